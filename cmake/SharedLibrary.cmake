@@ -1,0 +1,25 @@
+# libvltutils.so: all floors in one library that shows the names of cmake/exports.txt and no other.
+if(NOT TARGET vlcore)
+  return()
+endif()
+set(exports ${CMAKE_SOURCE_DIR}/cmake/exports.map)
+file(GLOB startup CONFIGURE_DEPENDS source/Utilities/startup.cpp)
+add_library(vltutils SHARED ${startup})
+set_target_properties(vltutils PROPERTIES
+  LINKER_LANGUAGE CXX VERSION ${PROJECT_VERSION} SOVERSION ${PROJECT_VERSION_MAJOR}
+  LINK_DEPENDS ${exports})
+set(floors "")
+foreach(floor vlcore ztcore ztfnd ztini)
+  if(TARGET ${floor})
+    list(APPEND floors ${floor})
+  endif()
+endforeach()
+list(JOIN floors "," floors)
+target_link_libraries(vltutils PRIVATE vlt_strict "$<LINK_LIBRARY:WHOLE_ARCHIVE,${floors}>")
+target_link_options(vltutils PRIVATE -Wl,--version-script=${exports} -Wl,-z,nodelete
+  -Wl,-z,relro -Wl,-z,now -Wl,--gc-sections)
+if(NOT VLT_SANITIZE)
+  target_link_options(vltutils PRIVATE -Wl,-z,defs)
+endif()
+target_include_directories(vltutils INTERFACE
+  $<BUILD_INTERFACE:${CMAKE_SOURCE_DIR}> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/vltutils>)

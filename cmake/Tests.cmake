@@ -1,0 +1,55 @@
+# GoogleTest is built from the distribution's sources with our flags. Each test runs in a process of
+# its own, inside a directory of its own (tests/support/main.cpp).
+include(GoogleTest)
+set(BUILD_GMOCK OFF CACHE BOOL "" FORCE)
+set(INSTALL_GTEST OFF CACHE BOOL "" FORCE)
+add_subdirectory(/usr/src/googletest ${CMAKE_BINARY_DIR}/googletest EXCLUDE_FROM_ALL SYSTEM)
+
+file(GLOB support CONFIGURE_DEPENDS tests/support/*.cpp)
+list(FILTER support EXCLUDE REGEX "_test\\.cpp$")
+add_library(vlt_test_support STATIC ${support})
+target_link_libraries(vlt_test_support PUBLIC vlt_strict gtest Threads::Threads)
+
+function(vlt_tests name)
+  cmake_parse_arguments(ARG "" "LABELS;TIMEOUT" "GLOBS;LINKS" ${ARGN})
+  file(GLOB sources CONFIGURE_DEPENDS ${ARG_GLOBS})
+  if(VLT_TEST_FILTER)
+    list(FILTER sources INCLUDE REGEX "${VLT_TEST_FILTER}")
+  endif()
+  if(NOT sources)
+    return()
+  endif()
+  add_executable(${name} ${sources})
+  target_link_libraries(${name} PRIVATE vlt_test_support ${ARG_LINKS})
+  if(NOT ARG_TIMEOUT)
+    set(ARG_TIMEOUT 120)
+  endif()
+  gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 60
+    PROPERTIES TIMEOUT ${ARG_TIMEOUT} LABELS "${ARG_LABELS}")
+endfunction()
+
+set(inside "")
+foreach(floor vlcore ztcore ztfnd ztini)
+  if(TARGET ${floor})
+    list(APPEND inside ${floor})
+  endif()
+endforeach()
+vlt_tests(support_tests LABELS unit GLOBS tests/support/*_test.cpp)
+vlt_tests(ztini_tests LABELS unit GLOBS ztini/*_test.cpp LINKS ztini)
+vlt_tests(fnd_tests LABELS unit GLOBS zt/fnd/*_test.cpp LINKS ztfnd)
+vlt_tests(osdep_tests LABELS unit GLOBS zt/fnd/osdep/*_test.cpp LINKS ztfnd)
+vlt_tests(ztcore_tests LABELS unit LINKS ${inside}
+  GLOBS ztcom/ztcore/*_test.cpp source/Common/ZtUtils/COM/*_test.cpp
+        source/Common/ZtUtils/General/*_test.cpp)
+vlt_tests(vlcore_tests LABELS unit LINKS ${inside}
+  GLOBS source/*_test.cpp source/Common/*_test.cpp source/Common/Posix/*_test.cpp
+        source/Pharlap/*_test.cpp source/Posix/*_test.cpp source/Utilities/*_test.cpp
+        vlloader/source/*_test.cpp)
+if(TARGET vltutils)
+  vlt_tests(e2e_tests LABELS e2e TIMEOUT 300 GLOBS tests/e2e/*_test.cpp LINKS vltutils)
+  if(TARGET e2e_tests)
+    target_compile_definitions(e2e_tests PRIVATE
+      VLT_TEST_LIBRARY="$<TARGET_FILE:vltutils>" VLT_TEST_BIN="${CMAKE_BINARY_DIR}/bin"
+      VLT_TEST_SOURCE="${CMAKE_SOURCE_DIR}")
+  endif()
+endif()
