@@ -1,0 +1,138 @@
+#include "ztini/Document.h"
+
+#include <cstring>
+
+#include "ztini/StringTools.h"
+
+namespace {
+
+constexpr size_t kScratchSize = 256;
+
+bool EnclosedIn(char quote, const char* value, size_t length) {
+  return length >= 2 && value[0] == quote && value[length - 1] == quote;
+}
+
+}  // namespace
+
+IniStructForwardReferenceTag* IniNew(int reserved) {
+  if (reserved != 0) return nullptr;
+  auto* doc = ztini::New<IniStructForwardReferenceTag>();
+  if (!doc) return nullptr;
+  doc->scratch = ztini_PI_NewHandle(kScratchSize);
+  if (!doc->scratch) {
+    ztini::Delete(doc);
+    return nullptr;
+  }
+  return doc;
+}
+
+void IniDispose(IniStructForwardReferenceTag* doc) {
+  if (!doc) return;
+  IniEmptyDocument(doc);
+  ztini_PI_DisposeHandle(doc->scratch);
+  ztini::Delete(doc);
+}
+
+int32_t IniSetDuplicateChecking(IniStructForwardReferenceTag* doc, int32_t value) {
+  return doc ? std::exchange(doc->duplicateChecking, value) : 0;
+}
+
+int32_t IniSetReadOptions(IniStructForwardReferenceTag* doc, int32_t bits) {
+  if (!doc) return 0;
+  doc->readOptions = bits;
+  return 1;
+}
+
+int32_t IniSetWriteOptions(IniStructForwardReferenceTag* doc, int32_t maxLineLength,
+                           int32_t breakCharacter, int32_t bits) {
+  if (!doc) return 0;
+  doc->maxLineLength = maxLineLength;
+  doc->breakCharacter = breakCharacter;
+  doc->writeOptions = bits;
+  return 1;
+}
+
+IniDurability IniSetDurability(IniStructForwardReferenceTag* doc, IniDurability durability) {
+  return doc ? std::exchange(doc->durability, durability) : IniDurability::None;
+}
+
+IniSection* IniNewSection(IniStructForwardReferenceTag* doc, const char* name) {
+  IniSection* section = ztini::New<IniSection>(&doc->fold);
+  if (!section) return nullptr;
+  section->flags = doc->sectionFlags;
+  section->name = ztini_StrDupWithoutSurrWhiteSpace(name);
+  if (!section->name) {
+    IniDisposeSection(section);
+    return nullptr;
+  }
+  return section;
+}
+
+IniEntry* IniNewEntry(const char* name, const char* value, int32_t readOptions) {
+  IniEntry* entry = ztini::New<IniEntry>();
+  if (!entry) return nullptr;
+  entry->name = ztini_StrDupWithoutSurrWhiteSpace(name);
+  entry->value = ztini_StrDupWithoutSurrWhiteSpace(value);
+  if (!entry->name || !entry->value) {
+    IniDisposeEntry(entry);
+    return nullptr;
+  }
+  IniNewEntryHandleQuotes(entry, readOptions);
+  return entry;
+}
+
+void IniDisposeSection(IniSection* section) {
+  if (!section) return;
+  for (int32_t n = section->items.count(); n >= 1; --n) IniDisposeEntry(section->item(n));
+  std::free(section->name);
+  ztini::Delete(section);
+}
+
+void IniDisposeEntry(IniEntry* entry) {
+  if (!entry) return;
+  std::free(entry->name);
+  std::free(entry->value);
+  ztini::Delete(entry);
+}
+
+void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions) {
+  const size_t length = strlen(entry->value);
+  entry->quote = 0;
+  if ((readOptions & kIniReadDoubleQuotes) && EnclosedIn('"', entry->value, length)) {
+    entry->quote = '"';
+  } else if ((readOptions & kIniReadSingleQuotes) && EnclosedIn('\'', entry->value, length)) {
+    entry->quote = '\'';
+  }
+  if (!entry->quote) return;
+  memmove(entry->value, entry->value + 1, length - 2);
+  entry->value[length - 2] = 0;
+}
+
+void IniReplaceValue(IniEntry* entry, char* value) {
+  std::free(entry->value);
+  entry->value = value;
+}
+
+bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section) {
+  if (!doc->sections.reserveOne()) {
+    IniDisposeSection(section);
+    return false;
+  }
+  doc->sections.append(section);
+  return true;
+}
+
+bool IniAppendEntry(IniSection* section, IniEntry* entry) {
+  if (!section->items.reserveOne()) {
+    IniDisposeEntry(entry);
+    return false;
+  }
+  section->items.append(entry);
+  return true;
+}
+
+void IniEmptyDocument(IniStructForwardReferenceTag* doc) {
+  doc->currentSection = nullptr;
+  for (int32_t n = doc->sections.count(); n >= 1; --n) IniDisposeSection(doc->section(n));
+  doc->sections.keepFirst(0);
+}

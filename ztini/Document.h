@@ -1,0 +1,76 @@
+#pragma once
+
+#include <cstdint>
+
+#include "ztini/Alloc.h"
+#include "ztini/Handle.h"
+#include "ztini/NameFold.h"
+#include "ztini/NameList.h"
+#include "ztini/ztini.h"
+
+// The records behind the engine's handles. Callers outside see the functions of ztini.h only.
+
+inline constexpr char kIniNullSectionName[] = "(null)";
+
+struct IniEntry : ztini::NameNode {
+  char* value = nullptr;  // owned; without surrounding white space and enclosing quotes
+  int32_t line = -1;      // -1: not from a file
+  int32_t quote = 0;      // what encloses the value in the file: 0, 34, 39, or as put
+};
+
+struct IniSection : ztini::NameNode {
+  explicit IniSection(ztini::NameFold* fold) : items(fold) {}
+
+  IniEntry* item(int32_t position) const { return static_cast<IniEntry*>(items.at(position)); }
+
+  ztini::NameList items;  // of IniEntry
+  int32_t flags = 0;
+  int32_t line = -1;  // of the header; -1: not from a file
+};
+
+struct IniStructForwardReferenceTag {
+  ztini::NameFold fold;
+  ztini::NameList sections{&fold};       // of IniSection
+  IniSection* currentSection = nullptr;  // the section last found, asked first
+  int32_t sectionFlags = 0;              // copied into new sections, read by nobody
+  int32_t duplicateChecking = 1;
+  int32_t caseSensitive = 0;
+  int32_t lastItemLine = -1;       // of the item last fetched by IniGet
+  ztini_Handle scratch = nullptr;  // the value last decoded
+  int32_t maxLineLength = 80;
+  int32_t breakCharacter = 0;
+  int32_t writeOptions = 14;
+  int32_t readOptions = 2;
+  int32_t firstBadLine = -1;  // of the last read; -1: none
+  IniDurability durability = IniDurability::None;
+  ztini::OwnedText fileName;  // last read or written successfully; null: none
+  int64_t fileTimestamp = 0;
+
+  ztini::NameMatch match() const {
+    return caseSensitive ? ztini::NameMatch::Exact : ztini::NameMatch::IgnoreCase;
+  }
+  IniSection* section(int32_t position) const {
+    return static_cast<IniSection*>(sections.at(position));
+  }
+};
+
+// Records that belong to no list yet; null without memory.
+IniSection* IniNewSection(IniStructForwardReferenceTag* doc, const char* name);
+IniEntry* IniNewEntry(const char* name, const char* value, int32_t readOptions);
+
+// Frees the record and what it holds; it must be in no list. Null is allowed.
+void IniDisposeSection(IniSection* section);
+void IniDisposeEntry(IniEntry* entry);
+
+// Removes the quotes that enclose the value, where the options ask for it, and sets `quote`.
+void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions);
+
+// Takes over a malloc block as the value and frees the old one.
+void IniReplaceValue(IniEntry* entry, char* value);
+
+// Appends the record, or disposes it. False without memory.
+bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section);
+bool IniAppendEntry(IniSection* section, IniEntry* entry);
+
+// Removes all sections, the last one first.
+void IniEmptyDocument(IniStructForwardReferenceTag* doc);

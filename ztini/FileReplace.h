@@ -1,0 +1,65 @@
+#pragma once
+
+#include <cstdint>
+
+#include "ztini/Alloc.h"
+#include "ztini/OpenFile.h"
+#include "ztini/ztini.h"
+
+namespace ztini {
+
+// Names of the temporary file beside a target; null without memory.
+
+// The target with its extension replaced by "TMP". What has no extension behind its last slash, has
+// no slash, or ends in ".TMP" already, gets ".TMP" appended.
+char* SiblingTemporaryName(const char* target);
+
+// For mkstemp: "ini$$.TMPXXXXXX" in the target's directory.
+char* UniqueTemporaryTemplate(const char* target);
+
+// One save of one file: open, write to stream(), commit. An object that goes without a commit
+// removes what it wrote, and the target is then as before.
+//
+//   state      open()                 commit()              destructor
+//   closed     opened, or closed      -                     nothing
+//   opened     -                      done, or closed       removes the written file
+//   done       -                      -                     nothing
+//
+// Without kIniWriteSafely the written file is the target itself.
+class FileReplacement {
+ public:
+  // The path must outlive the object.
+  FileReplacement(const char* target, int32_t writeOptions);
+  ~FileReplacement();
+  FileReplacement(const FileReplacement&) = delete;
+  FileReplacement& operator=(const FileReplacement&) = delete;
+
+  // 0, or kIniNotReplaceable, kIniNoTemporary, kIniCannotCreate, kIniOutOfMemory.
+  int32_t open();
+
+  FILE* stream() const { return m_stream.get(); }
+
+  // Closes the file, which was flushed, and puts it in place. 0, or kIniWriteFailed,
+  // kIniNotReplaceable.
+  int32_t commit(IniDurability durability);
+
+ private:
+  bool safely() const { return m_temporary != nullptr; }
+  ScopedFd openUnique();
+  ScopedFd openSibling();
+  int32_t openTemporary();
+  int32_t openTarget();
+  int32_t finish(ScopedFd fd);
+  void inheritFromTarget();
+  int32_t closeStream();
+  const char* written() const { return m_temporary ? m_temporary.get() : m_target; }
+  void discard();
+
+  const char* m_target;
+  int32_t m_options;
+  OwnedText m_temporary;  // null when the target itself is written
+  Stream m_stream;
+  bool m_pending = false;  // the written file is ours to remove
+};
+
+}  // namespace ztini

@@ -1,0 +1,158 @@
+#include "ztini/FileReplace.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <string>
+
+#include "tests/support/TempDir.h"
+#include "ztini/FailingAlloc.h"
+
+namespace {
+
+using vlt::test::Exists;
+using vlt::test::ModeOf;
+using vlt::test::ReadBytes;
+using vlt::test::TempDir;
+using vlt::test::WriteBytes;
+using ztini::FileReplacement;
+using ztini::OwnedText;
+
+TEST(IniFileReplace, SiblingNames) {
+  const struct {
+    const char *target, *expected;
+  } rows[] = {
+      {"/d/a.ini", "/d/a.TMP"},       {"/d/a.TMP", "/d/a.TMP.TMP"}, {"/d/a.tmp", "/d/a.TMP"},
+      {"a.ini", "a.ini.TMP"},         {"/d/a", "/d/a.TMP"},         {"/d.x/a", "/d.x/a.TMP"},
+      {"/d.x/a.b.c", "/d.x/a.b.TMP"}, {"/d/a.", "/d/a.TMP"},        {"/d/.ini", "/d/.TMP"},
+      {"d/a.ini", "d/a.TMP"},         {"./a.ini", "./a.TMP"},       {"a", "a.TMP"},
+      {"a.TMP", "a.TMP.TMP"}};
+  for (const auto& row : rows) {
+    OwnedText name(ztini::SiblingTemporaryName(row.target));
+    EXPECT_STREQ(name.get(), row.expected) << row.target;
+  }
+}
+
+TEST(IniFileReplace, UniqueTemplates) {
+  const struct {
+    const char *target, *expected;
+  } rows[] = {{"/d/a.ini", "/d/ini$$.TMPXXXXXX"},
+              {"/a.ini", "/ini$$.TMPXXXXXX"},
+              {"a.ini", "ini$$.TMPXXXXXX"},
+              {"d.x/e/a", "d.x/e/ini$$.TMPXXXXXX"}};
+  for (const auto& row : rows) {
+    OwnedText name(ztini::UniqueTemporaryTemplate(row.target));
+    EXPECT_STREQ(name.get(), row.expected) << row.target;
+  }
+}
+
+TEST(IniFileReplace, WithoutACommitTheTargetIsAsBeforeAndNothingElseRemains) {
+  for (int32_t options : {2, 6}) {
+    TempDir dir;
+    const std::string path = dir / "a.ini";
+    WriteBytes(path, "old");
+    {
+      FileReplacement file(path.c_str(), options);
+      ASSERT_EQ(file.open(), 0);
+      fputs("new", file.stream());
+      EXPECT_EQ(ReadBytes(path), "old");
+    }
+    EXPECT_EQ(ReadBytes(path), "old");
+    EXPECT_EQ(rmdir(dir.path().c_str()), -1);
+    unlink(path.c_str());
+    EXPECT_EQ(rmdir(dir.path().c_str()), 0);  // the target was all there was
+  }
+}
+
+TEST(IniFileReplace, TheStreamIsCloseOnExec) {
+  for (int32_t options : {0, 2, 6}) {
+    TempDir dir;
+    const std::string path = dir / "a.ini";
+    FileReplacement file(path.c_str(), options);
+    ASSERT_EQ(file.open(), 0);
+    EXPECT_EQ(fcntl(fileno(file.stream()), F_GETFD) & FD_CLOEXEC, FD_CLOEXEC) << options;
+  }
+}
+
+TEST(IniFileReplace, TheNewFileHasModeAndOwnerBeforeItIsInPlace) {
+  TempDir dir;
+  const std::string path = dir / "a.ini";
+  WriteBytes(path, "old");
+  chmod(path.c_str(), 0604);
+  const bool root = geteuid() == 0;
+  struct stat before;
+  if (root && chown(path.c_str(), 12345, 54321) != 0) GTEST_SKIP() << "no such owners here";
+  ASSERT_EQ(stat(path.c_str(), &before), 0);
+  for (int32_t options : {2, 6}) {
+    FileReplacement file(path.c_str(), options);
+    ASSERT_EQ(file.open(), 0);
+    fputs("new", file.stream());
+    fflush(file.stream());
+    EXPECT_EQ(file.commit(IniDurability::None), 0);
+    EXPECT_EQ(ReadBytes(path), "new");
+    EXPECT_EQ(ModeOf(path), 0604);
+    struct stat status;
+    stat(path.c_str(), &status);
+    EXPECT_EQ(status.st_uid, before.st_uid);
+    EXPECT_EQ(status.st_gid, before.st_gid);
+  }
+}
+
+TEST(IniFileReplace, AFailedRenameRemovesTheTemporary) {
+  TempDir dir;
+  const std::string path = dir / "a.ini", temporary = dir / "a.TMP";
+  FileReplacement file(path.c_str(), 2);
+  ASSERT_EQ(file.open(), 0);
+  EXPECT_TRUE(Exists(temporary));
+  ASSERT_EQ(mkdir(path.c_str(), 0777), 0);
+  EXPECT_EQ(file.commit(IniDurability::None), kIniNotReplaceable);
+  EXPECT_FALSE(Exists(temporary));
+}
+
+TEST(IniFileReplace, AStaleSiblingIsReplacedAndAPlantedLinkNotFollowed) {
+  TempDir dir;
+  const std::string path = dir / "a.ini", temporary = dir / "a.TMP", victim = dir / "victim";
+  WriteBytes(temporary, "left by a writer that was killed");
+  chmod(temporary.c_str(), 0);
+  {
+    FileReplacement file(path.c_str(), 2);
+    EXPECT_EQ(file.open(), 0);
+    EXPECT_EQ(ReadBytes(temporary), "");
+  }
+  WriteBytes(victim, "precious");
+  ASSERT_EQ(symlink(victim.c_str(), temporary.c_str()), 0);
+  FileReplacement file(path.c_str(), 2);
+  ASSERT_EQ(file.open(), 0);
+  fputs("new", file.stream());
+  fflush(file.stream());
+  EXPECT_EQ(file.commit(IniDurability::Synced), 0);
+  EXPECT_EQ(ReadBytes(victim), "precious");
+  EXPECT_EQ(ReadBytes(path), "new");
+}
+
+TEST(IniFileReplace, ADirectoryInTheSiblingsPlaceIsAnError) {
+  TempDir dir;
+  const std::string path = dir / "a.ini";
+  dir.makeDir("a.TMP");
+  FileReplacement file(path.c_str(), 2);
+  EXPECT_EQ(file.open(), kIniCannotCreate);
+  EXPECT_TRUE(Exists(dir / "a.TMP"));
+  EXPECT_FALSE(Exists(path));
+}
+
+TEST(IniFileReplace, OpenWithoutMemoryLeavesNothing) {
+  for (int32_t options : {2, 6}) {
+    TempDir dir;
+    const std::string path = dir / "a.ini";
+    {
+      ztini::test::FailFromAllocation fail(1);
+      FileReplacement file(path.c_str(), options);
+      EXPECT_EQ(file.open(), kIniOutOfMemory);
+    }
+    EXPECT_EQ(rmdir(dir.path().c_str()), 0);
+  }
+}
+
+}  // namespace

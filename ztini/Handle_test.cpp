@@ -1,0 +1,71 @@
+#include "ztini/Handle.h"
+
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <string>
+
+#include "ztini/FailingAlloc.h"
+
+namespace {
+
+using ztini::test::FailFromAllocation;
+
+std::string Bytes(ztini_Handle handle) {
+  return std::string(static_cast<char*>(handle->data), handle->size);
+}
+
+TEST(IniHandle, NewBlockIsZeroFilled) {
+  ztini_Handle handle = ztini_PI_NewHandle(300);
+  ASSERT_NE(handle, nullptr);
+  EXPECT_EQ(ztini_PI_GetHandleSize(handle), 300u);
+  EXPECT_EQ(Bytes(handle), std::string(300, '\0'));
+  ztini_PI_DisposeHandle(handle);
+}
+
+TEST(IniHandle, GrowthKeepsContentsAndZeroFillsTheRest) {
+  ztini_Handle handle = ztini_PI_NewHandle(3);
+  memcpy(handle->data, "abc", 3);
+  EXPECT_EQ(ztini_PI_SetHandleSize(handle, 1000), 1);
+  EXPECT_EQ(Bytes(handle), "abc" + std::string(997, '\0'));
+  EXPECT_EQ(ztini_PI_SetHandleSize(handle, 2), 1);
+  EXPECT_EQ(Bytes(handle), "ab");
+  EXPECT_EQ(ztini_PI_SetHandleSize(handle, 4), 1);
+  EXPECT_EQ(Bytes(handle), std::string("ab\0\0", 4));
+  ztini_PI_DisposeHandle(handle);
+}
+
+TEST(IniHandle, SizeZeroIsAUsableHandle) {
+  ztini_Handle handle = ztini_PI_NewHandle(0);
+  ASSERT_NE(handle, nullptr);
+  EXPECT_EQ(ztini_PI_GetHandleSize(handle), 0u);
+  EXPECT_EQ(ztini_PI_SetHandleSize(handle, 2), 1);
+  EXPECT_EQ(Bytes(handle), std::string(2, '\0'));
+  ztini_PI_DisposeHandle(handle);
+}
+
+TEST(IniHandle, FailedResizeLeavesTheBlockIntact) {
+  ztini_Handle handle = ztini_PI_NewHandle(3);
+  memcpy(handle->data, "abc", 3);
+  {
+    FailFromAllocation fail(1);
+    EXPECT_EQ(ztini_PI_SetHandleSize(handle, 100000), 0);
+  }
+  EXPECT_EQ(Bytes(handle), "abc");
+  ztini_PI_DisposeHandle(handle);
+}
+
+TEST(IniHandle, NewFailsWithNullAtEveryAllocation) {
+  for (int number = 1; number <= 2; ++number) {
+    FailFromAllocation fail(number);
+    EXPECT_EQ(ztini_PI_NewHandle(10), nullptr) << number;
+  }
+}
+
+TEST(IniHandle, NullIsAllowed) {
+  ztini_PI_DisposeHandle(nullptr);
+  EXPECT_EQ(ztini_PI_GetHandleSize(nullptr), 0u);
+  EXPECT_EQ(ztini_PI_SetHandleSize(nullptr, 5), 0);
+}
+
+}  // namespace

@@ -1,0 +1,183 @@
+#include "ztini/List.h"
+
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <vector>
+
+#include "ztini/FailingAlloc.h"
+
+namespace {
+
+using ztini::test::FailFromAllocation;
+
+struct DisposeList {
+  void operator()(ztini_List list) const { ztini_ListDispose(list); }
+};
+using Owned = std::unique_ptr<ztini_ListRecord, DisposeList>;
+
+Owned ListOf(const std::vector<int32_t>& items) {
+  Owned list(ztini_ListNew(sizeof(int32_t)));
+  for (int32_t item : items) EXPECT_EQ(ztini_ListInsertItem(list.get(), &item, 0), 1);
+  return list;
+}
+
+std::vector<int32_t> Items(const Owned& list) {
+  std::vector<int32_t> items;
+  for (int32_t at = 1; at <= ztini_ListNumItems(list.get()); ++at) {
+    items.push_back(*static_cast<int32_t*>(ztini_ListItem(list.get(), at)));
+  }
+  return items;
+}
+
+using Ints = std::vector<int32_t>;
+
+TEST(IniList, NewListIsEmptyWithoutCapacity) {
+  Owned list(ztini_ListNew(8));
+  EXPECT_EQ(ztini_ListNumItems(list.get()), 0);
+  EXPECT_EQ(list->capacity, 0u);
+  EXPECT_EQ(list->itemSize, 8u);
+}
+
+TEST(IniList, GetKnowsZeroAsLastAndMinusOneAsFirst) {
+  Owned list = ListOf({10, 20, 30});
+  const struct {
+    int32_t position, expected;
+  } rows[] = {{1, 10}, {2, 20}, {3, 30}, {0, 30}, {-1, 10}, {4, 777}, {5, 777}, {-2, 777}};
+  for (const auto& row : rows) {
+    int32_t out = 777;
+    ztini_ListGetItem(list.get(), &out, row.position);
+    EXPECT_EQ(out, row.expected) << row.position;
+  }
+}
+
+TEST(IniList, InsertPlacesBeforeAtTheEndAndAtTheFront) {
+  const struct {
+    int32_t position, result;
+    Ints expected;
+  } rows[] = {
+      {1, 1, {9, 10, 20, 30}}, {2, 1, {10, 9, 20, 30}}, {3, 1, {10, 20, 9, 30}},
+      {4, 1, {10, 20, 30, 9}}, {0, 1, {10, 20, 30, 9}}, {-1, 1, {9, 10, 20, 30}},
+      {5, 0, {10, 20, 30}},    {-2, 0, {10, 20, 30}},
+  };
+  for (const auto& row : rows) {
+    Owned list = ListOf({10, 20, 30});
+    const int32_t nine = 9;
+    EXPECT_EQ(ztini_ListInsertItem(list.get(), &nine, row.position), row.result) << row.position;
+    EXPECT_EQ(Items(list), row.expected) << row.position;
+  }
+}
+
+TEST(IniList, SeveralItemsAreInsertedAtOnceAndANullSourceGivesZeros) {
+  Owned list = ListOf({1, 2});
+  const int32_t two[] = {8, 9};
+  EXPECT_EQ(ztini_ListInsertItems(list.get(), two, 2, 2), 1);
+  EXPECT_EQ(ztini_ListInsertItems(list.get(), nullptr, -1, 2), 1);
+  EXPECT_EQ(Items(list), (Ints{0, 0, 1, 8, 9, 2}));
+}
+
+TEST(IniList, RemoveTakesTheItemOut) {
+  const struct {
+    int32_t position, out;
+    Ints expected;
+  } rows[] = {
+      {1, 10, {20, 30, 40}},      {2, 20, {10, 30, 40}},       {3, 30, {10, 20, 40}},
+      {4, 40, {10, 20, 30}},      {0, 40, {10, 20, 30}},       {-1, 10, {20, 30, 40}},
+      {5, 777, {10, 20, 30, 40}}, {-2, 777, {10, 20, 30, 40}},
+  };
+  for (const auto& row : rows) {
+    Owned list = ListOf({10, 20, 30, 40});
+    int32_t out = 777;
+    ztini_ListRemoveItem(list.get(), &out, row.position);
+    EXPECT_EQ(out, row.out) << row.position;
+    EXPECT_EQ(Items(list), row.expected) << row.position;
+  }
+}
+
+TEST(IniList, FindStartsAtTheGivenPosition) {
+  Owned list = ListOf({5, 6, 5, 7});
+  const struct {
+    int32_t item, start, expected;
+  } rows[] = {{5, 1, 1}, {5, 2, 3}, {5, -1, 1}, {7, 0, 4},
+              {5, 0, 0}, {8, 1, 0}, {5, 5, 0},  {5, 9, 0}};
+  for (const auto& row : rows) {
+    EXPECT_EQ(ztini_ListFindItem(list.get(), &row.item, row.start, nullptr), row.expected)
+        << row.item << " from " << row.start;
+  }
+}
+
+TEST(IniList, FindUsesTheCompareFunction) {
+  Owned list = ListOf({15, 26, 37});
+  const int32_t six = 6;
+  const auto sameUnits = [](const void* left, const void* right) {
+    return *static_cast<const int32_t*>(left) % 10 - *static_cast<const int32_t*>(right) % 10;
+  };
+  EXPECT_EQ(ztini_ListFindItem(list.get(), &six, 1, sameUnits), 2);
+}
+
+TEST(IniList, NullArgumentsAndEmptyListsDoNothing) {
+  int32_t item = 3;
+  EXPECT_EQ(ztini_ListInsertItem(nullptr, &item, 1), 0);
+  EXPECT_EQ(ztini_ListFindItem(nullptr, &item, 1, nullptr), 0);
+  EXPECT_EQ(ztini_ListNumItems(nullptr), 0);
+  EXPECT_EQ(ztini_ListItem(nullptr, 1), nullptr);
+  ztini_ListGetItem(nullptr, &item, 1);
+  ztini_ListRemoveItem(nullptr, &item, 1);
+  Owned list = ListOf({});
+  for (int32_t position : {0, -1, 1}) {
+    ztini_ListGetItem(list.get(), &item, position);
+    ztini_ListRemoveItem(list.get(), &item, position);
+    EXPECT_EQ(ztini_ListFindItem(list.get(), &item, position, nullptr), 0);
+  }
+  EXPECT_EQ(item, 3);
+  EXPECT_EQ(ztini_ListFindItem(list.get(), nullptr, 1, nullptr), 0);
+  EXPECT_EQ(ztini_ListNew(0), nullptr);
+}
+
+TEST(IniList, FailedInsertLeavesTheListAsItWas) {
+  Owned list = ListOf({1, 2, 3, 4});
+  const int32_t nine = 9;
+  {
+    FailFromAllocation fail(1);
+    EXPECT_EQ(ztini_ListInsertItems(list.get(), &nine, 2, 1), 0);
+    EXPECT_EQ(ztini_ListNew(4), nullptr);
+  }
+  EXPECT_EQ(Items(list), (Ints{1, 2, 3, 4}));
+}
+
+TEST(IniList, ReservedRoomMakesInsertIndependentOfMemory) {
+  Owned list = ListOf({1});
+  EXPECT_EQ(ztini_ListReserve(list.get(), 1000), 1);
+  FailFromAllocation fail(1);
+  for (int32_t item = 2; item <= 1001; ++item) {
+    ASSERT_EQ(ztini_ListInsertItem(list.get(), &item, 0), 1);
+  }
+}
+
+TEST(IniList, ImpossibleSizesAreRefused) {
+  Owned list(ztini_ListNew(UINT32_MAX));
+  EXPECT_EQ(ztini_ListReserve(list.get(), UINT32_MAX), 0);
+  EXPECT_EQ(ztini_ListInsertItems(list.get(), nullptr, 0, UINT32_MAX), 0);
+}
+
+TEST(IniList, MixedUseAgreesWithAVector) {
+  Owned list = ListOf({});
+  Ints model;
+  uint32_t random = 1;
+  for (int32_t step = 0; step < 20000; ++step) {
+    random = random * 1664525u + 1013904223u;
+    const int32_t count = static_cast<int32_t>(model.size());
+    const int32_t at = static_cast<int32_t>((random >> 16) % static_cast<uint32_t>(count + 1));
+    if (random >> 31 || model.empty()) {
+      ASSERT_EQ(ztini_ListInsertItem(list.get(), &step, at + 1), 1);
+      model.insert(model.begin() + at, step);
+    } else {
+      const int32_t victim = at % count;
+      ztini_ListRemoveItem(list.get(), nullptr, victim + 1);
+      model.erase(model.begin() + victim);
+    }
+  }
+  EXPECT_EQ(Items(list), model);
+}
+
+}  // namespace

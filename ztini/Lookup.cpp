@@ -1,0 +1,134 @@
+#include "ztini/Document.h"
+#include "ztini/StringTools.h"
+
+#include <cstring>
+
+namespace {
+
+using Doc = IniStructForwardReferenceTag;
+
+IniEntry* FindItem(Doc* doc, const char* section, const char* item) {
+  return doc ? IniFindEntry(IniFindSection(doc, section), doc->caseSensitive, item) : nullptr;
+}
+
+IniEntry* NthItem(Doc* doc, const char* section, int32_t n) {
+  IniSection* found = IniFindSection(doc, section);
+  return found ? found->item(n) : nullptr;
+}
+
+bool IsCurrent(Doc* doc, const char* name) {
+  if (!doc->currentSection) return false;
+  if (doc->caseSensitive) return strcmp(doc->currentSection->name, name) == 0;
+  return ztini_StrICmpWithoutSurrWhiteSpace(doc->currentSection->name, name) == 0;
+}
+
+int32_t Give(const char* text, const char** out) {
+  if (out) *out = text;
+  return text ? 1 : 0;
+}
+
+}  // namespace
+
+IniSection* IniFindSection(Doc* doc, const char* section) {
+  if (!doc || !section) return nullptr;
+  if (IsCurrent(doc, section)) return doc->currentSection;
+  ztini::NameNode* found = doc->sections.find(section, doc->match());
+  if (found) doc->currentSection = static_cast<IniSection*>(found);
+  return static_cast<IniSection*>(found);
+}
+
+int32_t IniFindSectionIndex(Doc* doc, const char* section) {
+  IniSection* found = IniFindSection(doc, section);
+  return found ? doc->sections.positionOf(found) : 0;
+}
+
+IniEntry* IniFindEntry(IniSection* section, int32_t caseSensitive, const char* item) {
+  if (!section) return nullptr;
+  const auto match = caseSensitive ? ztini::NameMatch::Exact : ztini::NameMatch::IgnoreCase;
+  return static_cast<IniEntry*>(section->items.find(item, match));
+}
+
+int32_t IniFindEntryIndex(IniSection* section, int32_t caseSensitive, const char* item) {
+  IniEntry* found = IniFindEntry(section, caseSensitive, item);
+  return found ? section->items.positionOf(found) : 0;
+}
+
+int32_t IniSectionExists(Doc* doc, const char* section) {
+  return IniFindSection(doc, section) ? 1 : 0;
+}
+
+int32_t IniItemExists(Doc* doc, const char* section, const char* item) {
+  return FindItem(doc, section, item) ? 1 : 0;
+}
+
+int32_t IniLineOfSection(Doc* doc, const char* section) {
+  IniSection* found = IniFindSection(doc, section);
+  return found ? found->line : -1;
+}
+
+const char* IniSectionName(const IniSection* section) { return section ? section->name : nullptr; }
+
+const char* IniEntryName(const IniEntry* entry) { return entry ? entry->name : nullptr; }
+
+int32_t IniSectionWasReadFromFile(const IniSection* section) {
+  return section && section->line >= 0 ? 1 : 0;
+}
+
+int32_t IniSectionIsNull(const IniSection* section) {
+  return section && strcmp(section->name, kIniNullSectionName) == 0 ? 1 : 0;
+}
+
+int32_t IniNumberOfSections(Doc* doc) { return doc ? doc->sections.count() : 0; }
+
+int32_t IniNumberOfItems(Doc* doc, const char* section) {
+  IniSection* found = IniFindSection(doc, section);
+  return found ? found->items.count() : 0;
+}
+
+int32_t IniNthSectionName(Doc* doc, int32_t n, const char** name) {
+  IniSection* found = doc ? doc->section(n) : nullptr;
+  if (found) doc->currentSection = found;
+  return Give(IniSectionName(found), name);
+}
+
+int32_t IniNthItemName(Doc* doc, const char* section, int32_t n, const char** name) {
+  return Give(IniEntryName(NthItem(doc, section, n)), name);
+}
+
+int32_t IniNthItemPointerToString(Doc* doc, const char* section, int32_t n, const char** value) {
+  const IniEntry* found = NthItem(doc, section, n);
+  return Give(found ? found->value : nullptr, value);
+}
+
+int32_t IniGet(Doc* doc, const char* section, const char* item, const char** value) {
+  const IniEntry* found = FindItem(doc, section, item);
+  if (found) doc->lastItemLine = found->line;
+  return Give(found ? found->value : nullptr, value);
+}
+
+int32_t IniRenameSection(Doc* doc, const char* section, const char* name) {
+  IniSection* found = IniFindSection(doc, section);
+  if (!found || !name) return 0;
+  char* copy = ztini_StrDupWithoutSurrWhiteSpace(name);
+  if (!copy) return kIniOutOfMemory;
+  doc->sections.rename(found, copy);
+  return 1;
+}
+
+int32_t IniRemoveSection(Doc* doc, const char* section) {
+  IniSection* found = IniFindSection(doc, section);
+  if (!found) return 0;
+  doc->sections.remove(found);
+  if (doc->currentSection == found) doc->currentSection = nullptr;
+  IniDisposeSection(found);
+  return 1;
+}
+
+int32_t IniRemoveItem(Doc* doc, const char* section, const char* item) {
+  IniSection* parent = IniFindSection(doc, section);
+  IniEntry* found = parent ? IniFindEntry(parent, doc->caseSensitive, item) : nullptr;
+  if (!found) return 0;
+  parent->items.remove(found);
+  IniDisposeEntry(found);
+  return 1;
+}

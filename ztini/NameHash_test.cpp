@@ -1,0 +1,47 @@
+#include "ztini/NameHash.h"
+
+#include <gtest/gtest.h>
+
+#include <set>
+#include <string>
+
+namespace {
+
+using ztini::HashName;
+using ztini::NameFold;
+using ztini::SameFoldedName;
+
+TEST(IniNameHash, EqualNamesHashEqually) {
+  NameFold fold;
+  const struct {
+    const char *left, *right;
+  } rows[] = {{"a", " A\t"},
+              {"", "  "},
+              {"Section 12", "SECTION 12"},
+              {"exactly8", " EXACTLY8 "},
+              {"longer than one word", "LONGER THAN ONE WORD"},
+              {"\xc3\xa4", "\xc3\xa4 "}};
+  for (const auto& row : rows) {
+    EXPECT_EQ(HashName(fold, row.left), HashName(fold, row.right)) << row.left;
+    EXPECT_TRUE(SameFoldedName(fold, row.left, row.right)) << row.left;
+  }
+}
+
+TEST(IniNameHash, DifferentNamesAreToldApart) {
+  NameFold fold;
+  EXPECT_FALSE(SameFoldedName(fold, "a", "b"));
+  EXPECT_FALSE(SameFoldedName(fold, "a b", "ab"));
+  EXPECT_FALSE(SameFoldedName(fold, "a", "a b"));
+  EXPECT_FALSE(SameFoldedName(fold, "\xc3\xa4", "\xc3\xb6"));
+}
+
+TEST(IniNameHash, ManyNamesSpread) {
+  NameFold fold;
+  std::set<uint32_t> low;
+  for (int i = 0; i < 10000; ++i) {
+    low.insert(static_cast<uint32_t>(HashName(fold, ("\xe3\x81" + std::to_string(i)).c_str())));
+  }
+  EXPECT_GT(low.size(), 9990u);
+}
+
+}  // namespace

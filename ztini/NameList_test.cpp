@@ -1,0 +1,142 @@
+#include "ztini/NameList.h"
+
+#include <gtest/gtest.h>
+
+#include <deque>
+#include <string>
+#include <vector>
+
+#include "ztini/FailingAlloc.h"
+#include "ztini/StringTools.h"
+
+namespace {
+
+using ztini::NameFold;
+using ztini::NameList;
+using ztini::NameMatch;
+using ztini::NameNode;
+
+class IniNameList : public testing::Test {
+ protected:
+  ~IniNameList() override {
+    for (NameNode& node : m_nodes) std::free(node.name);
+  }
+  NameNode* add(const std::string& name) {
+    m_nodes.push_back(NameNode{ztini_StrDup(name.c_str()), 0, nullptr, nullptr});
+    EXPECT_TRUE(list.reserveOne());
+    list.append(&m_nodes.back());
+    return &m_nodes.back();
+  }
+  NameNode* find(const char* name) { return list.find(name, NameMatch::IgnoreCase); }
+
+  NameFold fold;
+  NameList list{&fold};
+
+ private:
+  std::deque<NameNode> m_nodes;
+};
+
+TEST_F(IniNameList, FindsTheFirstOfEqualNamesWhenShortAndWhenLong) {
+  NameNode* first = add("x");
+  NameNode* second = add("X");
+  EXPECT_EQ(find(" x "), first);
+  for (int i = 0; i < 100; ++i) add("n" + std::to_string(i));
+  EXPECT_EQ(find("X"), first);
+  list.remove(first);
+  EXPECT_EQ(find("x"), second);
+  NameNode* third = add("x");
+  list.remove(second);
+  EXPECT_EQ(find("x"), third);
+}
+
+TEST_F(IniNameList, ExactMatchIsCaseSensitiveAndLooksAtWhiteSpace) {
+  NameNode* upper = add("ABC");
+  NameNode* lower = add("abc");
+  for (int rounds = 0; rounds < 2; ++rounds) {
+    EXPECT_EQ(list.find("abc", NameMatch::Exact), lower);
+    EXPECT_EQ(list.find("ABC", NameMatch::Exact), upper);
+    EXPECT_EQ(list.find("Abc", NameMatch::Exact), nullptr);
+    EXPECT_EQ(list.find("abc ", NameMatch::Exact), nullptr);
+    for (int i = 0; i < 50; ++i) add("n" + std::to_string(i));
+  }
+}
+
+TEST_F(IniNameList, PositionsFollowRemovals) {
+  std::vector<NameNode*> all;
+  for (int i = 0; i < 40; ++i) all.push_back(add(std::to_string(i)));
+  list.remove(all[0]);
+  list.remove(all[20]);
+  EXPECT_EQ(list.positionOf(all[1]), 1);
+  EXPECT_EQ(list.positionOf(all[19]), 19);
+  EXPECT_EQ(list.positionOf(all[21]), 20);
+  EXPECT_EQ(list.positionOf(all[39]), 38);
+  EXPECT_EQ(list.positionOf(all[20]), 0);
+  EXPECT_EQ(list.at(0), all[39]);
+  EXPECT_EQ(list.at(-1), all[1]);
+  EXPECT_EQ(list.at(39), nullptr);
+}
+
+TEST_F(IniNameList, RenameMovesTheNodeToItsNewChain) {
+  std::vector<NameNode*> all;
+  for (int i = 0; i < 40; ++i) all.push_back(add("n" + std::to_string(i)));
+  EXPECT_EQ(find("n5"), all[5]);
+  list.rename(all[3], ztini_StrDup("N5"));
+  EXPECT_EQ(find("n5"), all[3]);  // earlier in the list than the old bearer of the name
+  EXPECT_EQ(find("n3"), nullptr);
+  list.rename(all[3], ztini_StrDup("other"));
+  EXPECT_EQ(find("n5"), all[5]);
+  EXPECT_EQ(find("OTHER"), all[3]);
+}
+
+TEST_F(IniNameList, NullNameIsNotFound) {
+  add("x");
+  EXPECT_EQ(find(nullptr), nullptr);
+}
+
+TEST_F(IniNameList, WithoutMemoryForTheIndexItScans) {
+  std::vector<NameNode*> all;
+  for (int i = 0; i < 60; ++i) all.push_back(add("n" + std::to_string(i)));
+  char* name = ztini_StrDup("n7");
+  ztini::test::FailFromAllocation fail(1);
+  for (int i = 0; i < 60; ++i) {
+    EXPECT_EQ(find(("N" + std::to_string(i)).c_str()), all[static_cast<size_t>(i)]);
+  }
+  EXPECT_TRUE(fail.failed());
+  list.remove(all[7]);
+  EXPECT_EQ(find("n7"), nullptr);
+  list.rename(all[8], name);
+  EXPECT_EQ(find("n7"), all[8]);
+}
+
+TEST_F(IniNameList, AnIndexThatCannotGrowIsReplacedByAScan) {
+  std::vector<NameNode> extra(200);
+  for (int i = 0; i < 30; ++i) add("n" + std::to_string(i));
+  EXPECT_NE(find("n1"), nullptr);  // builds the index
+  for (size_t i = 0; i < extra.size(); ++i) {
+    extra[i].name = ztini_StrDup(("e" + std::to_string(i)).c_str());
+  }
+  for (NameNode& node : extra) {
+    ASSERT_TRUE(list.reserveOne());
+    ztini::test::FailFromAllocation fail(1);
+    list.append(&node);
+    EXPECT_EQ(find(node.name), &node);
+  }
+  EXPECT_EQ(find("e0"), &extra[0]);
+  EXPECT_EQ(find("n29"), list.at(30));
+  for (NameNode& node : extra) std::free(node.name);
+}
+
+TEST_F(IniNameList, CompactionForgetsTheIndex) {
+  std::vector<NameNode*> all;
+  for (int i = 0; i < 40; ++i) all.push_back(add("n" + std::to_string(i)));
+  EXPECT_EQ(find("n30"), all[30]);
+  NameNode** nodes = list.nodes();
+  nodes[1] = nodes[39];
+  list.keepFirst(2);
+  EXPECT_EQ(list.count(), 2);
+  EXPECT_EQ(find("n39"), all[39]);
+  EXPECT_EQ(find("n30"), nullptr);
+  EXPECT_EQ(list.positionOf(all[39]), 2);
+}
+
+}  // namespace

@@ -1,0 +1,276 @@
+#include <gtest/gtest.h>
+
+#include <string>
+
+#include "ztini/FailingAlloc.h"
+#include "ztini/TestDocument.h"
+
+namespace {
+
+using ztini::test::Document;
+using ztini::test::FailFromAllocation;
+using ztini::test::MemoryLines;
+using ztini::test::NewDocument;
+using ztini::test::Parse;
+using ztini::test::RawValue;
+using ztini::test::Read;
+using ztini::test::Show;
+using namespace std::string_literals;
+
+struct Row {
+  const char* text;
+  int32_t options;
+  const char* expected;
+  int32_t firstBadLine;
+};
+
+void Check(const Row& row, int32_t duplicateChecking = 1) {
+  Document doc = Parse(row.text, row.options, duplicateChecking);
+  ASSERT_NE(doc, nullptr) << row.text;
+  EXPECT_EQ(Show(doc), row.expected) << row.text;
+  EXPECT_EQ(doc->firstBadLine, row.firstBadLine) << row.text;
+}
+
+TEST(IniParser, Headers) {
+  const Row rows[] = {
+      {"[a]", 2, "[a@1]", -1},
+      {"[ name ]tail", 2, "[name@1]", -1},
+      {"  [\ta b\v]\n", 2, "[a b@1]", -1},
+      {"[a]b]\n", 2, "[a@1]", -1},
+      {"[a;b]\n", 2, "[a;b@1]", -1},
+      {"[a=b]\n", 2, "[a=b@1]", -1},
+      {"[[a]\n", 2, "[[a@1]", -1},
+      {"[]\n", 2, "", 1},
+      {"[   ]\n", 2, "", 1},
+      {"[abc\n", 2, "", 1},
+      {"[x=1\n", 2, "", 1},
+      {"[a]\n[bad\nx=1\n", 2, "[a@1] x=1@3", 2},
+      {"[a]\n[ ]\nx=1\n", 2, "[a@1] x=1@3", 2},
+      {"[a] x=1\n", 2, "[a@1]", -1},
+  };
+  for (const Row& row : rows) Check(row);
+}
+
+TEST(IniParser, Items) {
+  const Row rows[] = {
+      {"[s]\nkey=value\n", 2, "[s@1] key=value@2", -1},
+      {"[s]\n  my key \t=\t my value \v\n", 2, "[s@1] my key=my value@2", -1},
+      {"[s]\na=b=c\n", 2, "[s@1] a=b=c@2", -1},
+      {"[s]\na:b=c\n", 2, "[s@1] a:b=c@2", -1},
+      {"[s]\n=value\n", 2, "[s@1]", 2},
+      {"[s]\n  =value\n", 2, "[s@1]", 2},
+      {"[s]\n \t \n", 2, "[s@1]", 2},
+      {"[s]\nword\n", 2, "[s@1]", 2},
+      {"[s]\nx=1\n\ny=2\nbad\n", 2, "[s@1] x=1@2 y=2@4", 3},
+      {"[s]\nkey=\n", 2, "[s@1]", 2},
+      {"[s]\nkey=   \n", 2, "[s@1]", 2},
+      {"[s]\nkey=\n", 3, "[s@1] key=@2", -1},
+      {"[s]\nkey=\"\"\n", 2, "[s@1] key=\"\"@2", -1},
+      {"[s]\nkey=\"\"\n", 0, "[s@1] key=\"\"@2", -1},
+      {"[s]\nkey = \"a\" b\n", 2, "[s@1] key=\"a\" b@2", -1},
+      {"[s]\nkey=\"\n", 2, "[s@1] key=\"@2", -1},
+      {"[s]\nkey=\"  a \"\n", 2, "[s@1] key=\"  a \"@2", -1},
+      {"[s]\nkey='a'\n", 4, "[s@1] key='a'@2", -1},
+      {"[s]\na.b[1]=x\n", 2, "[s@1] a.b[1]=x@2", -1},
+      {"[s]\nx=a;b\n", 2, "[s@1] x=a;b@2", -1},
+      {"[s]\nx=\\n\\\"\n", 2, "[s@1] x=\\n\\\"@2", -1},
+      {"[s]\nx]=1\n", 2, "[s@1] x]=1@2", -1},
+  };
+  for (const Row& row : rows) Check(row);
+}
+
+TEST(IniParser, ALoneQuoteStaysAOneCharacterValue) {
+  Document doc = Parse("[s]\nkey=\"\n");
+  EXPECT_EQ(doc->section(1)->item(1)->quote, 0);
+  EXPECT_EQ(RawValue(doc, "s", "key"), "\"");
+}
+
+TEST(IniParser, AQuoteInsideAValueLeavesItWhole) {
+  Document doc = Parse("[s]\nkey = \"a\" b\n");
+  EXPECT_EQ(doc->section(1)->item(1)->quote, 0);
+  EXPECT_EQ(RawValue(doc, "s", "key"), "\"a\" b");
+}
+
+TEST(IniParser, CommentsBeginALineWithASemicolonAndNothingElseDoes) {
+  const Row rows[] = {
+      {";c\n[s]\n ; x=1\nx=1 ; y\n", 2, "[s@2] x=1 ; y@4", -1},
+      {"[s]\n#x=1\n", 2, "[s@1] #x=1@2", -1},
+      {"[s]\n//x=1\n", 2, "[s@1] //x=1@2", -1},
+      {"[s]\nx;y=1\n", 2, "[s@1] x;y=1@2", -1},
+  };
+  for (const Row& row : rows) Check(row);
+}
+
+TEST(IniParser, ColonsSeparateUnderTheirOptionOnly) {
+  const Row rows[] = {
+      {"[s]\na:b\n", 10, "[s@1] a=b@2", -1},
+      {"[s]\na:=b\n", 10, "[s@1] a=b@2", -1},
+      {"[s]\na : = b\n", 10, "[s@1] a== b@2", -1},
+      {"[s]\na=:b\n", 10, "[s@1] a=:b@2", -1},
+      {"[s]\na=b:c\n", 10, "[s@1] a=b:c@2", -1},
+      {"[s]\na:b=c\n", 10, "[s@1] a=b=c@2", -1},
+      {"[s]\n:b\n", 10, "[s@1]", 2},
+      {"[s]\n:=b\n", 10, "[s@1]", 2},
+      {"[s]\na:=\n", 10, "[s@1]", 2},
+      {"[s]\na:=\n", 11, "[s@1] a=@2", -1},
+      {"[s]\na:b\n", 2, "[s@1]", 2},
+  };
+  for (const Row& row : rows) Check(row);
+}
+
+TEST(IniParser, ItemsBeforeTheFirstHeader) {
+  const Row rows[] = {
+      {"x=1\n[a]\ny=2\n", 2, "[a@2] y=2@3", -1},
+      {"x=1\n[a]\ny=2\n", 10, "[(null)@-1] x=1@1 [a@2] y=2@3", -1},
+      {"x=1\nz=3\n[(null)]\ny=2\n", 10, "[(null)@3] x=1@1 z=3@2 y=2@4", -1},
+      {"bad\nx=\n", 10, "", 1},
+  };
+  for (const Row& row : rows) Check(row);
+}
+
+TEST(IniParser, RepeatsUpdateTheFirstOne) {
+  const Row rows[] = {
+      {"[a]\nx=1\n[b]\n[A]\nx=2\n", 2, "[a@4] x=2@5 [b@3]", -1},
+      {"[a]\nx=1\ny=2\n X =\"3\"\n", 2, "[a@1] x=\"3\"@4 y=2@3", -1},
+      {"[a]\nx=\"1\"\nx=2\n", 2, "[a@1] x=2@3", -1},
+      {"[a]\nx=1\nx=\n", 2, "[a@1] x=1@2", 3},
+      {"[a]\nx=1\n[b]\ny=1\n[ a ]\nz=3\n", 2, "[a@5] x=1@2 z=3@6 [b@3] y=1@4", -1},
+  };
+  for (const Row& row : rows) Check(row);
+}
+
+TEST(IniParser, RepeatsStaySeparateWithoutDuplicateChecking) {
+  const Row rows[] = {
+      {"[a]\nx=1\nX=2\n[A]\nx=3\n", 2, "[a@1] x=1@2 X=2@3 [A@4] x=3@5", -1},
+      {"x=1\n[(null)]\ny=2\n", 10, "[(null)@-1] x=1@1 [(null)@2] y=2@3", -1},
+  };
+  for (const Row& row : rows) Check(row, 0);
+}
+
+TEST(IniParser, OptionSixteenDoesNothing) {
+  Check({"[s]\na:b\nkey=\nx='1'\n", 16, "[s@1] x='1'@4", 2});
+}
+
+TEST(IniParser, EveryLineEndReadsAlike) {
+  for (const std::string& end : {"\n"s, "\r"s, "\r\n"s, "\n\r"s, "\0"s}) {
+    Document doc = Parse("[a]" + end + "x=1" + end + "[b]" + end + "y=2" + end);
+    EXPECT_EQ(Show(doc), "[a@1] x=1@2 [b@3] y=2@4");
+  }
+  Document mixed = Parse("[a]\r\nx=1\n[b]\ry=2");
+  EXPECT_EQ(Show(mixed), "[a@1] x=1@2 [b@3] y=2@4");
+}
+
+TEST(IniParser, ALastLineWithoutATerminatorIsRead) {
+  EXPECT_EQ(Show(Parse("[a]\nx=1")), "[a@1] x=1@2");
+  EXPECT_EQ(Show(Parse("[a]")), "[a@1]");
+}
+
+TEST(IniParser, AnUnterminatedLastLineOfExactlyTheCapacityLessOneIsLost) {
+  const struct {
+    size_t length;
+    bool lost;
+  } rows[] = {{254, false}, {255, true},  {256, false},  {510, false}, {511, true},
+              {512, false}, {513, false}, {1022, false}, {1023, true}, {1024, false}};
+  for (const auto& row : rows) {
+    const std::string value(row.length - 2, 'v');
+    Document doc = Parse("[a]\nx=" + value);
+    EXPECT_EQ(RawValue(doc, "a", "x"), row.lost ? "<absent>" : value) << row.length;
+  }
+}
+
+TEST(IniParser, TheLossyLengthFollowsTheCapacityReached) {
+  const std::string grow = "[a]\ny=" + std::string(298, 'y') + "\n";
+  EXPECT_EQ(RawValue(Parse(grow + "x=" + std::string(253, 'v')), "a", "x"), std::string(253, 'v'));
+  EXPECT_EQ(RawValue(Parse(grow + "x=" + std::string(509, 'v')), "a", "x"), "<absent>");
+}
+
+TEST(IniParser, AFirstLineOf255CharactersMergesWithTheNext) {
+  const std::string header = "[" + std::string(253, 'n') + "]";
+  ASSERT_EQ(header.size(), 255u);
+  Document doc = Parse(header + "\nx=1\ny=2\n");
+  // The second line is what follows the "]" of the first; it counts as line 1.
+  EXPECT_EQ(Show(doc), "[" + std::string(253, 'n') + "@1] y=2@2");
+  const std::string comment = ";" + std::string(254, 'c');
+  EXPECT_EQ(Show(Parse(comment + "\n[a]\n[b]\nx=1\n")), "[b@2] x=1@3");
+  EXPECT_EQ(Show(Parse(header + "\n")), "");  // its end goes as half a pair, then the file ends
+}
+
+TEST(IniParser, LaterLinesOfTheBoundaryLengthsReadCorrectly) {
+  for (size_t length : {254u, 255u, 256u, 257u, 510u, 511u, 512u, 513u}) {
+    for (const std::string& end : {"\n"s, "\r\n"s, "\r"s}) {
+      const std::string value(length - 2, 'v');
+      Document doc = Parse("[a]" + end + "x=" + value + end + "y=2" + end);
+      EXPECT_EQ(RawValue(doc, "a", "x"), value) << length;
+      EXPECT_EQ(RawValue(doc, "a", "y"), "2") << length;
+    }
+  }
+}
+
+TEST(IniParser, EachReadEmptiesTheDocumentFirst) {
+  Document doc = Parse("bad\n[a]\nx=1\n");
+  IniFindSection(doc.get(), "a");
+  EXPECT_EQ(doc->firstBadLine, 1);
+  EXPECT_EQ(Read(doc, "[b]\ny=2\n"), 0);
+  EXPECT_EQ(Show(doc), "[b@1] y=2@2");
+  EXPECT_EQ(doc->firstBadLine, -1);
+  EXPECT_EQ(IniSectionExists(doc.get(), "a"), 0);
+  EXPECT_EQ(Read(doc, ""), 0);
+  EXPECT_EQ(Show(doc), "");
+}
+
+TEST(IniParser, NullDocumentAndNullFunction) {
+  MemoryLines lines("[a]\n");
+  EXPECT_EQ(IniRead(nullptr, IniLineFileInputFunction, lines.state()), 0);
+  Document doc = Parse("[a]\nx=1\n");
+  EXPECT_EQ(IniRead(doc.get(), nullptr, nullptr), 0);
+  EXPECT_EQ(IniNumberOfSections(doc.get()), 0);
+}
+
+TEST(IniParser, ANegativeStatusEndsTheReadAtOnceWithoutJoining) {
+  const auto input = [](void* context, char* buffer, int32_t, int32_t* endOfFile,
+                        int32_t* endOfLine, int32_t* line) -> int32_t {
+    static const char* const lines[] = {"[a]", "x Line0001=1", "x Line0002=2"};
+    int& next = *static_cast<int*>(context);
+    if (next == 3) return -4711;
+    strcpy(buffer, lines[next++]);
+    *endOfFile = 0;
+    *endOfLine = 1;
+    *line = next;
+    return 0;
+  };
+  Document doc = NewDocument();
+  int next = 0;
+  EXPECT_EQ(IniRead(doc.get(), input, &next), -4711);
+  EXPECT_EQ(Show(doc), "[a@1] x Line0001=1@2 x Line0002=2@3");
+}
+
+// Each allocation in turn fails: the status says so, the document stays usable, nothing leaks.
+TEST(IniParser, EveryFailedAllocationIsOutOfMemoryWithAUsableDocument) {
+  std::string text =
+      "[a]\nx=1\nx=2\np Line0001=a\np Line0002=b\n[b]\ny=" + std::string(400, 'v') + "\n";
+  for (int i = 0; i < 20; ++i) text += "i" + std::to_string(i) + "=1\n";
+  int number = 1;
+  for (; number < 1000; ++number) {
+    Document doc = NewDocument();
+    MemoryLines lines(text);
+    FailFromAllocation fail(number);
+    const int32_t status = IniRead(doc.get(), IniLineFileInputFunction, lines.state());
+    if (!fail.failed()) {
+      EXPECT_EQ(status, 0);
+      break;
+    }
+    // The index over the many items may go without memory; nothing else may.
+    if (status == 0) {
+      EXPECT_EQ(RawValue(doc, "b", "i19"), "1") << number;
+      EXPECT_EQ(RawValue(doc, "a", "p"), "ab") << number;
+    } else {
+      EXPECT_EQ(status, kIniOutOfMemory) << number;
+    }
+    for (int32_t s = 1; s <= IniNumberOfSections(doc.get()); ++s)
+      EXPECT_NE(doc->section(s), nullptr);
+  }
+  EXPECT_GT(number, 60);
+  EXPECT_LT(number, 1000);
+}
+
+}  // namespace

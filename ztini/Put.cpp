@@ -1,0 +1,74 @@
+#include <cstdio>
+
+#include "ztini/Document.h"
+#include "ztini/EscapeCodec.h"
+#include "ztini/StringTools.h"
+
+namespace {
+
+using Doc = IniStructForwardReferenceTag;
+
+// Puts the item into a section that may not be in the document yet.
+bool PutIntoSection(Doc* doc, IniSection* section, const char* item, const char* value,
+                    int32_t quote) {
+  IniEntry* known =
+      doc->duplicateChecking ? IniFindEntry(section, doc->caseSensitive, item) : nullptr;
+  if (known) {
+    // The old value goes last: the new one may be a part of it.
+    char* copy = ztini_StrDupWithoutSurrWhiteSpace(value);
+    if (!copy) return false;
+    IniReplaceValue(known, copy);
+    known->quote = quote;
+    return true;
+  }
+  IniEntry* entry = IniNewEntry(item, value, 0);
+  if (!entry) return false;
+  entry->quote = quote;
+  return IniAppendEntry(section, entry);
+}
+
+int32_t OutOfMemory(Doc* doc) {
+  doc->currentSection = nullptr;
+  return kIniOutOfMemory;
+}
+
+}  // namespace
+
+int32_t IniPut(Doc* doc, const char* section, const char* item, const char* value,
+               int32_t quoteCharacter) {
+  if (!doc) return 0;
+  if (!ztini_HasNonWhiteSpace(section) || !ztini_HasNonWhiteSpace(item)) return kIniEmptyName;
+  if (!value) value = "";
+  IniSection* known = IniFindSection(doc, section);
+  if (known) {
+    return PutIntoSection(doc, known, item, value, quoteCharacter) ? 1 : OutOfMemory(doc);
+  }
+  IniSection* fresh = IniNewSection(doc, section);
+  if (!fresh) return OutOfMemory(doc);
+  if (!PutIntoSection(doc, fresh, item, value, quoteCharacter)) {
+    IniDisposeSection(fresh);
+    return OutOfMemory(doc);
+  }
+  if (!IniAppendSection(doc, fresh)) return OutOfMemory(doc);
+  doc->currentSection = fresh;
+  return 1;
+}
+
+int32_t IniPutStringWithOptions(Doc* doc, const char* section, const char* item, const char* value,
+                                int32_t quote, int32_t escape) {
+  const int32_t quoteCharacter = quote ? '"' : 0;
+  if (!doc || !escape || !value) return IniPut(doc, section, item, value, quoteCharacter);
+  ztini::OwnedText encoded(ztini::EncodeEscapes(value));
+  if (!encoded) return OutOfMemory(doc);
+  return IniPut(doc, section, item, encoded.get(), quoteCharacter);
+}
+
+int32_t IniPutRawString(Doc* doc, const char* section, const char* item, const char* value) {
+  return IniPutStringWithOptions(doc, section, item, value, 1, 0);
+}
+
+int32_t IniPutDouble(Doc* doc, const char* section, const char* item, double value) {
+  char text[64];
+  snprintf(text, sizeof text, "%.14e", value);
+  return IniPut(doc, section, item, text, 0);
+}
