@@ -1,0 +1,150 @@
+#include "zt/fnd/AbsTime.h"
+
+#include <algorithm>
+#include <cmath>
+#include <iterator>
+#include <limits>
+
+using nZTSS100::tTimeUnit;
+
+namespace {
+
+typedef tSSTimeValue::tValue Value;
+
+constexpr std::uint64_t k_half = std::uint64_t(1) << 63;
+constexpr double k_two64 = 18446744073709551616.0;
+
+void SetStatus(std::int32_t* status, std::int32_t error) {
+  if (status != nullptr && *status == tSSTimeValue::kNoError) *status = error;
+}
+
+struct UnitFactor {
+  tTimeUnit unit;
+  std::int64_t factor;
+  bool perSecond;  // so many to the second; otherwise so many seconds
+};
+
+constexpr UnitFactor k_unitFactors[] = {
+    {nZTSS100::kTimeUnitAtto, 1000000000000000000, true},
+    {nZTSS100::kTimeUnitFemto, 1000000000000000, true},
+    {nZTSS100::kTimeUnitPico, 1000000000000, true},
+    {nZTSS100::kTimeUnitNano, 1000000000, true},
+    {nZTSS100::kTimeUnitTicks, 10000000, true},
+    {nZTSS100::kTimeUnitMicro, 1000000, true},
+    {nZTSS100::kTimeUnitMilli, 1000, true},
+    {nZTSS100::kTimeUnitMinute, 60, false},
+    {nZTSS100::kTimeUnitHour, 3600, false},
+    {nZTSS100::kTimeUnitDay, 86400, false},
+};
+
+// Whether the magnitude, truncated, goes up by one.
+bool RoundsAway(tSSTimeValue::tRoundMethod method, const Value& magnitude, bool negative) {
+  const std::uint64_t fraction = magnitude.fractionBits();
+  switch (method) {
+    case tSSTimeValue::kRoundNearest:
+      return fraction > k_half || (fraction == k_half && magnitude.IsOdd());
+    case tSSTimeValue::kRoundUp:
+      return fraction != 0 && !negative;
+    case tSSTimeValue::kRoundDown:
+      return fraction != 0 && negative;
+    default:
+      return false;
+  }
+}
+
+}  // namespace
+
+void tSSTimeValue::_CorrectUnits(tUnitConversion conversion, tTimeUnit unit, tValue& value,
+                                 std::int32_t* status) {
+  if (unit == nZTSS100::kTimeUnitSecond) return;
+  const UnitFactor* const end = std::end(k_unitFactors);
+  const UnitFactor* const row = std::find_if(std::begin(k_unitFactors), end,
+                                             [=](const UnitFactor& f) { return f.unit == unit; });
+  if (row == end) return SetStatus(status, kInvalidUnit);
+  const tValue factor(static_cast<long long>(row->factor));
+  if (row->perSecond == (conversion == kToSeconds)) {
+    value /= factor;
+    return;
+  }
+  const bool wasNegative = value.IsNegative();
+  value *= factor;
+  if (value.IsNegative() != wasNegative) SetStatus(status, kDoesNotFit);
+}
+
+// Works on the magnitude: the bits before the point of a negative number are its floor, not its
+// integer part.
+void tSSTimeValue::_RoundAndCheckFit(tRoundMethod method, const tValue& maximum,
+                                     const tValue& minimum, tValue& value, std::int32_t* status) {
+  const bool negative = value.IsNegative();
+  if (negative) value.Negate();
+  const bool away = RoundsAway(method, value, negative);
+  value &= tValue(0xFFFFFFFF, 0xFFFFFFFF, 0, 0);
+  if (away) value += tValue(1);
+  const bool passed = !negative && value.IsNegative();
+  if (negative) value.Negate();
+  if (passed || value > maximum || value < minimum) SetStatus(status, kDoesNotFit);
+}
+
+namespace zt {
+namespace fnd {
+namespace {
+
+constexpr Value k_most(0x7FFFFFFF, 0xFFFFFFFF, 0, 0);
+constexpr Value k_least(0x80000000, 0, 0, 0);
+
+std::int64_t Limit(bool negative) {
+  return negative ? std::numeric_limits<std::int64_t>::min()
+                  : std::numeric_limits<std::int64_t>::max();
+}
+
+// Seconds since 1904 to a count of units since an epoch that lies `offset` seconds before 1904.
+// A step that leaves the range ends at the limit on the side where it left.
+std::int64_t CountSince(Value value, std::int64_t offset, tTimeUnit unit, bool round) {
+  const bool wasNegative = value.IsNegative();
+  value += Value(static_cast<long long>(offset));
+  if (wasNegative == (offset < 0) && value.IsNegative() != wasNegative) return Limit(wasNegative);
+  const bool negative = value.IsNegative();
+  std::int32_t status = tSSTimeValue::kNoError;
+  tSSTimeValue::_CorrectUnits(tSSTimeValue::kFromSeconds, unit, value, &status);
+  const auto method = round ? tSSTimeValue::kRoundNearest : tSSTimeValue::kRoundTowardZero;
+  tSSTimeValue::_RoundAndCheckFit(method, k_most, k_least, value, &status);
+  return status == tSSTimeValue::kNoError ? value.integerPart() : Limit(negative);
+}
+
+// A fraction that lies so close to 1.0 that a double shows it as 1.0 or the value next to it.
+bool ShowsAsOne(double fraction) {
+  const double band = std::numeric_limits<double>::epsilon() * std::max(std::fabs(fraction), 1.0);
+  return fraction >= 1.0 || 1.0 - fraction <= band;
+}
+
+double FractionOf(const Value& value) {
+  return static_cast<double>(value.fractionBits()) / k_two64;
+}
+
+}  // namespace
+
+std::int64_t AbsTime::getSeconds() const noexcept {
+  const bool negative = m_value.IsNegative();
+  const Value magnitude = negative ? -m_value : m_value;
+  Value whole = m_value;
+  tSSTimeValue::_RoundAndCheckFit(tSSTimeValue::kRoundTowardZero, k_most, k_least, whole, nullptr);
+  const std::int64_t seconds = whole.integerPart();
+  if (!ShowsAsOne(FractionOf(magnitude)) || seconds == Limit(negative)) return seconds;
+  return negative ? seconds - 1 : seconds + 1;
+}
+
+double AbsTime::getFraction() const noexcept {
+  const double fraction = FractionOf(m_value);
+  return ShowsAsOne(fraction) ? 0.0 : fraction;
+}
+
+std::int64_t AbsTime::toTime_T(bool round) const noexcept {
+  return CountSince(m_value, -k_unixEpoch, nZTSS100::kTimeUnitSecond, round);
+}
+
+std::int64_t AbsTime::toLKTIME(bool round) const noexcept {
+  return CountSince(m_value, k_lktimeEpoch, nZTSS100::kTimeUnitTicks, round);
+}
+
+}  // namespace fnd
+}  // namespace zt

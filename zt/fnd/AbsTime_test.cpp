@@ -1,0 +1,216 @@
+#include "zt/fnd/AbsTime.h"
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <limits>
+
+using namespace zt::fnd;
+using namespace nZTSS100;
+typedef tSSTimeValue V;
+typedef V::tValue Fixed;
+
+namespace {
+
+constexpr std::int64_t k_most = std::numeric_limits<std::int64_t>::max();
+constexpr std::int64_t k_least = std::numeric_limits<std::int64_t>::min();
+
+AbsTime Unix(double seconds) { return AbsTime(2082844800.0, seconds); }
+
+const Fixed k_wholeMax(0x7FFFFFFF, 0xFFFFFFFF, 0, 0), k_wholeMin(0x80000000, 0, 0, 0);
+
+double Rounded(V::tRoundMethod method, double number) {
+  Fixed value(number);
+  std::int32_t status = 0;
+  V::_RoundAndCheckFit(method, k_wholeMax, k_wholeMin, value, &status);
+  EXPECT_EQ(0, status);
+  EXPECT_EQ(0u, value.fractionBits());
+  return static_cast<double>(value);
+}
+
+double Corrected(V::tUnitConversion conversion, std::uint32_t unit, double number,
+                 std::int32_t* status) {
+  Fixed value(number);
+  V::_CorrectUnits(conversion, static_cast<tTimeUnit>(unit), value, status);
+  return static_cast<double>(value);
+}
+
+}  // namespace
+
+TEST(TimeAbsTime, LimitsAndSize) {
+  static_assert(AbsTime::size == 16 && sizeof(AbsTime) == 16);
+  EXPECT_EQ(Fixed(0x7FFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF), AbsTime::max.value());
+  EXPECT_EQ(Fixed(0x80000000, 0, 0, 0), AbsTime::min.value());
+  EXPECT_LT(AbsTime::min, AbsTime::max);
+  EXPECT_EQ(0, AbsTime().getSeconds());
+}
+
+TEST(TimeAbsTime, UnixZeroCountsFrom1904) {
+  EXPECT_EQ(2082844800, Unix(0).getSeconds());
+  EXPECT_EQ(2082844800, Unix(0).value().integerPart());
+  EXPECT_EQ(0, Unix(0).toTime_T(false));
+}
+
+TEST(TimeAbsTime, UnixTimeTruncatesOrRounds) {
+  const struct {
+    double unixTime;
+    std::int64_t truncated, rounded;
+  } table[] = {{1.25, 1, 1},
+               {1.75, 1, 2},
+               {1.5, 1, 2},
+               {2.5, 2, 2},
+               {0.5, 0, 0},
+               {-1.5, -1, -2},
+               {-2.5, -2, -2},
+               {-0.5, 0, 0},
+               {-0.75, 0, -1},
+               {3, 3, 3},
+               {-2082844801.5, -2082844801, -2082844802}};
+  for (const auto& row : table) {
+    EXPECT_EQ(row.truncated, Unix(row.unixTime).toTime_T(false)) << row.unixTime;
+    EXPECT_EQ(row.rounded, Unix(row.unixTime).toTime_T(true)) << row.unixTime;
+  }
+}
+
+TEST(TimeAbsTime, TicksCountFrom1601) {
+  EXPECT_EQ(116444736000000000, Unix(0).toLKTIME(false));
+  EXPECT_EQ(116444736000000000 + 15000000, Unix(1.5).toLKTIME(true));
+  EXPECT_EQ(0, AbsTime(-9561628800.0, 0).toLKTIME(true));
+  EXPECT_EQ(95616288000000000, AbsTime().toLKTIME(false));
+  EXPECT_EQ(-10000000, AbsTime(-9561628801.0, 0).toLKTIME(false));
+  // 0.3 ticks and 0.5 ticks, counted in 2^-64 seconds.
+  const AbsTime third(Fixed(3) / Fixed(100000000));
+  EXPECT_EQ(95616288000000000, third.toLKTIME(true));
+  EXPECT_EQ(95616288000000001, AbsTime(Fixed(7) / Fixed(100000000)).toLKTIME(true));
+  EXPECT_EQ(95616288000000000, AbsTime(Fixed(7) / Fixed(100000000)).toLKTIME(false));
+}
+
+TEST(TimeAbsTime, WhatDoesNotFitEndsAtTheLimits) {
+  EXPECT_EQ(k_least, AbsTime::min.toTime_T(true));
+  EXPECT_EQ(k_least, AbsTime::min.toTime_T(false));
+  EXPECT_EQ(k_most - 2082844800 + 1, AbsTime::max.toTime_T(true));
+  EXPECT_EQ(k_least, AbsTime::min.toLKTIME(false));
+  EXPECT_EQ(k_most, AbsTime::max.toLKTIME(true));
+  EXPECT_EQ(k_most, AbsTime(1e12, 0).toLKTIME(true)) << "the product changes its sign";
+  EXPECT_EQ(k_least, AbsTime(-1e12, 0).toLKTIME(true));
+}
+
+TEST(TimeAbsTime, SecondsTruncateTowardZero) {
+  EXPECT_EQ(1, AbsTime(1, 0.75).getSeconds());
+  EXPECT_EQ(-1, AbsTime(-1.25, 0).getSeconds());
+  EXPECT_EQ(0, AbsTime(-0.75, 0).getSeconds());
+  EXPECT_EQ(k_least, AbsTime::min.getSeconds());
+  EXPECT_EQ(k_most, AbsTime::max.getSeconds()) << "the carry does not wrap";
+}
+
+TEST(TimeAbsTime, FractionThatShowsAsOneCarriesOver) {
+  const AbsTime almost(Fixed(0, 4, 0xFFFFFFFF, 0xFFFFFFFF));
+  EXPECT_EQ(5, almost.getSeconds());
+  EXPECT_EQ(0.0, almost.getFraction());
+  AbsTime negative(-Fixed(0, 4, 0xFFFFFFFF, 0xFFFFFFFF));
+  EXPECT_EQ(-5, negative.getSeconds());
+  const AbsTime below(Fixed(1) - Fixed(std::ldexp(1.0, -51)));
+  EXPECT_EQ(0, below.getSeconds()) << "two steps below 1.0";
+  EXPECT_EQ(1 - std::ldexp(1.0, -51), below.getFraction());
+  const AbsTime edge(Fixed(1) - Fixed(std::ldexp(1.0, -52)));
+  EXPECT_EQ(1, edge.getSeconds()) << "one step below counts as 1.0";
+  EXPECT_EQ(0.0, edge.getFraction());
+}
+
+TEST(TimeAbsTime, FractionIsTheBitsBehindThePoint) {
+  EXPECT_EQ(0.25, AbsTime(7, 0.25).getFraction());
+  EXPECT_EQ(0.75, AbsTime(-1.25, 0).getFraction()) << "counted from the second below";
+  EXPECT_EQ(0.0, AbsTime::min.getFraction());
+  EXPECT_EQ(0.0, AbsTime::max.getFraction());
+}
+
+TEST(TimeAbsTime, RangesCountTheirEnds) {
+  const AbsTime t1(1.0, 0), t2(2.0, 0), t3(3.0, 0), t4(4.0, 0);
+  EXPECT_TRUE(AbsTime::doRangesIntersect(t1, t2, t2, t3));
+  EXPECT_TRUE(AbsTime::doRangesIntersect(t2, t3, t1, t2));
+  EXPECT_TRUE(AbsTime::doRangesIntersect(t1, t4, t2, t3));
+  EXPECT_FALSE(AbsTime::doRangesIntersect(t1, t2, t3, t4));
+  EXPECT_FALSE(AbsTime::doRangesIntersect(t3, t4, t1, t2));
+  EXPECT_TRUE(AbsTime::isSubRange(t1, t2, t1, t2));
+  EXPECT_TRUE(AbsTime::isSubRange(t2, t3, t1, t4));
+  EXPECT_FALSE(AbsTime::isSubRange(t1, t3, t2, t4));
+  EXPECT_FALSE(AbsTime::isSubRange(t2, t4, t1, t3));
+}
+
+TEST(TimeValue, UnitsMultiplyOrDivide) {
+  const struct {
+    std::uint32_t unit;
+    double value, inSeconds;
+  } table[] = {{0x36CAD7B7, 25e17, 2.5}, {0x36CAD7BA, 25e14, 2.5}, {0x36CAD7BD, 25e11, 2.5},
+               {0x36CAD7C0, 25e8, 2.5},  {0x36CAD7C2, 25e6, 2.5},  {0x36CAD7C3, 25e5, 2.5},
+               {0x36CAD7C6, 2500, 2.5},  {0x36CAD7C9, 2.5, 2.5},   {0x36CAD7CB, 2.5, 150},
+               {0x36CAD7CD, 2.5, 9000},  {0x36CAD7CF, 2.5, 216000}};
+  for (const auto& row : table) {
+    std::int32_t status = 0;
+    EXPECT_EQ(row.inSeconds, Corrected(V::kToSeconds, row.unit, row.value, &status));
+    EXPECT_EQ(row.value, Corrected(V::kFromSeconds, row.unit, row.inSeconds, &status));
+    EXPECT_EQ(-row.inSeconds, Corrected(V::kToSeconds, row.unit, -row.value, &status));
+    EXPECT_EQ(0, status);
+  }
+}
+
+TEST(TimeValue, UnknownUnitKeepsTheValue) {
+  std::int32_t status = 0;
+  EXPECT_EQ(2.5, Corrected(V::kToSeconds, 0x36CAD7B8, 2.5, &status));
+  EXPECT_EQ(-50003, status);
+}
+
+TEST(TimeValue, SignChangeOfAProductIsTheOverflow) {
+  std::int32_t status = 0;
+  Corrected(V::kFromSeconds, kTimeUnitTicks, 1e12, &status);
+  EXPECT_EQ(-50175, status);
+  status = 0;
+  Corrected(V::kToSeconds, kTimeUnitTicks, 9e18, &status);
+  EXPECT_EQ(0, status);
+}
+
+TEST(TimeValue, FirstErrorStaysAndDoesNotStopTheWork) {
+  std::int32_t status = -7;
+  EXPECT_EQ(60, Corrected(V::kToSeconds, kTimeUnitMinute, 1, &status));
+  EXPECT_EQ(-7, status);
+  Corrected(V::kToSeconds, 1, 1, &status);
+  EXPECT_EQ(-7, status);
+  Corrected(V::kToSeconds, 1, 1, nullptr);
+  Fixed value(9.5);
+  V::_RoundAndCheckFit(V::kRoundTowardZero, Fixed(5), Fixed(0), value, &status);
+  EXPECT_EQ(-7, status);
+  EXPECT_EQ(Fixed(9), value);
+}
+
+TEST(TimeValue, RoundsByTable) {
+  const struct {
+    double value, nearest, zero, up, down;
+  } table[] = {{1.25, 1, 1, 2, 1},     {1.5, 2, 1, 2, 1},       {2.5, 2, 2, 3, 2},
+               {1.75, 2, 1, 2, 1},     {-1.25, -1, -1, -1, -2}, {-1.5, -2, -1, -1, -2},
+               {-2.5, -2, -2, -2, -3}, {-1.75, -2, -1, -1, -2}, {4, 4, 4, 4, 4},
+               {-4, -4, -4, -4, -4},   {0, 0, 0, 0, 0},         {0.5, 0, 0, 1, 0},
+               {-0.5, 0, 0, 0, -1}};
+  for (const auto& row : table) {
+    EXPECT_EQ(row.nearest, Rounded(V::kRoundNearest, row.value)) << row.value;
+    EXPECT_EQ(row.zero, Rounded(V::kRoundTowardZero, row.value)) << row.value;
+    EXPECT_EQ(row.up, Rounded(V::kRoundUp, row.value)) << row.value;
+    EXPECT_EQ(row.down, Rounded(V::kRoundDown, row.value)) << row.value;
+  }
+}
+
+TEST(TimeValue, ResultsOutsideTheBoundsDoNotFit) {
+  const struct {
+    double value;
+    std::int32_t status;
+  } table[] = {{10, 0}, {10.25, 0}, {10.75, -50175}, {11, -50175}, {-5, 0}, {-5.75, -50175}};
+  for (const auto& row : table) {
+    Fixed value(row.value);
+    std::int32_t status = 0;
+    V::_RoundAndCheckFit(V::kRoundNearest, Fixed(10), Fixed(-5), value, &status);
+    EXPECT_EQ(row.status, status) << row.value;
+  }
+  Fixed value(0x7FFFFFFF, 0xFFFFFFFF, 0x80000000, 0);
+  std::int32_t status = 0;
+  V::_RoundAndCheckFit(V::kRoundNearest, k_wholeMax, k_wholeMin, value, &status);
+  EXPECT_EQ(-50175, status) << "rounding passes the largest number";
+}

@@ -1,0 +1,30 @@
+#pragma once
+
+#include <locale>
+
+namespace zt {
+namespace fnd {
+
+// Properties of characters under one C++ locale, whatever the host's C locale is.
+// T is char or wchar_t. Threads: a plain value.
+template <class T>
+class CharacterAttributes {
+ public:
+  // The locale "C", which folds ASCII only.
+  CharacterAttributes();
+
+  // A locale by name; null counts as "". Throws InvalidArgument2 with the text of what the standard
+  // library raised for a name that it does not know.
+  explicit CharacterAttributes(const char* name);
+
+  T toUpper(T c) const { return std::use_facet<std::ctype<T>>(m_locale).toupper(c); }
+
+ private:
+  std::locale m_locale;
+};
+
+extern template class CharacterAttributes<char>;
+extern template class CharacterAttributes<wchar_t>;
+
+}  // namespace fnd
+}  // namespace zt

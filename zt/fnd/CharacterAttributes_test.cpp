@@ -1,0 +1,39 @@
+#include "zt/fnd/CharacterAttributes.h"
+
+#include <gtest/gtest.h>
+
+#include <cstring>
+
+#include "tests/support/ScopedLocale.h"
+#include "zt/fnd/Exception.h"
+
+using namespace zt::fnd;
+
+TEST(TextCharacterAttributes, DefaultFoldsAsciiOnly) {
+  const vlt::test::ScopedLocale locale(LC_ALL, "C.UTF-8");
+  const CharacterAttributes<wchar_t> wide;
+  EXPECT_EQ(L'A', wide.toUpper(L'a'));
+  EXPECT_EQ(L'A', wide.toUpper(L'A'));
+  EXPECT_EQ(L'\xE9', wide.toUpper(L'\xE9'));
+  EXPECT_EQ(static_cast<wchar_t>(0x7FFFFFFF), wide.toUpper(static_cast<wchar_t>(0x7FFFFFFF)));
+  const CharacterAttributes<char> narrow;
+  EXPECT_EQ('Z', narrow.toUpper('z'));
+  EXPECT_EQ('\xE9', narrow.toUpper('\xE9'));
+}
+
+TEST(TextCharacterAttributes, NamedLocale) {
+  const CharacterAttributes<wchar_t> wide("C.UTF-8");
+  EXPECT_EQ(L'\xC9', wide.toUpper(L'\xE9'));
+  const CharacterAttributes<wchar_t> copy(wide);
+  EXPECT_EQ(L'\xC9', copy.toUpper(L'\xE9'));
+}
+
+TEST(TextCharacterAttributes, UnknownNameRaisesWithTheReason) {
+  try {
+    const CharacterAttributes<char> none("no_SUCH.locale");
+    FAIL();
+  } catch (const exception::InvalidArgument2& e) {
+    EXPECT_EQ(0, std::strncmp(e.what(), "Invalid argument(s): ", 21));
+    EXPECT_GT(std::strlen(e.what()), 21u);
+  }
+}

@@ -1,0 +1,36 @@
+#include "zt/fnd/DLLAlloc.h"
+
+#include <cstdlib>
+#include <new>
+
+namespace zt {
+namespace fnd {
+
+void* DLLMallocNoThrow(unsigned long size) noexcept { return std::malloc(size); }
+
+void* DLLMalloc(unsigned long size) {
+  void* block = DLLMallocNoThrow(size);
+  if (block == nullptr) throw std::bad_alloc();
+  return block;
+}
+
+void* DLLReallocNoThrow(void* block, unsigned long size) noexcept {
+  if (size == 0 && block != nullptr) {
+    std::free(block);
+    return nullptr;
+  }
+  return std::realloc(block, size);
+}
+
+void* DLLRealloc(void* block, unsigned long size) {
+  void* moved = DLLReallocNoThrow(block, size);
+  if (moved == nullptr && size > 0) throw std::bad_alloc();
+  return moved;
+}
+
+void DLLFree(void* block) noexcept { std::free(block); }
+
+bool MakeDLLMallocThrow(bool) noexcept { return false; }
+
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,81 @@
+#include "zt/fnd/DLLAlloc.h"
+
+#include <gtest/gtest.h>
+
+#include <climits>
+#include <cstring>
+#include <memory>
+#include <new>
+
+namespace zt::fnd {
+namespace {
+
+// Hidden from the compiler, which would warn about it.
+volatile unsigned long g_impossibleSize = ULONG_MAX - 1000;
+
+TEST(BufferAlloc, MallocGivesABlockThatFreeTakes) {
+  void* p = DLLMalloc(100);
+  ASSERT_NE(nullptr, p);
+  std::memset(p, 1, 100);
+  DLLFree(p);
+  DLLFree(nullptr);
+}
+
+TEST(BufferAlloc, MallocThatFailsThrowsOrReturnsNullByItsName) {
+  EXPECT_THROW(DLLMalloc(g_impossibleSize), std::bad_alloc);
+  EXPECT_EQ(nullptr, DLLMallocNoThrow(g_impossibleSize));
+}
+
+TEST(BufferAlloc, ReallocToNothingFreesAndReturnsNull) {
+  EXPECT_EQ(nullptr, DLLReallocNoThrow(DLLMalloc(10), 0));
+  EXPECT_EQ(nullptr, DLLRealloc(DLLMalloc(10), 0));
+}
+
+TEST(BufferAlloc, ReallocOfNullAllocates) {
+  for (unsigned long size : {0ul, 10ul}) {
+    void* p = DLLRealloc(nullptr, size);
+    EXPECT_NE(nullptr, p) << size;
+    DLLFree(p);
+  }
+}
+
+TEST(BufferAlloc, ReallocKeepsTheBytes) {
+  char* p = static_cast<char*>(DLLMalloc(4));
+  std::memcpy(p, "abc", 4);
+  p = static_cast<char*>(DLLRealloc(p, 100000));
+  EXPECT_STREQ("abc", p);
+  DLLFree(p);
+}
+
+TEST(BufferAlloc, ReallocThatFailsLeavesTheOldBlock) {
+  std::unique_ptr<char, void (*)(void*)> p(static_cast<char*>(DLLMalloc(4)), DLLFree);
+  std::memcpy(p.get(), "abc", 4);
+  EXPECT_THROW(DLLRealloc(p.get(), g_impossibleSize), std::bad_alloc);
+  EXPECT_EQ(nullptr, DLLReallocNoThrow(p.get(), g_impossibleSize));
+  EXPECT_STREQ("abc", p.get());
+}
+
+TEST(BufferAlloc, MakeDLLMallocThrowChangesNothing) {
+  EXPECT_FALSE(MakeDLLMallocThrow(true));
+  EXPECT_EQ(nullptr, DLLMallocNoThrow(g_impossibleSize));
+  EXPECT_FALSE(MakeDLLMallocThrow(false));
+  EXPECT_THROW(DLLMalloc(g_impossibleSize), std::bad_alloc);
+}
+
+struct Counted : DLLAlloced {
+  explicit Counted(bool fail) {
+    if (fail) throw 1;
+  }
+  char bytes[64];
+};
+
+TEST(BufferAlloc, ObjectsGoThroughTheAllocator) {
+  Counted* p = new Counted(false);
+  delete p;
+  EXPECT_THROW(delete new Counted(true), int);
+  alignas(Counted) unsigned char place[sizeof(Counted)];
+  EXPECT_EQ(static_cast<void*>(place), new (place) Counted(false));
+}
+
+}  // namespace
+}  // namespace zt::fnd

@@ -1,0 +1,121 @@
+#include "zt/fnd/Guid.h"
+
+#include <cstring>
+
+#include "zt/fnd/ByteOrder.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/MakeGUID.h"
+
+bool operator<(const _GUID& a, const _GUID& b) noexcept {
+  if (a.Data1 != b.Data1) return a.Data1 < b.Data1;
+  if (a.Data2 != b.Data2) return a.Data2 < b.Data2;
+  if (a.Data3 != b.Data3) return a.Data3 < b.Data3;
+  return std::memcmp(a.Data4, b.Data4, sizeof a.Data4) < 0;
+}
+
+bool operator==(const _GUID& a, const _GUID& b) noexcept {
+  return std::memcmp(&a, &b, sizeof a) == 0;
+}
+
+namespace zt {
+namespace fnd {
+namespace {
+
+constexpr unsigned k_textLength = 38;
+constexpr unsigned k_size = sizeof(_GUID);
+
+// Which byte in memory each pair of digits shows; -1 is a hyphen.
+constexpr int k_byteOrder[] = {3,  2, 1, 0,  -1, 5,  4,  -1, 7,  6,
+                               -1, 8, 9, -1, 10, 11, 12, 13, 14, 15};
+
+}  // namespace
+
+Guid Guid::make() { return Guid(osdep::MakeGUID()); }
+
+void Guid::toString(String& out) const {
+  static constexpr wchar_t k_digits[] = L"0123456789ABCDEF";
+  unsigned char bytes[k_size];
+  std::memcpy(bytes, &m_guid, k_size);
+  wchar_t text[k_textLength];
+  wchar_t* p = text;
+  *p++ = L'{';
+  for (const int index : k_byteOrder) {
+    if (index < 0) {
+      *p++ = L'-';
+    } else {
+      *p++ = k_digits[bytes[index] >> 4];
+      *p++ = k_digits[bytes[index] & 0x0F];
+    }
+  }
+  *p = L'}';
+  out.assign(text, k_textLength);
+}
+
+void Guid::fromString(const String& text) {
+  if (text.length() != k_textLength) ZT_RAISE(exception::BadGuidString());
+  unsigned char bytes[k_size] = {};
+  unsigned char* out = bytes;
+  const wchar_t* cursor = text.begin();
+  const wchar_t* const end = text.end();
+  bool ok = true;
+  SkipCharacter(cursor, end, L'{', ok);
+  ParseHex<std::uint32_t>(cursor, end, out, ok);
+  for (int i = 0; i < 2; ++i) {
+    SkipCharacter(cursor, end, L'-', ok);
+    ParseHex<std::uint16_t>(cursor, end, out, ok);
+  }
+  SkipCharacter(cursor, end, L'-', ok);
+  for (int i = 0; i < 2; ++i) ParseHex<std::uint8_t>(cursor, end, out, ok);
+  SkipCharacter(cursor, end, L'-', ok);
+  for (int i = 0; i < 6; ++i) ParseHex<std::uint8_t>(cursor, end, out, ok);
+  SkipCharacter(cursor, end, L'}', ok);
+  if (!ok) ZT_RAISE(exception::BadGuidString());
+  std::memcpy(&m_guid, bytes, k_size);
+}
+
+void Guid::deserialize(const unsigned char*& cursor, const unsigned char* limit) {
+  little_endian::DeserializeRaw<_GUID>(m_guid, cursor, limit);
+}
+
+unsigned char ParseHexNibble(const wchar_t*& cursor, const wchar_t* end, bool& ok) {
+  if (!ok) return 0;
+  const wchar_t c = cursor == end ? L'\0' : *cursor;
+  int value;
+  if (c >= L'0' && c <= L'9') {
+    value = c - L'0';
+  } else if (c >= L'a' && c <= L'f') {
+    value = c - L'a' + 10;
+  } else if (c >= L'A' && c <= L'F') {
+    value = c - L'A' + 10;
+  } else {
+    ok = false;
+    return 0;
+  }
+  ++cursor;
+  return static_cast<unsigned char>(value);
+}
+
+void SkipCharacter(const wchar_t*& cursor, const wchar_t* end, wchar_t expected, bool& ok) {
+  if (!ok) return;
+  ok = cursor != end && *cursor == expected;
+  if (ok) ++cursor;
+}
+
+template <class T>
+void ParseHex(const wchar_t*& cursor, const wchar_t* end, unsigned char*& out, bool& ok) {
+  std::uint32_t value = 0;
+  for (unsigned i = 0; i < 2 * sizeof(T); ++i) {
+    value = value << 4 | ParseHexNibble(cursor, end, ok);
+  }
+  if (!ok) return;
+  const T field = static_cast<T>(value);
+  std::memcpy(out, &field, sizeof field);
+  out += sizeof field;
+}
+
+template void ParseHex<std::uint8_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
+template void ParseHex<std::uint16_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
+template void ParseHex<std::uint32_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
+
+}  // namespace fnd
+}  // namespace zt

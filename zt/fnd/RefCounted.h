@@ -1,0 +1,59 @@
+#pragma once
+
+#include <utility>
+
+#include "zt/fnd/DLLAlloc.h"
+#include "zt/fnd/osdep/AtomicInt.h"
+
+namespace zt {
+namespace fnd {
+
+// Base of objects with a reference count that any thread may change. The count starts at 0; the
+// object goes with its last reference.
+class RefCountedThreadSafePolicy : public DLLAlloced {
+ public:
+  RefCountedThreadSafePolicy() : m_references(0) {}
+  virtual ~RefCountedThreadSafePolicy() = default;
+  RefCountedThreadSafePolicy(const RefCountedThreadSafePolicy&) = delete;
+  RefCountedThreadSafePolicy& operator=(const RefCountedThreadSafePolicy&) = delete;
+
+  void addRef() const { m_references.increment(); }
+  void release() const {
+    if (m_references.decrement() == 0) delete this;
+  }
+
+ private:
+  mutable osdep::AtomicInt m_references;
+};
+
+// Counted pointer to an object that has addRef() and release().
+template <class T>
+class RefPtr {
+ public:
+  RefPtr(T* object = nullptr) : m_object(object) {
+    if (m_object != nullptr) m_object->addRef();
+  }
+  RefPtr(const RefPtr& other) : RefPtr(other.m_object) {}
+  RefPtr(RefPtr&& other) noexcept : m_object(other.detach()) {}
+  ~RefPtr() {
+    if (m_object != nullptr) m_object->release();
+  }
+  RefPtr& operator=(RefPtr other) noexcept {
+    std::swap(m_object, other.m_object);
+    return *this;
+  }
+
+  T* get() const noexcept { return m_object; }
+  T* operator->() const noexcept { return m_object; }
+  T& operator*() const noexcept { return *m_object; }
+  explicit operator bool() const noexcept { return m_object != nullptr; }
+
+  // Hands the reference out, or drops the pointer without releasing what it points to.
+  T* detach() noexcept { return std::exchange(m_object, nullptr); }
+
+ private:
+  T* m_object;
+};
+
+}  // namespace fnd
+}  // namespace zt

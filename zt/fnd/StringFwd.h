@@ -1,0 +1,21 @@
+#pragma once
+
+// Names of the string template and its four instances, for headers that only pass strings by
+// reference or return them. Whoever touches a string includes zt/fnd/String.h.
+
+namespace zt {
+namespace fnd {
+
+// T is the character, Other the character it converts from and to. The third argument selects the
+// encoding of an 8-bit string: wchar_t the process locale, char US-ASCII. A string of unsigned char
+// is UTF-8.
+template <class T, class Other, class Encoding>
+class StringBase;
+
+typedef StringBase<wchar_t, char, wchar_t> String;               // 32-bit code points
+typedef StringBase<char, wchar_t, wchar_t> AnsiString;           // the process locale
+typedef StringBase<char, wchar_t, char> AsciiString;             // US-ASCII
+typedef StringBase<unsigned char, wchar_t, wchar_t> Utf8String;  // UTF-8
+
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,89 @@
+#include <gtest/gtest.h>
+
+#include <cstdint>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+
+using namespace zt::fnd;
+
+namespace {
+
+// A string that claims a length of up to 32 bits without having the memory. Good for operations
+// that must fail, or answer, before they touch a character.
+template <class S>
+class Pretended {
+ public:
+  typedef typename S::value_type T;
+
+  explicit Pretended(std::uint32_t length) {
+    T** const fields = reinterpret_cast<T**>(&m_string);
+    for (int i = 0; i < 3; ++i) m_saved[i] = fields[i];
+    fields[0] = reinterpret_cast<T*>(std::uintptr_t(0x10000));
+    fields[1] = fields[2] = fields[0] + length;
+  }
+  ~Pretended() {
+    T** const fields = reinterpret_cast<T**>(&m_string);
+    for (int i = 0; i < 3; ++i) fields[i] = m_saved[i];
+  }
+  S& operator*() { return m_string; }
+
+ private:
+  S m_string;
+  T* m_saved[3];
+};
+
+constexpr bool k_wideEnough = sizeof(void*) == 8;
+
+}  // namespace
+
+TEST(StringLimits, ReplaceRefusesAResultOfAllOnes) {
+  if (!k_wideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
+  Pretended<AnsiString> s(0xFFFFFFFE);
+  try {
+    (*s).replace(0, 0, AnsiString("x"));
+    FAIL();
+  } catch (const exception::BoundExceeded2& e) {
+    EXPECT_STREQ("A request was made that would exceed the bounds: Resulting string too large",
+                 e.what());
+    EXPECT_EQ(0x8ABC7007u, e.getErrorCode());
+  }
+  Pretended<AnsiString> half(0x80000000), other(0x7FFFFFFF);
+  EXPECT_THROW((*half).replace(5, 0, *other), exception::BoundExceeded2);
+}
+
+TEST(StringLimits, SumsThatPass32BitsAreOutOfRange) {
+  if (!k_wideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
+  Pretended<AnsiString> s(0xFFFFFFFE), more(0x10);
+  EXPECT_THROW((*s).append(2, 'x'), exception::OutOfRange);
+  EXPECT_THROW((*s).append(1, 'x'), exception::OutOfRange) << "no room for the terminator";
+  EXPECT_THROW((*s).append("xy"), exception::OutOfRange);
+  EXPECT_THROW((*s).append(L"x"), exception::OutOfRange);
+  EXPECT_THROW((*s) += 'x', exception::OutOfRange);
+  EXPECT_THROW((*s).append(*more), exception::OutOfRange);
+  EXPECT_THROW(AnsiString(*s, *more), exception::OutOfRange);
+  EXPECT_THROW((*s).resize(0xFFFFFFFF, 'x'), exception::OutOfRange);
+}
+
+TEST(StringLimits, ConversionsOfTooMuchTextAreOutOfRange) {
+  if (!k_wideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
+  Pretended<String> s(0x40000000);  // four bytes a character
+  EXPECT_THROW(AnsiString a(*s), exception::OutOfRange);
+  EXPECT_THROW(AsciiString(nullptr, *s), exception::OutOfRange);
+  Pretended<AnsiString> narrow(0x40000000);
+  EXPECT_THROW(String w(*narrow), exception::OutOfRange);
+}
+
+TEST(StringLimits, WireSizesThatDoNotFitAreAllOnes) {
+  if (!k_wideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
+  EXPECT_EQ(0xFFFFFFFFu, (*Pretended<AnsiString>(0xFFFFFFFA)).serializationSize()) << "exactly";
+  EXPECT_EQ(0xFFFFFFFFu, (*Pretended<AnsiString>(0xFFFFFFFB)).serializationSize());
+  EXPECT_EQ(0xFFFFFFFEu, (*Pretended<AnsiString>(0xFFFFFFF9)).serializationSize());
+  EXPECT_EQ(0xFFFFFFFFu, (*Pretended<Utf8String>(0xFFFFFFFC)).serializationSize());
+  EXPECT_EQ(0xFFFFFFFEu, (*Pretended<Utf8String>(0xFFFFFFFA)).serializationSize());
+  unsigned char byte;
+  unsigned char* cursor = &byte;
+  EXPECT_THROW((*Pretended<AsciiString>(0xFFFFFFFE)).serialize(cursor, &byte + 1),
+               exception::BufferOverflow);
+  EXPECT_EQ(&byte, cursor);
+}

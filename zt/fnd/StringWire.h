@@ -1,0 +1,95 @@
+#pragma once
+
+// Bodies of the string template: the wire form. Only StringBase.cpp includes this.
+//
+// The bounds checks here raise without a stamp, as those of all wire forms do.
+
+#include <cstdint>
+#include <cstring>
+
+#include "zt/fnd/ByteOrder.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/StringBase.h"
+#include "zt/fnd/Utf8ToWide.h"
+#include "zt/fnd/WideToUtf8.h"
+
+namespace zt {
+namespace fnd {
+namespace string_detail {
+
+inline constexpr std::uint32_t k_lengthField = 4;
+
+// Bytes from the cursor to the limit; a limit before the cursor leaves none.
+inline std::uint64_t Remaining(const unsigned char* cursor, const unsigned char* limit) {
+  return std::less<const unsigned char*>()(cursor, limit)
+             ? static_cast<std::uint64_t>(limit - cursor)
+             : 0;
+}
+
+// Reads the length field and checks that so many bytes follow. Moves the cursor behind the field.
+inline std::uint32_t TakeLength(const unsigned char*& cursor, const unsigned char* limit) {
+  if (Remaining(cursor, limit) < k_lengthField) throw exception::DeserializationError();
+  std::uint32_t n = 0;
+  little_endian::DeserializeRaw<std::uint32_t>(n, cursor, limit);
+  if (n > Remaining(cursor, limit)) throw exception::DeserializationError();
+  return n;
+}
+
+inline std::uint32_t FitOrAllOnes(std::uint64_t size) {
+  return size > k_max32 ? 0xFFFFFFFFu : static_cast<std::uint32_t>(size);
+}
+
+}  // namespace string_detail
+
+template <class T, class O, class E>
+auto StringBase<T, O, E>::serializationSize() const -> size_type {
+  using string_detail::k_lengthField;
+  if constexpr (kIsWide) {
+    // The limit leaves room for the length field below 32 bits.
+    return k_lengthField + GetUtf8EncodingBytesWithBufferLimit(m_begin, m_end, 0xFFFFFFFBu);
+  } else {
+    const std::uint64_t terminator = kIsUtf8 ? 0 : 1;
+    return string_detail::FitOrAllOnes(k_lengthField + terminator + length());
+  }
+}
+
+// The length is written last, so that nothing has moved when the text does not fit after all.
+template <class T, class O, class E>
+void StringBase<T, O, E>::serialize(unsigned char*& cursor, const unsigned char* limit) const {
+  using string_detail::k_lengthField;
+  const std::uint32_t size = serializationSize();
+  if (size == npos || size > string_detail::Remaining(cursor, limit)) {
+    throw exception::BufferOverflow();
+  }
+  unsigned char* const body = cursor + k_lengthField;
+  unsigned char* const stop = cursor + size;
+  if constexpr (kIsWide) {
+    WideToUtf8(m_begin, m_end, body, stop);
+  } else {
+    std::memcpy(body, m_begin, size - k_lengthField);
+  }
+  little_endian::SerializeRaw<std::uint32_t>(size - k_lengthField, cursor, limit);
+  cursor = stop;
+}
+
+template <class T, class O, class E>
+void StringBase<T, O, E>::deserialize(const unsigned char*& cursor, const unsigned char* limit) {
+  const unsigned char* body = cursor;
+  const std::uint32_t n = string_detail::TakeLength(body, limit);
+  if constexpr (kIsWide) {
+    const size_type count = GetUtf8StringLength(body, body + n);  // raises before anything changes
+    fitBuffer(count);
+    if (count != 0) Utf8ToWide(body, body + n, m_begin, m_begin + count);
+    setLength(count);
+  } else if constexpr (kIsUtf8) {
+    assign(body, n);
+  } else {
+    if (n == 0 || body[n - 1] != 0) throw exception::DeserializationError();
+    assign(reinterpret_cast<const T*>(body), n - 1);
+  }
+  cursor = body + n;
+}
+
+}  // namespace fnd
+}  // namespace zt

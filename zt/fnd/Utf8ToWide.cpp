@@ -1,0 +1,136 @@
+#include "zt/fnd/Utf8ToWide.h"
+
+#include <array>
+#include <iterator>
+#include <memory>
+
+#include "zt/fnd/Exception.h"
+
+namespace zt {
+namespace fnd {
+namespace {
+
+// Sequences by lead byte; a row holds from its lead up to the next row's.
+struct LeadRule {
+  unsigned char lead;
+  unsigned char length;       // 0: never valid
+  unsigned char valueMask;    // bits of the lead that belong to the value
+  unsigned char leastSecond;  // for the overlong forms
+};
+
+constexpr LeadRule k_leadRules[] = {
+    {0x80, 0, 0x00, 0x80}, {0xC2, 2, 0x1F, 0x80}, {0xE0, 3, 0x0F, 0xA0},
+    {0xE1, 3, 0x0F, 0x80}, {0xF0, 4, 0x07, 0x90}, {0xF1, 4, 0x07, 0x80},
+    {0xF8, 6, 0x01, 0x84}, {0xFD, 6, 0x01, 0x80}, {0xFE, 0, 0x00, 0x80},
+};
+
+// The row of each lead from 0x80 on.
+constexpr auto k_rowOfLead = [] {
+  std::array<unsigned char, 0x80> rows{};
+  unsigned char row = 0;
+  for (unsigned lead = 0x80; lead <= 0xFF; ++lead) {
+    const std::size_t next = row + 1u;
+    if (next < std::size(k_leadRules) && k_leadRules[next].lead == lead) ++row;
+    rows[lead - 0x80] = row;
+  }
+  return rows;
+}();
+
+// Decodes the sequence of a lead byte of 0x80 or more; s is below end.
+const unsigned char* DecodeSequence(const unsigned char* s, const unsigned char* end,
+                                    std::uint32_t& value) {
+  const LeadRule rule = k_leadRules[k_rowOfLead[*s - 0x80u]];
+  if (rule.length == 0 || end - s < rule.length || s[1] < rule.leastSecond) {
+    ZT_RAISE(exception::InvalidSequence());
+  }
+  std::uint32_t result = *s++ & rule.valueMask;
+  unsigned bad = 0;  // one test at the end instead of one a byte
+  const auto takeNext = [&] {
+    bad |= (*s & 0xC0u) ^ 0x80u;
+    result = result << 6 | (*s++ & 0x3Fu);
+  };
+  switch (rule.length) {
+    case 6:
+      takeNext();
+      takeNext();
+      [[fallthrough]];
+    case 4:
+      takeNext();
+      [[fallthrough]];
+    case 3:
+      takeNext();
+      [[fallthrough]];
+    default:
+      takeNext();
+  }
+  if (bad != 0) ZT_RAISE(exception::InvalidSequence());
+  value = result;
+  return s;
+}
+
+inline const unsigned char* DecodeOne(const unsigned char* s, const unsigned char* end,
+                                      std::uint32_t& value) {
+  if (*s >= 0x80) return DecodeSequence(s, end, value);
+  value = *s;
+  return s + 1;
+}
+
+bool IsEmpty(const unsigned char* begin, const unsigned char* end) {
+  return begin == nullptr || begin >= end;
+}
+
+}  // namespace
+
+std::uint32_t GetUtf8StringLength(const unsigned char* begin, const unsigned char* end) {
+  if (IsEmpty(begin, end)) return 0;
+  std::uint64_t count = 0;
+  std::uint32_t ignored;
+  for (; begin != end; ++count) begin = DecodeOne(begin, end, ignored);
+  if (count > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
+  return static_cast<std::uint32_t>(count);
+}
+
+std::uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* end,
+                                   wchar_t* dest, wchar_t* destEnd) {
+  if (dest == nullptr || dest > destEnd) ZT_RAISE(exception::InvalidArgument());
+  if (IsEmpty(begin, end)) return 0;
+  const unsigned char* s = begin;
+  wchar_t* out = dest;
+  std::uint32_t value;
+  while (s != end && out != destEnd) {
+    s = DecodeOne(s, end, value);
+    *out++ = static_cast<wchar_t>(value);
+  }
+  if (static_cast<std::uint64_t>(out - dest) > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
+  begin = s;
+  return static_cast<std::uint32_t>(out - dest);
+}
+
+std::uint32_t Utf8ToWide(const unsigned char* begin, const unsigned char* end, wchar_t* dest,
+                         wchar_t* destEnd) {
+  const std::uint32_t count = Utf8ToWideNoOverflow(begin, end, dest, destEnd);
+  if (!IsEmpty(begin, end)) ZT_RAISE(exception::BufferOverflow());
+  return count;
+}
+
+wchar_t* Utf8ToWide(const unsigned char* s, std::uint32_t n) {
+  const unsigned char* const end = s == nullptr ? s : s + n;
+  const std::uint64_t size = static_cast<std::uint64_t>(GetUtf8StringLength(s, end)) + 1;
+  if (size * sizeof(wchar_t) > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
+  std::unique_ptr<wchar_t[]> text(new wchar_t[static_cast<std::size_t>(size)]);
+  text[Utf8ToWide(s, end, text.get(), text.get() + size - 1)] = L'\0';
+  return text.release();
+}
+
+const unsigned char* ConvertNextUtf8Character(const unsigned char* s, const unsigned char* end,
+                                              wchar_t& out) {
+  out = L'\0';
+  if (IsEmpty(s, end)) return s;
+  std::uint32_t value;
+  s = DecodeOne(s, end, value);
+  out = static_cast<wchar_t>(value);
+  return s;
+}
+
+}  // namespace fnd
+}  // namespace zt

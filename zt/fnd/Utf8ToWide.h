@@ -1,0 +1,48 @@
+#pragma once
+
+#include <cstdint>
+
+namespace zt {
+namespace fnd {
+
+// UTF-8 to 32-bit characters, by rules of its own:
+//
+//   lead 00-7F  1 byte
+//        C2-DF  2 bytes
+//        E0-EF  3 bytes; behind E0 the second byte is at least A0
+//        F0-F7  4 bytes; behind F0 the second byte is at least 90
+//        F8-FD  6 bytes, of whose lead only the lowest bit counts; except behind FD the second byte
+//               is at least 84
+//
+// Every other lead and every continuation byte outside 80-BF raises InvalidSequence, as does a
+// sequence that passes the end of the input. There is no five-byte form, surrogates are characters,
+// and the values reach up to 0x7FFFFFFF.
+//
+// Nothing is read beyond the given end. Output is never terminated, except in the new[] form.
+
+// Wide characters that the bytes decode to; 0 for a null or empty range.
+// Throws InvalidSequence.
+std::uint32_t GetUtf8StringLength(const unsigned char* begin, const unsigned char* end);
+
+// Decodes all of the range and returns the count. A null source produces nothing.
+// Throws InvalidArgument (dest null or above destEnd; tested first), InvalidSequence,
+// BufferOverflow (the destination ends first; it then holds what fits).
+std::uint32_t Utf8ToWide(const unsigned char* begin, const unsigned char* end, wchar_t* dest,
+                         wchar_t* destEnd);
+
+// Decodes what fits, moves `begin` behind it and returns the count. `begin` stays where it was when
+// this throws InvalidArgument or InvalidSequence.
+std::uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* end,
+                                   wchar_t* dest, wchar_t* destEnd);
+
+// The first n bytes decoded into a terminated block, which the caller frees by delete[]. A null s
+// gives an empty text. Throws InvalidSequence, OutOfRange, std::bad_alloc.
+wchar_t* Utf8ToWide(const unsigned char* s, std::uint32_t n);
+
+// Decodes one character and returns the position behind it. At a null s and at the end `out` is 0
+// and s comes back. Throws InvalidSequence.
+const unsigned char* ConvertNextUtf8Character(const unsigned char* s, const unsigned char* end,
+                                              wchar_t& out);
+
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,211 @@
+#include "zt/fnd/Utf8ToWide.h"
+
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/WideToUtf8.h"
+
+using namespace zt::fnd;
+
+namespace {
+
+typedef std::vector<unsigned char> Bytes;
+
+// In a block of exactly the size, so that a sanitizer sees every byte read beyond it.
+std::wstring Decode(const Bytes& bytes) {
+  const std::unique_ptr<unsigned char[]> exact(new unsigned char[bytes.size()]);
+  std::copy(bytes.begin(), bytes.end(), exact.get());
+  const unsigned char* const end = exact.get() + bytes.size();
+  const std::uint32_t n = GetUtf8StringLength(exact.get(), end);
+  std::vector<wchar_t> out(n + 1, L'#');
+  EXPECT_EQ(n, Utf8ToWide(exact.get(), end, out.data(), out.data() + n));
+  EXPECT_EQ(L'#', out[n]) << "no terminator is written";
+  return std::wstring(out.data(), n);
+}
+
+void ExpectInvalid(const Bytes& bytes) {
+  const unsigned char* const begin = bytes.data();
+  const unsigned char* const end = begin + bytes.size();
+  wchar_t out[16];
+  EXPECT_THROW(GetUtf8StringLength(begin, end), exception::InvalidSequence);
+  EXPECT_THROW(Utf8ToWide(begin, end, out, out + 16), exception::InvalidSequence);
+  EXPECT_THROW(Utf8ToWide(begin, static_cast<std::uint32_t>(bytes.size())),
+               exception::InvalidSequence);
+  const unsigned char* cursor = begin;
+  EXPECT_THROW(Utf8ToWideNoOverflow(cursor, end, out, out + 16), exception::InvalidSequence);
+  EXPECT_EQ(begin, cursor);
+  wchar_t c = L'#';
+  EXPECT_THROW(ConvertNextUtf8Character(begin, end, c), exception::InvalidSequence);
+  EXPECT_EQ(L'\0', c) << "set before the attempt";
+}
+
+}  // namespace
+
+TEST(TextUtf8ToWide, DecodesByTable) {
+  const struct {
+    Bytes bytes;
+    unsigned value;
+  } table[] = {
+      {{0x00}, 0},
+      {{0x41}, 0x41},
+      {{0x7F}, 0x7F},
+      {{0xC2, 0x80}, 0x80},
+      {{0xDF, 0xBF}, 0x7FF},
+      {{0xE0, 0xA0, 0x80}, 0x800},
+      {{0xE1, 0x80, 0x80}, 0x1000},
+      {{0xED, 0xA0, 0x80}, 0xD800},
+      {{0xED, 0xBF, 0xBF}, 0xDFFF},
+      {{0xEF, 0xBF, 0xBF}, 0xFFFF},
+      {{0xF0, 0x90, 0x80, 0x80}, 0x10000},
+      {{0xF1, 0x80, 0x80, 0x80}, 0x40000},
+      {{0xF4, 0x8F, 0xBF, 0xBF}, 0x10FFFF},
+      {{0xF4, 0x90, 0x80, 0x80}, 0x110000},
+      {{0xF7, 0xBF, 0xBF, 0xBF}, 0x1FFFFF},
+      {{0xF8, 0x84, 0x80, 0x80, 0x80, 0x80}, 0x04000000},
+      {{0xF9, 0x84, 0x80, 0x80, 0x80, 0x80}, 0x44000000},
+      {{0xFA, 0x84, 0x80, 0x80, 0x80, 0x80}, 0x04000000},
+      {{0xFC, 0x84, 0x80, 0x80, 0x80, 0x80}, 0x04000000},
+      {{0xFC, 0xBF, 0xBF, 0xBF, 0xBF, 0xBF}, 0x3FFFFFFF},
+      {{0xFD, 0x80, 0x80, 0x80, 0x80, 0x80}, 0x40000000},
+      {{0xFD, 0xBF, 0xBF, 0xBF, 0xBF, 0xBF}, 0x7FFFFFFF},
+  };
+  for (const auto& row : table) {
+    EXPECT_EQ(std::wstring(1, static_cast<wchar_t>(row.value)), Decode(row.bytes)) << row.value;
+  }
+}
+
+TEST(TextUtf8ToWide, RejectsMalformedSequences) {
+  const Bytes table[] = {
+      {0x80},
+      {0xBF, 0x80},
+      {0xC0, 0x80},
+      {0xC1, 0xBF},
+      {0xC2, 0x7F},
+      {0xC2, 0xC0},
+      {0xE0, 0x80, 0x80},
+      {0xE0, 0x9F, 0xBF},
+      {0xE1, 0x80, 0x41},
+      {0xE1, 0x41, 0x80},
+      {0xF0, 0x80, 0x80, 0x80},
+      {0xF0, 0x8F, 0xBF, 0xBF},
+      {0xF1, 0x80, 0x80, 0xC0},
+      {0xF8, 0x83, 0x80, 0x80, 0x80, 0x80},
+      {0xF8, 0x88, 0x80, 0x80, 0x80},  // the five-byte form
+      {0xF8, 0x88, 0x80, 0x80, 0x80, 0x41},
+      {0xFC, 0x83, 0x80, 0x80, 0x80, 0x80},
+      {0xFD, 0x7F, 0x80, 0x80, 0x80, 0x80},
+      {0xFE},
+      {0xFF},
+      {0xFE, 0x80, 0x80, 0x80, 0x80, 0x80, 0x80},
+  };
+  for (const Bytes& bytes : table) ExpectInvalid(bytes);
+}
+
+TEST(TextUtf8ToWide, SequencesThatPassTheEndAreInvalid) {
+  const Bytes whole[] = {{0xC3, 0xA9},
+                         {0xE2, 0x82, 0xAC},
+                         {0xF0, 0x9F, 0x98, 0x80},
+                         {0xFD, 0x80, 0x80, 0x80, 0x80, 0x80}};
+  for (const Bytes& bytes : whole) {
+    for (std::size_t n = 1; n < bytes.size(); ++n) {
+      ExpectInvalid(Bytes(bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(n)));
+    }
+  }
+}
+
+TEST(TextUtf8ToWide, FiveBytesOfTheEncoderDoNotDecode) {
+  const wchar_t text[] = L"\x200000";
+  unsigned char out[8];
+  ASSERT_EQ(5u, WideToUtf8(text, text + 1, out, out + 8));
+  ExpectInvalid(Bytes(out, out + 5));
+}
+
+TEST(TextUtf8ToWide, EmptyAndNullRanges) {
+  const unsigned char text[] = {'a', 0};
+  wchar_t out[4];
+  EXPECT_EQ(0u, GetUtf8StringLength(nullptr, nullptr));
+  EXPECT_EQ(0u, GetUtf8StringLength(nullptr, text));
+  EXPECT_EQ(0u, GetUtf8StringLength(text, text));
+  EXPECT_EQ(0u, Utf8ToWide(nullptr, nullptr, out, out + 4));
+  EXPECT_EQ(0u, Utf8ToWide(text, text, out, out));
+  wchar_t c = L'#';
+  EXPECT_EQ(nullptr, ConvertNextUtf8Character(nullptr, text, c));
+  EXPECT_EQ(L'\0', c);
+  c = L'#';
+  EXPECT_EQ(text, ConvertNextUtf8Character(text, text, c));
+  EXPECT_EQ(L'\0', c);
+}
+
+TEST(TextUtf8ToWide, BadDestinationsRaiseBeforeAnythingElse) {
+  wchar_t out[4];
+  EXPECT_THROW(Utf8ToWide(nullptr, nullptr, nullptr, out), exception::InvalidArgument);
+  EXPECT_THROW(Utf8ToWide(nullptr, nullptr, out + 1, out), exception::InvalidArgument);
+  const unsigned char* none = nullptr;
+  EXPECT_THROW(Utf8ToWideNoOverflow(none, nullptr, nullptr, nullptr), exception::InvalidArgument);
+  EXPECT_THROW(Utf8ToWideNoOverflow(none, nullptr, out + 1, out), exception::InvalidArgument);
+}
+
+TEST(TextUtf8ToWide, DestinationThatEndsFirstOverflows) {
+  const unsigned char text[] = {'a', 0xC3, 0xA9, 'b'};
+  wchar_t out[] = L"####";
+  EXPECT_THROW(Utf8ToWide(text, text + 4, out, out + 2), exception::BufferOverflow);
+  EXPECT_STREQ(L"a\xE9##", out) << "what fits is there";
+  EXPECT_EQ(3u, Utf8ToWide(text, text + 4, out, out + 3));
+}
+
+TEST(TextUtf8ToWide, NoOverflowDecodesWhatFits) {
+  const unsigned char text[] = {'a', 0xC3, 0xA9, 'b'};
+  const unsigned char* cursor = text;
+  wchar_t out[] = L"####";
+  EXPECT_EQ(2u, Utf8ToWideNoOverflow(cursor, text + 4, out, out + 2));
+  EXPECT_EQ(text + 3, cursor);
+  EXPECT_EQ(1u, Utf8ToWideNoOverflow(cursor, text + 4, out, out + 4));
+  EXPECT_EQ(text + 4, cursor);
+  EXPECT_EQ(L'b', out[0]);
+  cursor = text;
+  EXPECT_EQ(0u, Utf8ToWideNoOverflow(cursor, text + 4, out, out));
+  EXPECT_EQ(text, cursor);
+}
+
+TEST(TextUtf8ToWide, NewBlockIsTerminated) {
+  const unsigned char text[] = {'a', 0xC3, 0xA9, 'b'};
+  const std::unique_ptr<wchar_t[]> all(Utf8ToWide(text, 4)), part(Utf8ToWide(text, 1)),
+      none(Utf8ToWide(nullptr, 9)), zero(Utf8ToWide(text, 0));
+  EXPECT_STREQ(
+      L"a\xE9"
+      L"b",
+      all.get());
+  EXPECT_STREQ(L"a", part.get());
+  EXPECT_STREQ(L"", none.get());
+  EXPECT_STREQ(L"", zero.get());
+}
+
+TEST(TextUtf8ToWide, OneCharacterAtATime) {
+  const unsigned char text[] = {'a', 0, 0xE2, 0x82, 0xAC};
+  const unsigned char* const end = text + sizeof text;
+  wchar_t c;
+  const unsigned char* s = ConvertNextUtf8Character(text, end, c);
+  EXPECT_EQ(text + 1, s);
+  EXPECT_EQ(L'a', c);
+  s = ConvertNextUtf8Character(s, end, c);
+  EXPECT_EQ(L'\0', c);
+  s = ConvertNextUtf8Character(s, end, c);
+  EXPECT_EQ(end, s);
+  EXPECT_EQ(0x20AC, c);
+}
+
+TEST(TextUtf8ToWide, EveryEncodableValueOutsideTheFiveByteFormComesBack) {
+  for (std::uint32_t value = 0; value < 0x80000000u; value += value < 0x20000 ? 1 : value / 300) {
+    if (value > 0x1FFFFF && value <= 0x3FFFFFF) continue;
+    const wchar_t c = static_cast<wchar_t>(value);
+    unsigned char bytes[6];
+    const std::uint32_t n = WideToUtf8(&c, &c + 1, bytes, bytes + 6);
+    wchar_t back;
+    ASSERT_EQ(bytes + n, ConvertNextUtf8Character(bytes, bytes + n, back));
+    ASSERT_EQ(c, back);
+  }
+}

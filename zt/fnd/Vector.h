@@ -1,0 +1,157 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <new>
+#include <utility>
+
+#include "zt/fnd/DLLAlloc.h"
+#include "zt/fnd/SafeInteger.h"
+
+namespace zt {
+namespace fnd {
+
+// Growable array in one block from DLLMalloc; 32-bit size.
+//
+// Without room the capacity c becomes 2c + 1 (or c + 1 with c's top bit set). A copy has a capacity
+// equal to its size. Throws OutOfRange where a capacity or its byte size passes 32 bits,
+// std::bad_alloc, and what copying an element throws; a failed call changes nothing.
+// Threads: a plain value.
+template <class T>
+class Vector {
+  static_assert(alignof(T) <= alignof(std::max_align_t), "the block is aligned as malloc aligns");
+
+ public:
+  typedef T value_type;
+  typedef T* iterator;
+  typedef const T* const_iterator;
+
+  Vector() noexcept = default;
+  Vector(const Vector& other);
+  Vector(Vector&& other) noexcept { swap(other); }
+  Vector& operator=(Vector other) noexcept {
+    swap(other);
+    return *this;
+  }
+  ~Vector() { clear(); }
+
+  T* begin() noexcept { return m_begin; }
+  const T* begin() const noexcept { return m_begin; }
+  T* end() noexcept { return m_end; }
+  const T* end() const noexcept { return m_end; }
+  std::uint32_t size() const noexcept { return static_cast<std::uint32_t>(m_end - m_begin); }
+  std::uint32_t capacity() const noexcept {
+    return static_cast<std::uint32_t>(m_capacityEnd - m_begin);
+  }
+  bool empty() const noexcept { return m_begin == m_end; }
+  T& operator[](unsigned int i) noexcept { return m_begin[i]; }  // not checked
+  const T& operator[](unsigned int i) const noexcept { return m_begin[i]; }
+
+  // Appends a copy. `value` may be an element of this array.
+  void push_back(const T& value);
+
+  void swap(Vector& other) noexcept {
+    std::swap(m_begin, other.m_begin);
+    std::swap(m_end, other.m_end);
+    std::swap(m_capacityEnd, other.m_capacityEnd);
+  }
+
+  // Destroys the elements and frees the block.
+  void clear() noexcept;
+
+ private:
+  std::uint32_t calculateNewCapacity() const;
+
+  T* m_begin = nullptr;
+  T* m_end = nullptr;
+  T* m_capacityEnd = nullptr;
+};
+
+namespace vector_detail {
+
+// The capacity that follows c. Throws OutOfRange.
+inline std::uint32_t NextCapacity(std::uint32_t c) {
+  bool overflow;
+  SafeInteger<std::uint32_t> doubled(c);
+  doubled.multiplyByTwoNoThrow(overflow);
+  std::uint32_t next = doubled.get() + 1;
+  if (next == 0xFFFFFFFFu || next < c) ZT_RAISE(exception::OutOfRange());
+  return next;
+}
+
+// A raw block under construction: owns the memory and the elements built in it so far.
+template <class T>
+class Builder {
+ public:
+  explicit Builder(std::uint32_t capacity)
+      : m_begin(static_cast<T*>(
+            DLLMalloc(SafeInteger<std::uint32_t>::Multiply(capacity, NarrowSize(sizeof(T)))))),
+        m_end(m_begin) {}
+  ~Builder() {
+    std::destroy(m_begin, m_end);
+    DLLFree(m_begin);
+  }
+  Builder(const Builder&) = delete;
+  Builder& operator=(const Builder&) = delete;
+
+  void add(const T& value) {
+    ::new (static_cast<void*>(m_end)) T(value);
+    ++m_end;
+  }
+
+  // Exchanges the block with another one; its old elements go with the builder.
+  void exchange(T*& begin, T*& end) noexcept {
+    std::swap(m_begin, begin);
+    std::swap(m_end, end);
+  }
+
+ private:
+  static constexpr std::uint32_t NarrowSize(std::size_t size) {
+    return static_cast<std::uint32_t>(size);
+  }
+
+  T* m_begin;
+  T* m_end;
+};
+
+}  // namespace vector_detail
+
+template <class T>
+Vector<T>::Vector(const Vector& other) {
+  if (other.empty()) return;
+  vector_detail::Builder<T> block(other.size());
+  for (const T& value : other) block.add(value);
+  block.exchange(m_begin, m_end);
+  m_capacityEnd = m_end;
+}
+
+template <class T>
+std::uint32_t Vector<T>::calculateNewCapacity() const {
+  return vector_detail::NextCapacity(capacity());
+}
+
+template <class T>
+void Vector<T>::push_back(const T& value) {
+  if (m_end != m_capacityEnd) {
+    ::new (static_cast<void*>(m_end)) T(value);
+    ++m_end;
+    return;
+  }
+  std::uint32_t newCapacity = calculateNewCapacity();
+  vector_detail::Builder<T> block(newCapacity);
+  for (const T& old : *this) block.add(old);
+  block.add(value);
+  block.exchange(m_begin, m_end);
+  m_capacityEnd = m_begin + newCapacity;
+}
+
+template <class T>
+void Vector<T>::clear() noexcept {
+  std::destroy(m_begin, m_end);
+  DLLFree(m_begin);
+  m_begin = m_end = m_capacityEnd = nullptr;
+}
+
+}  // namespace fnd
+}  // namespace zt

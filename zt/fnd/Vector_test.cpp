@@ -1,0 +1,127 @@
+#include "zt/fnd/Vector.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+
+namespace zt::fnd {
+namespace {
+
+TEST(BufferVector, EmptyHasNoBlock) {
+  Vector<int> v;
+  EXPECT_EQ(0u, v.size());
+  EXPECT_EQ(0u, v.capacity());
+  EXPECT_EQ(nullptr, v.begin());
+  EXPECT_EQ(v.begin(), v.end());
+}
+
+TEST(BufferVector, CapacitiesRunOneThreeSevenFifteen) {
+  Vector<int> v;
+  const unsigned int expected[] = {1, 3, 3, 7, 7, 7, 7, 15};
+  for (unsigned int i = 0; i < 8; ++i) {
+    v.push_back(static_cast<int>(i));
+    EXPECT_EQ(expected[i], v.capacity()) << i;
+    EXPECT_EQ(i + 1, v.size());
+  }
+  for (unsigned int i = 0; i < 8; ++i) EXPECT_EQ(static_cast<int>(i), v[i]);
+}
+
+TEST(BufferVector, NextCapacityAtTheEdgesOfThirtyTwoBits) {
+  EXPECT_EQ(1u, vector_detail::NextCapacity(0));
+  EXPECT_EQ(0xFFFFFFFDu, vector_detail::NextCapacity(0x7FFFFFFEu));
+  EXPECT_THROW(vector_detail::NextCapacity(0x7FFFFFFFu), exception::OutOfRange);
+  EXPECT_EQ(0x80000001u, vector_detail::NextCapacity(0x80000000u));
+  EXPECT_EQ(0xFFFFFFFEu, vector_detail::NextCapacity(0xFFFFFFFDu));
+  EXPECT_THROW(vector_detail::NextCapacity(0xFFFFFFFEu), exception::OutOfRange);
+  EXPECT_THROW(vector_detail::NextCapacity(0xFFFFFFFFu), exception::OutOfRange);
+}
+
+struct Huge {
+  unsigned char bytes[0x40000000];
+};
+
+TEST(BufferVector, BlockOfMoreThanThirtyTwoBitsIsOutOfRange) {
+  EXPECT_THROW(vector_detail::Builder<Huge>(4), exception::OutOfRange);
+  EXPECT_THROW(vector_detail::Builder<std::string>(0xFFFFFFFDu), exception::OutOfRange);
+}
+
+TEST(BufferVector, CopyHasACapacityOfItsSizeAndItsOwnElements) {
+  Vector<std::string> v;
+  for (const char* s : {"a", "b", "c", "d"}) v.push_back(s);
+  Vector<std::string> copy(v);
+  EXPECT_EQ(4u, copy.capacity());
+  copy[0] = "changed";
+  EXPECT_EQ("a", v[0]);
+  EXPECT_EQ(0u, Vector<std::string>(Vector<std::string>()).capacity());
+}
+
+TEST(BufferVector, AssignmentReplacesAndToleratesItself) {
+  Vector<std::string> v, w;
+  v.push_back("a");
+  w.push_back("x");
+  w.push_back("y");
+  v = w;
+  EXPECT_EQ(2u, v.size());
+  EXPECT_EQ("y", v[1]);
+  Vector<std::string>& self = v;
+  v = self;
+  EXPECT_EQ("x", v[0]);
+}
+
+TEST(BufferVector, SwapExchangesAllAndClearFrees) {
+  Vector<int> v, w;
+  v.push_back(1);
+  v.swap(w);
+  EXPECT_EQ(0u, v.size());
+  ASSERT_EQ(1u, w.size());
+  EXPECT_EQ(1, w[0]);
+  w.clear();
+  EXPECT_EQ(0u, w.capacity());
+  EXPECT_EQ(nullptr, w.begin());
+  w.push_back(2);
+  EXPECT_EQ(1u, w.capacity());
+}
+
+TEST(BufferVector, PushBackOfAnOwnElementSurvivesTheMove) {
+  Vector<std::string> v;
+  v.push_back("a text that is long enough for a block of its own");
+  v.push_back(v[0]);
+  EXPECT_EQ(v[0], v[1]);
+}
+
+// Element whose nth copy throws, counting how many live.
+struct Fragile {
+  static inline int alive = 0, copiesLeft = 0;
+  int value;
+  explicit Fragile(int v) : value(v) { ++alive; }
+  Fragile(const Fragile& other) : value(other.value) {
+    if (copiesLeft-- == 0) throw std::string("no copy");
+    ++alive;
+  }
+  Fragile& operator=(const Fragile&) = default;
+  ~Fragile() { --alive; }
+};
+
+TEST(BufferVector, FailedPushBackLeavesTheOldBlock) {
+  {
+    Vector<Fragile> v;
+    Fragile::copiesLeft = 100;
+    for (int i = 0; i < 3; ++i) v.push_back(Fragile(i));  // full now
+    const Fragile* block = v.begin();
+    for (int failing = 0; failing < 4; ++failing) {
+      Fragile::copiesLeft = failing;
+      EXPECT_THROW(v.push_back(Fragile(9)), std::string) << failing;
+      EXPECT_EQ(3, Fragile::alive);
+      EXPECT_EQ(3u, v.size());
+      EXPECT_EQ(3u, v.capacity());
+      EXPECT_EQ(block, v.begin());
+    }
+    Fragile::copiesLeft = 1;
+    EXPECT_THROW(Vector<Fragile>{v}, std::string);
+    EXPECT_EQ(3, Fragile::alive);
+  }
+  EXPECT_EQ(0, Fragile::alive);
+}
+
+}  // namespace
+}  // namespace zt::fnd

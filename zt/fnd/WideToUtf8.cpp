@@ -1,0 +1,109 @@
+#include "zt/fnd/WideToUtf8.h"
+
+#include <cwchar>
+#include <memory>
+
+#include "zt/fnd/Exception.h"
+
+namespace zt {
+namespace fnd {
+namespace {
+
+bool IsEmpty(const wchar_t* begin, const wchar_t* end) { return begin == nullptr || begin >= end; }
+
+const wchar_t* EndOf(const wchar_t* s) { return s == nullptr ? s : s + std::wcslen(s); }
+
+// Whether wchar_t is signed differs between processors; the bits decide.
+std::uint32_t ValueOf(wchar_t c) { return static_cast<std::uint32_t>(c); }
+
+// An unencodable value counts as the one byte of its "?".
+unsigned EncodedBytes(std::uint32_t value) {
+  if (value <= 0x7F || value > 0x7FFFFFFF) return 1;
+  if (value <= 0x7FF) return 2;
+  if (value <= 0xFFFF) return 3;
+  if (value <= 0x1FFFFF) return 4;
+  return value <= 0x3FFFFFF ? 5 : 6;
+}
+
+// Writes the sequence of a value of `count` bytes and returns the place behind it.
+unsigned char* EncodeOne(std::uint32_t value, unsigned count, unsigned char* dest) {
+  if (count == 1) {
+    *dest = value > 0x7F ? '?' : static_cast<unsigned char>(value);
+    return dest + 1;
+  }
+  for (unsigned i = count - 1; i != 0; --i) {
+    dest[i] = static_cast<unsigned char>(0x80 | (value & 0x3F));
+    value >>= 6;
+  }
+  dest[0] = static_cast<unsigned char>((0xFF00u >> count) | value);
+  return dest + count;
+}
+
+std::uint32_t Checked(std::uint64_t count) {
+  if (count > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
+  return static_cast<std::uint32_t>(count);
+}
+
+}  // namespace
+
+std::uint32_t GetUtf8EncodingBytes(const wchar_t* s) { return GetUtf8EncodingBytes(s, EndOf(s)); }
+
+std::uint32_t GetUtf8EncodingBytes(const wchar_t* begin, const wchar_t* end) {
+  if (IsEmpty(begin, end)) return 0;
+  std::uint64_t count = 0;
+  for (; begin != end; ++begin) count += EncodedBytes(ValueOf(*begin));
+  return Checked(count);
+}
+
+std::uint32_t GetUtf8EncodingBytesWithBufferLimit(const wchar_t* begin, const wchar_t* end,
+                                                  std::uint32_t limit) {
+  if (IsEmpty(begin, end)) return 0;
+  std::uint32_t count = 0;
+  for (; begin != end; ++begin) {
+    const unsigned bytes = EncodedBytes(ValueOf(*begin));
+    if (bytes > limit - count) break;
+    count += bytes;
+  }
+  return count;
+}
+
+std::uint32_t WideToUtf8NoOverflow(const wchar_t*& begin, const wchar_t* end, unsigned char* dest,
+                                   unsigned char* destEnd) {
+  if (dest == nullptr || dest > destEnd) ZT_RAISE(exception::InvalidArgument());
+  if (IsEmpty(begin, end)) return 0;
+  const wchar_t* s = begin;
+  unsigned char* out = dest;
+  for (; s != end && out != destEnd; ++s) {
+    const std::uint32_t value = ValueOf(*s);
+    if (value <= 0x7F) {
+      *out++ = static_cast<unsigned char>(value);
+      continue;
+    }
+    const unsigned count = EncodedBytes(value);
+    if (static_cast<std::ptrdiff_t>(count) > destEnd - out) break;
+    out = EncodeOne(value, count, out);
+  }
+  const std::uint32_t written = Checked(static_cast<std::uint64_t>(out - dest));
+  begin = s;
+  return written;
+}
+
+std::uint32_t WideToUtf8(const wchar_t* begin, const wchar_t* end, unsigned char* dest,
+                         unsigned char* destEnd) {
+  const std::uint32_t written = WideToUtf8NoOverflow(begin, end, dest, destEnd);
+  if (!IsEmpty(begin, end)) ZT_RAISE(exception::BufferOverflow());
+  return written;
+}
+
+unsigned char* WideToUtf8(const wchar_t* begin, const wchar_t* end) {
+  const std::uint32_t count = GetUtf8EncodingBytes(begin, end);
+  const std::size_t size = Checked(static_cast<std::uint64_t>(count) + 1);
+  std::unique_ptr<unsigned char[]> text(new unsigned char[size]);
+  text[WideToUtf8(begin, end, text.get(), text.get() + count)] = 0;
+  return text.release();
+}
+
+unsigned char* WideToUtf8(const wchar_t* s) { return WideToUtf8(s, EndOf(s)); }
+
+}  // namespace fnd
+}  // namespace zt

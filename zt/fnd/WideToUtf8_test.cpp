@@ -1,0 +1,110 @@
+#include "zt/fnd/WideToUtf8.h"
+
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "zt/fnd/Exception.h"
+
+using namespace zt::fnd;
+
+namespace {
+
+std::string Encode(const std::wstring& text) {
+  const wchar_t* const end = text.data() + text.size();
+  const std::uint32_t n = GetUtf8EncodingBytes(text.data(), end);
+  std::vector<unsigned char> out(n + 1, '#');
+  EXPECT_EQ(n, WideToUtf8(text.data(), end, out.data(), out.data() + n));
+  EXPECT_EQ('#', out[n]) << "no terminator is written";
+  return std::string(out.begin(), out.begin() + n);
+}
+
+}  // namespace
+
+TEST(TextWideToUtf8, EncodesByTable) {
+  const struct {
+    unsigned value;
+    const char* bytes;
+  } table[] = {
+      {0x41, "A"},
+      {0x7F, "\x7F"},
+      {0x80, "\xC2\x80"},
+      {0x7FF, "\xDF\xBF"},
+      {0x800, "\xE0\xA0\x80"},
+      {0xD800, "\xED\xA0\x80"},
+      {0xFFFF, "\xEF\xBF\xBF"},
+      {0x10000, "\xF0\x90\x80\x80"},
+      {0x10FFFF, "\xF4\x8F\xBF\xBF"},
+      {0x1FFFFF, "\xF7\xBF\xBF\xBF"},
+      {0x200000, "\xF8\x88\x80\x80\x80"},
+      {0x3FFFFFF, "\xFB\xBF\xBF\xBF\xBF"},
+      {0x4000000, "\xFC\x84\x80\x80\x80\x80"},
+      {0x7FFFFFFF, "\xFD\xBF\xBF\xBF\xBF\xBF"},
+      {0x80000000, "?"},
+      {0xFFFFFFFF, "?"},
+  };
+  for (const auto& row : table) {
+    EXPECT_EQ(row.bytes, Encode(std::wstring(1, static_cast<wchar_t>(row.value)))) << row.value;
+  }
+  EXPECT_EQ(std::string("a\0b", 3), Encode(std::wstring(L"a\0b", 3)));
+}
+
+TEST(TextWideToUtf8, CountsTerminatedAndRangedText) {
+  EXPECT_EQ(0u, GetUtf8EncodingBytes(nullptr));
+  EXPECT_EQ(0u, GetUtf8EncodingBytes(L""));
+  EXPECT_EQ(6u, GetUtf8EncodingBytes(L"a\xE9\x20AC"));
+  EXPECT_EQ(0u, GetUtf8EncodingBytes(nullptr, nullptr));
+  const wchar_t bad[] = {static_cast<wchar_t>(0x80000000), L'a'};
+  EXPECT_EQ(2u, GetUtf8EncodingBytes(bad, bad + 2));
+}
+
+TEST(TextWideToUtf8, CountingStopsBeforeTheLimit) {
+  const wchar_t text[] = L"a\xE9\x20ACz";
+  const unsigned expected[] = {0, 1, 1, 3, 3, 3, 6, 7, 7};
+  for (unsigned limit = 0; limit < 9; ++limit) {
+    EXPECT_EQ(expected[limit], GetUtf8EncodingBytesWithBufferLimit(text, text + 4, limit)) << limit;
+  }
+  EXPECT_EQ(0u, GetUtf8EncodingBytesWithBufferLimit(nullptr, nullptr, 9));
+  EXPECT_EQ(7u, GetUtf8EncodingBytesWithBufferLimit(text, text + 4, 0xFFFFFFFF));
+}
+
+TEST(TextWideToUtf8, BadDestinationsRaiseBeforeAnythingElse) {
+  unsigned char out[4];
+  EXPECT_THROW(WideToUtf8(nullptr, nullptr, nullptr, out), exception::InvalidArgument);
+  EXPECT_THROW(WideToUtf8(nullptr, nullptr, out + 1, out), exception::InvalidArgument);
+  const wchar_t* none = nullptr;
+  EXPECT_THROW(WideToUtf8NoOverflow(none, nullptr, nullptr, out), exception::InvalidArgument);
+  EXPECT_EQ(0u, WideToUtf8(nullptr, nullptr, out, out + 4));
+}
+
+TEST(TextWideToUtf8, CharacterThatDoesNotFitStopsTheRun) {
+  const wchar_t text[] = L"a\x20ACz";
+  for (unsigned room = 1; room < 4; ++room) {
+    unsigned char out[8] = "#######";
+    const wchar_t* cursor = text;
+    EXPECT_EQ(1u, WideToUtf8NoOverflow(cursor, text + 3, out, out + room));
+    EXPECT_EQ(text + 1, cursor);
+    EXPECT_STREQ("a######", reinterpret_cast<char*>(out)) << "never a part of a sequence";
+    EXPECT_THROW(WideToUtf8(text, text + 3, out, out + room), exception::BufferOverflow);
+  }
+  unsigned char out[8];
+  const wchar_t* cursor = text;
+  EXPECT_EQ(4u, WideToUtf8NoOverflow(cursor, text + 3, out, out + 4));
+  EXPECT_EQ(text + 2, cursor);
+  EXPECT_EQ(5u, WideToUtf8(text, text + 3, out, out + 5));
+}
+
+TEST(TextWideToUtf8, NewBlockIsTerminated) {
+  const wchar_t text[] = L"a\xE9";
+  const auto chars = [](const std::unique_ptr<unsigned char[]>& p) {
+    return reinterpret_cast<const char*>(p.get());
+  };
+  const std::unique_ptr<unsigned char[]> all(WideToUtf8(text)), range(WideToUtf8(text, text + 1)),
+      none(WideToUtf8(nullptr)), nullRange(WideToUtf8(nullptr, nullptr));
+  EXPECT_STREQ("a\xC3\xA9", chars(all));
+  EXPECT_STREQ("a", chars(range));
+  EXPECT_STREQ("", chars(none));
+  EXPECT_STREQ("", chars(nullRange));
+}
