@@ -1,0 +1,48 @@
+#pragma once
+
+#include <pthread.h>
+
+#include <cstdint>
+
+// Changes the counter atomically and returns the new value.
+int ZTInterlockedInc(int* counter);
+int ZTInterlockedDec(int* counter);
+pthread_t ZTGetThreadId();
+
+// Lock of one process, not recursive, that knows its owner.
+//
+//   state \ call   Lock                 Unlock   IsNesting
+//   free           taken                -        false
+//   held by me     waits for ever       free     true
+//   held by other  waits, then taken    free     false
+//
+// A Lock that finds the lock taken although the underlying mutex was free aborts the process: the
+// lock's memory has been overwritten. Threads: any; an object outlives its users.
+class CZTMutex {
+ public:
+  CZTMutex();
+  virtual ~CZTMutex();
+  CZTMutex(const CZTMutex&) = delete;
+  CZTMutex& operator=(const CZTMutex&) = delete;
+
+  void Lock();
+  void Unlock();
+  // For code that would otherwise wait for itself.
+  bool IsNesting() const;
+
+ private:
+  struct State;
+  State* m_state;
+};
+
+// Holds a CZTMutex for a scope.
+class CZTMutexHold {
+ public:
+  explicit CZTMutexHold(CZTMutex& mutex) : m_mutex(mutex) { m_mutex.Lock(); }
+  ~CZTMutexHold() { m_mutex.Unlock(); }
+  CZTMutexHold(const CZTMutexHold&) = delete;
+  CZTMutexHold& operator=(const CZTMutexHold&) = delete;
+
+ private:
+  CZTMutex& m_mutex;
+};
