@@ -1,4 +1,4 @@
-# libvltutils.so: all floors in one library that shows the names of cmake/exports.txt and no other.
+# libvltutils.so: all floors in one library that shows the names of cmake/exports.map and no other.
 if(NOT TARGET vlcore)
   return()
 endif()
@@ -14,8 +14,10 @@ foreach(floor vlcore ztcore ztfnd ztini)
     list(APPEND floors ${floor})
   endif()
 endforeach()
+target_link_libraries(vltutils PRIVATE vlt_strict ${floors})
+# Whole, also where one floor brings another: what nobody refers to is the surface itself.
 list(JOIN floors "," floors)
-target_link_libraries(vltutils PRIVATE vlt_strict "$<LINK_LIBRARY:WHOLE_ARCHIVE,${floors}>")
+set_property(TARGET vltutils PROPERTY LINK_LIBRARY_OVERRIDE "WHOLE_ARCHIVE,${floors}")
 target_link_options(vltutils PRIVATE -Wl,--version-script=${exports} -Wl,-z,nodelete
   -Wl,-z,relro -Wl,-z,now -Wl,--gc-sections)
 if(NOT VLT_SANITIZE)

@@ -1,0 +1,194 @@
+#include <string.h>
+
+#include <algorithm>
+
+#include "source/Common/Posix/vltlinuxos.h"
+#include "source/Common/vltcmn.h"
+#include "vlloader/source/vlloader.h"
+#include "zt/fnd/osdep/StringCompare.h"
+#include "ztini/ztini.h"
+
+namespace {
+
+constexpr const char* kEarlyTraceSource = "./source/Utilities/../Common/Posix/vltlinuxos";
+constexpr const char* kComponents = "KORComponents";
+constexpr size_t kFileNameSize = 260;
+
+bool Warns() { return (vltGetTraceFlagsImpl() & kEarlyTraceMask) >= kEarlyTraceWarnings; }
+
+// What stands behind the last slash; the whole text without one.
+std::string BaseName(const std::string& file) { return file.substr(file.rfind('/') + 1); }
+
+struct NameLess {
+  bool operator()(const std::string& a, const std::string& b) const {
+    return zt::fnd::osdep::StringCaseCompare(a.c_str(), b.c_str()) < 0;
+  }
+};
+
+struct Question {
+  const char* separator;
+  std::string target;  // base name of the component's file
+  std::string key;
+  unsigned maxLength;
+  std::string joined;
+  HRESULT result = E_FAIL;
+};
+
+}  // namespace
+
+struct vltStringResources::Database {
+  explicit Database(const std::string& file) : document(IniNew(0)) {
+    if (!document) return;
+    IniSetDuplicateChecking(document, 1);
+    IniReadFromFile(document, file.c_str());  // A missing file is an empty one.
+  }
+  ~Database() { IniDispose(document); }
+  Database(const Database&) = delete;
+  Database& operator=(const Database&) = delete;
+
+  void answer(Question& q);
+  bool fileNameOf(const char* section, std::string* base);
+  bool take(Question& q, const char* section);
+  void walk(Question& q);
+  void index();
+
+  IniStructForwardReferenceTag* document;
+  bool indexed = false;
+  // Base name of a component's file to the sections that have it, in the order of the list.
+  std::map<std::string, std::vector<std::string>, NameLess> sectionsOf;
+};
+
+// False, with a warning where that is due, for a section that names no file.
+bool vltStringResources::Database::fileNameOf(const char* section, std::string* base) {
+  if (!IniSectionExists(document, section)) {
+    if (Warns()) {
+      vltEarlyTrace(kEarlyTraceSource, 143,
+                    "Warning: %s section has component %s but no section for this component in "
+                    "vlt.vlr file",
+                    kComponents, section);
+    }
+    return false;
+  }
+  if (IniItemExists(document, section, "FileName") != 1) return false;
+  char file[kFileNameSize];
+  int32_t status = IniGetStringIntoBuffer(document, section, "FileName", file, sizeof file);
+  if (status < 1) {
+    if (Warns()) {
+      vltEarlyTrace(kEarlyTraceSource, 134,
+                    "Warning: Could not read file name from section %s, result = %d", section,
+                    static_cast<int>(status));
+    }
+    return false;
+  }
+  *base = BaseName(file);
+  return true;
+}
+
+// Adds the text of one component. True if the search is over.
+bool vltStringResources::Database::take(Question& q, const char* section) {
+  if (IniItemExists(document, section, q.key.c_str()) == 1) {
+    TaskMem<char> text(static_cast<char*>(q.maxLength ? vltTaskMemAlloc(q.maxLength) : nullptr));
+    int32_t status = 0;
+    if (text) {
+      status = IniGetStringIntoBuffer(document, section, q.key.c_str(), text.get(), q.maxLength);
+    }
+    if (status != 0 && text) {
+      if (!q.joined.empty()) q.joined += q.separator ? q.separator : "";
+      q.joined += text.get();
+      q.result = S_OK;
+    } else if (Warns()) {
+      vltEarlyTrace(kEarlyTraceSource, 120,
+                    "Warning: Could not get string resource %s from section %s, result = %d",
+                    q.key.c_str(), section, static_cast<int>(status));
+    }
+  }
+  return !q.separator;
+}
+
+void vltStringResources::Database::walk(Question& q) {
+  int32_t count = IniNumberOfItems(document, kComponents);
+  for (int32_t n = 1; n <= count; ++n) {
+    const char* section = nullptr;
+    std::string base;
+    if (IniNthItemName(document, kComponents, n, &section) != 1) continue;
+    if (!fileNameOf(section, &base)) continue;
+    if (zt::fnd::osdep::StringCaseCompare(base.c_str(), q.target.c_str()) != 0) continue;
+    if (take(q, section)) return;
+  }
+}
+
+void vltStringResources::Database::index() {
+  if (indexed) return;
+  indexed = true;
+  int32_t count = IniNumberOfItems(document, kComponents);
+  for (int32_t n = 1; n <= count; ++n) {
+    const char* section = nullptr;
+    std::string base;
+    if (IniNthItemName(document, kComponents, n, &section) != 1) continue;
+    if (fileNameOf(section, &base)) sectionsOf[base].push_back(section);
+  }
+}
+
+void vltStringResources::Database::answer(Question& q) {
+  if (!document) return;
+  if (IniSectionExists(document, kComponents) != 1) {
+    if (Warns()) {
+      vltEarlyTrace(kEarlyTraceSource, 152, "Warning: There should always be %s", kComponents);
+    }
+    return;
+  }
+  // The walk has each question repeat its warnings; without them the index gives the same answer.
+  if (Warns()) return walk(q);
+  index();
+  auto found = sectionsOf.find(q.target);
+  if (found == sectionsOf.end()) return;
+  for (const std::string& section : found->second) {
+    if (take(q, section.c_str())) return;
+  }
+}
+
+vltStringResources::vltStringResources() = default;
+vltStringResources::~vltStringResources() = default;
+
+void vltStringResources::forget() {
+  m_databases.clear();
+  m_lookedUp = false;
+}
+
+vltStringResources::Database* vltStringResources::databaseFor(const std::string& file) {
+  std::string directory;
+  if (file.find("/Last/") != std::string::npos) {
+    directory = file.substr(0, file.rfind('/'));
+  } else {
+    if (!m_lookedUp) {
+      m_installDirectory = vlLookUpInstallDirectory();
+      m_lookedUp = true;
+    }
+    directory = m_installDirectory;
+  }
+  auto& database = m_databases[directory];
+  if (!database) database = std::make_unique<Database>(directory + "/vlt.vlr");
+  return database.get();
+}
+
+HRESULT vltStringResources::get(const char* separator, const wchar_t* file, const wchar_t* key,
+                                char** out, unsigned maxLength) {
+  if (!out) return E_POINTER;
+  std::string narrowFile = zt::fnd::AnsiString(file ? file : L"").c_str();
+  Question q{separator, "", zt::fnd::AnsiString(key ? key : L"").c_str(), maxLength, "", E_FAIL};
+  // Without a slash there is no base name to look for.
+  if (narrowFile.find('/') != std::string::npos) q.target = BaseName(narrowFile);
+  databaseFor(narrowFile)->answer(q);
+  if (q.joined.empty()) return q.result;
+  auto* text = static_cast<char*>(vltTaskMemAlloc(maxLength));
+  if (!text) return E_FAIL;
+  strncpy(text, q.joined.c_str(), maxLength);
+  text[maxLength - 1] = '\0';
+  *out = text;
+  return q.result;
+}
+
+HRESULT vltGetStringResourceImpl(const char* separator, const wchar_t* file, const wchar_t* key,
+                                 char** out, unsigned maxLength) {
+  return vltStringResources().get(separator, file, key, out, maxLength);
+}

@@ -1,0 +1,94 @@
+#include "source/Common/Posix/vltlinuxos.h"
+
+#include <pthread.h>
+#include <stdarg.h>
+#include <stdio.h>
+#include <stdlib.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <memory>
+
+#include "vlloader/source/vlloader.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/path.h"
+#include "ztini/ztini.h"
+
+using zt::fnd::osdep::path;
+using zt::fnd::AnsiString;
+using zt::fnd::String;
+
+void vltEarlyTrace(const char* sourceName, long line, const char* format, ...) {
+  char message[2048];
+  va_list args;
+  va_start(args, format);
+  int length = vsnprintf(message, sizeof message, format, args);
+  va_end(args);
+  if (length < 0) return;
+  printf("%s(%ld) : trace %d %ld: %s\n", sourceName, line, static_cast<int>(getpid()),
+         static_cast<long>(pthread_self()), message);
+}
+
+namespace {
+
+constexpr unsigned kFlagsUnread = 0xFFFFFFFF;
+
+unsigned ReadTraceFlags() {
+  std::string file = vlLookUpInstallDirectory() + "/vlttrace.txt";
+  std::unique_ptr<FILE, int (*)(FILE*)> in(fopen(file.c_str(), "re"), fclose);
+  unsigned first = 0, second = 0;
+  // A short file leaves its zeros.
+  if (in && fscanf(in.get(), "%u %u", &first, &second) < 0) return 0;
+  return second << 4 | first;
+}
+
+}  // namespace
+
+unsigned vltGetTraceFlagsImpl() {
+  // Atomic for a race that is harmless otherwise: two threads read the file to the same result.
+  static std::atomic<unsigned> flags{kFlagsUnread};
+  unsigned known = flags;
+  if (known == kFlagsUnread) flags = known = ReadTraceFlags();
+  return known;
+}
+
+String vlCreateLogDirIfNeeded(AnsiString& diagnosticsIni) {
+  // The fixed place on purpose: logging starts before anybody has said where the installation is.
+  String data = path::Join(String(kKorDefaultDirectory), String(L"Data"));
+  diagnosticsIni = AnsiString(path::Join(data, String(L"vldiag.ini")));
+  const char* home = getenv("HOME");
+  String root(L"/tmp/zentrex");
+  if (geteuid() == 0) {
+    root = L"/Library/Logs";
+  } else if (home) {
+    root = path::Join(String(home), String(L"Library/Logs"));
+  }
+  String directory = path::Join(root, String(L"KOR"));
+  path::MakePathEndInSlash(directory);
+  try {
+    if (!path::IsDirectory(directory.c_str())) path::CreateDir(directory.c_str(), 0777);
+  } catch (const zt::fnd::exception::Exception&) {
+    // Without the directory the log file cannot be opened either, and that is silent too.
+  }
+  return directory;
+}
+
+namespace {
+
+unsigned ReadOption(IniStructForwardReferenceTag* ini, const char* section, const char* key,
+                    unsigned fallback) {
+  uint32_t value = 0;
+  if (IniGetUInt(ini, section, key, &value) == 1) return value;
+  return IniGetUInt(ini, "AllComponents", key, &value) == 1 ? value : fallback;
+}
+
+}  // namespace
+
+unsigned vlReadTracerOptions(IniStructForwardReferenceTag* ini, const char* section,
+                             unsigned& severity, unsigned& target, unsigned* threshold) {
+  severity = ReadOption(ini, section, "Severity", 1);
+  target = ReadOption(ini, section, "Target", 1);
+  if (!threshold) return target;
+  *threshold = ReadOption(ini, section, "LowDiskThreshold", 0);
+  return *threshold;
+}

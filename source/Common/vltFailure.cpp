@@ -1,0 +1,21 @@
+#include "source/Common/vltFailure.h"
+
+#include <stdarg.h>
+#include <stdio.h>
+
+#include "source/Common/ZtUtils/General/vlTracer.h"
+
+void vltTraceError(const char* format, ...) {
+  if (!(vlTracer::gs_traceMask & kTraceErrors)) return;
+  char message[2048];  // As much as one line of the log takes.
+  va_list args;
+  va_start(args, format);
+  int length = vsnprintf(message, sizeof message, format, args);
+  va_end(args);
+  if (length >= 0) vlt_vlTracer::TraceOutput(' ', message, false);
+}
+
+HRESULT vltReportOutOfMemory(const char* signature) {
+  vltTraceError("Memory allocation failure in %s", signature);
+  return E_OUTOFMEMORY;
+}

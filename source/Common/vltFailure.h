@@ -1,0 +1,16 @@
+#pragma once
+
+// The one way in which the library reports a failure beside its result code.
+
+#include "source/Utilities/vltTypes.h"
+
+// Bit of the trace mask under which error messages go out.
+inline constexpr unsigned kTraceErrors = 2;
+
+// Hands the message to the log if the trace mask has kTraceErrors. `format` is that of printf.
+// Never fails: a message that cannot be formed is lost.
+void vltTraceError(const char* format, ...) __attribute__((format(printf, 1, 2)));
+
+// Tells other processes and the log that memory ran out in the function with this signature.
+// Returns E_OUTOFMEMORY, so that callers can end with it.
+HRESULT vltReportOutOfMemory(const char* signature);

@@ -1,0 +1,25 @@
+#pragma once
+
+// The files that the system writes for itself belong to all users of the machine: they are opened
+// up after each change. The functions here do that, and stamp files that are given up.
+
+#include "source/Utilities/vltTypes.h"
+#include "zt/fnd/String.h"
+
+// Mode of every shared file and directory.
+inline constexpr int kSharedMode = 0777;
+
+// Gives the path, and with `recursive` what a directory holds, these permission bits. A symbolic
+// link is neither changed nor followed, and counts as done. Entries whose name starts with a dot
+// are not visited. The first failure ends the walk: E_FAIL.
+HRESULT vltSetFileSecurityImpl(const zt::fnd::String& path, int mode, bool recursive);
+
+// chmod of one path, which follows links. S_OK or E_FAIL.
+HRESULT vlrSetFileSecurity(const zt::fnd::String& path, int mode);
+
+// Makes the directory, with the missing ones above it, unless it is there. Its mode becomes
+// kSharedMode; the result is that of the mode change. Throws what path::CreateDir throws.
+HRESULT vltMakeSharedDirectory(const zt::fnd::String& directory);
+
+// "_%m%d%Y" of the local time, "_11142026".
+zt::fnd::String vlrGetCurrentLocalTime();

@@ -1,0 +1,83 @@
+#include <stdio.h>
+#include <string.h>
+#include <wchar.h>
+
+#include <tuple>
+
+#include "source/Common/vltFailure.h"
+#include "source/Common/vltcmn.h"
+#include "source/Utilities/vltHookPoints.h"
+#include "source/Utilities/vltTestHook.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/Guid.h"
+
+HRESULT vltStringFromCLSID(const GUID* g, wchar_t** out) {
+  if (!g || !out) return E_POINTER;
+  zt::fnd::String text;
+  zt::fnd::Guid(*g).toString(text);
+  size_t sizeBytes = (text.length() + 1) * sizeof(wchar_t);
+  wchar_t* copy = nullptr;
+  if (!vltTestHook(vlt::hook::kStringFromClsid)) {
+    copy = static_cast<wchar_t*>(vltTaskMemAlloc(sizeBytes));
+  }
+  if (!copy) {
+    return vltReportOutOfMemory("HRESULT vltStringFromCLSID(const GUID*, wchar_t**)");
+  }
+  memcpy(copy, text.c_str(), sizeBytes);
+  *out = copy;
+  return S_OK;
+}
+
+zt::fnd::String vltGUIDToString(const GUID& g) {
+  TaskMem<wchar_t> text;
+  if (vltStringFromCLSID(&g, text.out()) < 0) return zt::fnd::String();
+  return zt::fnd::String(text.get());
+}
+
+wchar_t* vltGuidToString2(GUID g) {
+  wchar_t* copy = nullptr;
+  return vltDuplicateString2(vltGUIDToString(g).c_str(), &copy) < 0 ? nullptr : copy;
+}
+
+wchar_t* vltGuidToStructString2(GUID g) {
+  char text[128];
+  const unsigned char* b = g.Data4;
+  snprintf(text, sizeof text, "{%#lx,%#hx,%#hx,{%#hx,%#hx,%#hx,%#hx,%#hx,%#hx,%#hx,%#hx}}",
+           static_cast<unsigned long>(g.Data1), g.Data2, g.Data3, b[0], b[1], b[2], b[3], b[4],
+           b[5], b[6], b[7]);
+  return Dup(zt::fnd::String(text).c_str());
+}
+
+int vltCLSIDFromString(const wchar_t* s, GUID* out) {
+  try {
+    *out = zt::fnd::Guid(zt::fnd::String(s)).get();
+    return 0;
+  } catch (const zt::fnd::exception::BadGuidString&) {
+    // Bad text is a result here, not a failure: it reads as the null GUID.
+    *out = GUID_NULL;
+    return 1;
+  }
+}
+
+int vltStringToGUID(const wchar_t* s, GUID* out) {
+  *out = GUID_NULL;
+  return vltCLSIDFromString(s, out);
+}
+
+GUID vltGuidFromString2(const wchar_t* s) {
+  GUID g = GUID_NULL;
+  if (!s) return g;
+  if (wcschr(s, L'{')) {
+    vltStringToGUID(s, &g);
+  } else {
+    vltStringToGUID((zt::fnd::String(L"{") + s + L"}").c_str(), &g);
+  }
+  return g;
+}
+
+int vltDceGuidCompare2(const GUID& a, const GUID& b) {
+  auto numbers = [](const GUID& g) { return std::tie(g.Data1, g.Data2, g.Data3); };
+  if (numbers(a) != numbers(b)) return numbers(a) > numbers(b) ? 1 : -1;
+  int order = memcmp(a.Data4, b.Data4, sizeof a.Data4);
+  return (order > 0) - (order < 0);
+}

@@ -1,0 +1,34 @@
+#include <stdlib.h>
+
+#include "source/Common/vltcmn.h"
+
+void* vltTaskMemAlloc(size_t sizeBytes) {
+  // The limit belongs to the 32-bit days of the interface and holds on every word size.
+  return sizeBytes >= 0x80000000u ? nullptr : malloc(sizeBytes);
+}
+
+void vltTaskMemFree(void* p) { free(p); }
+
+void vltFreeComponent2(_vltComponent2& record) {
+  vltTaskMemFree(record.name);
+  vltTaskMemFree(record.fileName);
+  if (record.type == vltComponentDataDictionary) {
+    vltTaskMemFree(record.dictionary.prefix);
+    vltTaskMemFree(record.dictionary.auxString1);
+    vltTaskMemFree(record.dictionary.auxString2);
+  } else if (record.type == vltComponentResourceExpert) {
+    vltTaskMemFree(record.resource.pnp);
+  }
+}
+
+void vltFreeComponent(_vltComponent& record) {
+  vltTaskMemFree(record.name);
+  vltTaskMemFree(record.fileName);
+  if (record.type == vltComponentDataDictionary) {
+    vltTaskMemFree(record.dictionary.prefix);
+    vltTaskMemFree(record.dictionary.auxString1);
+    vltTaskMemFree(record.dictionary.auxString2);
+  } else if (record.type == vltComponentResourceExpert) {
+    vltTaskMemFree(record.resource.pnp);
+  }
+}

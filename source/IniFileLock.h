@@ -1,0 +1,37 @@
+#pragma once
+
+#include "zt/fnd/String.h"
+
+// Hold on the named lock of one guarded INI file, for the object's life.
+//
+// All holds of one name in the process stand on ONE zt::fnd::osdep::Mutex: a second object of that
+// class would be a second owner in the eyes of the kernel, and the thread that holds the first
+// would wait for itself for ever.
+//
+//   lock of the name      a hold is made by          it
+//   free                  any thread                 takes the named lock
+//   held by this thread   this thread                counts up at once
+//   held by a thread      another thread             waits
+//   held by a process     any thread of another      waits
+//
+// Any thread may end a hold. Other threads wait as long as the holder lives, or for ever if the
+// holding thread has ended without giving up its hold. A forked child owns none of its parent's
+// holds: ending one there leaves the parent's lock alone.
+// Lock order: settings file before jar; registration database before registration file.
+class IniFileLock {
+ public:
+  // Waits without limit. Throws what Mutex throws; nothing is held then.
+  explicit IniFileLock(const zt::fnd::String& name);
+  ~IniFileLock();
+  IniFileLock(const IniFileLock&) = delete;
+  IniFileLock& operator=(const IniFileLock&) = delete;
+
+  // Name of the lock of a file: its path without "\", "/", ":" and ".", in capitals. A name that
+  // would be too long for a directory entry ends in a digest instead of its tail.
+  static zt::fnd::String NameForFile(const char* fileName);
+
+ private:
+  struct Entry;
+  class Table;
+  Entry* m_entry;
+};

@@ -1,0 +1,54 @@
+#pragma once
+
+// Names of the registration database and small text helpers, shared by the sources of the
+// registrar.
+
+#include <stdlib.h>
+
+#include <string>
+
+#include "zt/fnd/String.h"
+#include "ztcom/ztcore/ztunknown.h"
+
+namespace registrar {
+
+inline constexpr const char* kGlobalSection = "KOR";
+inline constexpr const char* kComponents = "KORComponents";
+inline constexpr const char* kRegistrations = "Registration";
+inline constexpr const char* kContents = "VLRContentsSection";
+
+inline constexpr const char* kConfigFile = "ConfigFile";
+inline constexpr const char* kSchemaVersion = "SchemaVersion";
+inline constexpr const char* kCacheSize = "CacheSize";
+inline constexpr const char* kIdentifier = "Identifier";
+inline constexpr const char* kFileName = "FileName";
+inline constexpr const char* kFragmentRegistered = "FragmentRegistered";
+inline constexpr const char* kLastInstalledSchemaVersion = "LastInstalledSchemaVersion";
+inline constexpr const char* kPrefix = "Prefix";
+inline constexpr const char* kPnp = "PnP";
+inline constexpr const char* kBindingClasses = "BINDING_CLASSES";
+
+inline constexpr const wchar_t* kDictionaries = L"Data Dictionaries";
+inline constexpr const wchar_t* kExperts = L"Experts";
+
+// In the process's locale; null counts as empty.
+inline std::string Narrow(const wchar_t* text) {
+  return text ? std::string(zt::fnd::AnsiString(text).c_str()) : std::string();
+}
+inline std::string Narrow(const zt::fnd::String& text) { return Narrow(text.c_str()); }
+inline zt::fnd::String Widen(const std::string& text) { return zt::fnd::String(text.c_str()); }
+
+inline std::string Decimal(uint32_t value) { return std::to_string(value); }
+inline uint32_t Number(const std::string& text) {
+  return static_cast<uint32_t>(strtoul(text.c_str(), nullptr, 10));
+}
+
+}  // namespace registrar
+
+// Root of the installation, ending in a slash; empty if there is none.
+zt::fnd::String vlrInstallRoot();
+
+// The directory `name` below the root, ending in a slash, made if it was missing. Its code is that
+// of the mode change, or E_FAIL where the rights to make it are missing. Without a root the text is
+// empty, and the code E_FAIL.
+HRESULT vlrMakeRootDirectory(const wchar_t* name, zt::fnd::String* directory);

@@ -1,0 +1,222 @@
+// Data dictionaries: their registration, the flag that tells of a change, and the previous ones.
+#include <string.h>
+
+#include "source/Common/vltFileSecurity.h"
+#include "source/Common/vltcmn.h"
+#include "source/Pharlap/registrarText.h"
+#include "source/Pharlap/vltPharlapRegistrar.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/path.h"
+#include "ztcom/ztcore/ztmemmgr.h"
+
+using zt::fnd::osdep::path;
+using namespace registrar;
+using Toolyard::CztHold;
+using zt::fnd::String;
+using zt::fnd::Vector;
+
+namespace {
+
+constexpr const char* kEarlyTraceSource = "./source/Pharlap/vltPharlapRegistrar";
+constexpr long kPortConfigurationLine = 2208;
+
+// What is missing in one of the two files that are compared, as early tracing tells it.
+struct Warning {
+  long line;
+  const char* text;
+};
+constexpr Warning kNoIdentifier = {1857,
+                                   "Warning: Could not read id from section %s, result = %ld"};
+constexpr Warning kNoFileName = {1870,
+                                 "Warning: Could not read file name from section %s, result = %ld"};
+constexpr Warning kNoSchemaVersion = {
+    1882, "Warning: Could not read schema version from section %s, result = %ld"};
+constexpr Warning kNoFragmentIdentifier = {
+    1902, "Warning: Could not read id from section %s in product vlr, result = %ld"};
+
+// Reads an item; tells of a failure, and of an empty value where that counts as one. Returns the
+// code.
+HRESULT ReadOrWarn(const CvlIniMgr& ini, const std::string& section, const char* item,
+                   bool mayBeEmpty, const Warning& warning, std::string* value) {
+  value->clear();
+  HRESULT result = ini.GetItem(section.c_str(), item, value);
+  if (result >= 0 && (mayBeEmpty || !value->empty())) return result;
+  if ((vltGetTraceFlagsImpl() & kEarlyTraceMask) > 1) {
+    // The formats above are the only ones, each with a text and a number.
+#pragma GCC diagnostic push
+#pragma GCC diagnostic ignored "-Wformat-nonliteral"
+    vltEarlyTrace(kEarlyTraceSource, warning.line, warning.text, section.c_str(),
+                  static_cast<long>(result));
+#pragma GCC diagnostic pop
+  }
+  return result;
+}
+
+bool HasPortConfiguration(const _vltStartupOptions* options) {
+  constexpr size_t kFlagsOffset = 4;
+  constexpr unsigned char kPortConfigurationBit = 0x80;
+  return options &&
+         (reinterpret_cast<const unsigned char*>(options)[kFlagsOffset] & kPortConfigurationBit);
+}
+
+void ReplaceText(wchar_t** text, const wchar_t* by) {
+  ZtTaskMemFree(*text);
+  *text = nullptr;
+  if (by) vlrDuplicateString(by, text);
+}
+
+}  // namespace
+
+HRESULT CvltPharlapRegistrar::RegisterDataDictionary(_vltComponent2* record) {
+  std::lock_guard hold(m_iniLock);
+  if (!m_registrationIni) return E_FAIL;
+  std::string section = Narrow(record->name);
+  std::string identifier = Narrow(vlrGuidToString(record->identifier));
+  if (StripBracesFromGuid(identifier.data()) == S_OK) identifier.resize(strlen(identifier.c_str()));
+  const vltDictVariant& variant = record->dictionary;
+  auto set = [&](const char* item, const std::string& value, bool quote) {
+    m_registrationIni->SetItem(section.c_str(), item, value.c_str(), quote);
+  };
+  m_registrationIni->SetItem(kComponents, section.c_str(), section.c_str(), true);
+  set(kIdentifier, identifier, true);
+  set(kFileName, Narrow(record->fileName), true);
+  set(kSchemaVersion, Decimal(variant.schemaVersion), false);
+  set(kFragmentRegistered, Decimal(variant.fragmentRegistered), false);
+  set(kLastInstalledSchemaVersion, Decimal(variant.lastInstalledSchemaVersion), false);
+  set(kPrefix, Narrow(variant.prefix), true);
+  HRESULT result = SaveChanges();
+
+  CztHold holdMap(components().lock);
+  CvltComponent* component = nullptr;
+  if (InternalGetComponentNoScan(record->identifier, component) < 0) return result;
+  // A component of another type under this identifier has no place for the rest.
+  if (component->record().type != vltComponentDataDictionary) return result;
+  ReplaceText(&component->record().name, record->name);
+  ReplaceText(&component->record().fileName, record->fileName);
+  vltDictVariant& known = component->record().dictionary;
+  ReplaceText(&known.prefix, variant.prefix);
+  known.schemaVersion = variant.schemaVersion;
+  known.fragmentRegistered = variant.fragmentRegistered;
+  known.lastInstalledSchemaVersion = variant.lastInstalledSchemaVersion;
+  return result;
+}
+
+HRESULT CvltPharlapRegistrar::HasDDChanged(CvlIniMgr& fragment, const wchar_t* wideSection,
+                                           bool& changed) {
+  std::string section = Narrow(wideSection);
+  changed = true;
+  if (fragment.ItemExists(section.c_str(), kSchemaVersion) < 0) {
+    changed = false;
+    return S_OK;
+  }
+  if (m_registrationIni->SectionExists(section.c_str()) < 0) return S_OK;
+
+  // Every dictionary that is merged counts as changed: a merge happens only for a file with another
+  // time stamp. What follows is here for its warnings and its result.
+  std::string text;
+  GUID known = GUID_NULL;
+  HRESULT result =
+      ReadOrWarn(*m_registrationIni, section, kIdentifier, false, kNoIdentifier, &text);
+  if (result >= 0 && !text.empty()) known = vltGuidFromString2(Widen(text).c_str());
+  ReadOrWarn(*m_registrationIni, section, kFileName, true, kNoFileName, &text);
+  ReadOrWarn(*m_registrationIni, section, kSchemaVersion, false, kNoSchemaVersion, &text);
+
+  GUID brought = GUID_NULL;
+  result = ReadOrWarn(fragment, section, kIdentifier, false, kNoFragmentIdentifier, &text);
+  if (result >= 0 && !text.empty()) brought = vltGuidFromString2(Widen(text).c_str());
+  if (brought == GUID_NULL || !(brought == known)) return result;
+  HRESULT versionResult = fragment.GetItem(section.c_str(), kSchemaVersion, &text);
+  return versionResult < 0 ? versionResult : result;
+}
+
+HRESULT CvltPharlapRegistrar::ResetDDUpdatedFlags() {
+  std::lock_guard hold(m_iniLock);
+  HRESULT result = S_OK;
+  bool modified = false;
+  int sections = m_registrationIni ? m_registrationIni->GetNumberOfSections() : 0;
+  for (int n = 1; n <= sections; ++n) {
+    std::string section, flag;
+    if (m_registrationIni->GetNthSectionName(n, &section) < 0) continue;
+    if (m_registrationIni->ItemExists(section.c_str(), kSchemaVersion) < 0) continue;
+    result = m_registrationIni->GetItem(section.c_str(), kFragmentRegistered, &flag);
+    if (result < 0 || flag.empty() || Number(flag) == 0) continue;
+    result = m_registrationIni->SetItem(section.c_str(), kFragmentRegistered, "0", false);
+    modified = true;
+  }
+  if (!modified) return result;
+  result = SaveChanges();
+  CztHold holdMap(components().lock);
+  for (auto& [identifier, component] : components().map) {
+    _vltComponent2& record = component->record();
+    if (record.type == vltComponentDataDictionary) record.dictionary.fragmentRegistered = 0;
+  }
+  return result;
+}
+
+HRESULT CvltPharlapRegistrar::previousDictionariesFolder(String* folder) {
+  HRESULT result = vlrMakeRootDirectory(kDictionaries, folder);
+  if (result < 0) return result;
+  *folder = path::Join(*folder, String(L"Last"));
+  path::MakePathEndInSlash(*folder);
+  try {
+    return vltMakeSharedDirectory(*folder);
+  } catch (const zt::fnd::exception::AccessDenied&) {
+    return E_FAIL;  // A result of the interface, not an error of the caller's program.
+  }
+}
+
+HRESULT CvltPharlapRegistrar::GetPrevDictsLastFolder(Vector<String>& names) {
+  String folder;
+  HRESULT result = previousDictionariesFolder(&folder);
+  if (result < 0) return result;
+  return vltGetComponentNamesFromDirectory(folder, String(L"framework"), names);
+}
+
+HRESULT CvltPharlapRegistrar::GetPreviousDictionaries(const _vltStartupOptions*,
+                                                      unsigned int* count, wchar_t*** paths) {
+  if (!count || !paths) return S_OK;
+  Vector<String> names;
+  HRESULT result = GetPrevDictsLastFolder(names);
+  if (result < 0) return result;
+  *count = names.size();
+  if (names.size() == 0) return result;
+  auto* texts = static_cast<wchar_t**>(vltTaskMemAlloc(names.size() * sizeof(wchar_t*)));
+  if (!texts) return E_OUTOFMEMORY;
+  for (unsigned i = 0; i < names.size(); ++i) {
+    texts[i] = Dup(names[i].c_str());
+    if (texts[i]) continue;
+    while (i > 0) vltTaskMemFree(texts[--i]);
+    vltTaskMemFree(texts);
+    return E_OUTOFMEMORY;
+  }
+  *paths = texts;
+  return result;
+}
+
+HRESULT CvltPharlapRegistrar::RemovePreviousDictionaries(const _vltStartupOptions* options) {
+  if (HasPortConfiguration(options)) {
+    if (vltGetTraceFlagsImpl() & kEarlyTraceMask) {
+      vltEarlyTrace(kEarlyTraceSource, kPortConfigurationLine,
+                    "Error: Portcfg options specified for pharlap registrar remove previous "
+                    "dictionaries.");
+    }
+    return E_FAIL;
+  }
+  Vector<String> names;
+  HRESULT result = GetPrevDictsLastFolder(names);
+  if (result < 0) return result;
+  auto remove = [&result](const String& file) {
+    try {
+      path::RemoveFile(file);
+    } catch (const zt::fnd::exception::Exception&) {
+      result = E_FAIL;  // The others can still go.
+    }
+  };
+  for (const String& name : names) remove(name);
+  if (result < 0 || names.size() == 0) return result;
+  String folder;
+  result = previousDictionariesFolder(&folder);
+  if (result < 0) return result;
+  remove(folder + L"vlt.vlr");
+  return result;
+}

@@ -1,0 +1,226 @@
+// Single components: how a record reaches the database, how a section becomes a component, and how
+// a client gets a record out.
+#include <string.h>
+
+#include <memory>
+
+#include "source/Common/vltcmn.h"
+#include "source/Pharlap/registrarText.h"
+#include "source/Pharlap/vltPharlapRegistrar.h"
+#include "zt/fnd/osdep/path.h"
+#include "ztcom/ztcore/ztmemmgr.h"
+
+using zt::fnd::osdep::path;
+using namespace registrar;
+using Toolyard::CztHold;
+using zt::fnd::String;
+
+namespace {
+
+constexpr uint32_t kDictionaryVersion = 2;
+constexpr uint32_t kExpertVersion = 3;
+constexpr uint32_t kNoSchemaVersion = 0xFFFFFFFF;
+
+wchar_t* Copy(const wchar_t* text) {
+  wchar_t* copy = nullptr;
+  if (text) vlrDuplicateString(text, &copy);
+  return copy;
+}
+
+wchar_t* Copy(const std::string& text) { return Copy(Widen(text).c_str()); }
+
+void Replace(wchar_t** text, wchar_t* by) {
+  ZtTaskMemFree(*text);
+  *text = by;
+}
+
+}  // namespace
+
+HRESULT CvltPharlapRegistrar::RegisterComponent(_vltComponent2* record) {
+  switch (record->type) {
+    case vltComponentObjectExpert:
+      return RegisterObjectExpert(record);
+    case vltComponentResourceExpert:
+      return RegisterResourceExpert(record);
+    case vltComponentDataDictionary:
+      return RegisterDataDictionary(record);
+    default:
+      return E_FAIL;
+  }
+}
+
+HRESULT CvltPharlapRegistrar::GetComponent(GUID identifier, _vltComponent2* record) {
+  if (!record) return E_POINTER;
+  CztHold hold(components().lock);
+  CvltComponent* component = nullptr;
+  if (InternalGetComponentNoScan(identifier, component) < 0) return E_INVALIDARG;
+  return Duplicate(record, &component->record());
+}
+
+HRESULT CvltPharlapRegistrar::EnumComponents(_vltComponentType type,
+                                             IvltEnumComponent** enumerator) {
+  return enumerator ? CreateEnumerator(type, enumerator) : E_POINTER;
+}
+
+HRESULT CvltPharlapRegistrar::Duplicate(_vltComponent2* target, const _vltComponent2* source) {
+  memcpy(target, source, sizeof *target);
+  // Each text starts from null, so that a failed copy never hands out the registrar's own.
+  target->name = Copy(source->name);
+  target->fileName = Copy(source->fileName);
+  if (source->type == vltComponentDataDictionary) {
+    target->dictionary.auxString1 = Copy(source->dictionary.auxString1);
+    target->dictionary.prefix = Copy(source->dictionary.prefix);
+    target->dictionary.auxString2 = Copy(source->dictionary.auxString2);
+  } else if (source->type == vltComponentResourceExpert) {
+    target->resource.pnp = Copy(source->resource.pnp);
+  }
+  return S_OK;
+}
+
+// ---- Registration
+
+std::string CvltPharlapRegistrar::WriteExpert(const _vltComponent2* record, GuidText guidText) {
+  std::string section = Narrow(record->name);
+  std::string identifier = Narrow(vlrGuidToString(record->identifier));
+  if (guidText == GuidText::WithoutBraces && StripBracesFromGuid(identifier.data()) == S_OK) {
+    identifier.resize(strlen(identifier.c_str()));
+  }
+  // The directory is dropped: the next start puts the expert where experts are.
+  String file(record->fileName ? record->fileName : L"");
+  m_registrationIni->SetItem(kComponents, section.c_str(), section.c_str(), true);
+  m_registrationIni->SetItem(section.c_str(), kIdentifier, identifier.c_str(), true);
+  m_registrationIni->SetItem(section.c_str(), kFileName, Narrow(path::BaseName(file)).c_str(),
+                             true);
+  if (record->type == vltComponentResourceExpert) {
+    m_registrationIni->SetItem(section.c_str(), kPnp, Narrow(record->resource.pnp).c_str(), true);
+  }
+  return section;
+}
+
+HRESULT CvltPharlapRegistrar::SaveExpert(const _vltComponent2* record) {
+  HRESULT result = SaveChanges();
+  CztHold hold(components().lock);
+  CvltComponent* component = nullptr;
+  if (InternalGetComponentNoScan(record->identifier, component) < 0) return result;
+  _vltComponent2& known = component->record();
+  Replace(&known.name, Copy(record->name));
+  Replace(&known.fileName,
+          Copy(path::BaseName(String(record->fileName ? record->fileName : L"")).c_str()));
+  if (record->type == vltComponentResourceExpert && known.type == vltComponentResourceExpert) {
+    Replace(&known.resource.pnp, Copy(record->resource.pnp));
+  }
+  return result;
+}
+
+HRESULT CvltPharlapRegistrar::RegisterObjectExpert(_vltComponent2* record) {
+  std::lock_guard hold(m_iniLock);
+  if (!m_registrationIni) return E_FAIL;
+  WriteExpert(record, GuidText::WithoutBraces);
+  return SaveExpert(record);
+}
+
+HRESULT CvltPharlapRegistrar::RegisterResourceExpert(_vltComponent2* record) {
+  return RegisterObjectExpert(record);  // The type in the record makes the difference.
+}
+
+// ---- Reading
+
+void CvltPharlapRegistrar::readDictionary(const std::string& section, _vltComponent2* record) {
+  auto read = [&](const char* item, std::string* value) {
+    value->clear();
+    return m_registrationIni->GetItem(section.c_str(), item, value) >= 0;
+  };
+  auto number = [&](const char* item, uint32_t fallback) {
+    std::string value;
+    return read(item, &value) && !value.empty() ? Number(value) : fallback;
+  };
+  std::string value;
+  record->version = kDictionaryVersion;
+  record->type = vltComponentDataDictionary;
+  if (read(kFileName, &value)) record->fileName = Copy(value);
+  if (read(kPrefix, &value)) record->dictionary.prefix = Copy(value);
+  record->dictionary.schemaVersion = number(kSchemaVersion, 0);
+  record->dictionary.fragmentRegistered = number(kFragmentRegistered, 0);
+  record->dictionary.lastInstalledSchemaVersion =
+      number(kLastInstalledSchemaVersion, kNoSchemaVersion);
+}
+
+// True if the database was changed and has to be saved.
+bool CvltPharlapRegistrar::readExpert(const std::string& section, EmptyFileName emptyFileName,
+                                      _vltComponent2* record) {
+  bool isResourceExpert = record->type == vltComponentResourceExpert;
+  bool changed = false;
+  std::string file, pnp;
+  bool hasFile = m_registrationIni->GetItem(section.c_str(), kFileName, &file) >= 0;
+  if (isResourceExpert && file.empty() && emptyFileName == EmptyFileName::IsNone) hasFile = false;
+  if (hasFile) {
+    if (file.find_first_of("\\/") == std::string::npos) {
+      String experts;
+      vlrMakeRootDirectory(kExperts, &experts);
+      file = Narrow(experts) + file;
+      m_registrationIni->SetItem(section.c_str(), kFileName, file.c_str(), true);
+      changed = true;
+    }
+    record->fileName = Copy(file);
+  }
+  if (isResourceExpert && m_registrationIni->GetItem(section.c_str(), kPnp, &pnp) >= 0) {
+    record->resource.pnp = Copy(pnp);
+  }
+  return changed;
+}
+
+HRESULT CvltPharlapRegistrar::ReadComponent(const wchar_t* section) {
+  return ReadSection(section, EmptyFileName::Counts);
+}
+
+HRESULT CvltPharlapRegistrar::ReadSection(const wchar_t* wideSection, EmptyFileName emptyFileName) {
+  std::string section = Narrow(wideSection);
+  auto component = std::make_unique<CvltComponent>();
+  _vltComponent2& record = component->record();
+  // The stamp is that of the object: clients tell by it that the record came from here.
+  record.size = sizeof(CvltComponent);
+  record.name = Copy(wideSection);
+  std::string identifier;
+  if (m_registrationIni->GetItem(section.c_str(), kIdentifier, &identifier) >= 0 &&
+      !identifier.empty()) {
+    record.identifier = vlrGuidFromString(Widen(identifier));
+  }
+  if (m_registrationIni->ItemExists(section.c_str(), kSchemaVersion) >= 0) {
+    readDictionary(section, &record);
+    return AddComponent(component.release());
+  }
+  bool isResourceExpert = m_registrationIni->ItemExists(section.c_str(), kPnp) >= 0;
+  record.version = kExpertVersion;
+  record.type = isResourceExpert ? vltComponentResourceExpert : vltComponentObjectExpert;
+  bool changed = readExpert(section, emptyFileName, &record);
+  HRESULT result = PopulateBindingClasses(&record);
+  if (result < 0) result = S_OK;  // An expert without binding classes is an expert.
+  AddComponent(component.release());
+  if (!changed) return result;
+  HRESULT saved = SaveChanges();
+  return saved < 0 ? saved : result;
+}
+
+// ---- Binding classes
+
+void CvltPharlapRegistrar::AddBindingClasses(const _vltComponent2* record,
+                                             const CvltBindingClasses& classes) {
+  if (record->type == vltComponentResourceExpert) {
+    vltAddBindingClasses(record, classes, &m_resourceExpertBindings);
+  } else if (record->type == vltComponentObjectExpert) {
+    vltAddBindingClasses(record, classes, &m_objectExpertBindings);
+  }
+}
+
+HRESULT CvltPharlapRegistrar::GetComponentsForBindingClass(_vltComponentType type,
+                                                           GUID bindingClass, unsigned int* count,
+                                                           GUID** components) {
+  if (!components || !count) return E_POINTER;
+  *count = 0;
+  *components = nullptr;
+  BindingClassesMap* map = nullptr;
+  if (type == vltComponentResourceExpert) map = &m_resourceExpertBindings;
+  if (type == vltComponentObjectExpert) map = &m_objectExpertBindings;
+  if (!map) return VLT_E_NO_BINDING_CLASSES;
+  return vltGetComponentsForBindingClass(bindingClass, count, map, components);
+}

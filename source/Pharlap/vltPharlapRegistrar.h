@@ -1,0 +1,164 @@
+#pragma once
+
+#include <map>
+#include <memory>
+#include <mutex>
+#include <set>
+#include <string>
+
+#include "source/Common/Posix/vltlinuxos.h"
+#include "source/Common/vltBindingClasses.h"
+#include "source/vlIniMgr.h"
+#include "source/vltRegistrar.h"
+#include "zt/fnd/AbsTime.h"
+
+// Keeps the components in one guarded INI file, the registration database, and in memory.
+//
+// Init opens the database, brings it up to date with the registration files of the installation,
+// and reads every component into the map. After that no registration file is looked at again: Scan
+// does nothing. The database's lock is held until the destructor, so a second process that wants a
+// registrar waits for the first one's end.
+//
+// Each changed registration file is saved on its own, so that a start that is killed has done what
+// it has done. The scan does not wait for the medium: all of it can be had again from the
+// registration files; one wait stands at the end. Saves that a client asks for are durable each.
+//
+// Threads: any after Init. m_iniLock orders the operations that use the database, and is taken
+// before the map's lock.
+class CvltPharlapRegistrar : public CvltRegistrar,
+                             public IvltPharlapRegistrarEx,
+                             public IvltDynamicRegistrar,
+                             public IvltDowngradeRegistrar {
+ public:
+  using RegistrationFiles = zt::fnd::Vector<std::pair<zt::fnd::String, zt::fnd::AbsTime>>;
+
+  // `init` calls Init, with this class's operations. Subclasses pass false and call it themselves.
+  CvltPharlapRegistrar(const zt::fnd::String& registrationFilePath,
+                       const zt::fnd::String& installDirectory, bool init);
+
+  HRESULT QueryInterface(const GUID& iid, void** out) override;
+  uint32_t AddRef() override { return CvltRegistrar::AddRef(); }
+  uint32_t Release() override { return CvltRegistrar::Release(); }
+
+  // Path of the configuration; kKorDefaultDirectory + "/Data/config3.vlt" if none is set. A stored
+  // bare "config3.vlt" lies in the data directory; without that directory the text comes with
+  // E_FAIL.
+  HRESULT GetConfigurationPath(wchar_t** path) override;
+  HRESULT SetConfigurationPath(const wchar_t* path) override;
+  HRESULT GetSDKPath(wchar_t**) override { return E_FAIL; }
+  HRESULT SetSDKPath(const wchar_t*) override { return E_FAIL; }
+  HRESULT GetSchemaVersion(unsigned int* version) override;
+  HRESULT SetSchemaVersion(unsigned int version) override;
+  HRESULT RegisterComponent(_vltComponent2* component) override;
+  HRESULT UnregisterComponent(GUID) override { return E_FAIL; }
+  HRESULT GetComponent(GUID identifier, _vltComponent2* component) override;
+  HRESULT EnumComponents(_vltComponentType type, IvltEnumComponent** enumerator) override;
+  HRESULT GetStorageServerCacheSize(unsigned int* sizeBytes) override;
+  HRESULT SetStorageServerCacheSize(unsigned int sizeBytes) override;
+  HRESULT GetStorageClientCacheSize(unsigned int*) override { return E_FAIL; }
+  HRESULT SetStorageClientCacheSize(unsigned int) override { return E_FAIL; }
+  HRESULT GetSnapshotPath(wchar_t**) override { return E_FAIL; }
+  HRESULT SetSnapshotPath(const wchar_t*) override { return E_FAIL; }
+
+  ~CvltPharlapRegistrar() override;
+  HRESULT Scan() override { return S_OK; }
+
+  // ---- Behind Scan, in the order of the dispatch table.
+  HRESULT ResetDDUpdatedFlags() override;
+  HRESULT GetComponentsForBindingClass(_vltComponentType type, GUID bindingClass,
+                                       unsigned int* count, GUID** components) override;
+  HRESULT GetPreviousDictionaries(const _vltStartupOptions* options, unsigned int* count,
+                                  wchar_t*** paths) override;
+  HRESULT RemovePreviousDictionaries(const _vltStartupOptions* options) override;
+  // Copies a record with texts of its own; failed texts are null. 0.
+  virtual HRESULT Duplicate(_vltComponent2* target, const _vltComponent2* source);
+  // Writes the record's section, saves, and brings the copy in memory up to date, if there is one.
+  virtual HRESULT RegisterDataDictionary(_vltComponent2* record);
+  // Registration files of the bundles, dictionaries first, with the times of their last change.
+  virtual HRESULT FindRegistrationFiles(RegistrationFiles& files);
+  // Copies every section of the file into the database; does not save.
+  virtual HRESULT MergeRegistrationFile(const zt::fnd::String& installDirectory, const char* file);
+  virtual HRESULT UpdateRegistrationFile();
+  // `changed` becomes true for every section of a dictionary, and false for the others.
+  virtual HRESULT HasDDChanged(CvlIniMgr& fragment, const wchar_t* section, bool& changed);
+  // Drops the components whose registration file is gone; does not save.
+  virtual HRESULT RemoveDeletedComponents();
+  virtual void RemoveComponentsIfFileDoesNotExist(char* section, char* file,
+                                                  zt::fnd::Vector<zt::fnd::String>& eraseList,
+                                                  int first, int last);
+  // Full paths of the dictionaries in "Data Dictionaries/Last": 0, or 1 if there are none.
+  virtual HRESULT GetPrevDictsLastFolder(zt::fnd::Vector<zt::fnd::String>& names);
+  virtual HRESULT RegisterResourceExpert(_vltComponent2* record);
+  virtual HRESULT RegisterObjectExpert(_vltComponent2* record);
+  // Makes a component of a section of the database and puts it into the map.
+  virtual HRESULT ReadComponent(const wchar_t* section);
+  virtual HRESULT PopulateBindingClasses(_vltComponent2*) { return S_OK; }
+
+  // Cuts the braces of a 38-character GUID text: 0; 1 for another length, E_FAIL for 38 characters
+  // without both braces, the text then untouched; E_POINTER.
+  static HRESULT StripBracesFromGuid(char* text);
+  static HRESULT StripBracesFromGuid(wchar_t* text);
+
+ protected:
+  // Whether an item that is there, but empty, counts as the file name of a resource expert.
+  enum class EmptyFileName { Counts, IsNone };
+  // What the sections of experts have in their database form.
+  enum class GuidText { WithoutBraces, WithBraces };
+
+  // Opens the database and fills the map. A database that cannot be used leaves both empty; what
+  // the file system refuses, and what the second opening throws, passes.
+  void Init();
+  HRESULT ReadSection(const wchar_t* section, EmptyFileName emptyFileName);
+  // The items that every expert has; answers the section's name.
+  std::string WriteExpert(const _vltComponent2* record, GuidText guidText);
+  HRESULT SaveExpert(const _vltComponent2* record);
+  void AddBindingClasses(const _vltComponent2* record, const CvltBindingClasses& classes);
+  HRESULT SaveChanges();
+  bool isOpen() const { return m_registrationIni != nullptr; }
+  CvlIniMgr& database() { return *m_registrationIni; }
+
+  // By exact comparison of the file's path, unlike the String's own.
+  struct ExactLess {
+    bool operator()(const zt::fnd::String& a, const zt::fnd::String& b) const {
+      return a.exactCompare(b) < 0;
+    }
+  };
+  std::map<zt::fnd::String, std::unique_ptr<CvltBindingClasses>, ExactLess> m_bindingClassesByFile;
+  // Texts of the database as it is on the disk.
+  vltStringResources m_resources;
+  std::recursive_mutex m_iniLock;
+
+ private:
+  HRESULT OpenIniWithValidation();
+  HRESULT DeleteIniFile();
+  HRESULT GetChecksumForCacheFile(unsigned char** digest);
+  HRESULT SetChecksumForCacheFile(const unsigned char* digest);
+  bool ChecksumFileExists();
+  HRESULT ProcessFileName(bool isDictionary, const zt::fnd::String& installDirectory,
+                          std::string& file);
+
+  void initSettings();
+  void registerBuiltInDictionary();
+  void readComponents();
+  HRESULT dataDirectory(zt::fnd::String* directory);
+  bool isRegistered(const std::string& file, uint32_t low, uint32_t high);
+  void eraseComponentsOf(const std::string& file);
+  void mergeItem(CvlIniMgr& fragment, const zt::fnd::String& installDirectory, const char* file,
+                 const std::string& section, const std::string& item, HRESULT* result);
+  HRESULT previousDictionariesFolder(zt::fnd::String* folder);
+  void readDictionary(const std::string& section, _vltComponent2* record);
+  bool readExpert(const std::string& section, EmptyFileName emptyFileName, _vltComponent2* record);
+  std::string sidecarName() const;
+
+  BindingClassesMap m_resourceExpertBindings;
+  BindingClassesMap m_objectExpertBindings;
+  zt::fnd::String m_installDirectory;
+  zt::fnd::String m_registrationFilePath;
+  std::unique_ptr<CvlIniMgr> m_registrationIni;
+  bool m_durable = true;
+  bool m_saved = false;
+  // Whether the last registration file could be opened at all.
+  bool m_lastMergeOpened = false;
+  // Registration files that FindRegistrationFiles has seen: asked for once a start is enough.
+  std::set<std::string> m_filesSeen;
+};

@@ -1,0 +1,80 @@
+#include "source/Posix/vltLinuxRegistrar.h"
+
+#include "source/Common/vltcmn.h"
+#include "source/Pharlap/registrarText.h"
+#include "zt/fnd/Exception.h"
+
+using namespace registrar;
+using zt::fnd::String;
+using zt::fnd::Vector;
+
+namespace {
+
+constexpr unsigned kLongestResource = 1024;
+
+}  // namespace
+
+CvltLinuxRegistrar::CvltLinuxRegistrar(const String& registrationFilePath,
+                                       const String& installDirectory)
+    : CvltPharlapRegistrar(registrationFilePath, installDirectory, false) {
+  Init();  // Here, where virtual calls already reach this class.
+}
+
+HRESULT CvltLinuxRegistrar::ReadComponent(const wchar_t* section) {
+  return ReadSection(section, EmptyFileName::IsNone);
+}
+
+void CvltLinuxRegistrar::writeBindingClasses(const std::string& section,
+                                             const _vltComponent2* record) {
+  auto found = m_bindingClassesByFile.find(String(record->fileName ? record->fileName : L""));
+  if (found == m_bindingClassesByFile.end()) return;
+  Vector<GUID> components = found->second->GetComponentVector();
+  for (unsigned k = 0; k < components.size(); ++k) {
+    if (!(components[k] == record->identifier)) continue;
+    Vector<GUID> classes;
+    found->second->GetBindingClassesForComponent(record->identifier, classes);
+    std::string text = Narrow(vlrGuidToString(record->identifier));
+    text += ":" + std::to_string(classes.size());
+    for (unsigned n = 0; n < classes.size(); ++n) {
+      // By the component's index: files in the field hold entries written so.
+      if (k >= classes.size()) ZT_RAISE(zt::fnd::exception::OutOfRange());
+      text += ":" + Narrow(vlrGuidToString(classes[k]));
+    }
+    database().SetItem(section.c_str(), kBindingClasses, text.c_str(), true);
+  }
+}
+
+HRESULT CvltLinuxRegistrar::RegisterObjectExpert(_vltComponent2* record) {
+  std::lock_guard hold(m_iniLock);
+  if (!isOpen()) return E_FAIL;
+  std::string section = WriteExpert(record, GuidText::WithBraces);
+  writeBindingClasses(section, record);
+  return SaveExpert(record);
+}
+
+HRESULT CvltLinuxRegistrar::RegisterResourceExpert(_vltComponent2* record) {
+  return RegisterObjectExpert(record);  // The type in the record makes the difference.
+}
+
+void CvltLinuxRegistrar::addIfOwn(const _vltComponent2* record, const CvltBindingClasses& classes) {
+  for (const GUID& component : classes.GetComponentVector()) {
+    if (component == record->identifier) AddBindingClasses(record, classes);
+  }
+}
+
+HRESULT CvltLinuxRegistrar::PopulateBindingClasses(_vltComponent2* record) {
+  String file(record->fileName ? record->fileName : L"");
+  auto found = m_bindingClassesByFile.find(file);
+  if (found != m_bindingClassesByFile.end()) {
+    addIfOwn(record, *found->second);
+    return S_OK;
+  }
+  TaskMem<char> text;
+  HRESULT result =
+      m_resources.get(":", file.c_str(), L"BINDING_CLASSES", text.out(), kLongestResource);
+  if (result < 0 || !text || !*text.get()) return E_FAIL;
+  auto& classes = m_bindingClassesByFile[file];
+  classes = std::make_unique<CvltBindingClasses>(String(text.get()));
+  addIfOwn(record, *classes);
+  return result;
+}

@@ -1,0 +1,168 @@
+// How a client reaches the one registrar of the process.
+#include "source/Utilities/vltRegistrarEntry.h"
+
+#include <mutex>
+#include <new>
+#include <string>
+
+#include "source/Common/vltFailure.h"
+#include "source/Posix/vltLinuxRegistrar.h"
+#include "source/Utilities/vltHookPoints.h"
+#include "source/Utilities/vltTestHook.h"
+#include "source/Utilities/vltutils.h"
+#include "vlloader/source/vlloader.h"
+#include "zt/fnd/osdep/CriticalSection.h"
+#include "zt/fnd/osdep/SharedLibrary.h"
+#include "zt/fnd/osdep/path.h"
+#include "ztcom/ztcore/ztcom.h"
+
+using zt::fnd::String;
+
+namespace {
+
+// Made on first use and never destroyed, like the registrar itself: other libraries ask for it from
+// their exit handlers.
+zt::fnd::osdep::CriticalSection& RegistrarGuard() {
+  static auto* g_RegistrarGuard = new zt::fnd::osdep::CriticalSection;
+  return *g_RegistrarGuard;
+}
+
+// The process-wide registrar, and the lock of its creation: two first calls would otherwise make
+// two, and the second would wait for the first one's database for ever. Recursive, so that a call
+// from inside the creation can be told apart from one of another thread.
+struct Creation {
+  std::recursive_mutex lock;
+  bool inProgress = false;
+  IvltRegistrar* s_LinuxRegistrar = nullptr;  // with one reference that is never released
+};
+
+Creation& TheCreation() {
+  static auto* creation = new Creation;
+  return *creation;
+}
+
+class InProgress {
+ public:
+  explicit InProgress(Creation& creation) : m_creation(creation) { m_creation.inProgress = true; }
+  ~InProgress() { m_creation.inProgress = false; }
+  InProgress(const InProgress&) = delete;
+  InProgress& operator=(const InProgress&) = delete;
+
+ private:
+  Creation& m_creation;
+};
+
+bool LookUp(const char* failure, std::string* directory) {
+  try {
+    *directory = vlLookUpInstallDirectory();
+    return true;
+  } catch (const std::bad_alloc&) {
+    vltTraceError("%s", failure);  // The caller has a result for this, and nothing was begun yet.
+    return false;
+  }
+}
+
+constexpr const char* kGetRegistrar2Signature =
+    "HRESULT vltGetRegistrar2(const TCHAR*, const TCHAR*, IvltRegistrar**)";
+
+}  // namespace
+
+void vlPrepareRegistrarEntry() {
+  RegistrarGuard();
+  TheCreation();
+}
+
+HRESULT vltGetRegistrar(IvltRegistrar** out) {
+  zt::fnd::osdep::CriticalSectionGuard hold(RegistrarGuard());
+  std::string installDirectory, dataDirectory;
+  if (!LookUp("Could not get the VLT install path in vltGetRegistrar", &installDirectory) ||
+      !LookUp("Could not get the VLT data path in vltGetRegistrar", &dataDirectory)) {
+    return E_FAIL;
+  }
+  String file(dataDirectory.c_str());
+  zt::fnd::osdep::path::MakePathEndInSlash(file);
+  file += L"vlt.vlr";
+  return vltGetRegistrar2(file.c_str(), String(installDirectory.c_str()).c_str(), out);
+}
+
+HRESULT vltGetRegistrar2(const wchar_t* registrationFile, const wchar_t* installDir,
+                         IvltRegistrar** out) {
+  if (!registrationFile) return vltGetRegistrar(out);
+  if (!out) return E_POINTER;
+  *out = nullptr;
+  Creation& creation = TheCreation();
+  std::lock_guard hold(creation.lock);
+  if (creation.inProgress) return E_FAIL;
+  if (!creation.s_LinuxRegistrar) {
+    CvltLinuxRegistrar* created = nullptr;
+    if (!vltTestHook(vlt::hook::kGetRegistrar2)) {
+      InProgress inProgress(creation);
+      created = new (std::nothrow)
+          CvltLinuxRegistrar(String(registrationFile), String(installDir ? installDir : L""));
+    }
+    if (!created) return vltReportOutOfMemory(kGetRegistrar2Signature);
+    created->QueryInterface(IID_IvltRegistrar,
+                            reinterpret_cast<void**>(&creation.s_LinuxRegistrar));
+  }
+  *out = ZtAddRef(creation.s_LinuxRegistrar);
+  return S_OK;
+}
+
+HRESULT vltLoadDataDictionaries() {
+  CztComPtr<IvltRegistrar> registrar;
+  HRESULT result = vltGetRegistrar(registrar.out());
+  if (result < 0) {
+    vltTraceError("failed to get registrar");
+    return result;
+  }
+  return vltLoadDataDictionaries2(registrar.get());
+}
+
+namespace {
+
+void TryToLoad(const wchar_t* fileName) {
+  if (!fileName) {
+    vltTraceError("invalid dictionary registration, missing file path");
+    return;
+  }
+  zt::fnd::osdep::SharedLibrary library(String(fileName), true, true);
+  if (!library.isLoaded()) {
+    vltTraceError("failed to load dictionary \"%s\"", zt::fnd::AnsiString(fileName).c_str());
+  }
+}
+
+// Frees the texts of a dictionary's record at the end of a scope.
+struct DictionaryRecord : _vltComponent2 {
+  DictionaryRecord() : _vltComponent2() {}
+  ~DictionaryRecord() {
+    for (wchar_t* text :
+         {dictionary.auxString1, dictionary.prefix, dictionary.auxString2, name, fileName}) {
+      vltFree(text);
+    }
+  }
+  DictionaryRecord(const DictionaryRecord&) = delete;
+  DictionaryRecord& operator=(const DictionaryRecord&) = delete;
+};
+
+}  // namespace
+
+HRESULT vltLoadDataDictionaries2(IvltRegistrar* registrar) {
+  if (!registrar) return E_POINTER;
+  CztComPtr<IvltEnumComponent> enumerator;
+  HRESULT result = registrar->EnumComponents(vltComponentDataDictionary, enumerator.out());
+  if (result < 0) return result;
+  for (;;) {
+    DictionaryRecord record;
+    unsigned int fetched = 0;
+    if (enumerator->Next(1, &record, &fetched) != S_OK) return result;
+    TryToLoad(record.fileName);
+  }
+}
+
+HRESULT vltGetRegistrarDynamically(IvltRegistrar** out) {
+  zt::fnd::osdep::SharedLibrary library(String(L"vltutils"), false, true);
+  if (!library.isLoaded()) return E_FAIL;
+  auto entry = reinterpret_cast<HRESULT (*)(IvltRegistrar**)>(
+      library.getFunctionPointer(zt::fnd::AnsiString("vltGetRegistrar"), true));
+  return entry ? entry(out) : E_FAIL;
+}

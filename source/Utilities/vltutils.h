@@ -1,0 +1,110 @@
+#pragma once
+
+// The exported surface of libvltutils.
+//
+// Rules for every function here:
+// 1. Results. HRESULTs are negative on failure; test the sign. Functions that return a value have
+// no
+//    failure of their own: bad text reads as 0 or as the null GUID.
+// 2. Ownership. A text or array that a call hands out comes from vltAlloc and is ended with
+// vltFree.
+//    A record's texts are ended with vltutilsFreeComponent2, an interface with Release.
+//    `const wchar_t*` results are static and never freed.
+// 3. Null. A required null pointer gives E_POINTER and changes nothing, unless told otherwise.
+// 4. Text. Wide text is UTF-32 in the host's byte order, narrow text is in the encoding of the
+//    process's locale (setlocale); what that encoding lacks becomes "?".
+// 5. Exceptions. Nothing is caught at the surface: failures below it that have no result code of
+//    their own pass out as zt::fnd::exception::Exception (zt/fnd/Exception.h) or std::bad_alloc. A
+//    call that ends so has released its locks.
+// 6. Threads. Every function may be called from every thread, unless told otherwise.
+// 7. Waiting. Calls that open a shared file wait, without limit, for other processes that have it.
+
+#include "source/Utilities/vltInterfaces.h"
+#include "source/Utilities/vltTypes.h"
+#include "zt/fnd/StringFwd.h"
+
+#define VLT_EXPORT extern "C" __attribute__((visibility("default")))
+
+// ---- Memory.
+
+// Block of `size` bytes; null when there is none, or for 0x80000000 bytes and more.
+VLT_EXPORT void* vltAlloc(size_t size);
+VLT_EXPORT void vltFree(void* p);  // null is ignored
+// Frees the texts of a record, not the record; does not null them. Returns 0.
+VLT_EXPORT int vltutilsFreeComponent2(_vltComponent2& c);
+
+// ---- Registrar.
+
+// The one registrar of the process, made at the first call: that one scans the installation under
+// the "Dir" preference and brings the database "vlt.vlr" up to date, and waits while another
+// process has its registrar. Later calls answer at once.
+VLT_EXPORT HRESULT vltGetRegistrar(IvltRegistrar** out);
+// The same with the database and the install directory named; both are ignored once the registrar
+// exists. A null registrationFile makes it vltGetRegistrar.
+VLT_EXPORT HRESULT vltGetRegistrar2(const wchar_t* registrationFile, const wchar_t* installDir,
+                                    IvltRegistrar** out);
+VLT_EXPORT HRESULT vltGetOldRegistrar(void** out);  // nulls *out; E_NOTIMPL
+// Tries to load the library of every registered dictionary and traces what does not load, which is
+// no failure of the call.
+VLT_EXPORT HRESULT vltLoadDataDictionaries();
+VLT_EXPORT HRESULT vltLoadDataDictionaries2(IvltRegistrar* registrar);
+
+// ---- Resources and files.
+
+// Text under `key` of the components in the database whose file has the base name of `file`. With a
+// separator the texts of all of them, joined; without, the first one's. At most maxLength bytes
+// with the terminator. E_FAIL, and *out untouched, when there is none.
+VLT_EXPORT HRESULT vltGetStringResource(const char* separator, const wchar_t* file,
+                                        const wchar_t* key, char** out, unsigned maxLength);
+VLT_EXPORT int vltGetBinaryResource();  // 0
+// chmod, to the mode bits given, that does not follow a symbolic link; with `recursive` also of
+// what a directory holds, up to the first failure. S_OK or E_FAIL.
+VLT_EXPORT HRESULT vltSetFileSecurity(const zt::fnd::String& path, int mode, bool recursive);
+// Flags of "vlttrace.txt" in the install directory, read once: (second number << 4) | first.
+VLT_EXPORT unsigned vltGetTraceFlags();
+
+// ---- Text case. In place; 0, or 1 for null or empty. Characters above 255 stay.
+VLT_EXPORT int vltStrupr(char* s);
+VLT_EXPORT int vltWcsupr(wchar_t* s);
+
+// ---- Scalars and GUIDs as text.
+VLT_EXPORT wchar_t* vltU32ToString(unsigned v);
+VLT_EXPORT unsigned vltU32FromString(const wchar_t* s);
+// Prints a negative number as such in the 32-bit library only; the 64-bit one prints it plus 2^32.
+VLT_EXPORT wchar_t* vltI32ToString(int v);
+VLT_EXPORT int vltI32FromString(const wchar_t* s);
+VLT_EXPORT wchar_t* vltF64ToString(double v);  // 15 significant digits
+VLT_EXPORT double vltF64FromString(const wchar_t* s);
+VLT_EXPORT const wchar_t* vltBoolToString(int v);    // "True" or "False"
+VLT_EXPORT int vltBoolFromString(const wchar_t* s);  // 1 for true, t, yes, y in any case
+VLT_EXPORT HRESULT vltCreateGuid(GUID* out);
+// Field by field, as unsigned numbers: -1, 0 or 1.
+VLT_EXPORT int vltDceGuidCompare(const GUID& a, const GUID& b);
+VLT_EXPORT GUID vltGuidFromString(const wchar_t* s);  // with or without braces
+VLT_EXPORT wchar_t* vltGuidToString(GUID g);        // {38 characters}, upper case; null: no memory
+VLT_EXPORT wchar_t* vltGuidToStructString(GUID g);  // a C initialiser
+
+// ---- Type vocabulary.
+VLT_EXPORT _vltAttributeStorage vltAttributeStorageFromString(const wchar_t* s);
+VLT_EXPORT const wchar_t* vltAttributeStorageToString(_vltAttributeStorage s);
+VLT_EXPORT _vltAttributeType vltAttributeTypeFromString(const wchar_t* s);
+VLT_EXPORT const wchar_t* vltAttributeTypeToString(_vltAttributeType t);   // "i32_array"
+VLT_EXPORT const wchar_t* vltAttributeTypeToString2(_vltAttributeType t);  // "vltI32ArrayType"
+VLT_EXPORT _vltClient vltClientFromString(const wchar_t* s);
+VLT_EXPORT const wchar_t* vltClientToString(_vltClient c);
+VLT_EXPORT const wchar_t* vltAttributeTypeToVltTypeString(_vltAttributeType t);
+VLT_EXPORT const wchar_t* vltAttributeTypeToLumTypeString(_vltAttributeType t);
+VLT_EXPORT const wchar_t* vltAttributeTypeToLumTypeName(_vltAttributeType t);
+VLT_EXPORT const wchar_t* vltAttributeTypeToLumDataTypeString(_vltAttributeType t);
+VLT_EXPORT unsigned short vltAttributeTypeToExternalLumDataType(_vltAttributeType t);
+VLT_EXPORT unsigned short vltAttributeTypeToInternalLumDataType(_vltAttributeType t);
+VLT_EXPORT unsigned vltAttributeIDExternalToInternal(unsigned id);
+VLT_EXPORT unsigned vltAttributeIDInternalToExternal(unsigned id);
+VLT_EXPORT unsigned vltMakeExternalAttributeID(unsigned id, _vltAttributeType t);
+VLT_EXPORT unsigned vltMakeInternalAttributeID(unsigned id, _vltAttributeType t);
+VLT_EXPORT int vltIsLumBlob(unsigned tag);                           // 1 for the two blob tags
+VLT_EXPORT unsigned vltLumMakeTypedTag(unsigned type, unsigned id);  // low halves, type on top
+
+// ---- Fixed answers.
+VLT_EXPORT int vltUseZTRPC();    // 1
+VLT_EXPORT int vltStandAlone();  // 1

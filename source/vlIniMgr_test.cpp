@@ -1,0 +1,549 @@
+#include "source/vlIniMgr.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <thread>
+
+#include "source/Common/vltFileSecurity.h"
+#include "source/IniSidecar.h"
+#include "tests/support/Child.h"
+#include "tests/support/Installation.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/Exception.h"
+
+namespace {
+
+using namespace vlt::test;
+
+std::string BadName(const std::string& file) {
+  return file + zt::fnd::AnsiString(vlrGetCurrentLocalTime()).c_str() + ".bad";
+}
+
+std::string Value(const CvlIniMgr& ini, const char* section, const char* item) {
+  std::string value;
+  return ini.GetItem(section, item, &value) == S_OK ? value : "(none)";
+}
+
+// 0 when the constructor goes through, else the integer that it throws.
+int Open(const std::string& file, const std::string& digest = "") {
+  try {
+    auto* expected = reinterpret_cast<const unsigned char*>(digest.data());
+    CvlIniMgr ini(file.c_str(), false, digest.empty() ? nullptr : expected, false, true);
+    return 0;
+  } catch (int thrown) {
+    return thrown;
+  }
+}
+
+std::string Unhex(const std::string& hex) {
+  std::string bytes;
+  for (size_t i = 0; i < hex.size(); i += 2) {
+    bytes += static_cast<char>(std::stoi(hex.substr(i, 2), nullptr, 16));
+  }
+  return bytes;
+}
+
+TEST(IniManager, NewFileIsMadeWithItsDirectoryAndModes) {
+  TempDir dir;
+  std::string file = dir / "a/b/x.ini";
+  ScopedUmask strict(077);
+  {
+    CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+    EXPECT_EQ(ReadBytes(file), "");
+    EXPECT_EQ(ModeOf(file), 0777);
+    EXPECT_EQ(ModeOf(dir / "a/b"), 0777);
+    EXPECT_EQ(ini.Write(), S_OK);  // dirty, and empty
+  }
+  EXPECT_EQ(ReadBytes(file), "");
+  EXPECT_EQ(ModeOf(file), 0777);
+}
+
+TEST(IniManager, AnEmptyFileIsCleanAndNotWritten) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "");
+  struct stat before, after;
+  {
+    CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+    ASSERT_EQ(stat(file.c_str(), &before), 0);
+    EXPECT_EQ(ini.Write(), S_OK);
+    ASSERT_EQ(stat(file.c_str(), &after), 0);
+    EXPECT_EQ(before.st_ino, after.st_ino);  // A write would have renamed another file over it.
+  }
+  EXPECT_EQ(ModeOf(file), 0777);
+}
+
+TEST(IniManager, AnEmptyFileMatchesTheDigestOfNothing) {
+  TempDir dir;
+  WriteBytes(dir / "x.ini", "");
+  EXPECT_EQ(Open(dir / "x.ini", Unhex("d41d8cd98f00b204e9800998ecf8427e")), 0);
+}
+
+TEST(IniManager, ADifferingDigestThrowsAndSetsNothingAside) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "[a]\nb = 1\n");
+  WriteBytes(dir / "x.vl5", std::string(16, 'q'));
+  EXPECT_EQ(Open(file, std::string(16, 'q')), 1);
+  EXPECT_EQ(ReadBytes(file), "[a]\nb = 1\n");
+  EXPECT_TRUE(Exists(dir / "x.vl5"));
+  EXPECT_FALSE(Exists(BadName(file)));
+  EXPECT_EQ(Open(file), 0);  // The lock is free again.
+}
+
+TEST(IniManager, AnUnparsableFileIsSetAsideWithItsSidecar) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, std::string("\xFF\xFE[\0a\0]\0", 8));
+  WriteBytes(dir / "x.vl5", std::string(16, 'q'));
+  WriteBytes(BadName(file), "an earlier one of the day");
+  EXPECT_EQ(Open(file), 1);
+  EXPECT_FALSE(Exists(file));
+  EXPECT_FALSE(Exists(dir / "x.vl5"));
+  EXPECT_EQ(ReadBytes(BadName(file)).substr(0, 2), "\xFF\xFE");
+  EXPECT_EQ(Open(file), 0);
+}
+
+TEST(IniManager, APipeOrADeviceInTheFilesPlaceIsLeftAlone) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  ASSERT_EQ(mkfifo(file.c_str(), 0640), 0);
+  EXPECT_EQ(Open(file), 1);
+  EXPECT_EQ(ModeOf(file), 0640);
+}
+
+TEST(IniManager, ADirectoryInTheFilesPlaceThrows) {
+  TempDir dir;
+  dir.makeDir("x.ini");
+  EXPECT_EQ(Open(dir / "x.ini"), 1);
+  EXPECT_TRUE(Exists(dir / "x.ini"));
+}
+
+TEST(IniManager, AFileThatCannotBeOpenedStays) {
+  if (geteuid() == 0) {
+    // The superuser opens everything; a path through a file fails for everybody.
+    TempDir dir;
+    WriteBytes(dir / "file", "x");
+    EXPECT_EQ(Open(dir / "file/x.ini"), 1);
+    EXPECT_EQ(ReadBytes(dir / "file"), "x");
+    return;
+  }
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "[a]\nb = 1\n");
+  ASSERT_EQ(chmod(file.c_str(), 0), 0);
+  EXPECT_EQ(Open(file), 1);
+  EXPECT_FALSE(Exists(BadName(file)));
+}
+
+TEST(IniManager, RunningOutOfDescriptorsLosesNothing) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "[a]\nb = 1\n");
+  Child child([&] {
+    // The lock file takes the last one.
+    std::vector<int> fds;
+    for (int fd; (fd = open("/dev/null", O_RDONLY)) >= 0;) fds.push_back(fd);
+    close(fds.back());
+    try {
+      CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+      return 10;
+    } catch (int thrown) {
+      return thrown;
+    } catch (const std::exception&) {
+      return 2;
+    }
+  });
+  int result = child.wait();
+  EXPECT_TRUE(result == 1 || result == 2) << result;
+  EXPECT_EQ(ReadBytes(file), "[a]\nb = 1\n");
+  EXPECT_FALSE(Exists(BadName(file)));
+}
+
+TEST(IniManager, SymbolicLinksAreReadButNotOpenedUp) {
+  TempDir dir;
+  WriteBytes(dir / "secret", "[a]\nb = 1\n");
+  ASSERT_EQ(chmod((dir / "secret").c_str(), 0600), 0);
+  ASSERT_EQ(symlink((dir / "secret").c_str(), (dir / "x.ini").c_str()), 0);
+  {
+    CvlIniMgr ini((dir / "x.ini").c_str(), false, nullptr, false, true);
+    EXPECT_EQ(Value(ini, "a", "b"), "1");
+  }
+  EXPECT_EQ(ModeOf(dir / "secret"), 0600);
+}
+
+TEST(IniManager, LockOnlyTouchesNothing) {
+  TempDir dir;
+  std::string file = dir / "d/x.ini";
+  { CvlIniMgr ini(file.c_str(), true, nullptr, true, false); }
+  EXPECT_FALSE(Exists(dir / "d"));
+}
+
+TEST(IniManager, WritesTheDialectAndReadsItBack) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  {
+    CvlIniMgr ini(file.c_str(), false, nullptr, true, true);
+    EXPECT_EQ(ini.SetItem("s", "quoted", "a b", true), S_OK);
+    EXPECT_EQ(ini.SetItem("s", "plain", "7", false), S_OK);
+    EXPECT_EQ(ini.SetItem("s", "escaped", "a\nb", true), S_OK);
+  }
+  // A new section is set apart in the save that brings it.
+  EXPECT_EQ(ReadBytes(file), "[s]\nquoted = \"a b\"\nplain = 7\nescaped = \"a\\nb\"\n\n");
+  CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+  EXPECT_EQ(Value(ini, "S", "QUOTED"), "a b");
+  EXPECT_EQ(Value(ini, "s", "escaped"), "a\nb");
+}
+
+TEST(IniManager, WithoutEscapesALineFeedBreaksTheLine) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  {
+    CvlIniMgr ini(file.c_str(), false, nullptr, true, false);
+    EXPECT_EQ(ini.SetItem("s", "i", "a\nb=c", false), S_OK);
+  }
+  CvlIniMgr ini(file.c_str(), false, nullptr, false, false);
+  EXPECT_EQ(Value(ini, "s", "i"), "a");
+  EXPECT_EQ(Value(ini, "s", "b"), "c");
+}
+
+TEST(IniManager, ItemOperationsAnswerByTheirCodes) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "[s]\na = 1\nb = 2\n[t]\nc = 3\n");
+  CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+  EXPECT_EQ(ini.GetNumberOfSections(), 2);
+  EXPECT_EQ(ini.GetNumberOfItems("s"), 2);
+  EXPECT_EQ(ini.GetNumberOfItems("none"), 0);
+  EXPECT_EQ(ini.GetNumberOfItems(nullptr), 0);
+  EXPECT_EQ(ini.ItemExists("s", "a"), S_OK);
+  EXPECT_EQ(ini.ItemExists("s", "c"), E_FAIL);
+  EXPECT_EQ(ini.ItemExists(nullptr, "c"), E_FAIL);
+  EXPECT_EQ(ini.SectionExists("t"), S_OK);
+  EXPECT_EQ(ini.SectionExists("u"), E_FAIL);
+  EXPECT_EQ(ini.SectionExists(nullptr), E_POINTER);
+  char buffer[16] = "unchanged";
+  char* out = buffer;
+  char* null = nullptr;
+  EXPECT_EQ(ini.GetItem("s", "b", &out), S_OK);
+  EXPECT_STREQ(buffer, "2");
+  EXPECT_EQ(ini.GetItem("s", "c", &out), E_FAIL);
+  EXPECT_EQ(ini.GetItem("s", "b", &null), E_POINTER);
+  EXPECT_EQ(ini.GetItem("s", "b", static_cast<char**>(nullptr)), E_POINTER);
+  EXPECT_EQ(ini.GetItem(nullptr, "b", &out), E_POINTER);
+  EXPECT_EQ(ini.GetItem("s", nullptr, &out), E_POINTER);
+  EXPECT_EQ(ini.GetNthSectionName(2, &out), S_OK);
+  EXPECT_STREQ(buffer, "t");
+  EXPECT_EQ(ini.GetNthSectionName(3, &out), E_FAIL);
+  EXPECT_EQ(ini.GetNthSectionName(1, &null), E_POINTER);
+  EXPECT_EQ(ini.GetNthItemName("s", 2, &out), S_OK);
+  EXPECT_STREQ(buffer, "b");
+  EXPECT_EQ(ini.GetNthItemName("s", 0, &out), S_OK);  // the last
+  EXPECT_EQ(ini.GetNthItemName("s", 3, &out), E_FAIL);
+  EXPECT_EQ(ini.GetNthItemName(nullptr, 1, &out), E_POINTER);
+  EXPECT_EQ(ini.SetItem(nullptr, "a", "1", false), E_POINTER);
+  EXPECT_EQ(ini.SetItem("s", nullptr, "1", false), E_POINTER);
+  EXPECT_EQ(ini.SetItem("s", "a", nullptr, false), E_POINTER);
+  EXPECT_EQ(ini.SetItem("s", "  ", "1", false), E_FAIL);
+  EXPECT_EQ(ini.EraseItem(nullptr, "a"), E_POINTER);
+  EXPECT_EQ(ini.EraseSection(nullptr), E_POINTER);
+}
+
+TEST(IniManager, ErasingWhatIsAbsentLeavesTheObjectClean) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "[s]\na=1\n");
+  CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+  EXPECT_EQ(ini.EraseItem("s", "b"), E_FAIL);
+  EXPECT_EQ(ini.EraseSection("t"), E_FAIL);
+  EXPECT_EQ(ini.Write(), S_OK);
+  EXPECT_EQ(ReadBytes(file), "[s]\na=1\n");  // Not rewritten in the writer's form.
+  EXPECT_EQ(ini.EraseItem("s", "a"), S_OK);
+  EXPECT_EQ(ini.EraseSection("s"), S_OK);
+  EXPECT_EQ(ini.Write(), S_OK);
+  EXPECT_EQ(ReadBytes(file), "");
+}
+
+TEST(IniManager, ChecksumIsThatOfTheFile) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "[s]\na=1\n");
+  CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+  unsigned char* digest = nullptr;
+  ASSERT_EQ(ini.WriteAndGetChecksum(&digest), S_OK);  // clean: the file as it stands
+  EXPECT_EQ(Hex(std::string(reinterpret_cast<char*>(digest), 16)), Md5Sum(file));
+  EXPECT_EQ(ReadBytes(file), "[s]\na=1\n");
+  delete[] digest;
+  ini.SetItem("new", "b", "2", true);
+  ASSERT_EQ(ini.WriteAndGetChecksum(&digest), S_OK);
+  EXPECT_EQ(Hex(std::string(reinterpret_cast<char*>(digest), 16)), Md5Sum(file));
+  delete[] digest;
+  EXPECT_EQ(Value(ini, "new", "b"), "2");
+  EXPECT_EQ(ini.WriteAndGetChecksum(nullptr), E_POINTER);
+}
+
+TEST(IniManager, AfterAFailedDigestEveryOperationFailsAndNothingCrashes) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "[s]\na=1\n");
+  CvlIniMgr ini(file.c_str(), false, nullptr, true, true);
+  std::filesystem::remove(file);
+  unsigned char* digest = reinterpret_cast<unsigned char*>(&file);
+  EXPECT_EQ(ini.WriteAndGetChecksum(&digest), E_FAIL);
+  EXPECT_EQ(digest, nullptr);
+  std::string value;
+  EXPECT_EQ(ini.GetItem("s", "a", &value), E_FAIL);
+  EXPECT_EQ(ini.SetItem("t", "a", "1", true), S_OK);  // an empty document, but a document
+}
+
+TEST(IniManager, AFailedWriteLeavesFileAndDocument) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "[s]\na=1\n");
+  CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+  ini.SetItem("s", "a", "2", false);
+  // A directory where the temporary file would be: neither unlinked nor created.
+  dir.makeDir("x.TMP");
+  unsigned char* digest = nullptr;
+  EXPECT_EQ(ini.WriteAndGetChecksum(&digest), E_FAIL);
+  EXPECT_EQ(ReadBytes(file), "[s]\na=1\n");
+  EXPECT_EQ(Value(ini, "s", "a"), "2");
+}
+
+TEST(IniManager, SidecarNameCutsAtTheLastPointOfTheWholePath) {
+  EXPECT_EQ(CvlIniMgr::SidecarName("/d/vltjar.ini"), "/d/vltjar.vl5");
+  EXPECT_EQ(CvlIniMgr::SidecarName("/d.x/file"), "/d.vl5");
+  EXPECT_EQ(CvlIniMgr::SidecarName("/d/file"), "/d/file.vl5");
+}
+
+// ---- The lock
+
+TEST(IniLock, NameHasNoSeparatorAndIsInCapitals) {
+  auto name = [](const char* file) {
+    return std::string(zt::fnd::AnsiString(IniFileLock::NameForFile(file)).c_str());
+  };
+  EXPECT_EQ(name("/d/vltjar.ini"), "DVLTJARINI");
+  EXPECT_EQ(name("C:\\a b.ini"), "CA BINI");
+  std::string longPath = "/" + std::string(300, 'a');
+  EXPECT_LE(name(longPath.c_str()).size(), 255u);
+  EXPECT_NE(name(longPath.c_str()), name((longPath + "b").c_str()));
+  EXPECT_EQ(name(("/" + std::string(255, 'a')).c_str()), std::string(255, 'A'));
+}
+
+TEST(IniLock, IsRecursiveInAThread) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  CvlIniMgr outer(file.c_str(), true, nullptr, false, false);
+  {
+    CvlIniMgr inner(file.c_str(), false, nullptr, true, true);
+    inner.SetItem("s", "a", "1", true);
+  }
+  CvlIniMgr again(file.c_str(), false, nullptr, false, true);
+  EXPECT_EQ(Value(again, "s", "a"), "1");
+}
+
+TEST(IniLock, AnotherThreadWaits) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  auto outer = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
+  Signal started, entered;
+  std::thread other([&] {
+    started.notify();
+    CvlIniMgr mine(file.c_str(), true, nullptr, false, false);
+    entered.notify();
+  });
+  EXPECT_TRUE(started.await());
+  EXPECT_FALSE(entered.await(50));
+  outer.reset();
+  EXPECT_TRUE(entered.await());
+  other.join();
+}
+
+TEST(IniLock, AnotherProcessWaitsAndGoesOnWhenTheHolderIsKilled) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  Signal held, never, entered;
+  Child holder([&] {
+    CvlIniMgr mine(file.c_str(), true, nullptr, false, false);
+    held.notify();
+    never.await();
+    return 0;
+  });
+  ASSERT_TRUE(held.await());
+  Child waiter([&] {
+    CvlIniMgr mine(file.c_str(), true, nullptr, false, false);
+    entered.notify();
+    return 0;
+  });
+  EXPECT_TRUE(Eventually([&] { return BlockedIn(waiter.pid(), SYS_flock); }));
+  EXPECT_FALSE(entered.await(0));
+  holder.kill(SIGKILL);
+  EXPECT_TRUE(entered.await());
+  EXPECT_EQ(waiter.wait(), 0);
+}
+
+TEST(IniLock, MayBeGivenUpByAnotherThreadAndTakenAgain) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  auto mine = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
+  std::thread([&] { mine.reset(); }).join();
+  CvlIniMgr again(file.c_str(), true, nullptr, false, false);
+  EXPECT_EQ(Child([&] {
+              CvlIniMgr blocked(file.c_str(), true, nullptr, false, false);
+              return 0;
+            }).running(),
+            true);
+}
+
+TEST(IniLock, AForkedChildDoesNotFreeItsParentsLock) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  auto mine = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
+  EXPECT_EQ(Child([&] {
+              mine.reset();
+              return 0;
+            }).wait(),
+            0);
+  Signal entered;
+  Child waiter([&] {
+    CvlIniMgr other(file.c_str(), true, nullptr, false, false);
+    entered.notify();
+    return 0;
+  });
+  EXPECT_TRUE(Eventually([&] { return BlockedIn(waiter.pid(), SYS_flock); }));
+  EXPECT_FALSE(entered.await(0));
+  mine.reset();
+  EXPECT_TRUE(entered.await());
+  EXPECT_EQ(waiter.wait(), 0);
+}
+
+TEST(IniLock, IsFreeAfterAConstructorThatThrows) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "[a]\n");
+  EXPECT_EQ(Open(file, std::string(16, 'q')), 1);
+  EXPECT_EQ(Child([&] { return Open(file); }).wait(), 0);
+}
+
+// ---- The sidecar
+
+TEST(Sidecar, ReadsSixteenBytesAndTellsWhatItFinds) {
+  TempDir dir;
+  std::string name = dir / "x.vl5";
+  unsigned char* digest = reinterpret_cast<unsigned char*>(&name);
+  EXPECT_EQ(IniSidecar::Read(name, &digest), S_FALSE);
+  EXPECT_EQ(digest, nullptr);
+  WriteBytes(name, std::string(15, 'a'));
+  EXPECT_EQ(IniSidecar::Read(name, &digest), E_FAIL);
+  EXPECT_EQ(digest, nullptr);
+  WriteBytes(name, std::string(16, 'a') + "more");
+  EXPECT_EQ(IniSidecar::Read(name, &digest), S_OK);
+  EXPECT_EQ(std::string(reinterpret_cast<char*>(digest), 16), std::string(16, 'a'));
+  delete[] digest;
+  std::filesystem::remove(name);
+  std::filesystem::create_directory(name);
+  EXPECT_EQ(IniSidecar::Read(name, &digest), E_FAIL);
+}
+
+TEST(Sidecar, IsWrittenWholeWithItsModeAndNothingBesideIt) {
+  TempDir dir;
+  std::string name = dir / "x.vl5";
+  ScopedUmask strict(077);
+  auto* first = reinterpret_cast<const unsigned char*>("0123456789abcdef");
+  EXPECT_EQ(IniSidecar::Write(name, first, true), S_OK);
+  EXPECT_EQ(ReadBytes(name), "0123456789abcdef");
+  EXPECT_EQ(ModeOf(name), 0777);
+  WriteBytes(name, std::string(40, 'x'));
+  EXPECT_EQ(IniSidecar::Write(name, IniSidecar::kInvalidMark, false), S_OK);
+  EXPECT_EQ(ReadBytes(name), "0000000000000000");
+  WriteBytes(name, "short");
+  EXPECT_EQ(IniSidecar::Write(name, first, false), S_OK);
+  EXPECT_EQ(ReadBytes(name), "0123456789abcdef");
+  EXPECT_FALSE(Exists(name + ".TMP"));
+}
+
+TEST(Sidecar, IsNotWrittenThroughALinkNorOverALeftover) {
+  TempDir dir;
+  WriteBytes(dir / "victim", "precious");
+  ASSERT_EQ(symlink((dir / "victim").c_str(), (dir / "x.vl5").c_str()), 0);
+  EXPECT_EQ(IniSidecar::Write(dir / "x.vl5", IniSidecar::kInvalidMark, false), E_FAIL);
+  EXPECT_EQ(ReadBytes(dir / "victim"), "precious");
+  ASSERT_EQ(symlink((dir / "victim").c_str(), (dir / "y.vl5.TMP").c_str()), 0);
+  EXPECT_EQ(IniSidecar::Write(dir / "y.vl5", IniSidecar::kInvalidMark, false), S_OK);
+  EXPECT_EQ(ReadBytes(dir / "victim"), "precious");
+  EXPECT_EQ(ReadBytes(dir / "y.vl5"), "0000000000000000");
+}
+
+// ---- File security
+
+TEST(FileSecurity, ChangesTheModeOfFilesAndDirectories) {
+  TempDir dir;
+  WriteBytes(dir / "f", "");
+  EXPECT_EQ(vlrSetFileSecurity(zt::fnd::String((dir / "f").c_str()), 0640), S_OK);
+  EXPECT_EQ(ModeOf(dir / "f"), 0640);
+  EXPECT_EQ(vlrSetFileSecurity(zt::fnd::String((dir / "none").c_str()), 0640), E_FAIL);
+}
+
+TEST(FileSecurity, RecursesWithoutFollowingLinks) {
+  TempDir dir;
+  dir.makeDir("d/e");
+  WriteBytes(dir / "d/e/f", "");
+  WriteBytes(dir / "outside", "");
+  ASSERT_EQ(chmod((dir / "outside").c_str(), 0600), 0);
+  ASSERT_EQ(symlink((dir / "outside").c_str(), (dir / "d/link").c_str()), 0);
+  zt::fnd::String path((dir / "d").c_str());
+  EXPECT_EQ(vltSetFileSecurityImpl(path, 0777, false), S_OK);
+  EXPECT_NE(ModeOf(dir / "d/e"), 0777);
+  EXPECT_EQ(vltSetFileSecurityImpl(path, 0777, true), S_OK);
+  EXPECT_EQ(ModeOf(dir / "d"), 0777);
+  EXPECT_EQ(ModeOf(dir / "d/e"), 0777);
+  EXPECT_EQ(ModeOf(dir / "d/e/f"), 0777);
+  EXPECT_EQ(ModeOf(dir / "outside"), 0600);
+}
+
+TEST(FileSecurity, StopsAtTheFirstEntryThatCannotBeChanged) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs root, to make files of two users";
+  TempDir dir;
+  ASSERT_EQ(chmod(dir.path().c_str(), 0777), 0);
+  std::string tree = dir.makeDir("d");
+  ASSERT_EQ(chmod(tree.c_str(), 0777), 0);
+  constexpr uid_t kNobody = 65534;
+  for (const char* name : {"1", "2", "3"}) WriteBytes(tree + "/" + name, "");
+  ASSERT_EQ(chown((tree + "/1").c_str(), kNobody, kNobody), 0);
+  ASSERT_EQ(chown((tree + "/3").c_str(), kNobody, kNobody), 0);
+  ASSERT_EQ(chown(tree.c_str(), kNobody, kNobody), 0);
+  Child child([&] {
+    if (setresuid(kNobody, kNobody, kNobody) != 0) return 50;
+    return vltSetFileSecurityImpl(zt::fnd::String(tree.c_str()), 0777, true) == E_FAIL ? 0 : 1;
+  });
+  EXPECT_EQ(child.wait(), 0);
+  EXPECT_NE(ModeOf(tree + "/2"), 0777);
+}
+
+TEST(FileSecurity, DateStampIsTodaysLocalDate) {
+  char text[32];
+  time_t now = time(nullptr);
+  tm local;
+  localtime_r(&now, &local);
+  strftime(text, sizeof text, "_%m%d%Y", &local);
+  EXPECT_STREQ(zt::fnd::AnsiString(vlrGetCurrentLocalTime()).c_str(), text);
+}
+
+TEST(FileSecurity, SharedDirectoryIsMadeOrRaises) {
+  TempDir dir;
+  ScopedUmask strict(077);
+  EXPECT_EQ(vltMakeSharedDirectory(zt::fnd::String((dir / "a/b/").c_str())), S_OK);
+  EXPECT_EQ(ModeOf(dir / "a/b"), 0777);
+  EXPECT_EQ(ModeOf(dir / "a"), 0700);
+  EXPECT_EQ(vltMakeSharedDirectory(zt::fnd::String((dir / "a/b/").c_str())), S_OK);
+  WriteBytes(dir / "file", "");
+  EXPECT_THROW(vltMakeSharedDirectory(zt::fnd::String((dir / "file/").c_str())),
+               zt::fnd::exception::Exception);
+}
+
+}  // namespace

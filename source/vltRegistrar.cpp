@@ -1,0 +1,202 @@
+#include "source/vltRegistrar.h"
+
+#include <wchar.h>
+
+#include <memory>
+#include <new>
+
+#include "ztcom/ztcore/ztcom.h"
+
+using Toolyard::CztHold;
+using zt::fnd::Vector;
+
+HRESULT CvltRegistrar::QueryInterface(const GUID& iid, void** out) {
+  if (!out) return E_POINTER;
+  *out = nullptr;
+  if (!(iid == IID_IUnknown) && !(iid == IID_IvltRegistrar2) &&
+      !(iid == IID_IvltRegistrar)) {
+    return E_NOINTERFACE;
+  }
+  AddRef();
+  *out = static_cast<IvltRegistrar2*>(this);
+  return S_OK;
+}
+
+uint32_t CvltRegistrar::AddRef() { return static_cast<uint32_t>(m_refCount.increment()); }
+
+uint32_t CvltRegistrar::Release() {
+  int left = m_refCount.decrement();
+  if (left == 0) delete this;
+  return static_cast<uint32_t>(left);
+}
+
+CvltRegistrar::~CvltRegistrar() { DeleteComponents(); }
+
+HRESULT CvltRegistrar::RegisterComponent(_vltComponent2* component) {
+  if (!component || !component->name || !component->fileName) return E_POINTER;
+  if (component->identifier == GUID_NULL) return E_POINTER;
+  HRESULT result = Scan();
+  if (result < 0) return result;
+  return AddComponent(new CvltComponent(component, false));
+}
+
+HRESULT CvltRegistrar::UnregisterComponent(GUID identifier) {
+  HRESULT result = Scan();
+  if (result < 0) return result;
+  CztHold hold(m_components.lock);
+  return removeEntry(identifier) == S_OK ? S_OK : result;
+}
+
+HRESULT CvltRegistrar::GetComponent(GUID identifier, _vltComponent2* component) {
+  if (!component) return E_POINTER;
+  HRESULT result = Scan();
+  if (result < 0) return result;
+  return CopyComponent(identifier, std::nullopt, component);
+}
+
+HRESULT CvltRegistrar::EnumComponents(_vltComponentType type, IvltEnumComponent** enumerator) {
+  if (!enumerator) return E_POINTER;
+  *enumerator = nullptr;
+  HRESULT result = Scan();
+  if (result < 0) return result;
+  return CreateEnumerator(type, enumerator);
+}
+
+Vector<GUID> CvltRegistrar::SnapshotIdentifiers() const {
+  Vector<GUID> identifiers;
+  CztHold hold(m_components.lock);
+  for (const auto& [identifier, component] : m_components.map) identifiers.push_back(identifier);
+  return identifiers;
+}
+
+HRESULT CvltRegistrar::CreateEnumerator(_vltComponentType type, IvltEnumComponent** enumerator) {
+  auto* created = new (std::nothrow) CvltEnumComponentRegistrar(*this, type, SnapshotIdentifiers());
+  if (!created) return E_OUTOFMEMORY;
+  return created->QueryInterface(IID_IvltEnumComponent, reinterpret_cast<void**>(enumerator));
+}
+
+HRESULT CvltRegistrar::InternalGetComponent(GUID identifier, CvltComponent*& component) {
+  HRESULT result = Scan();
+  if (result < 0) return result;
+  return InternalGetComponentNoScan(identifier, component);
+}
+
+HRESULT CvltRegistrar::InternalGetComponentNoScan(GUID identifier, CvltComponent*& component) {
+  CztHold hold(m_components.lock);
+  auto found = m_components.map.find(identifier);
+  if (found == m_components.map.end()) return E_INVALIDARG;
+  component = found->second;
+  return S_OK;
+}
+
+template <class Record>
+HRESULT CvltRegistrar::CopyComponent(GUID identifier, std::optional<_vltComponentType> type,
+                                     Record* record) {
+  CztHold hold(m_components.lock);
+  auto found = m_components.map.find(identifier);
+  if (found == m_components.map.end()) return E_INVALIDARG;
+  if (type && found->second->record().type != *type) return E_FAIL;
+  return found->second->CopyTo(record);
+}
+
+HRESULT CvltRegistrar::AddComponent(CvltComponent* component) {
+  std::unique_ptr<CvltComponent> owned(component);
+  CztHold hold(m_components.lock);
+  removeEntry(component->record().identifier);
+  m_components.map.emplace(component->record().identifier, component);
+  owned.release();
+  return S_OK;
+}
+
+HRESULT CvltRegistrar::RemoveComponent(CvltComponent* component) {
+  return removeEntry(component->record().identifier);
+}
+
+HRESULT CvltRegistrar::removeEntry(GUID identifier) {
+  auto found = m_components.map.find(identifier);
+  if (found == m_components.map.end()) return S_FALSE;
+  delete found->second;
+  m_components.map.erase(found);
+  return S_OK;
+}
+
+HRESULT CvltRegistrar::DeleteComponents() {
+  CztHold hold(m_components.lock);
+  for (const auto& [identifier, component] : m_components.map) delete component;
+  m_components.map.clear();
+  return S_OK;
+}
+
+_vltComponentType CvltRegistrar::MapStringToType(const wchar_t* text) {
+  const std::pair<const wchar_t*, _vltComponentType> keys[] = {
+      {DataDictionariesKey, vltComponentDataDictionary},
+      {ObjectExpertsKey, vltComponentObjectExpert},
+      {ResourceExpertsKey, vltComponentResourceExpert},
+      {ProvidersKey, vltComponentUIProvider}};
+  for (const auto& [key, type] : keys) {
+    if (text && wcscmp(text, key) == 0) return type;
+  }
+  return vltComponentNone;
+}
+
+CvltEnumComponentRegistrar::CvltEnumComponentRegistrar(CvltRegistrar& registrar,
+                                                       _vltComponentType type,
+                                                       const Vector<GUID>& identifiers)
+    : m_registrar(&registrar), m_type(type), m_identifiers(identifiers) {
+  m_registrar->AddRef();
+}
+
+CvltEnumComponentRegistrar::~CvltEnumComponentRegistrar() { m_registrar->Release(); }
+
+HRESULT CvltEnumComponentRegistrar::QueryInterface(const GUID& iid, void** out) {
+  if (!out) return E_POINTER;
+  *out = nullptr;
+  if (!(iid == IID_IUnknown) && !(iid == IID_IvltEnumComponent)) return E_NOINTERFACE;
+  AddRef();
+  *out = static_cast<IvltEnumComponent*>(this);
+  return S_OK;
+}
+
+uint32_t CvltEnumComponentRegistrar::AddRef() { return ++m_refCount; }
+
+uint32_t CvltEnumComponentRegistrar::Release() {
+  uint32_t left = --m_refCount;
+  if (left == 0) delete this;
+  return left;
+}
+
+HRESULT CvltEnumComponentRegistrar::Next(unsigned int count, _vltComponent2* records,
+                                         unsigned int* fetched) {
+  if (!fetched || !records) return E_POINTER;
+  if (count == 0) return E_INVALIDARG;
+  HRESULT result = S_OK;
+  for (unsigned i = 0; i < count; ++i) {
+    result = Next(&records[i]);
+    if (result == S_FALSE) break;
+    ++*fetched;
+  }
+  return result;
+}
+
+HRESULT CvltEnumComponentRegistrar::Reset() {
+  m_cursor = 0;
+  return S_OK;
+}
+
+template <class Record>
+HRESULT CvltEnumComponentRegistrar::step(Record* record) {
+  while (m_cursor < m_identifiers.size()) {
+    GUID identifier = m_identifiers[m_cursor++];
+    if (m_registrar->Scan() < 0) continue;
+    if (m_registrar->CopyComponent(identifier, m_type, record) >= 0) return S_OK;
+  }
+  return S_FALSE;
+}
+
+HRESULT CvltEnumComponentRegistrar::Next(_vltComponent2* record) { return step(record); }
+HRESULT CvltEnumComponentRegistrar::Next(_vltComponent2point2* record) { return step(record); }
+
+template HRESULT CvltRegistrar::CopyComponent(GUID, std::optional<_vltComponentType>,
+                                              _vltComponent2*);
+template HRESULT CvltRegistrar::CopyComponent(GUID, std::optional<_vltComponentType>,
+                                              _vltComponent2point2*);

@@ -1,0 +1,130 @@
+#pragma once
+
+// The registrar's base: the component map in memory, and the enumerator over it.
+
+#include <map>
+#include <optional>
+
+#include "source/Common/ZtUtils/General/ztSync.h"
+#include "source/Utilities/vltInterfaces.h"
+#include "source/vlrHelpers.h"
+#include "source/xcomponent.h"
+#include "zt/fnd/Guid.h"
+#include "zt/fnd/Vector.h"
+#include "zt/fnd/osdep/AtomicInt.h"
+
+// An ordered map with the lock that guards it.
+template <class Key, class Value>
+struct CvlrProtectedMap {
+  std::map<Key, Value> map;
+  mutable Toolyard::CztCS lock;
+};
+
+// Answers from a map of components in memory. Never created by itself: what Scan does, and all that
+// needs a database, comes with the classes behind it.
+//
+// Threads: any. The map's lock is held for look-ups, changes and the copying of a record, never for
+// anything that reads a file or waits.
+class CvltRegistrar : public IvltRegistrar2 {
+ public:
+  static constexpr const wchar_t* DataDictionariesKey = L"Data Dictionaries";
+  static constexpr const wchar_t* ObjectExpertsKey = L"Object Experts";
+  static constexpr const wchar_t* ResourceExpertsKey = L"Resource Experts";
+  static constexpr const wchar_t* ProvidersKey = L"UI Providers";
+
+  CvltRegistrar() : m_refCount(0) {}
+  CvltRegistrar(const CvltRegistrar&) = delete;
+  CvltRegistrar& operator=(const CvltRegistrar&) = delete;
+
+  HRESULT QueryInterface(const GUID& iid, void** out) override;
+  uint32_t AddRef() override;
+  uint32_t Release() override;
+
+  HRESULT GetConfigurationPath(wchar_t**) override { return E_NOTIMPL; }
+  HRESULT SetConfigurationPath(const wchar_t*) override { return E_NOTIMPL; }
+  HRESULT GetSDKPath(wchar_t**) override { return E_NOTIMPL; }
+  HRESULT SetSDKPath(const wchar_t*) override { return E_NOTIMPL; }
+  HRESULT GetSchemaVersion(unsigned int*) override { return E_NOTIMPL; }
+  HRESULT SetSchemaVersion(unsigned int) override { return E_NOTIMPL; }
+  HRESULT RegisterComponent(_vltComponent2* component) override;
+  HRESULT UnregisterComponent(GUID identifier) override;
+  HRESULT GetComponent(GUID identifier, _vltComponent2* component) override;
+  HRESULT EnumComponents(_vltComponentType type, IvltEnumComponent** enumerator) override;
+  HRESULT GetStorageServerCacheSize(unsigned int*) override { return E_NOTIMPL; }
+  HRESULT SetStorageServerCacheSize(unsigned int) override { return E_NOTIMPL; }
+  HRESULT GetStorageClientCacheSize(unsigned int*) override { return E_NOTIMPL; }
+  HRESULT SetStorageClientCacheSize(unsigned int) override { return E_NOTIMPL; }
+
+  // ---- Behind the interface, in the order of the dispatch table.
+  virtual ~CvltRegistrar();
+  // Brings the map up to date; its negative result is that of the operation that asked.
+  virtual HRESULT Scan() = 0;
+
+  // The component, or E_INVALIDARG and `component` untouched. The pointer holds as long as nobody
+  // removes the component.
+  HRESULT InternalGetComponent(GUID identifier, CvltComponent*& component);
+  HRESULT InternalGetComponentNoScan(GUID identifier, CvltComponent*& component);
+
+  // Copies the record out under the map's lock, if the component is there and of the type, where
+  // one is given. E_INVALIDARG if it is not there, E_FAIL for another type.
+  template <class Record>
+  HRESULT CopyComponent(GUID identifier, std::optional<_vltComponentType> type, Record* record);
+
+  // Takes ownership; an earlier component of the same identifier is destroyed. 0.
+  HRESULT AddComponent(CvltComponent* component);
+  // Destroys the stored component with the identifier of this one: 0, or 1 if there is none. Takes
+  // no lock.
+  HRESULT RemoveComponent(CvltComponent* component);
+  HRESULT DeleteComponents();
+
+  // Type of one of the keys above, which are exact; 0 for other texts.
+  static _vltComponentType MapStringToType(const wchar_t* text);
+
+ protected:
+  using ComponentMap = CvlrProtectedMap<GUID, CvltComponent*>;
+
+  // All identifiers in map order.
+  zt::fnd::Vector<GUID> SnapshotIdentifiers() const;
+  // New enumerator over a snapshot, with one reference. E_OUTOFMEMORY leaves *enumerator alone.
+  HRESULT CreateEnumerator(_vltComponentType type, IvltEnumComponent** enumerator);
+  ComponentMap& components() { return m_components; }
+
+ private:
+  HRESULT removeEntry(GUID identifier);
+
+  zt::fnd::osdep::AtomicInt m_refCount;
+  ComponentMap m_components;
+};
+
+// Walks a snapshot of identifiers and hands out the components of one type that are still there.
+// Keeps the registrar alive. Threads: one; the count is not atomic.
+class CvltEnumComponentRegistrar : public IvltEnumComponent {
+ public:
+  CvltEnumComponentRegistrar(CvltRegistrar& registrar, _vltComponentType type,
+                             const zt::fnd::Vector<GUID>& identifiers);
+  CvltEnumComponentRegistrar(const CvltEnumComponentRegistrar&) = delete;
+  CvltEnumComponentRegistrar& operator=(const CvltEnumComponentRegistrar&) = delete;
+
+  HRESULT QueryInterface(const GUID& iid, void** out) override;
+  uint32_t AddRef() override;
+  uint32_t Release() override;
+  HRESULT Next(unsigned int count, _vltComponent2* records, unsigned int* fetched) override;
+  HRESULT Skip(unsigned int) override { return E_NOTIMPL; }
+  HRESULT Reset() override;
+  HRESULT Clone(IvltEnumComponent**) override { return E_NOTIMPL; }
+  virtual ~CvltEnumComponentRegistrar();
+
+  // One step: 0 with a copy that belongs to the caller, or 1 at the end.
+  HRESULT Next(_vltComponent2* record);
+  HRESULT Next(_vltComponent2point2* record);
+
+ private:
+  template <class Record>
+  HRESULT step(Record* record);
+
+  uint32_t m_refCount = 0;
+  CvltRegistrar* m_registrar;
+  _vltComponentType m_type;
+  zt::fnd::Vector<GUID> m_identifiers;
+  unsigned m_cursor = 0;
+};

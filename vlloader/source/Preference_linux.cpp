@@ -1,0 +1,69 @@
+#include <stdlib.h>
+
+#include <memory>
+#include <vector>
+
+#include "vlloader/source/Preference.h"
+#include "ztini/ztini.h"
+
+namespace {
+
+// secure_getenv: a program that runs with foreign rights does not let its caller choose the
+// directory.
+std::string Environment(const char* name) {
+  const char* value = secure_getenv(name);
+  return value ? value : "";
+}
+
+void AddIfAbsolute(std::vector<std::string>& directories, const std::string& directory) {
+  if (!directory.empty() && directory[0] == '/') directories.push_back(directory);
+}
+
+void AddEach(std::vector<std::string>& directories, const std::string& list) {
+  size_t start = 0;
+  while (start <= list.size()) {
+    size_t end = list.find(':', start);
+    if (end == std::string::npos) end = list.size();
+    AddIfAbsolute(directories, list.substr(start, end - start));
+    start = end + 1;
+  }
+}
+
+std::vector<std::string> ConfigDirectories() {
+  std::vector<std::string> directories;
+  std::string own = Environment("XDG_CONFIG_HOME");
+  if (own.empty()) {
+    std::string home = Environment("HOME");
+    if (!home.empty()) own = home + "/.config";
+  }
+  AddIfAbsolute(directories, own);
+  std::string shared = Environment("XDG_CONFIG_DIRS");
+  AddEach(directories, shared.empty() ? "/etc/xdg" : shared);
+  return directories;
+}
+
+struct Dispose {
+  void operator()(IniStructForwardReferenceTag* document) const { IniDispose(document); }
+};
+
+std::optional<std::string> ReadItem(const std::string& file, const std::string& key) {
+  constexpr int32_t kQuotesOfBothKinds = 2 | 4;
+  std::unique_ptr<IniStructForwardReferenceTag, Dispose> document(IniNew(0));
+  if (!document) return std::nullopt;
+  IniSetReadOptions(document.get(), kQuotesOfBothKinds);
+  if (IniReadFromFile(document.get(), file.c_str()) < 0) return std::nullopt;
+  const char* value = nullptr;
+  if (IniGetPointerToRawString(document.get(), "Preferences", key.c_str(), &value) != 1) {
+    return std::nullopt;
+  }
+  return value;
+}
+
+}  // namespace
+
+std::optional<std::string> vlReadPreference(const std::string& domain, const std::string& key) {
+  for (const std::string& directory : ConfigDirectories()) {
+    if (auto value = ReadItem(directory + "/" + domain + ".ini", key)) return value;
+  }
+  return std::nullopt;
+}
