@@ -1,0 +1,51 @@
+#pragma once
+
+#include <chrono>
+#include <optional>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+#include "source/Utilities/vltutils.h"
+
+// What vltctl knows of the registrar: components as plain values.
+namespace vltctl {
+
+// The installation's data cannot be used; the text says why.
+struct DataUnusable : std::runtime_error {
+  using std::runtime_error::runtime_error;
+};
+
+struct Component {
+  std::string type, name, guid, file;
+  uint32_t recordVersion = 0;
+  // Dictionaries only.
+  std::optional<uint32_t> schemaVersion, fragmentRegistered, lastInstalledSchemaVersion;
+  std::optional<std::string> prefix;
+  std::optional<std::string> pnp;  // resource experts only
+};
+
+class Client {
+ public:
+  // Throws DataUnusable.
+  Client();
+  ~Client();
+  Client(const Client&) = delete;
+  Client& operator=(const Client&) = delete;
+
+  // All components: dictionaries, object experts, resource experts, UI providers; each in GUID order.
+  std::vector<Component> list() const;
+  std::optional<Component> find(const std::string& guid) const;
+  // Components that bind to the class.
+  std::vector<Component> classes(const std::string& guid) const;
+  std::chrono::microseconds timeToReady() const { return m_timeToReady; }
+
+ private:
+  IvltRegistrar* m_registrar = nullptr;
+  std::chrono::microseconds m_timeToReady{};
+};
+
+// True for the text form of a GUID, with or without braces.
+bool IsGuid(const std::string& text);
+
+}  // namespace vltctl
