@@ -53,6 +53,9 @@ int ModeOf(const std::string& path) {
 
 bool Exists(const std::string& path) { return ModeOf(path) >= 0; }
 
+ScopedUmask::ScopedUmask(mode_t mask) : m_old(umask(mask)) {}
+ScopedUmask::~ScopedUmask() { umask(m_old); }
+
 int OpenDescriptors() {
   int count = 0;
   for ([[maybe_unused]] const auto& entry : fs::directory_iterator("/proc/self/fd")) ++count;

@@ -42,6 +42,18 @@ int ModeOf(const std::string& path);
 // True if the path names anything, a dangling link included.
 bool Exists(const std::string& path);
 
+// Sets the process's umask for a scope.
+class ScopedUmask {
+ public:
+  explicit ScopedUmask(mode_t mask);
+  ~ScopedUmask();
+  ScopedUmask(const ScopedUmask&) = delete;
+  ScopedUmask& operator=(const ScopedUmask&) = delete;
+
+ private:
+  mode_t m_old;
+};
+
 // Number of open descriptors of this process.
 int OpenDescriptors();
 

@@ -1,0 +1,37 @@
+#pragma once
+
+#include <sys/resource.h>
+#include <unistd.h>
+
+#include <cstdio>
+
+namespace vlt::test {
+
+// Sanitizers reserve the address space themselves and end the process where memory runs out.
+#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
+inline constexpr bool kCanLimitMemory = false;
+#elif defined(__has_feature)
+#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
+inline constexpr bool kCanLimitMemory = false;
+#else
+inline constexpr bool kCanLimitMemory = true;
+#endif
+#else
+inline constexpr bool kCanLimitMemory = true;
+#endif
+
+// Lets this process map only so many bytes more than it has now. For a child: there is no way back.
+inline void LimitMemoryTo(unsigned long moreBytes) {
+  unsigned long pages = 0;
+  if (FILE* f = std::fopen("/proc/self/statm", "re")) {
+    if (std::fscanf(f, "%lu", &pages) != 1) pages = 0;
+    std::fclose(f);
+  }
+  rlimit limit;
+  getrlimit(RLIMIT_AS, &limit);
+  limit.rlim_cur = static_cast<rlim_t>(pages) * static_cast<rlim_t>(sysconf(_SC_PAGESIZE)) +
+                   static_cast<rlim_t>(moreBytes);
+  setrlimit(RLIMIT_AS, &limit);
+}
+
+}  // namespace vlt::test
