@@ -1,0 +1,212 @@
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <climits>
+
+#include "zt/fnd/ByteOrder.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/BinaryFile.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/Retry.h"
+#include "zt/fnd/osdep/ScopedFd.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+constexpr std::uint32_t kTopBit = 0x80000000u;
+constexpr unsigned int kCheckedReadSize = 1u << 20;
+
+static_assert(static_cast<int>(BinaryFile::Origin::Begin) == SEEK_SET);
+static_assert(static_cast<int>(BinaryFile::Origin::Current) == SEEK_CUR);
+static_assert(static_cast<int>(BinaryFile::Origin::End) == SEEK_END);
+
+int OpenFlags(BinaryFile::Mode mode) {
+  static constexpr struct {
+    BinaryFile::Mode bit;
+    int flag;
+  } kFlags[] = {{BinaryFile::Mode::Read, O_RDONLY},
+                {BinaryFile::Mode::Write, O_WRONLY},
+                {BinaryFile::Mode::ReadWrite, O_RDWR},
+                {BinaryFile::Mode::Truncate, O_TRUNC},
+                {BinaryFile::Mode::Create, O_CREAT}};
+  int flags = O_CLOEXEC;
+  for (const auto& entry : kFlags) {
+    if (static_cast<std::uint32_t>(mode) & static_cast<std::uint32_t>(entry.bit)) {
+      flags |= entry.flag;
+    }
+  }
+  return flags;
+}
+
+// Moves up to n bytes by a call that moves some of the rest; returns how many were moved.
+template <class Transfer>
+unsigned long MoveAll(unsigned long n, Transfer transfer) {
+  unsigned long done = 0;
+  while (done < n) {
+    errno = 0;
+    ssize_t moved = transfer(done, std::min<unsigned long>(n - done, SSIZE_MAX));
+    if (moved > 0) {
+      done += static_cast<unsigned long>(moved);
+    } else if (errno != EINTR) {
+      break;
+    }
+  }
+  return done;
+}
+
+// The result of a transfer that is complete.
+int FullCount(unsigned long n) {
+  if (n >= kTopBit) ZT_RAISE(exception::OutOfRange());
+  return static_cast<int>(n);
+}
+
+// True if a regular file surely ends before n more bytes: no memory need be taken for them then.
+bool EndsBefore(int fd, unsigned int n) {
+  struct stat info;
+  off_t position = ::lseek(fd, 0, SEEK_CUR);
+  return position >= 0 && ::fstat(fd, &info) == 0 && S_ISREG(info.st_mode) &&
+         static_cast<std::int64_t>(info.st_size) - position < static_cast<std::int64_t>(n);
+}
+
+// Makes room behind the buffer's bytes; null if that fails.
+unsigned char* MakeRoom(AutoBuffer& buffer, unsigned int n) {
+  unsigned int length = buffer.Len();
+  try {
+    buffer.Skip(n);
+  } catch (const std::exception&) {  // Reads report by their result; the buffer is unchanged.
+    return nullptr;
+  }
+  return buffer.Data() + length;
+}
+
+std::uint32_t InOrder(std::uint32_t value, BinaryFile::Endianness order) {
+  return order == BinaryFile::Endianness::Little ? value : big_endian::ToBigEndian(value);
+}
+
+}  // namespace
+
+BinaryFile::BinaryFile(const String& path, Mode mode, bool noThrow) : BinaryFile() {
+  if (noThrow) {
+    openNoThrow(path, mode);
+  } else {
+    open(path, mode);
+  }
+}
+
+void BinaryFile::open(const String& path, Mode mode) {
+  if (openNoThrow(path, mode) != 0) ZT_RAISE(PosixError());
+}
+
+int BinaryFile::openNoThrow(const String& path, Mode mode) {
+  if (isOpen()) {
+    errno = EINVAL;
+    return -1;
+  }
+  int flags = OpenFlags(mode);
+  mode_t permissions = (flags & O_CREAT) ? 0600 : 0;
+  int failure;
+  {
+    AnsiString narrow(path);
+    m_fd = RetryEintr([&] { return ::open(narrow.c_str(), flags, permissions); });
+    failure = errno;
+  }
+  errno = failure;
+  return m_fd < 0 ? -1 : 0;
+}
+
+void BinaryFile::close() noexcept {
+  ScopedFd closing(m_fd);
+  m_fd = -1;
+}
+
+long BinaryFile::read(void* bytes, unsigned long n) const {
+  return RetryEintr([&] { return ::read(m_fd, bytes, n); });
+}
+
+long BinaryFile::write(const void* bytes, unsigned long n) {
+  return RetryEintr([&] { return ::write(m_fd, bytes, n); });
+}
+
+long BinaryFile::read(AutoBuffer& buffer, unsigned int n) const {
+  unsigned char* room = MakeRoom(buffer, n);
+  if (room == nullptr && n > 0) return -1;
+  long got = read(room, n);
+  int failure = errno;
+  buffer.UnAppend(got < 0 ? n : n - static_cast<unsigned int>(got));
+  errno = failure;
+  return got;
+}
+
+int BinaryFile::readExactSize(AutoBuffer& buffer, unsigned int n) const {
+  if (n > kCheckedReadSize && EndsBefore(m_fd, n)) return -1;
+  unsigned char* room = MakeRoom(buffer, n);
+  if (room == nullptr && n > 0) return -1;
+  int got = readExactSize(room, n);
+  int failure = errno;
+  if (got < 0) buffer.UnAppend(n);
+  errno = failure;
+  return got;
+}
+
+int BinaryFile::ReadExactSize(int fd, void* bytes, unsigned long n) {
+  unsigned long got = MoveAll(n, [&](unsigned long done, unsigned long rest) {
+    return ::read(fd, static_cast<char*>(bytes) + done, rest);
+  });
+  if (got == n) return FullCount(n);
+  int failure = errno;
+  if (got > 0) ::lseek(fd, -static_cast<off_t>(got), SEEK_CUR);
+  errno = failure;
+  return -1;
+}
+
+int BinaryFile::WriteExactSize(int fd, const void* bytes, unsigned long n) {
+  unsigned long written = MoveAll(n, [&](unsigned long done, unsigned long rest) {
+    return ::write(fd, static_cast<const char*>(bytes) + done, rest);
+  });
+  return written == n ? FullCount(n) : -1;
+}
+
+std::int64_t BinaryFile::readByteVector(AutoBuffer& buffer, Endianness order) {
+  std::uint32_t length;
+  if (readExactSize(&length, sizeof length) < 0) return -1;
+  length = InOrder(length, order);
+  if ((length & kTopBit) == 0 && readExactSize(buffer, length) >= 0) {
+    return static_cast<std::int64_t>(length) + 4;
+  }
+  int failure = errno;
+  seek(-static_cast<std::int64_t>(sizeof length), Origin::Current);
+  errno = failure;
+  return -1;
+}
+
+std::int64_t BinaryFile::writeByteVector(const BufferWrapper& bytes, Endianness order) {
+  if (bytes.Len() >= kTopBit) return -1;
+  std::uint32_t length = InOrder(bytes.Len(), order);
+  if (writeExactSize(&length, sizeof length) < 0) return -1;
+  if (writeExactSize(bytes.Data(), bytes.Len()) < 0) return -1;
+  return static_cast<std::int64_t>(bytes.Len()) + 4;
+}
+
+std::int64_t BinaryFile::seek(std::int64_t offset, Origin origin) const {
+  return ::lseek(m_fd, offset, static_cast<int>(origin));
+}
+
+void BinaryFile::resize(std::int64_t size) {
+  if (!isOpen()) return;
+  if (RetryEintr([&] { return ::ftruncate(m_fd, size); }) != 0) ZT_RAISE(PosixError());
+}
+
+void BinaryFile::sync() {
+  if (!isOpen()) return;
+  if (RetryEintr([&] { return ::fsync(m_fd); }) != 0) ZT_RAISE(PosixError());
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,342 @@
+#include "zt/fnd/osdep/BinaryFile.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/mman.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cstring>
+#include <string>
+#include <thread>
+
+#include "tests/support/Child.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/OSException.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::ModeOf;
+using vlt::test::ReadBytes;
+using vlt::test::TempDir;
+using vlt::test::WriteBytes;
+typedef BinaryFile::Mode Mode;
+typedef BinaryFile::Origin Origin;
+typedef BinaryFile::Endianness Endianness;
+
+String Wide(const std::string& text) { return String(text.c_str()); }
+
+std::string Text(const AutoBuffer& b) {
+  return b.Len() == 0 ? std::string() : std::string(reinterpret_cast<char*>(b.Data()), b.Len());
+}
+
+template <class Call>
+int PosixErrorOf(Call call) {
+  try {
+    call();
+  } catch (const PosixError& e) {
+    return static_cast<int>(e.whatcode());
+  }
+  return -1;
+}
+
+// A file of these bytes, open for reading and writing.
+struct Opened {
+  TempDir dir;
+  std::string path = dir / "file";
+  BinaryFile file;
+  explicit Opened(const std::string& bytes) {
+    WriteBytes(path, bytes);
+    file.open(Wide(path), Mode::ReadWrite);
+  }
+  std::int64_t position() const { return file.seek(0, Origin::Current); }
+};
+
+TEST(FileBinary, ModeBitsHaveTheirValues) {
+  EXPECT_EQ(1u, static_cast<unsigned>(Mode::Read));
+  EXPECT_EQ(0x14u, static_cast<unsigned>(Mode::ReadWrite | Mode::Create));
+  EXPECT_EQ(0x1Cu, static_cast<unsigned>(Mode::ReadWrite | Mode::Create | Mode::Truncate));
+  EXPECT_EQ(2u, static_cast<unsigned>(Mode::Write));
+}
+
+TEST(FileBinary, CreatedFileIsPrivateAndCloseOnExec) {
+  TempDir dir;
+  BinaryFile file(Wide(dir / "new"), static_cast<Mode>(20), false);
+  EXPECT_EQ(0600, ModeOf(dir / "new"));
+  int fd = ::open("/dev/null", O_RDONLY | O_CLOEXEC);
+  EXPECT_EQ(FD_CLOEXEC, fcntl(fd - 1, F_GETFD)) << "the file's descriptor is the one below";
+  ::close(fd);
+}
+
+TEST(FileBinary, CreateObeysTheUmask) {
+  TempDir dir;
+  vlt::test::Child child([&] {
+    umask(0277);
+    BinaryFile file;
+    file.open(Wide(dir / "new"), static_cast<Mode>(20));
+    return 0;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(0400, ModeOf(dir / "new"));
+}
+
+TEST(FileBinary, ModesOpenAsToldBitByBit) {
+  Opened o("0123456789");
+  char c;
+  auto tryMode = [&](unsigned mode, bool reads, bool writes) {
+    BinaryFile file;
+    ASSERT_EQ(0, file.openNoThrow(Wide(o.path), static_cast<Mode>(mode))) << mode;
+    EXPECT_EQ(reads ? 1 : -1, file.read(&c, 1)) << mode;
+    EXPECT_EQ(writes ? 1 : -1, file.write("x", 1)) << mode;
+  };
+  tryMode(1, true, false);
+  tryMode(2, false, true);
+  tryMode(4, true, true);
+  tryMode(1 | 2, false, true);   // reading is no bit of the system's
+  tryMode(2 | 4, false, false);  // both access modes together are none
+  EXPECT_EQ(10u, ReadBytes(o.path).size());
+  tryMode(1 | 4, true, true);
+  BinaryFile truncated(Wide(o.path), Mode::Read | Mode::Truncate, false);
+  EXPECT_EQ("", ReadBytes(o.path));
+}
+
+TEST(FileBinary, OpenFailuresThrowOrReturn) {
+  TempDir dir;
+  BinaryFile file;
+  EXPECT_EQ(ENOENT, PosixErrorOf([&] { file.open(Wide(dir / "no"), Mode::Read); }));
+  errno = 0;
+  EXPECT_EQ(-1, file.openNoThrow(Wide(dir / "no"), Mode::Read));
+  EXPECT_EQ(ENOENT, errno);
+  EXPECT_FALSE(file.isOpen());
+  EXPECT_EQ(EISDIR, PosixErrorOf([&] { BinaryFile(Wide(dir.path()), Mode::Write, false); }));
+  EXPECT_FALSE(BinaryFile(Wide(dir / "no"), Mode::Read, true).isOpen());
+}
+
+TEST(FileBinary, OpeningAnOpenObjectIsRefusedAndLeavesIt) {
+  Opened o("abc");
+  char c;
+  ASSERT_EQ(1, o.file.read(&c, 1));
+  errno = 0;
+  EXPECT_EQ(-1, o.file.openNoThrow(Wide(o.dir / "other"), static_cast<Mode>(20)));
+  EXPECT_EQ(EINVAL, errno);
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { o.file.open(Wide(o.path), Mode::Read); }));
+  EXPECT_FALSE(vlt::test::Exists(o.dir / "other"));
+  ASSERT_EQ(1, o.file.read(&c, 1));
+  EXPECT_EQ('b', c);
+}
+
+TEST(FileBinary, ClosedObjectReportsAndDoesNothing) {
+  BinaryFile file;
+  char c = 'x';
+  AutoBuffer buffer;
+  EXPECT_EQ(-1, file.read(&c, 1));
+  EXPECT_EQ(-1, file.write(&c, 1));
+  EXPECT_EQ(-1, file.read(buffer, 3));
+  EXPECT_EQ(0u, buffer.Len());
+  EXPECT_EQ(-1, file.readExactSize(&c, 1));
+  EXPECT_EQ(-1, file.writeExactSize(&c, 1));
+  EXPECT_EQ(-1, file.readExactSize(buffer, 3));
+  EXPECT_EQ(0, file.readExactSize(&c, 0));
+  EXPECT_EQ(0, file.writeExactSize(&c, 0));
+  EXPECT_EQ(-1, file.readByteVector(buffer, Endianness::Little));
+  EXPECT_EQ(-1, file.writeByteVector(BufferWrapper("a", 1), Endianness::Little));
+  EXPECT_EQ(-1, file.seek(0, Origin::Begin));
+  file.resize(5);
+  file.sync();
+  file.close();
+  file.close();
+}
+
+TEST(FileBinary, CloseAndDestructorGiveTheDescriptorBack) {
+  TempDir dir;
+  int before = vlt::test::OpenDescriptors();
+  {
+    BinaryFile file(Wide(dir / "f"), static_cast<Mode>(20), false);
+    EXPECT_EQ(before + 1, vlt::test::OpenDescriptors());
+    file.close();
+    EXPECT_EQ(before, vlt::test::OpenDescriptors());
+    file.open(Wide(dir / "f"), Mode::Read);
+  }
+  EXPECT_EQ(before, vlt::test::OpenDescriptors());
+}
+
+TEST(FileBinary, ReadMayBeShortAndIsZeroAtTheEnd) {
+  Opened o("abcdef");
+  char bytes[10];
+  EXPECT_EQ(6, o.file.read(bytes, 10));
+  EXPECT_EQ(0, o.file.read(bytes, 10));
+  EXPECT_EQ(3, o.file.seek(3, Origin::Begin));
+  AutoBuffer buffer(BufferWrapper("xy", 2));
+  EXPECT_EQ(3, o.file.read(buffer, 10));
+  EXPECT_EQ("xydef", Text(buffer));
+  EXPECT_EQ(0, o.file.read(buffer, 10));
+  EXPECT_EQ("xydef", Text(buffer));
+}
+
+TEST(FileBinary, ExactReadIsAllOrNothing) {
+  Opened o("abcdef");
+  char bytes[10];
+  EXPECT_EQ(4, o.file.readExactSize(bytes, 4));
+  EXPECT_EQ(0, std::memcmp(bytes, "abcd", 4));
+  EXPECT_EQ(-1, o.file.readExactSize(bytes, 3));
+  EXPECT_EQ(4, o.position());
+  AutoBuffer buffer(BufferWrapper("xy", 2));
+  EXPECT_EQ(-1, o.file.readExactSize(buffer, 3));
+  EXPECT_EQ("xy", Text(buffer));
+  EXPECT_EQ(4, o.position());
+  EXPECT_EQ(2, o.file.readExactSize(buffer, 2));
+  EXPECT_EQ("xyef", Text(buffer));
+  EXPECT_EQ(-1, o.file.readExactSize(bytes, 1));
+  EXPECT_EQ(6, o.position());
+}
+
+TEST(FileBinary, HugeExactReadOfASmallFileTakesNoMemory) {
+  Opened o("abc");
+  AutoBuffer buffer;
+  EXPECT_EQ(-1, o.file.readExactSize(buffer, 0xFFFFFFF0u));
+  EXPECT_EQ(0u, buffer.Capacity());
+  EXPECT_EQ(0, o.position());
+}
+
+TEST(FileBinary, ExactTransferGoesOnAfterShortOnes) {
+  int fds[2];
+  ASSERT_EQ(0, pipe2(fds, O_CLOEXEC));
+  std::string sent(300000, 's'), got(300000, '\0');  // several times what a pipe holds
+  std::thread writer([&] {
+    EXPECT_EQ(300000, BinaryFile::WriteExactSize(fds[1], sent.data(), sent.size()));
+    ::close(fds[1]);
+  });
+  EXPECT_EQ(300000, BinaryFile::ReadExactSize(fds[0], got.data(), got.size()));
+  writer.join();
+  EXPECT_EQ(sent, got);
+  EXPECT_EQ(-1, BinaryFile::ReadExactSize(fds[0], got.data(), 1));
+  ::close(fds[0]);
+}
+
+TEST(FileBinary, ExactTransferSurvivesSignals) {
+  struct sigaction action = {}, before = {};
+  action.sa_handler = [](int) {};
+  sigaction(SIGUSR1, &action, &before);  // without SA_RESTART
+  int fds[2];
+  ASSERT_EQ(0, pipe2(fds, O_CLOEXEC));
+  std::atomic<int> result{-2};
+  char bytes[4];
+  std::thread reader([&] { result = BinaryFile::ReadExactSize(fds[0], bytes, 4); });
+  for (int i = 0; i < 20; ++i) {
+    pthread_kill(reader.native_handle(), SIGUSR1);
+    std::this_thread::sleep_for(std::chrono::milliseconds(1));
+  }
+  EXPECT_EQ(-2, result);
+  EXPECT_EQ(4, BinaryFile::WriteExactSize(fds[1], "abcd", 4));
+  reader.join();
+  EXPECT_EQ(4, result);
+  sigaction(SIGUSR1, &before, nullptr);
+  ::close(fds[0]);
+  ::close(fds[1]);
+}
+
+TEST(FileBinary, ExactWriteThatFailsLeavesWhatItWrote) {
+  TempDir dir;
+  vlt::test::Child child([&] {
+    signal(SIGXFSZ, SIG_IGN);
+    rlimit limit = {10, 10};
+    setrlimit(RLIMIT_FSIZE, &limit);
+    BinaryFile file(Wide(dir / "f"), static_cast<Mode>(20), false);
+    if (file.writeExactSize("0123456789abcdef", 16) != -1) return 1;
+    if (errno != EFBIG) return 2;
+    return file.seek(0, Origin::Current) == 10 ? 0 : 3;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ("0123456789", ReadBytes(dir / "f"));
+}
+
+TEST(FileBinary, ExactCountBeyondThirtyOneBitsThrowsAfterTheTransfer) {
+  if constexpr (sizeof(void*) > 4) {
+    TempDir dir;
+    int fd = ::open((dir / "sparse").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600);
+    const unsigned long n = 0x80000000ul;
+    ASSERT_EQ(0, ftruncate(fd, static_cast<off_t>(n)));
+    // Reads into pages that one small piece of memory stands behind would need as much; the zero
+    // device takes them without.
+    int null = ::open("/dev/null", O_WRONLY | O_CLOEXEC);
+    void* zeros = mmap(nullptr, n, PROT_READ, MAP_PRIVATE, fd, 0);
+    ASSERT_NE(MAP_FAILED, zeros);
+    EXPECT_THROW(BinaryFile::WriteExactSize(null, zeros, n), exception::OutOfRange);
+    EXPECT_EQ(0x7FFFFFFF, BinaryFile::WriteExactSize(null, zeros, n - 1));
+    munmap(zeros, n);
+    ::close(null);
+    ::close(fd);
+  }
+}
+
+TEST(FileBinary, ByteVectorsInBothOrders) {
+  for (Endianness order : {Endianness::Little, Endianness::Big, static_cast<Endianness>(7)}) {
+    Opened o("");
+    EXPECT_EQ(7, o.file.writeByteVector(BufferWrapper("abc", 3), order));
+    EXPECT_EQ(4, o.file.writeByteVector(BufferWrapper(), order));
+    const bool little = order == Endianness::Little;
+    EXPECT_EQ(
+        little ? std::string("\3\0\0\0abc\0\0\0\0", 11) : std::string("\0\0\0\3abc\0\0\0\0", 11),
+        ReadBytes(o.path));
+    o.file.seek(0, Origin::Begin);
+    AutoBuffer buffer(BufferWrapper("x", 1));
+    EXPECT_EQ(7, o.file.readByteVector(buffer, order));
+    EXPECT_EQ("xabc", Text(buffer));
+    EXPECT_EQ(4, o.file.readByteVector(buffer, order));
+    EXPECT_EQ(-1, o.file.readByteVector(buffer, order));
+    EXPECT_EQ("xabc", Text(buffer));
+    EXPECT_EQ(11, o.position());
+  }
+}
+
+TEST(FileBinary, ByteVectorTooLongWritesNothing) {
+  Opened o("");
+  EXPECT_EQ(-1, o.file.writeByteVector(BufferWrapper("x", 0x80000000u), Endianness::Little));
+  EXPECT_EQ(-1, o.file.writeByteVector(BufferWrapper("x", 0xFFFFFFFFu), Endianness::Big));
+  EXPECT_EQ("", ReadBytes(o.path));
+  EXPECT_EQ(0, o.position());
+}
+
+TEST(FileBinary, BrokenByteVectorsLeavePositionAndBuffer) {
+  const std::string rows[] = {std::string("z\5\0\0\0abc", 8), std::string("z\0\0\0\x80q", 6),
+                              std::string("z\xff\xff\xff\x7f", 5), std::string("z\1\0\0", 4)};
+  for (const std::string& bytes : rows) {
+    Opened o(bytes);
+    o.file.seek(1, Origin::Begin);
+    AutoBuffer buffer(BufferWrapper("x", 1));
+    EXPECT_EQ(-1, o.file.readByteVector(buffer, Endianness::Little));
+    EXPECT_EQ(1, o.position());
+    EXPECT_EQ("x", Text(buffer));
+  }
+}
+
+TEST(FileBinary, SeekResizeSync) {
+  Opened o("abcdef");
+  EXPECT_EQ(4, o.file.seek(-2, Origin::End));
+  EXPECT_EQ(3, o.file.seek(-1, Origin::Current));
+  EXPECT_EQ(-1, o.file.seek(-1, Origin::Begin));
+  o.file.resize(2);
+  EXPECT_EQ("ab", ReadBytes(o.path));
+  o.file.resize(4);
+  EXPECT_EQ(std::string("ab\0\0", 4), ReadBytes(o.path));
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { o.file.resize(-1); }));
+  o.file.sync();
+  const std::int64_t large = 5000000000;
+  o.file.resize(large);
+  EXPECT_EQ(large, o.file.seek(0, Origin::End));
+  int fds[2];
+  ASSERT_EQ(0, pipe2(fds, O_CLOEXEC));
+  BinaryFile pipeEnd(Wide("/proc/self/fd/" + std::to_string(fds[1])), Mode::Write, false);
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { pipeEnd.sync(); }));
+  ::close(fds[0]);
+  ::close(fds[1]);
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

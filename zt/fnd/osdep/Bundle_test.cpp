@@ -1,0 +1,123 @@
+#include "zt/fnd/osdep/Bundle.h"
+
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cmath>
+#include <string>
+
+#include "tests/support/Modules.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/OSException.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::IsMapped;
+using vlt::test::MakeModule;
+using vlt::test::TempDir;
+
+String Wide(const std::string& text) { return String(text.c_str()); }
+
+bool Works(void* function) {
+  return function != nullptr && reinterpret_cast<double (*)(double)>(function)(0.0) == 1.0;
+}
+
+TEST(LibraryBundle, DecorateName) {
+  const char* rows[][2] = {
+      {"X", "X.bundle"}, {"X.framework", "X.framework"}, {"/a.b/X", "/a.b/X.bundle"}, {".", "."}};
+  for (const auto& row : rows) {
+    EXPECT_STREQ(row[1], AnsiString(Bundle::decorateName(Wide(row[0]))).c_str());
+  }
+  EXPECT_THROW(Bundle::decorateName(String()), exception::InvalidArgument);
+}
+
+TEST(LibraryBundle, OpensTheFirstModuleInsideThatLoads) {
+  for (const char* inside : {"libX.so", "X.so", "X"}) {
+    for (const char* name : {"X.framework", "X.bundle", "X.vle"}) {
+      TempDir dir;
+      dir.makeDir(name);
+      std::string module = dir / (std::string(name) + "/" + inside);
+      MakeModule(module);
+      {
+        Bundle bundle(Wide(dir / name));
+        EXPECT_TRUE(bundle.isOpened()) << inside << " in " << name;
+        EXPECT_TRUE(bundle.isLoaded());
+        EXPECT_TRUE(Works(bundle.getFunctionPointer(L"cos", false)));
+        EXPECT_TRUE(IsMapped(module));
+      }
+      EXPECT_FALSE(IsMapped(module));
+    }
+  }
+}
+
+TEST(LibraryBundle, OrderInsideIsLibraryPlainBare) {
+  TempDir dir;
+  dir.makeDir("X.bundle");
+  vlt::test::WriteBytes(dir / "X.bundle/libX.so", "no module");
+  MakeModule(dir / "X.bundle/X.so");
+  MakeModule(dir / "X.bundle/X");
+  {
+    Bundle bundle(Wide(dir / "X"));  // decorated
+    EXPECT_TRUE(IsMapped(dir / "X.bundle/X.so"));
+    EXPECT_FALSE(IsMapped(dir / "X.bundle/X"));
+  }
+  MakeModule(dir / "X.bundle/libX.so");
+  Bundle bundle(Wide(dir / "X"));
+  EXPECT_TRUE(IsMapped(dir / "X.bundle/libX.so"));
+  EXPECT_FALSE(IsMapped(dir / "X.bundle/X.so"));
+}
+
+TEST(LibraryBundle, WhatIsNoDirectoryIsNoBundle) {
+  TempDir dir;
+  MakeModule(dir / "X.bundle");
+  dir.makeDir("empty.framework");
+  dir.makeDir(".bundle");
+  dir.makeDir("pipe.bundle");
+  ASSERT_EQ(0, mkfifo((dir / "pipe.bundle/libpipe.so").c_str(), 0600));
+  for (const std::string& no :
+       {dir / "X.bundle", dir / "missing", dir / "empty.framework", dir / ".bundle", dir / "pipe",
+        std::string("libm.so.6"), std::string("X"), std::string()}) {
+    Bundle bundle(Wide(no));
+    EXPECT_FALSE(bundle.isOpened()) << no;
+    EXPECT_FALSE(bundle.isLoaded());
+  }
+}
+
+TEST(LibraryBundle, LookUpFailures) {
+  Bundle closed{String()};
+  EXPECT_EQ(nullptr, closed.getFunctionPointer(L"cos", true));
+  EXPECT_THROW(closed.getFunctionPointer(L"cos", false), exception::InvalidOperation);
+  TempDir dir;
+  dir.makeDir("X.bundle");
+  MakeModule(dir / "X.bundle/libX.so");
+  Bundle bundle(Wide(dir / "X"));
+  EXPECT_EQ(nullptr, bundle.getFunctionPointer(L"no_such_function", true));
+  try {
+    bundle.getFunctionPointer(L"no_such_function", false);
+    FAIL();
+  } catch (const PosixError& e) {
+    EXPECT_NE(nullptr, strstr(e.what(), "no_such_function"));
+    EXPECT_EQ(42u, e.getErrorCode());
+  }
+}
+
+TEST(LibraryBundle, CopiesShareTheModule) {
+  TempDir dir;
+  dir.makeDir("X.bundle");
+  MakeModule(dir / "X.bundle/libX.so");
+  auto* first = new Bundle(Wide(dir / "X"));
+  {
+    Bundle copy(*first);
+    delete first;
+    EXPECT_TRUE(copy.isOpened());
+    EXPECT_TRUE(Works(copy.getFunctionPointer(L"cos", false)));
+  }
+  EXPECT_FALSE(IsMapped(dir / "X.bundle/libX.so"));
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

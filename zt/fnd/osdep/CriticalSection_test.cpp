@@ -1,0 +1,110 @@
+#include "zt/fnd/osdep/CriticalSection.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <thread>
+#include <vector>
+
+#include "tests/support/Child.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+// Asks from another thread.
+bool OthersMayEnter(const UnixCriticalSection& section) {
+  bool entered = false;
+  std::thread([&] {
+    entered = section.tryEnter();
+    if (entered) section.leave();
+  }).join();
+  return entered;
+}
+
+TEST(ThreadCriticalSection, EnteredTwiceIsFreeAfterTwoLeaves) {
+  UnixCriticalSection section;
+  section.enter();
+  section.enter();
+  EXPECT_FALSE(OthersMayEnter(section));
+  section.leave();
+  EXPECT_FALSE(OthersMayEnter(section));
+  section.leave();
+  EXPECT_TRUE(OthersMayEnter(section));
+}
+
+TEST(ThreadCriticalSection, LeaveByAStrangerChangesNothing) {
+  UnixCriticalSection section;
+  section.leave();  // nobody owns it
+  section.enter();
+  std::thread([&] {
+    section.leave();
+    section.leave();
+  }).join();
+  EXPECT_TRUE(section.inOwningThread());
+  EXPECT_FALSE(OthersMayEnter(section));
+  section.leave();
+  section.leave();  // no longer the owner
+  EXPECT_TRUE(OthersMayEnter(section));
+}
+
+TEST(ThreadCriticalSection, TryEnterCountsAsAnEntry) {
+  UnixCriticalSection section;
+  EXPECT_TRUE(section.tryEnter());
+  EXPECT_TRUE(section.tryEnter());
+  section.leave();
+  EXPECT_FALSE(OthersMayEnter(section));
+  section.leave();
+  EXPECT_TRUE(OthersMayEnter(section));
+}
+
+TEST(ThreadCriticalSection, OwnerIsTheThreadInside) {
+  UnixCriticalSection section;
+  EXPECT_FALSE(section.inOwningThread());
+  section.enter();
+  EXPECT_TRUE(section.inOwningThread());
+  bool elsewhere = true;
+  std::thread([&] { elsewhere = section.inOwningThread(); }).join();
+  EXPECT_FALSE(elsewhere);
+  section.leave();
+  EXPECT_FALSE(section.inOwningThread());
+}
+
+TEST(ThreadCriticalSection, EnterWaitsForTheOwner) {
+  CriticalSection section;
+  std::atomic<bool> inside{false};
+  section.enter();
+  std::thread waiter([&] {
+    section.enter();
+    inside = true;
+    section.leave();
+  });
+  EXPECT_FALSE(inside);
+  section.leave();
+  waiter.join();
+  EXPECT_TRUE(inside);
+}
+
+TEST(ThreadCriticalSection, GuardedCountIsExact) {
+  CriticalSection section;
+  int count = 0;
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([&] {
+      for (int i = 0; i < 10000; ++i) {
+        CriticalSectionGuard guard(section);
+        ++count;
+      }
+    });
+  }
+  for (auto& thread : threads) thread.join();
+  EXPECT_EQ(40000, count);
+}
+
+TEST(ThreadCriticalSection, OwnedSectionMayBeDestroyed) {
+  auto* section = new UnixCriticalSection;
+  std::thread([&] { section->enter(); }).join();
+  delete section;
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

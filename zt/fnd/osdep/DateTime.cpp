@@ -1,0 +1,132 @@
+#include "zt/fnd/osdep/DateTime.h"
+
+#include <clocale>
+#include <cwchar>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+constexpr unsigned k_mostDigits = 3;
+constexpr std::size_t k_textSize = 512;
+constexpr unsigned k_powersOfTen[k_mostDigits + 1] = {1, 10, 100, 1000};
+
+const AbsTime::Value k_unixEpoch(static_cast<long long>(AbsTime::k_unixEpoch));
+
+String SeparatorText(int separator) {
+  if (separator == 1) return L".";
+  if (separator == 2) return L",";
+  return String(std::localeconv()->decimal_point);
+}
+
+// The separator and the decimals of the time, which moves on by a second where they round up to 1.
+String FractionText(AbsTime& time, unsigned digits, int separator) {
+  const unsigned one = k_powersOfTen[digits];
+  double f = time.getFraction() * one + 0.5;
+  if (f >= one) {
+    time = AbsTime(time.value() + AbsTime::Value(1));
+    f = 0;
+  }
+  unsigned rest = static_cast<unsigned>(f);
+  String text(digits, L'0');
+  for (unsigned i = digits; i-- > 0; rest /= 10) text[i] = static_cast<wchar_t>(L'0' + rest % 10);
+  return SeparatorText(separator) + text;
+}
+
+// Puts the text behind every "%S" and "%#S".
+String WithFraction(const String& format, const String& fraction) {
+  String result;
+  String::size_type done = 0;
+  for (String::size_type i = 0; i + 1 < format.length(); ++i) {
+    if (format[i] != L'%') continue;
+    const String::size_type letter = format[i + 1] == L'#' ? i + 2 : i + 1;
+    if (letter >= format.length() || format[letter] != L'S') continue;
+    result.append(format.begin() + done, letter + 1 - done);
+    result += fraction;
+    done = letter + 1;
+  }
+  return result.append(format.begin() + done, format.length() - done);
+}
+
+String Join(const String& first, const String& second) {
+  return first.empty() || second.empty() ? first + second : first + L" " + second;
+}
+
+String Format(const std::tm& fields, const String& format) {
+  char text[k_textSize];
+  const AnsiString narrow(format);
+  const std::size_t n = std::strftime(text, sizeof text, narrow.c_str(), &fields);
+  return String(static_cast<const char*>(text), static_cast<String::size_type>(n));
+}
+
+template <class BreakDown>
+std::tm ToFields(const AbsTime& time, bool round, BreakDown breakDown) {
+  const std::time_t seconds = static_cast<std::time_t>(time.toTime_T(round));
+  std::tm fields;
+  if (breakDown(&seconds, &fields) == nullptr) ZT_RAISE(exception::OutOfRange());
+  return fields;
+}
+
+String SystemFormat(const wchar_t* format) {
+  std::setlocale(LC_TIME, "");
+  return String(format);
+}
+
+static_assert(sizeof(std::time_t) == sizeof(std::int64_t), "times pass 2038");
+
+}  // namespace
+
+AbsTime TimevalToAbsTime(const timeval& time) {
+  // Unsigned, where a clock far outside all calendars wraps instead of trapping.
+  const std::uint64_t micros =
+      static_cast<std::uint64_t>(time.tv_sec) * 1000000 + static_cast<std::uint64_t>(time.tv_usec);
+  AbsTime::Value value(static_cast<std::int64_t>(micros));
+  tSSTimeValue::_CorrectUnits(tSSTimeValue::kToSeconds, nZTSS100::kTimeUnitMicro, value, nullptr);
+  value += k_unixEpoch;
+  return AbsTime(value);
+}
+
+AbsTime CurrentSystemTime() {
+  timeval now;
+  gettimeofday(&now, nullptr);
+  return TimevalToAbsTime(now);
+}
+
+std::tm AbsTimeToLocalDateTime(const AbsTime& time, bool round) {
+  return ToFields(time, round, localtime_r);
+}
+
+std::tm AbsTimeToUTCDateTime(const AbsTime& time, bool round) {
+  return ToFields(time, round, gmtime_r);
+}
+
+String AbsTimeToString(AbsTime time, const wchar_t* dateFormat, const wchar_t* timeFormat,
+                       unsigned int fractionDigits, TimeStringType type, bool timeFirst,
+                       const wchar_t* timeSuffix, int separator) {
+  if (fractionDigits > k_mostDigits) ZT_RAISE(exception::InvalidArgument());
+  if (time == AbsTime::min) return String();
+  const String datePart = dateFormat == nullptr ? GetSystemDateFormat() : String(dateFormat);
+  String timePart = timeFormat == nullptr ? GetSystemTimeFormat() : String(timeFormat);
+  if (!timePart.empty()) {
+    if (timeSuffix != nullptr && *timeSuffix != L'\0') timePart = timePart + L" " + timeSuffix;
+    if (fractionDigits != 0) {
+      timePart = WithFraction(timePart, FractionText(time, fractionDigits, separator));
+    }
+  }
+  const String format = timeFirst ? Join(timePart, datePart) : Join(datePart, timePart);
+  const bool round = fractionDigits == 0;
+  return Format(
+      type == kTimeUTC ? AbsTimeToUTCDateTime(time, round) : AbsTimeToLocalDateTime(time, round),
+      format);
+}
+
+String GetSystemDateFormat() { return SystemFormat(L"%x"); }
+String GetSystemTimeFormat() { return SystemFormat(L"%X"); }
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,219 @@
+#include "zt/fnd/osdep/DateTime.h"
+
+#include <gtest/gtest.h>
+#include <stdlib.h>
+
+#include <clocale>
+#include <cmath>
+#include <ctime>
+#include <string>
+
+#include "tests/support/ScopedLocale.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+
+using namespace zt::fnd;
+using namespace zt::fnd::osdep;
+using vlt::test::ScopedLocale;
+
+namespace {
+
+// 2026-11-14 13:34:25 UTC.
+constexpr double k_seconds = 1794663265;
+
+AbsTime At(double seconds, double fraction = 0) {
+  return AbsTime(2082844800.0 + seconds, fraction);
+}
+
+std::wstring Std(const String& s) { return std::wstring(s.begin(), s.end()); }
+
+std::wstring Text(AbsTime time, const wchar_t* date, const wchar_t* clock, unsigned digits,
+                  int separator = 1) {
+  return Std(AbsTimeToString(time, date, clock, digits, kTimeUTC, false, nullptr, separator));
+}
+
+// The zone of the process for the life of the object.
+class ScopedZone {
+ public:
+  explicit ScopedZone(const char* zone) {
+    setenv("TZ", zone, 1);
+    tzset();
+  }
+  ~ScopedZone() {
+    unsetenv("TZ");
+    tzset();
+  }
+};
+
+}  // namespace
+
+TEST(TimeText, DateAndTimeStandWithABlank) {
+  EXPECT_EQ(L"20261114 133425", Text(At(k_seconds), L"%Y%m%d", L"%H%M%S", 0));
+  EXPECT_EQ(L"13:34:25 14.11.2026",
+            Std(AbsTimeToString(At(k_seconds), L"%d.%m.%Y", L"%H:%M:%S", 0, kTimeUTC, true)));
+}
+
+TEST(TimeText, UsesOfTheSystem) {
+  EXPECT_EQ(L"_11142026", Text(At(k_seconds), L"_%m%d%Y", L"", 0));
+  EXPECT_EQ(L"20261114 133425.123", Text(At(k_seconds, 0.123), L"%Y%m%d", L"%H%M%S", 3));
+}
+
+TEST(TimeText, MissingPartsLeaveNoBlank) {
+  EXPECT_EQ(L"13:34", Text(At(k_seconds), L"", L"%H:%M", 0));
+  EXPECT_EQ(L"2026", Text(At(k_seconds), L"%Y", L"", 0));
+  EXPECT_EQ(L"", Text(At(k_seconds), L"", L"", 0));
+  EXPECT_EQ(L"13", Std(AbsTimeToString(At(k_seconds), L"", L"%H", 0, kTimeUTC, true)));
+}
+
+TEST(TimeText, NoTimeIsEmptyWhateverTheFormats) {
+  EXPECT_EQ(L"", Text(AbsTime::min, L"%Y", L"%H", 3));
+  EXPECT_EQ(L"", Text(AbsTime::min, L"%Q%", L"%", 0));
+  EXPECT_EQ(L"", Text(AbsTime::min, nullptr, nullptr, 0));
+}
+
+TEST(TimeText, TooManyDigitsRaiseFirst) {
+  EXPECT_THROW(Text(AbsTime::min, L"", L"", 4), exception::InvalidArgument);
+  EXPECT_THROW(Text(At(0), L"%Y", L"", 0xFFFFFFFF), exception::InvalidArgument);
+}
+
+TEST(TimeText, FractionsAreRoundedHalfUpWithCarry) {
+  const struct {
+    double fraction;
+    unsigned digits;
+    const wchar_t* text;
+  } table[] = {{0.9996, 3, L"26.000"}, {0.9995, 3, L"26.000"},   {0.9994, 3, L"25.999"},
+               {0.0, 3, L"25.000"},    {0.0625, 3, L"25.063"},   {0.005, 2, L"25.01"},
+               {0.04, 1, L"25.0"},     {0.05078125, 1, L"25.1"}, {0.95, 1, L"26.0"},
+               {0.5, 1, L"25.5"},      {0.25, 2, L"25.25"}};
+  for (const auto& row : table) {
+    EXPECT_EQ(row.text, Text(At(k_seconds, row.fraction), L"", L"%S", row.digits)) << row.fraction;
+  }
+}
+
+TEST(TimeText, WithoutDigitsWholeSecondsAreRoundedHalfToEven) {
+  EXPECT_EQ(L"26", Text(At(k_seconds, 0.5), L"", L"%S", 0));
+  EXPECT_EQ(L"26", Text(At(k_seconds + 1, 0.5), L"", L"%S", 0));
+  EXPECT_EQ(L"25", Text(At(k_seconds, 0.25), L"", L"%S", 0));
+}
+
+TEST(TimeText, EmptyTimeFormatIgnoresTheDigits) {
+  EXPECT_EQ(L"2026", Text(At(k_seconds, 0.5), L"%Y", L"", 3));
+  EXPECT_EQ(L"25", Text(At(k_seconds, 0.75), L"%S", L"", 3))
+      << "truncated, as digits are asked for";
+  EXPECT_EQ(L"26", Text(At(k_seconds, 0.75), L"%S", L"", 0));
+}
+
+TEST(TimeText, FractionStandsBehindEverySecond) {
+  EXPECT_EQ(L"25.5|25.5|34", Text(At(k_seconds, 0.5), L"", L"%S|%#S|%M", 1));
+  EXPECT_EQ(L"%S.5", Text(At(k_seconds, 0.5), L"", L"%%S", 1)) << "found in the text as it stands";
+  EXPECT_EQ(L"25", Text(At(k_seconds, 0.5), L"%S", L"%M", 1).substr(0, 2)) << "not in the date";
+}
+
+TEST(TimeText, SeparatorComesFromTheLastArgument) {
+  EXPECT_EQ(L"25.5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 1));
+  EXPECT_EQ(L"25,5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 2));
+  const std::wstring point = Std(String(std::localeconv()->decimal_point));
+  EXPECT_EQ(L"25" + point + L"5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 0));
+  EXPECT_EQ(L"25" + point + L"5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 99));
+}
+
+TEST(TimeText, SuffixFollowsATimeFormat) {
+  const auto text = [](const wchar_t* clock, const wchar_t* suffix) {
+    return Std(AbsTimeToString(At(k_seconds), L"%Y", clock, 0, kTimeUTC, false, suffix));
+  };
+  EXPECT_EQ(L"2026 13 UTC", text(L"%H", L"UTC"));
+  EXPECT_EQ(L"2026 13", text(L"%H", L""));
+  EXPECT_EQ(L"2026", text(L"", L"UTC"));
+}
+
+TEST(TimeText, LocalTimeForTypesOneAndTwo) {
+  const ScopedZone zone("XYZ-2");
+  const auto text = [](TimeStringType type) {
+    return Std(AbsTimeToString(At(k_seconds), L"", L"%H:%M", 0, type));
+  };
+  EXPECT_EQ(L"13:34", text(kTimeUTC));
+  EXPECT_EQ(L"15:34", text(kTimeLocal));
+  EXPECT_EQ(L"15:34", text(kTimeLocal2));
+}
+
+TEST(TimeText, NullFormatsAreTheSystemsOwn) {
+  const ScopedLocale locale(LC_TIME, "C");
+  EXPECT_EQ(L"%x", Std(GetSystemDateFormat()));
+  EXPECT_EQ(L"%X", Std(GetSystemTimeFormat()));
+  const std::wstring both = Text(At(k_seconds), nullptr, nullptr, 0);
+  EXPECT_EQ(Text(At(k_seconds), L"%x", L"%X", 0), both);
+  EXPECT_FALSE(both.empty());
+}
+
+TEST(TimeText, SystemFormatsTakeTheTimeLocaleFromTheEnvironment) {
+  const ScopedLocale locale(LC_TIME, "C");
+  setenv("LC_ALL", "C.UTF-8", 1);
+  GetSystemDateFormat();
+  EXPECT_STREQ("C.UTF-8", std::setlocale(LC_TIME, nullptr));
+  EXPECT_STREQ("C", std::setlocale(LC_CTYPE, nullptr)) << "and nothing else";
+  unsetenv("LC_ALL");
+}
+
+TEST(TimeText, ExplicitFormatsLeaveTheLocaleAlone) {
+  const ScopedLocale locale(LC_TIME, "C");
+  setenv("LC_ALL", "C.UTF-8", 1);
+  Text(At(k_seconds), L"%Y", L"%H", 3);
+  EXPECT_STREQ("C", std::setlocale(LC_TIME, nullptr));
+  unsetenv("LC_ALL");
+}
+
+TEST(TimeText, TextBeyondTheBufferIsEmpty) {
+  const std::wstring format(511, L'x'), longer(512, L'x'), longest(100000, L'x');
+  EXPECT_EQ(format, Text(At(0), format.c_str(), L"", 0));
+  EXPECT_EQ(L"", Text(At(0), longer.c_str(), L"", 0));
+  EXPECT_EQ(L"", Text(At(0), longest.c_str(), longest.c_str(), 0));
+}
+
+TEST(TimeText, YearsBeyondTheCalendarRaise) {
+  EXPECT_THROW(Text(AbsTime::max, L"%Y", L"", 0), exception::OutOfRange);
+  EXPECT_THROW(AbsTimeToUTCDateTime(AbsTime::max, false), exception::OutOfRange);
+  EXPECT_THROW(AbsTimeToLocalDateTime(AbsTime(-9e18, 0), true), exception::OutOfRange);
+}
+
+TEST(TimeFields, RoundOrTruncate) {
+  EXPECT_EQ(25, AbsTimeToUTCDateTime(At(k_seconds, 0.75), false).tm_sec);
+  EXPECT_EQ(26, AbsTimeToUTCDateTime(At(k_seconds, 0.75), true).tm_sec);
+  const std::tm fields = AbsTimeToUTCDateTime(At(0), false);
+  EXPECT_EQ(70, fields.tm_year);
+  EXPECT_EQ(4, fields.tm_wday);
+  const std::tm old = AbsTimeToUTCDateTime(AbsTime(), false);
+  EXPECT_EQ(4, old.tm_year);
+  EXPECT_EQ(1, old.tm_mday);
+}
+
+TEST(TimeFields, PassTheYear2038) {
+  EXPECT_EQ(138, AbsTimeToUTCDateTime(At(2147483648.0), false).tm_year);
+  EXPECT_EQ(1100, AbsTimeToUTCDateTime(At(32503680000.0), false).tm_year);
+}
+
+TEST(TimeFields, LocalTimeFollowsTheZone) {
+  const ScopedZone zone("XYZ5");
+  EXPECT_EQ(8, AbsTimeToLocalDateTime(At(k_seconds), false).tm_hour);
+}
+
+TEST(TimeClock, TimevalKeepsItsMicroseconds) {
+  timeval time;
+  time.tv_sec = 1794663265;
+  time.tv_usec = 500000;
+  const AbsTime t = TimevalToAbsTime(time);
+  EXPECT_EQ(2082844800LL + 1794663265, t.getSeconds());
+  EXPECT_EQ(0.5, t.getFraction());
+  time.tv_usec = 1;
+  EXPECT_NEAR(1e-6, TimevalToAbsTime(time).getFraction(), 1e-15);
+  time.tv_sec = -1;
+  time.tv_usec = 0;
+  EXPECT_EQ(2082844799, TimevalToAbsTime(time).getSeconds());
+}
+
+TEST(TimeClock, CurrentTimeIsNow) {
+  const std::int64_t before = std::time(nullptr);
+  const AbsTime now = CurrentSystemTime();
+  const std::int64_t after = std::time(nullptr);
+  EXPECT_LE(before, now.toTime_T(false));
+  EXPECT_GE(after, now.toTime_T(false));
+}

@@ -1,0 +1,117 @@
+#include "zt/fnd/osdep/Event.h"
+
+#include <pthread.h>
+#include <sys/time.h>
+
+#include <ctime>
+#include <utility>
+
+#include "zt/fnd/Exception.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+constexpr unsigned int kNoLimit = 0xFFFFFFFFu;
+
+class MutexHold {
+ public:
+  explicit MutexHold(pthread_mutex_t* mutex) : m_mutex(mutex) { pthread_mutex_lock(m_mutex); }
+  ~MutexHold() { pthread_mutex_unlock(m_mutex); }
+  MutexHold(const MutexHold&) = delete;
+  MutexHold& operator=(const MutexHold&) = delete;
+
+ private:
+  pthread_mutex_t* m_mutex;
+};
+
+timespec DeadlineIn(unsigned int ms) {
+  timeval now;
+  gettimeofday(&now, nullptr);
+  timespec deadline;
+  deadline.tv_sec = now.tv_sec + ms / 1000;
+  deadline.tv_nsec = now.tv_usec * 1000L + (ms % 1000) * 1000000L;
+  if (deadline.tv_nsec >= 1000000000L) {
+    deadline.tv_sec += 1;
+    deadline.tv_nsec -= 1000000000L;
+  }
+  return deadline;
+}
+
+}  // namespace
+
+struct Event::Block {
+  pthread_cond_t condition;
+  pthread_mutex_t mutex;
+  const bool manualReset;
+  bool signaled;
+
+  Block(bool manual, bool initial) : manualReset(manual), signaled(initial) {
+    pthread_cond_init(&condition, nullptr);
+    pthread_mutex_init(&mutex, nullptr);
+  }
+  ~Block() {
+    pthread_mutex_destroy(&mutex);
+    pthread_cond_destroy(&condition);
+  }
+
+  bool take() { return manualReset ? signaled : std::exchange(signaled, false); }
+};
+
+Event::Event(bool manualReset, bool initialState) : m_block(new Block(manualReset, initialState)) {}
+
+Event::~Event() { delete m_block; }
+
+void Event::set() const {
+  MutexHold hold(&m_block->mutex);
+  m_block->signaled = true;
+  if (m_block->manualReset) {
+    pthread_cond_broadcast(&m_block->condition);
+  } else {
+    pthread_cond_signal(&m_block->condition);
+  }
+}
+
+void Event::reset() const {
+  MutexHold hold(&m_block->mutex);
+  m_block->signaled = false;
+}
+
+void Event::resetIfAuto() {
+  if (!m_block->manualReset) reset();
+}
+
+bool Event::check() const {
+  MutexHold hold(&m_block->mutex);
+  return m_block->take();
+}
+
+void Event::wait() const {
+  MutexHold hold(&m_block->mutex);
+  while (!m_block->signaled) pthread_cond_wait(&m_block->condition, &m_block->mutex);
+  m_block->take();
+}
+
+bool Event::wait(unsigned int ms) const {
+  if (ms == 0) return check();
+  if (ms == kNoLimit) {
+    wait();
+    return true;
+  }
+  timespec deadline = DeadlineIn(ms);
+  MutexHold hold(&m_block->mutex);
+  while (!m_block->signaled) {
+    if (pthread_cond_timedwait(&m_block->condition, &m_block->mutex, &deadline) != 0) break;
+  }
+  return m_block->take();
+}
+
+bool PumpEvent::wait(unsigned long ms, bool) const {
+  if (!std::in_range<unsigned int>(ms)) ZT_RAISE(exception::OutOfRange());
+  return Event::wait(static_cast<unsigned int>(ms));
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,147 @@
+#include "zt/fnd/osdep/Event.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <chrono>
+#include <climits>
+#include <thread>
+#include <vector>
+
+#include "tests/support/Child.h"
+#include "zt/fnd/Exception.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using Clock = std::chrono::steady_clock;
+
+std::int64_t MsSince(Clock::time_point start) {
+  return std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - start).count();
+}
+
+constexpr bool kManual = true, kAutomatic = false, kSet = true, kClear = false;
+
+TEST(ThreadEvent, StartsAsTold) {
+  EXPECT_TRUE(Event(kManual, kSet).check());
+  EXPECT_FALSE(Event(kManual, kClear).check());
+  EXPECT_TRUE(Event(kAutomatic, kSet).check());
+  EXPECT_FALSE(Event(kAutomatic, kClear).check());
+}
+
+TEST(ThreadEvent, AutomaticSetTwiceReleasesOneWait) {
+  Event event(kAutomatic, kClear);
+  event.set();
+  event.set();
+  event.wait();
+  EXPECT_FALSE(event.check());
+}
+
+TEST(ThreadEvent, WaitOfZeroOnASetManualEventLeavesItSet) {
+  Event event(kManual, kSet);
+  EXPECT_TRUE(event.wait(0));
+  EXPECT_TRUE(event.wait(0));
+  event.wait();
+  EXPECT_TRUE(event.wait(10));
+  EXPECT_TRUE(event.check());
+}
+
+TEST(ThreadEvent, WaitOfZeroIsACheck) {
+  Event event(kAutomatic, kSet);
+  EXPECT_TRUE(event.wait(0));
+  EXPECT_FALSE(event.wait(0));
+}
+
+TEST(ThreadEvent, TimedWaitOnAnUnsetEventEndsAfterItsTime) {
+  for (bool manual : {kManual, kAutomatic}) {
+    Event event(manual, kClear);
+    auto start = Clock::now();
+    EXPECT_FALSE(event.wait(10));
+    EXPECT_GE(MsSince(start), 9);
+    EXPECT_LT(MsSince(start), 5000);
+  }
+}
+
+TEST(ThreadEvent, TimedWaitThatIsSetConsumesAnAutomaticEvent) {
+  Event event(kAutomatic, kSet);
+  EXPECT_TRUE(event.wait(10000));
+  EXPECT_FALSE(event.check());
+}
+
+TEST(ThreadEvent, ResetAndResetIfAuto) {
+  Event manual(kManual, kSet), automatic(kAutomatic, kSet);
+  manual.resetIfAuto();
+  EXPECT_TRUE(manual.check());
+  manual.reset();
+  EXPECT_FALSE(manual.check());
+  automatic.resetIfAuto();
+  EXPECT_FALSE(automatic.check());
+}
+
+TEST(ThreadEvent, ManualSetReleasesAllWaitersAutomaticOne) {
+  for (bool manual : {kManual, kAutomatic}) {
+    Event event(manual, kClear);
+    std::atomic<int> released{0};
+    std::vector<std::thread> waiters;
+    for (int i = 0; i < 3; ++i) {
+      waiters.emplace_back([&] {
+        event.wait();
+        ++released;
+      });
+    }
+    event.set();
+    int first = manual ? 3 : 1;
+    EXPECT_TRUE(vlt::test::Eventually([&] { return released == first; }));
+    if (!manual) {
+      EXPECT_FALSE(event.check());
+      EXPECT_EQ(1, released);
+      for (int i = 2; i <= 3; ++i) {
+        event.set();
+        EXPECT_TRUE(vlt::test::Eventually([&] { return released == i; }));
+      }
+    }
+    for (auto& waiter : waiters) waiter.join();
+  }
+}
+
+TEST(ThreadEvent, WaitWithoutLimitReturnsTrue) {
+  Event event(kAutomatic, kClear);
+  bool result = false;
+  std::thread waiter([&] { result = event.wait(0xFFFFFFFFu); });
+  event.set();
+  waiter.join();
+  EXPECT_TRUE(result);
+}
+
+TEST(ThreadEvent, SetDuringATimedWaitEndsIt) {
+  Event event(kManual, kClear);
+  auto start = Clock::now();
+  std::thread setter([&] { event.set(); });
+  EXPECT_TRUE(event.wait(60000));
+  EXPECT_LT(MsSince(start), 30000);
+  setter.join();
+}
+
+TEST(ThreadPumpEvent, WaitsAsAnEventDoesWhateverTheFlag) {
+  for (bool pump : {true, false}) {
+    PumpEvent event(kAutomatic, kSet, pump);
+    event.wait(pump);
+    EXPECT_FALSE(event.wait(0ul, pump));
+    event.set();
+    EXPECT_TRUE(event.wait(10ul, !pump));
+    EXPECT_FALSE(event.check());
+  }
+}
+
+TEST(ThreadPumpEvent, TimeAboveThirtyTwoBitsIsOutOfRange) {
+  PumpEvent event(kManual, kSet, true);
+  EXPECT_TRUE(event.wait(0xFFFFFFFFul, true));
+  if constexpr (sizeof(unsigned long) > 4) {
+    EXPECT_THROW(event.wait(ULONG_MAX, true), exception::OutOfRange);
+    EXPECT_THROW(event.wait(0xFFFFFFFFul + 1, false), exception::OutOfRange);
+    EXPECT_TRUE(event.check());
+  }
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

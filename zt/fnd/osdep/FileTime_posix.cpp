@@ -1,0 +1,28 @@
+#include <sys/stat.h>
+
+#include <cstdint>
+
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/FileTime.h"
+#include "zt/fnd/osdep/Retry.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+
+AbsTime Time_TtoAbsTime(std::time_t seconds) {
+  AbsTime::Value value(static_cast<std::int64_t>(seconds));
+  value += AbsTime::Value(AbsTime::k_unixEpoch);
+  return AbsTime(value);
+}
+
+AbsTime GetFileLastWriteTime(const String& path) {
+  AnsiString narrow(path);
+  struct stat info;
+  if (RetryEintr([&] { return ::stat(narrow.c_str(), &info); }) != 0) return AbsTime::min;
+  return Time_TtoAbsTime(info.st_mtime);
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,61 @@
+#include "zt/fnd/osdep/FileTime.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <string>
+
+#include "tests/support/TempDir.h"
+#include "zt/fnd/String.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::TempDir;
+
+String Wide(const std::string& text) { return String(text.c_str()); }
+
+void SetTime(const std::string& path, time_t seconds, long nanoseconds) {
+  timespec times[2] = {{seconds, nanoseconds}, {seconds, nanoseconds}};
+  ASSERT_EQ(0, utimensat(AT_FDCWD, path.c_str(), times, 0));
+}
+
+TEST(FileTime, UnixTimeCountsFrom1904) {
+  EXPECT_EQ(2082844800, Time_TtoAbsTime(0).getSeconds());
+  EXPECT_EQ(0, Time_TtoAbsTime(0).toTime_T(false));
+  EXPECT_EQ(-5, Time_TtoAbsTime(-5).toTime_T(false));
+}
+
+TEST(FileTime, LastWriteIsInWholeSeconds) {
+  TempDir dir;
+  vlt::test::WriteBytes(dir / "f", "x");
+  SetTime(dir / "f", 1000000000, 999999999);
+  AbsTime time = GetFileLastWriteTime(Wide(dir / "f"));
+  EXPECT_EQ(1000000000, time.toTime_T(false));
+  EXPECT_EQ(1000000000, time.toTime_T(true));
+  EXPECT_EQ(0.0, time.getFraction());
+  EXPECT_TRUE(time == Time_TtoAbsTime(1000000000));
+}
+
+TEST(FileTime, LinksAreFollowedAndDirectoriesHaveATime) {
+  TempDir dir;
+  vlt::test::WriteBytes(dir / "f", "x");
+  SetTime(dir / "f", 12345, 0);
+  ASSERT_EQ(0, symlink("f", (dir / "link").c_str()));
+  EXPECT_EQ(12345, GetFileLastWriteTime(Wide(dir / "link")).toTime_T(false));
+  SetTime(dir.path(), 54321, 0);
+  EXPECT_EQ(54321, GetFileLastWriteTime(Wide(dir.path())).toTime_T(false));
+}
+
+TEST(FileTime, WhatCannotBeAskedHasTheMinimum) {
+  TempDir dir;
+  vlt::test::WriteBytes(dir / "f", "x");
+  EXPECT_TRUE(GetFileLastWriteTime(Wide(dir / "missing")) == AbsTime::min);
+  EXPECT_TRUE(GetFileLastWriteTime(Wide(dir / "f/x")) == AbsTime::min);
+  EXPECT_TRUE(GetFileLastWriteTime(String()) == AbsTime::min);
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

@@ -1,0 +1,142 @@
+#include <dirent.h>
+
+#include <cerrno>
+#include <memory>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/FindFiles.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/StringCompare.h"
+#include "zt/fnd/osdep/path.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+typedef FindFiles::FindFlags Flags;
+typedef std::unique_ptr<DIR, int (*)(DIR*)> ScopedDir;
+
+enum class Errors { Quiet, Thrown };
+
+bool Has(Flags flags, Flags flag) {
+  return (static_cast<std::uint32_t>(flags) & static_cast<std::uint32_t>(flag)) != 0;
+}
+
+bool SameCharacter(wchar_t a, wchar_t b) {
+  return a == b || StringCaseCompare(&a, &a + 1, &b, &b + 1) == 0;
+}
+
+struct Mask {
+  String directory, pattern;
+
+  explicit Mask(const String& mask) {
+    String::size_type slash = mask.find_last_of(String(L"/\\"));
+    if (slash == String::npos) {
+      directory = L".";
+      pattern = mask;
+    } else {
+      directory = mask.substr(0, slash);
+      pattern = mask.substr(slash + 1);
+    }
+  }
+};
+
+ScopedDir OpenDirectory(const String& directory) {
+  AnsiString narrow(directory);
+  DIR* dir;
+  do {
+    dir = ::opendir(narrow.c_str());
+  } while (dir == nullptr && errno == EINTR);
+  return ScopedDir(dir, ::closedir);
+}
+
+// The next entry; null at the end, or with errno set.
+const dirent* NextEntry(DIR* dir) {
+  errno = 0;
+  return ::readdir(dir);
+}
+
+bool IsDotOrDotDot(const char* name) {
+  return name[0] == '.' && (name[1] == '\0' || (name[1] == '.' && name[2] == '\0'));
+}
+
+// Entries whose type the listing tells need no look of their own.
+bool SurelyNoDirectory(const dirent* entry) {
+  return entry->d_type != DT_DIR && entry->d_type != DT_LNK && entry->d_type != DT_UNKNOWN;
+}
+
+void AddEntry(const Mask& mask, Flags flags, const dirent* entry, Vector<String>& found) {
+  if (IsDotOrDotDot(entry->d_name)) return;
+  if (entry->d_name[0] == '.' && !Has(flags, Flags::Hidden)) return;
+  String name(entry->d_name);
+  if (!WildcardFit(mask.pattern.c_str(), name.c_str())) return;
+  String full(mask.directory);
+  full.reserve(mask.directory.length() + name.length() + 2);
+  full += L'/';
+  full += name;
+  if (Has(flags, Flags::Directories)) {
+    if (SurelyNoDirectory(entry) || !path::IsDirectory(full.c_str())) return;
+    path::MakePathEndInSlash(full);
+  }
+  if (Has(flags, Flags::FollowLinks) && path::IsSymLink(full.c_str())) {
+    full = path::ResolveSymLink(full);
+  }
+  found.push_back(full);
+}
+
+Vector<String> List(const String& text, Flags flags, Errors errors) {
+  Vector<String> found;
+  Mask mask(text);
+  // A mask that ends in a separator names nothing; an empty one fits no name either.
+  if (mask.pattern.empty() && !text.empty()) return found;
+  ScopedDir dir = OpenDirectory(mask.directory);
+  if (!dir) {
+    if (errors == Errors::Thrown) ZT_RAISE(PosixError());
+    return found;
+  }
+  while (const dirent* entry = NextEntry(dir.get())) AddEntry(mask, flags, entry, found);
+  if (errno != 0 && errors == Errors::Thrown) ZT_RAISE(PosixError());
+  if (Has(flags, Flags::DotEntries)) {
+    found.push_back(mask.directory + L"/.");
+    found.push_back(mask.directory + L"/..");
+  }
+  return found;
+}
+
+}  // namespace
+
+bool WildcardFit(const wchar_t* pattern, const wchar_t* name) {
+  // Behind the last "*", and where in the name the run that it stands for ends. Only the last one
+  // ever has to take more: what an earlier "*" took already led here.
+  const wchar_t* star = nullptr;
+  const wchar_t* resume = nullptr;
+  while (*name != L'\0') {
+    if (*pattern == L'*') {
+      star = ++pattern;
+      resume = name;
+    } else if (*pattern != L'\0' && (*pattern == L'?' || SameCharacter(*pattern, *name))) {
+      ++pattern;
+      ++name;
+    } else if (star != nullptr) {
+      pattern = star;
+      name = ++resume;
+    } else {
+      return false;
+    }
+  }
+  while (*pattern == L'*') ++pattern;
+  return *pattern == L'\0';
+}
+
+Vector<String> FindFiles::getFilenames(const String& mask) {
+  return List(mask, Flags::None, Errors::Quiet);
+}
+
+Vector<String> FindFiles::getFilenames(const String& mask, FindFlags flags) {
+  return List(mask, flags, Errors::Thrown);
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,203 @@
+#include "zt/fnd/osdep/FindFiles.h"
+
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <string>
+#include <vector>
+
+#include "tests/support/TempDir.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/path.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::TempDir;
+using vlt::test::WriteBytes;
+typedef FindFiles::FindFlags Flags;
+typedef std::vector<std::string> Names;
+
+String Wide(const std::string& text) { return String(text.c_str()); }
+
+Names Sorted(const Vector<String>& found) {
+  Names names;
+  for (const String& name : found) names.push_back(AnsiString(name).c_str());
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+Names Find(const std::string& mask) { return Sorted(FindFiles().getFilenames(Wide(mask))); }
+Names Find(const std::string& mask, Flags flags) {
+  return Sorted(FindFiles().getFilenames(Wide(mask), flags));
+}
+
+// a.txt, B.TXT, .hidden, sub/, .dot/ and three links.
+struct Tree {
+  TempDir dir;
+  Tree() {
+    WriteBytes(dir / "a.txt", "");
+    WriteBytes(dir / "B.TXT", "");
+    WriteBytes(dir / ".hidden", "");
+    dir.makeDir("sub");
+    dir.makeDir(".dot");
+    symlink("a.txt", (dir / "lfile").c_str());
+    symlink((dir / "sub").c_str(), (dir / "ldir").c_str());
+    symlink("nowhere", (dir / "ldangling").c_str());
+  }
+  std::string operator/(const char* name) const { return dir / name; }
+  Names full(const Names& names) const {
+    Names result;
+    for (const std::string& name : names) result.push_back(dir / name);
+    std::sort(result.begin(), result.end());
+    return result;
+  }
+};
+
+TEST(FileFind, StarLeavesHiddenNamesOutUnlessAsked) {
+  Tree t;
+  const Names plain = {"B.TXT", "a.txt", "ldangling", "ldir", "lfile", "sub"};
+  EXPECT_EQ(t.full(plain), Find(t / "*"));
+  EXPECT_EQ(t.full(plain), Find(t / "*", Flags::None));
+  Names all = plain;
+  all.insert(all.end(), {".hidden", ".dot"});
+  EXPECT_EQ(t.full(all), Find(t / "*", Flags::Hidden));
+}
+
+TEST(FileFind, MasksIgnoreCase) {
+  Tree t;
+  EXPECT_EQ(t.full({"B.TXT", "a.txt"}), Find(t / "*.TXT"));
+  EXPECT_EQ(t.full({"B.TXT"}), Find(t / "b.*"));
+  EXPECT_EQ(t.full({"B.TXT", "a.txt"}), Find(t / "?.Tx?"));
+  EXPECT_EQ(Names(), Find(t / "*.hid*"));
+}
+
+TEST(FileFind, MaskThatEndsInASeparatorListsNothing) {
+  Tree t;
+  EXPECT_EQ(Names(), Find(t / "sub/"));
+  EXPECT_EQ(Names(), Find(t / ""));
+  EXPECT_EQ(Names(), Find(t / "sub\\"));
+  EXPECT_EQ(Names(), Find(t / "missing/", Flags::Hidden));
+}
+
+TEST(FileFind, MissingDirectoryIsQuietWithoutFlagsOnly) {
+  Tree t;
+  EXPECT_EQ(Names(), Find(t / "missing/*"));
+  try {
+    Find(t / "missing/*", Flags::None);
+    ADD_FAILURE();
+  } catch (const PosixError& e) {
+    EXPECT_EQ(static_cast<unsigned>(ENOENT), e.whatcode());
+  }
+  EXPECT_THROW(Find(t / "a.txt/*", Flags::Hidden), PosixError);
+  EXPECT_EQ(Names(), Find(t / "a.txt/*"));
+  // The directory of a mask in the root is the empty one.
+  EXPECT_EQ(Names(), Find("/*"));
+  EXPECT_THROW(Find("/*", Flags::None), PosixError);
+}
+
+TEST(FileFind, DirectoriesOnlyEndInASlash) {
+  Tree t;
+  EXPECT_EQ(t.full({"ldir/", "sub/"}), Find(t / "*", Flags::Directories));
+  EXPECT_EQ(t.full({".dot/", "ldir/", "sub/"}), Find(t / "*", Flags::Directories | Flags::Hidden));
+}
+
+TEST(FileFind, LinksAreReplacedByTheirText) {
+  Tree t;
+  Names expected = t.full({"B.TXT", "a.txt", "sub", "sub"});
+  expected.insert(expected.end(), {"a.txt", "nowhere"});
+  std::sort(expected.begin(), expected.end());
+  EXPECT_EQ(expected, Find(t / "*", Flags::FollowLinks));
+  // With the slash a link to a directory is one no more.
+  EXPECT_EQ(t.full({"ldir/", "sub/"}), Find(t / "*", Flags::Directories | Flags::FollowLinks));
+}
+
+TEST(FileFind, DotEntriesStandAtTheEndWhateverThePattern) {
+  Tree t;
+  Vector<String> found = FindFiles().getFilenames(Wide(t / "a*"), Flags::DotEntries);
+  ASSERT_EQ(3u, found.size());
+  EXPECT_EQ(t / "a.txt", AnsiString(found[0]).c_str());
+  EXPECT_EQ(t / ".", AnsiString(found[1]).c_str());
+  EXPECT_EQ(t / "..", AnsiString(found[2]).c_str());
+  EXPECT_EQ(2u, FindFiles().getFilenames(Wide(t / "nothing"), Flags::DotEntries).size());
+}
+
+TEST(FileFind, RelativeMasks) {
+  Tree t;
+  String before = path::SetCWD(Wide(t.dir.path()));
+  EXPECT_EQ((Names{"./B.TXT", "./a.txt"}), Find("*.txt"));
+  EXPECT_EQ((Names{"./sub"}), Find("sub"));
+  EXPECT_EQ(Names(), Find("*", Flags::Directories));
+  WriteBytes(t / "sub/x", "");
+  EXPECT_EQ((Names{"sub/x"}), Find("sub/*"));
+  EXPECT_EQ((Names{"sub/x"}), Find("sub\\x"));
+  EXPECT_EQ(Names(), Find(""));
+  path::SetCWD(before);
+}
+
+TEST(FileFind, LaterSeparatorSplitsTheMask) {
+  TempDir dir;
+  dir.makeDir("d\\e");
+  WriteBytes(dir / "d\\e/f", "");
+  EXPECT_EQ((Names{dir / "d\\e/f"}), Find(dir / "d\\e/*"));
+  // The last one is "\" here: the directory is "d", which is not there.
+  EXPECT_EQ(Names(), Find(dir / "d\\*"));
+}
+
+TEST(FileFind, ManyEntriesAreAllListed) {
+  TempDir dir;
+  for (int i = 0; i < 3000; ++i) WriteBytes(dir / ("n" + std::to_string(i)), "");
+  EXPECT_EQ(3000u, Find(dir / "n*").size());
+}
+
+TEST(FileWildcard, Table) {
+  const struct {
+    const wchar_t* pattern;
+    const wchar_t* name;
+    bool fits;
+  } rows[] = {
+      {L"*", L"", true},
+      {L"*", L"abc", true},
+      {L"", L"", true},
+      {L"", L"a", false},
+      {L"?", L"", false},
+      {L"?", L"a", true},
+      {L"??", L"a", false},
+      {L"a*c", L"abc", true},
+      {L"a*c", L"ac", true},
+      {L"a*c", L"acx", false},
+      {L"***a", L"bca", true},
+      {L"*.vle", L"X.VLE", true},
+      {L"a*b*c", L"aXbYbZc", true},
+      {L"a*b*c", L"aXcYb", false},
+      {L"*ab", L"aab", true},
+      {L"[a]", L"a", false},
+      {L"[a]", L"[A]", true},
+      {L"a?c*", L"abc", true},
+      {L"*?", L"", false},
+      {L"*?", L"x", true},
+      {L"\\*", L"*", false},
+      {L"abc", L"abcd", false},
+      {L"abcd", L"abc", false},
+  };
+  for (const auto& row : rows) {
+    EXPECT_EQ(row.fits, WildcardFit(row.pattern, row.name)) << String(row.pattern).length();
+  }
+}
+
+TEST(FileWildcard, HostilePatternEndsSoon) {
+  String pattern, name(5000, L'a');
+  for (int i = 0; i < 500; ++i) pattern += L"*a";
+  pattern += L"b";
+  auto start = std::chrono::steady_clock::now();
+  EXPECT_FALSE(WildcardFit(pattern.c_str(), name.c_str()));
+  EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(10));
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

@@ -1,0 +1,67 @@
+#include "zt/fnd/osdep/IConv.h"
+
+#include <iconv.h>
+
+#include <algorithm>
+#include <cstddef>
+
+#include "zt/fnd/Exception.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+class ScopedIconv {
+ public:
+  ScopedIconv(const char* toCode, const char* fromCode) : m_cd(iconv_open(toCode, fromCode)) {
+    if (m_cd == reinterpret_cast<iconv_t>(-1)) ZT_RAISE(exception::InvalidLocale());
+  }
+  ~ScopedIconv() { iconv_close(m_cd); }
+  ScopedIconv(const ScopedIconv&) = delete;
+  ScopedIconv& operator=(const ScopedIconv&) = delete;
+
+  // False where iconv stopped before the end of the input.
+  bool convert(char*& in, std::size_t& inLeft, char*& out, std::size_t& outLeft) const {
+    return iconv(m_cd, &in, &inLeft, &out, &outLeft) != static_cast<std::size_t>(-1);
+  }
+
+ private:
+  iconv_t m_cd;
+};
+
+template <class In, class Out>
+void Convert(const In* begin, const In* end, const char* fromCode, Out* dest, Out*& destEnd,
+             const char* toCode) {
+  const ScopedIconv converter(toCode, fromCode);
+  char* in = const_cast<char*>(reinterpret_cast<const char*>(begin));
+  std::size_t inLeft = static_cast<std::size_t>(end - begin) * sizeof(In);
+  char* out = reinterpret_cast<char*>(dest);
+  std::size_t outLeft = static_cast<std::size_t>(destEnd - dest) * sizeof(Out);
+  while (inLeft != 0 && outLeft >= sizeof(Out)) {
+    if (converter.convert(in, inLeft, out, outLeft)) continue;
+    if (inLeft == 0 || outLeft < sizeof(Out)) break;
+    *reinterpret_cast<Out*>(out) = static_cast<Out>('?');
+    out += sizeof(Out);
+    outLeft -= sizeof(Out);
+    in += std::min(inLeft, sizeof(In));
+    inLeft -= std::min(inLeft, sizeof(In));
+  }
+  destEnd = reinterpret_cast<Out*>(out);
+}
+
+}  // namespace
+
+void IConv(const char* begin, const char* end, const char* fromCode, wchar_t* dest,
+           wchar_t*& destEnd, const char* toCode) {
+  Convert(begin, end, fromCode, dest, destEnd, toCode);
+}
+
+void IConv(const wchar_t* begin, const wchar_t* end, const char* fromCode, char* dest,
+           char*& destEnd, const char* toCode) {
+  Convert(begin, end, fromCode, dest, destEnd, toCode);
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,41 @@
+#include <dlfcn.h>
+#include <sys/stat.h>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/LoadModule.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/Retry.h"
+#include "zt/fnd/osdep/path.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+
+void* LoadModule(const String& name) {
+  AnsiString narrow(name);
+  struct stat info;
+  // Without a "/" the loader searches its own path.
+  if (name.find(L'/') != String::npos &&
+      RetryEintr([&] { return ::stat(narrow.c_str(), &info); }) == 0 && !S_ISREG(info.st_mode)) {
+    return nullptr;
+  }
+  return ::dlopen(narrow.c_str(), RTLD_NOW | RTLD_GLOBAL);
+}
+
+void UnloadModule(void* module) {
+  if (module != nullptr) ::dlclose(module);
+}
+
+void* FindFunction(void* module, const AnsiString& name) { return ::dlsym(module, name.c_str()); }
+
+void RaiseLoaderError() {
+  const char* text = ::dlerror();
+  ZT_RAISE(PosixError(text == nullptr ? "" : text, -1));
+}
+
+bool NeedsDecoration(const String& name) { return path::BaseName(name).find(L'.') == String::npos; }
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,38 @@
+#include "zt/fnd/osdep/MakeGUID.h"
+
+#include <cstring>
+
+#include "zt/fnd/ByteOrder.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/UuidSource.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+template <class T>
+T BigEndianField(const unsigned char* bytes) {
+  T field;
+  std::memcpy(&field, bytes, sizeof field);
+  return big_endian::FromBigEndian(field);
+}
+
+}  // namespace
+
+_GUID MakeGUID() { return MakeGUID(NewUuidBytes); }
+
+_GUID MakeGUID(UuidSource source) {
+  unsigned char bytes[16];
+  if (!source(bytes)) ZT_RAISE(exception::InitializationFailure());
+  _GUID guid;
+  guid.Data1 = BigEndianField<std::uint32_t>(bytes);
+  guid.Data2 = BigEndianField<std::uint16_t>(bytes + 4);
+  guid.Data3 = BigEndianField<std::uint16_t>(bytes + 6);
+  std::memcpy(guid.Data4, bytes + 8, sizeof guid.Data4);
+  return guid;
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

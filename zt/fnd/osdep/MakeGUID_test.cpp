@@ -1,0 +1,61 @@
+#include "zt/fnd/osdep/MakeGUID.h"
+
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <set>
+#include <string>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/Guid.h"
+#include "zt/fnd/osdep/UuidSource.h"
+
+using namespace zt::fnd;
+using namespace zt::fnd::osdep;
+
+namespace {
+
+bool CountingSource(unsigned char (&bytes)[16]) {
+  for (unsigned char i = 0; i < 16; ++i) bytes[i] = static_cast<unsigned char>(i * 0x11);
+  return true;
+}
+
+bool NoSource(unsigned char (&)[16]) { return false; }
+
+}  // namespace
+
+TEST(GuidMake, TextReadsAsTheUuid) {
+  const _GUID guid = MakeGUID(CountingSource);
+  EXPECT_EQ(0x00112233u, guid.Data1);
+  EXPECT_EQ(0x4455u, guid.Data2);
+  EXPECT_EQ(0x6677u, guid.Data3);
+  EXPECT_EQ(0x88, guid.Data4[0]);
+  EXPECT_EQ(0xFF, guid.Data4[7]);
+  String text;
+  Guid(guid).toString(text);
+  EXPECT_EQ(0, text.exactCompare(L"{00112233-4455-6677-8899-AABBCCDDEEFF}"));
+}
+
+TEST(GuidMake, WithoutASourceRaises) {
+  EXPECT_THROW(MakeGUID(NoSource), exception::InitializationFailure);
+}
+
+TEST(GuidMake, VersionFourAndNeverTheSame) {
+  std::set<std::string> seen;
+  for (int i = 0; i < 1000; ++i) {
+    const _GUID guid = MakeGUID();
+    EXPECT_EQ(4, guid.Data3 >> 12);
+    EXPECT_EQ(0x80, guid.Data4[0] & 0xC0);
+    EXPECT_TRUE(seen.insert(std::string(reinterpret_cast<const char*>(&guid), 16)).second);
+  }
+}
+
+TEST(GuidMake, SourceFillsAllBytes) {
+  unsigned char ones[16] = {};
+  for (int i = 0; i < 200; ++i) {
+    unsigned char bytes[16] = {};
+    ASSERT_TRUE(NewUuidBytes(bytes));
+    for (int b = 0; b < 16; ++b) ones[b] |= bytes[b];
+  }
+  for (int b = 0; b < 16; ++b) EXPECT_NE(0, ones[b]) << b;
+}

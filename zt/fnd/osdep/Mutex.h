@@ -1,0 +1,58 @@
+#pragma once
+
+#include "zt/fnd/StringFwd.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+
+// Lock known by name to every process of the machine.
+//
+// An flock() on the file "mutex/" + name of the shared directory (SharedUnixObject.h), for the
+// processes, and a section shared by the objects of one name in a process, for its threads. The
+// kernel drops the file lock when the holder dies, so there is no abandoned state. The file stays
+// behind; if it is removed or replaced, the next taker makes it anew.
+//
+// Recursive for the thread that holds it, per object: a second object of the name in the same
+// thread passes the section and waits in flock, as it is another owner of the file. Names that
+// differ in case only share the section and have two files.
+//
+//   state of the object    lock               tryLock               unlock
+//   free                   waits; held, 1     held, 1, or false     nothing
+//   held by this thread    held, n + 1        held, n + 1           n - 1; 0 is free
+//   held by another        waits              false                 n - 1; 0 frees the file, while
+//                                                                   the section stays the holder's
+//
+// A forked child holds nothing: its objects open their files anew on first use and never free what
+// the parent holds. A program started by exec keeps no lock.
+//
+// Threads: one object may be shared. Lock order: the name's section, then the file.
+class Mutex {
+ public:
+  // Makes the file; throws what CreateSharedUnixFile and BuildSharedUnixFilePath throw.
+  explicit Mutex(const String& name);
+
+  // Frees what the object holds.
+  ~Mutex();
+  Mutex(const Mutex&) = delete;
+  Mutex& operator=(const Mutex&) = delete;
+
+  // Takes the lock; waits without limit and resumes interrupted waits. Throws PosixError with
+  // flock's errno, or of making the file anew; the lock is then not held.
+  void lock() const;
+
+  // Takes the lock if that needs no wait. Returns false, with nothing changed, where it would have
+  // to wait and for every failure.
+  bool tryLock() const;
+
+  // Never throws. A failing system call leaves the file locked.
+  void unlock() const;
+
+ private:
+  struct Record;
+  Record* m_record;
+};
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,54 @@
+#pragma once
+
+#include <sys/types.h>
+
+#include <map>
+#include <memory>
+
+#include "zt/fnd/RefCounted.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/CriticalSection.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+
+// What the Mutex objects of one name in this process share.
+struct MutexData {
+  int objects = 0;
+  std::unique_ptr<UnixCriticalSection> section = std::make_unique<UnixCriticalSection>();
+};
+
+// The named mutexes of this process. Each Mutex holds a reference.
+//
+// A forked child starts with fresh ones: the inherited ones, which a thread may have been changing
+// at the fork, are never touched again.
+class MutexGlobalStatics : public RefCountedThreadSafePolicy {
+ public:
+  typedef std::map<String, MutexData> Map;  // folds case
+
+  // The statics of the calling process, made where there are none.
+  static RefPtr<MutexGlobalStatics> Get();
+
+  MutexGlobalStatics();
+
+  // Adds an object of the name, or takes one off; the last one takes the section along.
+  Map::iterator attach(const String& name) EXCLUDES(section);
+  void detach(Map::iterator data) EXCLUDES(section);
+
+  const pid_t pid;
+
+  // Guards the map and the hold counts of the Mutex objects; never held across a wait.
+  CriticalSection section;
+
+  // Keeps two threads of a forked child from renewing one inherited Mutex at once; the other
+  // section may be entered inside.
+  CriticalSection renewal;
+
+ private:
+  Map m_data GUARDED_BY(section);
+};
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

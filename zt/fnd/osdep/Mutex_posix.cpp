@@ -1,0 +1,201 @@
+#include <sys/file.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cerrno>
+#include <utility>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/Mutex.h"
+#include "zt/fnd/osdep/MutexGlobalStatics.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/fnd/osdep/SharedUnixObject.h"
+#include "zt/fnd/osdep/path.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+constexpr const wchar_t* kDirectory = L"mutex";
+// Attempts of tryLock on a file that somebody keeps replacing.
+constexpr int kReplacedFiles = 100;
+
+// Opens the file of a name once more; its directory may have gone meanwhile.
+ScopedFd OpenLockFile(const AnsiString& file) {
+  String dir = path::DirName(String(file));
+  path::MakePathEndInSlash(dir);
+  CreateSharedUnixDir(dir);
+  return ScopedFd(CreateSharedUnixFile(file));
+}
+
+// Leaves a section again unless the lock was taken whole.
+class ScopedEntry {
+ public:
+  explicit ScopedEntry(const UnixCriticalSection& section) : m_section(&section) {}
+  ~ScopedEntry() {
+    if (m_section != nullptr) m_section->leave();
+  }
+  ScopedEntry(const ScopedEntry&) = delete;
+  ScopedEntry& operator=(const ScopedEntry&) = delete;
+  void keep() { m_section = nullptr; }
+
+ private:
+  const UnixCriticalSection* m_section;
+};
+
+}  // namespace
+
+struct Mutex::Record {
+  explicit Record(const String& mutexName)
+      : name(mutexName),
+        statics(MutexGlobalStatics::Get()),
+        file(BuildSharedUnixFilePath(String(kDirectory), name)),
+        fd(CreateSharedUnixFile(file)),
+        identity(FileIdentity::Of(fd.get())),
+        data(statics->attach(name)),
+        pid(statics->pid) {}
+
+  ~Record();
+
+  bool ofThisProcess() const { return pid.load(std::memory_order_acquire) == getpid(); }
+  void renewAfterFork();
+  void reopen();
+  bool addHoldIfHeld();
+  bool takeFile(int operation, int attempts);
+  void finishLock(ScopedEntry& entry);
+  const UnixCriticalSection& section() const { return *data->second.section; }
+
+  const String name;
+  RefPtr<MutexGlobalStatics> statics;
+  const AnsiString file;
+  // Changed by the section's owner alone, under the statics' section, so that other threads may read
+  // it there.
+  ScopedFd fd;
+  FileIdentity identity;
+  MutexGlobalStatics::Map::iterator data;
+  // How often the file lock was taken through this object, and how often the section was entered
+  // for it. They differ after an unlock by a thread that does not own the section.
+  int holds = 0;
+  int entries = 0;
+  std::atomic<pid_t> pid;
+};
+
+Mutex::Record::~Record() {
+  if (!ofThisProcess()) {
+    // The inherited statics are unusable, and closing does not free what the parent holds.
+    statics.detach();
+    return;
+  }
+  for (; entries > 0; --entries) section().leave();
+  statics->detach(data);
+}
+
+// Makes an object that came through fork() one of this process, which holds nothing.
+void Mutex::Record::renewAfterFork() {
+  if (ofThisProcess()) return;
+  RefPtr<MutexGlobalStatics> fresh = MutexGlobalStatics::Get();
+  CriticalSectionGuard guard(fresh->renewal);
+  if (ofThisProcess()) return;
+  ScopedFd own = OpenLockFile(file);
+  data = fresh->attach(name);
+  statics.detach();
+  statics = fresh;
+  fd = std::move(own);
+  identity = FileIdentity::Of(fd.get());
+  holds = entries = 0;
+  pid.store(fresh->pid, std::memory_order_release);
+}
+
+void Mutex::Record::reopen() {
+  ScopedFd own = OpenLockFile(file);
+  CriticalSectionGuard guard(statics->section);
+  fd = std::move(own);
+  identity = FileIdentity::Of(fd.get());
+}
+
+// Counts a further lock of the thread that holds the file already.
+bool Mutex::Record::addHoldIfHeld() {
+  CriticalSectionGuard guard(statics->section);
+  if (holds == 0) return false;
+  ++holds;
+  ++entries;
+  return true;
+}
+
+// Takes the file lock; false with flock's errno. A lock on a file that the path no longer names
+// excludes nobody who comes later, so the new file is locked instead.
+bool Mutex::Record::takeFile(int operation, int attempts) {
+  for (int attempt = 1;; ++attempt) {
+    if (Flock(fd.get(), operation) != 0) return false;
+    if (identity.isNamedBy(file)) return true;
+    if (attempt == attempts) {
+      Flock(fd.get(), LOCK_UN);
+      errno = EWOULDBLOCK;
+      return false;
+    }
+    reopen();
+  }
+}
+
+void Mutex::Record::finishLock(ScopedEntry& entry) {
+  CriticalSectionGuard guard(statics->section);
+  ++holds;
+  ++entries;
+  entry.keep();
+}
+
+Mutex::Mutex(const String& name) : m_record(new Record(name)) {}
+
+Mutex::~Mutex() { delete m_record; }
+
+void Mutex::lock() const {
+  Record& record = *m_record;
+  record.renewAfterFork();
+  record.section().enter();
+  ScopedEntry entry(record.section());
+  if (record.addHoldIfHeld()) {
+    entry.keep();
+    return;
+  }
+  if (!record.takeFile(LOCK_EX, 0)) ZT_RAISE(PosixError());
+  record.finishLock(entry);
+}
+
+bool Mutex::tryLock() const {
+  Record& record = *m_record;
+  try {
+    record.renewAfterFork();
+    if (!record.section().tryEnter()) return false;
+    ScopedEntry entry(record.section());
+    if (record.addHoldIfHeld()) {
+      entry.keep();
+      return true;
+    }
+    if (!record.takeFile(LOCK_EX | LOCK_NB, kReplacedFiles)) return false;
+    record.finishLock(entry);
+    return true;
+  } catch (const exception::Exception&) {  // A file that cannot be made anew is a lock not taken.
+    return false;
+  }
+}
+
+void Mutex::unlock() const {
+  Record& record = *m_record;
+  if (!record.ofThisProcess()) return;  // what the parent holds
+  bool leave;
+  {
+    CriticalSectionGuard guard(record.statics->section);
+    // The file goes with the count, so that a lock between the two cannot lose it.
+    if (record.holds > 0 && --record.holds == 0) Flock(record.fd.get(), LOCK_UN);
+    leave = record.entries > 0 && record.section().inOwningThread();
+    if (leave) --record.entries;
+  }
+  if (leave) record.section().leave();
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

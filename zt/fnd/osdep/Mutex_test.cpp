@@ -1,0 +1,638 @@
+#include "zt/fnd/osdep/Mutex.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <future>
+#include <memory>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "tests/support/Child.h"
+#include "tests/support/FailSystemCall.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/ScopedFd.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::BlockedIn;
+using vlt::test::Child;
+using vlt::test::Eventually;
+using vlt::test::ModeOf;
+using vlt::test::ReadBytes;
+using vlt::test::TempDir;
+using vlt::test::WriteBytes;
+
+String Wide(const std::string& text) { return String(text.c_str()); }
+
+template <class Call>
+int PosixErrorOf(Call call) {
+  try {
+    call();
+  } catch (const PosixError& e) {
+    return static_cast<int>(e.whatcode());
+  }
+  return -1;
+}
+
+// A shared place of the test's own.
+struct Place {
+  TempDir dir;
+  Place() { setenv("ZTFNDTMPSHAREDFILEDIR", dir.path().c_str(), 1); }
+  std::string file(const char* name) const { return dir / ("mutex/" + std::string(name)); }
+};
+
+// Whether the lock on the file is free for others, told by a descriptor of its own.
+bool FileIsFree(const std::string& path) {
+  ScopedFd fd(::open(path.c_str(), O_RDWR | O_CLOEXEC));
+  EXPECT_TRUE(fd.valid()) << path;
+  return Flock(fd.get(), LOCK_EX | LOCK_NB) == 0;
+}
+
+bool TryElsewhere(const Mutex& mutex) {
+  return std::async(std::launch::async,
+                    [&] {
+                      bool taken = mutex.tryLock();
+                      if (taken) mutex.unlock();
+                      return taken;
+                    })
+      .get();
+}
+
+// A process that holds the name until it is killed.
+struct Holder {
+  vlt::test::Signal held;
+  Child child;
+  explicit Holder(const char* name)
+      : child([this, name] {
+          Mutex mutex{Wide(name)};
+          mutex.lock();
+          held.notify();
+          for (;;) pause();
+          return 0;
+        }) {
+    EXPECT_TRUE(held.await());
+  }
+};
+
+TEST(Mutex, LeavesAnEmptyFileOpenToAll) {
+  Place place;
+  {
+    Mutex mutex(L"name");
+    mutex.lock();
+    EXPECT_FALSE(FileIsFree(place.file("name")));
+    mutex.unlock();
+  }
+  EXPECT_EQ(0777, ModeOf(place.dir / "mutex"));
+  EXPECT_EQ(0666, ModeOf(place.file("name")));
+  EXPECT_EQ("", ReadBytes(place.file("name")));
+}
+
+TEST(Mutex, ModesStandUnderARestrictiveUmask) {
+  Place place;
+  Child child([] {
+    umask(0077);
+    Mutex mutex(L"name");
+    return mutex.tryLock() ? 0 : 1;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(0777, ModeOf(place.dir / "mutex"));
+  EXPECT_EQ(0666, ModeOf(place.file("name")));
+}
+
+TEST(Mutex, LockedThreeTimesIsFreeAfterTheThirdUnlock) {
+  Place place;
+  Mutex mutex(L"name");
+  mutex.lock();
+  EXPECT_TRUE(mutex.tryLock());
+  mutex.lock();
+  for (int i = 0; i < 2; ++i) {
+    mutex.unlock();
+    EXPECT_FALSE(FileIsFree(place.file("name"))) << i;
+    EXPECT_FALSE(TryElsewhere(mutex)) << i;
+  }
+  mutex.unlock();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  EXPECT_TRUE(TryElsewhere(mutex));
+}
+
+TEST(Mutex, ThreadsWithObjectsOfTheirOwnExcludeOneAnother) {
+  Place place;
+  int count = 0;  // guarded by nothing but the mutex
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([&] {
+      Mutex mutex(L"name");
+      for (int i = 0; i < 500; ++i) {
+        mutex.lock();
+        ++count;
+        mutex.unlock();
+      }
+    });
+  }
+  for (auto& thread : threads) thread.join();
+  EXPECT_EQ(2000, count);
+}
+
+TEST(Mutex, ThreadsThatShareOneObjectExcludeOneAnother) {
+  Place place;
+  Mutex mutex(L"name");
+  int count = 0;
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([&] {
+      for (int i = 0; i < 500; ++i) {
+        if (i % 2 == 0 || !mutex.tryLock()) mutex.lock();
+        ++count;
+        mutex.unlock();
+      }
+    });
+  }
+  for (auto& thread : threads) thread.join();
+  EXPECT_EQ(2000, count);
+}
+
+TEST(Mutex, OtherThreadOfTheProcessIsRefusedWhileHeld) {
+  Place place;
+  Mutex mutex(L"name"), sibling(L"name");
+  mutex.lock();
+  EXPECT_FALSE(TryElsewhere(mutex));
+  EXPECT_FALSE(TryElsewhere(sibling));
+  mutex.unlock();
+  EXPECT_TRUE(TryElsewhere(sibling));
+}
+
+TEST(Mutex, ProcessesLoseNoStep) {
+  Place place;
+  WriteBytes(place.dir / "count", std::string(sizeof(int), '\0'));
+  std::vector<Child> children;
+  for (int c = 0; c < 4; ++c) {
+    children.emplace_back([&] {
+      Mutex mutex(L"name");
+      int fd = ::open((place.dir / "count").c_str(), O_RDWR | O_CLOEXEC);
+      for (int i = 0; i < 300; ++i) {
+        int n;
+        mutex.lock();
+        if (pread(fd, &n, sizeof n, 0) != sizeof n) return 1;
+        ++n;
+        if (pwrite(fd, &n, sizeof n, 0) != sizeof n) return 2;
+        mutex.unlock();
+      }
+      return 0;
+    });
+  }
+  for (Child& child : children) EXPECT_EQ(0, child.wait());
+  int n;
+  std::memcpy(&n, ReadBytes(place.dir / "count").data(), sizeof n);
+  EXPECT_EQ(1200, n);
+}
+
+TEST(Mutex, TryLockWhileAnotherProcessHoldsItIsFalseAndLeavesNoTrace) {
+  Place place;
+  Mutex mutex(L"name");
+  Holder holder("name");
+  EXPECT_FALSE(mutex.tryLock());
+  EXPECT_FALSE(TryElsewhere(mutex));
+  holder.child.kill(SIGKILL);
+  EXPECT_EQ(128 + SIGKILL, holder.child.wait());
+  // The section is free for any thread, and one unlock frees the file.
+  EXPECT_TRUE(TryElsewhere(mutex));
+  EXPECT_TRUE(mutex.tryLock());
+  mutex.unlock();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+}
+
+TEST(Mutex, KilledHolderDoesNotBlockTheNext) {
+  Place place;
+  Holder holder("name");
+  Child waiter([] {
+    Mutex mutex(L"name");
+    mutex.lock();
+    mutex.unlock();
+    return 0;
+  });
+  EXPECT_TRUE(Eventually([&] { return BlockedIn(waiter.pid(), SYS_flock); }));
+  holder.child.kill(SIGKILL);
+  EXPECT_EQ(0, waiter.wait());
+}
+
+TEST(Mutex, InterruptedWaitIsResumed) {
+  Place place;
+  Holder holder("name");
+  Child waiter([] {
+    struct sigaction action = {};
+    action.sa_handler = [](int) {};
+    sigaction(SIGUSR1, &action, nullptr);  // without SA_RESTART
+    Mutex mutex(L"name");
+    mutex.lock();
+    return FileIsFree(std::string(getenv("ZTFNDTMPSHAREDFILEDIR")) + "/mutex/name") ? 1 : 0;
+  });
+  for (int i = 0; i < 10; ++i) {
+    ASSERT_TRUE(Eventually([&] { return BlockedIn(waiter.pid(), SYS_flock); }));
+    waiter.kill(SIGUSR1);
+  }
+  EXPECT_TRUE(waiter.running());
+  holder.child.kill(SIGKILL);
+  EXPECT_EQ(0, waiter.wait());
+}
+
+TEST(Mutex, NamesThatDifferInCaseShareASectionAndHaveTwoFiles) {
+  Place place;
+  Mutex upper(L"Foo"), lower(L"foo");
+  upper.lock();
+  EXPECT_FALSE(TryElsewhere(lower));  // the section
+  EXPECT_TRUE(FileIsFree(place.file("foo")));
+  lower.lock();  // the same thread passes the section, and the file is another one
+  EXPECT_FALSE(FileIsFree(place.file("foo")));
+  lower.unlock();
+  EXPECT_TRUE(FileIsFree(place.file("foo")));
+  EXPECT_FALSE(FileIsFree(place.file("Foo")));
+  upper.unlock();
+  EXPECT_TRUE(FileIsFree(place.file("Foo")));
+  EXPECT_TRUE(TryElsewhere(lower));
+}
+
+TEST(Mutex, SecondObjectInTheSameThreadBlocksInFlock) {
+  Place place;
+  Child child([] {
+    Mutex first(L"name"), second(L"name");
+    first.lock();
+    if (second.tryLock()) return 1;
+    second.lock();
+    return 2;
+  });
+  EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }));
+  EXPECT_TRUE(child.running());
+  child.kill(SIGKILL);
+  EXPECT_EQ(128 + SIGKILL, child.wait());
+}
+
+TEST(Mutex, UnlockOfAFreeMutexChangesNothing) {
+  Place place;
+  Mutex mutex(L"name"), sibling(L"name");
+  mutex.unlock();
+  mutex.unlock();
+  mutex.lock();
+  sibling.unlock();  // not held through this one
+  EXPECT_FALSE(FileIsFree(place.file("name")));
+  EXPECT_FALSE(TryElsewhere(mutex));
+  mutex.unlock();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  EXPECT_TRUE(TryElsewhere(mutex));
+}
+
+TEST(Mutex, UnlockByAnotherThreadFreesTheFileAndLeavesTheSection) {
+  Place place;
+  Mutex mutex(L"name");
+  mutex.lock();
+  std::thread([&] { mutex.unlock(); }).join();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  EXPECT_FALSE(TryElsewhere(mutex));
+  mutex.lock();  // the owner goes on as before
+  EXPECT_FALSE(FileIsFree(place.file("name")));
+  mutex.unlock();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  mutex.unlock();  // and gives back what the other thread could not
+  EXPECT_TRUE(TryElsewhere(mutex));
+}
+
+TEST(Mutex, DestructionFreesWhatIsHeld) {
+  Place place;
+  Mutex sibling(L"name");
+  {
+    Mutex mutex(L"name");
+    mutex.lock();
+    mutex.lock();
+  }
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  EXPECT_TRUE(TryElsewhere(sibling));
+}
+
+TEST(Mutex, DestructionByAnotherThreadFreesTheFile) {
+  Place place;
+  auto mutex = std::make_unique<Mutex>(Wide("name"));
+  mutex->lock();
+  std::thread([&] { mutex.reset(); }).join();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  Mutex next(L"name");  // the section went with its last object
+  EXPECT_TRUE(TryElsewhere(next));
+}
+
+TEST(Mutex, DescriptorsComeBack) {
+  Place place;
+  Mutex first(L"other");
+  int before = vlt::test::OpenDescriptors();
+  { Mutex mutex(L"name"), again(L"name"); }
+  EXPECT_EQ(before, vlt::test::OpenDescriptors());
+}
+
+// ---- hostile places
+
+TEST(Mutex, FileThatCannotBeMadeIsAPosixErrorWithoutTrace) {
+  Place place;
+  ASSERT_EQ(0, mkdir((place.dir / "mutex").c_str(), 0777));
+  ASSERT_EQ(0, mkfifo(place.file("fifo").c_str(), 0666));
+  WriteBytes(place.dir / "victim", "x");
+  chmod((place.dir / "victim").c_str(), 0600);
+  ASSERT_EQ(0, symlink("../victim", place.file("link").c_str()));
+  int before = vlt::test::OpenDescriptors();
+  auto make = [](const std::string& name) { return PosixErrorOf([&] { Mutex m(Wide(name)); }); };
+  EXPECT_EQ(ENXIO, make("fifo"));
+  EXPECT_EQ(ELOOP, make("link"));
+  EXPECT_EQ(EISDIR, make(""));
+  EXPECT_EQ(ENAMETOOLONG, make(std::string(256, 'n')));
+  EXPECT_EQ(ENOENT, make("no/such"));
+  EXPECT_EQ(before, vlt::test::OpenDescriptors());
+  EXPECT_EQ(0600, ModeOf(place.dir / "victim"));
+  EXPECT_EQ(-1, make(std::string(255, 'n')));
+}
+
+TEST(Mutex, FileInTheDirectorysPlaceIsENOTDIR) {
+  Place place;
+  WriteBytes(place.dir / "mutex", "x");
+  EXPECT_EQ(ENOTDIR, PosixErrorOf([] { Mutex m(L"name"); }));
+}
+
+TEST(Mutex, ReplacedFileIsLockedInPlaceOfTheOldOne) {
+  Place place;
+  Mutex mutex(L"name");
+  ASSERT_EQ(0, unlink(place.file("name").c_str()));
+  mutex.lock();
+  EXPECT_EQ(0666, ModeOf(place.file("name")));
+  EXPECT_FALSE(FileIsFree(place.file("name")));
+  mutex.unlock();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  // The same by tryLock, with another process on the new file.
+  ASSERT_EQ(0, unlink(place.file("name").c_str()));
+  Holder holder("name");
+  EXPECT_FALSE(mutex.tryLock());
+  holder.child.kill(SIGKILL);
+  holder.child.wait();
+  EXPECT_TRUE(mutex.tryLock());
+  mutex.unlock();
+}
+
+TEST(Mutex, RemovedDirectoryIsMadeAgain) {
+  Place place;
+  Mutex mutex(L"name");
+  std::filesystem::remove_all(place.dir / "mutex");
+  mutex.lock();
+  EXPECT_EQ(0777, ModeOf(place.dir / "mutex"));
+  EXPECT_FALSE(FileIsFree(place.file("name")));
+  mutex.unlock();
+}
+
+TEST(Mutex, FailedLockLeavesTheSection) {
+  Place place;
+  Mutex mutex(L"name");
+  std::filesystem::remove_all(place.dir / "mutex");
+  WriteBytes(place.dir / "mutex", "in the way");
+  EXPECT_EQ(ENOTDIR, PosixErrorOf([&] { mutex.lock(); }));
+  EXPECT_FALSE(mutex.tryLock());
+  std::filesystem::remove(place.dir / "mutex");
+  EXPECT_TRUE(TryElsewhere(mutex));
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+}
+
+TEST(Mutex, RefusedFileLockIsThrownWithItsErrnoAndLeavesTheSection) {
+  Place place;
+  Child child([] {
+    Mutex mutex(L"name");
+    if (!vlt::test::FailSystemCall(SYS_flock, ENOLCK)) return 1;
+    if (PosixErrorOf([&] { mutex.lock(); }) != ENOLCK) return 2;
+    if (mutex.tryLock()) return 3;
+    // The section is free: another thread gets as far as the file.
+    int error = -1;
+    std::thread([&] { error = PosixErrorOf([&] { mutex.lock(); }); }).join();
+    return error == ENOLCK ? 0 : 4;
+  });
+  EXPECT_EQ(0, child.wait());
+}
+
+TEST(Mutex, UnlockThatTheSystemRefusesThrowsNothing) {
+  Place place;
+  Child child([&] {
+    Mutex mutex(L"name");
+    mutex.lock();
+    if (!vlt::test::FailSystemCall(SYS_flock, EIO)) return 1;
+    mutex.unlock();
+    return 0;
+  });
+  EXPECT_EQ(0, child.wait());
+}
+
+// ---- fork and exec
+
+TEST(MutexFork, ChildHoldsNothingAndFreesNothing) {
+  Place place;
+  Mutex mutex(L"name");
+  mutex.lock();
+  Child child([&] {
+    mutex.unlock();
+    if (FileIsFree(place.file("name"))) return 1;
+    if (mutex.tryLock()) return 2;
+    mutex.unlock();
+    return FileIsFree(place.file("name")) ? 3 : 0;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_FALSE(FileIsFree(place.file("name")));
+  mutex.unlock();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+}
+
+TEST(MutexFork, InheritedObjectMayBeDestroyedWhileTheParentHolds) {
+  Place place;
+  auto mutex = std::make_unique<Mutex>(Wide("name"));
+  mutex->lock();
+  for (bool useFirst : {false, true}) {
+    Child child([&] {
+      if (useFirst && mutex->tryLock()) return 1;
+      mutex.reset();
+      return FileIsFree(place.file("name")) ? 2 : 0;
+    });
+    EXPECT_EQ(0, child.wait());
+    EXPECT_FALSE(FileIsFree(place.file("name")));
+  }
+}
+
+TEST(MutexFork, ChildWaitsForTheParentAndThenHolds) {
+  Place place;
+  Mutex mutex(L"name");
+  mutex.lock();
+  Child child([&] {
+    mutex.lock();
+    if (FileIsFree(place.file("name"))) return 1;
+    mutex.lock();
+    mutex.unlock();
+    if (FileIsFree(place.file("name"))) return 2;
+    mutex.unlock();
+    return FileIsFree(place.file("name")) ? 0 : 3;
+  });
+  EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }));
+  mutex.unlock();
+  EXPECT_EQ(0, child.wait());
+}
+
+TEST(MutexFork, ForkWhileAnotherThreadHoldsLeavesAUsableChild) {
+  Place place;
+  Mutex mutex(L"name");
+  std::promise<void> locked, finish;
+  std::thread holder([&] {
+    mutex.lock();
+    locked.set_value();
+    finish.get_future().wait();
+    mutex.unlock();
+  });
+  locked.get_future().wait();
+  Child child([&] {
+    if (mutex.tryLock()) return 1;  // the parent's thread holds the file
+    Mutex other(L"other");
+    other.lock();
+    other.unlock();
+    mutex.lock();  // until that thread has finished
+    mutex.unlock();
+    return 0;
+  });
+  EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }));
+  finish.set_value();
+  holder.join();
+  EXPECT_EQ(0, child.wait());
+}
+
+TEST(MutexFork, ForksDuringHeavyUseLeaveUsableChildren) {
+  Place place;
+  Mutex shared(L"shared");
+  std::atomic<bool> stop{false};
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 2; ++t) {
+    threads.emplace_back([&, t] {
+      while (!stop) {
+        Mutex mutex(Wide("own" + std::to_string(t)));
+        mutex.lock();
+        shared.lock();
+        shared.unlock();
+        mutex.unlock();
+      }
+    });
+  }
+  for (int i = 0; i < 30; ++i) {
+    Child child([&] {
+      shared.lock();
+      shared.unlock();
+      Mutex mutex(L"own0");
+      mutex.lock();
+      mutex.unlock();
+      return 0;
+    });
+    EXPECT_EQ(0, child.wait()) << i;
+  }
+  stop = true;
+  for (auto& thread : threads) thread.join();
+}
+
+TEST(MutexFork, ThreadsOfAChildRenewAnInheritedObjectOnce) {
+  Place place;
+  Mutex mutex(L"name");
+  Child child([&] {
+    int count = 0;
+    std::vector<std::thread> threads;
+    for (int t = 0; t < 4; ++t) {
+      threads.emplace_back([&] {
+        for (int i = 0; i < 200; ++i) {
+          mutex.lock();
+          ++count;
+          mutex.unlock();
+        }
+      });
+    }
+    for (auto& thread : threads) thread.join();
+    return count == 800 ? 0 : 1;
+  });
+  EXPECT_EQ(0, child.wait());
+}
+
+TEST(MutexFork, GrandchildRenewsAgain) {
+  Place place;
+  Mutex mutex(L"name");
+  Child child([&] {
+    mutex.lock();
+    Child grandchild([&] { return mutex.tryLock() ? 1 : 0; });
+    int code = grandchild.wait();
+    mutex.unlock();
+    return code;
+  });
+  EXPECT_EQ(0, child.wait());
+}
+
+TEST(MutexFork, ProgramStartedByExecKeepsNoLock) {
+  Place place;
+  int feed[2], started[2];
+  ASSERT_EQ(0, pipe2(feed, O_CLOEXEC));
+  ASSERT_EQ(0, pipe2(started, O_CLOEXEC));
+  Child holder([&] {
+    Mutex mutex(L"name");
+    mutex.lock();
+    if (fork() == 0) {
+      // Lives until the test closes the other end.
+      dup2(feed[0], 0);
+      dup2(started[1], 1);
+      execlp("cat", "cat", static_cast<char*>(nullptr));
+      _exit(1);
+    }
+    for (;;) pause();
+    return 0;
+  });
+  ::close(feed[0]);
+  ::close(started[1]);
+  char byte;
+  ASSERT_EQ(1, write(feed[1], "x", 1));
+  ASSERT_EQ(1, read(started[0], &byte, 1));  // the program runs
+  EXPECT_FALSE(FileIsFree(place.file("name")));
+  holder.kill(SIGKILL);
+  holder.wait();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  ::close(feed[1]);
+  EXPECT_EQ(0, read(started[0], &byte, 1));  // it has lived until now
+  ::close(started[0]);
+}
+
+// ---- the end of the process
+
+void UseAfterTheStaticsWent() {
+  Mutex mutex(L"late");
+  mutex.lock();
+  mutex.unlock();
+  WriteBytes(std::string(getenv("ZTFNDTMPSHAREDFILEDIR")) + "/done", "x");
+}
+
+TEST(Mutex, WorksInExitFunctionsThatRunAfterItsOwn) {
+  Place place;
+  Child child([]() -> int {
+    std::atexit(UseAfterTheStaticsWent);  // before the first use, so it runs after
+    {
+      Mutex mutex(L"name");
+      mutex.lock();
+    }
+    exit(0);
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ("x", ReadBytes(place.dir / "done"));
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

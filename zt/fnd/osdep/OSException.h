@@ -1,0 +1,59 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+
+#include "zt/fnd/Exception.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+
+// A failure that the operating system reports. getErrorCode() of this family is a small number, not
+// one of the foundation's block; whatcode() is the system's own number.
+class ZT_EXCEPTION_CLASS OSException : public exception::Exception {
+ public:
+  OSException();  // "Unknown error", 0
+  OSException(const char* message, unsigned int code);
+  OSException(const OSException&) = default;
+  OSException& operator=(const OSException&) = default;
+  ~OSException() override;
+
+  const char* what() const noexcept override;
+  std::uint32_t getErrorCode() const noexcept override;  // 42
+  virtual std::uint32_t whatcode() const noexcept;
+
+ protected:
+  std::string message;
+  std::uint32_t code;
+};
+
+// An errno. getErrorCode(): 0 for 0, 7 for ENOENT, 42 for any other.
+class ZT_EXCEPTION_CLASS PosixError : public OSException {
+ public:
+  PosixError();  // the calling thread's errno, so build it right behind the failed call
+  explicit PosixError(int errnum);  // the system's text for it
+  PosixError(const char* message, int errnum);
+  PosixError(const PosixError&) = default;
+  PosixError& operator=(const PosixError&) = default;
+  ~PosixError() override;
+
+  std::uint32_t getErrorCode() const noexcept override;
+};
+
+// An OSStatus, sign-extended. getErrorCode(): 0 for 0, 7 for -43 (file not found), 42 for any
+// other.
+class ZT_EXCEPTION_CLASS CarbonError : public OSException {
+ public:
+  explicit CarbonError(short code);  // "Unknown error code"
+  CarbonError(const char* message, short code);
+  CarbonError(const CarbonError&) = default;
+  CarbonError& operator=(const CarbonError&) = default;
+  ~CarbonError() override;
+
+  std::uint32_t getErrorCode() const noexcept override;
+};
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

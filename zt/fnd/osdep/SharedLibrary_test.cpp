@@ -1,0 +1,270 @@
+#include "zt/fnd/osdep/SharedLibrary.h"
+
+#include <dlfcn.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cstring>
+#include <string>
+
+#include "tests/support/Child.h"
+#include "tests/support/Modules.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/OSException.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::IsMapped;
+using vlt::test::MakeModule;
+using vlt::test::TempDir;
+
+String Wide(const std::string& text) { return String(text.c_str()); }
+
+bool Works(void* function) {
+  return function != nullptr && reinterpret_cast<double (*)(double)>(function)(0.0) == 1.0;
+}
+
+TEST(Library, EmptyNameLoadsNothing) {
+  SharedLibrary none;
+  EXPECT_FALSE(none.isLoaded());
+  none.load();
+  EXPECT_FALSE(none.isLoaded());
+  EXPECT_EQ(nullptr, none.getHandle());
+  EXPECT_FALSE(SharedLibrary(String(), true, false).isLoaded());
+  none.unload();
+}
+
+TEST(Library, NameWithoutADotIsDecoratedInItsDirectory) {
+  TempDir dir;
+  MakeModule(dir / "libfoo.so");
+  {
+    SharedLibrary library(Wide(dir / "foo"), true, false);
+    EXPECT_TRUE(library.isLoaded());
+    EXPECT_TRUE(IsMapped(dir / "libfoo.so"));
+    EXPECT_TRUE(Works(library.getFunctionPointer(AnsiString("cos"), false)));
+    EXPECT_TRUE(Works(library.getFunctionPointer(String(L"cos"), false)));
+  }
+  EXPECT_FALSE(IsMapped(dir / "libfoo.so"));
+}
+
+TEST(Library, NameWithADotGetsNoSuffixInAnyStep) {
+  TempDir dir;
+  MakeModule(dir / "libfoo.x.so");
+  MakeModule(dir / "foo.x");
+  dir.makeDir("foo.x.framework");
+  MakeModule(dir / "foo.x.framework/libfoo.x.so");
+  dir.makeDir("foo.x.bundle");
+  MakeModule(dir / "foo.x.bundle/libfoo.x.so");
+  SharedLibrary library(Wide(dir / "foo.x"), true, false);
+  EXPECT_TRUE(IsMapped(dir / "foo.x"));
+  EXPECT_FALSE(IsMapped(dir / "libfoo.x.so"));
+  EXPECT_FALSE(IsMapped(dir / "foo.x.framework/libfoo.x.so"));
+  EXPECT_FALSE(IsMapped(dir / "foo.x.bundle/libfoo.x.so"));
+}
+
+TEST(Library, NameWithoutADotIsNeverTriedUndecorated) {
+  TempDir dir;
+  MakeModule(dir / "foo");
+  EXPECT_FALSE(SharedLibrary(Wide(dir / "foo"), true, false).isLoaded());
+}
+
+TEST(Library, DottedDirectoryDoesNotCountAsADottedName) {
+  TempDir dir;
+  dir.makeDir("a.b");
+  MakeModule(dir / "a.b/libfoo.so");
+  EXPECT_TRUE(SharedLibrary(Wide(dir / "a.b/foo"), true, false).isLoaded());
+}
+
+TEST(Library, SearchOrderIsFrameworkBundleLibrary) {
+  TempDir dir;
+  const std::string framework = dir / "X.framework/libX.so", bundle = dir / "X.bundle/libX.so",
+                    library = dir / "libX.so";
+  MakeModule(library);
+  {
+    SharedLibrary loaded(Wide(dir / "X"), true, false);
+    EXPECT_TRUE(IsMapped(library));
+  }
+  dir.makeDir("X.bundle");
+  MakeModule(bundle);
+  {
+    SharedLibrary loaded(Wide(dir / "X"), true, false);
+    EXPECT_TRUE(IsMapped(bundle));
+    EXPECT_FALSE(IsMapped(library));
+    EXPECT_TRUE(Works(loaded.getFunctionPointer(AnsiString("cos"), false)));
+  }
+  dir.makeDir("X.framework");
+  MakeModule(framework);
+  {
+    SharedLibrary loaded(Wide(dir / "X"), true, false);
+    EXPECT_TRUE(IsMapped(framework));
+    EXPECT_FALSE(IsMapped(bundle));
+    EXPECT_TRUE(loaded.isLoaded());
+  }
+  EXPECT_FALSE(IsMapped(framework));
+}
+
+TEST(Library, FileWithABundlesNameIsLoadedItself) {
+  TempDir dir;
+  MakeModule(dir / "X.vle");
+  SharedLibrary library(Wide(dir / "X.vle"), true, false);
+  EXPECT_TRUE(library.isLoaded());
+  EXPECT_TRUE(IsMapped(dir / "X.vle"));
+}
+
+TEST(Library, FailedLoadIsQuiet) {
+  TempDir dir;
+  vlt::test::WriteBytes(dir / "libbroken.so", "no module");
+  ASSERT_EQ(0, mkfifo((dir / "libpipe.so").c_str(), 0600));
+  dir.makeDir("libdir.so");
+  for (const char* name : {"missing", "broken", "pipe", "dir", "libdir.so", "libpipe.so"}) {
+    SharedLibrary library(Wide(dir / name), true, false);
+    EXPECT_FALSE(library.isLoaded()) << name;
+    library.load(Wide(dir / name));  // nothing has been loaded: allowed again
+    EXPECT_FALSE(library.isLoaded()) << name;
+  }
+}
+
+TEST(Library, LoadByNameAfterALoadIsInvalidEvenWhenUnloaded) {
+  TempDir dir;
+  MakeModule(dir / "libfoo.so");
+  SharedLibrary library;
+  library.load(Wide(dir / "foo"));
+  ASSERT_TRUE(library.isLoaded());
+  EXPECT_THROW(library.load(Wide(dir / "foo")), exception::InvalidOperation);
+  library.unload();
+  EXPECT_FALSE(library.isLoaded());
+  EXPECT_EQ(nullptr, library.getHandle());
+  EXPECT_THROW(library.load(Wide(dir / "foo")), exception::InvalidOperation);
+  library.load();  // the requested name has stayed
+  EXPECT_TRUE(library.isLoaded());
+}
+
+TEST(Library, LoadAgainReplacesTheHandle) {
+  TempDir dir;
+  MakeModule(dir / "libfoo.so");
+  {
+    SharedLibrary library(Wide(dir / "foo"), true, false);
+    library.load();
+    library.load();
+    EXPECT_TRUE(library.isLoaded());
+  }
+  EXPECT_FALSE(IsMapped(dir / "libfoo.so")) << "a load was not given back";
+}
+
+TEST(Library, UnloadedLookUp) {
+  SharedLibrary library;
+  EXPECT_EQ(nullptr, library.getFunctionPointer(AnsiString("cos"), true));
+  EXPECT_EQ(nullptr, library.getFunctionPointer(String(L"cos"), true));
+  dlerror();
+  try {
+    library.getFunctionPointer(AnsiString("cos"), false);
+    FAIL();
+  } catch (const PosixError& e) {
+    EXPECT_STREQ("", e.what());
+    EXPECT_EQ(42u, e.getErrorCode());
+  }
+}
+
+TEST(Library, MissingFunctionIsThrownWithTheLoadersText) {
+  TempDir dir;
+  MakeModule(dir / "libfoo.so");
+  SharedLibrary library(AnsiString((dir / "foo").c_str()), true, true);
+  EXPECT_EQ(nullptr, library.getFunctionPointer(AnsiString("no_such_function"), true));
+  try {
+    library.getFunctionPointer(String(L"no_such_function"), false);
+    FAIL();
+  } catch (const PosixError& e) {
+    EXPECT_NE(nullptr, strstr(e.what(), "no_such_function"));
+  }
+}
+
+TEST(Library, ModuleStaysWhenTheObjectIsToldSo) {
+  for (bool bundle : {false, true}) {
+    TempDir dir;
+    dir.makeDir("X.bundle");
+    std::string module = bundle ? dir / "X.bundle/libX.so" : dir / "libX.so";
+    MakeModule(module);
+    void* function;
+    {
+      SharedLibrary library(Wide(dir / "X"), false, false);
+      function = library.getFunctionPointer(AnsiString("cos"), false);
+    }
+    EXPECT_TRUE(IsMapped(module)) << bundle;
+    EXPECT_TRUE(Works(function));
+  }
+}
+
+TEST(Library, CopiesHoldLoadsOfTheirOwn) {
+  TempDir dir;
+  MakeModule(dir / "libfoo.so");
+  MakeModule(dir / "libbar.so");
+  {
+    auto* first = new SharedLibrary(Wide(dir / "foo"), true, false);
+    SharedLibrary copy(*first), assigned(Wide(dir / "bar"), true, false);
+    assigned = *first;
+    EXPECT_FALSE(IsMapped(dir / "libbar.so"));
+    delete first;
+    EXPECT_TRUE(copy.isLoaded());
+    EXPECT_TRUE(assigned.isLoaded());
+    copy.unload();
+    SharedLibrary ofUnloaded(copy);
+    EXPECT_FALSE(ofUnloaded.isLoaded());
+    EXPECT_THROW(ofUnloaded.load(Wide(dir / "bar")), exception::InvalidOperation);
+    SharedLibrary& self = assigned;
+    assigned = self;
+    EXPECT_TRUE(assigned.isLoaded());
+  }
+  EXPECT_FALSE(IsMapped(dir / "libfoo.so"));
+}
+
+TEST(Library, SwapExchangesAll) {
+  TempDir dir;
+  MakeModule(dir / "libfoo.so");
+  SharedLibrary loaded(Wide(dir / "foo"), true, false), empty;
+  void* handle = loaded.getHandle();
+  loaded.swap(empty);
+  EXPECT_FALSE(loaded.isLoaded());
+  EXPECT_EQ(handle, empty.getHandle());
+  loaded.load();
+  EXPECT_FALSE(loaded.isLoaded());  // the requested name went along
+}
+
+TEST(Library, DecorateNameChangesNothing) {
+  EXPECT_STREQ("foo", AnsiString(SharedLibrary::decorateName(L"foo")).c_str());
+}
+
+// ---- bare names: the loader's own search path, which is read when a process starts
+
+TEST(LibraryBare, DISABLED_InsideAProcessWithAPath) {
+  EXPECT_TRUE(SharedLibrary(String(L"bare"), true, false).isLoaded());
+  EXPECT_TRUE(SharedLibrary(String(L"libbare.so"), true, false).isLoaded());
+  EXPECT_FALSE(SharedLibrary(String(L"absent"), true, false).isLoaded());
+}
+
+TEST(LibraryBare, NameGoesToTheLoaderAsLibNameSo) {
+  TempDir dir;
+  MakeModule(dir / "libbare.so");
+  auto run = [&](const std::string& path) {
+    return vlt::test::RunProgram({"/proc/self/exe", "--gtest_also_run_disabled_tests",
+                                  "--gtest_filter=LibraryBare.DISABLED_InsideAProcessWithAPath"},
+                                 {{"LD_LIBRARY_PATH", path}});
+  };
+  EXPECT_EQ(0, run(dir.path()).exitCode);
+  EXPECT_EQ(1, run(dir / "elsewhere").exitCode);
+}
+
+TEST(LibraryBare, WorkingDirectoryIsNotSearched) {
+  TempDir dir;
+  MakeModule(dir / "libhere.so");
+  vlt::test::Child child([&] {
+    if (chdir(dir.path().c_str()) != 0) return 1;
+    return SharedLibrary(String(L"here"), true, false).isLoaded() ? 2 : 0;
+  });
+  EXPECT_EQ(0, child.wait());
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

@@ -1,0 +1,49 @@
+#pragma once
+
+#include <sys/types.h>
+
+#include "zt/fnd/StringFwd.h"
+
+// The place in the file system where objects live that processes of different users share by name.
+//
+// Everything there is open to all users: directories 0777, files 0666, whatever the umask. Nothing
+// is removed when a process ends. As any user may put anything there, nothing follows a symbolic
+// link, waits for a pipe, or touches a file that has a second name elsewhere. All steps may be
+// repeated, and run in several processes at once. Threads: any.
+namespace zt {
+namespace fnd {
+namespace osdep {
+
+// "/var/tmp/zentrex/shared", or $ZTFNDTMPSHAREDFILEDIR, read at each call, where that is absolute.
+String GetSharedUnixBase();
+
+// The path of a file in the directory `dirName` below the base. Makes the directory;
+// throws what CreateSharedUnixDir throws.
+AnsiString BuildSharedUnixFilePath(const String& dirName, const String& fileName);
+
+// Makes the directory with all missing ones above it, and gives it mode 0777, also if it was there;
+// one that belongs to somebody else stays as it is. The path ends in "/". Throws PosixError: with
+// ENOTDIR where a file or a link stands in its place. Passes on AccessDenied from
+// path::CreateDir.
+void CreateSharedUnixDir(const String& path);
+
+// Opens the file for reading and writing, made if missing, and gives it mode 0666; one that belongs
+// to somebody else stays as it is. Returns the descriptor, close-on-exec, which the caller owns.
+// Throws PosixError: refused access (EACCES) after three attempts a millisecond apart, EPERM for any
+// failure to set the mode, ENXIO for what is no regular file, EMLINK for a file with several names.
+int CreateSharedUnixFile(const AnsiString& path);
+
+// Which file a descriptor belongs to.
+struct FileIdentity {
+  dev_t device = 0;
+  ino_t inode = 0;
+
+  static FileIdentity Of(int fd);
+
+  // False if the path names another file by now, or none. True when it cannot be asked.
+  bool isNamedBy(const AnsiString& path) const;
+};
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

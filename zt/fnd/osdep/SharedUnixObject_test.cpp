@@ -1,0 +1,299 @@
+#include "zt/fnd/osdep/SharedUnixObject.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <chrono>
+#include <string>
+#include <vector>
+
+#include "tests/support/Child.h"
+#include "tests/support/FailSystemCall.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/ScopedFd.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::Child;
+using vlt::test::ModeOf;
+using vlt::test::ReadBytes;
+using vlt::test::TempDir;
+using vlt::test::WriteBytes;
+
+constexpr const char* kVariable = "ZTFNDTMPSHAREDFILEDIR";
+constexpr uid_t kSomeUser = 65534, kOtherUser = 65533;
+
+String Wide(const std::string& text) { return String(text.c_str()); }
+
+template <class Call>
+int PosixErrorOf(Call call) {
+  try {
+    call();
+  } catch (const PosixError& e) {
+    return static_cast<int>(e.whatcode());
+  }
+  return -1;
+}
+
+int Open(const std::string& path) {
+  return ScopedFd(CreateSharedUnixFile(AnsiString(path.c_str()))).get();
+}
+
+// ---- where
+
+TEST(FileShared, BaseIsTheAbsoluteVariableOrTheDefault) {
+  std::string kept = getenv(kVariable);
+  const struct {
+    const char* value;
+    const char* base;
+  } rows[] = {{"relative/path", "/var/tmp/zentrex/shared"},
+              {"", "/var/tmp/zentrex/shared"},
+              {"/some/where", "/some/where"},
+              {nullptr, "/var/tmp/zentrex/shared"}};
+  for (const auto& row : rows) {
+    if (row.value) {
+      setenv(kVariable, row.value, 1);
+    } else {
+      unsetenv(kVariable);
+    }
+    EXPECT_STREQ(row.base, AnsiString(GetSharedUnixBase()).c_str());
+  }
+  setenv(kVariable, kept.c_str(), 1);
+}
+
+TEST(FileShared, PathIsBaseDirectoryAndNameAndTheDirectoryExists) {
+  TempDir dir;
+  setenv(kVariable, (dir / "base").c_str(), 1);
+  EXPECT_EQ(dir / "base/things/name", BuildSharedUnixFilePath(L"things", L"name").c_str());
+  EXPECT_EQ(0777, ModeOf(dir / "base"));
+  EXPECT_EQ(0777, ModeOf(dir / "base/things"));
+  EXPECT_FALSE(vlt::test::Exists(dir / "base/things/name"));
+  EXPECT_EQ(dir / "base/things/n", BuildSharedUnixFilePath(L"things/", L"n").c_str());
+}
+
+// ---- directories
+
+TEST(FileShared, ModesStandUnderEveryUmask) {
+  for (mode_t mask : {077, 0, 022, 0777}) {
+    TempDir dir;
+    Child child([&] {
+      umask(mask);
+      CreateSharedUnixDir(Wide(dir / "a/b/"));
+      Open(dir / "a/b/file");
+      return umask(mask) == mask ? 0 : 1;  // and the umask is as it was
+    });
+    EXPECT_EQ(0, child.wait());
+    EXPECT_EQ(0777, ModeOf(dir / "a")) << mask;
+    EXPECT_EQ(0777, ModeOf(dir / "a/b")) << mask;
+    EXPECT_EQ(0666, ModeOf(dir / "a/b/file")) << mask;
+  }
+}
+
+TEST(FileShared, ExistingObjectsAreOpenedToAllAtEachCall) {
+  TempDir dir;
+  mkdir((dir / "d").c_str(), 0700);
+  WriteBytes(dir / "d/file", "kept");
+  chmod((dir / "d/file").c_str(), 0600);
+  CreateSharedUnixDir(Wide(dir / "d/"));
+  Open(dir / "d/file");
+  EXPECT_EQ(0777, ModeOf(dir / "d"));
+  EXPECT_EQ(0666, ModeOf(dir / "d/file"));
+  EXPECT_EQ("kept", ReadBytes(dir / "d/file"));
+}
+
+TEST(FileShared, FileInTheDirectorysPlaceIsENOTDIR) {
+  TempDir dir;
+  WriteBytes(dir / "d", "x");
+  EXPECT_EQ(ENOTDIR, PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/")); }));
+  EXPECT_EQ(ENOTDIR, PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/sub/")); }));
+  setenv(kVariable, dir.path().c_str(), 1);
+  EXPECT_EQ(ENOTDIR, PosixErrorOf([] { BuildSharedUnixFilePath(L"d", L"name"); }));
+  EXPECT_EQ("x", ReadBytes(dir / "d"));
+}
+
+TEST(FileShared, LinkInTheDirectorysPlaceIsNotFollowed) {
+  TempDir dir;
+  ASSERT_EQ(0, mkdir((dir / "target").c_str(), 0700));
+  ASSERT_EQ(0, symlink("target", (dir / "d").c_str()));
+  EXPECT_EQ(ENOTDIR, PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/")); }));
+  EXPECT_EQ(0700, ModeOf(dir / "target"));
+}
+
+TEST(FileShared, RefusedDirectoryIsAccessDenied) {
+  EXPECT_THROW(CreateSharedUnixDir(L"/proc/no/such/"), exception::AccessDenied);
+}
+
+TEST(FileShared, SimultaneousStartsAllSucceed) {
+  for (int round = 0; round < 20; ++round) {
+    TempDir dir;
+    vlt::test::Signal go;
+    std::vector<Child> children;
+    for (int i = 0; i < 6; ++i) {
+      children.emplace_back([&] {
+        if (!go.await()) return 1;
+        CreateSharedUnixDir(Wide(dir / "a/b/c/d/"));
+        Open(dir / "a/b/c/d/file");
+        return 0;
+      });
+    }
+    for (int i = 0; i < 6; ++i) go.notify();
+    for (Child& child : children) EXPECT_EQ(0, child.wait());
+    EXPECT_EQ(0777, ModeOf(dir / "a/b/c/d"));
+  }
+}
+
+TEST(FileShared, DirectoryOfAnotherUserIsUsedAsItIs) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs to become another user";
+  TempDir dir;
+  chmod(dir.path().c_str(), 0755);
+  ASSERT_EQ(0, mkdir((dir / "d").c_str(), 0755));
+  chmod((dir / "d").c_str(), 0755);
+  ASSERT_EQ(0, mkdir((dir / "unreadable").c_str(), 0711));
+  chmod((dir / "unreadable").c_str(), 0711);
+  Child child([&] {
+    if (setresuid(kSomeUser, kSomeUser, kSomeUser) != 0) return 1;
+    CreateSharedUnixDir(Wide(dir / "d/"));
+    CreateSharedUnixDir(Wide(dir / "unreadable/"));
+    return 0;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(0755, ModeOf(dir / "d"));
+  EXPECT_EQ(0711, ModeOf(dir / "unreadable"));
+}
+
+TEST(FileShared, OwnDirectoryThatMayNotBeReadIsOpenedToAll) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs to become another user";
+  TempDir dir;
+  chmod(dir.path().c_str(), 0777);
+  Child child([&] {
+    if (setresuid(kSomeUser, kSomeUser, kSomeUser) != 0) return 1;
+    mkdir((dir / "d").c_str(), 0300);
+    CreateSharedUnixDir(Wide(dir / "d/"));
+    return 0;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(0777, ModeOf(dir / "d"));
+}
+
+// ---- files
+
+TEST(FileShared, DescriptorReadsWritesAndClosesOnExec) {
+  TempDir dir;
+  ScopedFd fd(CreateSharedUnixFile(AnsiString((dir / "f").c_str())));
+  EXPECT_EQ(O_RDWR, fcntl(fd.get(), F_GETFL) & O_ACCMODE);
+  EXPECT_EQ(FD_CLOEXEC, fcntl(fd.get(), F_GETFD));
+  EXPECT_EQ(3, write(fd.get(), "abc", 3));
+  Open(dir / "f");
+  EXPECT_EQ("abc", ReadBytes(dir / "f"));  // opening again cuts nothing
+}
+
+TEST(FileShared, FileOfAnotherUserIsUsedThoughItsModeCannotBeSet) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs to become another user";
+  TempDir dir;
+  chmod(dir.path().c_str(), 0777);
+  WriteBytes(dir / "f", "x");
+  ASSERT_EQ(0, chown((dir / "f").c_str(), kSomeUser, kSomeUser));
+  ASSERT_EQ(0, chmod((dir / "f").c_str(), 0667));
+  Child child([&] {
+    if (setresuid(kOtherUser, kOtherUser, kOtherUser) != 0) return 1;
+    ScopedFd fd(CreateSharedUnixFile(AnsiString((dir / "f").c_str())));
+    return write(fd.get(), "y", 1) == 1 ? 0 : 2;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(0667, ModeOf(dir / "f"));
+  EXPECT_EQ("y", ReadBytes(dir / "f"));
+}
+
+TEST(FileShared, RefusedFileIsTriedThreeTimes) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs to become another user";
+  TempDir dir;
+  chmod(dir.path().c_str(), 0777);
+  WriteBytes(dir / "f", "x");
+  ASSERT_EQ(0, chmod((dir / "f").c_str(), 0600));
+  Child child([&] {
+    if (setresuid(kSomeUser, kSomeUser, kSomeUser) != 0) return 1;
+    int before = vlt::test::OpenDescriptors();
+    auto start = std::chrono::steady_clock::now();
+    if (PosixErrorOf([&] { Open(dir / "f"); }) != EACCES) return 2;
+    // Two pauses of a millisecond lie between three attempts.
+    if (std::chrono::steady_clock::now() - start < std::chrono::milliseconds(2)) return 3;
+    return vlt::test::OpenDescriptors() == before ? 0 : 4;
+  });
+  EXPECT_EQ(0, child.wait());
+}
+
+TEST(FileShared, WhatIsNoFileOfItsOwnIsRefusedUntouched) {
+  TempDir dir;
+  dir.makeDir("directory");
+  ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0600));
+  WriteBytes(dir / "victim", "x");
+  chmod((dir / "victim").c_str(), 0600);
+  ASSERT_EQ(0, symlink("victim", (dir / "link").c_str()));
+  ASSERT_EQ(0, symlink("nowhere", (dir / "dangling").c_str()));
+  int before = vlt::test::OpenDescriptors();
+  EXPECT_EQ(EISDIR, PosixErrorOf([&] { Open(dir / "directory"); }));
+  EXPECT_EQ(ENXIO, PosixErrorOf([&] { Open(dir / "fifo"); }));
+  EXPECT_EQ(ELOOP, PosixErrorOf([&] { Open(dir / "link"); }));
+  EXPECT_EQ(ELOOP, PosixErrorOf([&] { Open(dir / "dangling"); }));
+  ASSERT_EQ(0, link((dir / "victim").c_str(), (dir / "hard").c_str()));
+  EXPECT_EQ(EMLINK, PosixErrorOf([&] { Open(dir / "hard"); }));
+  EXPECT_EQ(ENOENT, PosixErrorOf([&] { Open(dir / "missing/f"); }));
+  EXPECT_EQ(ENAMETOOLONG, PosixErrorOf([&] { Open(dir / std::string(256, 'x')); }));
+  EXPECT_EQ(before, vlt::test::OpenDescriptors());
+  EXPECT_EQ(0600, ModeOf(dir / "victim"));
+  EXPECT_EQ(0600, ModeOf(dir / "fifo"));
+  EXPECT_FALSE(vlt::test::Exists(dir / "nowhere"));
+}
+
+TEST(FileShared, FailureToSetTheModeIsAlwaysEPERM) {
+  TempDir dir;
+  Child child([&] {
+    if (!vlt::test::FailSystemCall(SYS_fchmod, EIO)) return 1;
+    int before = vlt::test::OpenDescriptors();
+    if (PosixErrorOf([&] { Open(dir / "f"); }) != EPERM) return 2;
+    if (vlt::test::OpenDescriptors() != before) return 3;
+    // A directory's failure keeps its own number.
+    return PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/")); }) == EIO ? 0 : 4;
+  });
+  EXPECT_EQ(0, child.wait());
+}
+
+TEST(FileShared, RefusedModeIsAcceptedForFilesAndDirectories) {
+  TempDir dir;
+  Child child([&] {
+    if (!vlt::test::FailSystemCall(SYS_fchmod, EPERM)) return 1;
+    CreateSharedUnixDir(Wide(dir / "d/"));
+    Open(dir / "d/f");
+    return 0;
+  });
+  EXPECT_EQ(0, child.wait());
+}
+
+// ---- identity
+
+TEST(FileShared, IdentityTellsWhetherThePathStillNamesTheFile) {
+  TempDir dir;
+  AnsiString path((dir / "f").c_str());
+  ScopedFd fd(CreateSharedUnixFile(path));
+  FileIdentity identity = FileIdentity::Of(fd.get());
+  EXPECT_TRUE(identity.isNamedBy(path));
+  ASSERT_EQ(0, unlink(path.c_str()));
+  EXPECT_FALSE(identity.isNamedBy(path));
+  WriteBytes(path.c_str(), "another");
+  EXPECT_FALSE(identity.isNamedBy(path));
+  ASSERT_EQ(0, unlink(path.c_str()));
+  ASSERT_EQ(0, symlink(("/proc/self/fd/" + std::to_string(fd.get())).c_str(), path.c_str()));
+  EXPECT_FALSE(identity.isNamedBy(path));  // a link to it is not it
+  EXPECT_FALSE(identity.isNamedBy(AnsiString((dir / "no/f").c_str())));
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

@@ -1,0 +1,18 @@
+#include "zt/fnd/osdep/Sleep.h"
+
+#include <cerrno>
+#include <ctime>
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+
+void Sleep(unsigned int ms) {
+  timespec left = {static_cast<time_t>(ms / 1000), static_cast<long>(ms % 1000) * 1000000L};
+  while (nanosleep(&left, &left) != 0 && errno == EINTR) {
+  }
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,110 @@
+#include "zt/fnd/osdep/StringCompare.h"
+
+#include <cctype>
+#include <cstdint>
+#include <cstring>
+#include <cwchar>
+#include <cwctype>
+#include <limits>
+
+#include "zt/fnd/Exception.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+const char* OrEmpty(const char* s) { return s == nullptr ? "" : s; }
+const wchar_t* OrEmpty(const wchar_t* s) { return s == nullptr ? L"" : s; }
+
+int Upper(char c) { return std::toupper(static_cast<unsigned char>(c)); }
+wchar_t Upper(wchar_t c) {
+  return static_cast<wchar_t>(std::towupper(static_cast<std::wint_t>(c)));
+}
+
+int Raw(char c) { return static_cast<unsigned char>(c); }
+wchar_t Raw(wchar_t c) { return c; }
+
+int Difference(int a, int b) { return a - b; }
+int Difference(wchar_t a, wchar_t b) { return std::wcsncmp(&a, &b, 1); }
+
+// Equal characters fold to equal ones, whatever the locale: only a raw difference needs the
+// library's tables.
+template <class C>
+int FoldedDifference(C a, C b) {
+  return a == b ? 0 : Difference(Upper(a), Upper(b));
+}
+
+template <class C>
+int RawDifference(C a, C b) {
+  return a == b ? 0 : Difference(Raw(a), Raw(b));
+}
+
+template <class C>
+int CompareFolded(const C* a, const C* b) {
+  for (;; ++a, ++b) {
+    const int difference = FoldedDifference(*a, *b);
+    if (difference != 0 || *a == C() || *b == C()) return difference;
+  }
+}
+
+template <class C, int (*CharDifference)(C, C)>
+int CompareRanges(const C* a, const C* aEnd, const C* b, const C* bEnd) {
+  while (a != aEnd && b != bEnd) {
+    const int difference = CharDifference(*a++, *b++);
+    if (difference != 0) return difference;
+  }
+  return LengthDifference(aEnd - a, bEnd - b);
+}
+
+}  // namespace
+
+int LengthDifference(long long a, long long b) {
+  const long long difference = a - b;
+  if (difference < std::numeric_limits<std::int32_t>::min() ||
+      difference > std::numeric_limits<std::int32_t>::max()) {
+    ZT_RAISE(exception::OutOfRange());
+  }
+  return static_cast<int>(difference);
+}
+
+int StringCaseCompare(const char* a, const char* b) {
+  return CompareFolded(OrEmpty(a), OrEmpty(b));
+}
+
+int StringCaseCompare(const wchar_t* a, const wchar_t* b) {
+  a = OrEmpty(a);
+  b = OrEmpty(b);
+  // Against the empty text the characters compare as they are: a locale that folds a character to
+  // a smaller one must not change which text is the longer.
+  if (*a == L'\0' || *b == L'\0') return std::wcsncmp(a, b, 1);
+  return CompareFolded(a, b);
+}
+
+int StringExactCompare(const char* a, const char* b) { return std::strcmp(OrEmpty(a), OrEmpty(b)); }
+
+int StringExactCompare(const wchar_t* a, const wchar_t* b) {
+  return std::wcscmp(OrEmpty(a), OrEmpty(b));
+}
+
+int StringCaseCompare(const char* a, const char* aEnd, const char* b, const char* bEnd) {
+  return CompareRanges<char, FoldedDifference<char>>(a, aEnd, b, bEnd);
+}
+
+int StringCaseCompare(const wchar_t* a, const wchar_t* aEnd, const wchar_t* b,
+                      const wchar_t* bEnd) {
+  return CompareRanges<wchar_t, FoldedDifference<wchar_t>>(a, aEnd, b, bEnd);
+}
+
+int StringExactCompare(const char* a, const char* aEnd, const char* b, const char* bEnd) {
+  return CompareRanges<char, RawDifference<char>>(a, aEnd, b, bEnd);
+}
+
+int StringExactCompare(const wchar_t* a, const wchar_t* aEnd, const wchar_t* b,
+                       const wchar_t* bEnd) {
+  return CompareRanges<wchar_t, RawDifference<wchar_t>>(a, aEnd, b, bEnd);
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

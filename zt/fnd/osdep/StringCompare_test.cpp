@@ -1,0 +1,125 @@
+#include "zt/fnd/osdep/StringCompare.h"
+
+#include <gtest/gtest.h>
+
+#include <climits>
+#include <clocale>
+
+#include "tests/support/ScopedLocale.h"
+#include "zt/fnd/Exception.h"
+
+using namespace zt::fnd;
+using namespace zt::fnd::osdep;
+using vlt::test::ScopedLocale;
+
+namespace {
+
+template <class C, std::size_t A, std::size_t B>
+int CaseRanges(const C (&a)[A], const C (&b)[B]) {
+  return StringCaseCompare(a, a + A - 1, b, b + B - 1);
+}
+
+template <class C, std::size_t A, std::size_t B>
+int ExactRanges(const C (&a)[A], const C (&b)[B]) {
+  return StringExactCompare(a, a + A - 1, b, b + B - 1);
+}
+
+const char* const k_null = nullptr;
+const wchar_t* const k_wideNull = nullptr;
+
+}  // namespace
+
+TEST(TextCompare, NullIsEmpty) {
+  EXPECT_EQ(0, StringCaseCompare(k_null, ""));
+  EXPECT_EQ(0, StringCaseCompare(k_null, k_null));
+  EXPECT_EQ(0, StringCaseCompare(L"", k_wideNull));
+  EXPECT_EQ(0, StringExactCompare(k_null, ""));
+  EXPECT_EQ(0, StringExactCompare(k_wideNull, L""));
+  EXPECT_LT(StringCaseCompare(k_null, "a"), 0);
+  EXPECT_GT(StringCaseCompare(L"a", k_wideNull), 0);
+  EXPECT_GT(StringExactCompare("a", k_null), 0);
+  EXPECT_LT(StringExactCompare(k_wideNull, L"a"), 0);
+}
+
+TEST(TextCompare, CaseIsFolded) {
+  EXPECT_EQ(0, StringCaseCompare("KORComponents", "korcomponentS"));
+  EXPECT_EQ(0, StringCaseCompare(L"KORComponents", L"korcomponentS"));
+  EXPECT_LT(StringCaseCompare("abc", "ABD"), 0);
+  EXPECT_GT(StringCaseCompare(L"abd", L"ABC"), 0);
+}
+
+TEST(TextCompare, NarrowResultIsTheDifferenceOfTheFoldedCharacters) {
+  EXPECT_EQ('A' - 'C', StringCaseCompare("xa", "Xc"));
+  EXPECT_EQ('C', StringCaseCompare("abc", "ab"));
+  EXPECT_EQ(-'C', StringCaseCompare("AB", "abc"));
+  EXPECT_EQ('_' - 'Z', StringCaseCompare("_", "z")) << "folding is upward";
+  EXPECT_EQ(0xE9 - 'A', StringCaseCompare("\xE9", "a")) << "bytes are unsigned";
+}
+
+TEST(TextCompare, WideResultHasASign) {
+  EXPECT_LT(StringCaseCompare(L"ab", L"ABC"), 0);
+  EXPECT_GT(StringCaseCompare(L"abc", L"AB"), 0);
+  EXPECT_LT(StringCaseCompare(L"", L"a"), 0);
+  EXPECT_GT(StringCaseCompare(L"a", L""), 0);
+  EXPECT_GT(StringCaseCompare(L"_", L"z"), 0);
+  EXPECT_GT(StringCaseCompare(L"\x10FFFF", L"a"), 0);
+}
+
+TEST(TextCompare, ExactSeesCase) {
+  EXPECT_EQ(0, StringExactCompare("abc", "abc"));
+  EXPECT_GT(StringExactCompare("a", "A"), 0);
+  EXPECT_LT(StringExactCompare(L"A", L"a"), 0);
+  EXPECT_EQ(0, StringExactCompare(L"a\xE9", L"a\xE9"));
+}
+
+TEST(TextCompare, FoldsByTheHostsLocale) {
+  const wchar_t lower[] = L"\xE9", upper[] = L"\xC9";
+  {
+    const ScopedLocale locale(LC_CTYPE, "C");
+    EXPECT_NE(0, StringCaseCompare(lower, upper));
+    EXPECT_NE(0, StringCaseCompare(L"\x131", L"i"));
+  }
+  const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
+  EXPECT_EQ(0, StringCaseCompare(lower, upper));
+  EXPECT_EQ(0, StringCaseCompare(L"\x131", L"i")) << "both fold to I";
+  EXPECT_EQ(0, StringCaseCompare(L"\x17F", L"s"));
+  EXPECT_NE(0, StringExactCompare(lower, upper));
+}
+
+TEST(TextCompare, RangesReturnLengthDifferences) {
+  EXPECT_EQ(-1, CaseRanges("ab", "abc"));
+  EXPECT_EQ(-1, CaseRanges(L"ab", L"ABC"));
+  EXPECT_EQ(3, CaseRanges("abcde", "AB"));
+  EXPECT_EQ(-2, ExactRanges("", "ab"));
+  EXPECT_EQ(2, ExactRanges(L"ab", L""));
+  EXPECT_EQ(0, CaseRanges("", ""));
+  EXPECT_EQ(0, StringCaseCompare(k_null, k_null, k_null, k_null));
+}
+
+TEST(TextCompare, RangesStopAtTheFirstDifference) {
+  EXPECT_EQ('A' - 'B', CaseRanges("aazz", "abb"));
+  EXPECT_GT(CaseRanges(L"bzz", L"azzzz"), 0);
+  EXPECT_EQ('a' - 'A', ExactRanges("a", "A"));
+  EXPECT_GT(ExactRanges("\xE9", "a"), 0) << "bytes are unsigned";
+  EXPECT_GT(ExactRanges(L"a", L"A"), 0);
+}
+
+TEST(TextCompare, RangesSeeThroughZeros) {
+  EXPECT_NE(0, CaseRanges("a\0b", "a\0c"));
+  EXPECT_EQ(0, CaseRanges("a\0b", "A\0B"));
+  EXPECT_EQ(1, ExactRanges(L"a\0b", L"a\0"));
+}
+
+TEST(TextCompare, DifferenceBeyond32BitsRaises) {
+  EXPECT_EQ(INT_MAX, LengthDifference(INT_MAX, 0));
+  EXPECT_EQ(INT_MIN, LengthDifference(0, 0x80000000LL));
+  EXPECT_THROW(LengthDifference(0x80000000LL, 0), exception::OutOfRange);
+  EXPECT_THROW(LengthDifference(0, 0x80000001LL), exception::OutOfRange);
+  if (sizeof(void*) == 8) {
+    // The ends are compared, the characters never read: one side is empty.
+    const char* const begin = reinterpret_cast<const char*>(0x10000);
+    const char* const end = reinterpret_cast<const char*>(0x10000 + 0x80000000ull);
+    EXPECT_THROW(StringCaseCompare(begin, end, begin, begin), exception::OutOfRange);
+    EXPECT_THROW(StringExactCompare(begin, end, begin, begin), exception::OutOfRange);
+  }
+}

@@ -1,0 +1,53 @@
+#include "zt/fnd/osdep/SystemString.h"
+
+#include <cstring>
+#include <cwchar>
+#include <limits>
+
+#include "zt/fnd/DLLAlloc.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+typedef std::uint32_t Count;
+
+constexpr std::uint64_t k_max32 = std::numeric_limits<std::uint32_t>::max();
+
+}  // namespace
+
+wchar_t* SystemAllocString(const wchar_t* s) {
+  if (s == nullptr) return nullptr;
+  const std::uint64_t n = std::wcslen(s);
+  return n > k_max32 ? nullptr : SystemAllocStringLen(s, static_cast<unsigned int>(n));
+}
+
+wchar_t* SystemAllocStringLen(const wchar_t* s, unsigned int n) {
+  const std::uint64_t bytes = (static_cast<std::uint64_t>(n) + 1) * sizeof(wchar_t) + sizeof(Count);
+  if (bytes > k_max32) return nullptr;
+  char* const block = static_cast<char*>(DLLMallocNoThrow(static_cast<unsigned long>(bytes)));
+  if (block == nullptr) return nullptr;
+  const Count count = n;
+  std::memcpy(block, &count, sizeof count);
+  wchar_t* const text = reinterpret_cast<wchar_t*>(block + sizeof count);
+  if (s != nullptr && n != 0) std::memcpy(text, s, static_cast<std::size_t>(n) * sizeof(wchar_t));
+  text[n] = L'\0';
+  return text;
+}
+
+void SystemFreeString(wchar_t* s) {
+  if (s != nullptr) DLLFree(reinterpret_cast<char*>(s) - sizeof(Count));
+}
+
+std::uint32_t SystemStringLen(const wchar_t* s) {
+  Count count = 0;
+  if (s != nullptr) {
+    std::memcpy(&count, reinterpret_cast<const char*>(s) - sizeof count, sizeof count);
+  }
+  return count;
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,75 @@
+#include "zt/fnd/osdep/SystemString.h"
+
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <cwchar>
+
+#include "tests/support/Child.h"
+#include "tests/support/MemoryLimit.h"
+#include "zt/fnd/DLLAlloc.h"
+
+using namespace zt::fnd;
+using namespace zt::fnd::osdep;
+
+TEST(TextSystemString, CountStandsInFrontOfTheText) {
+  wchar_t* const s = SystemAllocStringLen(L"ab", 2);
+  std::uint32_t count;
+  std::memcpy(&count, reinterpret_cast<char*>(s) - 4, 4);
+  EXPECT_EQ(2u, count);
+  EXPECT_STREQ(L"ab", s);
+  EXPECT_EQ(2u, SystemStringLen(s));
+  DLLFree(reinterpret_cast<char*>(s) - 4);
+}
+
+TEST(TextSystemString, TakesForcedLengths) {
+  wchar_t* const part = SystemAllocStringLen(L"abcdef", 3);
+  EXPECT_STREQ(L"abc", part);
+  SystemFreeString(part);
+  wchar_t* const zeros = SystemAllocStringLen(L"a\0b", 3);
+  EXPECT_EQ(0, std::wmemcmp(zeros, L"a\0b", 4));
+  EXPECT_EQ(3u, SystemStringLen(zeros));
+  SystemFreeString(zeros);
+  wchar_t* const empty = SystemAllocStringLen(L"", 0);
+  EXPECT_STREQ(L"", empty);
+  SystemFreeString(empty);
+}
+
+TEST(TextSystemString, NullTextLeavesRoomToFill) {
+  wchar_t* const s = SystemAllocStringLen(nullptr, 5);
+  ASSERT_NE(nullptr, s);
+  EXPECT_EQ(5u, SystemStringLen(s));
+  std::wmemset(s, L'x', 5);
+  EXPECT_STREQ(L"xxxxx", s);
+  SystemFreeString(s);
+}
+
+TEST(TextSystemString, CopiesTerminatedText) {
+  wchar_t* const s = SystemAllocString(L"text");
+  EXPECT_STREQ(L"text", s);
+  EXPECT_EQ(4u, SystemStringLen(s));
+  SystemFreeString(s);
+  EXPECT_EQ(nullptr, SystemAllocString(nullptr));
+  SystemFreeString(nullptr);
+}
+
+TEST(TextSystemString, SizesBeyond32BitsYieldNull) {
+  for (const unsigned n : {0x3FFFFFFEu, 0x3FFFFFFFu, 0x40000000u, 0xFFFFFFFEu, 0xFFFFFFFFu}) {
+    EXPECT_EQ(nullptr, SystemAllocStringLen(nullptr, n)) << n;
+  }
+}
+
+namespace {
+
+int AllocateWithoutMemory() {
+  vlt::test::LimitMemoryTo(4u << 20);
+  return SystemAllocStringLen(nullptr, 16u << 20) == nullptr ? 0 : 1;
+}
+
+}  // namespace
+
+TEST(TextSystemString, MissingMemoryYieldsNull) {
+  if (!vlt::test::kCanLimitMemory) GTEST_SKIP() << "the sanitizer owns the address space";
+  vlt::test::Child child(AllocateWithoutMemory);
+  EXPECT_EQ(0, child.wait());
+}

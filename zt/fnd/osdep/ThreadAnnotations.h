@@ -1,0 +1,21 @@
+#pragma once
+
+// Lock annotations that clang checks (-Wthread-safety); nothing elsewhere.
+//
+// The raw enter() and leave() of the primitives carry none, because ownership there crosses
+// functions and is recursive. Checked code takes its locks through scoped guards.
+#if defined(__clang__)
+#define ZT_THREAD_ANNOTATION(x) __attribute__((x))
+#else
+#define ZT_THREAD_ANNOTATION(x)
+#endif
+
+#define CAPABILITY(name) ZT_THREAD_ANNOTATION(capability(name))
+#define SCOPED_CAPABILITY ZT_THREAD_ANNOTATION(scoped_lockable)
+#define GUARDED_BY(lock) ZT_THREAD_ANNOTATION(guarded_by(lock))
+#define PT_GUARDED_BY(lock) ZT_THREAD_ANNOTATION(pt_guarded_by(lock))
+#define REQUIRES(...) ZT_THREAD_ANNOTATION(requires_capability(__VA_ARGS__))
+#define EXCLUDES(...) ZT_THREAD_ANNOTATION(locks_excluded(__VA_ARGS__))
+#define ACQUIRE(...) ZT_THREAD_ANNOTATION(acquire_capability(__VA_ARGS__))
+#define RELEASE(...) ZT_THREAD_ANNOTATION(release_capability(__VA_ARGS__))
+#define NO_THREAD_SAFETY_ANALYSIS ZT_THREAD_ANNOTATION(no_thread_safety_analysis)

@@ -1,0 +1,39 @@
+#include "zt/fnd/osdep/UuidSource.h"
+
+#include <fcntl.h>
+#include <sys/random.h>
+#include <unistd.h>
+
+#include "zt/fnd/osdep/Retry.h"
+#include "zt/fnd/osdep/ScopedFd.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+constexpr ssize_t k_size = 16;
+
+// For a kernel or a sandbox without getrandom().
+bool ReadRandomDevice(unsigned char* bytes) {
+  const ScopedFd device(RetryEintr([] { return open("/dev/urandom", O_RDONLY | O_CLOEXEC); }));
+  if (device.get() < 0) return false;
+  return RetryEintr([&] { return read(device.get(), bytes, k_size); }) == k_size;
+}
+
+}  // namespace
+
+// Requests of up to 256 bytes come whole from both sources once the pool is ready.
+bool NewUuidBytes(unsigned char (&bytes)[16]) {
+  if (RetryEintr([&] { return getrandom(bytes, k_size, 0); }) != k_size &&
+      !ReadRandomDevice(bytes)) {
+    return false;
+  }
+  bytes[6] = static_cast<unsigned char>((bytes[6] & 0x0F) | 0x40);  // version 4
+  bytes[8] = static_cast<unsigned char>((bytes[8] & 0x3F) | 0x80);  // the RFC's variant
+  return true;
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,322 @@
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <sys/statvfs.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <string>
+
+#include "tests/support/Child.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/path.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::Exists;
+using vlt::test::ModeOf;
+using vlt::test::ReadBytes;
+using vlt::test::TempDir;
+using vlt::test::WriteBytes;
+
+String Wide(const std::string& text) { return String(text.c_str()); }
+
+template <class Call>
+int PosixErrorOf(Call call) {
+  try {
+    call();
+  } catch (const PosixError& e) {
+    return static_cast<int>(e.whatcode());
+  }
+  return -1;
+}
+
+ino_t InodeOf(const std::string& path) {
+  struct stat info = {};
+  stat(path.c_str(), &info);
+  return info.st_ino;
+}
+
+TEST(PathTree, RemoveDirForceTakesHiddenEntriesAndLinksButNotTheirTargets) {
+  TempDir dir;
+  WriteBytes(dir.makeDir("keep") + "/file", "kept");
+  std::string top = dir.makeDir("top");
+  WriteBytes(dir.makeDir("top/sub/.deep") + "/f", "x");
+  WriteBytes(top + "/.hidden", "x");
+  ASSERT_EQ(0, symlink("../keep", (top + "/link").c_str()));
+  ASSERT_EQ(0, symlink("nowhere", (top + "/dangling").c_str()));
+  ASSERT_EQ(0, mkfifo((top + "/fifo").c_str(), 0600));
+  path::RemoveDirForce(Wide(top).c_str());
+  EXPECT_FALSE(Exists(top));
+  EXPECT_EQ("kept", ReadBytes(dir / "keep/file"));
+}
+
+TEST(PathTree, RemoveDirForceOfALinkRemovesTheLinkOnlyWithOrWithoutSlash) {
+  TempDir dir;
+  WriteBytes(dir.makeDir("target") + "/file", "kept");
+  for (const char* name : {"link", "link/", "link//"}) {
+    ASSERT_EQ(0, symlink("target", (dir / "link").c_str()));
+    path::RemoveDirForce(Wide(dir / name).c_str());
+    EXPECT_FALSE(Exists(dir / "link")) << name;
+    EXPECT_EQ("kept", ReadBytes(dir / "target/file")) << name;
+  }
+  path::RemoveDirForce(Wide(dir / "target/").c_str());
+  EXPECT_FALSE(Exists(dir / "target"));
+}
+
+TEST(PathTree, RemoveDirForceOfWhatIsNoDirectory) {
+  TempDir dir;
+  WriteBytes(dir / "file", "x");
+  EXPECT_THROW(path::RemoveDirForce(Wide(dir / "missing").c_str()),
+               exception::NonexistentException);
+  EXPECT_THROW(path::RemoveDirForce(Wide(dir / "file").c_str()), exception::NonexistentException);
+  EXPECT_THROW(path::RemoveDirForce(L"relative"), exception::NonexistentException);
+  EXPECT_THROW(path::RemoveDirForce(nullptr), exception::NonexistentException);
+}
+
+TEST(PathTree, RenameReplacesTheTarget) {
+  TempDir dir;
+  WriteBytes(dir / "from", "new");
+  WriteBytes(dir / "to", "old");
+  ino_t inode = InodeOf(dir / "from");
+  path::RenameFile(Wide(dir / "from"), Wide(dir / "to"));
+  EXPECT_EQ("new", ReadBytes(dir / "to"));
+  EXPECT_EQ(inode, InodeOf(dir / "to"));
+  EXPECT_FALSE(Exists(dir / "from"));
+}
+
+TEST(PathTree, RenameToANameOfOtherCaseDoesNothing) {
+  TempDir dir;
+  WriteBytes(dir / "File", "x");
+  path::RenameFile(Wide(dir / "File"), Wide(dir / "FILE"));
+  EXPECT_TRUE(Exists(dir / "File"));
+  EXPECT_FALSE(Exists(dir / "FILE"));
+  path::RenameFile(Wide(dir / "missing"), Wide(dir / "MISSING"));
+}
+
+TEST(PathTree, RenameFailures) {
+  TempDir dir;
+  WriteBytes(dir / "file", "x");
+  EXPECT_THROW(path::RenameFile(L"a", Wide(dir / "b")), exception::InvalidArgument);
+  EXPECT_THROW(path::RenameFile(Wide(dir / "file"), L"b"), exception::InvalidArgument);
+  EXPECT_EQ(ENOENT, PosixErrorOf([&] { path::RenameFile(Wide(dir / "no"), Wide(dir / "x")); }));
+  dir.makeDir("d");
+  EXPECT_EQ(EISDIR, PosixErrorOf([&] { path::RenameFile(Wide(dir / "file"), Wide(dir / "d")); }));
+  EXPECT_EQ("x", ReadBytes(dir / "file"));
+}
+
+// A directory of another file system than the temporary one, if this machine has one to write to.
+class OtherFileSystem {
+ public:
+  explicit OtherFileSystem(const std::string& here) {
+    struct stat mine = {}, other = {};
+    stat(here.c_str(), &mine);
+    for (const char* candidate : {"/dev/shm", "/run/shm", "/tmp", "/var/tmp", "/run"}) {
+      if (stat(candidate, &other) != 0 || other.st_dev == mine.st_dev) continue;
+      std::string name = std::string(candidate) + "/vlt.XXXXXX";
+      if (mkdtemp(name.data())) {
+        m_path = name;
+        return;
+      }
+    }
+  }
+  ~OtherFileSystem() {
+    if (!m_path.empty()) std::filesystem::remove_all(m_path);
+  }
+  const std::string& path() const { return m_path; }
+
+ private:
+  std::string m_path;
+};
+
+TEST(PathTree, RenameBetweenFileSystemsCopiesAndRemoves) {
+  TempDir dir;
+  OtherFileSystem other(dir.path());
+  if (other.path().empty()) GTEST_SKIP() << "one file system only";
+  std::string bytes(100000, 'b');
+  WriteBytes(dir / "from", bytes);
+  WriteBytes(other.path() + "/to", "old and to be replaced");
+  path::RenameFile(Wide(dir / "from"), Wide(other.path() + "/to"));
+  EXPECT_EQ(bytes, ReadBytes(other.path() + "/to"));
+  EXPECT_EQ(0600, ModeOf(other.path() + "/to"));
+  EXPECT_FALSE(Exists(dir / "from"));
+}
+
+TEST(PathTree, RenameOfADirectoryBetweenFileSystemsFailsToRead) {
+  TempDir dir;
+  OtherFileSystem other(dir.path());
+  if (other.path().empty()) GTEST_SKIP() << "one file system only";
+  dir.makeDir("d");
+  EXPECT_THROW(path::RenameFile(Wide(dir / "d"), Wide(other.path() + "/d")),
+               exception::FileReadFailed);
+  EXPECT_TRUE(Exists(dir / "d"));
+}
+
+TEST(PathTree, RenameThatCannotRemoveTheSourceTakesTheCopyBack) {
+  TempDir dir;
+  OtherFileSystem other(dir.path());
+  if (other.path().empty()) GTEST_SKIP() << "one file system only";
+  if (geteuid() != 0) GTEST_SKIP() << "needs another user's rights";
+  WriteBytes(dir.makeDir("ro") + "/from", "x");
+  chmod((dir / "ro/from").c_str(), 0644);
+  chmod((dir / "ro").c_str(), 0755);
+  chmod(dir.path().c_str(), 0755);
+  chmod(other.path().c_str(), 0777);
+  vlt::test::Child child([&] {
+    if (setresuid(65534, 65534, 65534) != 0) return 1;
+    int error =
+        PosixErrorOf([&] { path::RenameFile(Wide(dir / "ro/from"), Wide(other.path() + "/to")); });
+    return error == EACCES ? 0 : 2;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_TRUE(Exists(dir / "ro/from"));
+  EXPECT_FALSE(Exists(other.path() + "/to"));
+}
+
+TEST(PathTree, CpFileCopiesBytesIntoAPrivateFile) {
+  TempDir dir;
+  std::string bytes;
+  for (int i = 0; i < 100001; ++i) bytes += static_cast<char>(i * 7);
+  WriteBytes(dir / "from", bytes);
+  chmod((dir / "from").c_str(), 0644);
+  path::CpFile(Wide(dir / "from"), Wide(dir / "to"), false);
+  EXPECT_EQ(bytes, ReadBytes(dir / "to"));
+  EXPECT_EQ(0600, ModeOf(dir / "to"));
+  WriteBytes(dir / "empty", "");
+  path::CpFile(Wide(dir / "empty"), Wide(dir / "to2"), true);
+  EXPECT_EQ("", ReadBytes(dir / "to2"));
+}
+
+TEST(PathTree, CpFileOverwritesOnlyWhenTold) {
+  TempDir dir;
+  WriteBytes(dir / "from", "new");
+  WriteBytes(dir / "to", "old, and longer");
+  chmod((dir / "to").c_str(), 0640);
+  EXPECT_THROW(path::CpFile(Wide(dir / "from"), Wide(dir / "to"), false),
+               exception::FileAlreadyExists);
+  // The check for an existing target comes before the one for the same file.
+  EXPECT_THROW(path::CpFile(Wide(dir / "to"), Wide(dir / "to"), false),
+               exception::FileAlreadyExists);
+  EXPECT_EQ("old, and longer", ReadBytes(dir / "to"));
+  path::CpFile(Wide(dir / "from"), Wide(dir / "to"), true);
+  EXPECT_EQ("new", ReadBytes(dir / "to"));
+  EXPECT_EQ(0640, ModeOf(dir / "to"));
+}
+
+TEST(PathTree, CpFileOntoItselfUnderAnyNameKeepsTheBytes) {
+  TempDir dir;
+  WriteBytes(dir / "File", "kept");
+  ASSERT_EQ(0, link((dir / "File").c_str(), (dir / "hard").c_str()));
+  ASSERT_EQ(0, symlink("File", (dir / "soft").c_str()));
+  for (const char* name : {"File", "FILE", "./File", "hard", "soft"}) {
+    path::CpFile(Wide(dir / "File"), Wide(dir / name), true);
+    EXPECT_EQ("kept", ReadBytes(dir / "File")) << name;
+  }
+  EXPECT_FALSE(Exists(dir / "FILE"));
+}
+
+TEST(PathTree, CpFileFailures) {
+  TempDir dir;
+  WriteBytes(dir / "file", "x");
+  dir.makeDir("d");
+  auto copy = [&](const char* from, const char* to) {
+    path::CpFile(Wide(dir / from), Wide(dir / to), true);
+  };
+  EXPECT_THROW(path::CpFile(L"file", Wide(dir / "x"), true), exception::InvalidArgument);
+  EXPECT_THROW(path::CpFile(Wide(dir / "file"), L"x", true), exception::InvalidArgument);
+  EXPECT_EQ(ENOENT, PosixErrorOf([&] { copy("missing", "file"); }));
+  EXPECT_EQ("x", ReadBytes(dir / "file"));  // not truncated for a source that is not there
+  EXPECT_EQ(EISDIR, PosixErrorOf([&] { copy("file", "d"); }));
+  EXPECT_EQ(EISDIR,
+            PosixErrorOf([&] { path::CpFile(Wide(dir / "file"), Wide(dir / "d"), false); }));
+  EXPECT_THROW(copy("d", "y"), exception::FileReadFailed);
+  EXPECT_EQ(ENOENT, PosixErrorOf([&] { copy("file", "no/y"); }));
+}
+
+TEST(PathTree, CpFileNeverWaitsForAPipe) {
+  TempDir dir;
+  WriteBytes(dir / "file", "x");
+  ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0600));
+  EXPECT_THROW(path::CpFile(Wide(dir / "fifo"), Wide(dir / "to"), true), exception::FileReadFailed);
+  EXPECT_THROW(path::CpFile(Wide(dir / "file"), Wide(dir / "fifo"), true),
+               exception::FileWriteFailed);
+  EXPECT_FALSE(Exists(dir / "to"));
+}
+
+TEST(PathTree, CpFileThatCannotWriteAllFails) {
+  TempDir dir;
+  WriteBytes(dir / "file", std::string(100000, 'x'));
+  vlt::test::Child child([&] {
+    signal(SIGXFSZ, SIG_IGN);
+    rlimit limit = {50000, 50000};
+    setrlimit(RLIMIT_FSIZE, &limit);
+    int before = vlt::test::OpenDescriptors();
+    try {
+      path::CpFile(Wide(dir / "file"), Wide(dir / "to"), false);
+    } catch (const exception::FileWriteFailed&) {
+      return vlt::test::OpenDescriptors() == before ? 0 : 1;
+    }
+    return 2;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_THROW(path::CpFile(Wide(dir / "file"), L"/dev/full", true), exception::FileWriteFailed);
+}
+
+TEST(PathTree, CpDirCopiesATreeWithoutHiddenEntries) {
+  TempDir dir;
+  WriteBytes(dir.makeDir("from") + "/a", "A");
+  WriteBytes(dir.makeDir("from/sub/deep") + "/b", "B");
+  dir.makeDir("from/empty");
+  WriteBytes(dir / "from/.hidden", "h");
+  ASSERT_EQ(0, symlink("sub", (dir / "from/link").c_str()));
+  WriteBytes(dir.makeDir("to") + "/a", "old");
+  path::CpDir(Wide(dir / "from"), Wide(dir / "to"));
+  EXPECT_EQ("A", ReadBytes(dir / "to/a"));
+  EXPECT_EQ("B", ReadBytes(dir / "to/sub/deep/b"));
+  EXPECT_EQ("B", ReadBytes(dir / "to/link/deep/b"));  // links are followed
+  EXPECT_TRUE(path::IsDirectory(Wide(dir / "to/empty").c_str()));
+  EXPECT_FALSE(Exists(dir / "to/.hidden"));
+  path::CpDir(Wide(dir / "from/"), Wide(dir / "new/one/"));
+  EXPECT_EQ("A", ReadBytes(dir / "new/one/a"));
+  EXPECT_EQ(0700, ModeOf(dir / "new/one"));
+}
+
+TEST(PathTree, CpDirFailures) {
+  TempDir dir;
+  WriteBytes(dir.makeDir("from") + "/a", "A");
+  EXPECT_THROW(path::CpDir(L"from", Wide(dir / "to/")), exception::InvalidArgument);
+  EXPECT_THROW(path::CpDir(Wide(dir / "from"), L"to"), exception::InvalidArgument);
+  EXPECT_THROW(path::CpDir(Wide(dir / "missing"), Wide(dir / "to/")),
+               exception::NonexistentException);
+  EXPECT_FALSE(Exists(dir / "to"));
+  // Without a slash at the end only the directory above is made.
+  EXPECT_EQ(ENOENT, PosixErrorOf([&] { path::CpDir(Wide(dir / "from"), Wide(dir / "x/to")); }));
+  EXPECT_TRUE(Exists(dir / "x"));
+}
+
+TEST(PathTree, CpDirThroughALoopOfLinksEnds) {
+  TempDir dir;
+  dir.makeDir("from/sub");
+  // Two loops in one directory would be walked some 2^40 times.
+  ASSERT_EQ(0, symlink("..", (dir / "from/sub/up").c_str()));
+  ASSERT_EQ(0, symlink(".", (dir / "from/sub/self").c_str()));
+  EXPECT_EQ(ELOOP, PosixErrorOf([&] { path::CpDir(Wide(dir / "from"), Wide(dir / "to/")); }));
+}
+
+TEST(PathTree, CpDirIntoItselfDoesNotCopyTheCopy) {
+  TempDir dir;
+  WriteBytes(dir.makeDir("from") + "/a", "A");
+  dir.makeDir("from/to");
+  path::CpDir(Wide(dir / "from"), Wide(dir / "from/to"));
+  EXPECT_EQ("A", ReadBytes(dir / "from/to/a"));
+  EXPECT_FALSE(Exists(dir / "from/to/to"));
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

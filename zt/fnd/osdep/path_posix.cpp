@@ -1,0 +1,178 @@
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <memory>
+#include <string>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/Retry.h"
+#include "zt/fnd/osdep/path.h"
+
+// The operations on single entries of the file system.
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+typedef std::unique_ptr<char, void (*)(void*)> MallocText;
+
+constexpr unsigned int kModeBits = 0xFFFF;
+constexpr mode_t kPrivateDirMode = 0700;
+
+void DemandAbsolute(const wchar_t* path) {
+  if (!path::IsPathAbsolute(path)) ZT_RAISE(exception::InvalidArgument());
+}
+
+int Stat(const char* path, struct stat* info) {
+  return RetryEintr([&] { return ::stat(path, info); });
+}
+
+int LStat(const char* path, struct stat* info) {
+  return RetryEintr([&] { return ::lstat(path, info); });
+}
+
+bool IsDirectoryText(const char* path) {
+  struct stat info;
+  return Stat(path, &info) == 0 && S_ISDIR(info.st_mode);
+}
+
+// Makes one directory; 0, or the errno of the failed step.
+int MakeOneDir(const char* path, bool useMode, mode_t mode) {
+  if (RetryEintr([&] { return ::mkdir(path, useMode ? mode : kPrivateDirMode); }) != 0) {
+    return errno;
+  }
+  if (!useMode) return 0;
+  // The umask may have cut the mode.
+  if (RetryEintr([&] { return ::chmod(path, mode); }) == 0) return 0;
+  int failure = errno;
+  RetryEintr([&] { return ::rmdir(path); });
+  return failure;
+}
+
+void CreateDirWorker(const wchar_t* path, bool useMode, mode_t mode) {
+  DemandAbsolute(path);
+  AnsiString narrow{String(path)};
+  std::string text(narrow.c_str());
+  text.erase(text.rfind('/') + 1);
+  if (text.empty()) ZT_RAISE(exception::InvalidArgument());
+  if (IsDirectoryText(text.c_str())) return;
+  for (std::string::size_type slash = 0; slash != std::string::npos;) {
+    slash = text.find('/', slash + 1);
+    std::string prefix = text.substr(0, slash);
+    if (IsDirectoryText(prefix.c_str())) continue;
+    int failure = MakeOneDir(prefix.c_str(), useMode, mode);
+    if (failure == 0) continue;
+    if (failure == EEXIST) ZT_RAISE(exception::ObjectAlreadyExists());
+    ZT_RAISE(exception::AccessDenied(prefix.c_str()));
+  }
+}
+
+}  // namespace
+
+String path::GetCWD() {
+  for (;;) {
+    MallocText text(::getcwd(nullptr, 0), std::free);
+    if (text) return String(text.get());
+    if (errno != EINTR) ZT_RAISE(PosixError());
+  }
+}
+
+String path::SetCWD(String dir) {
+  String old = GetCWD();
+  AnsiString narrow(dir);
+  if (::chdir(narrow.c_str()) != 0) ZT_RAISE(PosixError());
+  return old;
+}
+
+String path::AbsPath(const String& path) {
+  if (path.exactCompare(L".") == 0) return GetCWD();
+  return IsAbs(path) ? path : Join(GetCWD(), path);
+}
+
+String path::TempDirName() {
+  const char* dir = std::getenv("TMPDIR");
+  return dir == nullptr ? String(L"/var/tmp/") : String(dir);
+}
+
+String path::TempFileName(const String& prefix, const String& dir) {
+  if (prefix.empty()) ZT_RAISE(exception::InvalidArgument());
+  String where = dir.empty() ? TempDirName() : dir;
+  DemandAbsolute(where.c_str());
+  if (!IsDirectory(where.c_str())) ZT_RAISE(exception::NonexistentException());
+  AnsiString narrowDir(where), narrowPrefix(prefix);
+  MallocText name(::tempnam(narrowDir.c_str(), narrowPrefix.c_str()), std::free);
+  if (!name) ZT_RAISE(PosixError());
+  return String(name.get());
+}
+
+bool path::IsDirectory(const wchar_t* path) {
+  return IsPathAbsolute(path) && IsDirectoryText(AnsiString(String(path)).c_str());
+}
+
+bool path::IsSymLink(const wchar_t* path) {
+  struct stat info;
+  return IsPathAbsolute(path) && LStat(AnsiString(String(path)).c_str(), &info) == 0 &&
+         S_ISLNK(info.st_mode);
+}
+
+bool path::DoesFileExist(const String& path) {
+  DemandAbsolute(path.c_str());
+  AnsiString narrow(path);
+  struct stat info;
+  if (Stat(narrow.c_str(), &info) == 0) return S_ISREG(info.st_mode);
+  if (errno != ENOENT) ZT_RAISE(PosixError());
+  return false;
+}
+
+void path::CreateDir(const wchar_t* path) { CreateDirWorker(path, false, 0); }
+
+void path::CreateDir(const wchar_t* path, unsigned int mode) {
+  CreateDirWorker(path, true, static_cast<mode_t>(mode & kModeBits));
+}
+
+void path::RemoveFile(const wchar_t* path) {
+  DemandAbsolute(path);
+  AnsiString narrow{String(path)};
+  if (RetryEintr([&] { return ::unlink(narrow.c_str()); }) != 0) ZT_RAISE(PosixError());
+}
+
+void path::RemoveFile(const String& path) { RemoveFile(path.c_str()); }
+
+void path::RemoveDir(const wchar_t* path) {
+  if (!IsDirectory(path)) ZT_RAISE(exception::NonexistentException());
+  if (IsSymLink(path)) {
+    RemoveFile(path);
+    return;
+  }
+  AnsiString narrow{String(path)};
+  if (RetryEintr([&] { return ::rmdir(narrow.c_str()); }) != 0) {
+    ZT_RAISE(exception::AccessDenied(narrow.c_str()));
+  }
+}
+
+void path::CreateSymLink(const String& link, const String& target) {
+  AnsiString narrowTarget(target), narrowLink(link);
+  if (RetryEintr([&] { return ::symlink(narrowTarget.c_str(), narrowLink.c_str()); }) != 0) {
+    ZT_RAISE(PosixError());
+  }
+}
+
+String path::ResolveSymLink(const String& path) {
+  if (!IsSymLink(path.c_str())) ZT_RAISE(exception::InvalidArgument());
+  AnsiString narrow(path);
+  struct stat info;
+  if (LStat(narrow.c_str(), &info) != 0) ZT_RAISE(PosixError());
+  std::string text(static_cast<std::size_t>(info.st_size), '\0');
+  ssize_t length = RetryEintr([&] { return ::readlink(narrow.c_str(), text.data(), text.size()); });
+  if (length < 0) ZT_RAISE(PosixError());
+  return String(text.data(), static_cast<String::size_type>(length));
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

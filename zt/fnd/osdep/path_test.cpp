@@ -1,0 +1,364 @@
+#include "zt/fnd/osdep/path.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <string>
+
+#include "tests/support/Child.h"
+#include "tests/support/FailSystemCall.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/OSException.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::Exists;
+using vlt::test::ModeOf;
+using vlt::test::TempDir;
+
+String Wide(const std::string& text) { return String(text.c_str()); }
+std::string Narrow(const String& text) { return AnsiString(text).c_str(); }
+
+// The errno of the PosixError that the call throws; -1 for none.
+template <class Call>
+int PosixErrorOf(Call call) {
+  try {
+    call();
+  } catch (const PosixError& e) {
+    return static_cast<int>(e.whatcode());
+  }
+  return -1;
+}
+
+template <class Call>
+std::string AccessDeniedTextOf(Call call) {
+  try {
+    call();
+  } catch (const exception::AccessDenied& e) {
+    return e.what();
+  }
+  return "";
+}
+
+// ---- text
+
+TEST(Path, SymLinksAreSupported) { EXPECT_TRUE(path::PlatformSupportsSymLinks()); }
+
+TEST(Path, AbsoluteIsWhatStartsWithASlash) {
+  EXPECT_TRUE(path::IsPathAbsolute(L"/"));
+  EXPECT_TRUE(path::IsAbs(L"//x"));
+  EXPECT_FALSE(path::IsPathAbsolute(L""));
+  EXPECT_FALSE(path::IsPathAbsolute(L"a/b"));
+  EXPECT_FALSE(path::IsAbs(L"~/x"));
+  EXPECT_FALSE(path::IsPathAbsolute(nullptr));
+}
+
+TEST(Path, DirName) {
+  const char* rows[][2] = {{"/a/b", "/a"},  {"/a/b/", "/a/b"}, {"a", ""},          {"/a", "/"},
+                           {"//a", "//"},   {"/", "/"},        {"a/b", "a"},       {"", ""},
+                           {"///", "///"},  {"a/", "a"},       {"a//b", "a"},      {"a//", "a"},
+                           {"/a//b", "/a"}, {"//a//", "//a"},  {"/a/b/c", "/a/b"}, {"/a//", "/a"}};
+  for (const auto& row : rows) EXPECT_EQ(row[1], Narrow(path::DirName(Wide(row[0])))) << row[0];
+}
+
+TEST(Path, BaseName) {
+  const char* rows[][2] = {{"/a/b", "b"}, {"/a/b/", ""}, {"a", "a"},
+                           {"", ""},      {"/", ""},     {"/a", "a"}};
+  for (const auto& row : rows) EXPECT_EQ(row[1], Narrow(path::BaseName(Wide(row[0])))) << row[0];
+}
+
+TEST(Path, Join) {
+  const char* rows[][3] = {{"a", "/b", "/b"}, {"", "b", "b"},   {"a/", "b", "a/b"},
+                           {"a", "b", "a/b"}, {"a", "", "a/"},  {"", "", ""},
+                           {"/", "b", "/b"},  {"a/", "", "a/"}, {"a//", "b", "a//b"}};
+  for (const auto& row : rows) {
+    EXPECT_EQ(row[2], Narrow(path::Join(Wide(row[0]), Wide(row[1]))));
+    EXPECT_STREQ(row[2], path::Join(AnsiString(row[0]), AnsiString(row[1])).c_str());
+  }
+}
+
+TEST(Path, MakePathEndInSlash) {
+  String text(L"/a");
+  path::MakePathEndInSlash(text);
+  EXPECT_EQ("/a/", Narrow(text));
+  path::MakePathEndInSlash(text);
+  EXPECT_EQ("/a/", Narrow(text));
+  String empty;
+  EXPECT_THROW(path::MakePathEndInSlash(empty), exception::InvalidArgument);
+  EXPECT_TRUE(empty.empty());
+}
+
+TEST(Path, NormalizePath) {
+  const char* rows[][2] = {{"a/b", ""},          {"", ""},
+                           {"./a", ""},          {"/a/b/../c", "/a/c"},
+                           {"/..", ""},          {"/a/.../b", ""},
+                           {"/a//b", "/a//b"},   {"/a/b/", "/a/b/"},
+                           {"/a//./b", "/a//b"}, {"/a/../..", ""},
+                           {"/a/./b/", "/a/b/"}, {"/.", "/"},
+                           {"/./", "/"},         {"/a/..", "/"},
+                           {"/a/../", "/"},      {"/a/b/../../c", "/c"},
+                           {"/a//../b", "/a/b"}, {"/a.b/c", "/a.b/c"},
+                           {"/a/..b", "/a/..b"}, {"/a/....", "/a/...."},
+                           {"/../a", ""},        {"/a/b/c/../../d/./e/", "/a/d/e/"},
+                           {"//./a", "//a"},     {"/...", ""},
+                           {"/a/.../..", ""},    {"/", "/"}};
+  for (const auto& row : rows) {
+    EXPECT_EQ(row[1], Narrow(path::NormalizePath(Wide(row[0])))) << row[0];
+  }
+}
+
+TEST(Path, NormalizeOfALongPathTakesLittleTime) {
+  String text;
+  for (int i = 0; i < 200000; ++i) text += L"/a/./b/..";
+  String result = path::NormalizePath(text);
+  EXPECT_EQ(400000u, result.length());
+}
+
+// ---- the working directory and temporary names
+
+TEST(Path, WorkingDirectory) {
+  TempDir dir;
+  String before = path::GetCWD();
+  String left = path::SetCWD(Wide(dir.path()));
+  EXPECT_EQ(0, before.exactCompare(left));
+  char real[4096];
+  ASSERT_NE(nullptr, realpath(dir.path().c_str(), real));
+  EXPECT_EQ(real, Narrow(path::GetCWD()));
+  EXPECT_EQ(real, Narrow(path::AbsPath(L".")));
+  EXPECT_EQ(std::string(real) + "/x/y", Narrow(path::AbsPath(L"x/y")));
+  EXPECT_EQ("/abs", Narrow(path::AbsPath(L"/abs")));
+  // A relative directory exists below the working directory, and still is none.
+  mkdir((dir / "relative").c_str(), 0700);
+  EXPECT_FALSE(path::IsDirectory(L"relative"));
+  EXPECT_EQ(ENOENT, PosixErrorOf([&] { path::SetCWD(Wide(dir / "missing")); }));
+  EXPECT_EQ(real, Narrow(path::GetCWD()));
+  path::SetCWD(before);
+}
+
+TEST(Path, WorkingDirectoryThatIsGoneIsAnError) {
+  TempDir dir;
+  std::string gone = dir.makeDir("gone");
+  vlt::test::Child child([&] {
+    if (chdir(gone.c_str()) != 0 || rmdir(gone.c_str()) != 0) return 1;
+    return PosixErrorOf([] { path::GetCWD(); }) == ENOENT ? 0 : 2;
+  });
+  EXPECT_EQ(0, child.wait());
+}
+
+TEST(Path, TempDirNameIsTheEnvironmentsOrTheDefault) {
+  std::string kept = getenv("TMPDIR");
+  setenv("TMPDIR", "/some/where", 1);
+  EXPECT_EQ("/some/where", Narrow(path::TempDirName()));
+  setenv("TMPDIR", "", 1);
+  EXPECT_EQ("", Narrow(path::TempDirName()));
+  unsetenv("TMPDIR");
+  EXPECT_EQ("/var/tmp/", Narrow(path::TempDirName()));
+  setenv("TMPDIR", kept.c_str(), 1);
+}
+
+TEST(Path, TempFileNameIsFreeAndNothingIsMade) {
+  TempDir dir;
+  std::string kept = getenv("TMPDIR");
+  setenv("TMPDIR", dir.path().c_str(), 1);
+  std::string name = Narrow(path::TempFileName(L"pre", String()));
+  EXPECT_EQ(0u, name.find(dir / "pre")) << name;
+  EXPECT_FALSE(Exists(name));
+  EXPECT_THROW(path::TempFileName(String(), String()), exception::InvalidArgument);
+  EXPECT_THROW(path::TempFileName(L"p", L"relative"), exception::InvalidArgument);
+  EXPECT_THROW(path::TempFileName(L"p", Wide(dir / "missing")), exception::NonexistentException);
+  setenv("TMPDIR", "", 1);
+  EXPECT_THROW(path::TempFileName(L"p", String()), exception::InvalidArgument);
+  // Without the variable the directory given counts.
+  unsetenv("TMPDIR");
+  name = Narrow(path::TempFileName(L"pre", Wide(dir.path())));
+  EXPECT_EQ(0u, name.find(dir / "pre")) << name;
+  setenv("TMPDIR", kept.c_str(), 1);
+}
+
+// ---- asking
+
+TEST(Path, IsDirectoryAndIsSymLinkNeverThrow) {
+  TempDir dir;
+  vlt::test::WriteBytes(dir / "file", "x");
+  ASSERT_EQ(0, symlink(dir.path().c_str(), (dir / "link").c_str()));
+  ASSERT_EQ(0, symlink("nowhere", (dir / "dangling").c_str()));
+  EXPECT_TRUE(path::IsDirectory(Wide(dir.path()).c_str()));
+  EXPECT_TRUE(path::IsDirectory(Wide(dir / "link").c_str()));
+  for (const char* no : {"file", "file/x", "dangling", "missing"}) {
+    EXPECT_FALSE(path::IsDirectory(Wide(dir / no).c_str())) << no;
+  }
+  EXPECT_TRUE(path::IsSymLink(Wide(dir / "link").c_str()));
+  EXPECT_TRUE(path::IsSymLink(Wide(dir / "dangling").c_str()));
+  for (const char* no : {"file", "file/x", "missing", "link/"}) {
+    EXPECT_FALSE(path::IsSymLink(Wide(dir / no).c_str())) << no;
+  }
+  EXPECT_FALSE(path::IsDirectory(nullptr));
+  EXPECT_FALSE(path::IsSymLink(nullptr));
+  EXPECT_FALSE(path::IsDirectory(L""));
+  String longName(5000, L'x');
+  EXPECT_FALSE(path::IsDirectory((String(L"/") + longName).c_str()));
+}
+
+TEST(Path, DoesFileExistIsTrueForRegularFilesOnly) {
+  TempDir dir;
+  vlt::test::WriteBytes(dir / "file", "x");
+  ASSERT_EQ(0, symlink("file", (dir / "link").c_str()));
+  ASSERT_EQ(0, symlink("nowhere", (dir / "dangling").c_str()));
+  ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0600));
+  EXPECT_TRUE(path::DoesFileExist(Wide(dir / "file")));
+  EXPECT_TRUE(path::DoesFileExist(Wide(dir / "link")));
+  for (const std::string& no : {dir.path(), dir / "dangling", dir / "fifo", dir / "missing"}) {
+    EXPECT_FALSE(path::DoesFileExist(Wide(no))) << no;
+  }
+  EXPECT_THROW(path::DoesFileExist(L"file"), exception::InvalidArgument);
+  EXPECT_THROW(path::DoesFileExist(String()), exception::InvalidArgument);
+  EXPECT_EQ(ENOTDIR, PosixErrorOf([&] { path::DoesFileExist(Wide(dir / "file/x")); }));
+  EXPECT_EQ(ENAMETOOLONG,
+            PosixErrorOf([&] { path::DoesFileExist(Wide(dir / std::string(300, 'x'))); }));
+}
+
+// ---- making directories
+
+TEST(Path, CreateDirMakesTheDirectoriesOfAFilesPath) {
+  TempDir dir;
+  path::CreateDir(Wide(dir / "a/b/c").c_str());
+  EXPECT_EQ(0700, ModeOf(dir / "a"));
+  EXPECT_EQ(0700, ModeOf(dir / "a/b"));
+  EXPECT_FALSE(Exists(dir / "a/b/c"));
+  path::CreateDir(Wide(dir / "a/b/c/").c_str());
+  EXPECT_EQ(0700, ModeOf(dir / "a/b/c"));
+}
+
+TEST(Path, CreateDirOnAnExistingDirectoryChangesNothing) {
+  TempDir dir;
+  ASSERT_EQ(0, mkdir((dir / "x").c_str(), 0711));
+  ASSERT_EQ(0, chmod((dir / "x").c_str(), 0711));
+  path::CreateDir(Wide(dir / "x/").c_str());
+  path::CreateDir(Wide(dir / "x/").c_str(), 0777);
+  EXPECT_EQ(0711, ModeOf(dir / "x"));
+  path::CreateDir(L"/x");
+  EXPECT_FALSE(Exists("/x"));
+}
+
+TEST(Path, CreateDirWithAModeWinsAgainstTheUmask) {
+  TempDir dir;
+  vlt::test::Child child([&] {
+    umask(0077);
+    path::CreateDir(Wide(dir / "a//b/c/").c_str(), 0777);
+    path::CreateDir(Wide(dir / "plain/x/").c_str());
+    umask(0700);
+    path::CreateDir(Wide(dir / "odd/").c_str(), 0x10000 + 01750);
+    return 0;
+  });
+  EXPECT_EQ(0, child.wait());
+  for (const char* name : {"a", "a/b", "a/b/c"}) EXPECT_EQ(0777, ModeOf(dir / name)) << name;
+  EXPECT_EQ(0700, ModeOf(dir / "plain"));
+  EXPECT_EQ(0700, ModeOf(dir / "plain/x"));
+  EXPECT_EQ(01750, ModeOf(dir / "odd"));  // 16 bits of the mode count
+}
+
+TEST(Path, CreateDirWithoutAModeObeysTheUmask) {
+  TempDir dir;
+  vlt::test::Child child([&] {
+    umask(0300);
+    path::CreateDir(Wide(dir / "a/").c_str());
+    return 0;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(0400, ModeOf(dir / "a"));
+}
+
+TEST(Path, CreateDirDemandsAnAbsolutePath) {
+  EXPECT_THROW(path::CreateDir(L"a/b/"), exception::InvalidArgument);
+  EXPECT_THROW(path::CreateDir(L""), exception::InvalidArgument);
+  EXPECT_THROW(path::CreateDir(nullptr), exception::InvalidArgument);
+  EXPECT_THROW(path::CreateDir(nullptr, 0777), exception::InvalidArgument);
+}
+
+TEST(Path, CreateDirThroughAFileIsRefusedByTheFailingPart) {
+  TempDir dir;
+  vlt::test::WriteBytes(dir / "file", "x");
+  ASSERT_EQ(0, symlink("nowhere", (dir / "dangling").c_str()));
+  EXPECT_THROW(path::CreateDir(Wide(dir / "file/").c_str()), exception::ObjectAlreadyExists);
+  EXPECT_THROW(path::CreateDir(Wide(dir / "file/x/").c_str()), exception::ObjectAlreadyExists);
+  EXPECT_THROW(path::CreateDir(Wide(dir / "dangling/").c_str()), exception::ObjectAlreadyExists);
+  EXPECT_EQ("x", vlt::test::ReadBytes(dir / "file"));
+  std::string longName(300, 'x');
+  EXPECT_EQ("Access denied: " + (dir / "a/" + longName), AccessDeniedTextOf([&] {
+              path::CreateDir(Wide(dir / "a/" + longName + "/y/").c_str());
+            }));
+  EXPECT_TRUE(Exists(dir / "a"));  // made before the failing one
+  EXPECT_EQ("Access denied: /proc/nothing", AccessDeniedTextOf([] {
+              path::CreateDir(L"/proc/nothing/here/");  // ENOENT is nothing special
+            }));
+}
+
+TEST(Path, CreateDirWhoseModeCannotBeSetTakesTheDirectoryAway) {
+  TempDir dir;
+  vlt::test::Child child([&] {
+    if (!vlt::test::FailSystemCall(SYS_chmod, EIO)) return 1;
+    std::string text =
+        AccessDeniedTextOf([&] { path::CreateDir(Wide(dir / "a/b/").c_str(), 0777); });
+    return text == "Access denied: " + (dir / "a") ? 0 : 2;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_FALSE(Exists(dir / "a"));
+}
+
+// ---- removing
+
+TEST(Path, RemoveFile) {
+  TempDir dir;
+  vlt::test::WriteBytes(dir / "file", "x");
+  path::RemoveFile(Wide(dir / "file"));
+  EXPECT_FALSE(Exists(dir / "file"));
+  EXPECT_EQ(ENOENT, PosixErrorOf([&] { path::RemoveFile(Wide(dir / "file").c_str()); }));
+  EXPECT_THROW(path::RemoveFile(L"file"), exception::InvalidArgument);
+  EXPECT_THROW(path::RemoveFile(static_cast<const wchar_t*>(nullptr)), exception::InvalidArgument);
+  ASSERT_EQ(0, symlink(dir.path().c_str(), (dir / "link").c_str()));
+  path::RemoveFile(Wide(dir / "link"));
+  EXPECT_FALSE(Exists(dir / "link"));
+}
+
+TEST(Path, RemoveDir) {
+  TempDir dir;
+  vlt::test::WriteBytes(dir.makeDir("full") + "/file", "x");
+  dir.makeDir("empty");
+  ASSERT_EQ(0, symlink("full", (dir / "link").c_str()));
+  path::RemoveDir(Wide(dir / "empty").c_str());
+  EXPECT_FALSE(Exists(dir / "empty"));
+  EXPECT_EQ("Access denied: " + (dir / "full"),
+            AccessDeniedTextOf([&] { path::RemoveDir(Wide(dir / "full").c_str()); }));
+  path::RemoveDir(Wide(dir / "link").c_str());
+  EXPECT_FALSE(Exists(dir / "link"));
+  EXPECT_TRUE(Exists(dir / "full/file"));
+  for (const std::string& no : {dir / "missing", dir / "full/file", std::string("relative")}) {
+    EXPECT_THROW(path::RemoveDir(Wide(no).c_str()), exception::NonexistentException) << no;
+  }
+  EXPECT_THROW(path::RemoveDir(nullptr), exception::NonexistentException);
+}
+
+// ---- links
+
+TEST(Path, CreateAndResolveSymLink) {
+  TempDir dir;
+  path::CreateSymLink(Wide(dir / "link"), L"some/../target");
+  EXPECT_EQ("some/../target", Narrow(path::ResolveSymLink(Wide(dir / "link"))));
+  EXPECT_EQ(EEXIST, PosixErrorOf([&] { path::CreateSymLink(Wide(dir / "link"), L"other"); }));
+  EXPECT_EQ("some/../target", Narrow(path::ResolveSymLink(Wide(dir / "link"))));
+  vlt::test::WriteBytes(dir / "file", "x");
+  EXPECT_THROW(path::ResolveSymLink(Wide(dir / "file")), exception::InvalidArgument);
+  EXPECT_THROW(path::ResolveSymLink(Wide(dir / "missing")), exception::InvalidArgument);
+  EXPECT_THROW(path::ResolveSymLink(L"link"), exception::InvalidArgument);
+  // Links of the process file system tell no length.
+  EXPECT_EQ(EINVAL, PosixErrorOf([] { path::ResolveSymLink(L"/proc/self/exe"); }));
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep
