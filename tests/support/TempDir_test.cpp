@@ -2,6 +2,9 @@
 
 #include <gtest/gtest.h>
 #include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
 
 #include "tests/support/Child.h"
 
@@ -37,6 +40,15 @@ TEST(Support, RunProgramCatchesBothOutputs) {
   EXPECT_EQ(result.exitCode, 3);
   EXPECT_EQ(result.out, "out\n");
   EXPECT_EQ(result.err, "err\n");
+}
+
+TEST(Support, TheSuperusersRootDirectoryIsItsOwn) {
+  if (geteuid() != 0) GTEST_SKIP() << "only the superuser gets a root directory of its own";
+  ASSERT_EQ(mkdir("/Library", 0755), 0);
+  WriteBytes("/Library/mark", "x");
+  std::string inside = std::string(getenv("VLT_TEST_ROOT")) + "/private-root/Library/mark";
+  EXPECT_EQ(ReadBytes(inside), "x");  // The same file by the machine's own path.
+  std::filesystem::remove_all("/Library");
 }
 
 }  // namespace

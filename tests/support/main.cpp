@@ -16,6 +16,8 @@
 #include <string>
 #include <string_view>
 
+#include "tests/support/PrivateRoot.h"
+
 namespace {
 
 namespace fs = std::filesystem;
@@ -47,6 +49,10 @@ int RunInside(char** argv) {
     prctl(PR_SET_PDEATHSIG, SIGKILL);
     if (getppid() != parent) _exit(97);
     SetUp(root);
+    if (geteuid() == 0 && !vlt::test::EnterPrivateRoot(root)) {
+      fprintf(stderr, "No private root directory: the tests run as an ordinary user.\n");
+      if (!vlt::test::BecomeOrdinaryUser(root)) _exit(97);
+    }
     execv("/proc/self/exe", argv);
     _exit(97);
   }

@@ -26,6 +26,44 @@ class RefCountedThreadSafePolicy : public DLLAlloced {
   mutable osdep::AtomicInt m_references;
 };
 
+// Base of objects with a reference count that one thread at a time may change.
+class RefCountedThreadUnsafePolicy : public DLLAlloced {
+ public:
+  RefCountedThreadUnsafePolicy() = default;
+  virtual ~RefCountedThreadUnsafePolicy() = default;
+  RefCountedThreadUnsafePolicy(const RefCountedThreadUnsafePolicy&) = delete;
+  RefCountedThreadUnsafePolicy& operator=(const RefCountedThreadUnsafePolicy&) = delete;
+
+  void addRef() const { ++m_references; }
+  void release() const {
+    if (--m_references == 0) delete this;
+  }
+
+ private:
+  mutable int m_references = 0;
+};
+
+// Base of objects that are counted, and destroyed, inside a section that belongs to somebody else
+// and has to outlive the last release().
+class RefCountedCriticalSectionPolicy : public RefCountedThreadUnsafePolicy {
+ public:
+  explicit RefCountedCriticalSectionPolicy(const osdep::CriticalSection* section)
+      : m_section(section) {}
+
+  void addRef() const {
+    osdep::CriticalSectionGuard guard(*m_section);
+    RefCountedThreadUnsafePolicy::addRef();
+  }
+  void release() const {
+    const osdep::CriticalSection& section = *m_section;  // the object may go first
+    osdep::CriticalSectionGuard guard(section);
+    RefCountedThreadUnsafePolicy::release();
+  }
+
+ private:
+  const osdep::CriticalSection* m_section;
+};
+
 // Counted pointer to an object that has addRef() and release().
 template <class T>
 class RefPtr {

@@ -2,6 +2,11 @@
 
 #include <gtest/gtest.h>
 
+#include <atomic>
+#include <chrono>
+#include <thread>
+#include <vector>
+
 namespace zt::fnd {
 namespace {
 
@@ -31,6 +36,82 @@ TEST(BufferRefPtr, DetachedReferenceIsNotReleased) {
   EXPECT_EQ(1, Thing::alive);
   raw->release();
   EXPECT_EQ(0, Thing::alive);
+}
+
+struct PlainThing : RefCountedThreadUnsafePolicy {
+  static inline int alive = 0;
+  PlainThing() { ++alive; }
+  ~PlainThing() override { --alive; }
+};
+
+TEST(BufferRefPtr, PlainCountWorksTheSameInOneThread) {
+  {
+    RefPtr<PlainThing> a(new PlainThing), b(a);
+    a = nullptr;
+    EXPECT_EQ(1, PlainThing::alive);
+  }
+  EXPECT_EQ(0, PlainThing::alive);
+}
+
+struct SectionThing : RefCountedCriticalSectionPolicy {
+  const osdep::CriticalSection& section;
+  std::thread& probe;
+  std::atomic<bool>& entered;
+  bool& enteredWhileGoing;
+  SectionThing(const osdep::CriticalSection& s, std::thread& p, std::atomic<bool>& e, bool& w)
+      : RefCountedCriticalSectionPolicy(&s),
+        section(s),
+        probe(p),
+        entered(e),
+        enteredWhileGoing(w) {}
+  ~SectionThing() override {
+    probe = std::thread([&s = section, &e = entered] {
+      osdep::CriticalSectionGuard guard(s);
+      e = true;
+    });
+    std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    enteredWhileGoing = entered;
+  }
+};
+
+TEST(BufferRefPtr, SectionCountedObjectGoesInsideItsSection) {
+  osdep::CriticalSection section;
+  std::thread probe;
+  std::atomic<bool> entered = false;
+  bool enteredWhileGoing = true;
+  {
+    RefPtr<SectionThing> a(new SectionThing(section, probe, entered, enteredWhileGoing)), b(a);
+    a = nullptr;
+    EXPECT_FALSE(probe.joinable());
+  }
+  ASSERT_TRUE(probe.joinable());
+  probe.join();
+  EXPECT_TRUE(entered);
+  EXPECT_FALSE(enteredWhileGoing);
+}
+
+TEST(BufferRefPtr, SectionCountIsExactAcrossThreads) {
+  osdep::CriticalSection section;
+  struct Counted : RefCountedCriticalSectionPolicy {
+    int* alive;
+    Counted(const osdep::CriticalSection* s, int* a)
+        : RefCountedCriticalSectionPolicy(s), alive(a) {
+      ++*alive;
+    }
+    ~Counted() override { --*alive; }
+  };
+  int alive = 0;
+  RefPtr<Counted> shared(new Counted(&section, &alive));
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([&] {
+      for (int i = 0; i < 2000; ++i) RefPtr<Counted> mine(shared.get());
+    });
+  }
+  for (auto& thread : threads) thread.join();
+  EXPECT_EQ(1, alive);
+  shared = nullptr;
+  EXPECT_EQ(0, alive);
 }
 
 }  // namespace

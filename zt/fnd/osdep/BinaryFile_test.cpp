@@ -14,6 +14,7 @@
 #include <thread>
 
 #include "tests/support/Child.h"
+#include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
@@ -23,27 +24,17 @@ namespace zt::fnd::osdep {
 namespace {
 
 using vlt::test::ModeOf;
+using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
 using vlt::test::TempDir;
+using vlt::test::Wide;
 using vlt::test::WriteBytes;
 typedef BinaryFile::Mode Mode;
 typedef BinaryFile::Origin Origin;
 typedef BinaryFile::Endianness Endianness;
 
-String Wide(const std::string& text) { return String(text.c_str()); }
-
 std::string Text(const AutoBuffer& b) {
   return b.Len() == 0 ? std::string() : std::string(reinterpret_cast<char*>(b.Data()), b.Len());
-}
-
-template <class Call>
-int PosixErrorOf(Call call) {
-  try {
-    call();
-  } catch (const PosixError& e) {
-    return static_cast<int>(e.whatcode());
-  }
-  return -1;
 }
 
 // A file of these bytes, open for reading and writing.

@@ -33,8 +33,8 @@ class Bundle {
   // The module stays in the process when the copies have gone.
   void keepLoaded();
 
-  // Appends ".bundle" to a name whose last component has no ".". Throws InvalidArgument for an empty
-  // name.
+  // Appends ".bundle" to a name whose last component has no ".". Throws InvalidArgument for an
+  // empty name.
   static String decorateName(const String& name);
 
  protected:

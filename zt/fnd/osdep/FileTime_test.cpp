@@ -7,6 +7,7 @@
 
 #include <string>
 
+#include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
 
@@ -14,8 +15,7 @@ namespace zt::fnd::osdep {
 namespace {
 
 using vlt::test::TempDir;
-
-String Wide(const std::string& text) { return String(text.c_str()); }
+using vlt::test::Wide;
 
 void SetTime(const std::string& path, time_t seconds, long nanoseconds) {
   timespec times[2] = {{seconds, nanoseconds}, {seconds, nanoseconds}};

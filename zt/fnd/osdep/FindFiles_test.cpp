@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/OSException.h"
@@ -19,11 +20,10 @@ namespace zt::fnd::osdep {
 namespace {
 
 using vlt::test::TempDir;
+using vlt::test::Wide;
 using vlt::test::WriteBytes;
 typedef FindFiles::FindFlags Flags;
 typedef std::vector<std::string> Names;
-
-String Wide(const std::string& text) { return String(text.c_str()); }
 
 Names Sorted(const Vector<String>& found) {
   Names names;

@@ -37,6 +37,7 @@ class MutexGlobalStatics : public RefCountedThreadSafePolicy {
   void detach(Map::iterator data) EXCLUDES(section);
 
   const pid_t pid;
+  MutexGlobalStatics* inherited = nullptr;  // list of those that this process may not use
 
   // Guards the map and the hold counts of the Mutex objects; never held across a wait.
   CriticalSection section;

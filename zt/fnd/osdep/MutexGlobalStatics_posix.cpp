@@ -14,7 +14,11 @@ namespace {
 // Plain objects, ready before any initialiser and good after every destructor.
 pthread_once_t s_once = PTHREAD_ONCE_INIT;
 pthread_mutex_t s_lock = PTHREAD_MUTEX_INITIALIZER;
-MutexGlobalStatics* s_statics = nullptr;  // one reference, guarded by s_lock
+// Guarded by s_lock: one reference, and the list of the statics that came through forks. Those are
+// never released, as their sections may belong to threads that are not here, but kept in sight of
+// leak checkers.
+MutexGlobalStatics* s_statics = nullptr;
+MutexGlobalStatics* s_inherited = nullptr;
 
 class Hold {
  public:
@@ -24,24 +28,29 @@ class Hold {
   Hold& operator=(const Hold&) = delete;
 };
 
-void BeforeFork() { pthread_mutex_lock(&s_lock); }
-void InParent() { pthread_mutex_unlock(&s_lock); }
-void InChild() {
-  pthread_mutex_init(&s_lock, nullptr);
-  s_statics = nullptr;  // not released: its sections may belong to threads that are not here
+void LockForFork() { pthread_mutex_lock(&s_lock); }
+void UnlockAfterFork() { pthread_mutex_unlock(&s_lock); }
+
+// Sets statics of another process aside. The process id tells a child apart that was made without
+// the handlers of fork(), too.
+void DropInherited() {
+  if (s_statics == nullptr || s_statics->pid == getpid()) return;
+  s_statics->inherited = std::exchange(s_inherited, s_statics);
+  s_statics = nullptr;
 }
 
 void AtExit() {
   MutexGlobalStatics* last;
   {
     Hold hold;
+    DropInherited();
     last = std::exchange(s_statics, nullptr);
   }
-  if (last != nullptr && last->pid == getpid()) last->release();
+  if (last != nullptr) last->release();
 }
 
 void Register() {
-  pthread_atfork(BeforeFork, InParent, InChild);
+  pthread_atfork(LockForFork, UnlockAfterFork, UnlockAfterFork);
   std::atexit(AtExit);
 }
 
@@ -52,11 +61,8 @@ MutexGlobalStatics::MutexGlobalStatics() : pid(getpid()) {}
 RefPtr<MutexGlobalStatics> MutexGlobalStatics::Get() {
   pthread_once(&s_once, Register);
   Hold hold;
-  // The process id tells a child apart that was made without the handlers of fork().
-  if (s_statics == nullptr || s_statics->pid != getpid()) {
-    RefPtr<MutexGlobalStatics> fresh(new MutexGlobalStatics);
-    s_statics = fresh.detach();
-  }
+  DropInherited();
+  if (s_statics == nullptr) s_statics = RefPtr<MutexGlobalStatics>(new MutexGlobalStatics).detach();
   return RefPtr<MutexGlobalStatics>(s_statics);
 }
 

@@ -71,8 +71,8 @@ struct Mutex::Record {
   const String name;
   RefPtr<MutexGlobalStatics> statics;
   const AnsiString file;
-  // Changed by the section's owner alone, under the statics' section, so that other threads may read
-  // it there.
+  // Changed by the section's owner alone, under the statics' section, so that other threads may
+  // read it there.
   ScopedFd fd;
   FileIdentity identity;
   MutexGlobalStatics::Map::iterator data;

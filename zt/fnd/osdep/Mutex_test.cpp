@@ -21,6 +21,8 @@
 
 #include "tests/support/Child.h"
 #include "tests/support/FailSystemCall.h"
+#include "tests/support/MutexPlace.h"
+#include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
@@ -33,36 +35,14 @@ namespace {
 using vlt::test::BlockedIn;
 using vlt::test::Child;
 using vlt::test::Eventually;
+using vlt::test::FileIsFree;
 using vlt::test::ModeOf;
+using vlt::test::MutexPlace;
+using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
 using vlt::test::TempDir;
+using vlt::test::Wide;
 using vlt::test::WriteBytes;
-
-String Wide(const std::string& text) { return String(text.c_str()); }
-
-template <class Call>
-int PosixErrorOf(Call call) {
-  try {
-    call();
-  } catch (const PosixError& e) {
-    return static_cast<int>(e.whatcode());
-  }
-  return -1;
-}
-
-// A shared place of the test's own.
-struct Place {
-  TempDir dir;
-  Place() { setenv("ZTFNDTMPSHAREDFILEDIR", dir.path().c_str(), 1); }
-  std::string file(const char* name) const { return dir / ("mutex/" + std::string(name)); }
-};
-
-// Whether the lock on the file is free for others, told by a descriptor of its own.
-bool FileIsFree(const std::string& path) {
-  ScopedFd fd(::open(path.c_str(), O_RDWR | O_CLOEXEC));
-  EXPECT_TRUE(fd.valid()) << path;
-  return Flock(fd.get(), LOCK_EX | LOCK_NB) == 0;
-}
 
 bool TryElsewhere(const Mutex& mutex) {
   return std::async(std::launch::async,
@@ -91,7 +71,7 @@ struct Holder {
 };
 
 TEST(Mutex, LeavesAnEmptyFileOpenToAll) {
-  Place place;
+  MutexPlace place;
   {
     Mutex mutex(L"name");
     mutex.lock();
@@ -104,7 +84,7 @@ TEST(Mutex, LeavesAnEmptyFileOpenToAll) {
 }
 
 TEST(Mutex, ModesStandUnderARestrictiveUmask) {
-  Place place;
+  MutexPlace place;
   Child child([] {
     umask(0077);
     Mutex mutex(L"name");
@@ -116,7 +96,7 @@ TEST(Mutex, ModesStandUnderARestrictiveUmask) {
 }
 
 TEST(Mutex, LockedThreeTimesIsFreeAfterTheThirdUnlock) {
-  Place place;
+  MutexPlace place;
   Mutex mutex(L"name");
   mutex.lock();
   EXPECT_TRUE(mutex.tryLock());
@@ -132,7 +112,7 @@ TEST(Mutex, LockedThreeTimesIsFreeAfterTheThirdUnlock) {
 }
 
 TEST(Mutex, ThreadsWithObjectsOfTheirOwnExcludeOneAnother) {
-  Place place;
+  MutexPlace place;
   int count = 0;  // guarded by nothing but the mutex
   std::vector<std::thread> threads;
   for (int t = 0; t < 4; ++t) {
@@ -150,7 +130,7 @@ TEST(Mutex, ThreadsWithObjectsOfTheirOwnExcludeOneAnother) {
 }
 
 TEST(Mutex, ThreadsThatShareOneObjectExcludeOneAnother) {
-  Place place;
+  MutexPlace place;
   Mutex mutex(L"name");
   int count = 0;
   std::vector<std::thread> threads;
@@ -168,7 +148,7 @@ TEST(Mutex, ThreadsThatShareOneObjectExcludeOneAnother) {
 }
 
 TEST(Mutex, OtherThreadOfTheProcessIsRefusedWhileHeld) {
-  Place place;
+  MutexPlace place;
   Mutex mutex(L"name"), sibling(L"name");
   mutex.lock();
   EXPECT_FALSE(TryElsewhere(mutex));
@@ -178,7 +158,7 @@ TEST(Mutex, OtherThreadOfTheProcessIsRefusedWhileHeld) {
 }
 
 TEST(Mutex, ProcessesLoseNoStep) {
-  Place place;
+  MutexPlace place;
   WriteBytes(place.dir / "count", std::string(sizeof(int), '\0'));
   std::vector<Child> children;
   for (int c = 0; c < 4; ++c) {
@@ -203,7 +183,7 @@ TEST(Mutex, ProcessesLoseNoStep) {
 }
 
 TEST(Mutex, TryLockWhileAnotherProcessHoldsItIsFalseAndLeavesNoTrace) {
-  Place place;
+  MutexPlace place;
   Mutex mutex(L"name");
   Holder holder("name");
   EXPECT_FALSE(mutex.tryLock());
@@ -218,7 +198,7 @@ TEST(Mutex, TryLockWhileAnotherProcessHoldsItIsFalseAndLeavesNoTrace) {
 }
 
 TEST(Mutex, KilledHolderDoesNotBlockTheNext) {
-  Place place;
+  MutexPlace place;
   Holder holder("name");
   Child waiter([] {
     Mutex mutex(L"name");
@@ -232,7 +212,7 @@ TEST(Mutex, KilledHolderDoesNotBlockTheNext) {
 }
 
 TEST(Mutex, InterruptedWaitIsResumed) {
-  Place place;
+  MutexPlace place;
   Holder holder("name");
   Child waiter([] {
     struct sigaction action = {};
@@ -252,7 +232,7 @@ TEST(Mutex, InterruptedWaitIsResumed) {
 }
 
 TEST(Mutex, NamesThatDifferInCaseShareASectionAndHaveTwoFiles) {
-  Place place;
+  MutexPlace place;
   Mutex upper(L"Foo"), lower(L"foo");
   upper.lock();
   EXPECT_FALSE(TryElsewhere(lower));  // the section
@@ -268,7 +248,7 @@ TEST(Mutex, NamesThatDifferInCaseShareASectionAndHaveTwoFiles) {
 }
 
 TEST(Mutex, SecondObjectInTheSameThreadBlocksInFlock) {
-  Place place;
+  MutexPlace place;
   Child child([] {
     Mutex first(L"name"), second(L"name");
     first.lock();
@@ -283,7 +263,7 @@ TEST(Mutex, SecondObjectInTheSameThreadBlocksInFlock) {
 }
 
 TEST(Mutex, UnlockOfAFreeMutexChangesNothing) {
-  Place place;
+  MutexPlace place;
   Mutex mutex(L"name"), sibling(L"name");
   mutex.unlock();
   mutex.unlock();
@@ -297,7 +277,7 @@ TEST(Mutex, UnlockOfAFreeMutexChangesNothing) {
 }
 
 TEST(Mutex, UnlockByAnotherThreadFreesTheFileAndLeavesTheSection) {
-  Place place;
+  MutexPlace place;
   Mutex mutex(L"name");
   mutex.lock();
   std::thread([&] { mutex.unlock(); }).join();
@@ -312,7 +292,7 @@ TEST(Mutex, UnlockByAnotherThreadFreesTheFileAndLeavesTheSection) {
 }
 
 TEST(Mutex, DestructionFreesWhatIsHeld) {
-  Place place;
+  MutexPlace place;
   Mutex sibling(L"name");
   {
     Mutex mutex(L"name");
@@ -324,7 +304,7 @@ TEST(Mutex, DestructionFreesWhatIsHeld) {
 }
 
 TEST(Mutex, DestructionByAnotherThreadFreesTheFile) {
-  Place place;
+  MutexPlace place;
   auto mutex = std::make_unique<Mutex>(Wide("name"));
   mutex->lock();
   std::thread([&] { mutex.reset(); }).join();
@@ -334,7 +314,7 @@ TEST(Mutex, DestructionByAnotherThreadFreesTheFile) {
 }
 
 TEST(Mutex, DescriptorsComeBack) {
-  Place place;
+  MutexPlace place;
   Mutex first(L"other");
   int before = vlt::test::OpenDescriptors();
   { Mutex mutex(L"name"), again(L"name"); }
@@ -344,7 +324,7 @@ TEST(Mutex, DescriptorsComeBack) {
 // ---- hostile places
 
 TEST(Mutex, FileThatCannotBeMadeIsAPosixErrorWithoutTrace) {
-  Place place;
+  MutexPlace place;
   ASSERT_EQ(0, mkdir((place.dir / "mutex").c_str(), 0777));
   ASSERT_EQ(0, mkfifo(place.file("fifo").c_str(), 0666));
   WriteBytes(place.dir / "victim", "x");
@@ -363,13 +343,13 @@ TEST(Mutex, FileThatCannotBeMadeIsAPosixErrorWithoutTrace) {
 }
 
 TEST(Mutex, FileInTheDirectorysPlaceIsENOTDIR) {
-  Place place;
+  MutexPlace place;
   WriteBytes(place.dir / "mutex", "x");
   EXPECT_EQ(ENOTDIR, PosixErrorOf([] { Mutex m(L"name"); }));
 }
 
 TEST(Mutex, ReplacedFileIsLockedInPlaceOfTheOldOne) {
-  Place place;
+  MutexPlace place;
   Mutex mutex(L"name");
   ASSERT_EQ(0, unlink(place.file("name").c_str()));
   mutex.lock();
@@ -388,7 +368,7 @@ TEST(Mutex, ReplacedFileIsLockedInPlaceOfTheOldOne) {
 }
 
 TEST(Mutex, RemovedDirectoryIsMadeAgain) {
-  Place place;
+  MutexPlace place;
   Mutex mutex(L"name");
   std::filesystem::remove_all(place.dir / "mutex");
   mutex.lock();
@@ -398,7 +378,7 @@ TEST(Mutex, RemovedDirectoryIsMadeAgain) {
 }
 
 TEST(Mutex, FailedLockLeavesTheSection) {
-  Place place;
+  MutexPlace place;
   Mutex mutex(L"name");
   std::filesystem::remove_all(place.dir / "mutex");
   WriteBytes(place.dir / "mutex", "in the way");
@@ -410,7 +390,7 @@ TEST(Mutex, FailedLockLeavesTheSection) {
 }
 
 TEST(Mutex, RefusedFileLockIsThrownWithItsErrnoAndLeavesTheSection) {
-  Place place;
+  MutexPlace place;
   Child child([] {
     Mutex mutex(L"name");
     if (!vlt::test::FailSystemCall(SYS_flock, ENOLCK)) return 1;
@@ -425,7 +405,7 @@ TEST(Mutex, RefusedFileLockIsThrownWithItsErrnoAndLeavesTheSection) {
 }
 
 TEST(Mutex, UnlockThatTheSystemRefusesThrowsNothing) {
-  Place place;
+  MutexPlace place;
   Child child([&] {
     Mutex mutex(L"name");
     mutex.lock();
@@ -434,181 +414,6 @@ TEST(Mutex, UnlockThatTheSystemRefusesThrowsNothing) {
     return 0;
   });
   EXPECT_EQ(0, child.wait());
-}
-
-// ---- fork and exec
-
-TEST(MutexFork, ChildHoldsNothingAndFreesNothing) {
-  Place place;
-  Mutex mutex(L"name");
-  mutex.lock();
-  Child child([&] {
-    mutex.unlock();
-    if (FileIsFree(place.file("name"))) return 1;
-    if (mutex.tryLock()) return 2;
-    mutex.unlock();
-    return FileIsFree(place.file("name")) ? 3 : 0;
-  });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_FALSE(FileIsFree(place.file("name")));
-  mutex.unlock();
-  EXPECT_TRUE(FileIsFree(place.file("name")));
-}
-
-TEST(MutexFork, InheritedObjectMayBeDestroyedWhileTheParentHolds) {
-  Place place;
-  auto mutex = std::make_unique<Mutex>(Wide("name"));
-  mutex->lock();
-  for (bool useFirst : {false, true}) {
-    Child child([&] {
-      if (useFirst && mutex->tryLock()) return 1;
-      mutex.reset();
-      return FileIsFree(place.file("name")) ? 2 : 0;
-    });
-    EXPECT_EQ(0, child.wait());
-    EXPECT_FALSE(FileIsFree(place.file("name")));
-  }
-}
-
-TEST(MutexFork, ChildWaitsForTheParentAndThenHolds) {
-  Place place;
-  Mutex mutex(L"name");
-  mutex.lock();
-  Child child([&] {
-    mutex.lock();
-    if (FileIsFree(place.file("name"))) return 1;
-    mutex.lock();
-    mutex.unlock();
-    if (FileIsFree(place.file("name"))) return 2;
-    mutex.unlock();
-    return FileIsFree(place.file("name")) ? 0 : 3;
-  });
-  EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }));
-  mutex.unlock();
-  EXPECT_EQ(0, child.wait());
-}
-
-TEST(MutexFork, ForkWhileAnotherThreadHoldsLeavesAUsableChild) {
-  Place place;
-  Mutex mutex(L"name");
-  std::promise<void> locked, finish;
-  std::thread holder([&] {
-    mutex.lock();
-    locked.set_value();
-    finish.get_future().wait();
-    mutex.unlock();
-  });
-  locked.get_future().wait();
-  Child child([&] {
-    if (mutex.tryLock()) return 1;  // the parent's thread holds the file
-    Mutex other(L"other");
-    other.lock();
-    other.unlock();
-    mutex.lock();  // until that thread has finished
-    mutex.unlock();
-    return 0;
-  });
-  EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }));
-  finish.set_value();
-  holder.join();
-  EXPECT_EQ(0, child.wait());
-}
-
-TEST(MutexFork, ForksDuringHeavyUseLeaveUsableChildren) {
-  Place place;
-  Mutex shared(L"shared");
-  std::atomic<bool> stop{false};
-  std::vector<std::thread> threads;
-  for (int t = 0; t < 2; ++t) {
-    threads.emplace_back([&, t] {
-      while (!stop) {
-        Mutex mutex(Wide("own" + std::to_string(t)));
-        mutex.lock();
-        shared.lock();
-        shared.unlock();
-        mutex.unlock();
-      }
-    });
-  }
-  for (int i = 0; i < 30; ++i) {
-    Child child([&] {
-      shared.lock();
-      shared.unlock();
-      Mutex mutex(L"own0");
-      mutex.lock();
-      mutex.unlock();
-      return 0;
-    });
-    EXPECT_EQ(0, child.wait()) << i;
-  }
-  stop = true;
-  for (auto& thread : threads) thread.join();
-}
-
-TEST(MutexFork, ThreadsOfAChildRenewAnInheritedObjectOnce) {
-  Place place;
-  Mutex mutex(L"name");
-  Child child([&] {
-    int count = 0;
-    std::vector<std::thread> threads;
-    for (int t = 0; t < 4; ++t) {
-      threads.emplace_back([&] {
-        for (int i = 0; i < 200; ++i) {
-          mutex.lock();
-          ++count;
-          mutex.unlock();
-        }
-      });
-    }
-    for (auto& thread : threads) thread.join();
-    return count == 800 ? 0 : 1;
-  });
-  EXPECT_EQ(0, child.wait());
-}
-
-TEST(MutexFork, GrandchildRenewsAgain) {
-  Place place;
-  Mutex mutex(L"name");
-  Child child([&] {
-    mutex.lock();
-    Child grandchild([&] { return mutex.tryLock() ? 1 : 0; });
-    int code = grandchild.wait();
-    mutex.unlock();
-    return code;
-  });
-  EXPECT_EQ(0, child.wait());
-}
-
-TEST(MutexFork, ProgramStartedByExecKeepsNoLock) {
-  Place place;
-  int feed[2], started[2];
-  ASSERT_EQ(0, pipe2(feed, O_CLOEXEC));
-  ASSERT_EQ(0, pipe2(started, O_CLOEXEC));
-  Child holder([&] {
-    Mutex mutex(L"name");
-    mutex.lock();
-    if (fork() == 0) {
-      // Lives until the test closes the other end.
-      dup2(feed[0], 0);
-      dup2(started[1], 1);
-      execlp("cat", "cat", static_cast<char*>(nullptr));
-      _exit(1);
-    }
-    for (;;) pause();
-    return 0;
-  });
-  ::close(feed[0]);
-  ::close(started[1]);
-  char byte;
-  ASSERT_EQ(1, write(feed[1], "x", 1));
-  ASSERT_EQ(1, read(started[0], &byte, 1));  // the program runs
-  EXPECT_FALSE(FileIsFree(place.file("name")));
-  holder.kill(SIGKILL);
-  holder.wait();
-  EXPECT_TRUE(FileIsFree(place.file("name")));
-  ::close(feed[1]);
-  EXPECT_EQ(0, read(started[0], &byte, 1));  // it has lived until now
-  ::close(started[0]);
 }
 
 // ---- the end of the process
@@ -621,7 +426,7 @@ void UseAfterTheStaticsWent() {
 }
 
 TEST(Mutex, WorksInExitFunctionsThatRunAfterItsOwn) {
-  Place place;
+  MutexPlace place;
   Child child([]() -> int {
     std::atexit(UseAfterTheStaticsWent);  // before the first use, so it runs after
     {

@@ -10,6 +10,7 @@
 
 #include "tests/support/Child.h"
 #include "tests/support/Modules.h"
+#include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/OSException.h"
@@ -20,8 +21,7 @@ namespace {
 using vlt::test::IsMapped;
 using vlt::test::MakeModule;
 using vlt::test::TempDir;
-
-String Wide(const std::string& text) { return String(text.c_str()); }
+using vlt::test::Wide;
 
 bool Works(void* function) {
   return function != nullptr && reinterpret_cast<double (*)(double)>(function)(0.0) == 1.0;

@@ -29,8 +29,9 @@ void CreateSharedUnixDir(const String& path);
 
 // Opens the file for reading and writing, made if missing, and gives it mode 0666; one that belongs
 // to somebody else stays as it is. Returns the descriptor, close-on-exec, which the caller owns.
-// Throws PosixError: refused access (EACCES) after three attempts a millisecond apart, EPERM for any
-// failure to set the mode, ENXIO for what is no regular file, EMLINK for a file with several names.
+// Throws PosixError: refused access (EACCES) after three attempts a millisecond apart, EPERM for
+// any failure to set the mode, ENXIO for what is no regular file, EMLINK for a file with several
+// names.
 int CreateSharedUnixFile(const AnsiString& path);
 
 // Which file a descriptor belongs to.

@@ -24,20 +24,21 @@ constexpr const wchar_t* kDefaultBase = L"/var/tmp/zentrex/shared";
 constexpr const char* kBaseVariable = "ZTFNDTMPSHAREDFILEDIR";
 constexpr mode_t kDirMode = 0777;
 constexpr mode_t kFileMode = 0666;
-constexpr int kDirAttempts = 5;
+constexpr int kRefusedDirs = 5;
+constexpr int kLostRaces = 100;  // one may be lost at each level of a path
 constexpr int kRefusedOpens = 3;
 constexpr int kVanishedOpens = 100;
 
 // Makes the directories. Other processes make the same ones: the loser of a race finds a level that
 // stands already, and one of another user may be seen before its mode is set.
 void MakeDirectories(const String& path) {
-  for (int attempt = 1; !path::IsDirectory(path.c_str()); ++attempt) {
+  for (int lost = 0, refused = 0; !path::IsDirectory(path.c_str());) {
     try {
       path::CreateDir(path.c_str(), kDirMode);
     } catch (const exception::ObjectAlreadyExists&) {  // A level of a race, or a file for good.
-      if (attempt >= kDirAttempts) return;
+      if (++lost >= kLostRaces) return;
     } catch (const exception::AccessDenied&) {  // A level whose mode is about to be opened.
-      if (attempt >= kDirAttempts) throw;
+      if (++refused >= kRefusedDirs) throw;
       Sleep(1);
     }
   }

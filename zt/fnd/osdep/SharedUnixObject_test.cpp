@@ -13,6 +13,7 @@
 
 #include "tests/support/Child.h"
 #include "tests/support/FailSystemCall.h"
+#include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
@@ -24,24 +25,14 @@ namespace {
 
 using vlt::test::Child;
 using vlt::test::ModeOf;
+using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
 using vlt::test::TempDir;
+using vlt::test::Wide;
 using vlt::test::WriteBytes;
 
 constexpr const char* kVariable = "ZTFNDTMPSHAREDFILEDIR";
 constexpr uid_t kSomeUser = 65534, kOtherUser = 65533;
-
-String Wide(const std::string& text) { return String(text.c_str()); }
-
-template <class Call>
-int PosixErrorOf(Call call) {
-  try {
-    call();
-  } catch (const PosixError& e) {
-    return static_cast<int>(e.whatcode());
-  }
-  return -1;
-}
 
 int Open(const std::string& path) {
   return ScopedFd(CreateSharedUnixFile(AnsiString(path.c_str()))).get();

@@ -89,7 +89,8 @@ class TreeCopy {
     if (!path::IsDirectory(to.c_str())) path::CreateDir(to.c_str());
     if (m_chain.empty()) m_target = Entry(to);
     m_chain.push_back(source);
-    for (const String& name : FindFiles().getFilenames(path::Join(from, String(L"*")))) {
+    for (const String& name :
+         FindFiles().getFilenames(path::Join(from, String(L"*")), FindFiles::FindFlags::None)) {
       copyEntry(name, to);
     }
     m_chain.pop_back();

@@ -10,6 +10,7 @@
 #include <string>
 
 #include "tests/support/Child.h"
+#include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
@@ -21,21 +22,11 @@ namespace {
 
 using vlt::test::Exists;
 using vlt::test::ModeOf;
+using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
 using vlt::test::TempDir;
+using vlt::test::Wide;
 using vlt::test::WriteBytes;
-
-String Wide(const std::string& text) { return String(text.c_str()); }
-
-template <class Call>
-int PosixErrorOf(Call call) {
-  try {
-    call();
-  } catch (const PosixError& e) {
-    return static_cast<int>(e.whatcode());
-  }
-  return -1;
-}
 
 ino_t InodeOf(const std::string& path) {
   struct stat info = {};

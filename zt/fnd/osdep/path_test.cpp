@@ -10,6 +10,7 @@
 
 #include "tests/support/Child.h"
 #include "tests/support/FailSystemCall.h"
+#include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
@@ -20,21 +21,11 @@ namespace {
 
 using vlt::test::Exists;
 using vlt::test::ModeOf;
+using vlt::test::PosixErrorOf;
 using vlt::test::TempDir;
+using vlt::test::Wide;
 
-String Wide(const std::string& text) { return String(text.c_str()); }
 std::string Narrow(const String& text) { return AnsiString(text).c_str(); }
-
-// The errno of the PosixError that the call throws; -1 for none.
-template <class Call>
-int PosixErrorOf(Call call) {
-  try {
-    call();
-  } catch (const PosixError& e) {
-    return static_cast<int>(e.whatcode());
-  }
-  return -1;
-}
 
 template <class Call>
 std::string AccessDeniedTextOf(Call call) {

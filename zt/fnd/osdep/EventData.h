@@ -1,0 +1,63 @@
+#pragma once
+
+#include <sys/types.h>
+
+#include "zt/fnd/RefCounted.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/EventFile.h"
+#include "zt/fnd/osdep/SemaphoreSet.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+
+// One open event; one object a name in a process.
+//
+// A slot in a semaphore set, which the event's lock file names. Where nobody else has the event, the
+// slot that a dead process left is taken over, if the set has outlived that process too and the kind
+// of reset is the same; otherwise the first free slot of the lowest set is taken. The last one to
+// close gives the slot back and removes the lock file. Destruction throws nothing.
+class EventData : public RefCountedCriticalSectionPolicy {
+ public:
+  EventData(NamedEventGlobalStatics& statics, const String& name, bool manualReset);
+  ~EventData() override;
+
+  // Opens or joins. False if the event is being closed by others: nothing is held then, and the
+  // caller has to begin again. `initialState` counts only where nobody else has the event. Throws as
+  // getOrCreateNamedEvent; nothing is held then, and a file that this call has made is gone.
+  bool open(bool initialState);
+
+  // Takes one reference away, in a forked child too, where the parent's event stays as it is.
+  void drop();
+
+  const String& name() const { return m_name; }
+  bool manualReset() const { return m_manualReset; }
+  const SemaphoreSet& set() const { return *m_set; }
+  unsigned slot() const { return m_slot; }
+
+  // Values of the semaphore. The waiters of a manual event wait for zero, which lets all of them
+  // pass and changes nothing; those of an automatic one decrement, which lets one of them pass.
+  int signaledValue() const { return m_manualReset ? 0 : 1; }
+  int clearValue() const { return m_manualReset ? 1 : 0; }
+
+ private:
+  class Undo;
+  void openAlone(EventFile& file, bool initialState);
+  bool takeOver(const EventFile& file, RefPtr<SemaphoreSet>& seen);
+  void allocate(const EventFile& file);
+  bool allocateIn(SemaphoreSet& set, unsigned slot, const EventFile& file);
+  bool join(const EventFile& file);
+  void close();
+
+  RefPtr<NamedEventGlobalStatics> m_statics;
+  const pid_t m_pid;
+  const String m_name;
+  const bool m_manualReset;
+  EventFile m_file;
+  RefPtr<SemaphoreSet> m_set;
+  unsigned m_slot = 0;
+};
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,185 @@
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <string>
+#include <utility>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/EventData.h"
+#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
+#include "zt/fnd/osdep/OSException.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+// Unusable sets in a row after which there is none to be had. One that somebody else keeps locked
+// takes half a second to tell, so it counts for more.
+constexpr unsigned kUnusableSets = 1024;
+constexpr unsigned kBusySetWeight = 128;
+
+// A set of this number belongs to a program that keeps its events elsewhere.
+bool IsReserved(unsigned number) {
+  std::string marker = "/tmp/zentrex/zt_fnd_osdep_NamedEvent_sem_" + std::to_string(number);
+  struct stat info;
+  return ::stat(marker.c_str(), &info) == 0;
+}
+
+bool ReadPlace(const EventFile& file, EventPlace& place) {
+  EventPlace::Bytes bytes;
+  if (!file.read(bytes.data(), bytes.size(), 0)) return false;
+  place = EventPlace::Decode(bytes);
+  return true;
+}
+
+}  // namespace
+
+EventData::EventData(NamedEventGlobalStatics& statics, const String& name, bool manualReset)
+    : RefCountedCriticalSectionPolicy(&statics.section),
+      m_statics(&statics),
+      m_pid(getpid()),
+      m_name(name),
+      m_manualReset(manualReset) {}
+
+// ---- opening
+
+// Takes back what a failed opening has taken. The lock file goes too if it leads nowhere now.
+class EventData::Undo {
+ public:
+  Undo(EventData& event, const EventFile& file) : m_event(&event), m_file(file) {}
+  ~Undo() {
+    if (m_event == nullptr) return;
+    bool taken = static_cast<bool>(m_event->m_set);
+    if (taken) m_event->m_set->giveBack(m_event->m_slot, m_file.key());
+    if (taken || m_file.wasEmpty()) m_file.unlink();
+    m_event->m_set = nullptr;
+  }
+  Undo(const Undo&) = delete;
+  Undo& operator=(const Undo&) = delete;
+  void dismiss() { m_event = nullptr; }
+
+ private:
+  EventData* m_event;
+  const EventFile& m_file;
+};
+
+bool EventData::open(bool initialState) {
+  EventFile file = EventFile::Open(m_name);
+  {
+    MutexHold hold(m_statics->stateFileMutex);
+    if (file.exclusive()) {
+      openAlone(file, initialState);
+    } else if (!join(file)) {
+      return false;
+    }
+  }
+  m_file = std::move(file);
+  m_file.settle();
+  return true;
+}
+
+void EventData::openAlone(EventFile& file, bool initialState) {
+  RefPtr<SemaphoreSet> seen;  // kept until the end, as the slot may come from it after all
+  Undo undo(*this, file);
+  if (!takeOver(file, seen)) allocate(file);
+  if (!m_set->setValue(m_slot, initialState ? signaledValue() : clearValue())) {
+    ZT_RAISE(PosixError());
+  }
+  if (!file.share()) ZT_RAISE(PosixError());
+  undo.dismiss();
+}
+
+// Takes the slot that the lock file names if it still is this event's.
+bool EventData::takeOver(const EventFile& file, RefPtr<SemaphoreSet>& seen) {
+  EventPlace place;
+  if (!ReadPlace(file, place)) return false;
+  seen = m_statics->getOrCreateSemaphoreSet(place.set);
+  SlotRecord record;
+  if (!seen->usable() || !seen->readSlot(place.slot, record)) return false;
+  if (!record.inUse || record.manualReset != m_manualReset || record.keyOrNext != file.key()) {
+    return false;
+  }
+  m_set = seen;
+  m_slot = place.slot;
+  return true;
+}
+
+void EventData::allocate(const EventFile& file) {
+  unsigned unusable = 0;
+  for (unsigned number = 1;; ++number) {
+    if (IsReserved(number)) continue;
+    RefPtr<SemaphoreSet> set = m_statics->getOrCreateSemaphoreSet(number);
+    unsigned slot = 0;
+    SemaphoreSet::Room room = set->usable() ? set->firstFree(slot) : SemaphoreSet::Room::Damaged;
+    if (room == SemaphoreSet::Room::Some && allocateIn(*set, slot, file)) return;
+    unusable = room == SemaphoreSet::Room::None ? 0 : unusable + (set->busy() ? kBusySetWeight : 1);
+    if (unusable >= kUnusableSets) ZT_RAISE(PosixError(ENOLCK));
+  }
+}
+
+// The lock file first: one that names a slot of somebody else's is seen through, while a used slot
+// that no lock file names would be lost.
+bool EventData::allocateIn(SemaphoreSet& set, unsigned slot, const EventFile& file) {
+  const EventPlace::Bytes bytes = EventPlace{set.number(), slot}.encode();
+  if (!file.write(bytes.data(), bytes.size(), 0)) ZT_RAISE(PosixError(ENOLCK));
+  if (!set.take(slot, m_manualReset, file.key())) return false;
+  m_set = RefPtr<SemaphoreSet>(&set);
+  m_slot = slot;
+  return true;
+}
+
+// Attaches to an event that others have. False if what the files say is not this event's: then it is
+// being closed, or a process has died with it. The wrong kind of reset is final.
+bool EventData::join(const EventFile& file) {
+  EventPlace place;
+  if (!ReadPlace(file, place)) return false;
+  RefPtr<SemaphoreSet> set = m_statics->getOrCreateSemaphoreSet(place.set);
+  SlotRecord record;
+  if (!set->usable() || !set->readSlot(place.slot, record)) return false;
+  if (!record.inUse || record.keyOrNext != file.key()) return false;
+  if (record.manualReset != m_manualReset) ZT_RAISE(PosixError(ENOLCK));
+  m_set = set;
+  m_slot = place.slot;
+  return true;
+}
+
+// ---- closing
+
+void EventData::drop() {
+  if (m_pid != getpid()) {
+    NamedEventGlobalStatics::ReleaseInherited(*this);
+    return;
+  }
+  RefPtr<NamedEventGlobalStatics> hold(m_statics);  // the section has to outlive the release
+  release();
+}
+
+EventData::~EventData() {
+  if (m_pid != getpid()) {
+    // The statics of the parent are out of bounds; what is this process's own is the descriptors.
+    m_statics.detach();
+    if (SemaphoreSet* set = m_set.detach()) set->RefCountedThreadUnsafePolicy::release();
+    return;
+  }
+  if (!m_file.valid()) return;
+  close();
+  m_statics->removeNamedEvent(*this);
+}
+
+void EventData::close() {
+  if (m_file.claim()) {
+    try {
+      MutexHold hold(m_statics->stateFileMutex);
+      m_set->giveBack(m_slot, m_file.key());
+      m_file.unlink();
+    } catch (const std::exception&) {  // Everything stays as a killed process leaves it.
+    }
+  }
+  m_file.close();
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,85 @@
+#pragma once
+
+#include <sys/types.h>
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/fnd/osdep/SharedUnixObject.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+
+// Locks an open file: true if the caller has it alone, false if beside others who share it.
+//
+// Waits for somebody who has it alone, 500 times a millisecond. Throws PosixError with flock's errno
+// after that; the file is then not locked.
+bool GetLockAccessToFile(int fd);
+
+// A file of "namedEvent/" in the shared directory, open and locked.
+//
+// The lock tells who is there: everybody who uses the file shares it, so that the last one, and only
+// the last, can have it alone; the kernel drops it when a process dies. A child that is forked while
+// a file is being opened or closed has no copy of it; a copy of a settled file counts as one more
+// user. An object that came through fork() never unlocks what its parent holds. Threads: one at a
+// time.
+class EventFile {
+ public:
+  EventFile() = default;  // none
+  EventFile(EventFile&& other) noexcept;
+  EventFile& operator=(EventFile&& other) noexcept;
+  ~EventFile() { close(); }
+
+  // Opens, made if missing, and locks, alone if possible. What is locked is the file that the name
+  // leads to: one that was removed meanwhile is given up for the new one. Throws what
+  // CreateSharedUnixFile and GetLockAccessToFile throw; PosixError(ENOLCK) if the file is replaced
+  // again and again.
+  static EventFile Open(const String& name);
+
+  bool valid() const noexcept { return m_fd.valid(); }
+  bool exclusive() const noexcept { return m_exclusive; }
+  // True if there was nothing in it when it was opened.
+  bool wasEmpty() const noexcept { return m_wasEmpty; }
+  // ftok(path, 1); never -1.
+  key_t key() const noexcept { return m_key; }
+
+  // One transfer of all the bytes; false for less.
+  bool read(void* bytes, std::size_t n, std::uint64_t offset) const noexcept;
+  bool write(const void* bytes, std::size_t n, std::uint64_t offset) const noexcept;
+
+  // From alone to shared, without a moment between. False with errno: not locked.
+  bool share() noexcept;
+
+  // Ends the opening: from here on a forked child keeps its copy of the file.
+  void settle() noexcept;
+
+  // From shared to alone, if nobody else is there. On false the file is not locked at all, so this
+  // is for the last use only.
+  bool claim() noexcept;
+
+  // Takes the file's name away, unless it names another file by now. For those who have it alone.
+  bool unlink() const noexcept;
+
+  // Unlocks and closes.
+  void close() noexcept;
+
+ private:
+  explicit EventFile(const AnsiString& path);
+  bool identify();
+
+  std::unique_ptr<const AnsiString> m_path;  // a pointer, as moving a string can fail
+  ScopedFd m_fd;
+  pid_t m_pid = 0;
+  bool m_exclusive = false;
+  bool m_wasEmpty = false;
+  key_t m_key = -1;
+  FileIdentity m_identity;
+};
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

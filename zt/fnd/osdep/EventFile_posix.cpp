@@ -1,0 +1,126 @@
+#include "zt/fnd/osdep/EventFile.h"
+
+#include <sys/file.h>
+#include <sys/ipc.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <utility>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/CloseOnFork.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/Retry.h"
+#include "zt/fnd/osdep/Sleep.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+constexpr const wchar_t* kDirectory = L"namedEvent";
+constexpr int kLockRounds = 500;
+// Each time another process has opened and closed the event in between, so many are no hang.
+constexpr int kReplacedFiles = 10000;
+constexpr int kProject = 1;  // of ftok
+
+}  // namespace
+
+bool GetLockAccessToFile(int fd) {
+  for (int round = 0;; ++round) {
+    if (Flock(fd, LOCK_EX | LOCK_NB) == 0) return true;
+    if (Flock(fd, LOCK_SH | LOCK_NB) == 0) return false;
+    if (round == kLockRounds) ZT_RAISE(PosixError());
+    Sleep(1);
+  }
+}
+
+EventFile::EventFile(const AnsiString& path)
+    : m_path(std::make_unique<const AnsiString>(path)),
+      m_fd(CreateSharedUnixFileCloseOnFork(path)),
+      m_pid(getpid()) {}
+
+EventFile::EventFile(EventFile&& other) noexcept { *this = std::move(other); }
+
+EventFile& EventFile::operator=(EventFile&& other) noexcept {
+  close();
+  m_path = std::move(other.m_path);
+  m_fd = std::move(other.m_fd);
+  m_pid = other.m_pid;
+  m_exclusive = other.m_exclusive;
+  m_wasEmpty = other.m_wasEmpty;
+  m_key = other.m_key;
+  m_identity = other.m_identity;
+  return *this;
+}
+
+EventFile EventFile::Open(const String& name) {
+  for (int attempt = 1;; ++attempt) {
+    EventFile file(BuildSharedUnixFilePath(String(kDirectory), name));
+    file.m_exclusive = GetLockAccessToFile(file.m_fd.get());
+    if (file.identify()) return file;
+    if (attempt == kReplacedFiles) ZT_RAISE(PosixError(ENOLCK));
+  }
+}
+
+// Learns what the locked file is; false if its name is gone or leads elsewhere. The key comes from
+// the name, so it is good only if the name still leads here after it was made.
+bool EventFile::identify() {
+  struct stat info;
+  if (::fstat(m_fd.get(), &info) != 0) ZT_RAISE(PosixError());
+  m_wasEmpty = info.st_size == 0;
+  m_identity = FileIdentity::Of(m_fd.get());
+  m_key = RetryEintr([&] { return ::ftok(m_path->c_str(), kProject); });
+  if (m_key == -1) {
+    if (errno != ENOENT) ZT_RAISE(PosixError());
+    return false;
+  }
+  return m_identity.isNamedBy(*m_path);
+}
+
+bool EventFile::read(void* bytes, std::size_t n, std::uint64_t offset) const noexcept {
+  ssize_t got =
+      RetryEintr([&] { return ::pread(m_fd.get(), bytes, n, static_cast<off_t>(offset)); });
+  return got >= 0 && static_cast<std::size_t>(got) == n;
+}
+
+bool EventFile::write(const void* bytes, std::size_t n, std::uint64_t offset) const noexcept {
+  ssize_t put =
+      RetryEintr([&] { return ::pwrite(m_fd.get(), bytes, n, static_cast<off_t>(offset)); });
+  return put >= 0 && static_cast<std::size_t>(put) == n;
+}
+
+bool EventFile::share() noexcept {
+  if (Flock(m_fd.get(), LOCK_SH) != 0) return false;
+  m_exclusive = false;
+  return true;
+}
+
+void EventFile::settle() noexcept { KeepOnFork(m_fd.get()); }
+
+bool EventFile::claim() noexcept {
+  CloseOnForkAgain(m_fd.get());
+  m_exclusive = Flock(m_fd.get(), LOCK_EX | LOCK_NB) == 0;
+  return m_exclusive;
+}
+
+bool EventFile::unlink() const noexcept {
+  if (!m_identity.isNamedBy(*m_path)) return false;
+  return RetryEintr([&] { return ::unlink(m_path->c_str()); }) == 0;
+}
+
+void EventFile::close() noexcept {
+  if (!m_fd.valid()) return;
+  if (m_pid == getpid()) {
+    int saved = errno;
+    Flock(m_fd.get(), LOCK_UN);
+    KeepOnFork(m_fd.get());
+    errno = saved;
+  }
+  m_fd.reset();
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,91 @@
+#include "zt/fnd/osdep/EventStateFile.h"
+
+#include <algorithm>
+#include <cstring>
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+template <class Number>
+void Put(unsigned char* to, Number value) {
+  std::memcpy(to, &value, sizeof value);
+}
+
+template <class Number>
+Number Get(const unsigned char* from) {
+  Number value;
+  std::memcpy(&value, from, sizeof value);
+  return value;
+}
+
+}  // namespace
+
+EventPlace::Bytes EventPlace::encode() const {
+  Bytes bytes = {};
+  Put(&bytes[1], set);
+  Put(&bytes[5], slot);
+  return bytes;
+}
+
+EventPlace EventPlace::Decode(const Bytes& bytes) {
+  EventPlace place;
+  place.set = Get<std::uint32_t>(&bytes[1]);
+  place.slot = Get<std::uint32_t>(&bytes[5]);
+  return place;
+}
+
+SetHeader::Bytes SetHeader::encode() const {
+  Bytes bytes = {};
+  Put(&bytes[0], kMagic);
+  bytes[kReadyOffset] = ready ? 1 : 0;
+  Put(&bytes[6], count);
+  Put(&bytes[kFreeOffset], freeCount);
+  Put(&bytes[14], firstFree);
+  return bytes;
+}
+
+bool SetHeader::decode(const Bytes& bytes) {
+  *this = SetHeader();
+  if (Get<std::uint32_t>(&bytes[0]) != kMagic) return false;
+  ready = bytes[kReadyOffset] == 1;
+  count = Get<std::uint32_t>(&bytes[6]);
+  freeCount = Get<std::uint32_t>(&bytes[kFreeOffset]);
+  firstFree = Get<std::uint32_t>(&bytes[14]);
+  return true;
+}
+
+SlotRecord::Bytes SlotRecord::encode() const {
+  Bytes bytes = {};
+  bytes[0] = inUse ? 1 : 0;
+  bytes[1] = manualReset ? 1 : 0;
+  // Widened with the sign, which makes the end of the list all ones.
+  Put(&bytes[2], static_cast<std::int64_t>(keyOrNext));
+  return bytes;
+}
+
+SlotRecord SlotRecord::Decode(const Bytes& bytes) {
+  SlotRecord record;
+  record.inUse = bytes[0] != 0;
+  record.manualReset = bytes[1] != 0;
+  record.keyOrNext = static_cast<std::int32_t>(Get<std::int64_t>(&bytes[2]));
+  return record;
+}
+
+StateFileBytes EncodeEmptySet() {
+  StateFileBytes bytes;
+  SetHeader header;
+  header.count = header.freeCount = kSlotsPerSet;
+  auto end = std::ranges::copy(header.encode(), bytes.begin()).out;
+  for (std::uint32_t slot = 0; slot < kSlotsPerSet; ++slot) {
+    SlotRecord record;
+    record.keyOrNext = slot + 1 < kSlotsPerSet ? static_cast<std::int32_t>(slot + 1) : -1;
+    end = std::ranges::copy(record.encode(), end).out;
+  }
+  return bytes;
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,83 @@
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+
+// The bytes of the two kinds of file in "namedEvent/" of the shared directory.
+//
+// All numbers are in the host's byte order, field behind field, without padding, and the same in
+// 32-bit and 64-bit processes. docs/event-files.md shows them in worked examples.
+namespace zt {
+namespace fnd {
+namespace osdep {
+
+constexpr std::uint32_t kSlotsPerSet = 128;
+constexpr std::uint32_t kNoSlot = 0xFFFFFFFFu;  // behind the last free slot
+
+// Contents of an event's lock file: where the event's semaphore is.
+//
+//   0  1  reserved, 0        1  4  set number        5  4  slot index
+struct EventPlace {
+  static constexpr std::size_t kSize = 9;
+  typedef std::array<unsigned char, kSize> Bytes;
+
+  std::uint32_t set = 0;
+  std::uint32_t slot = 0;
+
+  Bytes encode() const;
+  static EventPlace Decode(const Bytes& bytes);
+};
+
+// Head of a set's state file.
+//
+//   0  4  magic              5  1  ready: 1 while the semaphore set exists
+//   4  1  reserved, 0        6  4  slots      10  4  free slots      14  4  first free slot
+struct SetHeader {
+  static constexpr std::size_t kSize = 18;
+  static constexpr std::uint32_t kMagic = 0x15E35E31u;
+  static constexpr std::size_t kReadyOffset = 5;
+  static constexpr std::size_t kFreeOffset = 10;  // free count, then first free, to the end
+  typedef std::array<unsigned char, kSize> Bytes;
+
+  bool ready = false;
+  std::uint32_t count = 0;
+  std::uint32_t freeCount = 0;
+  std::uint32_t firstFree = 0;
+
+  Bytes encode() const;
+
+  // False, with all fields 0, if the magic is another one.
+  bool decode(const Bytes& bytes);
+};
+
+// Record of one slot, behind the head by index.
+//
+//   0  1  in use             1  1  manual reset
+//   2  8  in use: the key of the event's lock file; free: the next free slot, all ones at the end.
+//         Written with its sign; only the low 32 bits are read back.
+struct SlotRecord {
+  static constexpr std::size_t kSize = 10;
+  typedef std::array<unsigned char, kSize> Bytes;
+
+  bool inUse = false;
+  bool manualReset = false;
+  std::int32_t keyOrNext = 0;
+
+  Bytes encode() const;
+  static SlotRecord Decode(const Bytes& bytes);
+
+  static constexpr std::uint64_t Offset(std::uint32_t slot) {
+    return SetHeader::kSize + static_cast<std::uint64_t>(slot) * kSize;
+  }
+};
+
+constexpr std::size_t kStateFileSize = SetHeader::kSize + kSlotsPerSet * SlotRecord::kSize;
+typedef std::array<unsigned char, kStateFileSize> StateFileBytes;
+
+// A state file with all slots free and the ready flag clear.
+StateFileBytes EncodeEmptySet();
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,150 @@
+#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
+
+#include <pthread.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdlib>
+#include <utility>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/MonotonicClock.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/Sleep.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+// How long an event that others hold, but that cannot be joined, is tried again.
+constexpr unsigned kJoinPatienceMs = 2000;
+
+// Plain objects, ready before any initialiser and good after every destructor.
+pthread_once_t s_once = PTHREAD_ONCE_INIT;
+pthread_mutex_t s_lock = PTHREAD_MUTEX_INITIALIZER;
+// One reference. Behind it the statics that came through forks: never released, as their section may
+// belong to a thread that is not here, but kept in sight of leak checkers. Both guarded by s_lock.
+NamedEventGlobalStatics* s_statics = nullptr;
+NamedEventGlobalStatics* s_inherited = nullptr;
+
+class Hold {
+ public:
+  Hold() { pthread_mutex_lock(&s_lock); }
+  ~Hold() { pthread_mutex_unlock(&s_lock); }
+  Hold(const Hold&) = delete;
+  Hold& operator=(const Hold&) = delete;
+};
+
+void LockForFork() { pthread_mutex_lock(&s_lock); }
+void UnlockAfterFork() { pthread_mutex_unlock(&s_lock); }
+
+// Sets statics of another process aside. The process id tells a child apart that was made without
+// the handlers of fork(), too.
+void DropInherited() {
+  if (s_statics == nullptr || s_statics->pid == getpid()) return;
+  s_statics->inherited = std::exchange(s_inherited, s_statics);
+  s_statics = nullptr;
+}
+
+void AtExit() {
+  NamedEventGlobalStatics* last;
+  {
+    Hold hold;
+    DropInherited();
+    last = std::exchange(s_statics, nullptr);
+  }
+  if (last != nullptr) last->release();
+}
+
+void Register() {
+  pthread_atfork(LockForFork, UnlockAfterFork, UnlockAfterFork);
+  std::atexit(AtExit);
+}
+
+RefPtr<NamedEventGlobalStatics> Present() {
+  Hold hold;
+  DropInherited();
+  return RefPtr<NamedEventGlobalStatics>(s_statics);
+}
+
+}  // namespace
+
+NamedEventGlobalStatics::NamedEventGlobalStatics()
+    : pid(getpid()), stateFileMutex(String(L"zt_fnd_osdep_NamedEvent_StateFileMutex")) {}
+
+RefPtr<NamedEventGlobalStatics> NamedEventGlobalStatics::Get() {
+  pthread_once(&s_once, Register);
+  RefPtr<NamedEventGlobalStatics> present = Present();
+  if (present) return present;
+  // Made outside the lock, as this opens the mutex's file; of two threads one makes it in vain.
+  RefPtr<NamedEventGlobalStatics> fresh(new NamedEventGlobalStatics);
+  Hold hold;
+  if (s_statics == nullptr) s_statics = RefPtr<NamedEventGlobalStatics>(fresh).detach();
+  return RefPtr<NamedEventGlobalStatics>(s_statics);
+}
+
+RefPtr<SemaphoreSet> NamedEventGlobalStatics::getOrCreateSemaphoreSet(unsigned number) {
+  CriticalSectionGuard guard(section);
+  auto found = m_sets.find(number);
+  if (found != m_sets.end()) return RefPtr<SemaphoreSet>(found->second);
+  RefPtr<SemaphoreSet> set(new SemaphoreSet(*this, number));
+  m_sets.emplace(number, set.get());
+  return set;
+}
+
+// An event can be closing while it is joined: then everything is let go, and the event opened anew.
+// The others must have a chance to do the same, each at its own pace.
+RefPtr<EventData> NamedEventGlobalStatics::getOrCreateNamedEvent(const String& name,
+                                                                 bool manualReset,
+                                                                 bool initialState) {
+  const std::uint64_t end = MonotonicTicks() + MonotonicTicksPerSecond() / 1000 * kJoinPatienceMs;
+  for (unsigned attempt = 1;; ++attempt) {
+    RefPtr<EventData> event = openOrFind(name, manualReset, initialState);
+    if (event) return event;
+    if (MonotonicTicks() >= end) ZT_RAISE(PosixError(ENOLCK));
+    Sleep(1 + (static_cast<unsigned>(pid) + attempt) % 5);
+  }
+}
+
+// Null if a joined event turned out to be closing.
+RefPtr<EventData> NamedEventGlobalStatics::openOrFind(const String& name, bool manualReset,
+                                                      bool initialState) {
+  CriticalSectionGuard guard(section);
+  auto found = m_events.find(name);
+  if (found != m_events.end()) {
+    if (found->second->manualReset() != manualReset) ZT_RAISE(PosixError(EINVAL));
+    return RefPtr<EventData>(found->second);
+  }
+  RefPtr<EventData> event(new EventData(*this, name, manualReset));
+  if (!event->open(initialState)) return nullptr;
+  m_events.emplace(name, event.get());
+  return event;
+}
+
+void NamedEventGlobalStatics::removeSemaphoreSet(const SemaphoreSet& set) {
+  CriticalSectionGuard guard(section);
+  auto found = m_sets.find(set.number());
+  if (found != m_sets.end() && found->second == &set) m_sets.erase(found);
+}
+
+void NamedEventGlobalStatics::removeNamedEvent(const EventData& event) {
+  CriticalSectionGuard guard(section);
+  auto found = m_events.find(event.name());
+  if (found != m_events.end() && found->second == &event) m_events.erase(found);
+}
+
+bool NamedEventGlobalStatics::hasSemaphoreSetOfId(int id) const {
+  CriticalSectionGuard guard(section);
+  return std::ranges::any_of(m_sets, [id](const auto& entry) { return entry.second->id() == id; });
+}
+
+void NamedEventGlobalStatics::ReleaseInherited(const EventData& event) {
+  Hold hold;
+  event.RefCountedThreadUnsafePolicy::release();
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,561 @@
+// Opening and closing: which slot an event gets, what stands in the files, and what is left.
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/file.h>
+#include <sys/ipc.h>
+#include <sys/sem.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <cstring>
+#include <filesystem>
+#include <memory>
+#include <stdexcept>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "tests/support/Child.h"
+#include "tests/support/EventPlace.h"
+#include "tests/support/PosixErrorOf.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/EventStateFile.h"
+#include "zt/fnd/osdep/NamedEvent.h"
+#include "zt/fnd/osdep/ScopedFd.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::Child;
+using vlt::test::EventPlace;
+using vlt::test::Exists;
+using vlt::test::Keeper;
+using vlt::test::ModeOf;
+using vlt::test::OpenDescriptors;
+using vlt::test::PosixErrorOf;
+using vlt::test::ReadBytes;
+using vlt::test::Wide;
+using vlt::test::WriteBytes;
+typedef std::vector<std::string> Names;
+
+constexpr bool kManual = true, kAutomatic = false, kSet = true, kClear = false;
+
+typedef EventPlace::Slot Slot;
+
+auto Open(const std::string& name, bool manual = kManual, bool initial = kClear) {
+  return std::make_unique<NamedEvent>(Wide(name), manual, initial);
+}
+
+// The errno that opening the name fails with in another process; 0 if it does not.
+int ErrorElsewhere(const std::string& name, bool manual) {
+  return Child([&] {
+           int error = PosixErrorOf([&] { Open(name, manual); });
+           return error == -1 ? 0 : error;
+         })
+      .wait();
+}
+
+SetHeader HeaderOf(const std::string& path) {
+  std::string bytes = ReadBytes(path);
+  SetHeader header;
+  SetHeader::Bytes head = {};
+  if (bytes.size() >= head.size()) std::memcpy(head.data(), bytes.data(), head.size());
+  EXPECT_TRUE(header.decode(head)) << path;
+  return header;
+}
+
+SlotRecord RecordOf(const std::string& path, unsigned slot) {
+  std::string bytes = ReadBytes(path);
+  SlotRecord::Bytes record = {};
+  std::size_t at = static_cast<std::size_t>(SlotRecord::Offset(slot));
+  EXPECT_GE(bytes.size(), at + record.size());
+  std::memcpy(record.data(), bytes.data() + at, record.size());
+  return SlotRecord::Decode(record);
+}
+
+// ---- one process
+
+TEST(NamedEventFiles, FirstEventTakesSlotZeroOfSetOne) {
+  EventPlace place;
+  auto event = Open("name");
+  EXPECT_EQ((Names{"name", "sem_1"}), place.files());
+  EXPECT_EQ(std::string("\0\1\0\0\0\0\0\0\0", 9), ReadBytes(place.file("name")));
+  std::string state = ReadBytes(place.file("sem_1"));
+  ASSERT_EQ(1298u, state.size());
+  EXPECT_EQ(std::string("\x31\x5E\xE3\x15\0\1\x80\0\0\0\x7F\0\0\0\1\0\0\0", 18),
+            state.substr(0, 18));
+  std::int64_t key = ftok(place.file("name").c_str(), 1);
+  std::string record = std::string("\1\1") + std::string(reinterpret_cast<char*>(&key), 8);
+  EXPECT_EQ(record, state.substr(18, 10));
+  EXPECT_EQ(std::string("\0\0\2\0\0\0\0\0\0\0", 10), state.substr(28, 10));
+  EXPECT_EQ(std::string("\0\0\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF", 10), state.substr(1288));
+}
+
+TEST(NamedEventFiles, KernelSetHas128SemaphoresForEverybody) {
+  EventPlace place;
+  auto event = Open("name");
+  semid_ds info = {};
+  int id = EventPlace::SetOfKey(ftok(place.file("sem_1").c_str(), 1));
+  ASSERT_EQ(0, semctl(id, 0, IPC_STAT, &info));
+  EXPECT_EQ(128u, info.sem_nsems);
+  EXPECT_EQ(0777u, info.sem_perm.mode & 0777u);
+}
+
+TEST(NamedEventFiles, FilesAreOpenToAllWhateverTheUmask) {
+  EventPlace place;
+  Keeper keeper([] {
+    umask(0077);
+    return Open("name");
+  });
+  ASSERT_TRUE(keeper.good());
+  EXPECT_EQ(0666, ModeOf(place.file("name")));
+  EXPECT_EQ(0666, ModeOf(place.file("sem_1")));
+  EXPECT_EQ(0777, ModeOf(std::filesystem::path(place.file("name")).parent_path()));
+  EXPECT_TRUE(keeper.finish());
+}
+
+TEST(NamedEventFiles, LastCloseRemovesFilesAndSet) {
+  EventPlace place;
+  int before = EventPlace::CountSets();
+  Open("warm up");
+  int descriptors = OpenDescriptors();
+  auto event = Open("name");
+  int id = place.setOf(1);
+  ASSERT_GE(id, 0);
+  event.reset();
+  EXPECT_EQ(Names(), place.files());
+  EXPECT_EQ(-1, EventPlace::ValueOf(id, 0));
+  EXPECT_EQ(before, EventPlace::CountSets());
+  EXPECT_EQ(descriptors, OpenDescriptors());
+}
+
+TEST(NamedEventFiles, ClosedSlotGoesToTheFrontOfTheFreeList) {
+  EventPlace place;
+  auto a = Open("a"), b = Open("b", kAutomatic), c = Open("c");
+  EXPECT_EQ((Slot{1, 1}), place.slotOf("b"));
+  b.reset();
+  EXPECT_FALSE(Exists(place.file("b")));
+  SetHeader header = HeaderOf(place.file("sem_1"));
+  EXPECT_EQ(126u, header.freeCount);
+  EXPECT_EQ(1u, header.firstFree);
+  SlotRecord record = RecordOf(place.file("sem_1"), 1);
+  EXPECT_FALSE(record.inUse);
+  EXPECT_FALSE(record.manualReset);
+  EXPECT_EQ(3, record.keyOrNext);
+  a.reset();
+  EXPECT_EQ(0u, HeaderOf(place.file("sem_1")).firstFree);
+  // Last in, first out.
+  auto d = Open("d"), e = Open("e"), f = Open("f");
+  EXPECT_EQ((Slot{1, 0}), place.slotOf("d"));
+  EXPECT_EQ((Slot{1, 1}), place.slotOf("e"));
+  EXPECT_EQ((Slot{1, 3}), place.slotOf("f"));
+}
+
+TEST(NamedEventFiles, The129thEventGoesToSetTwo) {
+  EventPlace place;
+  std::vector<std::unique_ptr<NamedEvent>> events;
+  for (int i = 0; i < 128; ++i) events.push_back(Open("e" + std::to_string(i)));
+  EXPECT_FALSE(Exists(place.file("sem_2")));
+  SetHeader full = HeaderOf(place.file("sem_1"));
+  EXPECT_EQ(0u, full.freeCount);
+  EXPECT_EQ(kNoSlot, full.firstFree);
+  auto last = Open("e128");
+  EXPECT_EQ((Slot{2, 0}), place.slotOf("e128"));
+  EXPECT_NE(place.setOf(1), place.setOf(2));
+  // A slot given back to a full set ends its list with eight bytes of ones.
+  events[7].reset();
+  EXPECT_EQ(std::string("\0\0\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF", 10),
+            ReadBytes(place.file("sem_1")).substr(18 + 70, 10));
+  // The lowest set with room first.
+  auto again = Open("again");
+  EXPECT_EQ((Slot{1, 7}), place.slotOf("again"));
+  last.reset();
+  EXPECT_FALSE(Exists(place.file("sem_2")));
+  events.clear();
+  again.reset();
+  EXPECT_EQ(Names(), place.files());
+}
+
+TEST(NamedEventFiles, EventsOfManySetsAreIndependent) {
+  EventPlace place;
+  std::vector<std::unique_ptr<NamedEvent>> events;
+  for (int i = 0; i < 300; ++i) events.push_back(Open("e" + std::to_string(i), kAutomatic));
+  EXPECT_EQ((Slot{3, 43}), place.slotOf("e299"));
+  for (std::size_t i = 0; i < events.size(); i += 7) events[i]->set();
+  for (std::size_t i = 0; i < events.size(); ++i) EXPECT_EQ(i % 7 == 0, events[i]->check()) << i;
+  events.clear();
+  EXPECT_EQ(Names(), place.files());
+}
+
+TEST(NamedEventFiles, ObjectsOfOneNameShareTheEvent) {
+  EventPlace place;
+  auto first = Open("name", kAutomatic);
+  int descriptors = OpenDescriptors();
+  auto second = Open("name", kAutomatic, kSet);
+  EXPECT_EQ(descriptors, OpenDescriptors());
+  EXPECT_FALSE(second->checkOnly());  // the initial state is ignored
+  first->set();
+  EXPECT_TRUE(second->check());
+  first.reset();
+  EXPECT_TRUE(Exists(place.file("name")));
+  second->set();
+  EXPECT_TRUE(second->check());
+}
+
+TEST(NamedEventFiles, OtherKindInOneProcessIsEINVAL) {
+  EventPlace place;
+  auto event = Open("name", kManual, kSet);
+  std::string before = ReadBytes(place.file("sem_1"));
+  EXPECT_EQ(EINVAL, PosixErrorOf([] { Open("name", kAutomatic); }));
+  EXPECT_EQ(EINVAL, PosixErrorOf([] { Open("NAME", kAutomatic); }));
+  EXPECT_TRUE(event->checkOnly());
+  EXPECT_EQ(before, ReadBytes(place.file("sem_1")));
+  event.reset();
+  EXPECT_EQ(-1, PosixErrorOf([] { Open("name", kAutomatic); }));
+}
+
+TEST(NamedEventFiles, NamesFoldInAProcessAndNotInTheFileSystem) {
+  EventPlace place;
+  auto lower = Open("name"), upper = Open("NAME");
+  EXPECT_EQ((Names{"name", "sem_1"}), place.files());
+  lower->set();
+  EXPECT_TRUE(upper->checkOnly());
+  Keeper other([] { return Open("NAME", kAutomatic, kClear); });
+  ASSERT_TRUE(other.good());
+  EXPECT_EQ((Names{"NAME", "name", "sem_1"}), place.files());
+  EXPECT_EQ((Slot{1, 1}), place.slotOf("NAME"));
+  EXPECT_TRUE(other.finish());
+}
+
+TEST(NamedEventFiles, NamesOfTheWrongShape) {
+  EventPlace place;
+  auto other = Open("other");
+  int descriptors = OpenDescriptors();
+  std::string before = ReadBytes(place.file("sem_1"));
+  EXPECT_EQ(EISDIR, PosixErrorOf([] { Open(""); }));
+  EXPECT_EQ(ENOENT, PosixErrorOf([] { Open("no/such"); }));
+  EXPECT_EQ(ENAMETOOLONG, PosixErrorOf([] { Open(std::string(256, 'n')); }));
+  EXPECT_EQ(-1, PosixErrorOf([] { Open(std::string(255, 'n')); }));
+  EXPECT_EQ(descriptors, OpenDescriptors());
+  EXPECT_EQ(before, ReadBytes(place.file("sem_1")));
+  EXPECT_EQ((Names{"other", "sem_1"}), place.files());
+}
+
+// ---- several processes
+
+TEST(NamedEventFiles, TwoProcessesOpenANewNameAtOnceAndGetOneSlot) {
+  EventPlace place;
+  for (int round = 0; round < 40; ++round) {
+    vlt::test::Signal go, opened[2], end;
+    std::vector<Child> children;
+    for (int i = 0; i < 2; ++i) {
+      children.emplace_back([&, i] {
+        go.await();
+        auto event = Open("name", kAutomatic, kClear);
+        opened[i].notify();
+        end.await();
+        // What the first one sets, the second one gets.
+        if (i == 0) event->set();
+        return i == 0 || event->wait(20000) ? 0 : 1;
+      });
+    }
+    go.notify();
+    go.notify();
+    ASSERT_TRUE(opened[0].await() && opened[1].await());
+    EXPECT_EQ((Names{"name", "sem_1"}), place.files());
+    EXPECT_EQ((Slot{1, 0}), place.slotOf("name"));
+    EXPECT_EQ(127u, HeaderOf(place.file("sem_1")).freeCount);
+    end.notify();
+    end.notify();
+    for (Child& child : children) EXPECT_EQ(0, child.wait());
+    EXPECT_EQ(Names(), place.files());
+  }
+}
+
+TEST(NamedEventFiles, OpenerWaitsWhileAnotherSetsTheFileUp) {
+  EventPlace place;
+  auto other = Open("other");
+  // The exclusive phase of another opener, played with a descriptor of the test.
+  ScopedFd busy(::open(place.file("name").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666));
+  ASSERT_EQ(0, Flock(busy.get(), LOCK_EX));
+  vlt::test::Signal begun;
+  Child opener([&] {
+    begun.notify();
+    return Open("name", kAutomatic, kSet)->check() ? 0 : 1;
+  });
+  ASSERT_TRUE(begun.await());
+  std::this_thread::sleep_for(std::chrono::milliseconds(50));
+  EXPECT_TRUE(opener.running());
+  EXPECT_EQ("", ReadBytes(place.file("name")));
+  busy.reset();
+  EXPECT_EQ(0, opener.wait());
+}
+
+TEST(NamedEventFiles, OtherKindInAnotherProcessIsENOLCKAndChangesNothing) {
+  EventPlace place;
+  for (bool manual : {kManual, kAutomatic}) {
+    auto event = Open("name", manual, kSet);
+    std::string state = ReadBytes(place.file("sem_1")), lock = ReadBytes(place.file("name"));
+    auto begin = std::chrono::steady_clock::now();
+    EXPECT_EQ(ENOLCK, ErrorElsewhere("name", !manual));
+    EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::milliseconds(1500));
+    EXPECT_EQ(state, ReadBytes(place.file("sem_1")));
+    EXPECT_EQ(lock, ReadBytes(place.file("name")));
+    EXPECT_TRUE(event->checkOnly());
+    EXPECT_EQ(0, ErrorElsewhere("name", manual));
+  }
+}
+
+TEST(NamedEventFiles, JoiningIgnoresTheInitialState) {
+  EventPlace place;
+  for (bool manual : {kManual, kAutomatic}) {
+    for (bool initial : {kSet, kClear}) {
+      auto event = Open("name", manual, initial);
+      Child joiner([&] { return Open("name", manual, !initial)->checkOnly() == initial ? 0 : 1; });
+      EXPECT_EQ(0, joiner.wait());
+      EXPECT_EQ(initial, event->checkOnly());
+    }
+  }
+}
+
+TEST(NamedEventFiles, EventLivesUntilTheLastProcessCloses) {
+  EventPlace place;
+  auto mine = Open("name");
+  Keeper other([] { return Open("name"); });
+  ASSERT_TRUE(other.good());
+  mine->set();
+  mine.reset();
+  EXPECT_EQ((Names{"name", "sem_1"}), place.files());
+  EXPECT_EQ(127u, HeaderOf(place.file("sem_1")).freeCount);
+  mine = Open("name", kManual, kClear);
+  EXPECT_TRUE(mine->checkOnly());  // the state has stayed, too
+  mine.reset();
+  EXPECT_TRUE(other.finish());
+  EXPECT_EQ(Names(), place.files());
+}
+
+TEST(NamedEventFiles, SetLivesUntilTheLastOfItsEventsGoes) {
+  EventPlace place;
+  Keeper other([] { return Open("other"); });
+  ASSERT_TRUE(other.good());
+  int id = place.setOf(1);
+  auto mine = Open("mine");
+  EXPECT_EQ((Slot{1, 1}), place.slotOf("mine"));
+  EXPECT_TRUE(other.finish());
+  EXPECT_EQ((Names{"mine", "sem_1"}), place.files());
+  EXPECT_EQ(id, place.setOf(1));
+  mine->set();
+  mine.reset();
+  EXPECT_EQ(Names(), place.files());
+  EXPECT_EQ(-1, EventPlace::ValueOf(id, 0));
+}
+
+// ---- processes that die
+
+TEST(NamedEventFiles, KilledProcessLeavesItsSlotToTheNextOpener) {
+  EventPlace place;
+  auto other = Open("other");
+  for (bool manual : {kManual, kAutomatic}) {
+    Keeper killed([&] { return Open("name", manual, kClear); });
+    ASSERT_TRUE(killed.good());
+    Slot slot = place.slotOf("name");
+    killed.kill();
+    EXPECT_TRUE(Exists(place.file("name")));
+    auto another = Open("another");  // takes another slot
+    for (bool initial : {kSet, kClear}) {
+      Keeper next([&] { return Open("name", manual, initial); });
+      ASSERT_TRUE(next.good());
+      EXPECT_EQ(slot, place.slotOf("name"));
+      EXPECT_EQ(125u, HeaderOf(place.file("sem_1")).freeCount);
+      Child asks([&] { return Open("name", manual, !initial)->checkOnly() == initial ? 0 : 1; });
+      EXPECT_EQ(0, asks.wait());
+      next.kill();
+    }
+    Open("name", manual);  // closing takes everything away again
+    EXPECT_FALSE(Exists(place.file("name")));
+    EXPECT_EQ(126u, HeaderOf(place.file("sem_1")).freeCount);
+  }
+}
+
+TEST(NamedEventFiles, SetWhoseUsersAllDiedIsMadeAnew) {
+  EventPlace place;
+  int id = -1;
+  {
+    Keeper killed([] {
+      std::vector<std::unique_ptr<NamedEvent>> events;
+      for (int i = 0; i < 5; ++i) events.push_back(Open("e" + std::to_string(i)));
+      return events;
+    });
+    ASSERT_TRUE(killed.good());
+    id = place.setOf(1);
+    killed.kill();
+  }
+  EXPECT_EQ((Slot{1, 4}), place.slotOf("e4"));
+  auto event = Open("e4", kManual, kSet);
+  EXPECT_EQ((Slot{1, 0}), place.slotOf("e4"));
+  EXPECT_EQ(127u, HeaderOf(place.file("sem_1")).freeCount);
+  EXPECT_EQ(id, place.setOf(1));  // the kernel's set is taken over
+  EXPECT_TRUE(event->checkOnly());
+  // A name whose file leads to a slot that is another's by now gets one of its own.
+  auto e0 = Open("e0");
+  EXPECT_EQ((Slot{1, 1}), place.slotOf("e0"));
+  event.reset();
+  e0.reset();
+  EXPECT_EQ((Names{"e1", "e2", "e3"}), place.files());
+  for (int i = 1; i < 4; ++i) Open("e" + std::to_string(i));
+  EXPECT_EQ(Names(), place.files());
+}
+
+TEST(NamedEventFiles, SlotOfADeadEventOfTheOtherKindIsNotTaken) {
+  EventPlace place;
+  auto other = Open("other");
+  Keeper killed([] { return Open("name", kManual); });
+  ASSERT_TRUE(killed.good());
+  killed.kill();
+  auto event = Open("name", kAutomatic, kSet);
+  EXPECT_EQ((Slot{1, 2}), place.slotOf("name"));
+  EXPECT_TRUE(event->check());
+  EXPECT_TRUE(RecordOf(place.file("sem_1"), 1).inUse);
+}
+
+TEST(NamedEventFiles, HolderThatDiesBetweenTwoOthersIsNotMissed) {
+  EventPlace place;
+  Keeper first([] { return Open("name"); });
+  Keeper second([] { return Open("name"); });
+  ASSERT_TRUE(first.good() && second.good());
+  first.kill();
+  auto third = Open("name");
+  EXPECT_EQ((Slot{1, 0}), place.slotOf("name"));
+  EXPECT_TRUE(second.finish());
+  third.reset();
+  EXPECT_EQ(Names(), place.files());
+}
+
+// ---- closing in a changed world
+
+TEST(NamedEventFiles, CloseLeavesALockFileThatIsNotItsOwn) {
+  EventPlace place;
+  auto event = Open("name"), other = Open("other");
+  std::filesystem::remove(place.file("name"));
+  Keeper stranger([] { return Open("name"); });
+  ASSERT_TRUE(stranger.good());
+  EXPECT_EQ((Slot{1, 2}), place.slotOf("name"));
+  event.reset();
+  EXPECT_TRUE(Exists(place.file("name")));
+  EXPECT_EQ((Slot{1, 2}), place.slotOf("name"));
+  EXPECT_FALSE(RecordOf(place.file("sem_1"), 0).inUse);  // its own slot went back
+  EXPECT_TRUE(stranger.finish());
+  EXPECT_FALSE(Exists(place.file("name")));
+}
+
+TEST(NamedEventFiles, CloseGivesBackOnlyWhatIsItsOwn) {
+  EventPlace place;
+  auto event = Open("name"), other = Open("other");
+  std::string state = ReadBytes(place.file("sem_1"));
+  state[18 + 2] = static_cast<char>(state[18 + 2] ^ 0x55);  // another key
+  WriteBytes(place.file("sem_1"), state);
+  event.reset();
+  EXPECT_EQ(state, ReadBytes(place.file("sem_1")));
+  EXPECT_FALSE(Exists(place.file("name")));
+}
+
+TEST(NamedEventFiles, SetThatAnotherUserRemovesLastStaysForTheNext) {
+  if (geteuid() != 0) GTEST_SKIP() << "SKIPPED: needs two users, so the superuser";
+  EventPlace place;
+  auto event = Open("name");
+  int id = place.setOf(1);
+  Keeper other([] {
+    if (setgid(65534) != 0 || setuid(65534) != 0) throw std::runtime_error("setuid");
+    return Open("name");
+  });
+  ASSERT_TRUE(other.good());
+  event.reset();
+  EXPECT_TRUE(other.finish());  // may not remove the set
+  EXPECT_EQ(Names{"sem_1"}, place.files());
+  EXPECT_FALSE(HeaderOf(place.file("sem_1")).ready);
+  EXPECT_EQ(id, place.setOf(1));
+  event = Open("name", kManual, kSet);
+  EXPECT_TRUE(HeaderOf(place.file("sem_1")).ready);
+  EXPECT_EQ(id, place.setOf(1));
+  EXPECT_EQ((Slot{1, 0}), place.slotOf("name"));
+  EXPECT_TRUE(event->checkOnly());
+  event.reset();
+  EXPECT_EQ(Names(), place.files());
+}
+
+TEST(NamedEventFiles, EventsOfAnotherUserAreJoined) {
+  if (geteuid() != 0) GTEST_SKIP() << "SKIPPED: needs two users, so the superuser";
+  EventPlace place;
+  Keeper other([] {
+    umask(0077);
+    if (setgid(65534) != 0 || setuid(65534) != 0) throw std::runtime_error("setuid");
+    return Open("name", kAutomatic, kSet);
+  });
+  ASSERT_TRUE(other.good());
+  EXPECT_TRUE(Open("name", kAutomatic)->check());
+  Child third([] {
+    if (setgid(65533) != 0 || setuid(65533) != 0) return 1;
+    Open("name", kAutomatic)->set();
+    return 0;
+  });
+  EXPECT_EQ(0, third.wait());
+  EXPECT_TRUE(Open("name", kAutomatic)->check());
+  EXPECT_TRUE(other.finish());
+  EXPECT_EQ(Names(), place.files());
+}
+
+TEST(NamedEventFiles, StaticEventsCloseWhenTheProgramEnds) {
+  EventPlace place;
+  Child child([]() -> int {
+    static NamedEvent event(L"name", kManual, kSet);
+    exit(event.checkOnly() ? 0 : 1);
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(Names(), place.files());
+}
+
+void OpenAfterTheStaticsWent() {
+  if (!Open("late", kManual, kSet)->checkOnly()) _exit(9);
+}
+
+TEST(NamedEventFiles, EventsWorkInExitFunctionsThatRunAfterTheirOwn) {
+  EventPlace place;
+  Child child([]() -> int {
+    std::atexit(OpenAfterTheStaticsWent);  // before the first use, so it runs after
+    Open("name");
+    exit(0);
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(Names(), place.files());
+}
+
+TEST(NamedEventFiles, ObjectThatOutlivesTheStaticsCloses) {
+  EventPlace place;
+  Child child([]() -> int {
+    static std::unique_ptr<NamedEvent> late;
+    std::atexit([] { late.reset(); });
+    late = Open("name");
+    exit(0);
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(Names(), place.files());
+}
+
+TEST(NamedEventFiles, EndWithoutClosingLeavesEverythingForTheNext) {
+  EventPlace place;
+  Child child([] {
+    new NamedEvent(L"name", kManual, kSet);
+    return 0;  // _exit
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ((Names{"name", "sem_1"}), place.files());
+  Open("name");
+  EXPECT_EQ(Names(), place.files());
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

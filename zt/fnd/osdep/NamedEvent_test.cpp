@@ -1,0 +1,412 @@
+#include "zt/fnd/osdep/NamedEvent.h"
+
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/ipc.h>
+#include <sys/sem.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <array>
+#include <atomic>
+#include <chrono>
+#include <cstdlib>
+#include <memory>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "tests/support/Child.h"
+#include "tests/support/EventPlace.h"
+#include "tests/support/PosixErrorOf.h"
+#include "zt/fnd/String.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::BlockedIn;
+using vlt::test::Child;
+using vlt::test::EventPlace;
+using vlt::test::Eventually;
+using vlt::test::PosixErrorOf;
+using Clock = std::chrono::steady_clock;
+
+constexpr unsigned kNoLimit = 0xFFFFFFFFu;
+constexpr bool kManual = true, kAutomatic = false, kSet = true, kClear = false;
+
+long MsSince(Clock::time_point begin) {
+  return static_cast<long>(
+      std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - begin).count());
+}
+
+// 32-bit processes reach the kernel's semaphores by the same call or by ipc().
+bool Waiting(pid_t pid) {
+#if defined(SYS_ipc)
+  if (BlockedIn(pid, SYS_ipc)) return true;
+#endif
+#if defined(SYS_semop)
+  if (BlockedIn(pid, SYS_semop)) return true;
+#endif
+#if defined(SYS_semtimedop_time64)
+  if (BlockedIn(pid, SYS_semtimedop_time64)) return true;
+#endif
+  return BlockedIn(pid, SYS_semtimedop);
+}
+
+// A process that waits for the event without limit and ends with 0 when it was released.
+Child Waiter(bool manual) {
+  return Child([manual] {
+    NamedEvent event(L"name", manual, kClear);
+    event.wait();
+    return 0;
+  });
+}
+
+TEST(NamedEvent, InitialStates) {
+  EventPlace place;
+  for (bool manual : {kManual, kAutomatic}) {
+    for (bool initial : {kSet, kClear}) {
+      NamedEvent event(L"name", manual, initial);
+      EXPECT_EQ(initial, event.checkOnly()) << manual;
+      EXPECT_EQ(initial, event.check()) << manual;
+      EXPECT_EQ(initial && manual, event.check()) << manual;
+    }
+  }
+}
+
+TEST(NamedEvent, SemaphoreValuesByKindAndState) {
+  EventPlace place;
+  NamedEvent manual(L"manual", kManual, kSet), automatic(L"auto", kAutomatic, kSet);
+  int set = place.setOf(1);
+  EXPECT_EQ(0, EventPlace::ValueOf(set, 0));
+  EXPECT_EQ(1, EventPlace::ValueOf(set, 1));
+  manual.reset();
+  automatic.reset();
+  EXPECT_EQ(1, EventPlace::ValueOf(set, 0));
+  EXPECT_EQ(0, EventPlace::ValueOf(set, 1));
+  manual.set();
+  automatic.set();
+  EXPECT_EQ(0, EventPlace::ValueOf(set, 0));
+  EXPECT_EQ(1, EventPlace::ValueOf(set, 1));
+}
+
+TEST(NamedEvent, ManualSetReleasesAllWaitersInAllProcessesAndStays) {
+  EventPlace place;
+  NamedEvent event(L"name", kManual, kClear);
+  std::vector<Child> waiters;
+  for (int i = 0; i < 3; ++i) waiters.push_back(Waiter(kManual));
+  std::atomic<bool> released{false};
+  std::thread thread([&] {
+    event.wait();
+    released = true;
+  });
+  for (Child& waiter : waiters) ASSERT_TRUE(Eventually([&] { return Waiting(waiter.pid()); }));
+  EXPECT_FALSE(released);
+  event.set();
+  for (Child& waiter : waiters) EXPECT_EQ(0, waiter.wait());
+  thread.join();
+  EXPECT_TRUE(event.check());
+  EXPECT_TRUE(event.check());
+  event.reset();
+  EXPECT_FALSE(event.check());
+  EXPECT_FALSE(event.checkOnly());
+}
+
+TEST(NamedEvent, AutomaticSetReleasesOneOfThreeWaiters) {
+  EventPlace place;
+  NamedEvent event(L"name", kAutomatic, kClear);
+  std::vector<Child> waiters;
+  for (int i = 0; i < 3; ++i) waiters.push_back(Waiter(kAutomatic));
+  for (Child& waiter : waiters) ASSERT_TRUE(Eventually([&] { return Waiting(waiter.pid()); }));
+  auto waiting = [&] {
+    int count = 0;
+    for (Child& waiter : waiters) count += waiter.running();
+    return count;
+  };
+  for (int left : {2, 1, 0}) {
+    event.set();
+    ASSERT_TRUE(Eventually([&] { return waiting() == left; }));
+    EXPECT_FALSE(event.checkOnly());
+    std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    EXPECT_EQ(left, waiting());  // and no second one
+  }
+  for (Child& waiter : waiters) EXPECT_EQ(0, waiter.wait());
+}
+
+TEST(NamedEvent, CheckConsumesAnAutomaticEvent) {
+  EventPlace place;
+  NamedEvent event(L"name", kAutomatic, kSet);
+  EXPECT_TRUE(event.check());
+  EXPECT_FALSE(event.checkOnly());
+  EXPECT_FALSE(event.check());
+}
+
+TEST(NamedEvent, CheckOnlyConsumesNothing) {
+  EventPlace place;
+  NamedEvent event(L"name", kAutomatic, kSet);
+  EXPECT_TRUE(event.checkOnly());
+  EXPECT_TRUE(event.checkOnly());
+  EXPECT_TRUE(event.check());
+}
+
+TEST(NamedEvent, WaitOfZeroIsCheck) {
+  EventPlace place;
+  NamedEvent automatic(L"auto", kAutomatic, kSet), manual(L"manual", kManual, kSet);
+  EXPECT_TRUE(automatic.wait(0));
+  EXPECT_FALSE(automatic.wait(0));
+  EXPECT_TRUE(manual.wait(0));
+  EXPECT_TRUE(manual.wait(0));
+  manual.reset();
+  EXPECT_FALSE(manual.wait(0));
+}
+
+TEST(NamedEvent, TimedWaitThatEndsInVainTakesItsTime) {
+  EventPlace place;
+  for (bool manual : {kManual, kAutomatic}) {
+    NamedEvent event(L"name", manual, kClear);
+    for (unsigned ms : {1u, 49u, 50u, 120u}) {
+      auto begin = Clock::now();
+      EXPECT_FALSE(event.wait(ms));
+      EXPECT_GE(MsSince(begin), static_cast<long>(ms));
+    }
+  }
+}
+
+// With looks at 0, 50, 100 and 120 ms, a signal between two looks is seen at the next one.
+TEST(NamedEvent, TimedWaitLooksEvery50Ms) {
+  EventPlace place;
+  NamedEvent event(L"name", kManual, kClear);
+  auto begin = Clock::now();
+  std::atomic<long> setAt{0};
+  std::thread setter([&] {
+    std::this_thread::sleep_for(std::chrono::milliseconds(60));
+    event.set();
+    setAt = MsSince(begin);
+  });
+  EXPECT_TRUE(event.wait(120));
+  long seen = MsSince(begin);
+  setter.join();
+  EXPECT_GE(seen, 100);
+  EXPECT_GE(setAt, 60);
+}
+
+TEST(NamedEvent, PulseBetweenTwoLooksGoesUnseen) {
+  EventPlace place;
+  NamedEvent event(L"name", kManual, kClear);
+  std::atomic<bool> begun{false};
+  std::thread pulser([&] {
+    while (!begun) std::this_thread::yield();
+    std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    event.set();
+    event.reset();
+  });
+  begun = true;
+  bool seen = event.wait(120);
+  pulser.join();
+  EXPECT_FALSE(seen);
+}
+
+TEST(NamedEvent, PulseReleasesThoseWhoWaitWithoutLimit) {
+  EventPlace place;
+  NamedEvent event(L"name", kManual, kClear);
+  Child waiter = Waiter(kManual);
+  ASSERT_TRUE(Eventually([&] { return Waiting(waiter.pid()); }));
+  event.set();
+  event.reset();
+  EXPECT_EQ(0, waiter.wait());
+}
+
+TEST(NamedEvent, WaitOfAllOnesHasNoLimit) {
+  EventPlace place;
+  NamedEvent event(L"name", kAutomatic, kClear);
+  Child waiter([] { return NamedEvent(L"name", kAutomatic, kClear).wait(kNoLimit) ? 0 : 1; });
+  ASSERT_TRUE(Eventually([&] { return Waiting(waiter.pid()); }));  // in the kernel, not polling
+  event.set();
+  EXPECT_EQ(0, waiter.wait());
+  EXPECT_FALSE(event.checkOnly());
+}
+
+TEST(NamedEvent, SetsDoNotAddUp) {
+  EventPlace place;
+  NamedEvent event(L"name", kAutomatic, kClear);
+  event.set();
+  event.set();
+  event.wait();
+  EXPECT_FALSE(event.check());
+  NamedEvent manual(L"manual", kManual, kClear);
+  manual.reset();
+  manual.reset();
+  manual.set();
+  EXPECT_TRUE(manual.check());
+}
+
+TEST(NamedEvent, ResetIfAutoLeavesAManualEvent) {
+  EventPlace place;
+  NamedEvent manual(L"manual", kManual, kSet), automatic(L"auto", kAutomatic, kSet);
+  manual.resetIfAuto();
+  automatic.resetIfAuto();
+  EXPECT_TRUE(manual.checkOnly());
+  EXPECT_FALSE(automatic.checkOnly());
+}
+
+TEST(NamedEvent, KilledWaiterChangesNothingForTheOthers) {
+  EventPlace place;
+  NamedEvent event(L"name", kAutomatic, kClear);
+  Child killed = Waiter(kAutomatic);
+  ASSERT_TRUE(Eventually([&] { return Waiting(killed.pid()); }));
+  Child other = Waiter(kAutomatic);
+  ASSERT_TRUE(Eventually([&] { return Waiting(other.pid()); }));
+  killed.kill(SIGKILL);
+  killed.wait();
+  EXPECT_TRUE(other.running());
+  event.set();
+  EXPECT_EQ(0, other.wait());
+  EXPECT_FALSE(event.checkOnly());
+}
+
+TEST(NamedEvent, SignalTakenByAProcessThatDiesStaysTaken) {
+  EventPlace place;
+  NamedEvent event(L"name", kAutomatic, kSet);
+  Child taker([] {
+    NamedEvent mine(L"name", kAutomatic, kClear);
+    mine.wait();
+    raise(SIGKILL);
+    return 0;
+  });
+  EXPECT_EQ(128 + SIGKILL, taker.wait());
+  EXPECT_FALSE(event.checkOnly());
+}
+
+TEST(NamedEvent, SignalSentBeforeAnyWaiterIsKept) {
+  EventPlace place;
+  for (bool manual : {kManual, kAutomatic}) {
+    NamedEvent event(L"name", manual, kClear);
+    event.set();
+    Child waiter = Waiter(manual);
+    EXPECT_EQ(0, waiter.wait());
+    EXPECT_EQ(manual, event.checkOnly());
+  }
+}
+
+TEST(NamedEvent, SignalHandlersDoNotEndAWait) {
+  EventPlace place;
+  NamedEvent event(L"name", kAutomatic, kClear);
+  Child waiter([] {
+    static volatile sig_atomic_t signals;
+    struct sigaction action = {};
+    action.sa_handler = [](int) { signals = signals + 1; };
+    sigaction(SIGUSR1, &action, nullptr);
+    NamedEvent mine(L"name", kAutomatic, kClear);
+    mine.wait();
+    return signals > 0 ? 0 : 1;
+  });
+  for (int i = 0; i < 5; ++i) {
+    ASSERT_TRUE(Eventually([&] { return Waiting(waiter.pid()); }));
+    waiter.kill(SIGUSR1);
+  }
+  EXPECT_TRUE(waiter.running());
+  event.set();
+  EXPECT_EQ(0, waiter.wait());
+}
+
+// ---- a set that was removed under the event
+
+TEST(NamedEvent, RemovalUnderAWaiterAndLaterCallsAreErrors) {
+  EventPlace place;
+  NamedEvent event(L"name", kAutomatic, kClear), manual(L"manual", kManual, kClear);
+  auto waiter = [](const wchar_t* name, bool kind) {
+    return Child([=] {
+      NamedEvent mine(name, kind, kClear);
+      return PosixErrorOf([&] { mine.wait(); });
+    });
+  };
+  Child first = waiter(L"name", kAutomatic), second = waiter(L"manual", kManual);
+  ASSERT_TRUE(Eventually([&] { return Waiting(first.pid()) && Waiting(second.pid()); }));
+  ASSERT_EQ(0, semctl(place.setOf(1), 0, IPC_RMID));
+  EXPECT_EQ(EIDRM, first.wait());
+  EXPECT_EQ(EIDRM, second.wait());
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.wait(); }));
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.wait(10); }));
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.wait(0); }));
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.check(); }));
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.checkOnly(); }));
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.set(); }));
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.reset(); }));
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.resetIfAuto(); }));
+  EXPECT_EQ(-1, PosixErrorOf([&] { manual.resetIfAuto(); }));  // does nothing
+}
+
+TEST(NamedEvent, ErrorsHaveTheCodeOfTheFamily) {
+  EventPlace place;
+  NamedEvent event(L"name", kAutomatic, kClear);
+  semctl(place.setOf(1), 0, IPC_RMID);
+  try {
+    event.check();
+    FAIL();
+  } catch (const OSException& e) {
+    EXPECT_EQ(42u, e.getErrorCode());
+    EXPECT_EQ(static_cast<unsigned>(EINVAL), e.whatcode());
+  }
+}
+
+// ---- threads
+
+TEST(NamedEvent, EveryThreadMayUseAnyObject) {
+  EventPlace place;
+  NamedEvent ping(L"ping", kAutomatic, kClear), pong(L"pong", kAutomatic, kClear);
+  constexpr int kRounds = 2000;
+  std::thread other([&] {
+    NamedEvent mine(L"ping", kAutomatic, kSet);
+    for (int i = 0; i < kRounds; ++i) {
+      mine.wait();
+      pong.set();
+    }
+  });
+  for (int i = 0; i < kRounds; ++i) {
+    ping.set();
+    pong.wait();
+  }
+  other.join();
+  EXPECT_FALSE(ping.checkOnly());
+  EXPECT_FALSE(pong.checkOnly());
+}
+
+// Each round opens and closes its event anew while the other side does the same.
+TEST(NamedEvent, PingPongBetweenProcessesLosesNothing) {
+  EventPlace place;
+  constexpr int kRounds = 500;
+  NamedEvent ping(L"ping", kAutomatic, kClear), pong(L"pong", kAutomatic, kClear);
+  Child other([] {
+    for (int i = 0; i < kRounds; ++i) {
+      NamedEvent(L"ping", kAutomatic, kClear).wait();
+      NamedEvent(L"pong", kAutomatic, kClear).set();
+    }
+    return 0;
+  });
+  for (int i = 0; i < kRounds; ++i) {
+    ping.set();
+    pong.wait();
+  }
+  EXPECT_EQ(0, other.wait());
+}
+
+TEST(NamedEvent, ThreadsOpenAndCloseOneNameAtOnce) {
+  EventPlace place;
+  std::vector<std::thread> threads;
+  std::atomic<int> bad{0};
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([&] {
+      for (int i = 0; i < 150; ++i) {
+        NamedEvent event(L"name", kManual, kClear);
+        event.set();
+        if (!event.checkOnly()) ++bad;
+      }
+    });
+  }
+  for (auto& thread : threads) thread.join();
+  EXPECT_EQ(0, bad);
+  EXPECT_EQ(std::vector<std::string>(), place.files());
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

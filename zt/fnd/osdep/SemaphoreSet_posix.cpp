@@ -1,0 +1,216 @@
+#include "zt/fnd/osdep/SemaphoreSet.h"
+
+#include <sys/ipc.h>
+#include <sys/sem.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+#include <string>
+#include <utility>
+
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/Retry.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+constexpr int kSetMode = 0777;
+
+union SemctlArgument {
+  int value;
+  semid_ds* info;
+  unsigned short* values;
+};
+
+int Semget(key_t key, unsigned count, int flags) {
+  return RetryEintr([&] { return ::semget(key, static_cast<int>(count), flags | kSetMode); });
+}
+
+void RemoveSet(int id) {
+  RetryEintr([&] { return ::semctl(id, 0, IPC_RMID); });
+}
+
+}  // namespace
+
+SemaphoreSet::SemaphoreSet(NamedEventGlobalStatics& statics, unsigned number)
+    : RefCountedCriticalSectionPolicy(&statics.section),
+      m_statics(&statics),
+      m_number(number),
+      m_pid(getpid()) {
+  open();
+}
+
+// ---- opening
+
+void SemaphoreSet::open() {
+  try {
+    EventFile file = EventFile::Open(String(("sem_" + std::to_string(m_number)).c_str()));
+    bool alone = file.exclusive();
+    if (alone ? build(file) : join(file)) {
+      m_file = std::move(file);
+      m_file.settle();
+      return;
+    }
+    if (m_made) RemoveSet(m_id);
+    // A file that this attempt has made must not stay, or every failure would leave one more.
+    if (alone && file.wasEmpty()) file.unlink();
+  } catch (const PosixError& e) {  // A set that cannot be had is skipped by its users.
+    m_busy = e.whatcode() == EWOULDBLOCK;
+  } catch (const std::exception&) {  // The same.
+  }
+  m_id = -1;
+}
+
+// Makes file and set from nothing. The ready flag comes last and by itself.
+bool SemaphoreSet::build(EventFile& file) {
+  const StateFileBytes bytes = EncodeEmptySet();
+  if (!file.write(bytes.data(), bytes.size(), 0)) return false;
+  if (!makeSet(file.key())) return false;
+  const unsigned char ready = 1;
+  return file.write(&ready, 1, SetHeader::kReadyOffset) && file.share();
+}
+
+// A set of that key is one of an earlier life. Its values do not matter, as each event sets its own
+// when it is opened.
+bool SemaphoreSet::makeSet(key_t key) {
+  int id = Semget(key, kSlotsPerSet, IPC_CREAT | IPC_EXCL);
+  m_made = id != -1;
+  return adopt(id == -1 && errno == EEXIST ? Semget(key, kSlotsPerSet, 0) : id);
+}
+
+bool SemaphoreSet::join(const EventFile& file) {
+  SetHeader::Bytes bytes;
+  SetHeader header;
+  if (!file.read(bytes.data(), bytes.size(), 0) || !header.decode(bytes) || !header.ready) {
+    return false;
+  }
+  return adopt(Semget(file.key(), header.count, 0));
+}
+
+// Keys are made of a few bits of the file's inode, so two files can come to one set. It stays with
+// the object that has it.
+bool SemaphoreSet::adopt(int id) {
+  m_id = id;
+  return id != -1 && !m_statics->hasSemaphoreSetOfId(id);
+}
+
+// ---- the state file
+
+bool SemaphoreSet::readHeader(bool& ready, unsigned& count, unsigned& freeCount,
+                              unsigned& firstFree) const {
+  SetHeader::Bytes bytes;
+  SetHeader header;
+  bool good = m_file.read(bytes.data(), bytes.size(), 0) && header.decode(bytes);
+  ready = header.ready;
+  count = header.count;
+  freeCount = header.freeCount;
+  firstFree = header.firstFree;
+  return good;
+}
+
+bool SemaphoreSet::readSlot(unsigned slot, SlotRecord& record) const {
+  bool ready;
+  unsigned count, freeCount, firstFree;
+  if (!readHeader(ready, count, freeCount, firstFree)) return false;
+  if (slot >= count || slot >= kSlotsPerSet) return false;
+  SlotRecord::Bytes bytes;
+  if (!m_file.read(bytes.data(), bytes.size(), SlotRecord::Offset(slot))) return false;
+  record = SlotRecord::Decode(bytes);
+  return true;
+}
+
+// Reads and writes the span from the free count to the record as a whole.
+bool SemaphoreSet::updateFreeRecords(int delta, unsigned newFirst, unsigned& oldFirst,
+                                     unsigned slot, const SlotRecord* record) {
+  constexpr std::size_t kBase = SetHeader::kFreeOffset;
+  StateFileBytes span;
+  std::size_t size = SetHeader::kSize - kBase;
+  if (record != nullptr) {
+    if (slot >= kSlotsPerSet) return false;
+    size = static_cast<std::size_t>(SlotRecord::Offset(slot + 1)) - kBase;
+  }
+  if (!m_file.read(span.data(), size, kBase)) return false;
+  std::uint32_t freeCount;
+  std::memcpy(&freeCount, &span[0], sizeof freeCount);
+  freeCount += static_cast<std::uint32_t>(delta);
+  std::memcpy(&span[0], &freeCount, sizeof freeCount);
+  std::memcpy(&oldFirst, &span[4], sizeof oldFirst);
+  std::memcpy(&span[4], &newFirst, sizeof newFirst);
+  if (record != nullptr) {
+    const SlotRecord::Bytes bytes = record->encode();
+    std::memcpy(&span[size - bytes.size()], bytes.data(), bytes.size());
+  }
+  return m_file.write(span.data(), size, kBase);
+}
+
+SemaphoreSet::Room SemaphoreSet::firstFree(unsigned& slot) const {
+  bool ready;
+  unsigned count, freeCount;
+  if (!readHeader(ready, count, freeCount, slot) || !ready) return Room::Damaged;
+  if (freeCount == 0) return Room::None;
+  SlotRecord record;
+  if (!readSlot(slot, record) || record.inUse) return Room::Damaged;
+  return Room::Some;
+}
+
+bool SemaphoreSet::take(unsigned slot, bool manualReset, key_t key) {
+  SlotRecord record;
+  if (!readSlot(slot, record)) return false;
+  const unsigned next = static_cast<unsigned>(record.keyOrNext);
+  record = SlotRecord{true, manualReset, key};
+  unsigned oldFirst;
+  return updateFreeRecords(-1, next, oldFirst, slot, &record);
+}
+
+void SemaphoreSet::giveBack(unsigned slot, key_t key) {
+  SlotRecord record;
+  if (!readSlot(slot, record) || !record.inUse || record.keyOrNext != key) return;
+  bool ready;
+  unsigned count, freeCount, first;
+  if (!readHeader(ready, count, freeCount, first)) return;
+  record = SlotRecord{false, false, static_cast<std::int32_t>(first)};
+  updateFreeRecords(+1, slot, first, slot, &record);
+}
+
+bool SemaphoreSet::setValue(unsigned slot, int value) const {
+  SemctlArgument argument = {value};
+  return RetryEintr([&] { return ::semctl(m_id, static_cast<int>(slot), SETVAL, argument); }) != -1;
+}
+
+// ---- closing
+
+SemaphoreSet::~SemaphoreSet() {
+  if (m_pid != getpid()) {
+    // The statics of the parent are out of bounds, and only its descriptor is this process's own.
+    m_statics.detach();
+    return;
+  }
+  close();
+  m_statics->removeSemaphoreSet(*this);
+}
+
+void SemaphoreSet::close() {
+  if (!usable()) return;
+  try {
+    MutexHold hold(m_statics->stateFileMutex);
+    if (m_file.claim()) {
+      const unsigned char notReady = 0;
+      m_file.write(&notReady, 1, SetHeader::kReadyOffset);
+      // The file of a set that belongs to somebody else stays, for the next to take the set over.
+      if (RetryEintr([&] { return ::semctl(m_id, 0, IPC_RMID); }) != -1) m_file.unlink();
+    }
+    m_file.close();
+  } catch (
+      const std::exception&) {  // Without the mutex everything stays as a killed process leaves it.
+    m_file.close();
+  }
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt
