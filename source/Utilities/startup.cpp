@@ -3,17 +3,51 @@
 //
 // Everything else that is static is constant or made on first use, so that any call works whatever
 // the host's own initialisers do before this one has run.
+#include <stdlib.h>
+
+#include <memory>
+
+#include "source/Common/Posix/vltlinuxos.h"
+#include "source/Common/ZtUtils/General/vlTracer.h"
 #include "source/Utilities/vltRegistrarEntry.h"
+#include "zt/fnd/String.h"
+#include "ztini/ztini.h"
 
 namespace {
 
-__attribute__((constructor)) void StartUp() {
-  try {
-    vlPrepareRegistrarEntry();
-  } catch (...) {
-    // Nothing that fails here may end the host, which has not called anything yet. What could not be
-    // made is made at the first call, and fails there.
+struct Dispose {
+  void operator()(IniStructForwardReferenceTag* document) const { IniDispose(document); }
+};
+
+void StartTracer() {
+  zt::fnd::AnsiString diagnosticsIni;
+  zt::fnd::String directory = vlCreateLogDirIfNeeded(diagnosticsIni);
+  std::unique_ptr<IniStructForwardReferenceTag, Dispose> options(IniNew(0));
+  IniReadFromFile(options.get(), diagnosticsIni.c_str());  // A missing file leaves the defaults.
+  unsigned severity, target, threshold;
+  vlReadTracerOptions(options.get(), "vlt", severity, target, &threshold);
+  vlTracer::Initialize(static_cast<vlTracer::SeverityLevel>(severity),
+                       static_cast<vlTracer::TraceTarget>(target), directory.c_str(),
+                       static_cast<long>(threshold));
+  if (vlTracer::gs_traceMask & vlTracer::kSeverityLoad) {
+    vlt_vlTracer::TraceOutput(' ', "vltutils: Process attach", false);
   }
+  atexit(vlTracer::Cleanup);
+}
+
+// Runs one step. Nothing that fails while loading may end the host, which has not called anything
+// yet; what could not be made is made at the first call, and fails there, or is done without.
+template <class Step>
+void Attempt(Step step) {
+  try {
+    step();
+  } catch (...) {
+  }
+}
+
+__attribute__((constructor)) void StartUp() {
+  Attempt(StartTracer);
+  Attempt(vlPrepareRegistrarEntry);
 }
 
 }  // namespace

@@ -8,6 +8,11 @@
 namespace vlt::hook {
 
 inline constexpr const char* kGetRegistrar2 = "TestHookNT\"./source/Utilities/vltutils\"1215";
+inline constexpr const char* kJarOpen = "TestHookNT\"./source/Utilities/vltutils\"2653";
+inline constexpr const char* kJarRetry = "TestHookNT\"./source/Utilities/vltutils\"2663";
+// Moments of a save: the file is written and its sidecar is old; the sidecar is written.
+inline constexpr const char* kJarInvalidChecksumSet = "vltjarInvalidChecksumSet";
+inline constexpr const char* kJarValidChecksumSet = "vltjarValidChecksumSet";
 inline constexpr const char* kGetComponentsForBindingClass =
     "TestHookNT\"./source/Common/vltcmn\"1330";
 inline constexpr const char* kCopyComponentOfClass = "TestHook\"./source/Common/vltcmn\"1317";

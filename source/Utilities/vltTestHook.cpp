@@ -1,3 +1,153 @@
 #include "source/Utilities/vltTestHook.h"
 
-extern "C" unsigned vltTestHook(const char*) { return 0; }
+#include <stdlib.h>
+#include <string.h>
+
+#include <atomic>
+#include <mutex>
+#include <new>
+#include <string>
+
+#include "source/vlIniMgr.h"
+#include "vlloader/source/vlloader.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/Sleep.h"
+#include "zt/fnd/osdep/StringCompare.h"
+#include "zt/fnd/osdep/path.h"
+
+using zt::fnd::String;
+
+namespace {
+
+constexpr uint32_t kForever = 0x7FFFFFFF;
+
+constinit std::atomic<bool> causeHang{false};
+constinit std::atomic<bool> causeCrash{false};
+constinit std::atomic<bool> simulateMemoryAllocationFailure{false};
+constinit std::atomic<bool> simulateMemoryAllocationFailureAndThrow{false};
+constinit std::atomic<bool> causeMemoryAllocationFailure{false};
+constinit std::atomic<uint32_t> hangTimeInMSecs{kForever};
+// Replaced whole and never freed, since another thread may be comparing with the old one.
+constinit std::atomic<const char*> currentHookName{""};
+
+bool IsTrue(const CvlIniMgr& ini, const char* key) {
+  std::string value;
+  return ini.GetItem("Hook", key, &value) >= 0 &&
+         zt::fnd::osdep::StringCaseCompare(String(value.c_str()).c_str(), L"true") == 0;
+}
+
+void ArmIfTrue(const CvlIniMgr& ini, const char* key, std::atomic<bool>& flag) {
+  if (IsTrue(ini, key)) flag = true;
+}
+
+uint32_t HangTime(const CvlIniMgr& ini) {
+  std::string value;
+  return ini.GetItem("Hook", "HangTime", &value) >= 0 ? static_cast<uint32_t>(atol(value.c_str()))
+                                                      : kForever;
+}
+
+void Arm(const CvlIniMgr& ini) {
+  std::string name;
+  if (ini.GetItem("Hook", "Name", &name) < 0) return;
+  char* copy = strdup(name.c_str());
+  if (!copy) throw std::bad_alloc();
+  currentHookName = copy;
+  ArmIfTrue(ini, "Crash", causeCrash);
+  if (IsTrue(ini, "Hang")) {
+    hangTimeInMSecs = HangTime(ini);
+    causeHang = true;
+  }
+  ArmIfTrue(ini, "SimulateMemoryAllocationFailure", simulateMemoryAllocationFailure);
+  ArmIfTrue(ini, "SimulateMemoryAllocationFailureAndThrow",
+            simulateMemoryAllocationFailureAndThrow);
+  ArmIfTrue(ini, "MemoryAllocationFailure", causeMemoryAllocationFailure);
+}
+
+}  // namespace
+
+extern "C" unsigned vltTestHook(const char* name) {
+  if (!name || strcmp(currentHookName, name) != 0 || !*name) return 0;
+  if (causeHang) {
+    zt::fnd::osdep::Sleep(hangTimeInMSecs);
+    return 1;
+  }
+  if (causeCrash) exit(0);
+  if (simulateMemoryAllocationFailure) return 1;
+  if (simulateMemoryAllocationFailureAndThrow) throw std::bad_alloc();
+  if (causeMemoryAllocationFailure) exhaustMemory();
+  return 1;
+}
+
+extern "C" void vltRefreshHook() {
+  try {
+    const char* directory = GetCurrentVltPath();
+    if (!directory) return;
+    String file(directory);
+    zt::fnd::osdep::path::MakePathEndInSlash(file);
+    file += L"VLTHooks.ini";
+    if (!zt::fnd::osdep::path::DoesFileExist(file)) return;
+    CvlIniMgr ini(zt::fnd::AnsiString(file).c_str(), false, nullptr, false, false);
+    Arm(ini);
+  } catch (...) {
+    // The process under test must not notice a bad hook file; it is simply not armed.
+  }
+}
+
+namespace {
+
+constexpr uint32_t kChunkUnitBytes = 4096;
+constexpr uint32_t kSmallChunk = 0x20000;
+constexpr uint32_t kLargestGrowingChunkWords = 100000000;
+
+struct Exhaustion {
+  uint32_t s_chunkSize = 1;  // in units of kChunkUnitBytes
+  bool s_increaseChunkSize = true;
+  uint32_t s_entryNum = 0;
+};
+
+// The block is kept for good. Volatile, or the compiler sees that nobody uses it and takes it away.
+void TakeChunk(uint32_t chunkSize) {
+  [[maybe_unused]] static void* volatile s_last;
+  s_last = ::operator new[](static_cast<size_t>(chunkSize) * kChunkUnitBytes);
+}
+
+// After a success. True if the exhaustion is over.
+bool Grow(Exhaustion& state, uint32_t i, uint32_t* limit) {
+  bool stop = i > *limit && !state.s_increaseChunkSize;
+  if (state.s_chunkSize <= kSmallChunk && !state.s_increaseChunkSize && *limit > 40) *limit -= 40;
+  if (state.s_increaseChunkSize && state.s_chunkSize * 1024u <= kLargestGrowingChunkWords) {
+    state.s_chunkSize *= 2;
+  }
+  return stop;
+}
+
+// After a refusal. True if even the smallest block was refused.
+bool Shrink(Exhaustion& state) {
+  state.s_increaseChunkSize = false;
+  if (state.s_chunkSize <= 1) return true;
+  state.s_chunkSize /= 2;
+  return false;
+}
+
+}  // namespace
+
+void exhaustMemory() {
+  static Exhaustion state;
+  static std::mutex lock;
+  std::lock_guard hold(lock);
+  ++state.s_entryNum;
+  uint32_t limit = state.s_entryNum == 1 || state.s_increaseChunkSize ? 10 : 1000;
+  uint32_t i = 0;
+  for (;;) {
+    bool stop;
+    try {
+      TakeChunk(state.s_chunkSize);
+      stop = Grow(state, i, &limit);
+      ++i;
+    } catch (const std::bad_alloc&) {
+      // What this is for: the heap refuses, and smaller blocks have their turn.
+      stop = Shrink(state);
+    }
+    if (stop) return;
+  }
+}

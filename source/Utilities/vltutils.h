@@ -19,6 +19,7 @@
 // 6. Threads. Every function may be called from every thread, unless told otherwise.
 // 7. Waiting. Calls that open a shared file wait, without limit, for other processes that have it.
 
+#include "source/Common/ZtUtils/General/vlt_vlTracer.h"
 #include "source/Utilities/vltInterfaces.h"
 #include "source/Utilities/vltTypes.h"
 #include "zt/fnd/StringFwd.h"
@@ -49,6 +50,39 @@ VLT_EXPORT HRESULT vltGetOldRegistrar(void** out);  // nulls *out; E_NOTIMPL
 VLT_EXPORT HRESULT vltLoadDataDictionaries();
 VLT_EXPORT HRESULT vltLoadDataDictionaries2(IvltRegistrar* registrar);
 
+// vltGetRegistrar for a null storage or the default one; E_FAIL for others. The same function twice.
+VLT_EXPORT HRESULT vltGetNamedRegistrar(const wchar_t* storage, IvltRegistrar** out);
+VLT_EXPORT HRESULT vltGetNamedRegistrar2(const wchar_t* storage, IvltRegistrar** out);
+
+// ---- Settings and rendezvous. Files below <install>/Data (docs/settings.md, docs/jar.md).
+
+// Each output is optional: a null one is not read. Texts are freed with vltFree. Index 3 has defaults
+// for every value; at others a missing one gives E_FAIL, and the rest is still read. A result of an
+// unusable sidecar is negative although the values, then defaults, are set.
+VLT_EXPORT HRESULT vltGetClientSettings(unsigned index, unsigned remote, unsigned offline,
+                                        const wchar_t* name, wchar_t** bootstrapEndpoint,
+                                        wchar_t** protocol, wchar_t** endpoint, wchar_t** eventPort,
+                                        wchar_t** eventNameAppend);
+VLT_EXPORT HRESULT vltGetClientCacheSettings(
+    unsigned* objectCacheLimit, unsigned* objectCacheFlushPercentage, unsigned* bufferCacheLimit,
+    unsigned* bufferCacheMinimumLimit, unsigned* bufferCacheFlushPercentage,
+    unsigned* garbageCollectorInterval, unsigned useName, const wchar_t* name);
+VLT_EXPORT HRESULT vltGetServerSettings(
+    unsigned index, unsigned* remoteEnabled, wchar_t** bootstrapEndpoint, wchar_t** remoteProtocol,
+    wchar_t** remoteEndpoint, wchar_t** remoteEventPort, wchar_t** localProtocol,
+    wchar_t** localEndpoint, int* lastServerCookie, wchar_t** eventNameAppend,
+    long* maxBackupFrequency, unsigned useName, const wchar_t* name, unsigned* journalingOptions,
+    unsigned* validateDBStructure, long* numCheckpoints, unsigned* createCheckpoints);
+// Identity of this machine's server, made at the first call with vltCreateGuid; E_FAIL where that fails.
+VLT_EXPORT HRESULT vltGetServerIdentity(GUID* out);
+VLT_EXPORT HRESULT vltSetServerCookie(int cookie);  // E_FAIL without a data directory
+VLT_EXPORT HRESULT vltAddSvrProcessIDToJar(const wchar_t* section, long processID);
+// "127.0.0.1:port" of the local server, as it was at the first call; null gives E_FAIL.
+VLT_EXPORT HRESULT vltGetLocalConfigurationURL(wchar_t** url);
+VLT_EXPORT int vltIsDefaultStorage(const wchar_t* path);  // 1 also for null
+// *storage, if wanted: the name of the offline storage that the address tells.
+VLT_EXPORT HRESULT vltIsOfflineStorage(const wchar_t* url, unsigned* isOffline, wchar_t** storage);
+
 // ---- Resources and files.
 
 // Text under `key` of the components in the database whose file has the base name of `file`. With a
@@ -62,6 +96,14 @@ VLT_EXPORT int vltGetBinaryResource();  // 0
 VLT_EXPORT HRESULT vltSetFileSecurity(const zt::fnd::String& path, int mode, bool recursive);
 // Flags of "vlttrace.txt" in the install directory, read once: (second number << 4) | first.
 VLT_EXPORT unsigned vltGetTraceFlags();
+
+// ---- Diagnostics. Beside these the three members of vlt_vlTracer, with mangled names.
+
+// Nonzero if a fault is armed at the point of this name (docs/hook-file.md); the fault may also act on
+// the spot: wait, end the process, throw std::bad_alloc, take all memory.
+VLT_EXPORT unsigned vltTestHook(const char* name);
+// Reads "VLTHooks.ini" of the install directory and arms what it asks for. Never fails.
+VLT_EXPORT void vltRefreshHook();
 
 // ---- Text case. In place; 0, or 1 for null or empty. Characters above 255 stay.
 VLT_EXPORT int vltStrupr(char* s);

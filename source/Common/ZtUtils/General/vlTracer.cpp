@@ -1,6 +1,209 @@
 #include "source/Common/ZtUtils/General/vlTracer.h"
 
-unsigned vlTracer::gs_traceMask = 0;
+#include <stdio.h>
+#include <string.h>
+#include <sys/statvfs.h>
+#include <unistd.h>
 
-void vlt_vlTracer::TraceOutput(char, const char*, bool) {}
-unsigned vlt_vlTracer::GetTraceMask() { return vlTracer::gs_traceMask; }
+#include <new>
+#include <optional>
+#include <sstream>
+#include <string>
+
+#include "source/Common/ZtUtils/General/ztSync.h"
+#include "zt/fnd/osdep/DateTime.h"
+#include "zt/fnd/osdep/ThreadID.h"
+
+using zt::fnd::AnsiString;
+using zt::fnd::String;
+using namespace zt::fnd::osdep;
+
+constinit std::atomic<uint32_t> vlTracer::gs_traceMask{0};
+
+namespace {
+
+constexpr size_t kLongestLine = 2047;
+constexpr unsigned long kArgumentTextSize = 1024;
+constexpr const char* kDiskShort =
+    "** Available disk space is below the desired threshold. Aborting tracing. **";
+
+constinit std::atomic<uint32_t> gs_traceTarget{vlTracer::kTargetError};
+constinit std::atomic<long> gs_traceLowDiskThreshold{0};
+constinit std::atomic<void (*)()> gs_traceInitCallback{nullptr};
+// Serialises the output; its presence says that the log is started. Never freed: a thread may be
+// inside while another one cleans up.
+constinit std::atomic<Toolyard::CztMutex*> gs_traceSync{nullptr};
+
+// What the lock above guards. Made at the first start and never freed, as exit handlers trace too.
+struct LogFile {
+  std::string directory, name;
+  FILE* stream = nullptr;
+  bool diskShort = false;
+};
+
+LogFile& Log() {
+  static LogFile* log = new LogFile;
+  return *log;
+}
+
+Toolyard::CztCS& InitSection() {
+  static auto* gs_traceInitCS = new Toolyard::CztCS;
+  return *gs_traceInitCS;
+}
+
+// The lock, if it can be had: a line that may stand between another's is better than none.
+class OutputLock {
+ public:
+  explicit OutputLock(Toolyard::CztMutex& mutex) : m_mutex(mutex), m_held(Take(mutex)) {}
+  ~OutputLock() {
+    if (m_held) m_mutex.Unlock();
+  }
+  OutputLock(const OutputLock&) = delete;
+  OutputLock& operator=(const OutputLock&) = delete;
+
+ private:
+  static bool Take(Toolyard::CztMutex& mutex) {
+    try {
+      return mutex.Lock(-1);
+    } catch (const std::exception&) {
+      return false;  // A lock file that cannot be had must not silence the log.
+    }
+  }
+
+  Toolyard::CztMutex& m_mutex;
+  bool m_held;
+};
+
+bool DiskIsShort(const LogFile& log) {
+  long threshold = gs_traceLowDiskThreshold;
+  return threshold != 0 && CalcFreeSpace(log.directory.c_str()) < threshold;
+}
+
+void OpenLog(LogFile& log) {
+  if (log.diskShort) return;
+  if (DiskIsShort(log)) {
+    log.diskShort = true;
+    return;
+  }
+  log.stream = fopen(log.name.c_str(), "ae");
+}
+
+void CloseLog(LogFile& log) {
+  if (log.stream) fclose(log.stream);
+  log.stream = nullptr;
+}
+
+// Writes the line to the file; on a disk that has become short, the message in the line's place, for
+// all targets, and that is the file's last one.
+const char* WriteToLog(LogFile& log, const char* line) {
+  if (!log.stream) OpenLog(log);
+  if (!log.stream) return line;
+  if (DiskIsShort(log)) {
+    line = kDiskShort;
+    log.diskShort = true;
+  }
+  fputs(line, log.stream);
+  fputc('\n', log.stream);
+  fflush(log.stream);
+  if (log.diskShort) CloseLog(log);
+  return line;
+}
+
+void WriteLine(const char* line) {
+  uint32_t target = gs_traceTarget;
+  if (target & vlTracer::kTargetFile) line = WriteToLog(Log(), line);
+  if (target & vlTracer::kTargetError) fprintf(stderr, "%s\n", line);
+  if (target & vlTracer::kTargetOutput) puts(line);
+}
+
+std::string LocalTime(const wchar_t* date, const wchar_t* time, unsigned fractionDigits) {
+  return AnsiString(AbsTimeToString(CurrentSystemTime(), date, time, fractionDigits, kTimeLocal))
+      .c_str();
+}
+
+std::string NewLogName() {
+  char suffix[64];
+  snprintf(suffix, sizeof suffix, "-vlTracer-%08lX.log", static_cast<unsigned long>(getpid()));
+  return LocalTime(L"%Y%m%d_%H%M%S", L"", 0) + suffix;
+}
+
+void PlaceLog(LogFile& log, const wchar_t* directory, const std::string& name) {
+  log.directory = AnsiString(String(directory)).c_str();
+  if (!log.directory.ends_with('/') && !log.directory.ends_with('\\')) log.directory += '/';
+  log.name = log.directory + name;
+}
+
+char* CopyText(const std::string& text, char* buffer, unsigned long sizeBytes) {
+  if (sizeBytes > 0) snprintf(buffer, sizeBytes, "%s", text.c_str());
+  return buffer;
+}
+
+}  // namespace
+
+int64_t CalcFreeSpace(const char* path) {
+  struct statvfs info;
+  if (statvfs(path, &info) != 0) return -1;
+  return static_cast<int64_t>(info.f_bfree) * static_cast<int64_t>(info.f_frsize);
+}
+
+void vlTracer::Initialize(SeverityLevel mask, TraceTarget target, const wchar_t* directory,
+                          long threshold) {
+  Toolyard::CztHold hold(InitSection());
+  gs_traceMask = mask;
+  gs_traceTarget = target;
+  gs_traceLowDiskThreshold = threshold;
+  if (gs_traceSync) return;
+  std::string name = NewLogName();
+  auto* sync = new Toolyard::CztMutex(String(name.c_str()).c_str(), false);
+  if ((target & kTargetFile) && Log().name.empty() && directory) PlaceLog(Log(), directory, name);
+  gs_traceSync = sync;  // Last: whoever sees it sees the rest.
+}
+
+void vlTracer::Initialize(void (*callback)()) { gs_traceInitCallback = callback; }
+
+void vlTracer::Cleanup() {
+  Toolyard::CztMutex* sync = gs_traceSync.exchange(nullptr);
+  if (!sync) return;
+  OutputLock lock(*sync);
+  CloseLog(Log());
+}
+
+unsigned vlt_vlTracer::GetTraceMask() {
+  if (!gs_traceSync && gs_traceInitCallback) {
+    Toolyard::CztHold hold(InitSection());
+    if (!gs_traceSync) gs_traceInitCallback.load()();
+  }
+  return vlTracer::gs_traceMask;
+}
+
+void vlt_vlTracer::TraceOutput(char marker, const char* text, bool detail) {
+  Toolyard::CztMutex* sync = gs_traceSync;
+  if (!sync) return;
+  OutputLock lock(*sync);
+  char line[kLongestLine + 1];
+  snprintf(line, sizeof line, "%c %s", marker, text ? text : "");
+  WriteLine(line);
+  if (!detail) return;
+  std::string thread = AnsiString(ThreadID::getCallingID().getDisplayStringHex()).c_str();
+  std::string time = LocalTime(L"%Y%m%d", L"%H%M%S", 3);
+  snprintf(line, sizeof line, "  Thread = 0x%s, Time = %s", thread.c_str(), time.c_str());
+  WriteLine(line);
+}
+
+void vlt_vlTracer::TraceArgsHelper() {
+  // The objects behind this call are trace objects: the exported class only lends its name.
+  auto* object = reinterpret_cast<vlTracer*>(this);
+  char text[kArgumentTextSize];
+  TraceOutput(object->marker(), object->GetStringContentsA(text, sizeof text), true);
+}
+
+char* vlTracer0::GetStringContentsA(char* buffer, unsigned long sizeBytes) {
+  return CopyText(std::string("Func: ") + m_functionName, buffer, sizeBytes);
+}
+
+char* vlTracerX::GetStringContentsA(char* buffer, unsigned long sizeBytes) {
+  std::ostringstream out;
+  out << "Func: " << m_functionName << " Args: ";
+  for (unsigned long i = 0; i < m_argCount; ++i) m_args[i].print(out, m_args[i]);
+  return CopyText(out.str(), buffer, sizeBytes);
+}

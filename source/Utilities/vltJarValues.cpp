@@ -1,0 +1,194 @@
+// What stands in the jar: the server's process, cookie and identity, and the offline endpoints.
+#include <stdio.h>
+#include <stdlib.h>
+
+#include "source/Common/vltFileSecurity.h"
+#include "source/Common/vltcmn.h"
+#include "source/Utilities/vltjar.h"
+#include "source/Utilities/vltutils.h"
+#include "vlloader/source/vlloader.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/path.h"
+
+using vltjar::Narrow;
+using zt::fnd::String;
+using zt::fnd::osdep::path;
+
+namespace {
+
+constexpr const char* kCookieSection = "CookieSection";
+constexpr const char* kLastServerCookie = "LastServerCookie";
+constexpr const char* kServerSection = "ServerSection";
+constexpr const char* kServerIdentity = "ServerIdentity";
+constexpr const char* kOfflineSection = "OfflineStorageSection";
+constexpr const char* kNextEndpoint = "NextEndpt";
+
+constexpr int kFirstEndpoint = 61901;
+constexpr int kEndpointLimit = 62101;
+constexpr int kMostRounds = 400;
+
+String InstallDirectory() {
+  const char* text = GetCurrentVltPath();
+  return String(text ? text : "");
+}
+
+// <install>/Data/, whether it is there or not; empty without an install directory.
+String DataDirectory() {
+  String directory = InstallDirectory();
+  if (directory.empty()) return directory;
+  path::MakePathEndInSlash(directory);
+  return directory + L"Data/";
+}
+
+// Fills in an empty dataDir and makes the directory if it is missing.
+HRESULT PrepareDataDirectory(String& dataDir) {
+  if (!dataDir.empty()) return S_OK;
+  dataDir = DataDirectory();
+  if (dataDir.empty()) return E_FAIL;
+  try {
+    return vltMakeSharedDirectory(dataDir);
+  } catch (const zt::fnd::exception::AccessDenied&) {
+    return E_FAIL;  // A result of the exports, not an error of the caller's program.
+  }
+}
+
+// Runs `use` on the opened jar, if there is one to be had.
+template <class Use>
+HRESULT WithJar(const wchar_t* jar, Use use) {
+  std::unique_ptr<CvlIniMgr> ini;
+  HRESULT result = VltjarOpen(jar, &ini);
+  return ini ? use(*ini) : result;
+}
+
+template <class Use>
+HRESULT WithPreparedJar(String& dataDir, Use use) {
+  HRESULT result = PrepareDataDirectory(dataDir);
+  if (result < 0) return result;
+  std::unique_ptr<wchar_t[]> jar(GetJarFilePath());
+  if (!jar) return result;  // The directory stays absent: there is nothing to read or to keep.
+  return WithJar(jar.get(), [&](CvlIniMgr& ini) { return use(jar.get(), ini); });
+}
+
+}  // namespace
+
+String vltjar::ExistingDataDirectory() {
+  String directory = DataDirectory();
+  return path::IsDirectory(directory.c_str()) ? directory : String();
+}
+
+wchar_t* GetJarFilePath() {
+  String directory = vltjar::ExistingDataDirectory();
+  if (directory.empty()) return nullptr;
+  String file = directory + L"vltjar.ini";
+  auto* copy = new wchar_t[file.length() + 1];
+  wcscpy(copy, file.c_str());
+  return copy;
+}
+
+// What would fill the entries of offline storages lies outside this library.
+HRESULT UpdateOfflineStorageInfo(const String&, CvlIniMgr*) { return E_FAIL; }
+HRESULT ValidateOfflineStorage(const String&, int*, CvlIniMgr*) { return E_FAIL; }
+HRESULT RemoveOfflineStorageInfo(const String&, CvlIniMgr*) { return E_FAIL; }
+
+HRESULT vltAddSvrProcessIDToJar(const wchar_t* section, long processID) {
+  String dataDir;
+  return WithPreparedJar(dataDir, [&](const wchar_t* jar, CvlIniMgr& ini) {
+    ini.SetItem(Narrow(section).c_str(), "ServerProcessID", std::to_string(processID).c_str(),
+                false);
+    return VltjarSaveChanges(jar, &ini);
+  });
+}
+
+HRESULT vltSetServerCookie(int cookie) {
+  std::unique_ptr<wchar_t[]> jar(GetJarFilePath());
+  if (!jar) return E_FAIL;
+  return WithJar(jar.get(), [&](CvlIniMgr& ini) {
+    ini.SetItem(kCookieSection, kLastServerCookie, std::to_string(cookie).c_str(), false);
+    return VltjarSaveChanges(jar.get(), &ini);
+  });
+}
+
+HRESULT vltGetServerCookieFromFile(int* out, String& dataDir) {
+  return WithPreparedJar(dataDir, [&](const wchar_t* jar, CvlIniMgr& ini) {
+    std::string value;
+    HRESULT result = ini.GetItem(kCookieSection, kLastServerCookie, &value);
+    *out = result >= 0 ? atoi(value.c_str()) : 0;
+    if (result >= 0) return result;
+    ini.SetItem(kCookieSection, kLastServerCookie, "0", false);
+    return VltjarSaveChanges(jar, &ini);
+  });
+}
+
+HRESULT vltGetServerIdentity(GUID* out) {
+  if (!out) return E_POINTER;
+  String dataDir = vltjar::ExistingDataDirectory();
+  return vltGetServerIdentityFromFile(out, dataDir);
+}
+
+HRESULT vltGetServerIdentityFromFile(GUID* out, String& dataDir) {
+  return WithPreparedJar(dataDir, [&](const wchar_t* jar, CvlIniMgr& ini) {
+    std::string value;
+    HRESULT result = ini.GetItem(kServerSection, kServerIdentity, &value);
+    if (result >= 0) {
+      *out = vltGuidFromString2(String(value.c_str()).c_str());
+      return result;
+    }
+    if (vltCreateGuid2(out) < 0) return result;
+    TaskMem<wchar_t> text(vltGuidToString2(*out));
+    ini.SetItem(kServerSection, kServerIdentity, Narrow(text.get()).c_str(), false);
+    return VltjarSaveChanges(jar, &ini);
+  });
+}
+
+namespace {
+
+// The next port of the circle; the one behind it is stored for the next caller.
+std::string TakeCandidate(CvlIniMgr& ini) {
+  std::string value;
+  int candidate = kFirstEndpoint;
+  if (ini.GetItem(kOfflineSection, kNextEndpoint, &value) >= 0) candidate = atoi(value.c_str());
+  int next = candidate < kEndpointLimit - 1 ? candidate + 1 : kFirstEndpoint;
+  ini.SetItem(kOfflineSection, kNextEndpoint, std::to_string(next).c_str(), false);
+  return std::to_string(candidate);
+}
+
+bool IsFree(CvlIniMgr& ini, const std::string& candidate) {
+  std::string storage;
+  int inUse = 1;
+  return ini.GetItem(kOfflineSection, candidate.c_str(), &storage) < 0 ||
+         ValidateOfflineStorage(String(storage.c_str()), &inUse, &ini) < 0;
+}
+
+std::string FindEndpoint(CvlIniMgr& ini, const String& storage) {
+  std::string entry;
+  if (ini.GetItem(kOfflineSection, Narrow(storage.c_str()).c_str(), &entry) >= 0) {
+    int inUse = 1;
+    ValidateOfflineStorage(storage, &inUse, &ini);
+    return entry;
+  }
+  std::string candidate = TakeCandidate(ini);
+  for (int round = 1; round < kMostRounds && !IsFree(ini, candidate); ++round) {
+    candidate = TakeCandidate(ini);
+  }
+  return candidate;
+}
+
+}  // namespace
+
+HRESULT vltGetUniqueOfflineEndpointFromFile(String storage, String& endpoint, String dataDir) {
+  return WithPreparedJar(dataDir, [&](const wchar_t* jar, CvlIniMgr& ini) {
+    endpoint = String(FindEndpoint(ini, storage).c_str());
+    return VltjarSaveChanges(jar, &ini);
+  });
+}
+
+HRESULT GetOfflineEndpt(wchar_t* storage, wchar_t** endpoint) {
+  std::unique_ptr<wchar_t[]> jar(GetJarFilePath());
+  if (!jar) return E_FAIL;
+  // Held across the reading and the saving inside, so that both are one step for other processes.
+  CvlIniMgr hold(Narrow(jar.get()).c_str(), true, nullptr, true, false);
+  String found;
+  HRESULT result =
+      vltGetUniqueOfflineEndpointFromFile(String(storage ? storage : L""), found, String());
+  return result < 0 ? result : vltDuplicateString2(found.c_str(), endpoint);
+}

@@ -1,0 +1,98 @@
+// Where the local server listens, and which kind of storage a name or an address stands for.
+#include <string.h>
+#include <wchar.h>
+
+#include <mutex>
+#include <string>
+
+#include "source/Common/vltcmn.h"
+#include "source/Utilities/vltjar.h"
+#include "source/Utilities/vltutils.h"
+#include "zt/fnd/osdep/StringCompare.h"
+#include "zt/fnd/osdep/path.h"
+
+using zt::fnd::String;
+using zt::fnd::osdep::path;
+using zt::fnd::osdep::StringCaseCompare;
+
+namespace {
+
+// A name without a directory: the settings file of this look-up lies in the working directory, unlike
+// that of the settings calls.
+constexpr const wchar_t* g_ModulePath = L"vltutils";
+constexpr const wchar_t* kLocalHost = L"127.0.0.1:";
+constexpr const char* kDefaultEndpoint = "61900";
+constexpr const wchar_t* kOfflineMarker = L"VLTOFFLINESTORAGE=";
+
+// The answer of the first call, which stays whatever the file says later.
+struct LocalServer {
+  std::mutex lock;
+  std::wstring endpoint;
+};
+
+LocalServer& TheLocalServer() {
+  static auto* server = new LocalServer;
+  return *server;
+}
+
+// The port of the settings file; empty if the file cannot be opened.
+HRESULT ReadPort(std::string* port) {
+  String file = path::Join(path::DirName(String(g_ModulePath)), String(L"kor.ini"));
+  std::unique_ptr<CvlIniMgr> ini;
+  HRESULT result = E_FAIL;
+  try {
+    result = VltjarOpen(file.c_str(), &ini);
+  } catch (int) {
+    return E_FAIL;  // A directory that cannot be written is no reason to fail the caller otherwise.
+  }
+  if (ini && ini->GetItem("STORAGE", "LocalServerEndpoint3", port) < 0) *port = kDefaultEndpoint;
+  return result;
+}
+
+}  // namespace
+
+HRESULT vltGetLocalConfigurationURL(wchar_t** url) {
+  if (!url) return E_FAIL;  // Not E_POINTER: callers know it so.
+  LocalServer& server = TheLocalServer();
+  std::lock_guard hold(server.lock);
+  HRESULT result = S_OK;
+  if (server.endpoint.empty()) {
+    server.endpoint = kLocalHost;
+    std::string port;
+    result = ReadPort(&port);
+    server.endpoint += String(port.c_str()).c_str();
+  }
+  vltDuplicateString2(server.endpoint.c_str(), url);
+  return result;
+}
+
+int vltIsDefaultStorage(const wchar_t* storage) {
+  if (!storage) return 1;
+  String name = path::BaseName(String(storage));
+  return StringCaseCompare(name.c_str(), L"config.vlt") == 0 ||
+         StringCaseCompare(name.c_str(), L"config3.vlt") == 0;
+}
+
+HRESULT vltIsOfflineStorage(const wchar_t* url, unsigned* isOffline, wchar_t** storage) {
+  const wchar_t* found = url ? wcsstr(url, kOfflineMarker) : nullptr;
+  if (isOffline) *isOffline = found ? 1 : 0;
+  if (!found || !storage) return S_OK;
+  const wchar_t* name = found + wcslen(kOfflineMarker);
+  const wchar_t* colon = wcschr(name, L':');
+  size_t length = colon ? static_cast<size_t>(colon - name) : wcslen(name);
+  auto* copy = static_cast<wchar_t*>(vltTaskMemAlloc((length + 1) * sizeof(wchar_t)));
+  *storage = copy;
+  if (!copy) return S_OK;  // A null name is what the caller sees of it.
+  wmemcpy(copy, name, length);
+  copy[length] = 0;
+  return S_OK;
+}
+
+HRESULT vltGetNamedRegistrar2(const wchar_t* storage, IvltRegistrar** out) {
+  if (!out) return E_POINTER;
+  return vltIsDefaultStorage(storage) ? vltGetRegistrar(out) : E_FAIL;
+}
+
+HRESULT vltGetNamedRegistrar(const wchar_t* storage, IvltRegistrar** out) {
+  return vltGetNamedRegistrar2(storage, out);
+}

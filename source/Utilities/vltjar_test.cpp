@@ -1,0 +1,316 @@
+#include "source/Utilities/vltjar.h"
+
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <functional>
+#include <thread>
+#include <vector>
+
+#include "source/Common/vltFileSecurity.h"
+#include "source/Common/vltcmn.h"
+#include "source/Utilities/vltutils.h"
+#include "tests/support/Child.h"
+#include "tests/support/Installation.h"
+
+namespace {
+
+using namespace vlt::test;
+using zt::fnd::String;
+
+std::wstring Wide(const std::string& text) { return std::wstring(text.begin(), text.end()); }
+
+std::string BadName(const std::string& file) {
+  return file + zt::fnd::AnsiString(vlrGetCurrentLocalTime()).c_str() + ".bad";
+}
+
+// An installation with (at first) an empty data directory. The install directory is looked up once a
+// process, so whatever asks for it runs in a child; its exit code is the body's result.
+class Jar : public testing::Test {
+ protected:
+  std::string data() const { return installation.root() + "/Data"; }
+  std::string jar() const { return data() + "/vltjar.ini"; }
+  std::string sidecar() const { return data() + "/vltjar.vl5"; }
+  void makeData() { std::filesystem::create_directory(data()); }
+  int run(const std::function<int()>& body) { return Child(body).wait(); }
+
+  void expectSealed() const { EXPECT_EQ(Hex(ReadBytes(sidecar())), Md5Sum(jar())); }
+
+  Installation installation;
+};
+
+TEST_F(Jar, PathNeedsTheDataDirectoryAndMakesNone) {
+  EXPECT_EQ(run([] { return GetJarFilePath() == nullptr ? 0 : 1; }), 0);
+  EXPECT_FALSE(Exists(data()));
+  makeData();
+  EXPECT_EQ(run([&] {
+              std::unique_ptr<wchar_t[]> path(GetJarFilePath());
+              return path && Wide(jar()) == path.get() ? 0 : 1;
+            }),
+            0);
+  EXPECT_FALSE(Exists(jar()));
+}
+
+TEST_F(Jar, WithoutAnInstallDirectoryNothingWorks) {
+  Installation::setDir("");
+  EXPECT_EQ(run([] {
+              GUID guid;
+              wchar_t* text = nullptr;
+              return vltSetServerCookie(1) == E_FAIL &&
+                             vltAddSvrProcessIDToJar(L"s", 1) == E_FAIL &&
+                             vltGetServerIdentity(&guid) == E_FAIL &&
+                             GetOfflineEndpt(nullptr, &text) == E_FAIL && !text
+                         ? 0
+                         : 1;
+            }),
+            0);
+}
+
+TEST_F(Jar, CookieIsKeptWithItsSidecarAndModes) {
+  makeData();
+  ScopedUmask strict(077);
+  EXPECT_EQ(run([] { return vltSetServerCookie(-17); }), 0);
+  EXPECT_EQ(ReadBytes(jar()), "[CookieSection]\nLastServerCookie = -17\n\n");
+  EXPECT_EQ(ModeOf(jar()), 0777);
+  EXPECT_EQ(ModeOf(sidecar()), 0777);
+  expectSealed();
+  EXPECT_EQ(run([] {
+              int cookie = 0;
+              String dataDir;
+              return vltGetServerCookieFromFile(&cookie, dataDir) == S_OK && cookie == -17 ? 0 : 1;
+            }),
+            0);
+}
+
+TEST_F(Jar, CookieWithoutADataDirectoryFailsAndMakesNone) {
+  EXPECT_EQ(run([] { return vltSetServerCookie(1) == E_FAIL ? 0 : 1; }), 0);
+  EXPECT_FALSE(Exists(data()));
+}
+
+TEST_F(Jar, AMissingCookieIsZeroAndWritten) {
+  EXPECT_EQ(run([] {
+              int cookie = 5;
+              String dataDir;
+              return vltGetServerCookieFromFile(&cookie, dataDir) == S_OK && cookie == 0 ? 0 : 1;
+            }),
+            0);
+  EXPECT_EQ(ReadBytes(jar()), "[CookieSection]\nLastServerCookie = 0\n\n");
+  EXPECT_EQ(ModeOf(data()), 0777);
+  expectSealed();
+}
+
+TEST_F(Jar, ProcessIdMakesTheDataDirectory) {
+  ScopedUmask strict(077);
+  EXPECT_EQ(run([] { return vltAddSvrProcessIDToJar(L"Server A", 4711); }), 0);
+  EXPECT_EQ(ModeOf(data()), 0777);
+  EXPECT_EQ(ReadBytes(jar()), "[Server A]\nServerProcessID = 4711\n\n");
+  expectSealed();
+  // Later sections are set apart only in the save that brings them.
+  EXPECT_EQ(run([] { return vltSetServerCookie(3); }), 0);
+  EXPECT_EQ(ReadBytes(jar()),
+            "[Server A]\nServerProcessID = 4711\n\n[CookieSection]\nLastServerCookie = 3\n\n");
+}
+
+TEST_F(Jar, AnEmptySectionNameSavesAndSucceeds) {
+  EXPECT_EQ(
+      run([] { return vltAddSvrProcessIDToJar(L"", 1) | vltAddSvrProcessIDToJar(nullptr, 1); }), 0);
+  EXPECT_EQ(ReadBytes(jar()), "");
+}
+
+TEST_F(Jar, IdentityNeedsItsLibraryAndLeavesNoKey) {
+  makeData();
+  EXPECT_EQ(run([] {
+              GUID guid;
+              return vltGetServerIdentity(&guid) == E_FAIL && vltGetServerIdentity(&guid) == E_FAIL
+                         ? 0
+                         : 1;
+            }),
+            0);
+  EXPECT_EQ(ReadBytes(jar()), "");  // begun by the open, and not saved
+  EXPECT_FALSE(Exists(sidecar()));
+  EXPECT_EQ(vltGetServerIdentity(nullptr), E_POINTER);
+}
+
+TEST_F(Jar, IdentityIsReadByEveryLaterCaller) {
+  makeData();
+  WriteBytes(jar(), "[ServerSection]\nServerIdentity={00000001-0002-0003-0405-060708090A0B}\n");
+  auto first = [] {
+    GUID guid = {};
+    if (vltGetServerIdentity(&guid) != S_OK) return 99;
+    return static_cast<int>(guid.Data1);
+  };
+  EXPECT_EQ(run(first), 1);
+  EXPECT_EQ(run(first), 1);
+  WriteBytes(jar(), "[ServerSection]\nServerIdentity=nonsense\n");
+  EXPECT_EQ(run(first), 0);  // bad text is the null GUID
+}
+
+// ---- Endpoints
+
+std::string Endpoint(const wchar_t* storage) {
+  wchar_t* text = nullptr;
+  if (GetOfflineEndpt(const_cast<wchar_t*>(storage), &text) < 0) return "failed";
+  std::string narrow = zt::fnd::AnsiString(text).c_str();
+  vltFree(text);
+  return narrow;
+}
+
+TEST_F(Jar, EndpointsRunInACircle) {
+  makeData();
+  EXPECT_EQ(run([] { return Endpoint(L"a") == "61901" && Endpoint(L"a") == "61902" ? 0 : 1; }), 0);
+  EXPECT_EQ(ReadBytes(jar()), "[OfflineStorageSection]\nNextEndpt = 61903\n");
+  WriteBytes(jar(), "[OfflineStorageSection]\nNextEndpt=62100\n");
+  EXPECT_EQ(run([] { return Endpoint(nullptr) == "62100" ? 0 : 1; }), 0);
+  EXPECT_EQ(ReadBytes(jar()), "[OfflineStorageSection]\nNextEndpt = 61901\n");
+  expectSealed();
+}
+
+TEST_F(Jar, AStoragesEntryIsItsEndpoint) {
+  makeData();
+  WriteBytes(jar(), "[OfflineStorageSection]\nmine=7000\nNextEndpt=61950\n61950=mine\n");
+  EXPECT_EQ(run([] {
+              if (Endpoint(L"mine") != "7000") return 1;
+              if (Endpoint(L"NextEndpt") != "61950") return 2;
+              return Endpoint(L"other") == "61950" ? 0 : 3;  // taken, but nobody can say so
+            }),
+            0);
+}
+
+TEST_F(Jar, AHostileCounterOverflowsNothing) {
+  makeData();
+  for (const char* value : {"2147483647", "99999999999999999999", "-5", "abc"}) {
+    WriteBytes(jar(), std::string("[OfflineStorageSection]\nNextEndpt=") + value + "\n");
+    EXPECT_EQ(run([] { return Endpoint(L"x") == "failed" ? 1 : 0; }), 0) << value;
+  }
+}
+
+TEST_F(Jar, NoEndpointIsHandedOutTwice) {
+  makeData();
+  constexpr int kProcesses = 4, kThreads = 4, kEach = 25;
+  std::vector<Child> children;
+  for (int p = 0; p < kProcesses; ++p) {
+    children.emplace_back([&] {
+      std::vector<std::thread> threads;
+      for (int t = 0; t < kThreads; ++t) {
+        threads.emplace_back([] {
+          for (int i = 0; i < kEach; ++i) {
+            if (Endpoint(L"s") == "failed") _exit(1);
+          }
+        });
+      }
+      for (auto& thread : threads) thread.join();
+      return 0;
+    });
+  }
+  for (Child& child : children) EXPECT_EQ(child.wait(), 0);
+  // 400 requests went twice round the circle of 200.
+  EXPECT_EQ(ReadBytes(jar()), "[OfflineStorageSection]\nNextEndpt = 61901\n");
+  expectSealed();
+}
+
+// ---- Guarded files
+
+class GuardedFile : public testing::Test {
+ protected:
+  GuardedFile() : file(dir / "x.ini"), wide(Wide(file)) {}
+
+  HRESULT open() { return VltjarOpen(wide.c_str(), &ini); }
+  std::string value(const char* section, const char* item) const {
+    std::string text;
+    return ini && ini->GetItem(section, item, &text) == S_OK ? text : "(none)";
+  }
+
+  TempDir dir;
+  std::string file;
+  std::wstring wide;
+  std::unique_ptr<CvlIniMgr> ini;
+};
+
+TEST_F(GuardedFile, WithoutASidecarOpensAsItIsAndTheSaveMakesOne) {
+  WriteBytes(file, "[s]\na=1\n");
+  EXPECT_EQ(open(), S_OK);
+  EXPECT_EQ(value("s", "a"), "1");
+  EXPECT_FALSE(VltjarChecksumFileExists(wide.c_str()));
+  ini->SetItem("s", "a", "2", false);
+  EXPECT_EQ(VltjarSaveChanges(wide.c_str(), ini.get()), S_OK);
+  EXPECT_TRUE(VltjarChecksumFileExists(wide.c_str()));
+  EXPECT_EQ(Hex(ReadBytes(dir / "x.vl5")), Md5Sum(file));
+}
+
+TEST_F(GuardedFile, AShortSidecarGivesUpTheFile) {
+  WriteBytes(file, "[s]\na=1\n");
+  WriteBytes(dir / "x.vl5", std::string(15, 'x'));
+  EXPECT_EQ(open(), E_FAIL);
+  ASSERT_TRUE(ini);
+  EXPECT_EQ(value("s", "a"), "(none)");
+  EXPECT_EQ(ReadBytes(BadName(file)), "[s]\na=1\n");
+  EXPECT_EQ(ReadBytes(file), "");
+  EXPECT_FALSE(Exists(dir / "x.vl5"));
+}
+
+TEST_F(GuardedFile, AWrongDigestCostsNothingAndIsRepaired) {
+  WriteBytes(file, "[s]\na=1\n");
+  for (char fill : {'q', '0'}) {
+    WriteBytes(dir / "x.vl5", std::string(16, fill));
+    EXPECT_EQ(open(), S_OK);
+    EXPECT_EQ(value("s", "a"), "1");
+    EXPECT_EQ(ReadBytes(dir / "x.vl5"), std::string(16, fill));
+    EXPECT_EQ(VltjarSaveChanges(wide.c_str(), ini.get()), S_OK);
+    EXPECT_EQ(Hex(ReadBytes(dir / "x.vl5")), Md5Sum(file));
+    ini.reset();
+  }
+}
+
+TEST_F(GuardedFile, AnUnparsableFileIsSetAside) {
+  WriteBytes(file, "\xFE\xFF garbage");
+  EXPECT_EQ(open(), S_OK);
+  ASSERT_TRUE(ini);
+  EXPECT_EQ(ReadBytes(BadName(file)), "\xFE\xFF garbage");
+  EXPECT_EQ(ini->GetNumberOfSections(), 0);
+}
+
+TEST_F(GuardedFile, AFailedRetryLeavesAsItsInteger) {
+  dir.makeDir("x.ini");
+  EXPECT_THROW(open(), int);
+  EXPECT_FALSE(ini);
+}
+
+TEST_F(GuardedFile, DeleteRenamesAndRemoves) {
+  EXPECT_EQ(VltjarDeleteIniFile(wide.c_str()), S_OK);
+  WriteBytes(file, "x");
+  WriteBytes(dir / "x.vl5", "y");
+  EXPECT_EQ(VltjarDeleteIniFile(wide.c_str()), S_OK);
+  EXPECT_EQ(ReadBytes(BadName(file)), "x");
+  EXPECT_FALSE(Exists(dir / "x.vl5"));
+  EXPECT_EQ(VltjarDeleteIniFile(L"relative.ini"), E_UNEXPECTED);
+  WriteBytes(dir / "plain", "");
+  EXPECT_EQ(VltjarDeleteIniFile(Wide(dir / "plain/x.ini").c_str()), E_FAIL);  // ENOTDIR
+}
+
+TEST_F(GuardedFile, DigestsAreReadAndWritten) {
+  unsigned char* digest = nullptr;
+  EXPECT_EQ(VltjarGetChecksumForCacheFile(wide.c_str(), &digest), S_FALSE);
+  auto* sixteen = reinterpret_cast<const unsigned char*>("0123456789abcdef");
+  EXPECT_EQ(VltjarSetChecksumForCacheFile(wide.c_str(), sixteen), S_OK);
+  EXPECT_EQ(VltjarGetChecksumForCacheFile(wide.c_str(), &digest), S_OK);
+  EXPECT_EQ(std::string(reinterpret_cast<char*>(digest), 16), "0123456789abcdef");
+  delete[] digest;
+  EXPECT_EQ(VltjarSetChecksumForCacheFile(Wide(dir / "none/x.ini").c_str(), sixteen), E_FAIL);
+}
+
+TEST_F(GuardedFile, SidecarOfAPathCutsAtTheLastPoint) {
+  auto* sixteen = reinterpret_cast<const unsigned char*>("0123456789abcdef");
+  EXPECT_EQ(VltjarSetChecksumForCacheFile(Wide(dir / "nodot").c_str(), sixteen), S_OK);
+  EXPECT_TRUE(Exists(CvlIniMgr::SidecarName(dir / "nodot")));
+}
+
+TEST(OfflineStorage, TheFamilyIsNotThere) {
+  int inUse = 1;
+  EXPECT_EQ(ValidateOfflineStorage(String(L"s"), &inUse, nullptr), E_FAIL);
+  EXPECT_EQ(UpdateOfflineStorageInfo(String(L"s"), nullptr), E_FAIL);
+  EXPECT_EQ(RemoveOfflineStorageInfo(String(L"s"), nullptr), E_FAIL);
+}
+
+}  // namespace
