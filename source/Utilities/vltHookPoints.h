@@ -8,6 +8,7 @@
 namespace vlt::hook {
 
 inline constexpr const char* kGetRegistrar2 = "TestHookNT\"./source/Utilities/vltutils\"1215";
+inline constexpr const char* kCheckComponent = "TestHookNT\"./source/Utilities/vltCheck\"369";
 inline constexpr const char* kJarOpen = "TestHookNT\"./source/Utilities/vltutils\"2653";
 inline constexpr const char* kJarRetry = "TestHookNT\"./source/Utilities/vltutils\"2663";
 // Moments of a save: the file is written and its sidecar is old; the sidecar is written.

@@ -50,6 +50,10 @@ VLT_EXPORT HRESULT vltGetOldRegistrar(void** out);  // nulls *out; E_NOTIMPL
 VLT_EXPORT HRESULT vltLoadDataDictionaries();
 VLT_EXPORT HRESULT vltLoadDataDictionaries2(IvltRegistrar* registrar);
 
+// Checks the files and entry points of one component, or of all for the null GUID. *errors walks the
+// messages and is handed out also when the result is a failure, but for E_POINTER, E_OUTOFMEMORY and a
+// registrar that cannot be had. Loads the libraries of experts into this process, and unloads them.
+VLT_EXPORT HRESULT vltCheckComponent(vltID id, IEnumString** errors);
 // vltGetRegistrar for a null storage or the default one; E_FAIL for others. The same function twice.
 VLT_EXPORT HRESULT vltGetNamedRegistrar(const wchar_t* storage, IvltRegistrar** out);
 VLT_EXPORT HRESULT vltGetNamedRegistrar2(const wchar_t* storage, IvltRegistrar** out);

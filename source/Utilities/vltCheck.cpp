@@ -1,0 +1,216 @@
+#include "source/Utilities/vltCheck.h"
+
+#include <errno.h>
+#include <stdlib.h>
+#include <string.h>
+
+#include <new>
+#include <string>
+
+#include "source/Common/vltFailure.h"
+#include "source/Common/vltcmn.h"
+#include "source/Utilities/vltHookPoints.h"
+#include "source/Utilities/vltTestHook.h"
+#include "source/Utilities/vltutils.h"
+#include "zt/fnd/osdep/BinaryFile.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/SharedLibrary.h"
+#include "zt/fnd/osdep/path.h"
+#include "ztcom/ztcore/ztcom.h"
+
+using zt::fnd::AnsiString;
+using zt::fnd::String;
+using zt::fnd::osdep::BinaryFile;
+using zt::fnd::osdep::path;
+
+namespace {
+
+struct Kind {
+  _vltComponentType type;
+  const wchar_t* word;
+  const wchar_t* entryPoint;
+};
+// In the order in which all components are checked.
+constexpr Kind kKinds[] = {
+    {vltComponentDataDictionary, L"dictionary", nullptr},
+    {vltComponentObjectExpert, L"object expert", L"vltCreateObjectExpert"},
+    {vltComponentResourceExpert, L"resource expert", L"vltCreateResourceExpert"},
+    {vltComponentUIProvider, L"UI provider", L"vlGetProvider"}};
+
+std::string Narrow(const wchar_t* text) { return AnsiString(text).c_str(); }
+
+HRESULT Tell(vltErrors& errors, const std::string& message) {
+  errors.push_back(String(message.c_str()));
+  return E_FAIL;
+}
+
+HRESULT TellOfFile(vltErrors& errors, const wchar_t* word, const wchar_t* file, const char* what) {
+  return Tell(errors,
+              "the " + Narrow(word) + " \"" + Narrow(file) + "\" is registered but " + what);
+}
+
+constexpr const char* kMissing = "does not exist";
+constexpr const char* kUnreadable = "is not readable";
+
+// A relative path is nowhere: dictionaries keep their prefix in a field that is checked as a file.
+bool IsThere(const wchar_t* file) {
+  return path::IsPathAbsolute(file) && path::DoesFileExist(String(file));
+}
+
+}  // namespace
+
+HRESULT CheckFileExistence(const wchar_t* file, const wchar_t* word, vltErrors& errors) {
+  try {
+    if (!IsThere(file)) return TellOfFile(errors, word, file, kMissing);
+    BinaryFile(String(file), BinaryFile::Mode::Read, false).close();
+    return S_OK;
+  } catch (const zt::fnd::osdep::OSException& error) {
+    // A problem of the file is what the check is there to tell.
+    bool missing = error.whatcode() == ENOTDIR;
+    return TellOfFile(errors, word, file, missing ? kMissing : kUnreadable);
+  }
+}
+
+HRESULT CheckEntryPoint(const wchar_t* file, const wchar_t* entryPoint, vltErrors& errors) {
+  zt::fnd::osdep::SharedLibrary library(String(file), true, true);
+  if (!library.isLoaded()) {
+    return Tell(errors, "failed to load library \"" + Narrow(file) +
+                            "\" while checking for entry point \"" + Narrow(entryPoint) + "\"");
+  }
+  if (!library.getFunctionPointer(String(entryPoint), true)) {
+    return Tell(errors, "failed to find entry point \"" + Narrow(entryPoint) + "\" in library \"" +
+                            Narrow(file) + "\"");
+  }
+  return S_OK;
+}
+
+HRESULT CheckComponent(const _vltComponent2& component, vltErrors& errors) {
+  const Kind* kind = nullptr;
+  for (const Kind& row : kKinds) {
+    if (row.type == component.type) kind = &row;
+  }
+  if (!kind) return S_OK;
+  if (kind->entryPoint) {
+    if (!component.fileName) return TellOfFile(errors, kind->word, L"", kMissing);
+    HRESULT result = CheckFileExistence(component.fileName, kind->word, errors);
+    return result < 0 ? result : CheckEntryPoint(component.fileName, kind->entryPoint, errors);
+  }
+  HRESULT result = S_OK;
+  for (const wchar_t* file : {static_cast<const wchar_t*>(component.fileName),
+                              static_cast<const wchar_t*>(component.dictionary.prefix),
+                              static_cast<const wchar_t*>(component.dictionary.auxString1)}) {
+    if (file) result = CheckFileExistence(file, kind->word, errors);
+  }
+  return result;
+}
+
+void FreeComponent(_vltComponent2& record) {
+  vltTaskMemFree(record.dictionary.auxString1);
+  vltTaskMemFree(record.dictionary.prefix);
+  vltTaskMemFree(record.dictionary.auxString2);
+  vltTaskMemFree(record.name);
+  vltTaskMemFree(record.fileName);
+  if (record.type == vltComponentResourceExpert) vltTaskMemFree(record.resource.pnp);
+}
+
+namespace {
+
+// A record that is ended with its scope.
+struct OwnedRecord : _vltComponent2 {
+  OwnedRecord() : _vltComponent2() { memset(static_cast<_vltComponent2*>(this), 0, sizeof *this); }
+  ~OwnedRecord() { FreeComponent(*this); }
+  OwnedRecord(const OwnedRecord&) = delete;
+  OwnedRecord& operator=(const OwnedRecord&) = delete;
+};
+
+HRESULT CheckAll(IvltRegistrar* registrar, vltErrors& errors) {
+  HRESULT status = S_OK;
+  for (const Kind& kind : kKinds) {
+    HRESULT result = CheckComponents(registrar, kind.type, errors);
+    if (status >= 0) status = result;
+  }
+  return status;
+}
+
+HRESULT CheckOne(IvltRegistrar* registrar, GUID id, vltErrors& errors) {
+  OwnedRecord record;
+  HRESULT result = registrar->GetComponent(id, &record);
+  return result < 0 ? result : CheckComponent(record, errors);
+}
+
+}  // namespace
+
+HRESULT CheckComponents(IvltRegistrar* registrar, _vltComponentType type, vltErrors& errors) {
+  CztComPtr<IvltEnumComponent> enumerator;
+  HRESULT status = registrar->EnumComponents(type, enumerator.out());
+  if (status < 0) return status;
+  if (!enumerator) abort();  // A registrar that says yes and hands out nothing.
+  for (;;) {
+    OwnedRecord record;
+    unsigned int fetched = 0;
+    if (enumerator->Next(1, &record, &fetched) != S_OK) return status;
+    HRESULT result = CheckComponent(record, errors);
+    if (status >= 0) status = result;
+  }
+}
+
+HRESULT vltCheckComponent(vltID id, IEnumString** errors) {
+  if (!errors) return E_POINTER;
+  CztComPtr<IvltRegistrar> registrar;
+  HRESULT status = vltGetRegistrar(registrar.out());
+  if (status < 0) return status;
+  vltErrors found;
+  bool all = memcmp(&id, &GUID_NULL, sizeof id) == 0;
+  status = all ? CheckAll(registrar.get(), found) : CheckOne(registrar.get(), id, found);
+  CEnumErrorString* list = nullptr;
+  if (!vltTestHook(vlt::hook::kCheckComponent)) list = new (std::nothrow) CEnumErrorString(found);
+  if (!list) return vltReportOutOfMemory("BOOL vltCheckComponent(vltID, IEnumString**)");
+  // The list is the result; the status is only its summary.
+  list->QueryInterface(IID_IEnumString, reinterpret_cast<void**>(errors));
+  return status;
+}
+
+HRESULT CEnumErrorString::QueryInterface(const GUID& iid, void** out) {
+  if (!out) return E_POINTER;
+  *out = nullptr;
+  if (memcmp(&iid, &IID_IUnknown, sizeof iid) != 0 &&
+      memcmp(&iid, &IID_IEnumString, sizeof iid) != 0) {
+    return E_NOINTERFACE;
+  }
+  AddRef();
+  *out = static_cast<IEnumString*>(this);
+  return S_OK;
+}
+
+uint32_t CEnumErrorString::AddRef() { return ++m_refCount; }
+
+uint32_t CEnumErrorString::Release() {
+  uint32_t left = --m_refCount;
+  if (left == 0) delete this;
+  return left;
+}
+
+HRESULT CEnumErrorString::Next(unsigned int count, wchar_t** strings, unsigned int* fetched) {
+  unsigned int done = 0;
+  while (done < count && m_cursor < m_errors.size()) {
+    strings[done] = nullptr;
+    // Without memory the text is met again by the next call.
+    if (vltDuplicateString(m_errors[static_cast<unsigned>(m_cursor)].c_str(), &strings[done]) < 0) {
+      break;
+    }
+    ++m_cursor;
+    ++done;
+  }
+  if (fetched) *fetched = done;
+  return done == count ? S_OK : S_FALSE;
+}
+
+HRESULT CEnumErrorString::Skip(unsigned int count) {
+  m_cursor += count;
+  return S_OK;
+}
+
+HRESULT CEnumErrorString::Reset() {
+  m_cursor = 0;
+  return S_OK;
+}

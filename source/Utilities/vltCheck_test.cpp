@@ -1,0 +1,286 @@
+#include "source/Utilities/vltCheck.h"
+
+#include <gtest/gtest.h>
+#include <string.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <functional>
+
+#include "source/Common/vltcmn.h"
+#include "source/Utilities/vltutils.h"
+#include "tests/support/Child.h"
+#include "tests/support/Installation.h"
+
+namespace {
+
+using namespace vlt::test;
+
+std::wstring Wide(const std::string& text) { return std::wstring(text.begin(), text.end()); }
+
+std::vector<std::string> Texts(const vltErrors& errors) {
+  std::vector<std::string> texts;
+  for (unsigned i = 0; i < errors.size(); ++i) {
+    texts.push_back(zt::fnd::AnsiString(const_cast<vltErrors&>(errors)[i]).c_str());
+  }
+  return texts;
+}
+
+using Messages = std::vector<std::string>;
+
+// A real library that exports the entry; of this program's word size.
+void MakeLibrary(const std::string& file, const std::string& entry, bool otherWordSize = false) {
+  TempDir dir;
+  WriteBytes(dir / "x.cpp", "extern \"C\" int " + entry + "() { return 0; }\n");
+  bool is32 = (sizeof(void*) == 4) != otherWordSize;
+  auto built = RunProgram(
+      {"g++", is32 ? "-m32" : "-m64", "-shared", "-fPIC", "-nostdlib", "-o", file, dir / "x.cpp"});
+  ASSERT_EQ(built.exitCode, 0) << built.err;
+}
+
+class Check : public testing::Test {
+ protected:
+  HRESULT check(_vltComponentType type, const std::string& file, const wchar_t* prefix = nullptr,
+                const std::string& aux = "") {
+    std::wstring wideFile = Wide(file), wideAux = Wide(aux);
+    std::wstring widePrefix = prefix ? prefix : L"";
+    _vltComponent2 record;
+    memset(&record, 0, sizeof record);
+    record.type = type;
+    if (!file.empty()) record.fileName = wideFile.data();
+    if (type == vltComponentDataDictionary) {
+      if (prefix) record.dictionary.prefix = widePrefix.data();
+      if (!aux.empty()) record.dictionary.auxString1 = wideAux.data();
+    }
+    return CheckComponent(record, errors);
+  }
+
+  TempDir dir;
+  vltErrors errors;
+};
+
+TEST_F(Check, ADictionarysLastFileDecides) {
+  WriteBytes(dir / "prefix", "");
+  WriteBytes(dir / "aux", "");
+  std::string missing = dir / "missing";
+  EXPECT_EQ(check(vltComponentDataDictionary, missing, Wide(dir / "prefix").c_str(), dir / "aux"),
+            S_OK);
+  EXPECT_EQ(Texts(errors),
+            Messages{"the dictionary \"" + missing + "\" is registered but does not exist"});
+  EXPECT_EQ(check(vltComponentDataDictionary, dir / "aux", nullptr, missing), E_FAIL);
+}
+
+TEST_F(Check, APrefixThatIsNoPathDoesNotExist) {
+  EXPECT_EQ(check(vltComponentDataDictionary, "", L"vl"), E_FAIL);
+  EXPECT_EQ(Texts(errors), Messages{"the dictionary \"vl\" is registered but does not exist"});
+}
+
+TEST_F(Check, FilesBelowAFileAndDirectoriesDoNotExist) {
+  WriteBytes(dir / "file", "");
+  EXPECT_EQ(check(vltComponentDataDictionary, dir / "file/x"), E_FAIL);
+  EXPECT_EQ(check(vltComponentDataDictionary, dir.path()), E_FAIL);
+  EXPECT_EQ(errors.size(), 2u);
+  EXPECT_NE(Texts(errors)[0].find("does not exist"), std::string::npos);
+}
+
+TEST_F(Check, AnUnreadableFileIsTold) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs root, to have files of two users";
+  WriteBytes(dir / "file", "");
+  ASSERT_EQ(chmod((dir / "file").c_str(), 0600), 0);
+  ASSERT_EQ(chmod(dir.path().c_str(), 0755), 0);
+  EXPECT_EQ(Child([&] {
+              if (setresuid(65534, 65534, 65534) != 0) return 9;
+              if (check(vltComponentDataDictionary, dir / "file") != E_FAIL) return 1;
+              return Texts(errors)[0] == "the dictionary \"" + (dir / "file") +
+                                             "\" is registered but is not readable"
+                         ? 0
+                         : 2;
+            }).wait(),
+            0);
+}
+
+TEST_F(Check, EntryPointsByType) {
+  struct Row {
+    _vltComponentType type;
+    const char *word, *entry;
+  };
+  const Row rows[] = {{vltComponentObjectExpert, "object expert", "vltCreateObjectExpert"},
+                      {vltComponentResourceExpert, "resource expert", "vltCreateResourceExpert"},
+                      {vltComponentUIProvider, "UI provider", "vlGetProvider"}};
+  for (const Row& row : rows) {
+    std::string good = dir / "good.so", other = dir / "other.so", missing = dir / "missing.so";
+    MakeLibrary(good, row.entry);
+    MakeLibrary(other, "somethingElse");
+    errors.clear();
+    EXPECT_EQ(check(row.type, good), S_OK);
+    EXPECT_EQ(check(row.type, other), E_FAIL);
+    EXPECT_EQ(check(row.type, missing), E_FAIL);
+    EXPECT_EQ(Texts(errors), (Messages{std::string("failed to find entry point \"") + row.entry +
+                                           "\" in library \"" + other + "\"",
+                                       std::string("the ") + row.word + " \"" + missing +
+                                           "\" is registered but does not exist"}));
+  }
+}
+
+TEST_F(Check, WhatIsNoLibraryDoesNotLoad) {
+  std::string text = dir / "text.so", foreign = dir / "foreign.so", needy = dir / "needy.so";
+  WriteBytes(text, "no library");
+  MakeLibrary(needy, "f(); int g() { return f(); } extern \"C\" int h");
+  EXPECT_EQ(check(vltComponentObjectExpert, text), E_FAIL);
+  EXPECT_EQ(check(vltComponentObjectExpert, needy), E_FAIL);
+  for (unsigned i = 0; i < errors.size(); ++i) {
+    EXPECT_EQ(Texts(errors)[i].rfind("failed to load library \"" + dir.path(), 0), 0u);
+    EXPECT_TRUE(
+        Texts(errors)[i].ends_with("\" while checking for entry point \"vltCreateObjectExpert\""));
+  }
+  EXPECT_EQ(errors.size(), 2u);
+}
+
+TEST_F(Check, OtherTypesHaveNothingToCheck) {
+  EXPECT_EQ(check(vltComponentType7, dir / "missing"), S_OK);
+  EXPECT_EQ(check(vltComponentNone, dir / "missing"), S_OK);
+  EXPECT_EQ(errors.size(), 0u);
+}
+
+TEST_F(Check, AnExpertWithoutAFileIsTold) {
+  EXPECT_EQ(check(vltComponentObjectExpert, ""), E_FAIL);
+  EXPECT_EQ(Texts(errors), Messages{"the object expert \"\" is registered but does not exist"});
+}
+
+// ---- The export
+
+Messages Drain(IEnumString* list) {
+  Messages texts;
+  wchar_t* text = nullptr;
+  unsigned fetched = 0;
+  while (list->Next(1, &text, &fetched) == S_OK) {
+    texts.push_back(zt::fnd::AnsiString(text).c_str());
+    vltFree(text);
+  }
+  return texts;
+}
+
+int InChild(const std::function<int()>& body) { return Child(body).wait(); }
+
+TEST(CheckExport, AllComponentsOfARealTree) {
+  Installation installation;
+  std::string good = installation.root() + "/good.so";
+  MakeLibrary(good, "vltCreateObjectExpert");
+  installation.addBundle("Experts", "a.vle",
+                         "[KORComponents]\nGood=Good\n[Good]\nIdentifier="
+                         "00000001-0000-0000-0000-000000000000\nFileName=" +
+                             good + "\n");
+  installation.addObjectExpert("b", "Bundle", "00000002-0000-0000-0000-000000000000");
+  installation.addResourceExpert("c", "Ports", "00000003-0000-0000-0000-000000000000", "PNP");
+  std::string root = installation.root();
+  EXPECT_EQ(InChild([&] {
+              IEnumString* list = nullptr;
+              if (vltCheckComponent(GUID_NULL, &list) != E_FAIL || !list) return 1;
+              Messages texts = Drain(list);
+              list->Release();
+              auto is = [](const std::string& word, const std::string& file) {
+                return "the " + word + " \"" + file + "\" is registered but does not exist";
+              };
+              Messages expected = {is("dictionary", root + "/Data Dictionaries/vltdd.framework"),
+                                   is("dictionary", "vl"),
+                                   is("object expert", root + "/Experts/b.vle"),
+                                   is("resource expert", root + "/Experts/c.vle")};
+              if (texts != expected) {
+                for (const auto& text : texts) fprintf(stderr, "%s\n", text.c_str());
+                return 2;
+              }
+              GUID one = {1, 0, 0, {}};
+              if (vltCheckComponent(one, &list) != S_OK) return 3;
+              bool empty = Drain(list).empty();
+              list->Release();
+              return empty ? 0 : 4;
+            }),
+            0);
+}
+
+TEST(CheckExport, AnUnknownIdFailsWithAnEmptyList) {
+  Installation installation;
+  EXPECT_EQ(InChild([] {
+              IEnumString* list = nullptr;
+              GUID unknown = {77, 0, 0, {}};
+              if (vltCheckComponent(unknown, &list) != E_INVALIDARG || !list) return 1;
+              wchar_t* text = nullptr;
+              unsigned fetched = 9;
+              bool empty = list->Next(1, &text, &fetched) == S_FALSE && fetched == 0;
+              list->Release();
+              return empty ? 0 : 2;
+            }),
+            0);
+  EXPECT_EQ(vltCheckComponent(GUID_NULL, nullptr), E_POINTER);
+}
+
+TEST(CheckExport, ARegistrarWithoutComponentsHasNothingToTell) {
+  Installation installation;
+  WriteBytes(installation.sidecar(), "short");  // The database is given up: an empty registrar.
+  EXPECT_EQ(InChild([] {
+              IEnumString* list = nullptr;
+              if (vltCheckComponent(GUID_NULL, &list) != S_OK || !list) return 1;
+              bool empty = Drain(list).empty();
+              list->Release();
+              return empty ? 0 : 2;
+            }),
+            0);
+}
+
+// ---- The enumerator
+
+class ErrorList : public testing::Test {
+ protected:
+  ErrorList() {
+    vltErrors errors;
+    for (const wchar_t* text : {L"a", L"b", L"c"}) errors.push_back(zt::fnd::String(text));
+    list = new CEnumErrorString(errors);
+    list->AddRef();
+  }
+  ~ErrorList() override { list->Release(); }
+  CEnumErrorString* list;
+};
+
+TEST_F(ErrorList, NextHandsOutWhatThereIs) {
+  wchar_t* texts[3] = {};
+  unsigned fetched = 0;
+  EXPECT_EQ(list->Next(2, texts, &fetched), S_OK);
+  EXPECT_EQ(fetched, 2u);
+  EXPECT_STREQ(texts[1], L"b");
+  vltFree(texts[0]);
+  vltFree(texts[1]);
+  EXPECT_EQ(list->Next(2, texts, nullptr), S_FALSE);
+  EXPECT_STREQ(texts[0], L"c");
+  vltFree(texts[0]);
+  EXPECT_EQ(list->Next(0, texts, &fetched), S_OK);
+  EXPECT_EQ(fetched, 0u);
+  EXPECT_EQ(list->Reset(), S_OK);
+  EXPECT_EQ(Drain(list), (Messages{"a", "b", "c"}));
+}
+
+TEST_F(ErrorList, SkipMayGoPastTheEnd) {
+  EXPECT_EQ(list->Skip(1), S_OK);
+  EXPECT_EQ(Drain(list), (Messages{"b", "c"}));
+  list->Reset();
+  EXPECT_EQ(list->Skip(0xFFFFFFFF), S_OK);
+  EXPECT_EQ(list->Skip(2), S_OK);
+  EXPECT_TRUE(Drain(list).empty());
+}
+
+TEST_F(ErrorList, TheOtherOperations) {
+  EXPECT_EQ(list->RemoteNext(1, nullptr, nullptr), E_NOTIMPL);
+  IEnumString* clone = list;
+  EXPECT_EQ(list->Clone(&clone), S_OK);
+  EXPECT_EQ(clone, list);
+  void* out = nullptr;
+  for (const GUID& iid : {IID_IUnknown, IID_IEnumString}) {
+    EXPECT_EQ(list->QueryInterface(iid, &out), S_OK);
+    EXPECT_EQ(out, static_cast<IEnumString*>(list));
+    EXPECT_EQ(list->Release(), 1u);
+  }
+  EXPECT_EQ(list->QueryInterface(IID_IvltRegistrar, &out), E_NOINTERFACE);
+  EXPECT_EQ(out, nullptr);
+}
+
+}  // namespace
