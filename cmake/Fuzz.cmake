@@ -1,0 +1,16 @@
+# One program a file of fuzz/. With VLT_FUZZ (clang) it is a libFuzzer target; otherwise it replays its
+# corpus, and is a test.
+file(GLOB fuzzers CONFIGURE_DEPENDS fuzz/*_fuzz.cpp)
+foreach(source ${fuzzers})
+  get_filename_component(name ${source} NAME_WE)
+  string(REGEX REPLACE "_fuzz$" "" topic ${name})
+  add_executable(${name} ${source})
+  target_link_libraries(${name} PRIVATE vlt_strict vltutils_static)
+  if(VLT_FUZZ)
+    target_link_options(${name} PRIVATE -fsanitize=fuzzer)
+  else()
+    target_sources(${name} PRIVATE fuzz/replay.cpp)
+    add_test(NAME Fuzz.${topic} COMMAND ${name} ${CMAKE_SOURCE_DIR}/fuzz/corpus/${topic})
+    set_tests_properties(Fuzz.${topic} PROPERTIES LABELS fuzz TIMEOUT 120)
+  endif()
+endforeach()
