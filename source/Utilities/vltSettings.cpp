@@ -1,32 +1,18 @@
 // Endpoints, ports and cache limits from the settings file, <install>/Data/kor.ini or a named one.
 #include <stdlib.h>
 
-#include <iterator>
+#include <algorithm>
 
 #include "source/Common/vltcmn.h"
+#include "source/Utilities/vltSettingsKeys.h"
 #include "source/Utilities/vltjar.h"
 #include "source/Utilities/vltutils.h"
 #include "zt/fnd/String.h"
 
+using namespace settings;
 using zt::fnd::String;
 
 namespace {
-
-constexpr const char* kSection = "STORAGE";
-
-// The one index that has defaults.
-constexpr unsigned kDefaultIndex = 3;
-
-struct IndexedText {
-  const char* key;
-  const wchar_t* atDefaultIndex;
-};
-constexpr IndexedText kBootstrapEndpoint = {"BootstrapEndpoint", L"62602"};
-constexpr IndexedText kRemoteProtocol = {"RemoteServerProtocol", L"ncacn_ip_tcp"};
-constexpr IndexedText kRemoteEndpoint = {"RemoteServerEndpoint", L"51700"};
-constexpr IndexedText kRemoteEventPort = {"RemoteEventPort", L"57616"};
-constexpr IndexedText kLocalProtocol = {"LocalServerProtocol", L"ncalrpc"};
-constexpr IndexedText kLocalEndpoint = {"LocalServerEndpoint", L"61900"};
 
 // An open settings file, or none, which answers with the defaults. Every output is optional: a value
 // that nobody wants is not read.
@@ -66,29 +52,27 @@ class Settings {
   void eventNameAppend(unsigned index, wchar_t** out) const {
     if (!out) return;
     std::string value;
-    read("EventNameAppend" + std::to_string(index), &value);
+    read(kEventNameAppend + std::to_string(index), &value);
     vltDuplicateString2(String(value.c_str()).c_str(), out);
   }
 
-  void u32(const char* key, unsigned fallback, unsigned* out) const {
+  void u32(const PlainNumber& row, unsigned* out) const {
     if (!out) return;
     std::string value;
-    *out = read(key, &value) ? vltU32FromString2(String(value.c_str()).c_str()) : fallback;
+    *out = static_cast<unsigned>(row.fallback);
+    if (read(row.key, &value)) *out = vltU32FromString2(String(value.c_str()).c_str());
   }
 
-  void flag(const char* key, unsigned fallback, unsigned* out) const {
+  void flag(const PlainNumber& row, unsigned* out) const {
     if (!out) return;
     std::string value;
-    *out = fallback;
-    if (read(key, &value)) *out = vltI32FromString2(String(value.c_str()).c_str()) != 0;
+    *out = static_cast<unsigned>(row.fallback);
+    if (read(row.key, &value)) *out = vltI32FromString2(String(value.c_str()).c_str()) != 0;
   }
 
-  // False, with the fallback, without a value.
-  bool number(const char* key, long fallback, long* out) const {
+  long number(const PlainNumber& row) const {
     std::string value;
-    bool found = read(key, &value);
-    *out = found ? atol(value.c_str()) : fallback;
-    return found;
+    return read(row.key, &value) ? atol(value.c_str()) : row.fallback;
   }
 
  private:
@@ -126,32 +110,26 @@ HRESULT vltGetClientCacheSettings(unsigned* objectCacheLimit, unsigned* objectCa
   Settings settings;
   HRESULT status = settings.open(useName != 0, name);
   if (!settings.usable()) return status;
-  settings.u32("ClientObjectCacheLimit", 150000, objectCacheLimit);
-  settings.u32("ClientObjectCacheFlushPercentage", 20, objectCacheFlushPercentage);
-  settings.u32("ClientBufferCacheLimit", 0x2000000, bufferCacheLimit);
-  settings.u32("ClientBufferCacheMinimumLimit", 0x200000, bufferCacheMinimumLimit);
-  settings.u32("ClientBufferCacheFlushPercentage", 20, bufferCacheFlushPercentage);
-  settings.u32("GarbageCollectorInterval", 20000, garbageCollectorInterval);
+  settings.u32(kObjectCacheLimit, objectCacheLimit);
+  settings.u32(kObjectCacheFlushPercentage, objectCacheFlushPercentage);
+  settings.u32(kBufferCacheLimit, bufferCacheLimit);
+  settings.u32(kBufferCacheMinimumLimit, bufferCacheMinimumLimit);
+  settings.u32(kBufferCacheFlushPercentage, bufferCacheFlushPercentage);
+  settings.u32(kGarbageCollectorInterval, garbageCollectorInterval);
   return status;
 }
 
 namespace {
 
 void ReadRemoteEnabled(const Settings& settings, unsigned index, unsigned* out) {
-  settings.u32(("RemoteServerEnabled" + std::to_string(index)).c_str(), 0, out);
+  std::string key = kRemoteServerEnabled + std::to_string(index);
+  settings.u32({key.c_str(), 0}, out);
   if (out) *out = *out != 0;
 }
 
 void ReadCheckpoints(const Settings& settings, long* numCheckpoints, unsigned* createCheckpoints) {
-  long value;
-  if (numCheckpoints) {
-    settings.number("NumCheckpoints", 100, &value);
-    *numCheckpoints = value < 0 ? 0 : value;
-  }
-  if (createCheckpoints) {
-    settings.number("CreateCheckpoints", 1, &value);
-    *createCheckpoints = value != 0;
-  }
+  if (numCheckpoints) *numCheckpoints = std::max(settings.number(kNumCheckpoints), 0L);
+  if (createCheckpoints) *createCheckpoints = settings.number(kCreateCheckpoints) != 0;
 }
 
 void ReadCookie(const Settings& settings, int* lastServerCookie) {
@@ -175,9 +153,9 @@ HRESULT vltGetServerSettings(unsigned index, unsigned* remoteEnabled, wchar_t** 
   if (!settings.usable()) return status;
   ReadRemoteEnabled(settings, index, remoteEnabled);
   settings.eventNameAppend(index, eventNameAppend);
-  settings.flag("JournalingOptions", 1, journalingOptions);
-  if (maxBackupFrequency) settings.number("MaxBackupFrequency", 86400, maxBackupFrequency);
-  settings.flag("ValidateDBStructure", 1, validateDBStructure);
+  settings.flag(kJournalingOptions, journalingOptions);
+  if (maxBackupFrequency) *maxBackupFrequency = settings.number(kMaxBackupFrequency);
+  settings.flag(kValidateDBStructure, validateDBStructure);
   ReadCheckpoints(settings, numCheckpoints, createCheckpoints);
   ReadCookie(settings, lastServerCookie);
   status = settings.text(kBootstrapEndpoint, index, bootstrapEndpoint, status);
