@@ -4,6 +4,8 @@
 #include <stdio.h>
 
 #include "source/Common/ZtUtils/General/vlTracer.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/NamedEvent.h"
 
 void vltTraceError(const char* format, ...) {
   if (!(vlTracer::gs_traceMask & kTraceErrors)) return;
@@ -16,6 +18,10 @@ void vltTraceError(const char* format, ...) {
 }
 
 HRESULT vltReportOutOfMemory(const char* signature) {
+  // Whoever wants to know holds the event open; without such a process the signal is for nobody, and
+  // the event goes again with this object.
+  zt::fnd::osdep::NamedEvent lockdown(zt::fnd::String(L"LockdownVLTEvent"), true, true);
+  lockdown.set();
   vltTraceError("Memory allocation failure in %s", signature);
   return E_OUTOFMEMORY;
 }

@@ -1,28 +1,49 @@
 #pragma once
 
-#include "zt/fnd/StringFwd.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include <sys/types.h>
 
-// Descriptors that a forked child does not keep (O_CLOFORK, which Linux lacks).
-//
-// A lock of flock() belongs to the open file, which a child of fork() shares: as long as the child
-// lives, the lock of a parent that was killed would last. A marked descriptor is closed in the child
-// before fork() returns there, which leaves the parent's lock alone. Its number means nothing in the
-// child any more: owners there let go of it without closing. A process made without fork()'s
-// handlers keeps the descriptor. Threads: any.
+#include <utility>
+
+#include "zt/fnd/StringFwd.h"
+
 namespace zt {
 namespace fnd {
 namespace osdep {
 
-// CreateSharedUnixFile, with the descriptor marked before any fork can copy it. Throws what that
-// throws, and std::bad_alloc.
-ScopedFd CreateSharedUnixFileCloseOnFork(const AnsiString& path);
+// Owner of a descriptor that a forked child does not keep (O_CLOFORK, which Linux lacks).
+//
+// A lock of flock() belongs to the open file, which a child of fork() shares: as long as the child
+// lives, the lock of a parent that was killed would last. The descriptor is closed in the child
+// before fork() returns there, which leaves the parent's lock alone, and the child's copy of the
+// object then owns nothing, whatever has got the number since. A process that was made without
+// fork()'s handlers keeps the descriptor. Threads: one at a time; any may fork.
+class CloseOnForkFd {
+ public:
+  CloseOnForkFd() noexcept = default;  // none
+  CloseOnForkFd(CloseOnForkFd&& other) noexcept;
+  CloseOnForkFd& operator=(CloseOnForkFd&& other) noexcept;
+  ~CloseOnForkFd() { reset(); }
 
-// Takes the mark off; before the descriptor is closed, as its number may serve another file then.
-void KeepOnFork(int fd) noexcept;
+  // CreateSharedUnixFile. No fork gets hold of the descriptor while it is being opened. Throws what
+  // that throws, and std::bad_alloc.
+  static CloseOnForkFd OpenShared(const AnsiString& path);
 
-// Marks a descriptor again that was marked at its opening.
-void CloseOnForkAgain(int fd) noexcept;
+  int get() const noexcept { return m_fd; }
+  bool valid() const noexcept { return m_fd >= 0; }
+
+  // Whether a child keeps its copy from here on, and owns it.
+  void keepOnFork(bool keep) noexcept;
+
+  // Closes what this process owns, once. Keeps errno.
+  void reset() noexcept;
+
+ private:
+  CloseOnForkFd(int fd, pid_t pid) noexcept : m_fd(fd), m_pid(pid) {}
+
+  int m_fd = -1;
+  pid_t m_pid = 0;
+  bool m_kept = false;
+};
 
 }  // namespace osdep
 }  // namespace fnd

@@ -4,9 +4,11 @@
 #include <unistd.h>
 
 #include <cstddef>
+#include <utility>
 #include <vector>
 
 #include "zt/fnd/String.h"
+#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 
 namespace zt {
@@ -65,7 +67,6 @@ bool MarkIfNoFork(int fd, unsigned forks) {
 }
 
 void Mark(int fd, bool marked) noexcept {
-  if (fd < 0) return;
   Hold hold;
   std::size_t index = static_cast<std::size_t>(fd);
   if (s_marked != nullptr && index < s_marked->size()) (*s_marked)[index] = marked;
@@ -73,19 +74,40 @@ void Mark(int fd, bool marked) noexcept {
 
 }  // namespace
 
-ScopedFd CreateSharedUnixFileCloseOnFork(const AnsiString& path) {
+CloseOnForkFd::CloseOnForkFd(CloseOnForkFd&& other) noexcept { *this = std::move(other); }
+
+CloseOnForkFd& CloseOnForkFd::operator=(CloseOnForkFd&& other) noexcept {
+  reset();
+  m_fd = std::exchange(other.m_fd, -1);
+  m_pid = other.m_pid;
+  m_kept = other.m_kept;
+  return *this;
+}
+
+CloseOnForkFd CloseOnForkFd::OpenShared(const AnsiString& path) {
   pthread_once(&s_once, Register);
   for (;;) {
     unsigned forks = ForksSoFar();
     ScopedFd fd(CreateSharedUnixFile(path));
-    if (MarkIfNoFork(fd.get(), forks)) return fd;
+    if (MarkIfNoFork(fd.get(), forks)) return CloseOnForkFd(fd.release(), getpid());
     // The copy in the child is of an open file that nobody locks; this process takes another.
   }
 }
 
-void KeepOnFork(int fd) noexcept { Mark(fd, false); }
+void CloseOnForkFd::keepOnFork(bool keep) noexcept {
+  if (!valid()) return;
+  Mark(m_fd, !keep);
+  m_kept = keep;
+}
 
-void CloseOnForkAgain(int fd) noexcept { Mark(fd, true); }
+void CloseOnForkFd::reset() noexcept {
+  if (!valid()) return;
+  bool ours = m_pid == getpid();
+  // Before the descriptor is closed, as its number may serve another file then.
+  if (ours) Mark(m_fd, false);
+  ScopedFd closes(ours || m_kept ? m_fd : -1);
+  m_fd = -1;
+}
 
 }  // namespace osdep
 }  // namespace fnd

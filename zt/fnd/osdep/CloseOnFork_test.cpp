@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <signal.h>
 #include <sys/file.h>
 #include <unistd.h>
 
@@ -13,6 +14,8 @@
 #include "tests/support/Child.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/ScopedFd.h"
 
 namespace zt::fnd::osdep {
 namespace {
@@ -27,21 +30,20 @@ bool IsOpen(int fd) { return fcntl(fd, F_GETFD) != -1; }
 
 TEST(ForkClose, ChildHasTheDescriptorClosedAndTheParentKeepsItsLock) {
   TempDir dir;
-  ScopedFd fd = CreateSharedUnixFileCloseOnFork(Path(dir, "file"));
+  CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
   ASSERT_EQ(0, Flock(fd.get(), LOCK_EX));
   Child child([&] { return IsOpen(fd.get()) ? 1 : 0; });
   EXPECT_EQ(0, child.wait());
   EXPECT_TRUE(IsOpen(fd.get()));
   ScopedFd other(::open((dir / "file").c_str(), O_RDWR | O_CLOEXEC));
   EXPECT_NE(0, Flock(other.get(), LOCK_EX | LOCK_NB));
-  KeepOnFork(fd.get());
 }
 
 TEST(ForkClose, LockOfAKilledParentDoesNotOutliveItInTheChild) {
   TempDir dir;
   vlt::test::Signal ready, end;
   Child parent([&] {
-    ScopedFd fd = CreateSharedUnixFileCloseOnFork(Path(dir, "file"));
+    CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
     Flock(fd.get(), LOCK_EX);
     if (fork() == 0) {
       ready.notify();
@@ -61,40 +63,43 @@ TEST(ForkClose, LockOfAKilledParentDoesNotOutliveItInTheChild) {
 
 TEST(ForkClose, UnmarkedAndRemarkedDescriptors) {
   TempDir dir;
-  ScopedFd fd = CreateSharedUnixFileCloseOnFork(Path(dir, "file"));
-  KeepOnFork(fd.get());
-  Child keeps([&] { return IsOpen(fd.get()) ? 0 : 1; });
+  CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
+  fd.keepOnFork(true);
+  Child keeps([&] {
+    int number = fd.get();
+    if (!IsOpen(number)) return 1;
+    fd.reset();
+    return IsOpen(number) ? 2 : 0;
+  });
   EXPECT_EQ(0, keeps.wait());
-  CloseOnForkAgain(fd.get());
+  fd.keepOnFork(false);
   Child closes([&] { return IsOpen(fd.get()) ? 1 : 0; });
   EXPECT_EQ(0, closes.wait());
-  KeepOnFork(fd.get());
 }
 
 TEST(ForkClose, GrandchildDoesNotCloseTheNumberAgain) {
   TempDir dir;
-  ScopedFd fd = CreateSharedUnixFileCloseOnFork(Path(dir, "file"));
+  CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
   Child child([&] {
     ScopedFd reused(::open("/dev/null", O_RDONLY | O_CLOEXEC));
     if (reused.get() != fd.get()) return 1;
     Child grandchild([&] { return IsOpen(reused.get()) ? 0 : 2; });
     int code = grandchild.wait();
-    fd.release();
-    return code;
+    fd.reset();  // nor does the object
+    return code == 0 && !IsOpen(reused.get()) ? 3 : code;
   });
   EXPECT_EQ(0, child.wait());
-  KeepOnFork(fd.get());
 }
 
 TEST(ForkClose, FailedOpenMarksNothing) {
   TempDir dir;
   int before = vlt::test::OpenDescriptors();
   EXPECT_EQ(EISDIR,
-            PosixErrorOf([&] { CreateSharedUnixFileCloseOnFork(AnsiString(dir.path().c_str())); }));
+            PosixErrorOf([&] { CloseOnForkFd::OpenShared(AnsiString(dir.path().c_str())); }));
   EXPECT_EQ(before, vlt::test::OpenDescriptors());
-  KeepOnFork(-1);
-  KeepOnFork(1 << 20);
-  CloseOnForkAgain(-1);
+  CloseOnForkFd none;
+  none.keepOnFork(true);
+  none.reset();
 }
 
 // Whatever the moment of the fork: no child keeps a lock that its parent's thread had.
@@ -103,9 +108,9 @@ TEST(ForkClose, ForksAtAnyMomentLeaveNoLockBehind) {
   std::atomic<bool> stop{false};
   std::thread opener([&] {
     while (!stop) {
-      ScopedFd fd = CreateSharedUnixFileCloseOnFork(Path(dir, "file"));
+      CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
       Flock(fd.get(), LOCK_EX);
-      KeepOnFork(fd.get());  // a child of this moment shares an open file that is unlocked next
+      fd.keepOnFork(true);  // a child of this moment shares an open file that is unlocked next
       Flock(fd.get(), LOCK_UN);
     }
   });

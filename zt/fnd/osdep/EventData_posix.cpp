@@ -45,16 +45,15 @@ EventData::EventData(NamedEventGlobalStatics& statics, const String& name, bool 
 
 // ---- opening
 
-// Takes back what a failed opening has taken. The lock file goes too if it leads nowhere now.
+// Takes back the slot of an opening that fails; the lock file, which leads nowhere then, goes too.
 class EventData::Undo {
  public:
-  Undo(EventData& event, const EventFile& file) : m_event(&event), m_file(file) {}
+  Undo(EventData& event, EventFile& file) : m_event(&event), m_file(file) {}
   ~Undo() {
-    if (m_event == nullptr) return;
-    bool taken = static_cast<bool>(m_event->m_set);
-    if (taken) m_event->m_set->giveBack(m_event->m_slot, m_file.key());
-    if (taken || m_file.wasEmpty()) m_file.unlink();
+    if (m_event == nullptr || !m_event->m_set) return;
+    m_event->m_set->giveBack(m_event->m_slot, m_file.key());
     m_event->m_set = nullptr;
+    m_file.discardAtClose(true);
   }
   Undo(const Undo&) = delete;
   Undo& operator=(const Undo&) = delete;
@@ -62,7 +61,7 @@ class EventData::Undo {
 
  private:
   EventData* m_event;
-  const EventFile& m_file;
+  EventFile& m_file;
 };
 
 bool EventData::open(bool initialState) {

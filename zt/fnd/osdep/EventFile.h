@@ -7,7 +7,7 @@
 #include <memory>
 
 #include "zt/fnd/String.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/fnd/osdep/CloseOnFork.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 
 namespace zt {
@@ -42,8 +42,6 @@ class EventFile {
 
   bool valid() const noexcept { return m_fd.valid(); }
   bool exclusive() const noexcept { return m_exclusive; }
-  // True if there was nothing in it when it was opened.
-  bool wasEmpty() const noexcept { return m_wasEmpty; }
   // ftok(path, 1); never -1.
   key_t key() const noexcept { return m_key; }
 
@@ -54,8 +52,12 @@ class EventFile {
   // From alone to shared, without a moment between. False with errno: not locked.
   bool share() noexcept;
 
-  // Ends the opening: from here on a forked child keeps its copy of the file.
+  // Ends the opening: from here on the file stays, and a forked child keeps its copy of it.
   void settle() noexcept;
+
+  // Whether close() takes the file's name away, if it is still held alone then. So it is after an
+  // opening that found the file empty, so that one that fails leaves nothing behind.
+  void discardAtClose(bool discard) noexcept { m_discard = discard; }
 
   // From shared to alone, if nobody else is there. On false the file is not locked at all, so this
   // is for the last use only.
@@ -72,10 +74,10 @@ class EventFile {
   bool identify();
 
   std::unique_ptr<const AnsiString> m_path;  // a pointer, as moving a string can fail
-  ScopedFd m_fd;
+  CloseOnForkFd m_fd;
   pid_t m_pid = 0;
   bool m_exclusive = false;
-  bool m_wasEmpty = false;
+  bool m_discard = false;
   key_t m_key = -1;
   FileIdentity m_identity;
 };

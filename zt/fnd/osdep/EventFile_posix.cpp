@@ -9,9 +9,9 @@
 #include <utility>
 
 #include "zt/fnd/Exception.h"
-#include "zt/fnd/osdep/CloseOnFork.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/Retry.h"
+#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/Sleep.h"
 
 namespace zt {
@@ -38,7 +38,7 @@ bool GetLockAccessToFile(int fd) {
 
 EventFile::EventFile(const AnsiString& path)
     : m_path(std::make_unique<const AnsiString>(path)),
-      m_fd(CreateSharedUnixFileCloseOnFork(path)),
+      m_fd(CloseOnForkFd::OpenShared(path)),
       m_pid(getpid()) {}
 
 EventFile::EventFile(EventFile&& other) noexcept { *this = std::move(other); }
@@ -49,7 +49,7 @@ EventFile& EventFile::operator=(EventFile&& other) noexcept {
   m_fd = std::move(other.m_fd);
   m_pid = other.m_pid;
   m_exclusive = other.m_exclusive;
-  m_wasEmpty = other.m_wasEmpty;
+  m_discard = other.m_discard;
   m_key = other.m_key;
   m_identity = other.m_identity;
   return *this;
@@ -69,8 +69,8 @@ EventFile EventFile::Open(const String& name) {
 bool EventFile::identify() {
   struct stat info;
   if (::fstat(m_fd.get(), &info) != 0) ZT_RAISE(PosixError());
-  m_wasEmpty = info.st_size == 0;
   m_identity = FileIdentity::Of(m_fd.get());
+  m_discard = info.st_size == 0;
   m_key = RetryEintr([&] { return ::ftok(m_path->c_str(), kProject); });
   if (m_key == -1) {
     if (errno != ENOENT) ZT_RAISE(PosixError());
@@ -97,10 +97,13 @@ bool EventFile::share() noexcept {
   return true;
 }
 
-void EventFile::settle() noexcept { KeepOnFork(m_fd.get()); }
+void EventFile::settle() noexcept {
+  m_discard = false;
+  m_fd.keepOnFork(true);
+}
 
 bool EventFile::claim() noexcept {
-  CloseOnForkAgain(m_fd.get());
+  m_fd.keepOnFork(false);
   m_exclusive = Flock(m_fd.get(), LOCK_EX | LOCK_NB) == 0;
   return m_exclusive;
 }
@@ -114,8 +117,8 @@ void EventFile::close() noexcept {
   if (!m_fd.valid()) return;
   if (m_pid == getpid()) {
     int saved = errno;
+    if (m_discard && m_exclusive) unlink();
     Flock(m_fd.get(), LOCK_UN);
-    KeepOnFork(m_fd.get());
     errno = saved;
   }
   m_fd.reset();

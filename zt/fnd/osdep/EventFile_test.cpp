@@ -18,6 +18,7 @@
 #include "tests/support/FailSystemCall.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
+#include "zt/fnd/osdep/ScopedFd.h"
 
 namespace zt::fnd::osdep {
 namespace {
@@ -103,7 +104,6 @@ TEST(EventFile, IsMadeOpenToAllAndKnowsWhatItIs) {
   EventFile file = EventFile::Open(L"name");
   EXPECT_TRUE(file.valid());
   EXPECT_TRUE(file.exclusive());
-  EXPECT_TRUE(file.wasEmpty());
   EXPECT_EQ(ftok(place.file("name").c_str(), 1), file.key());
   EXPECT_EQ(0666, ModeOf(place.file("name")));
   EXPECT_EQ(0777, ModeOf(std::filesystem::path(place.file("name")).parent_path()));
@@ -117,7 +117,6 @@ TEST(EventFile, SecondOpenerSharesOnceTheFirstDoes) {
   EXPECT_TRUE(first.write("abc", 3, 0));
   EventFile second = EventFile::Open(L"name");
   EXPECT_FALSE(second.exclusive());
-  EXPECT_FALSE(second.wasEmpty());
   EXPECT_EQ(first.key(), second.key());
   first.close();
   EXPECT_TRUE(second.claim());
@@ -167,7 +166,8 @@ TEST(EventFile, OpenerOfARemovedFileTakesTheNewOne) {
   Child opener([&] {
     waiting.notify();
     EventFile file = EventFile::Open(L"name");
-    if (!file.exclusive() || !file.wasEmpty()) return 1;
+    char byte;
+    if (!file.exclusive() || file.read(&byte, 1, 0)) return 1;
     return file.key() == ftok(place.file("name").c_str(), 1) && file.unlink() ? 0 : 2;
   });
   ASSERT_TRUE(waiting.await());
@@ -235,6 +235,36 @@ TEST(EventFile, ChildOfAnOpeningHasNoCopyAndOneOfASettledFileUnlocksNothing) {
   EXPECT_NE(0, Flock(OpenRaw(place.file("name")).get(), LOCK_EX | LOCK_NB));
 }
 
+TEST(EventFile, FileOfAnOpeningThatFailsIsGone) {
+  EventPlace place;
+  EventFile::Open(L"name").close();
+  EXPECT_FALSE(Exists(place.file("name")));
+  { EventFile file = EventFile::Open(L"name"); }
+  EXPECT_FALSE(Exists(place.file("name")));
+  EventFile settled = EventFile::Open(L"name");
+  settled.settle();
+  settled.close();
+  EXPECT_TRUE(Exists(place.file("name")));
+  WriteBytes(place.file("name"), "was there");
+  EventFile::Open(L"name").close();
+  EXPECT_EQ("was there", ReadBytes(place.file("name")));
+}
+
+TEST(EventFile, SharedOrReplacedFilesAreNotDiscarded) {
+  EventPlace place;
+  EventFile first = EventFile::Open(L"name");
+  ASSERT_TRUE(first.share());
+  EventFile::Open(L"name").close();  // finds it empty, but not alone
+  EXPECT_TRUE(Exists(place.file("name")));
+  first.close();
+  EXPECT_TRUE(Exists(place.file("name")));
+  EventFile replaced = EventFile::Open(L"name");
+  std::filesystem::remove(place.file("name"));
+  WriteBytes(place.file("name"), "a stranger's");
+  replaced.close();
+  EXPECT_TRUE(Exists(place.file("name")));
+}
+
 TEST(EventFile, MovedFilesHaveOneOwner) {
   EventPlace place;
   int before = OpenDescriptors();
@@ -245,7 +275,8 @@ TEST(EventFile, MovedFilesHaveOneOwner) {
     EXPECT_TRUE(second.valid());
     EventFile other = EventFile::Open(L"other");
     second = std::move(other);
-    EXPECT_EQ(0, Flock(OpenRaw(place.file("name")).get(), LOCK_EX | LOCK_NB));
+    EXPECT_FALSE(Exists(place.file("name")));
+    EXPECT_NE(0, Flock(OpenRaw(place.file("other")).get(), LOCK_EX | LOCK_NB));
   }
   EXPECT_EQ(before, OpenDescriptors());
 }

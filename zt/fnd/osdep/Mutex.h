@@ -24,7 +24,7 @@ namespace osdep {
 //                                                                   the section stays the holder's
 //
 // A forked child holds nothing: its objects open their files anew on first use and never free what
-// the parent holds. A program started by exec keeps no lock.
+// the parent holds. Neither it nor a program started by exec keeps the lock of a parent that died.
 //
 // Threads: one object may be shared. Lock order: the name's section, then the file.
 class Mutex {

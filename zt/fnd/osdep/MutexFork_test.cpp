@@ -167,6 +167,67 @@ TEST(MutexFork, GrandchildRenewsAgain) {
   EXPECT_EQ(0, child.wait());
 }
 
+TEST(MutexFork, LockOfAKilledParentDoesNotLiveOnInTheChild) {
+  MutexPlace place;
+  vlt::test::Signal forked, end;
+  Child holder([&] {
+    Mutex mutex(L"name"), other(L"other");
+    mutex.lock();
+    if (fork() == 0) {
+      forked.notify();
+      end.await();
+      _exit(0);
+    }
+    for (;;) pause();
+    return 0;
+  });
+  ASSERT_TRUE(forked.await());
+  EXPECT_FALSE(FileIsFree(place.file("name")));
+  holder.kill(SIGKILL);
+  holder.wait();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  end.notify();
+}
+
+TEST(MutexFork, ChildDoesNotCloseADescriptorThatIsNoLongerTheMutexs) {
+  MutexPlace place;
+  auto used = std::make_unique<Mutex>(Wide("used"));
+  auto unused = std::make_unique<Mutex>(Wide("unused"));
+  Child child([&] {
+    // The numbers that the parent's files had go to these.
+    int first = ::open("/dev/null", O_RDONLY | O_CLOEXEC);
+    int second = ::open("/dev/null", O_RDONLY | O_CLOEXEC);
+    used->lock();
+    used.reset();
+    unused.reset();
+    return fcntl(first, F_GETFD) != -1 && fcntl(second, F_GETFD) != -1 ? 0 : 1;
+  });
+  EXPECT_EQ(0, child.wait());
+}
+
+TEST(MutexFork, ReopenedFileIsNotKeptByAChildEither) {
+  MutexPlace place;
+  vlt::test::Signal forked, end;
+  Child holder([&] {
+    Mutex mutex(L"name");
+    unlink(place.file("name").c_str());
+    mutex.lock();
+    if (fork() == 0) {
+      forked.notify();
+      end.await();
+      _exit(0);
+    }
+    for (;;) pause();
+    return 0;
+  });
+  ASSERT_TRUE(forked.await());
+  EXPECT_FALSE(FileIsFree(place.file("name")));
+  holder.kill(SIGKILL);
+  holder.wait();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  end.notify();
+}
+
 TEST(MutexFork, ProgramStartedByExecKeepsNoLock) {
   MutexPlace place;
   int feed[2], started[2];

@@ -7,6 +7,7 @@
 
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
+#include "zt/fnd/osdep/CloseOnFork.h"
 #include "zt/fnd/osdep/Mutex.h"
 #include "zt/fnd/osdep/MutexGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
@@ -24,11 +25,11 @@ constexpr const wchar_t* kDirectory = L"mutex";
 constexpr int kReplacedFiles = 100;
 
 // Opens the file of a name once more; its directory may have gone meanwhile.
-ScopedFd OpenLockFile(const AnsiString& file) {
+CloseOnForkFd OpenLockFile(const AnsiString& file) {
   String dir = path::DirName(String(file));
   path::MakePathEndInSlash(dir);
   CreateSharedUnixDir(dir);
-  return ScopedFd(CreateSharedUnixFile(file));
+  return CloseOnForkFd::OpenShared(file);
 }
 
 // Leaves a section again unless the lock was taken whole.
@@ -53,7 +54,7 @@ struct Mutex::Record {
       : name(mutexName),
         statics(MutexGlobalStatics::Get()),
         file(BuildSharedUnixFilePath(String(kDirectory), name)),
-        fd(CreateSharedUnixFile(file)),
+        fd(CloseOnForkFd::OpenShared(file)),
         identity(FileIdentity::Of(fd.get())),
         data(statics->attach(name)),
         pid(statics->pid) {}
@@ -73,7 +74,7 @@ struct Mutex::Record {
   const AnsiString file;
   // Changed by the section's owner alone, under the statics' section, so that other threads may
   // read it there.
-  ScopedFd fd;
+  CloseOnForkFd fd;
   FileIdentity identity;
   MutexGlobalStatics::Map::iterator data;
   // How often the file lock was taken through this object, and how often the section was entered
@@ -85,7 +86,7 @@ struct Mutex::Record {
 
 Mutex::Record::~Record() {
   if (!ofThisProcess()) {
-    // The inherited statics are unusable, and closing does not free what the parent holds.
+    // The inherited statics are unusable.
     statics.detach();
     return;
   }
@@ -99,7 +100,7 @@ void Mutex::Record::renewAfterFork() {
   RefPtr<MutexGlobalStatics> fresh = MutexGlobalStatics::Get();
   CriticalSectionGuard guard(fresh->renewal);
   if (ofThisProcess()) return;
-  ScopedFd own = OpenLockFile(file);
+  CloseOnForkFd own = OpenLockFile(file);
   data = fresh->attach(name);
   statics.detach();
   statics = fresh;
@@ -110,7 +111,7 @@ void Mutex::Record::renewAfterFork() {
 }
 
 void Mutex::Record::reopen() {
-  ScopedFd own = OpenLockFile(file);
+  CloseOnForkFd own = OpenLockFile(file);
   CriticalSectionGuard guard(statics->section);
   fd = std::move(own);
   identity = FileIdentity::Of(fd.get());

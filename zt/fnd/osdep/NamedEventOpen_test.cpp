@@ -291,7 +291,7 @@ TEST(NamedEventFiles, OpenerWaitsWhileAnotherSetsTheFileUp) {
   std::this_thread::sleep_for(std::chrono::milliseconds(50));
   EXPECT_TRUE(opener.running());
   EXPECT_EQ("", ReadBytes(place.file("name")));
-  busy.reset();
+  Flock(busy.get(), LOCK_UN);  // the opener has a copy of the descriptor
   EXPECT_EQ(0, opener.wait());
 }
 

@@ -5,6 +5,7 @@
 #include <sys/ipc.h>
 #include <sys/sem.h>
 #include <sys/syscall.h>
+#include <ucontext.h>
 #include <unistd.h>
 
 #include <array>
@@ -18,6 +19,7 @@
 
 #include "tests/support/Child.h"
 #include "tests/support/EventPlace.h"
+#include "tests/support/FailSystemCall.h"
 #include "tests/support/PosixErrorOf.h"
 #include "zt/fnd/String.h"
 
@@ -38,6 +40,14 @@ long MsSince(Clock::time_point begin) {
   return static_cast<long>(
       std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - begin).count());
 }
+
+#if defined(__x86_64__)
+constexpr int kThirdArgument = REG_RDX, kResult = REG_RAX;
+constexpr long kSleepCall = SYS_clock_nanosleep;
+#else
+constexpr int kThirdArgument = REG_EDX, kResult = REG_EAX;
+constexpr long kSleepCall = SYS_clock_nanosleep_time64;
+#endif
 
 // 32-bit processes reach the kernel's semaphores by the same call or by ipc().
 bool Waiting(pid_t pid) {
@@ -172,38 +182,75 @@ TEST(NamedEvent, TimedWaitThatEndsInVainTakesItsTime) {
   }
 }
 
-// With looks at 0, 50, 100 and 120 ms, a signal between two looks is seen at the next one.
-TEST(NamedEvent, TimedWaitLooksEvery50Ms) {
-  EventPlace place;
-  NamedEvent event(L"name", kManual, kClear);
-  auto begin = Clock::now();
-  std::atomic<long> setAt{0};
-  std::thread setter([&] {
-    std::this_thread::sleep_for(std::chrono::milliseconds(60));
-    event.set();
-    setAt = MsSince(begin);
-  });
-  EXPECT_TRUE(event.wait(120));
-  long seen = MsSince(begin);
-  setter.join();
-  EXPECT_GE(seen, 100);
-  EXPECT_GE(setAt, 60);
+// Sleeps of this process, in milliseconds, as it asks the kernel for them. From CatchSleeps() on
+// they return at once. For children.
+std::array<long, 8> s_sleeps;
+std::size_t s_sleepCount;
+
+void OnSleep(int, siginfo_t*, void* context) {
+  auto& registers = static_cast<ucontext_t*>(context)->uc_mcontext.gregs;
+  auto* time = reinterpret_cast<const timespec*>(registers[kThirdArgument]);
+  s_sleeps.at(s_sleepCount++) = static_cast<long>(time->tv_sec * 1000 + time->tv_nsec / 1000000);
+  registers[kResult] = 0;
 }
 
+bool CatchSleeps() {
+  struct sigaction action = {};
+  action.sa_sigaction = OnSleep;
+  action.sa_flags = SA_SIGINFO;
+  sigaction(SIGSYS, &action, nullptr);
+  return vlt::test::TrapSystemCall(kSleepCall);
+}
+
+TEST(NamedEvent, TimedWaitSleeps50MsAndThenTheRest) {
+  EventPlace place;
+  auto sleepsOf = [](unsigned ms, std::vector<long> expected) {
+    return Child([=] {
+             NamedEvent event(L"name", kAutomatic, kClear);
+             if (!CatchSleeps()) return 1;
+             if (event.wait(ms)) return 2;
+             return std::vector<long>(s_sleeps.begin(), s_sleeps.begin() + s_sleepCount) == expected
+                        ? 0
+                        : 3;
+           })
+        .wait();
+  };
+  EXPECT_EQ(0, sleepsOf(120, {50, 50, 20}));
+  EXPECT_EQ(0, sleepsOf(50, {50, 0}));
+  EXPECT_EQ(0, sleepsOf(49, {49}));
+  EXPECT_EQ(0, sleepsOf(1, {1}));
+  EXPECT_EQ(0, sleepsOf(0, {}));
+}
+
+TEST(NamedEvent, TimedWaitSeesASignal) {
+  EventPlace place;
+  for (bool manual : {kManual, kAutomatic}) {
+    NamedEvent event(L"name", manual, kClear);
+    std::thread setter([&] {
+      std::this_thread::sleep_for(std::chrono::milliseconds(20));
+      event.set();
+    });
+    EXPECT_TRUE(event.wait(20000));
+    setter.join();
+    EXPECT_EQ(manual, event.checkOnly());
+  }
+}
+
+// A look can fall into the pulse, but not each time.
 TEST(NamedEvent, PulseBetweenTwoLooksGoesUnseen) {
   EventPlace place;
   NamedEvent event(L"name", kManual, kClear);
-  std::atomic<bool> begun{false};
-  std::thread pulser([&] {
-    while (!begun) std::this_thread::yield();
-    std::this_thread::sleep_for(std::chrono::milliseconds(20));
-    event.set();
-    event.reset();
-  });
-  begun = true;
-  bool seen = event.wait(120);
-  pulser.join();
-  EXPECT_FALSE(seen);
+  int unseen = 0;
+  for (int i = 0; i < 3; ++i) {
+    std::thread pulser([&] {
+      std::this_thread::sleep_for(std::chrono::milliseconds(20));
+      event.set();
+      event.reset();
+    });
+    unseen += !event.wait(120);
+    pulser.join();
+  }
+  EXPECT_GT(unseen, 0);
 }
 
 TEST(NamedEvent, PulseReleasesThoseWhoWaitWithoutLimit) {

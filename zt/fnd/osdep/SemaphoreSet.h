@@ -61,7 +61,7 @@ class SemaphoreSet : public RefCountedCriticalSectionPolicy {
  private:
   void open();
   bool build(EventFile& file);
-  bool makeSet(key_t key);
+  bool makeSet(EventFile& file);
   bool join(const EventFile& file);
   bool adopt(int id);
   void close();

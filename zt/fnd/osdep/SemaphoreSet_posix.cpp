@@ -50,15 +50,12 @@ SemaphoreSet::SemaphoreSet(NamedEventGlobalStatics& statics, unsigned number)
 void SemaphoreSet::open() {
   try {
     EventFile file = EventFile::Open(String(("sem_" + std::to_string(m_number)).c_str()));
-    bool alone = file.exclusive();
-    if (alone ? build(file) : join(file)) {
+    if (file.exclusive() ? build(file) : join(file)) {
       m_file = std::move(file);
       m_file.settle();
       return;
     }
     if (m_made) RemoveSet(m_id);
-    // A file that this attempt has made must not stay, or every failure would leave one more.
-    if (alone && file.wasEmpty()) file.unlink();
   } catch (const PosixError& e) {  // A set that cannot be had is skipped by its users.
     m_busy = e.whatcode() == EWOULDBLOCK;
   } catch (const std::exception&) {  // The same.
@@ -70,17 +67,23 @@ void SemaphoreSet::open() {
 bool SemaphoreSet::build(EventFile& file) {
   const StateFileBytes bytes = EncodeEmptySet();
   if (!file.write(bytes.data(), bytes.size(), 0)) return false;
-  if (!makeSet(file.key())) return false;
+  if (!makeSet(file)) return false;
   const unsigned char ready = 1;
   return file.write(&ready, 1, SetHeader::kReadyOffset) && file.share();
 }
 
 // A set of that key is one of an earlier life. Its values do not matter, as each event sets its own
 // when it is opened.
-bool SemaphoreSet::makeSet(key_t key) {
-  int id = Semget(key, kSlotsPerSet, IPC_CREAT | IPC_EXCL);
+bool SemaphoreSet::makeSet(EventFile& file) {
+  int id = Semget(file.key(), kSlotsPerSet, IPC_CREAT | IPC_EXCL);
   m_made = id != -1;
-  return adopt(id == -1 && errno == EEXIST ? Semget(key, kSlotsPerSet, 0) : id);
+  if (id == -1 && errno == EEXIST) {
+    // If the set cannot be taken, the file has to keep the inode that led to it, or the next number
+    // would get the inode, and the same set.
+    file.discardAtClose(false);
+    id = Semget(file.key(), kSlotsPerSet, 0);
+  }
+  return adopt(id);
 }
 
 bool SemaphoreSet::join(const EventFile& file) {

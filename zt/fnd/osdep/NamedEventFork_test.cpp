@@ -1,0 +1,302 @@
+// Named events and fork(): children that inherit, and openings that a fork cuts in two.
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/file.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <chrono>
+#include <memory>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "tests/support/Child.h"
+#include "tests/support/EventPlace.h"
+#include "tests/support/PosixErrorOf.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/Mutex.h"
+#include "zt/fnd/osdep/NamedEvent.h"
+#include "zt/fnd/osdep/ScopedFd.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::BlockedIn;
+using vlt::test::Child;
+using vlt::test::EventPlace;
+using vlt::test::Eventually;
+using vlt::test::Exists;
+using vlt::test::OpenDescriptors;
+using vlt::test::Wide;
+typedef std::vector<std::string> Names;
+
+constexpr bool kManual = true, kAutomatic = false, kSet = true, kClear = false;
+constexpr const wchar_t* kStateFileMutex = L"zt_fnd_osdep_NamedEvent_StateFileMutex";
+
+auto Open(const std::string& name, bool manual = kManual, bool initial = kClear) {
+  return std::make_unique<NamedEvent>(Wide(name), manual, initial);
+}
+
+bool FileIsFree(const std::string& path) {
+  ScopedFd fd(::open(path.c_str(), O_RDWR | O_CLOEXEC));
+  EXPECT_TRUE(fd.valid()) << path;
+  return Flock(fd.get(), LOCK_EX | LOCK_NB) == 0;
+}
+
+TEST(NamedEventFork, ChildUsesTheInheritedObject) {
+  EventPlace place;
+  auto event = Open("name", kAutomatic);
+  Child child([&] {
+    event->set();
+    return event->check() ? 0 : 1;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_FALSE(event->checkOnly());
+}
+
+TEST(NamedEventFork, ChildThatDestroysTakesNothingFromTheParent) {
+  EventPlace place;
+  auto event = Open("name", kManual, kSet), second = Open("name"), other = Open("other");
+  std::string state = vlt::test::ReadBytes(place.file("sem_1"));
+  Child child([&] {
+    int before = OpenDescriptors();
+    event.reset();
+    if (OpenDescriptors() != before) return 1;  // the second object still has the file
+    second.reset();
+    if (OpenDescriptors() != before - 1) return 2;
+    other.reset();
+    return OpenDescriptors() == before - 3 ? 0 : 3;  // with the set's file
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ((Names{"name", "other", "sem_1"}), place.files());
+  EXPECT_EQ(state, vlt::test::ReadBytes(place.file("sem_1")));
+  EXPECT_FALSE(FileIsFree(place.file("name")));
+  EXPECT_FALSE(FileIsFree(place.file("sem_1")));
+  EXPECT_TRUE(event->checkOnly());
+}
+
+TEST(NamedEventFork, ChildOpensTheNameItInherited) {
+  EventPlace place;
+  auto event = Open("name", kManual, kSet);
+  Child child([&] {
+    auto mine = Open("name", kManual, kClear);
+    if (!mine->checkOnly()) return 1;
+    event.reset();
+    mine->reset();
+    return 0;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_FALSE(event->checkOnly());
+  EXPECT_EQ((Names{"name", "sem_1"}), place.files());
+}
+
+TEST(NamedEventFork, ChildOpensOtherNamesInTheParentsSet) {
+  EventPlace place;
+  auto event = Open("name");
+  Child child([&] {
+    auto mine = Open("mine");
+    return place.slotOf("mine") == EventPlace::Slot{1, 1} ? 0 : 1;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ((Names{"name", "sem_1"}), place.files());
+}
+
+TEST(NamedEventFork, InheritedEventOutlivesAKilledParent) {
+  EventPlace place;
+  vlt::test::Signal ready, go, done;
+  Child parent([&] {
+    auto event = Open("name", kManual);
+    if (fork() == 0) {
+      ready.notify();
+      go.await();
+      event->set();
+      done.notify();
+      go.await();
+      _exit(0);
+    }
+    for (;;) pause();
+    return 0;
+  });
+  ASSERT_TRUE(ready.await());
+  parent.kill(SIGKILL);
+  parent.wait();
+  auto event = Open("name", kManual, kClear);  // joins the one that the child still uses
+  EXPECT_FALSE(event->checkOnly());
+  go.notify();
+  ASSERT_TRUE(done.await());
+  EXPECT_TRUE(event->checkOnly());
+  go.notify();
+}
+
+TEST(NamedEventFork, ParentClosesWhileAChildLives) {
+  EventPlace place;
+  auto event = Open("name");
+  vlt::test::Signal go;
+  Child child([&] {
+    go.await();
+    event.reset();
+    return 0;
+  });
+  event.reset();
+  EXPECT_EQ(Names(), place.files());
+  event = Open("name", kManual, kSet);  // the next life of the name
+  go.notify();
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ((Names{"name", "sem_1"}), place.files());
+  EXPECT_FALSE(FileIsFree(place.file("name")));
+  EXPECT_TRUE(event->checkOnly());
+}
+
+TEST(NamedEventFork, ProgramStartedByExecHoldsNothing) {
+  EventPlace place;
+  int feed[2], started[2];
+  ASSERT_EQ(0, pipe2(feed, O_CLOEXEC));
+  ASSERT_EQ(0, pipe2(started, O_CLOEXEC));
+  Child holder([&] {
+    auto event = Open("name");
+    if (fork() == 0) {
+      dup2(feed[0], 0);
+      dup2(started[1], 1);
+      execlp("cat", "cat", static_cast<char*>(nullptr));
+      _exit(1);
+    }
+    for (;;) pause();
+    return 0;
+  });
+  ::close(feed[0]);
+  ::close(started[1]);
+  char byte;
+  ASSERT_EQ(1, write(feed[1], "x", 1));
+  ASSERT_EQ(1, read(started[0], &byte, 1));
+  holder.kill(SIGKILL);
+  holder.wait();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  EXPECT_TRUE(FileIsFree(place.file("sem_1")));
+  ::close(feed[1]);
+  EXPECT_EQ(0, read(started[0], &byte, 1));
+  ::close(started[0]);
+}
+
+// A thread is in the middle of an opening, with the event's file locked for itself alone, when
+// another thread forks; then the process is killed, while the child lives on.
+TEST(NamedEventFork, OpeningCutOffByForkAndKillBlocksNobody) {
+  EventPlace place;
+  Mutex stateFiles{String(kStateFileMutex)};
+  vlt::test::Signal forked, end;
+  stateFiles.lock();
+  Child parent([&] {
+    std::thread opener([] { Open("name"); });
+    while (!Exists(place.file("name")) || FileIsFree(place.file("name"))) usleep(1000);
+    if (fork() == 0) {
+      forked.notify();
+      end.await();
+      _exit(0);
+    }
+    opener.join();
+    return 0;
+  });
+  ASSERT_TRUE(forked.await());
+  parent.kill(SIGKILL);
+  parent.wait();
+  EXPECT_TRUE(FileIsFree(place.file("name")));
+  stateFiles.unlock();
+  Child next([] { return Open("name", kManual, kSet)->check() ? 0 : 1; });
+  EXPECT_EQ(0, next.wait());
+  EXPECT_EQ(Names(), place.files());
+  end.notify();
+}
+
+TEST(NamedEventFork, ForkWhileAnotherThreadIsInsideLeavesAUsableChild) {
+  EventPlace place;
+  auto event = Open("name");
+  Mutex stateFiles{String(kStateFileMutex)};
+  stateFiles.lock();  // by another object, so openings wait inside the section
+  std::thread opener([] { Open("other"); });
+  ASSERT_TRUE(Eventually([&] { return Exists(place.file("other")); }));
+  Child child([&] {
+    event->set();
+    event.reset();  // does not enter the parent's section
+    auto mine = Open("mine");
+    return mine->check() ? 1 : 0;
+  });
+  std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  stateFiles.unlock();
+  opener.join();
+  EXPECT_EQ(0, child.wait());
+  EXPECT_TRUE(event->checkOnly());
+}
+
+TEST(NamedEventFork, ForksDuringHeavyUseLeaveUsableChildren) {
+  EventPlace place;
+  auto shared = Open("shared", kManual, kSet);
+  std::atomic<bool> stop{false};
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 2; ++t) {
+    threads.emplace_back([&, t] {
+      while (!stop) Open("own" + std::to_string(t))->set();
+    });
+  }
+  for (int i = 0; i < 20; ++i) {
+    Child child([&] {
+      if (!shared->check()) return 1;
+      shared.reset();
+      auto mine = Open("own0"), other = Open("other");
+      other->set();
+      return other->check() ? 0 : 2;
+    });
+    EXPECT_EQ(0, child.wait()) << i;
+  }
+  stop = true;
+  for (auto& thread : threads) thread.join();
+  shared.reset();
+  // What a child that ended without closing has left.
+  Open("own0");
+  Open("other");
+  EXPECT_EQ(Names(), place.files());
+}
+
+TEST(NamedEventFork, ThreadsOfAChildDestroyInheritedObjectsAtOnce) {
+  EventPlace place;
+  std::vector<std::unique_ptr<NamedEvent>> events;
+  for (int i = 0; i < 64; ++i) events.push_back(Open("e" + std::to_string(i % 8)));
+  Child child([&] {
+    std::vector<std::thread> threads;
+    for (int t = 0; t < 4; ++t) {
+      threads.emplace_back([&, t] {
+        for (int i = t; i < 64; i += 4) events[static_cast<std::size_t>(i)].reset();
+      });
+    }
+    for (auto& thread : threads) thread.join();
+    return 0;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(9u, place.files().size());
+  events.clear();
+  EXPECT_EQ(Names(), place.files());
+}
+
+TEST(NamedEventFork, GrandchildStartsFreshToo) {
+  EventPlace place;
+  auto event = Open("name", kManual, kSet);
+  Child child([&] {
+    auto mine = Open("name");
+    Child grandchild([&] {
+      event.reset();
+      mine.reset();
+      return Open("name")->checkOnly() ? 0 : 1;
+    });
+    return grandchild.wait();
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_TRUE(event->checkOnly());
+  event.reset();
+  Open("name");
+  EXPECT_EQ(Names(), place.files());
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep

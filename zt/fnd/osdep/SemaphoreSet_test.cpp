@@ -1,0 +1,182 @@
+#include "zt/fnd/osdep/SemaphoreSet.h"
+
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "tests/support/EventPlace.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
+
+namespace zt::fnd::osdep {
+namespace {
+
+using vlt::test::EventPlace;
+using vlt::test::OpenDescriptors;
+using vlt::test::ReadBytes;
+using vlt::test::WriteBytes;
+typedef std::vector<std::string> Names;
+typedef SemaphoreSet::Room Room;
+
+struct Set {
+  EventPlace place;
+  RefPtr<NamedEventGlobalStatics> statics = NamedEventGlobalStatics::Get();
+  CriticalSectionGuard guard{statics->section};
+  RefPtr<SemaphoreSet> set = statics->getOrCreateSemaphoreSet(1);
+  std::string path = place.file("sem_1");
+
+  void patch(std::size_t at, std::uint32_t value) const {
+    std::string bytes = ReadBytes(path);
+    std::memcpy(&bytes.at(at), &value, sizeof value);
+    FILE* file = fopen(path.c_str(), "r+b");
+    ASSERT_NE(nullptr, file);
+    EXPECT_EQ(bytes.size(), fwrite(bytes.data(), 1, bytes.size(), file));
+    fclose(file);
+  }
+};
+
+TEST(NamedEventSet, IsBuiltReadyAndAllFree) {
+  Set s;
+  ASSERT_TRUE(s.set->usable());
+  bool ready = false;
+  unsigned count = 0, freeCount = 0, firstFree = 9;
+  EXPECT_TRUE(s.set->readHeader(ready, count, freeCount, firstFree));
+  EXPECT_TRUE(ready);
+  EXPECT_EQ(128u, count);
+  EXPECT_EQ(128u, freeCount);
+  EXPECT_EQ(0u, firstFree);
+  EXPECT_EQ(s.set->id(), s.place.setOf(1));
+  EXPECT_EQ(1u, s.set->number());
+  EXPECT_FALSE(s.set->busy());
+}
+
+TEST(NamedEventSet, ReadHeaderDoesNotAskForReady) {
+  Set s;
+  s.patch(4, 0);  // reserved, ready, and the low half of the count
+  s.patch(6, 128);
+  bool ready = true;
+  unsigned count, freeCount, firstFree;
+  EXPECT_TRUE(s.set->readHeader(ready, count, freeCount, firstFree));
+  EXPECT_FALSE(ready);
+  EXPECT_EQ(128u, count);
+}
+
+TEST(NamedEventSet, BadHeaderClearsAllOutputs) {
+  Set s;
+  s.patch(0, 0x15E35E30);
+  bool ready = true;
+  unsigned count = 7, freeCount = 7, firstFree = 7;
+  EXPECT_FALSE(s.set->readHeader(ready, count, freeCount, firstFree));
+  EXPECT_FALSE(ready);
+  EXPECT_EQ(0u, count + freeCount + firstFree);
+  ASSERT_EQ(0, truncate(s.path.c_str(), 17));
+  ready = true;
+  count = freeCount = firstFree = 7;
+  EXPECT_FALSE(s.set->readHeader(ready, count, freeCount, firstFree));
+  EXPECT_FALSE(ready);
+  EXPECT_EQ(0u, count + freeCount + firstFree);
+}
+
+TEST(NamedEventSet, UpdateChangesCountAndFirstFreeAlone) {
+  Set s;
+  std::string before = ReadBytes(s.path);
+  unsigned old = 99;
+  EXPECT_TRUE(s.set->updateFreeRecords(-1, 0x01020304, old));
+  EXPECT_EQ(0u, old);
+  std::string after = ReadBytes(s.path);
+  EXPECT_EQ(before.substr(0, 10), after.substr(0, 10));
+  EXPECT_EQ(std::string("\x7F\0\0\0\4\3\2\1", 8), after.substr(10, 8));
+  EXPECT_EQ(before.substr(18), after.substr(18));
+  EXPECT_TRUE(s.set->updateFreeRecords(+1, kNoSlot, old));
+  EXPECT_EQ(0x01020304u, old);
+  EXPECT_EQ(std::string("\x80\0\0\0\xFF\xFF\xFF\xFF", 8), ReadBytes(s.path).substr(10, 8));
+}
+
+TEST(NamedEventSet, UpdateOfAShortFileFails) {
+  Set s;
+  unsigned old;
+  ASSERT_EQ(0, truncate(s.path.c_str(), 17));
+  EXPECT_FALSE(s.set->updateFreeRecords(-1, 1, old));
+  EXPECT_EQ(17u, ReadBytes(s.path).size());
+}
+
+TEST(NamedEventSet, TakeAndGiveBackAreEachOthersReverse) {
+  Set s;
+  const std::string before = ReadBytes(s.path);
+  for (int round = 0; round < 2; ++round) {
+    for (unsigned expected = 0; expected < 128; ++expected) {
+      unsigned slot = 999;
+      ASSERT_EQ(Room::Some, s.set->firstFree(slot));
+      ASSERT_EQ(expected, slot);
+      ASSERT_TRUE(s.set->take(slot, true, 0x01000000 + static_cast<int>(slot)));
+    }
+    unsigned slot;
+    EXPECT_EQ(Room::None, s.set->firstFree(slot));
+    for (unsigned i = 128; i-- > 0;) s.set->giveBack(i, 0x01000000 + static_cast<int>(i));
+    EXPECT_EQ(before, ReadBytes(s.path));
+  }
+}
+
+TEST(NamedEventSet, GiveBackOfAnothersSlotDoesNothing) {
+  Set s;
+  ASSERT_TRUE(s.set->take(0, false, 42));
+  std::string before = ReadBytes(s.path);
+  s.set->giveBack(0, 43);
+  s.set->giveBack(1, 42);
+  s.set->giveBack(128, 42);
+  s.set->giveBack(0xFFFFFFFFu, 42);
+  EXPECT_EQ(before, ReadBytes(s.path));
+}
+
+TEST(NamedEventSet, SlotsOutsideTheFileAreNotRead) {
+  Set s;
+  SlotRecord record;
+  EXPECT_TRUE(s.set->readSlot(127, record));
+  EXPECT_FALSE(s.set->readSlot(128, record));
+  EXPECT_FALSE(s.set->readSlot(0xFFFFFFFFu, record));
+  s.patch(6, 0xFFFFFFFFu);
+  EXPECT_FALSE(s.set->readSlot(128, record));
+  EXPECT_FALSE(s.set->readSlot(0xFFFFFFF0u, record));
+  s.patch(6, 2);
+  EXPECT_TRUE(s.set->readSlot(1, record));
+  EXPECT_FALSE(s.set->readSlot(2, record));
+}
+
+TEST(NamedEventSet, OneObjectANumberInAProcess) {
+  Set s;
+  RefPtr<SemaphoreSet> again = s.statics->getOrCreateSemaphoreSet(1);
+  EXPECT_EQ(s.set.get(), again.get());
+  RefPtr<SemaphoreSet> other = s.statics->getOrCreateSemaphoreSet(2);
+  EXPECT_NE(s.set.get(), other.get());
+  EXPECT_NE(s.set->id(), other->id());
+  other = nullptr;
+  EXPECT_EQ(Names{"sem_1"}, s.place.files());
+  again = nullptr;
+  EXPECT_EQ(Names{"sem_1"}, s.place.files());
+  s.set = nullptr;
+  EXPECT_EQ(Names(), s.place.files());
+}
+
+TEST(NamedEventSet, UnusableSetStaysInTheMapWhileItIsHeld) {
+  EventPlace place;
+  RefPtr<NamedEventGlobalStatics> statics = NamedEventGlobalStatics::Get();
+  CriticalSectionGuard guard(statics->section);
+  statics->getOrCreateSemaphoreSet(1);  // makes the directory
+  ASSERT_EQ(0, mkdir(place.file("sem_1").c_str(), 0777));
+  int descriptors = OpenDescriptors();
+  RefPtr<SemaphoreSet> set = statics->getOrCreateSemaphoreSet(1);
+  EXPECT_FALSE(set->usable());
+  EXPECT_EQ(-1, set->id());
+  EXPECT_EQ(descriptors, OpenDescriptors());
+  ASSERT_EQ(0, rmdir(place.file("sem_1").c_str()));
+  EXPECT_EQ(set.get(), statics->getOrCreateSemaphoreSet(1).get());
+  set = nullptr;
+  EXPECT_TRUE(statics->getOrCreateSemaphoreSet(1)->usable());
+}
+
+}  // namespace
+}  // namespace zt::fnd::osdep
