@@ -6,6 +6,36 @@
 #include <memory>
 
 namespace vltctl {
+
+namespace {
+
+template <class T>
+using Text = std::unique_ptr<T, decltype(&vltFree)>;
+
+}  // namespace
+
+std::string NarrowText(const wchar_t* text) {
+  if (!text) return "";
+  size_t size = wcstombs(nullptr, text, 0);
+  if (size != static_cast<size_t>(-1)) {
+    std::string out(size, '\0');
+    wcstombs(out.data(), text, size);
+    return out;
+  }
+  std::string out;  // The locale lacks a character: show what it has.
+  for (; *text; ++text) out += *text > 0 && *text < 0x80 ? static_cast<char>(*text) : '?';
+  return out;
+}
+
+std::string GuidText(GUID guid) {
+  Text<wchar_t> text(vltGuidToString(guid), &vltFree);
+  return NarrowText(text.get());
+}
+
+GUID ParseGuid(const std::string& text) {
+  return vltGuidFromString(std::wstring(text.begin(), text.end()).c_str());
+}
+
 namespace {
 
 template <class T>
@@ -14,9 +44,6 @@ struct ReleaseInterface {
 };
 template <class T>
 using Held = std::unique_ptr<T, ReleaseInterface<T>>;
-
-template <class T>
-using Text = std::unique_ptr<T, decltype(&vltFree)>;
 
 struct TypeName {
   _vltComponentType type;
@@ -34,28 +61,6 @@ const char* NameOf(_vltComponentType type) {
   return "unknown";
 }
 
-std::string Narrow(const wchar_t* text) {
-  if (!text) return "";
-  size_t size = wcstombs(nullptr, text, 0);
-  if (size != static_cast<size_t>(-1)) {
-    std::string out(size, '\0');
-    wcstombs(out.data(), text, size);
-    return out;
-  }
-  std::string out;  // The locale lacks a character: show what it has.
-  for (; *text; ++text) out += *text > 0 && *text < 0x80 ? static_cast<char>(*text) : '?';
-  return out;
-}
-
-std::wstring Widen(const std::string& text) { return std::wstring(text.begin(), text.end()); }
-
-GUID Parse(const std::string& guid) { return vltGuidFromString(Widen(guid).c_str()); }
-
-std::string GuidText(GUID guid) {
-  Text<wchar_t> text(vltGuidToString(guid), &vltFree);
-  return Narrow(text.get());
-}
-
 // A record filled by the registrar; ends its texts.
 struct Record {
   _vltComponent2 value;
@@ -68,17 +73,17 @@ struct Record {
 Component Describe(const _vltComponent2& r) {
   Component c;
   c.type = NameOf(r.type);
-  c.name = Narrow(r.name);
+  c.name = NarrowText(r.name);
   c.guid = GuidText(r.identifier);
-  c.file = Narrow(r.fileName);
+  c.file = NarrowText(r.fileName);
   c.recordVersion = r.version;
   if (r.type == vltComponentDataDictionary) {
     c.schemaVersion = r.dictionary.schemaVersion;
     c.fragmentRegistered = r.dictionary.fragmentRegistered;
     c.lastInstalledSchemaVersion = r.dictionary.lastInstalledSchemaVersion;
-    c.prefix = Narrow(r.dictionary.prefix);
+    c.prefix = NarrowText(r.dictionary.prefix);
   } else if (r.type == vltComponentResourceExpert) {
-    c.pnp = Narrow(r.resource.pnp);
+    c.pnp = NarrowText(r.resource.pnp);
   }
   return c;
 }
@@ -117,7 +122,7 @@ std::vector<Component> Client::list() const {
 
 std::optional<Component> Client::find(const std::string& guid) const {
   Record record;
-  if (m_registrar->GetComponent(Parse(guid), &record.value) < 0) {
+  if (m_registrar->GetComponent(ParseGuid(guid), &record.value) < 0) {
     memset(&record.value, 0, sizeof record.value);
     return std::nullopt;
   }
@@ -132,7 +137,7 @@ std::vector<Component> Client::classes(const std::string& guid) const {
   for (auto type : {vltComponentObjectExpert, vltComponentResourceExpert}) {
     unsigned count = 0;
     GUID* found = nullptr;
-    if (dynamic->GetComponentsForBindingClass(type, Parse(guid), &count, &found) < 0) continue;
+    if (dynamic->GetComponentsForBindingClass(type, ParseGuid(guid), &count, &found) < 0) continue;
     Text<GUID> array(found, &vltFree);
     for (unsigned i = 0; i < count; ++i) {
       if (auto component = find(GuidText(found[i]))) components.push_back(*component);
@@ -145,7 +150,7 @@ bool IsGuid(const std::string& text) {
   // The library reads bad text as the null GUID, so the null GUID itself is the one to be told apart.
   std::string bare = text.size() == 38 ? text.substr(1, 36) : text;
   if (bare == "00000000-0000-0000-0000-000000000000") return true;
-  return bare.size() == 36 && GuidText(Parse(text)) != GuidText(GUID_NULL);
+  return bare.size() == 36 && GuidText(ParseGuid(text)) != GuidText(GUID_NULL);
 }
 
 }  // namespace vltctl

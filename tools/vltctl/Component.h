@@ -45,6 +45,11 @@ class Client {
   std::chrono::microseconds m_timeToReady{};
 };
 
+// In the process's locale; null is empty.
+std::string NarrowText(const wchar_t* text);
+std::string GuidText(GUID guid);
+GUID ParseGuid(const std::string& text);
+
 // True for the text form of a GUID, with or without braces.
 bool IsGuid(const std::string& text);
 

@@ -1,11 +1,15 @@
 // vltctl: shows what the registrar of this machine knows.
 #include <locale.h>
 #include <stdio.h>
+#include <stdlib.h>
+#include <unistd.h>
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
+#include <filesystem>
 #include <nlohmann/json.hpp>
 
+#include "tools/vltctl/Check.h"
 #include "tools/vltctl/Component.h"
 #include "zt/fnd/Exception.h"
 
@@ -118,6 +122,84 @@ int Classes(const std::string& guid, bool asJson) {
   return kGood;
 }
 
+json ToJson(const vltctl::Finding& finding) {
+  json out = ToJson(finding.component);
+  out["sound"] = finding.sound;
+  out["messages"] = finding.messages;
+  out["notes"] = finding.notes;
+  return out;
+}
+
+int Check(const std::string& guid, bool asJson) {
+  Client client;
+  auto findings = vltctl::CheckComponents(
+      client, guid.empty() ? std::nullopt : std::optional<std::string>(guid));
+  if (findings.empty()) {
+    fprintf(stderr, "vltctl: no component %s\n", guid.c_str());
+    return kNotFound;
+  }
+  bool sound = true;
+  json all = json::array();
+  for (const vltctl::Finding& finding : findings) {
+    sound = sound && finding.sound;
+    all.push_back(ToJson(finding));
+    if (asJson) continue;
+    printf("%s %s: %s\n", finding.component.type.c_str(), finding.component.name.c_str(),
+           finding.sound ? "sound" : "NOT SOUND");
+    for (const std::string& message : finding.messages) printf("  %s\n", message.c_str());
+    for (const std::string& note : finding.notes) printf("    %s\n", note.c_str());
+  }
+  if (asJson) Print(all);
+  return sound ? kGood : kDataUnusable;
+}
+
+int Url(bool asJson) {
+  wchar_t* url = nullptr;
+  HRESULT result = vltGetLocalConfigurationURL(&url);
+  std::string text = vltctl::NarrowText(url);
+  vltFree(url);
+  if (asJson) {
+    Print({{"url", text}});
+  } else {
+    printf("%s\n", text.c_str());
+  }
+  return result < 0 ? kDataUnusable : kGood;
+}
+
+int Identity(bool asJson) {
+  GUID identity = {};
+  if (vltGetServerIdentity(&identity) < 0) {
+    fprintf(stderr, "vltctl: no identity can be had\n");
+    return kDataUnusable;
+  }
+  std::string text = vltctl::GuidText(identity);
+  if (asJson) {
+    Print({{"identity", text}});
+  } else {
+    printf("%s\n", text.c_str());
+  }
+  return kGood;
+}
+
+// The commands that read the system's files themselves are a program of their own: it stands beside
+// this one, or, once installed, among the programs that only other programs start.
+[[noreturn]] void RunAdmin(char** argv) {
+  std::filesystem::path here = std::filesystem::read_symlink("/proc/self/exe").parent_path();
+  for (const char* place : {"vltctl-admin", "../libexec/vltutils/vltctl-admin"}) {
+    std::string program = here / place;
+    if (access(program.c_str(), X_OK) == 0) execv(program.c_str(), argv);
+  }
+  fprintf(stderr, "vltctl: vltctl-admin is not installed\n");
+  exit(kDataUnusable);
+}
+
+bool IsAdminCommand(const std::string& word) {
+  for (const char* name : {"settings", "jar", "verify", "hook", "trace", "events"}) {
+    if (word == name) return true;
+  }
+  return false;
+}
+
 struct Arguments {
   bool json = false;
   std::string guid;
@@ -133,9 +215,11 @@ int Run(int argc, char** argv) {
   CLI::App app("Shows what the component registrar of this machine knows.", "vltctl");
   app.set_version_flag("--version", VLTCTL_VERSION);
   app.require_subcommand(1);
-  CLI::Validator guid([](const std::string& text) {
-    return vltctl::IsGuid(text) ? std::string() : "not a GUID: " + text;
-  }, "GUID");
+  CLI::Validator guid(
+      [](const std::string& text) {
+        return vltctl::IsGuid(text) ? std::string() : "not a GUID: " + text;
+      },
+      "GUID");
   auto command = [&](const char* name, const char* description) {
     CLI::App* sub = app.add_subcommand(name, description);
     sub->add_flag("--json", arguments.json, "Print JSON");
@@ -148,6 +232,17 @@ int Run(int argc, char** argv) {
       ->check(guid);
   CLI::App* classes = command("classes", "The experts that bind to a class of objects");
   classes->add_option("guid", arguments.guid, "Identifier of the class")->required()->check(guid);
+  CLI::App* check = command("check", "Do the components' files and entry points stand?");
+  check->add_option("guid", arguments.guid, "One component; all without")->check(guid);
+  CLI::App* url = command("url", "Where the local server listens");
+  CLI::App* identity = command("identity", "Identity of this machine's server");
+  // Listed here, run by the other program.
+  command("settings", "Each setting and where it comes from");
+  command("jar", "What server and clients have left each other");
+  command("verify", "A guarded file and its sidecar");
+  command("hook", "Fault injection: list, arm, clear");
+  command("trace", "Where the log of this user goes");
+  command("events", "Named events and who holds them");
   app.footer("Exit codes: 0 good, 1 not found, 2 usage, 3 the installation's data cannot be used.");
   try {
     app.parse(argc, argv);
@@ -155,6 +250,9 @@ int Run(int argc, char** argv) {
     return ExitOf(app, error);  // Prints the help or what is wrong with the arguments.
   }
   if (list->parsed()) return List(arguments.json);
+  if (check->parsed()) return Check(arguments.guid, arguments.json);
+  if (url->parsed()) return Url(arguments.json);
+  if (identity->parsed()) return Identity(arguments.json);
   if (show->parsed()) return Show(arguments.guid, arguments.json);
   return Classes(arguments.guid, arguments.json);
 }
@@ -163,6 +261,7 @@ int Run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
   setlocale(LC_ALL, "");
+  if (argc > 1 && IsAdminCommand(argv[1])) RunAdmin(argv);
   try {
     return Run(argc, argv);
   } catch (const zt::fnd::exception::Exception& error) {

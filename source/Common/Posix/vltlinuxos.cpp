@@ -1,5 +1,6 @@
 #include "source/Common/Posix/vltlinuxos.h"
 
+#include <fcntl.h>
 #include <pthread.h>
 #include <stdarg.h>
 #include <stdio.h>
@@ -11,12 +12,15 @@
 
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/Retry.h"
+#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/path.h"
 #include "ztini/ztini.h"
 
-using zt::fnd::osdep::path;
 using zt::fnd::AnsiString;
 using zt::fnd::String;
+using zt::fnd::osdep::path;
+using zt::fnd::osdep::ScopedFd;
 
 void vltEarlyTrace(const char* sourceName, long line, const char* format, ...) {
   char message[2048];
@@ -35,7 +39,11 @@ constexpr unsigned kFlagsUnread = 0xFFFFFFFF;
 
 unsigned ReadTraceFlags() {
   std::string file = vlLookUpInstallDirectory() + "/vlttrace.txt";
-  std::unique_ptr<FILE, int (*)(FILE*)> in(fopen(file.c_str(), "re"), fclose);
+  // Not fopen, which would wait for the other end of a pipe in the file's place.
+  ScopedFd fd(zt::fnd::osdep::RetryEintr(
+      [&] { return open(file.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY); }));
+  std::unique_ptr<FILE, int (*)(FILE*)> in(fd.valid() ? fdopen(fd.get(), "r") : nullptr, fclose);
+  if (in) fd.release();
   unsigned first = 0, second = 0;
   // A short file leaves its zeros.
   if (in && fscanf(in.get(), "%u %u", &first, &second) < 0) return 0;
@@ -52,10 +60,13 @@ unsigned vltGetTraceFlagsImpl() {
   return known;
 }
 
-String vlCreateLogDirIfNeeded(AnsiString& diagnosticsIni) {
+String vlDiagnosticsIni() {
   // The fixed place on purpose: logging starts before anybody has said where the installation is.
   String data = path::Join(String(kKorDefaultDirectory), String(L"Data"));
-  diagnosticsIni = AnsiString(path::Join(data, String(L"vldiag.ini")));
+  return path::Join(data, String(L"vldiag.ini"));
+}
+
+String vlLogDirectory() {
   const char* home = getenv("HOME");
   String root(L"/tmp/zentrex");
   if (geteuid() == 0) {
@@ -65,6 +76,12 @@ String vlCreateLogDirIfNeeded(AnsiString& diagnosticsIni) {
   }
   String directory = path::Join(root, String(L"KOR"));
   path::MakePathEndInSlash(directory);
+  return directory;
+}
+
+String vlCreateLogDirIfNeeded(AnsiString& diagnosticsIni) {
+  diagnosticsIni = AnsiString(vlDiagnosticsIni());
+  String directory = vlLogDirectory();
   try {
     if (!path::IsDirectory(directory.c_str())) path::CreateDir(directory.c_str(), 0777);
   } catch (const zt::fnd::exception::Exception&) {

@@ -53,9 +53,13 @@ class vltStringResources {
 HRESULT vltGetStringResourceImpl(const char* separator, const wchar_t* file, const wchar_t* key,
                                  char** out, unsigned maxLength);
 
-// The directory of the logs, ending in a slash, made with mode 0777 if it was missing: below
-// "/Library/Logs" for the superuser, "$HOME/Library/Logs" for others, "/tmp/zentrex" without HOME.
-// Failures to make it are dropped. Sets the path of "vldiag.ini".
+// Where the logs of this user go, ending in a slash: below "/Library/Logs" for the superuser,
+// "$HOME/Library/Logs" for others, "/tmp/zentrex" without HOME. And the file with their options.
+zt::fnd::String vlLogDirectory();
+zt::fnd::String vlDiagnosticsIni();
+
+// vlLogDirectory, made with mode 0777 if it was missing; failures to make it are dropped. Sets the path of
+// "vldiag.ini".
 zt::fnd::String vlCreateLogDirIfNeeded(zt::fnd::AnsiString& diagnosticsIni);
 
 // Reads "Severity" (default 1), "Target" (1) and, for a non-null threshold, "LowDiskThreshold" (0)

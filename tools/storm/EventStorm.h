@@ -1,0 +1,20 @@
+#pragma once
+
+namespace storm {
+
+struct EventStormSize {
+  unsigned processes = 8;
+  unsigned rounds = 20000;  // of each process
+  unsigned names = 300;
+  unsigned kills = 2000;
+  unsigned seed = 1;
+  bool machineSemaphores = false;  // otherwise a name space of the storm's own, where allowed
+};
+
+// Processes open, set, wait and close events of common names while some of them are killed at random
+// moments; killed ones are replaced. Two more, which nobody kills, play ping-pong all the time.
+// Prints what was seen. True if no wake-up was lost, no name was split over two semaphores, nothing
+// ran out of time or failed, and nothing was left at the end.
+bool RunEventStorm(const EventStormSize& size);
+
+}  // namespace storm

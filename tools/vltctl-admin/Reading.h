@@ -1,0 +1,67 @@
+#pragma once
+
+#include <nlohmann/json.hpp>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "ztini/ztini.h"
+
+// Reading shared files as an onlooker: without a lock, and without making or changing anything.
+namespace admin {
+
+// A file and its sidecar as they stood together at one moment.
+struct GuardedBytes {
+  enum class State { Missing, Unreadable, Read };
+  State state = State::Missing;
+  std::string error;  // why it is unreadable
+  std::string bytes;
+  std::optional<std::string> sidecar;
+};
+
+// Reads file and sidecar again while somebody writes them in between.
+GuardedBytes ReadGuarded(const std::string& file);
+
+// A document read from bytes, and its status (ztini.h).
+class Document {
+ public:
+  explicit Document(const std::string& bytes);
+  ~Document() { IniDispose(m_document); }
+  Document(const Document&) = delete;
+  Document& operator=(const Document&) = delete;
+
+  int32_t status() const { return m_status; }
+  std::optional<std::string> get(const std::string& section, const std::string& item) const;
+  std::vector<std::string> sections() const;
+  std::vector<std::pair<std::string, std::string>> items(const std::string& section) const;
+  IniStructForwardReferenceTag* handle() const { return m_document; }
+
+ private:
+  IniStructForwardReferenceTag* m_document;
+  int32_t m_status;
+};
+
+// <install>/Data/NAME.
+std::string DataFile(const std::string& name);
+
+// Prints rows of one width, or the JSON of them.
+struct Row {
+  std::string name, value, origin;
+};
+void Print(const std::vector<Row>& rows, bool json);
+void PrintJson(const nlohmann::json& value);
+
+enum ExitCode { kGood = 0, kNotFound = 1, kUsage = 2, kDataUnusable = 3 };
+
+// ---- The commands.
+int Settings(unsigned index, bool client, bool server, const std::string& name, bool json);
+int Jar(bool json);
+int Verify(const std::string& file, bool json);
+int Trace(bool json);
+int Events(bool json);
+int HookList(bool json);
+int HookArm(const std::string& name, const std::vector<std::string>& flags);
+int HookClear();
+
+}  // namespace admin

@@ -1,0 +1,78 @@
+// The commands of vltctl that read and write the system's files themselves; vltctl starts this program.
+#include <locale.h>
+#include <stdio.h>
+
+#include <CLI/CLI.hpp>
+
+#include "tools/vltctl-admin/Reading.h"
+
+namespace {
+
+struct Arguments {
+  bool json = false, client = false, server = false;
+  unsigned index = 3;
+  std::string name, file;
+  std::vector<std::string> flags;
+};
+
+int Run(int argc, char** argv) {
+  Arguments a;
+  int result = admin::kUsage;
+  CLI::App app("Files of the storage's rendezvous and diagnostics.", "vltctl");
+  app.require_subcommand(1);
+  auto command = [&](CLI::App& parent, const char* name, const char* text, auto run) {
+    CLI::App* sub = parent.add_subcommand(name, text);
+    sub->callback([&result, run] { result = run(); });
+    return sub;
+  };
+  auto json = [&](CLI::App* sub) { sub->add_flag("--json", a.json, "Print JSON"); };
+
+  CLI::App* settings = command(app, "settings", "Each setting and where it comes from", [&] {
+    return admin::Settings(a.index, a.client, a.server, a.name, a.json);
+  });
+  settings->add_option("--index", a.index, "Number behind the names of the items")
+      ->capture_default_str();
+  settings->add_flag("--client", a.client, "What a client reads");
+  settings->add_flag("--server", a.server, "What the server reads");
+  settings->add_option("--name", a.name, "NAME.ini instead of kor.ini");
+  json(settings);
+  json(command(app, "jar", "What stands in the jar", [&] { return admin::Jar(a.json); }));
+  CLI::App* verify = command(app, "verify", "A guarded file and its sidecar",
+                             [&] { return admin::Verify(a.file, a.json); });
+  verify->add_option("file", a.file, "The INI file")->required();
+  json(verify);
+  json(command(app, "trace", "Where the log of this user goes",
+               [&] { return admin::Trace(a.json); }));
+  json(command(app, "events", "Named events and who holds them",
+               [&] { return admin::Events(a.json); }));
+
+  CLI::App* hook = app.add_subcommand("hook", "Fault injection");
+  hook->require_subcommand(1);
+  json(command(*hook, "list", "The points", [&] { return admin::HookList(a.json); }));
+  CLI::App* arm = command(*hook, "arm", "Arms one point for processes that refresh their hooks",
+                          [&] { return admin::HookArm(a.name, a.flags); });
+  arm->add_option("name", a.name, "The point")->required();
+  arm->add_option("flags", a.flags, "hang[=MS], crash, fail, throw, exhaust")->required();
+  command(*hook, "clear", "Disarms", [&] { return admin::HookClear(); });
+
+  try {
+    app.parse(argc, argv);
+  } catch (const CLI::ParseError& error) {
+    return app.exit(error) == 0 ? admin::kGood : admin::kUsage;  // Prints help, or what is wrong.
+  }
+  return result;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  setlocale(LC_ALL, "");
+  try {
+    return Run(argc, argv);
+  } catch (const std::exception& error) {
+    fprintf(stderr, "vltctl: %s\n", error.what());
+  } catch (int) {
+    fprintf(stderr, "vltctl: the file cannot be opened\n");
+  }
+  return admin::kDataUnusable;
+}
