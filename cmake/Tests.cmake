@@ -48,6 +48,11 @@ vlt_tests(vlcore_tests LABELS unit LINKS ${inside}
 if(TARGET vltutils)
   vlt_tests(e2e_tests LABELS e2e TIMEOUT 300 GLOBS tests/e2e/*_test.cpp LINKS vltutils)
   if(TARGET e2e_tests)
+    find_package(nlohmann_json REQUIRED)
+    target_link_libraries(e2e_tests PRIVATE nlohmann_json::nlohmann_json)
+    if(TARGET vltctl)
+      add_dependencies(e2e_tests vltctl)
+    endif()
     target_compile_definitions(e2e_tests PRIVATE
       VLT_TEST_LIBRARY="$<TARGET_FILE:vltutils>" VLT_TEST_BIN="${CMAKE_BINARY_DIR}/bin"
       VLT_TEST_SOURCE="${CMAKE_SOURCE_DIR}")

@@ -38,7 +38,8 @@ class Supervisor {
   bool run() {
     const auto begin = Clock::now();
     pid_t ping = Spawn([this] { return PingSide(m_state); });
-    while (m_place.countEventFiles() < 3) SleepUs(1000);  // both events and their set
+    // Both events and their set.
+    while (m_place.countEventFiles() < 3 && Clock::now() - begin < kStall) SleepUs(1000);
     pid_t pong = Spawn([this] { return PongSide(m_state); });
     for (unsigned i = 0; i < m_size.processes; ++i) start(i);
     while (m_running > 0) step();

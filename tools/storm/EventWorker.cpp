@@ -138,6 +138,7 @@ int PingSide(StormState& state) {
   }
   state.lastPing = true;
   ping.set();
+  pong.wait();  // not earlier may the events go
   return 0;
 }
 
@@ -145,8 +146,9 @@ int PongSide(StormState& state) {
   for (;;) {
     NamedEvent ping(String(L"ping"), kAutomatic, kClear);
     ping.wait();
-    if (state.lastPing) return 0;
+    bool last = state.lastPing;
     NamedEvent(String(L"pong"), kAutomatic, kClear).set();
+    if (last) return 0;
   }
 }
 

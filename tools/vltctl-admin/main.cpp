@@ -1,12 +1,34 @@
-// The commands of vltctl that read and write the system's files themselves; vltctl starts this program.
+// vltctl: shows and tests an installation. The commands that are calls of the library are done by
+// vltctl-client, which this program becomes.
 #include <locale.h>
 #include <stdio.h>
+#include <stdlib.h>
+#include <unistd.h>
 
 #include <CLI/CLI.hpp>
+#include <filesystem>
 
 #include "tools/vltctl-admin/Reading.h"
 
 namespace {
+
+// It stands beside this program, or, once installed, among those that only other programs start.
+[[noreturn]] void BecomeClient(char** argv) {
+  std::filesystem::path here = std::filesystem::read_symlink("/proc/self/exe").parent_path();
+  for (const char* place : {"vltctl-client", "../libexec/vltutils/vltctl-client"}) {
+    std::string program = here / place;
+    if (access(program.c_str(), X_OK) == 0) execv(program.c_str(), argv);
+  }
+  fprintf(stderr, "vltctl: vltctl-client is not installed\n");
+  exit(admin::kDataUnusable);
+}
+
+bool IsOwnCommand(const std::string& word) {
+  for (const char* name : {"settings", "jar", "verify", "hook", "trace", "events"}) {
+    if (word == name) return true;
+  }
+  return false;
+}
 
 struct Arguments {
   bool json = false, client = false, server = false;
@@ -67,6 +89,7 @@ int Run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
   setlocale(LC_ALL, "");
+  if (argc < 2 || !IsOwnCommand(argv[1])) BecomeClient(argv);
   try {
     return Run(argc, argv);
   } catch (const std::exception& error) {

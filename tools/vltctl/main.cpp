@@ -1,12 +1,9 @@
-// vltctl: shows what the registrar of this machine knows.
+// The commands of vltctl that are calls of the library: what the registrar of this machine knows.
 #include <locale.h>
 #include <stdio.h>
-#include <stdlib.h>
-#include <unistd.h>
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
-#include <filesystem>
 #include <nlohmann/json.hpp>
 
 #include "tools/vltctl/Check.h"
@@ -181,25 +178,6 @@ int Identity(bool asJson) {
   return kGood;
 }
 
-// The commands that read the system's files themselves are a program of their own: it stands beside
-// this one, or, once installed, among the programs that only other programs start.
-[[noreturn]] void RunAdmin(char** argv) {
-  std::filesystem::path here = std::filesystem::read_symlink("/proc/self/exe").parent_path();
-  for (const char* place : {"vltctl-admin", "../libexec/vltutils/vltctl-admin"}) {
-    std::string program = here / place;
-    if (access(program.c_str(), X_OK) == 0) execv(program.c_str(), argv);
-  }
-  fprintf(stderr, "vltctl: vltctl-admin is not installed\n");
-  exit(kDataUnusable);
-}
-
-bool IsAdminCommand(const std::string& word) {
-  for (const char* name : {"settings", "jar", "verify", "hook", "trace", "events"}) {
-    if (word == name) return true;
-  }
-  return false;
-}
-
 struct Arguments {
   bool json = false;
   std::string guid;
@@ -236,7 +214,7 @@ int Run(int argc, char** argv) {
   check->add_option("guid", arguments.guid, "One component; all without")->check(guid);
   CLI::App* url = command("url", "Where the local server listens");
   CLI::App* identity = command("identity", "Identity of this machine's server");
-  // Listed here, run by the other program.
+  // Listed for the help; the command itself has done them before this program is asked.
   command("settings", "Each setting and where it comes from");
   command("jar", "What server and clients have left each other");
   command("verify", "A guarded file and its sidecar");
@@ -254,14 +232,14 @@ int Run(int argc, char** argv) {
   if (url->parsed()) return Url(arguments.json);
   if (identity->parsed()) return Identity(arguments.json);
   if (show->parsed()) return Show(arguments.guid, arguments.json);
-  return Classes(arguments.guid, arguments.json);
+  if (classes->parsed()) return Classes(arguments.guid, arguments.json);
+  return kUsage;
 }
 
 }  // namespace
 
 int main(int argc, char** argv) {
   setlocale(LC_ALL, "");
-  if (argc > 1 && IsAdminCommand(argv[1])) RunAdmin(argv);
   try {
     return Run(argc, argv);
   } catch (const zt::fnd::exception::Exception& error) {

@@ -1,0 +1,192 @@
+// The commands of vltctl that look at the system's files, and change nothing.
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <stdlib.h>
+#include <sys/file.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <filesystem>
+#include <nlohmann/json.hpp>
+#include <sstream>
+
+#include "tests/support/Child.h"
+#include "tests/support/Installation.h"
+
+namespace {
+
+using namespace vlt::test;
+using nlohmann::json;
+
+const std::string kVltctl = std::string(VLT_TEST_BIN) + "/vltctl";
+
+ProgramResult Vltctl(std::vector<std::string> arguments) {
+  arguments.insert(arguments.begin(), kVltctl);
+  return RunProgram(arguments);
+}
+
+json VltctlJson(std::vector<std::string> arguments) {
+  arguments.push_back("--json");
+  return json::parse(Vltctl(arguments).out);
+}
+
+class VltctlAdmin : public testing::Test {
+ protected:
+  VltctlAdmin() : data(installation.root() + "/Data") { std::filesystem::create_directory(data); }
+  std::string jar() const { return data + "/vltjar.ini"; }
+
+  Installation installation;
+  std::string data;
+};
+
+TEST_F(VltctlAdmin, SettingsTellTheirOrigin) {
+  WriteBytes(data + "/kor.ini", "[STORAGE]\nLocalServerEndpoint3=7\nNumCheckpoints=5\n");
+  json settings = VltctlJson({"settings"});
+  EXPECT_EQ(settings["LocalServerEndpoint3"]["value"], "7");
+  EXPECT_EQ(settings["LocalServerEndpoint3"]["origin"], data + "/kor.ini [STORAGE]");
+  EXPECT_EQ(settings["BootstrapEndpoint3"]["value"], "62602");
+  EXPECT_EQ(settings["BootstrapEndpoint3"]["origin"], "built-in default");
+  EXPECT_EQ(settings["NumCheckpoints"]["value"], "5");
+  EXPECT_EQ(settings["ClientObjectCacheLimit"]["value"], "150000");
+}
+
+TEST_F(VltctlAdmin, SettingsByIndexNameAndSide) {
+  WriteBytes(data + "/other.ini", "[STORAGE]\nLocalServerEndpoint4=9\n");
+  json client = VltctlJson({"settings", "--index", "4", "--name", "other", "--client"});
+  EXPECT_EQ(client["LocalServerEndpoint4"]["value"], "9");
+  EXPECT_EQ(client["BootstrapEndpoint4"]["origin"], "not set");
+  EXPECT_FALSE(client.contains("NumCheckpoints"));
+  EXPECT_FALSE(VltctlJson({"settings", "--server"}).contains("ClientObjectCacheLimit"));
+}
+
+TEST_F(VltctlAdmin, JarTellsItsSections) {
+  EXPECT_EQ(Vltctl({"jar"}).exitCode, 1);
+  WriteBytes(jar(), "[CookieSection]\nLastServerCookie=5\n[S]\nServerProcessID=77\n");
+  json sections = VltctlJson({"jar"});
+  EXPECT_EQ(sections["CookieSection"]["LastServerCookie"], "5");
+  EXPECT_EQ(sections["S"]["ServerProcessID"], "77");
+  EXPECT_NE(Vltctl({"jar"}).out.find("ServerProcessID"), std::string::npos);
+}
+
+TEST_F(VltctlAdmin, VerifyNamesTheRow) {
+  struct Case {
+    std::string bytes, sidecar, found;
+    int code;
+  };
+  const std::string good = "[a]\nb = 1\n";
+  TempDir dir;
+  WriteBytes(dir / "good", good);
+  std::string digest;
+  std::string hex = Md5Sum(dir / "good");
+  for (size_t i = 0; i < hex.size(); i += 2) {
+    digest += static_cast<char>(std::stoi(hex.substr(i, 2), nullptr, 16));
+  }
+  const Case cases[] = {
+      {good, "", "there is no sidecar", 0},
+      {good, digest, "the digest matches", 0},
+      {good, std::string(16, 'x'), "the digest differs", 0},
+      {good, std::string(16, '0'), "the sidecar is the mark of a first save under way", 0},
+      {good, "short", "the sidecar is short", 3},
+      {"\xFF\xFE[", "", "the file cannot be parsed", 3}};
+  for (const Case& c : cases) {
+    WriteBytes(dir / "x.ini", c.bytes);
+    std::filesystem::remove(dir / "x.vl5");
+    if (!c.sidecar.empty()) WriteBytes(dir / "x.vl5", c.sidecar);
+    EXPECT_EQ(VltctlJson({"verify", dir / "x.ini"})["found"], c.found);
+    EXPECT_EQ(Vltctl({"verify", dir / "x.ini"}).exitCode, c.code) << c.found;
+    EXPECT_EQ(ReadBytes(dir / "x.ini"), c.bytes);
+  }
+  EXPECT_EQ(Vltctl({"verify", dir / "none.ini"}).exitCode, 1);
+  EXPECT_EQ(Vltctl({"verify", dir.path()}).exitCode, 3);
+  EXPECT_EQ(Vltctl({"verify"}).exitCode, 2);
+}
+
+TEST_F(VltctlAdmin, HookIsArmedAndCleared) {
+  std::string file = installation.root() + "/VLTHooks.ini";
+  std::string point = "TestHookNT\"./source/Common/vltDuplicateString2\"19";
+  EXPECT_NE(Vltctl({"hook", "list"}).out.find(point), std::string::npos);
+  EXPECT_EQ(VltctlJson({"hook", "list"}).size(), 21u);
+  EXPECT_EQ(Vltctl({"hook", "arm", point, "hang=25", "fail"}).exitCode, 0);
+  EXPECT_EQ(ReadBytes(file), "[Hook]\nName = " + point +
+                                 "\nHang = true\nHangTime = 25\n"
+                                 "SimulateMemoryAllocationFailure = true\n\n");
+  EXPECT_EQ(Vltctl({"hook", "clear"}).exitCode, 0);
+  EXPECT_EQ(ReadBytes(file), "");
+  EXPECT_EQ(Vltctl({"hook", "arm", "no such point", "fail"}).exitCode, 1);
+  EXPECT_EQ(Vltctl({"hook", "arm", point, "nonsense"}).exitCode, 2);
+  EXPECT_EQ(Vltctl({"hook", "arm", point}).exitCode, 2);
+}
+
+TEST_F(VltctlAdmin, TraceTellsWhereTheLogGoes) {
+  json trace = VltctlJson({"trace"});
+  std::string expected =
+      geteuid() == 0 ? "/Library/Logs/KOR/" : std::string(getenv("HOME")) + "/Library/Logs/KOR/";
+  EXPECT_EQ(trace["directory"]["value"], expected);
+  EXPECT_EQ(trace["Severity"]["value"], "1");
+  std::filesystem::create_directories(expected);
+  WriteBytes(expected + "20260101_000000-vlTracer-00000001.log", "  old\n");
+  WriteBytes(expected + "20260102_000000-vlTracer-00000001.log", "  one\n  two\n");
+  EXPECT_NE(Vltctl({"trace"}).out.find("|   one\n|   two\n"), std::string::npos);
+  std::filesystem::remove_all(expected);
+}
+
+TEST_F(VltctlAdmin, UrlAndIdentity) {
+  EXPECT_EQ(Vltctl({"identity"}).exitCode, 3);  // without the library that makes GUIDs
+  WriteBytes(jar(), "[ServerSection]\nServerIdentity={00000001-0002-0003-0405-060708090A0B}\n");
+  EXPECT_EQ(Vltctl({"identity"}).out, "{00000001-0002-0003-0405-060708090A0B}\n");
+}
+
+// Lines of a trace that would change something. Writing to standard output and error is allowed.
+std::vector<std::string> Changes(const std::string& trace) {
+  std::vector<std::string> found;
+  std::istringstream lines(trace);
+  for (std::string line; std::getline(lines, line);) {
+    for (const char* mark :
+         {"O_CREAT", "O_WRONLY", "O_RDWR", "chmod(", "fchmod(", "fchmodat(", "unlink", "rename",
+          "mkdir", "flock(", "ftruncate(", " link(", "chown(", "F_SETLK"}) {
+      if (line.find(mark) != std::string::npos) found.push_back(line);
+    }
+  }
+  return found;
+}
+
+TEST_F(VltctlAdmin, LookingChangesNothingAndWaitsForNobody) {
+  if (RunProgram({"strace", "-e", "trace=none", "true"}).exitCode != 0) {
+    GTEST_SKIP() << "strace is missing or not permitted";
+  }
+  WriteBytes(data + "/kor.ini", "[STORAGE]\n");
+  WriteBytes(jar(), "[CookieSection]\nLastServerCookie=5\n");
+  TempDir dir;
+  // Another process has the jar's lock, as a server in the middle of a save would.
+  Signal held, release;
+  Child holder([&] {
+    std::string name;
+    for (char c : jar()) {
+      if (c != '/' && c != '.') name += static_cast<char>(toupper(c));
+    }
+    std::string locks = std::string(getenv("ZTFNDTMPSHAREDFILEDIR")) + "/mutex";
+    std::filesystem::create_directories(locks);
+    int fd = open((locks + "/" + name).c_str(), O_CREAT | O_RDWR, 0666);
+    flock(fd, LOCK_EX);
+    held.notify();
+    release.await();
+    return 0;
+  });
+  ASSERT_TRUE(held.await());
+  for (std::vector<std::string> command :
+       {std::vector<std::string>{"settings"}, {"jar"}, {"verify", jar()}, {"trace"}, {"events"}}) {
+    auto start = std::chrono::steady_clock::now();
+    auto plain = Vltctl(command);
+    EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(1)) << command[0];
+    EXPECT_EQ(plain.exitCode, 0) << plain.err;
+    std::vector<std::string> traced = {"strace", "-f", "-o", dir / "trace", kVltctl};
+    traced.insert(traced.end(), command.begin(), command.end());
+    EXPECT_EQ(RunProgram(traced).exitCode, 0);
+    std::vector<std::string> changes = Changes(ReadBytes(dir / "trace"));
+    EXPECT_TRUE(changes.empty()) << command[0] << ": " << changes[0];
+  }
+  release.notify();
+  EXPECT_EQ(holder.wait(), 0);
+}
+
+}  // namespace
