@@ -46,6 +46,7 @@ vlt_tests(vlcore_tests LABELS unit LINKS ${inside}
         source/Pharlap/*_test.cpp source/Posix/*_test.cpp source/Utilities/*_test.cpp
         vlloader/source/*_test.cpp)
 if(TARGET vltutils)
+  vlt_tests(oom_tests LABELS e2e TIMEOUT 600 GLOBS tests/oom/*_test.cpp LINKS vltutils)
   vlt_tests(e2e_tests LABELS e2e TIMEOUT 300 GLOBS tests/e2e/*_test.cpp LINKS vltutils)
   if(TARGET e2e_tests)
     find_package(nlohmann_json REQUIRED)

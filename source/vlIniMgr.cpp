@@ -19,8 +19,8 @@
 #include "zt/fnd/osdep/path.h"
 #include "ztini/ztini.h"
 
-using zt::fnd::osdep::path;
 using zt::fnd::String;
+using zt::fnd::osdep::path;
 using zt::fnd::osdep::RetryEintr;
 using zt::fnd::osdep::ScopedFd;
 
@@ -42,6 +42,11 @@ ScopedFd Open(const std::string& fileName, int flags) {
 bool IsFileOrDirectory(int fd) {
   struct stat info;
   return fstat(fd, &info) == 0 && (S_ISREG(info.st_mode) || S_ISDIR(info.st_mode));
+}
+
+// Want of memory, of descriptors or of the right to open.
+bool SaysNothingOfTheFile(int32_t status) {
+  return status == kIniOutOfMemory || status == kIniCannotOpen;
 }
 
 // The whole file; false if it could not be read to the told length.
@@ -102,8 +107,7 @@ void CvlIniMgr::Initialize(unsigned char const* digest) {
     CreateFile();
   }
   int32_t status = InitializeIniBindings();
-  // Want of memory or of the right to open says nothing about what the file holds.
-  if (status != 0) CleanupAndThrow(status != kIniOutOfMemory && status != kIniCannotOpen);
+  if (status != 0) CleanupAndThrow(!SaysNothingOfTheFile(status));
 }
 
 void CvlIniMgr::CreateFile() {
@@ -150,12 +154,21 @@ bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest) const {
 }
 
 int32_t CvlIniMgr::InitializeIniBindings() {
-  m_ini = IniNew(0);
-  if (!m_ini) return kIniOutOfMemory;
-  IniSetReadOptions(m_ini, kReadOptions);
-  IniSetWriteOptions(m_ini, kNoLineLimit, ' ', kWriteOptions);
-  SetDurable(m_durable);
-  return IniReadFromFile(m_ini, m_fileName.c_str());
+  IniStructForwardReferenceTag* fresh = IniNew(0);
+  if (!fresh) return kIniOutOfMemory;
+  IniSetReadOptions(fresh, kReadOptions);
+  IniSetWriteOptions(fresh, kNoLineLimit, ' ', kWriteOptions);
+  IniSetDurability(fresh, m_durable ? IniDurability::Synced : IniDurability::None);
+  int32_t status = IniReadFromFile(fresh, m_fileName.c_str());
+  // What could not be read for want of memory or descriptors is no reason to forget what is known: the
+  // next save would write the forgetting down.
+  if (m_ini && SaysNothingOfTheFile(status)) {
+    IniDispose(fresh);
+    return status;
+  }
+  DisposeDocument();
+  m_ini = fresh;
+  return status;
 }
 
 void CvlIniMgr::SetDurable(bool durable) {
@@ -219,7 +232,6 @@ HRESULT CvlIniMgr::WriteAndGetChecksum(unsigned char** digest) {
   *digest = nullptr;
   HRESULT result = Write();
   if (result < 0) return result;
-  DisposeDocument();
   result = DigestFile(digest);
   if (InitializeIniBindings() != 0 && result >= 0) result = E_FAIL;
   if (result < 0) {

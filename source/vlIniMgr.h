@@ -44,8 +44,8 @@ class CvlIniMgr {
   // Replaces the file if anything was changed since construction. A failure leaves the file.
   HRESULT Write();
   // Write, then the digest of the file as it stands, new[]; then reads the file anew, so that the
-  // object holds exactly what the file holds. Null on failure. After a failure behind Write the
-  // object may be empty, and every operation gives E_FAIL or 0.
+  // object holds exactly what the file holds. Null on failure. Where the file cannot be read anew for
+  // want of memory or because it cannot be opened, the object keeps what it held.
   HRESULT WriteAndGetChecksum(unsigned char** digest);
 
   // Copies the value to *out, which the caller provides and sizes.
