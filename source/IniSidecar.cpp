@@ -56,6 +56,9 @@ bool Create(const std::string& sidecar, const unsigned char* digest, bool durabl
     ScopedFd fd = Open(temporary, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW);
     // Always synced: a rename that outlives its file's bytes in a power cut would leave a short
     // one.
+    // Its mode before the rename, so that a kill right after it leaves no sidecar that others cannot
+    // write.
+    if (fd.valid()) fchmod(fd.get(), kSharedMode);
     if (!fd.valid() || !Overwrite(fd.get(), digest, true) ||
         rename(temporary.c_str(), sidecar.c_str()) != 0) {
       if (fd.valid()) unlink(temporary.c_str());
@@ -70,7 +73,10 @@ bool Create(const std::string& sidecar, const unsigned char* digest, bool durabl
 HRESULT Read(const std::string& sidecar, unsigned char** digest) {
   *digest = nullptr;
   ScopedFd fd = Open(sidecar, O_RDONLY);
-  if (!fd.valid()) return S_FALSE;
+  struct stat info;
+  if (!fd.valid() || fstat(fd.get(), &info) != 0) return S_FALSE;
+  // A pipe or a device is nothing that a save has left: it says nothing about the file beside it.
+  if (!S_ISREG(info.st_mode) && !S_ISDIR(info.st_mode)) return S_FALSE;
   std::unique_ptr<unsigned char[]> found(new unsigned char[kSizeBytes]);
   if (BinaryFile::ReadExactSize(fd.get(), found.get(), kSizeBytes) != kSizeBytes) return E_FAIL;
   *digest = found.release();

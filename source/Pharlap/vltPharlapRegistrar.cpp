@@ -176,12 +176,15 @@ bool CvltPharlapRegistrar::ChecksumFileExists() {
 
 HRESULT CvltPharlapRegistrar::DeleteIniFile() {
   try {
+    String badEnd = vlrGetCurrentLocalTime() + L".bad";
     if (path::DoesFileExist(m_registrationFilePath)) {
-      path::RenameFile(m_registrationFilePath,
-                       m_registrationFilePath + vlrGetCurrentLocalTime() + L".bad");
+      path::RenameFile(m_registrationFilePath, m_registrationFilePath + badEnd);
     }
     String sidecar = Widen(sidecarName());
     if (path::DoesFileExist(sidecar)) path::RemoveFile(sidecar);
+    // A directory in its place goes out of the way as well. Left there, it would have the next start
+    // set the empty database of this one aside, over the copy that was just made.
+    if (path::IsDirectory(sidecar.c_str())) path::RenameFile(sidecar, sidecar + badEnd);
     return S_OK;
   } catch (const zt::fnd::exception::Exception&) {
     return E_FAIL;  // What cannot be set aside is opened as it is.

@@ -28,10 +28,23 @@ namespace {
 
 constexpr const wchar_t* kRegistrationFile = L"Resources/Info.vlr";
 constexpr const char* kChangedMark = "23";
+constexpr const char* kHeaderless = "(null)";
 
 bool SameName(const std::string& a, const char* b) { return StringCaseCompare(a.c_str(), b) == 0; }
 
 bool HasLineEnd(const std::string& text) { return text.find_first_of("\r\n") != std::string::npos; }
+
+// Whether an item of this name is still that item when the file is read again: what follows a "="
+// would be its value, a header or a comment no item at all.
+bool CanBeItemName(const std::string& text) {
+  size_t first = text.find_first_not_of(" \t\v\f");
+  return first != std::string::npos && text[first] != ';' && text[first] != '[' &&
+         text.find('=') == std::string::npos && !HasLineEnd(text);
+}
+
+// Nothing can be found at the path, now or later: no entry, a file where a directory should be, or
+// links that go in circles.
+bool NamesNothing(int error) { return error == ENOENT || error == ENOTDIR || error == ELOOP; }
 
 // Time of the last change, in whole seconds, if the path names a regular file. One look answers
 // both whether the file is there and how old it is. A bundle that is no directory, or has something
@@ -41,7 +54,7 @@ bool RegistrationTime(const String& file, zt::fnd::AbsTime* time) {
   struct stat info;
   if (stat(AnsiString(file).c_str(), &info) != 0) {
     int error = errno;
-    if (error == ENOENT || error == ENOTDIR) return false;
+    if (NamesNothing(error)) return false;
     ZT_RAISE(zt::fnd::osdep::PosixError(error));
   }
   if (!S_ISREG(info.st_mode)) return false;
@@ -70,14 +83,13 @@ HRESULT BundleDirectory(const wchar_t* name, String* directory) {
   return result < 0 ? result : S_OK;
 }
 
-// True if the path names a regular file. A file in place of a directory above it makes it gone;
-// what else keeps the look from being taken is raised.
+// True if the path names a regular file; what keeps the look from being taken is raised.
 bool FileIsThere(const std::string& file) {
   try {
     return path::DoesFileExist(Widen(file));
   } catch (const zt::fnd::osdep::PosixError& error) {
-    // The bundle may have been replaced by a file of its name.
-    if (error.whatcode() != ENOTDIR) throw;
+    // The bundle may have been replaced by a file of its name, or by a link to itself.
+    if (!NamesNothing(static_cast<int>(error.whatcode()))) throw;
     return false;
   }
 }
@@ -176,8 +188,8 @@ void CvltPharlapRegistrar::mergeItem(CvlIniMgr& fragment, const String& installD
     if (StripBracesFromGuid(value.data()) == S_OK) value.resize(strlen(value.c_str()));
   }
   m_registrationIni->SetItem(section.c_str(), item.c_str(), value.c_str(), true);
-  // A line end in the name of an item would write lines of its own into the database.
-  if (SameName(section, kComponents) && !HasLineEnd(value)) {
+  // A value that is no name would write something else into the database, down to whole lines.
+  if (SameName(section, kComponents) && CanBeItemName(value)) {
     m_registrationIni->SetItem(kContents, value.c_str(), file, true);
   }
 }
@@ -199,6 +211,8 @@ HRESULT CvltPharlapRegistrar::MergeRegistrationFile(const String& installDirecto
   for (int s = 1; s <= sections; ++s) {
     std::string section;
     if (fragment->GetNthSectionName(s, &section) < 0) continue;
+    // Written without a header, so that its items would fall to whichever section stands before.
+    if (section == kHeaderless) continue;
     bool changed = true;
     result = HasDDChanged(*fragment, Widen(section).c_str(), changed);
     int items = fragment->GetNumberOfItems(section.c_str());

@@ -8,6 +8,7 @@
 #include <new>
 #include <string>
 
+#include "source/Utilities/vltutils.h"
 #include "source/vlIniMgr.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/String.h"

@@ -2,6 +2,7 @@
 #include "source/Utilities/vltutils.h"
 
 #include "source/Common/Posix/vltlinuxos.h"
+#include "source/Common/vltAttributeValues.h"
 #include "source/Common/vltFileSecurity.h"
 #include "source/Common/vltcmn.h"
 
@@ -93,6 +94,13 @@ unsigned vltMakeInternalAttributeID(unsigned id, _vltAttributeType t) {
 int vltIsLumBlob(unsigned tag) { return vltIsLumBlob2(static_cast<unsigned short>(tag)); }
 unsigned vltLumMakeTypedTag(unsigned type, unsigned id) {
   return vltLumMakeTypedTag2(static_cast<unsigned short>(type), static_cast<unsigned short>(id));
+}
+
+HRESULT vltGetAttributeValueAsString(IvltObject* object, unsigned id, wchar_t** text) {
+  return vltGetAttributeValueAsStringImpl(object, id, text);
+}
+HRESULT vltSetAttributeValueFromString(IvltObject* object, unsigned id, const wchar_t* text) {
+  return vltSetAttributeValueFromString2(object, id, text);
 }
 
 int vltUseZTRPC() { return 1; }

@@ -151,6 +151,16 @@ VLT_EXPORT unsigned vltMakeInternalAttributeID(unsigned id, _vltAttributeType t)
 VLT_EXPORT int vltIsLumBlob(unsigned tag);                           // 1 for the two blob tags
 VLT_EXPORT unsigned vltLumMakeTypedTag(unsigned type, unsigned id);  // low halves, type on top
 
+// ---- Attribute values. The object is the storage's; the attribute's type is asked of its class.
+
+// Text of any attribute: numbers, GUIDs and texts as they are, a reference as the GUID of its object
+// (all zeros for none), an array as "{a,b}" without quotes. E_FAIL for blobs and fast references;
+// *text is untouched on failure.
+VLT_EXPORT HRESULT vltGetAttributeValueAsString(IvltObject* object, unsigned id, wchar_t** text);
+// Sets a number, a GUID or a text; E_FAIL for other types.
+VLT_EXPORT HRESULT vltSetAttributeValueFromString(IvltObject* object, unsigned id,
+                                                  const wchar_t* text);
+
 // ---- Fixed answers.
 VLT_EXPORT int vltUseZTRPC();    // 1
 VLT_EXPORT int vltStandAlone();  // 1

@@ -44,6 +44,15 @@ void RemoveSet(int id) {
   if (id >= 0) semctl(id, 0, IPC_RMID);
 }
 
+// A name space of mounts of which nothing shows outside.
+bool EnterOwnMounts() {
+  if (unshare(CLONE_NEWNS) != 0) return false;
+  if (mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0) return true;
+  // Below a changed root directory that cannot be said, but it may be so already.
+  std::string mounts = ReadBytes("/proc/self/mountinfo");
+  return mounts.find(" shared:") == std::string::npos;
+}
+
 }  // namespace
 
 EventPlace::EventPlace() {
@@ -122,8 +131,7 @@ void Keeper::kill() {
 
 Allowed RunInOwnTmp(const std::string& options, const std::function<int()>& body, int* code) {
   Child child([&] {
-    if (unshare(CLONE_NEWNS | CLONE_NEWIPC) != 0 ||
-        mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0 ||
+    if (!EnterOwnMounts() || unshare(CLONE_NEWIPC) != 0 ||
         mount("tmpfs", "/tmp", "tmpfs", 0, options.c_str()) != 0 || chdir("/tmp") != 0) {
       return kNotAllowed;
     }

@@ -11,6 +11,17 @@ extern "C" int __lsan_do_recoverable_leak_check() __attribute__((weak));
 
 namespace vlt::test {
 
+// Expectations of the running test that have failed so far.
+inline int FailedExpectations() {
+  const testing::TestResult& result =
+      *testing::UnitTest::GetInstance()->current_test_info()->result();
+  int failed = 0;
+  for (int n = 0; n < result.total_part_count(); ++n) {
+    if (result.GetTestPartResult(n).failed()) ++failed;
+  }
+  return failed;
+}
+
 // Runs expectations in a forked process, for what a process does only once: look up its
 // installation, make its registrar. Returns 0 if all of them held and nothing leaked, 1 if not, 98
 // for a leak, and Child's codes otherwise.
@@ -18,8 +29,9 @@ namespace vlt::test {
 //   EXPECT_EQ(InChild([&] { EXPECT_TRUE(...); }), 0);
 inline int InChild(const std::function<void()>& body, int deadlineMs = kDeadlineMs) {
   Child child([&] {
+    int before = FailedExpectations();
     body();
-    if (testing::Test::HasFailure()) return 1;
+    if (FailedExpectations() != before) return 1;
     return __lsan_do_recoverable_leak_check && __lsan_do_recoverable_leak_check() ? 98 : 0;
   });
   return child.wait(deadlineMs);

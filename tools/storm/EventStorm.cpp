@@ -37,16 +37,10 @@ class Supervisor {
 
   bool run() {
     const auto begin = Clock::now();
-    pid_t ping = Spawn([this] { return PingSide(m_state); });
-    // Both events and their set.
-    while (m_place.countEventFiles() < 3 && Clock::now() - begin < kStall) SleepUs(1000);
-    pid_t pong = Spawn([this] { return PongSide(m_state); });
+    if (m_size.pingPong) startPingPong(begin);
     for (unsigned i = 0; i < m_size.processes; ++i) start(i);
     while (m_running > 0) step();
-    m_state.stop = true;
-    // One that waits for ever has lost a wake-up.
-    if (Reap(ping, Clock::now() + kStall) != 0) ++m_state.lostWakeUps;
-    if (Reap(pong, Clock::now() + kStall) != 0) ++m_state.lostWakeUps;
+    if (m_size.pingPong) endPingPong();
     m_filesOfTheDead = m_place.countEventFiles();
     sweep();
     report(std::chrono::duration<double>(Clock::now() - begin).count());
@@ -66,6 +60,20 @@ class Supervisor {
         Spawn([this, index, seed] { return WorkEvents(m_size, m_state, index, seed); });
     m_workers[index].lastProgress = Clock::now();
     ++m_running;
+  }
+
+  void startPingPong(Clock::time_point begin) {
+    m_ping = Spawn([this] { return PingSide(m_state); });
+    // Both events and their set.
+    while (m_place.countEventFiles() < 3 && Clock::now() - begin < kStall) SleepUs(1000);
+    m_pong = Spawn([this] { return PongSide(m_state); });
+  }
+
+  // One that waits for ever has lost a wake-up.
+  void endPingPong() {
+    m_state.stop = true;
+    if (Reap(m_ping, Clock::now() + kStall) != 0) ++m_state.lostWakeUps;
+    if (Reap(m_pong, Clock::now() + kStall) != 0) ++m_state.lostWakeUps;
   }
 
   std::uint64_t roundsDone() const {
@@ -159,7 +167,7 @@ class Supervisor {
   bool clean() const {
     return m_state.lostWakeUps == 0 && m_state.splitNames == 0 && m_state.timeOuts == 0 &&
            m_state.errors == 0 && m_filesLeft == 0 && m_setsLeft == 0 && m_kills == m_size.kills &&
-           m_state.pingPongs > 0;
+           (m_state.pingPongs > 0 || !m_size.pingPong);
   }
 
   const EventStormSize m_size;
@@ -168,6 +176,7 @@ class Supervisor {
   Place m_place;
   std::vector<Process> m_workers;
   const int m_setsBefore;
+  pid_t m_ping = 0, m_pong = 0;
   unsigned m_started = 0, m_running = 0, m_kills = 0;
   std::size_t m_filesOfTheDead = 0, m_filesLeft = 0;
   int m_setsLeft = 0;

@@ -7,6 +7,8 @@ struct EventStormSize {
   unsigned rounds = 20000;  // of each process
   unsigned names = 300;
   unsigned kills = 2000;
+  unsigned held = 40;    // events that a process has open at once, at most
+  bool pingPong = true;  // which also keeps one set alive all the time
   unsigned seed = 1;
   bool machineSemaphores = false;  // otherwise a name space of the storm's own, where allowed
 };

@@ -21,7 +21,6 @@ using zt::fnd::osdep::NamedEventGlobalStatics;
 
 constexpr bool kManual = true, kAutomatic = false, kClear = false;
 constexpr unsigned kPatienceMs = 10000;
-constexpr unsigned kMostHeld = 40;
 
 String Wide(const std::string& text) { return String(text.c_str()); }
 
@@ -43,7 +42,7 @@ class Worker {
  public:
   Worker(const EventStormSize& size, StormState& state, unsigned self, std::uint64_t seed)
       : m_size(size), m_state(state), m_self(self), m_random(seed), m_counts(size.names) {
-    m_room = m_random.below(kMostHeld) + 1;
+    m_room = m_random.below(m_size.held) + 1;
   }
 
   void round(unsigned number) {

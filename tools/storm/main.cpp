@@ -17,6 +17,8 @@ int main(int argc, char** argv) {
   events->add_option("--rounds", size.rounds);
   events->add_option("--names", size.names)->check(CLI::Range(1u, storm::kMaxNames));
   events->add_option("--kills", size.kills);
+  events->add_option("--held", size.held)->check(CLI::Range(1u, 1000u));
+  events->add_flag("!--no-ping-pong", size.pingPong);
   events->add_option("--seed", size.seed);
   events->add_flag("--machine-semaphores", size.machineSemaphores);
   unsigned kills = 10000;

@@ -1,6 +1,7 @@
 #include <string.h>
 
 #include <algorithm>
+#include <tuple>
 
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/Common/vltcmn.h"
@@ -50,12 +51,22 @@ struct vltStringResources::Database {
   bool fileNameOf(const char* section, std::string* base);
   bool take(Question& q, const char* section);
   void walk(Question& q);
+  void search(Question& q);
   void index();
 
   IniStructForwardReferenceTag* document;
   bool indexed = false;
   // Base name of a component's file to the sections that have it, in the order of the list.
   std::map<std::string, std::vector<std::string>, NameLess> sectionsOf;
+
+  // Answers given, by all of a question but the file: the components of one file all ask the same,
+  // and each answer looks at all of them.
+  struct Answer {
+    HRESULT result;
+    std::string text;
+  };
+  using Kind = std::tuple<bool, std::string, std::string, unsigned>;
+  std::map<Kind, std::map<std::string, Answer, NameLess>> answers;
 };
 
 // False, with a warning where that is due, for a section that names no file.
@@ -140,6 +151,17 @@ void vltStringResources::Database::answer(Question& q) {
   // The walk has each question repeat its warnings; without them the index gives the same answer.
   if (Warns()) return walk(q);
   index();
+  Kind kind(q.separator != nullptr, q.separator ? q.separator : "", q.key, q.maxLength);
+  auto [known, isNew] = answers[kind].try_emplace(q.target);
+  if (isNew) {
+    search(q);
+    known->second = {q.result, q.joined.substr(0, q.maxLength)};
+  }
+  q.result = known->second.result;
+  q.joined = known->second.text;
+}
+
+void vltStringResources::Database::search(Question& q) {
   auto found = sectionsOf.find(q.target);
   if (found == sectionsOf.end()) return;
   for (const std::string& section : found->second) {
@@ -166,6 +188,14 @@ vltStringResources::Database* vltStringResources::databaseFor(const std::string&
     }
     directory = m_installDirectory;
   }
+  if (directory.empty()) {
+    // An installation without a place; the file must not be looked for at the top of the system.
+    if (vltGetTraceFlagsImpl() & kEarlyTraceMask) {
+      vltEarlyTrace(kEarlyTraceSource, 57,
+                    "Could not get path to KOR Data in getstringresourceimpl\n");
+    }
+    return nullptr;
+  }
   auto& database = m_databases[directory];
   if (!database) database = std::make_unique<Database>(directory + "/vlt.vlr");
   return database.get();
@@ -178,7 +208,9 @@ HRESULT vltStringResources::get(const char* separator, const wchar_t* file, cons
   Question q{separator, "", zt::fnd::AnsiString(key ? key : L"").c_str(), maxLength, "", E_FAIL};
   // Without a slash there is no base name to look for.
   if (narrowFile.find('/') != std::string::npos) q.target = BaseName(narrowFile);
-  databaseFor(narrowFile)->answer(q);
+  Database* database = databaseFor(narrowFile);
+  if (!database) return E_FAIL;
+  database->answer(q);
   if (q.joined.empty()) return q.result;
   auto* text = static_cast<char*>(vltTaskMemAlloc(maxLength));
   if (!text) return E_FAIL;

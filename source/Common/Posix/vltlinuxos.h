@@ -43,6 +43,7 @@ class vltStringResources {
 
  private:
   struct Database;
+  // Null, after a word where that is asked for, if there is no install directory.
   Database* databaseFor(const std::string& file);
 
   std::string m_installDirectory;

@@ -15,10 +15,20 @@ namespace fnd {
 namespace osdep {
 namespace {
 
-// Unusable sets in a row after which there is none to be had. One that somebody else keeps locked
-// takes half a second to tell, so it counts for more.
+// Unusable sets in a row after which there is none to be had. Some take long to tell, and count for
+// more: a file that may not be opened 2 ms, one that somebody else keeps locked half a second.
 constexpr unsigned kUnusableSets = 1024;
-constexpr unsigned kBusySetWeight = 128;
+
+unsigned Weight(const SemaphoreSet& set) {
+  switch (set.state()) {
+    case SemaphoreSet::State::Busy:
+      return 128;
+    case SemaphoreSet::State::Closed:
+      return 4;
+    default:
+      return 1;
+  }
+}
 
 // A set of this number belongs to a program that keeps its events elsewhere.
 bool IsReserved(unsigned number) {
@@ -113,7 +123,7 @@ void EventData::allocate(const EventFile& file) {
     unsigned slot = 0;
     SemaphoreSet::Room room = set->usable() ? set->firstFree(slot) : SemaphoreSet::Room::Damaged;
     if (room == SemaphoreSet::Room::Some && allocateIn(*set, slot, file)) return;
-    unusable = room == SemaphoreSet::Room::None ? 0 : unusable + (set->busy() ? kBusySetWeight : 1);
+    unusable = room == SemaphoreSet::Room::None ? 0 : unusable + Weight(*set);
     if (unusable >= kUnusableSets) ZT_RAISE(PosixError(ENOLCK));
   }
 }

@@ -22,8 +22,8 @@ class EventData;
 // file in "namedEvent/" of the shared directory (docs/event-files.md). A process that dies leaves
 // its events behind for the next opener of the name. Objects of one name in one process share one
 // event; names that differ in case only are one in a process, while the file system decides between
-// processes. A forked child may go on using the parent's objects, also after the parent has gone;
-// its destroying them takes nothing from the parent.
+// processes. A forked child may go on using the parent's objects until the parent closes them, and
+// beyond a parent that was killed; its destroying them takes nothing from the parent.
 //
 // Threads: any may use any object; only construction and destruction take a lock. A failed system
 // call throws PosixError, which also tells a waiter that the event's semaphores were removed.

@@ -16,9 +16,11 @@
 #include <fstream>
 #include <functional>
 #include <memory>
+#include <new>
 #include <string>
 #include <vector>
 
+#include "tests/support/AllocFailure.h"
 #include "tests/support/Child.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/FailSystemCall.h"
@@ -268,6 +270,24 @@ TEST(NamedEventLimits, PlaceThatMayNotBeWrittenIsEACCES) {
   EXPECT_EQ(Names(), place.files());
 }
 
+// The event's own file can be opened, but no state file made, each after three attempts.
+TEST(NamedEventLimits, StateFilesThatMayNotBeMadeAreENOLCK) {
+  if (geteuid() != 0) GTEST_SKIP() << "SKIPPED: needs two users, so the superuser";
+  EventPlace place;
+  Open("warm up");
+  std::string dir = std::filesystem::path(place.file("x")).parent_path();
+  WriteBytes(place.file("name"), "");
+  chmod(place.file("name").c_str(), 0666);
+  chmod(dir.c_str(), 0755);
+  Child child([] {
+    if (setgid(65534) != 0 || setuid(65534) != 0) return 1;
+    REQUIRE(SoonErrorOfOpening("name") == ENOLCK);
+    return 0;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(Names{"name"}, place.files());
+}
+
 // Fills the file system to its last byte.
 void Fill(const std::string& path) {
   std::ofstream out(path, std::ios::binary | std::ios::app);
@@ -340,19 +360,45 @@ TEST(NamedEventLimits, PlaceWithoutInodesIsAnErrorThatLeavesNoFiles) {
 
 // ---- bounds
 
+// Makes the set of this number one that cannot be had: its key leads to a smaller one.
+void Spoil(const EventPlace& place, int number) {
+  std::string path = place.file("sem_" + std::to_string(number));
+  WriteBytes(path, "x");
+  ASSERT_NE(-1, semget(ftok(path.c_str(), 1), 1, IPC_CREAT | IPC_EXCL | 0600));
+}
+
 TEST(NamedEventLimits, ThousandUnusableSetsInARowAreTheEnd) {
   EventPlace place;
   Open("warm up");
-  for (int n = 1; n <= 1023; ++n) {
-    mkdir(place.file("sem_" + std::to_string(n)).c_str(), 0777);
-  }
+  for (int n = 1; n <= 1023; ++n) Spoil(place, n);
   auto event = Open("name");
   EXPECT_EQ((EventPlace::Slot{1024, 0}), place.slotOf("name"));
   event.reset();
-  mkdir(place.file("sem_1024").c_str(), 0777);
+  Spoil(place, 1024);
   EXPECT_EQ(ENOLCK, SoonErrorOfOpening("name"));
   EXPECT_FALSE(Exists(place.file("name")));
   EXPECT_FALSE(Exists(place.file("sem_1025")));
+  // With a full one among them there are not so many in a row.
+  semctl(place.setOf(2), 0, IPC_RMID);
+  std::vector<std::unique_ptr<NamedEvent>> full;
+  for (int i = 0; i < 128; ++i) full.push_back(Open("e" + std::to_string(i)));
+  Spoil(place, 1025);
+  event = Open("name");
+  EXPECT_EQ((EventPlace::Slot{1026, 0}), place.slotOf("name"));
+}
+
+TEST(NamedEventLimits, StateFilesThatCannotBeOpenedAreTheEndSooner) {
+  EventPlace place;
+  Open("warm up");
+  for (int n = 1; n <= 255; ++n) {
+    mkdir(place.file("sem_" + std::to_string(n)).c_str(), 0777);
+  }
+  auto event = Open("name");
+  EXPECT_EQ((EventPlace::Slot{256, 0}), place.slotOf("name"));
+  event.reset();
+  mkdir(place.file("sem_256").c_str(), 0777);
+  EXPECT_EQ(ENOLCK, SoonErrorOfOpening("name"));
+  EXPECT_FALSE(Exists(place.file("name")));
 }
 
 TEST(NamedEventLimits, NoDescriptorsLeftIsAnErrorThatPasses) {
@@ -379,6 +425,25 @@ TEST(NamedEventLimits, NoDescriptorsLeftIsAnErrorThatPasses) {
     EXPECT_EQ((Names{"sem_1", "warm up"}), place.files());
     EXPECT_EQ(now, OpenDescriptors());
   }
+}
+
+TEST(NamedEventLimits, FailedAllocationsLeaveNothing) {
+  EventPlace place;
+  Open("warm up");
+  const int descriptors = OpenDescriptors();
+  bool failed = true;
+  for (int nth = 1; failed; ++nth) {
+    ASSERT_LT(nth, 1000);
+    try {
+      vlt::test::FailAllocation fail(nth);
+      auto event = std::make_unique<NamedEvent>(String(L"name"), kManual, kClear);
+      failed = fail.happened();
+    } catch (const std::bad_alloc&) {  // the one that was asked for
+    }
+    EXPECT_EQ(Names(), place.files()) << nth;
+    EXPECT_EQ(descriptors, OpenDescriptors()) << nth;
+  }
+  EXPECT_EQ(0, SoonErrorOfOpening("name"));
 }
 
 }  // namespace

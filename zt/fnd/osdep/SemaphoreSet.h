@@ -28,9 +28,11 @@ class SemaphoreSet : public RefCountedCriticalSectionPolicy {
   ~SemaphoreSet() override;
 
   unsigned number() const { return m_number; }
+  // Unusable: the file was locked, but there is no set. Busy: somebody else had it alone all the
+  // time. Closed: it could not be opened.
+  enum class State { Usable, Unusable, Busy, Closed };
+  State state() const { return m_state; }
   bool usable() const { return m_file.valid(); }
-  // True for an unusable set whose file somebody else had alone all the time.
-  bool busy() const { return m_busy; }
   int id() const { return m_id; }
 
   // False, with all outputs 0 or false, on a short read or a wrong magic. Does not ask for ready.
@@ -73,7 +75,7 @@ class SemaphoreSet : public RefCountedCriticalSectionPolicy {
   EventFile m_file;
   int m_id = -1;
   bool m_made = false;  // the set is this object's own making
-  bool m_busy = false;
+  State m_state = State::Closed;
 };
 
 }  // namespace osdep

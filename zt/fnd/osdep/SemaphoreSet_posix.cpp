@@ -50,14 +50,16 @@ SemaphoreSet::SemaphoreSet(NamedEventGlobalStatics& statics, unsigned number)
 void SemaphoreSet::open() {
   try {
     EventFile file = EventFile::Open(String(("sem_" + std::to_string(m_number)).c_str()));
+    m_state = State::Unusable;
     if (file.exclusive() ? build(file) : join(file)) {
       m_file = std::move(file);
       m_file.settle();
+      m_state = State::Usable;
       return;
     }
     if (m_made) RemoveSet(m_id);
   } catch (const PosixError& e) {  // A set that cannot be had is skipped by its users.
-    m_busy = e.whatcode() == EWOULDBLOCK;
+    if (e.whatcode() == EWOULDBLOCK) m_state = State::Busy;
   } catch (const std::exception&) {  // The same.
   }
   m_id = -1;

@@ -51,7 +51,7 @@ TEST(NamedEventSet, IsBuiltReadyAndAllFree) {
   EXPECT_EQ(0u, firstFree);
   EXPECT_EQ(s.set->id(), s.place.setOf(1));
   EXPECT_EQ(1u, s.set->number());
-  EXPECT_FALSE(s.set->busy());
+  EXPECT_EQ(SemaphoreSet::State::Usable, s.set->state());
 }
 
 TEST(NamedEventSet, ReadHeaderDoesNotAskForReady) {
@@ -170,6 +170,7 @@ TEST(NamedEventSet, UnusableSetStaysInTheMapWhileItIsHeld) {
   int descriptors = OpenDescriptors();
   RefPtr<SemaphoreSet> set = statics->getOrCreateSemaphoreSet(1);
   EXPECT_FALSE(set->usable());
+  EXPECT_EQ(SemaphoreSet::State::Closed, set->state());
   EXPECT_EQ(-1, set->id());
   EXPECT_EQ(descriptors, OpenDescriptors());
   ASSERT_EQ(0, rmdir(place.file("sem_1").c_str()));

@@ -9,6 +9,7 @@
 #include <optional>
 #include <sstream>
 #include <string>
+#include <vector>
 
 #include "source/Common/ZtUtils/General/ztSync.h"
 #include "zt/fnd/osdep/DateTime.h"
@@ -138,6 +139,13 @@ char* CopyText(const std::string& text, char* buffer, unsigned long sizeBytes) {
   return buffer;
 }
 
+// Output locks are never destroyed, since threads may stand in one while the log is closed. Held here,
+// they do not count as lost.
+std::vector<Toolyard::CztMutex*>& OutputLocks() {
+  static auto* locks = new std::vector<Toolyard::CztMutex*>;
+  return *locks;
+}
+
 }  // namespace
 
 int64_t CalcFreeSpace(const char* path) {
@@ -156,6 +164,7 @@ void vlTracer::Initialize(SeverityLevel mask, TraceTarget target, const wchar_t*
   std::string name = NewLogName();
   auto* sync = new Toolyard::CztMutex(String(name.c_str()).c_str(), false);
   if ((target & kTargetFile) && Log().name.empty() && directory) PlaceLog(Log(), directory, name);
+  OutputLocks().push_back(sync);
   gs_traceSync = sync;  // Last: whoever sees it sees the rest.
 }
 

@@ -1,0 +1,54 @@
+# What an installation holds: the library, the headers of its surface, the two package files that
+# foreign builds find it by, the command, its manual.
+include(CMakePackageConfigHelpers)
+
+set(packages ${CMAKE_INSTALL_LIBDIR}/cmake/vltutils)
+install(TARGETS vltutils EXPORT vltutilsTargets
+  LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}
+  INCLUDES DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/vltutils)
+install(EXPORT vltutilsTargets NAMESPACE vltutils:: DESTINATION ${packages})
+
+# Headers keep their places below the tree's root, as they name each other by them.
+foreach(header
+    source/Common/ZtUtils/General/vlt_vlTracer.h
+    source/Utilities/vltutils.h source/Utilities/vltInterfaces.h source/Utilities/vltTypes.h
+    zt/fnd/Exception.h zt/fnd/GuidType.h zt/fnd/StringFwd.h zt/fnd/osdep/OSException.h
+    ztcom/ztcore/ztunknown.h)
+  get_filename_component(directory ${header} DIRECTORY)
+  install(FILES ${header} DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/vltutils/${directory})
+endforeach()
+
+write_basic_package_version_file(${CMAKE_BINARY_DIR}/vltutilsConfigVersion.cmake
+  COMPATIBILITY SameMajorVersion)
+file(WRITE ${CMAKE_BINARY_DIR}/vltutilsConfig.cmake
+  "include(\"\${CMAKE_CURRENT_LIST_DIR}/vltutilsTargets.cmake\")\n")
+install(FILES ${CMAKE_BINARY_DIR}/vltutilsConfig.cmake
+  ${CMAKE_BINARY_DIR}/vltutilsConfigVersion.cmake DESTINATION ${packages})
+
+# Relative to the file itself, so that a moved installation still works.
+file(RELATIVE_PATH up /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
+file(WRITE ${CMAKE_BINARY_DIR}/vltutils.pc
+"prefix=\${pcfiledir}/${up}
+libdir=\${prefix}/${CMAKE_INSTALL_LIBDIR}
+includedir=\${prefix}/${CMAKE_INSTALL_INCLUDEDIR}/vltutils
+
+Name: vltutils
+Description: Client-side support of a configuration storage service
+Version: ${PROJECT_VERSION}
+Libs: -L\${libdir} -lvltutils
+Cflags: -I\${includedir}
+")
+install(FILES ${CMAKE_BINARY_DIR}/vltutils.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+
+# vltctl becomes vltctl-client for what needs the library, and looks for it here.
+if(TARGET vltctl)
+  set(client_directory ${CMAKE_INSTALL_PREFIX}/libexec/vltutils)
+  file(RELATIVE_PATH library ${client_directory} ${CMAKE_INSTALL_PREFIX}/${CMAKE_INSTALL_LIBDIR})
+  set_target_properties(vltctl-client PROPERTIES INSTALL_RPATH "$ORIGIN/${library}")
+  install(TARGETS vltctl RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
+  install(TARGETS vltctl-client RUNTIME DESTINATION libexec/vltutils)
+endif()
+foreach(section 1 7)
+  file(GLOB manuals ${CMAKE_SOURCE_DIR}/man/*.${section})
+  install(FILES ${manuals} DESTINATION ${CMAKE_INSTALL_MANDIR}/man${section})
+endforeach()

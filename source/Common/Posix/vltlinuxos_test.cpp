@@ -1,0 +1,395 @@
+#include "source/Common/Posix/vltlinuxos.h"
+
+#include <gtest/gtest.h>
+#include <pthread.h>
+#include <stdio.h>
+#include <stdlib.h>
+#include <string.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "source/Common/vltcmn.h"
+#include "source/Utilities/vltutils.h"
+#include "tests/support/InChild.h"
+#include "tests/support/Installation.h"
+#include "vlloader/source/vlloader.h"
+#include "ztini/ztini.h"
+
+namespace vlt::test {
+namespace {
+
+constexpr char kSource[] = "./source/Utilities/../Common/Posix/vltlinuxos";
+
+struct Answer {
+  HRESULT result;
+  std::string text;  // "(untouched)" if there is none
+};
+
+// Asked in a child: the trace flags, which are read once, must be those of the question's
+// installation.
+Answer Ask(const char* separator, const wchar_t* file, const wchar_t* key = L"Key",
+           unsigned maxLength = 1024) {
+  TempDir dir;
+  EXPECT_EQ(InChild([&] {
+              TaskMem<char> out;
+              HRESULT result = vltGetStringResource(separator, file, key, out.out(), maxLength);
+              WriteBytes(dir / "result", std::to_string(result));
+              WriteBytes(dir / "text", out ? out.get() : "(untouched)");
+            }),
+            0);
+  return {static_cast<HRESULT>(std::stol(ReadBytes(dir / "result"))), ReadBytes(dir / "text")};
+}
+
+void Expect(const Answer& found, HRESULT result, const std::string& text) {
+  EXPECT_EQ(found.result, result);
+  EXPECT_EQ(found.text, text);
+}
+
+// Three components; two of them of one file.
+constexpr char kDatabase[] =
+    "[KORComponents]\nA = \"A\"\nB = \"B\"\nC = \"C\"\n"
+    "[A]\nFileName = \"/x/One.vle\"\nKey = \"first\"\nOnlyA = \"a\"\n"
+    "[B]\nFileName = \"/y/one.VLE\"\nKey = \"second\"\nOnlyB = \"b\"\n"
+    "[C]\nFileName = \"/x/Two.vle\"\nKey = \"third\"\nEmpty = \"\"\n";
+
+class Database : public Installation {
+ public:
+  explicit Database(const std::string& bytes = kDatabase) { WriteBytes(database(), bytes); }
+};
+
+TEST(StringResource, AFileWithoutASlashMatchesNothing) {
+  Database d;
+  Expect(Ask(";", L"One.vle"), E_FAIL, "(untouched)");
+  Expect(Ask(nullptr, L"One.vle"), E_FAIL, "(untouched)");
+  Expect(Ask(nullptr, nullptr), E_FAIL, "(untouched)");
+}
+
+// Its base name is the empty one, which a stored name that ends in a slash has too.
+TEST(StringResource, AnEmptyBaseNameIsAName) {
+  Database d("[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/dir/\"\nKey = \"k\"\n");
+  Expect(Ask(nullptr, L"/other/"), S_OK, "k");
+  Expect(Ask(nullptr, L"none"), S_OK, "k");
+}
+
+TEST(StringResource, ASeparatorJoinsTheTextsInTheOrderOfTheList) {
+  Database d;
+  Expect(Ask(";", L"/anywhere/ONE.vle"), S_OK, "first;second");
+  Expect(Ask("", L"/one.vle"), S_OK, "firstsecond");
+  Expect(Ask(" and ", L"/one.vle", L"OnlyB"), S_OK, "b");
+  Expect(Ask(";", L"/two.vle"), S_OK, "third");
+}
+
+TEST(StringResource, WithoutASeparatorTheFirstComponentDecides) {
+  Database d;
+  Expect(Ask(nullptr, L"/x/one.vle"), S_OK, "first");
+  Expect(Ask(nullptr, L"/x/one.vle", L"OnlyA"), S_OK, "a");
+  Expect(Ask(nullptr, L"/x/one.vle", L"OnlyB"), E_FAIL, "(untouched)");
+}
+
+TEST(StringResource, ALongTextIsCutAndTerminated) {
+  Database d;
+  Expect(Ask(";", L"/one.vle", L"Key", 13), S_OK, "first;second");
+  Expect(Ask(";", L"/one.vle", L"Key", 12), S_OK, "first;secon");
+  // Each text is cut before it is joined, and the whole again.
+  Expect(Ask(";", L"/one.vle", L"Key", 4), S_OK, "fir");
+  Expect(Ask(nullptr, L"/one.vle", L"Key", 2), S_OK, "f");
+}
+
+TEST(StringResource, NoRoomAtAllIsHarmless) {
+  Database d;
+  EXPECT_EQ(Ask(nullptr, L"/one.vle", L"Key", 0).text, "(untouched)");
+  EXPECT_EQ(Ask(nullptr, L"/one.vle", L"Key", 0).result, E_FAIL);
+  EXPECT_EQ(Ask(nullptr, L"/one.vle", L"Key", 1).text, "(untouched)");
+}
+
+TEST(StringResource, AnEmptyTextIsFoundButHandsNothingOut) {
+  Database d;
+  Expect(Ask(nullptr, L"/two.vle", L"Empty"), S_OK, "(untouched)");
+  Expect(Ask(";", L"/two.vle", L"Empty"), S_OK, "(untouched)");
+}
+
+TEST(StringResource, EscapesAreDecodedAndSingleQuotesStay) {
+  Database d(
+      "[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/x/a\\x62.vle\"\n"
+      "Key = \"tab\\tquote\\\"\"\nSingle = 'q'\n");
+  Expect(Ask(nullptr, L"/ab.vle"), S_OK, "tab\tquote\"");
+  Expect(Ask(nullptr, L"/ab.vle", L"Single"), S_OK, "'q'");
+}
+
+TEST(StringResource, WhatIsMissingIsPassedOver) {
+  Database d(
+      "[KORComponents]\nGone = \"x\"\nNoFile = \"x\"\nA = \"x\"\n[NoFile]\nKey = \"n\"\n"
+      "[A]\nFileName = \"/a.vle\"\nKey = \"a\"\n[Unlisted]\nFileName = \"/a.vle\"\n"
+      "Key = \"u\"\n");
+  Expect(Ask(";", L"/a.vle"), S_OK, "a");
+}
+
+TEST(StringResource, WithoutADatabaseOrItsListThereIsNothing) {
+  Installation i;
+  Expect(Ask(nullptr, L"/a.vle"), E_FAIL, "(untouched)");
+  WriteBytes(i.database(), "[A]\nFileName = \"/a.vle\"\nKey = \"a\"\n");
+  Expect(Ask(nullptr, L"/a.vle"), E_FAIL, "(untouched)");
+  EXPECT_EQ(InChild([] {
+              EXPECT_EQ(vltGetStringResource(nullptr, L"/a", L"k", nullptr, 10), E_POINTER);
+            }),
+            0);
+}
+
+TEST(StringResource, PreviousDictionariesHaveADatabaseBesideThem) {
+  Database d;
+  std::filesystem::create_directories(d.root() + "/Data Dictionaries/Last");
+  WriteBytes(d.root() + "/Data Dictionaries/Last/vlt.vlr",
+             "[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/x/One.vle\"\nKey = \"previous\"\n");
+  std::string file = d.root() + "/Data Dictionaries/Last/One.vle";
+  Expect(Ask(nullptr, std::wstring(file.begin(), file.end()).c_str()), S_OK, "previous");
+  Expect(Ask(nullptr, L"/nowhere/Last/One.vle"), E_FAIL, "(untouched)");
+}
+
+TEST(StringResource, TheDatabaseIsLookedForAnewEachTime) {
+  Database d;
+  Expect(Ask(nullptr, L"/two.vle"), S_OK, "third");
+  WriteBytes(d.database(),
+             "[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/two.vle\"\nKey = \"n\"\n");
+  Expect(Ask(nullptr, L"/two.vle"), S_OK, "n");
+  Database other("[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/two.vle\"\nKey = \"o\"\n");
+  Expect(Ask(nullptr, L"/two.vle"), S_OK, "o");
+}
+
+TEST(StringResource, StoredNamesCountUpToTheirLimit) {
+  // 259 bytes are read: what stands behind belongs to no name.
+  std::string deep = "/" + std::string(250, 'd') + "/";
+  Database d("[KORComponents]\nA = \"A\"\n[A]\nFileName = \"" + deep +
+             "1234567890\"\nKey = \"k\"\n");
+  Expect(Ask(nullptr, L"/1234567"), S_OK, "k");
+  Expect(Ask(nullptr, L"/1234567890"), E_FAIL, "(untouched)");
+}
+
+TEST(StringResource, ManyQuestionsReadTheDatabaseOnce) {
+  Database d;
+  EXPECT_EQ(InChild([&] {
+              vltStringResources resources;
+              auto ask = [&] {
+                TaskMem<char> out;
+                EXPECT_EQ(resources.get(nullptr, L"/two.vle", L"Key", out.out(), 100), S_OK);
+                return std::string(out.get());
+              };
+              EXPECT_EQ(ask(), "third");
+              WriteBytes(d.database(),
+                         "[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/two.vle\"\nKey = \"n\"\n");
+              EXPECT_EQ(ask(), "third");
+              resources.forget();
+              EXPECT_EQ(ask(), "n");
+            }),
+            0);
+}
+
+TEST(StringResource, BinaryOnesDoNotExist) { EXPECT_EQ(vltGetBinaryResource(), 0); }
+
+// ---- Warnings
+
+// What a child prints in an installation with these trace flags.
+std::string Printed(const std::string& flags, const std::function<void()>& body) {
+  TempDir out;
+  EXPECT_EQ(InChild([&] {
+              WriteBytes(vlLookUpInstallDirectory() + "/vlttrace.txt", flags);
+              ASSERT_TRUE(freopen((out / "text").c_str(), "w", stdout));
+              body();
+              fflush(stdout);
+            }),
+            0);
+  return ReadBytes(out / "text");
+}
+
+TEST(EarlyTrace, LinesHaveTheirForm) {
+  TempDir out;
+  std::string expected;
+  EXPECT_EQ(InChild([&] {
+              ASSERT_TRUE(freopen((out / "text").c_str(), "w", stdout));
+              vltEarlyTrace("source", 7, "text %s %d", "x", 5);
+              vltEarlyTrace("source", 8, "%s", std::string(5000, 'l').c_str());
+              fflush(stdout);
+              char line[200];
+              snprintf(line, sizeof line, "source(7) : trace %d %ld: text x 5\n",
+                       static_cast<int>(getpid()), static_cast<long>(pthread_self()));
+              EXPECT_EQ(ReadBytes(out / "text").substr(0, strlen(line)), line);
+            }),
+            0);
+  EXPECT_NE(ReadBytes(out / "text").find("source(8) : trace"), std::string::npos);
+}
+
+TEST(EarlyTrace, ResourcesWarnWhenAskedTo) {
+  struct Row {
+    const char* database;
+    int line;
+    std::string message;
+  };
+  const Row rows[] = {
+      {"", 152, "Warning: There should always be KORComponents"},
+      {"[KORComponents]\nA = \"A\"\n", 143,
+       "Warning: KORComponents section has component A but no section for this component in "
+       "vlt.vlr file"}};
+  for (const Row& row : rows) {
+    for (const char* flags : {"0 0", "1 0", "2 0", "3 9"}) {
+      Database d(row.database);
+      std::string text = Printed(flags, [] { Ask(nullptr, L"/a.vle"); });
+      if (*flags < '2') {
+        EXPECT_EQ(text, "") << flags;
+        continue;
+      }
+      EXPECT_EQ(text.find(std::string(kSource) + "(" + std::to_string(row.line) + ") : trace "), 0u)
+          << text;
+      EXPECT_NE(text.find(": " + row.message + "\n"), std::string::npos) << text;
+    }
+  }
+}
+
+TEST(EarlyTrace, AResourceThatCannotBeReadIsToldWhenAskedTo) {
+  Database d;
+  std::string text = Printed("2 0", [] { Ask(nullptr, L"/one.vle", L"Key", 0); });
+  EXPECT_EQ(text.find(std::string(kSource) + "(120) : trace "), 0u) << text;
+  EXPECT_NE(text.find(": Warning: Could not get string resource Key from section A, result = 0\n"),
+            std::string::npos)
+      << text;
+}
+
+TEST(EarlyTrace, AMissingInstallDirectoryIsToldWhenAskedTo) {
+  for (const char* flags : {"0 0", "1 0"}) {
+    Database d;
+    std::string text = Printed(flags, [] {
+      vltGetTraceFlags();
+      Installation::setDir("");
+      Expect(Ask(nullptr, L"/one.vle"), E_FAIL, "(untouched)");
+    });
+    if (*flags == '0') {
+      EXPECT_EQ(text, "");
+      continue;
+    }
+    EXPECT_EQ(text.find(std::string(kSource) + "(57) : trace "), 0u) << text;
+    // The message ends its line itself, and the form does once more.
+    const std::string end = ": Could not get path to KOR Data in getstringresourceimpl\n\n";
+    ASSERT_GT(text.size(), end.size());
+    EXPECT_EQ(text.substr(text.size() - end.size()), end);
+  }
+}
+
+TEST(EarlyTrace, AnswersDoNotDependOnTheFlags) {
+  for (const char* flags : {"0 0", "3 0"}) {
+    Database d;
+    WriteBytes(d.root() + "/vlttrace.txt", flags);
+    EXPECT_EQ(InChild([] {
+                Expect(Ask(";", L"/one.vle"), S_OK, "first;second");
+                Expect(Ask(nullptr, L"/one.vle", L"OnlyB"), E_FAIL, "(untouched)");
+                Expect(Ask(";", L"/one.vle", L"OnlyB"), S_OK, "b");
+              }),
+              0);
+  }
+}
+
+// ---- Flags
+
+unsigned Flags(const std::string& bytes) {
+  Installation i;
+  WriteBytes(i.root() + "/vlttrace.txt", bytes);
+  TempDir out;
+  EXPECT_EQ(InChild([&] { WriteBytes(out / "flags", std::to_string(vltGetTraceFlags())); }), 0);
+  return static_cast<unsigned>(std::stoul(ReadBytes(out / "flags")));
+}
+
+TEST(EarlyTrace, FlagsAreTwoNumbers) {
+  EXPECT_EQ(Flags("1 2"), 33u);
+  EXPECT_EQ(Flags("  3\n\t1\nmore"), 19u);
+  EXPECT_EQ(Flags("2"), 2u);
+  EXPECT_EQ(Flags(""), 0u);
+  EXPECT_EQ(Flags("words"), 0u);
+  EXPECT_EQ(Flags("1 words"), 1u);
+  EXPECT_EQ(Flags("16 1"), 16u);
+}
+
+TEST(EarlyTrace, FlagsAreReadOnce) {
+  Installation i;
+  EXPECT_EQ(InChild([&] {
+              EXPECT_EQ(vltGetTraceFlags(), 0u);
+              WriteBytes(i.root() + "/vlttrace.txt", "1 2");
+              EXPECT_EQ(vltGetTraceFlags(), 0u);
+            }),
+            0);
+}
+
+TEST(EarlyTrace, APipeInTheFlagsPlaceDoesNotHoldUp) {
+  Installation i;
+  ASSERT_EQ(mkfifo((i.root() + "/vlttrace.txt").c_str(), 0666), 0);
+  EXPECT_EQ(InChild([&] { EXPECT_EQ(vltGetTraceFlags(), 0u); }, 5000), 0);
+}
+
+// ---- The log directory
+
+TEST(LogDirectory, ForOthersThanTheSuperuser) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  TempDir home;
+  chmod(home.path().c_str(), 0777);
+  EXPECT_EQ(InChild([&] {
+              ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+              setenv("HOME", home.path().c_str(), 1);
+              ScopedUmask mask(077);
+              zt::fnd::AnsiString ini;
+              zt::fnd::String directory = vlCreateLogDirIfNeeded(ini);
+              std::string expected = home / "Library/Logs/KOR/";
+              EXPECT_EQ(std::string(zt::fnd::AnsiString(directory).c_str()), expected);
+              EXPECT_STREQ(ini.c_str(), "/Library/Application Support/Zentrex/KOR/Data/vldiag.ini");
+              EXPECT_EQ(ModeOf(home / "Library/Logs/KOR"), 0777);
+              EXPECT_EQ(ModeOf(home / "Library"), 0777);
+              // A home that gives no directory is no failure.
+              setenv("HOME", "", 1);
+              vlCreateLogDirIfNeeded(ini);
+              setenv("HOME", "/proc/nowhere", 1);
+              EXPECT_STREQ(zt::fnd::AnsiString(vlCreateLogDirIfNeeded(ini)).c_str(),
+                           "/proc/nowhere/Library/Logs/KOR/");
+            }),
+            0);
+}
+
+TEST(LogDirectory, WithoutAHomeItIsTheTemporaryOne) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  EXPECT_EQ(InChild([&] {
+              // The place is fixed; a user without the right to make it shows the text alone.
+              ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+              unsetenv("HOME");
+              zt::fnd::AnsiString ini;
+              bool there = Exists("/tmp/zentrex");
+              EXPECT_STREQ(zt::fnd::AnsiString(vlCreateLogDirIfNeeded(ini)).c_str(),
+                           "/tmp/zentrex/KOR/");
+              if (!there) std::filesystem::remove_all("/tmp/zentrex");
+            }),
+            0);
+}
+
+TEST(TracerOptions, ComeFromTheSectionThenFromAllComponentsThenFromDefaults) {
+  TempDir dir;
+  WriteBytes(dir / "x.ini",
+             "[AllComponents]\nSeverity = 5\nTarget = 6\nLowDiskThreshold = 7\n"
+             "[Own]\nSeverity = 2\nTarget = words\n[Whole]\nTarget = 8\nLowDiskThreshold = 9\n");
+  auto* ini = IniNew(0);
+  ASSERT_EQ(IniReadFromFile(ini, (dir / "x.ini").c_str()), 0);
+  unsigned severity = 0, target = 0, threshold = 0;
+  EXPECT_EQ(vlReadTracerOptions(ini, "Own", severity, target, &threshold), 7u);
+  EXPECT_EQ(severity, 2u);
+  EXPECT_EQ(target, 6u);
+  EXPECT_EQ(threshold, 7u);
+  vlReadTracerOptions(ini, "Whole", severity, target, &threshold);
+  EXPECT_EQ(severity, 5u);
+  EXPECT_EQ(target, 8u);
+  EXPECT_EQ(threshold, 9u);
+  EXPECT_EQ(vlReadTracerOptions(ini, "None", severity, target, nullptr), 6u);
+  IniDispose(ini);
+  auto* empty = IniNew(0);
+  vlReadTracerOptions(empty, "None", severity, target, &threshold);
+  EXPECT_EQ(severity, 1u);
+  EXPECT_EQ(target, 1u);
+  EXPECT_EQ(threshold, 0u);
+  IniDispose(empty);
+}
+
+}  // namespace
+}  // namespace vlt::test

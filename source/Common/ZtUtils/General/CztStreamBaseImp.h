@@ -1,0 +1,56 @@
+#pragma once
+
+#include <map>
+
+#include "source/Common/ZtUtils/General/ztStreamInterfaces.h"
+#include "zt/fnd/String.h"
+#include "ztcom/ztcore/ztcom.h"
+
+class CztMemoryStream;
+
+using CztSubStreamMap = std::map<zt::fnd::String, CztComPtr<CztMemoryStream>>;
+
+// The sub-streams of every stream, over the five byte operations of the class derived from it.
+//
+// Sub-streams are memory streams, in the order of their names, and may have sub-streams of their
+// own. Areas within areas are read and written up to kDeepestArea levels: reading throws
+// CztStreamException and writing gives E_INVALIDARG beyond, since each level costs stack.
+class CztStreamBaseImp : public IztStream3, public CZTComObjectRootEx<CZTComMultiThreadModelNoCS> {
+ public:
+  // Stands behind the sub-streams, in front of the offset of their first byte.
+  static const GUID s_SubStreamMarker;
+  static constexpr unsigned kDeepestArea = 256;
+
+  static const _ZTCOM_INTMAP_ENTRY* _GetEntries();
+
+  HRESULT LoadSubStreamInfo(int writable) override;
+  HRESULT WriteSubStreamInfo() override;
+  HRESULT OpenSubStream(const wchar_t* name, IztStream** out) override;
+  HRESULT CreateSubStream(const wchar_t* name, IztStream** out) override;
+  HRESULT DeleteSubStream(const wchar_t* name) override;
+  HRESULT ResetStreams() override;
+  HRESULT ClearStreams() override;
+  HRESULT NumSubStreams(unsigned int* count) override;
+  HRESULT GetSubStreamInfo(wchar_t*** names, unsigned int* count) override;
+  HRESULT Clone(IztStream* target) override;
+
+ protected:
+  CztStreamBaseImp();
+  ~CztStreamBaseImp();
+  CztStreamBaseImp(const CztStreamBaseImp&) = delete;
+  CztStreamBaseImp& operator=(const CztStreamBaseImp&) = delete;
+
+  // LoadSubStreamInfo of a stream that lies `depth` areas below the outermost one.
+  HRESULT loadSubStreams(bool writable, unsigned depth);
+
+ private:
+  HRESULT loadArea(int64_t offset, int64_t areaEnd, unsigned depth);
+  HRESULT cutArea();
+  bool nestsDeeperThan(unsigned levels) const;
+
+  CztSubStreamMap m_subStreams;
+  bool m_subStreamsLoaded = false;
+  bool m_subStreamsWritten = false;
+  bool m_subStreamsWritable = true;
+  int64_t m_subStreamInfoOffset = -1;  // of the area's header; -1 for none
+};

@@ -1,0 +1,147 @@
+#include "source/Common/ZtUtils/General/ztSubStreamArea.h"
+
+#include <string.h>
+
+#include <new>
+
+#include "source/Common/ZtUtils/General/CztMemoryStream.h"
+#include "source/Common/ZtUtils/General/ztTypedStream.h"
+
+namespace {
+
+constexpr int64_t kHeaderSize = 13;
+constexpr int64_t kCountSize = 4;
+constexpr int64_t kDataLengthSize = 4;
+constexpr uint64_t kLongestName = UINT32_MAX / sizeof(wchar_t) - 1;  // and a terminator
+constexpr size_t kMost = INT32_MAX;
+
+// Reads an area value by value and knows how many of its bytes are left.
+class AreaReader {
+ public:
+  AreaReader(IztStream* stream, int64_t sizeBytes)
+      : m_left(sizeBytes - kHeaderSize), m_in(stream) {}
+
+  int32_t readCount() {
+    take(kCountSize);
+    int32_t count = 0;
+    m_in >> count;
+    if (count < 0 || count > m_left / kSmallestEntry) throw CztStreamException();
+    return count;
+  }
+
+  CztSubStreamBlock readEntry() {
+    CztSubStreamBlock entry;
+    entry.name = readName();
+    entry.sizeBytes = readDataLength();
+    entry.data = readData(entry.sizeBytes);
+    return entry;
+  }
+
+ private:
+  // The reader's width for a name's length is that of long.
+  static constexpr int64_t kSmallestEntry = sizeof(unsigned long) + kDataLengthSize;
+
+  void take(int64_t sizeBytes) {
+    if (m_left < sizeBytes) throw CztEndOfStreamException();
+    m_left -= sizeBytes;
+  }
+
+  // The characters are never reversed: they are in the reader's own order.
+  zt::fnd::String readName() {
+    take(sizeof(unsigned long));
+    uint64_t length = m_in.ReadLong();
+    uint64_t there = static_cast<uint64_t>(m_left) / sizeof(wchar_t);
+    if (length > there || length > kLongestName) throw CztStreamException();
+    auto count = static_cast<uint32_t>(length);
+    take(static_cast<int64_t>(count * sizeof(wchar_t)));
+    std::vector<wchar_t> characters(count);
+    readBytes(characters.data(), static_cast<uint32_t>(count * sizeof(wchar_t)));
+    return zt::fnd::String(characters.data(), count);
+  }
+
+  uint32_t readDataLength() {
+    take(kDataLengthSize);
+    int32_t length = 0;
+    m_in >> length;
+    if (length < 0 || length > m_left) throw CztStreamException();
+    return static_cast<uint32_t>(length);
+  }
+
+  CztOwnedBlock readData(uint32_t sizeBytes) {
+    take(sizeBytes);
+    // Never a block of 0 bytes, which some heaps answer with null.
+    CztOwnedBlock data(static_cast<unsigned char*>(malloc(sizeBytes > 0 ? sizeBytes : 1)));
+    if (!data) throw std::bad_alloc();
+    readBytes(data.get(), sizeBytes);
+    return data;
+  }
+
+  void readBytes(void* bytes, uint32_t count) {
+    if (count > 0) ztReadStreamBytes(m_in.GetStream(), bytes, count);
+  }
+
+  int64_t m_left;
+  CztInStream m_in;
+};
+
+void WriteBytes(IztStream* stream, const void* bytes, uint32_t count) {
+  if (count > 0) ztWriteStreamBytes(stream, bytes, count);
+}
+
+HRESULT WriteEntry(CztOutStream& out, const zt::fnd::String& name, CztMemoryStream& subStream) {
+  HRESULT result = subStream.WriteSubStreamInfo();
+  if (result < 0) return result;
+  int64_t size = 0;
+  subStream.Seek(0, ztSeekEnd, &size);
+  if (static_cast<uint64_t>(size) > kMost) return E_INVALIDARG;
+  out << name.length();
+  WriteBytes(out.GetStream(), name.c_str(), name.length() * uint32_t{sizeof(wchar_t)});
+  out << static_cast<int32_t>(size);
+  WriteBytes(out.GetStream(), subStream.GetBuffer(), static_cast<uint32_t>(size));
+  return S_OK;
+}
+
+}  // namespace
+
+bool ReadSubStreamTrailer(IztStream* stream, int64_t streamSize, int64_t* offset) {
+  unsigned char trailer[kSubStreamTrailerSize];
+  stream->Seek(streamSize - kSubStreamTrailerSize, ztSeekBegin, nullptr);
+  ztReadStreamBytes(stream, trailer, sizeof trailer);
+  const GUID& marker = CztStreamBaseImp::s_SubStreamMarker;
+  memcpy(offset, trailer + sizeof marker, sizeof *offset);
+  return memcmp(trailer, &marker, sizeof marker) == 0 && *offset != -1;
+}
+
+std::vector<CztSubStreamBlock> ReadSubStreamArea(IztStream* stream, int64_t offset,
+                                                 int64_t areaEnd) {
+  if (offset < 0 || offset > areaEnd - kHeaderSize) throw CztStreamException();
+  stream->Seek(offset, ztSeekBegin, nullptr);
+  AreaReader reader(stream, areaEnd - offset);
+  std::vector<CztSubStreamBlock> blocks;
+  for (int32_t left = reader.readCount(); left > 0; --left) blocks.push_back(reader.readEntry());
+  return blocks;
+}
+
+CztSubStreamMap AttachSubStreams(std::vector<CztSubStreamBlock> blocks, unsigned depth) {
+  CztSubStreamMap subStreams;
+  for (CztSubStreamBlock& block : blocks) {
+    auto stream = CztComPtr<CztMemoryStream>::Attach(CztMemoryStream::CreateStream());
+    if (!stream) throw std::bad_alloc();
+    stream->attachNested(block.data.release(), block.sizeBytes, depth);
+    subStreams.insert_or_assign(block.name, stream);
+  }
+  return subStreams;
+}
+
+HRESULT WriteSubStreamArea(IztStream* stream, const CztSubStreamMap& subStreams, int64_t start) {
+  if (subStreams.size() > kMost) return E_INVALIDARG;
+  CztOutStream out(stream, 1, 0, 0);
+  out << static_cast<int32_t>(subStreams.size());
+  for (const auto& [name, subStream] : subStreams) {
+    HRESULT result = WriteEntry(out, name, *subStream.get());
+    if (result < 0) return result;
+  }
+  WriteBytes(stream, &CztStreamBaseImp::s_SubStreamMarker, sizeof(GUID));
+  WriteBytes(stream, &start, sizeof start);
+  return S_OK;
+}

@@ -1,0 +1,125 @@
+#include <algorithm>
+#include <cstdint>
+#include <limits>
+
+#include "source/Common/ZtUtils/General/ztSync.h"
+
+namespace Toolyard {
+namespace {
+
+constexpr int kNoLimit = -1;
+
+void WaitFor(const zt::fnd::osdep::PumpEvent& event, int timeoutMs, bool pumpMsgs) {
+  if (timeoutMs == kNoLimit) {
+    event.wait(pumpMsgs);
+  } else {
+    // Widened without the sign: the event takes no more than 32 bits.
+    event.wait(static_cast<unsigned long>(static_cast<std::uint32_t>(timeoutMs)), pumpMsgs);
+  }
+}
+
+// Gives a mutex back at the end, unless it is to be kept.
+class MutexRelease {
+ public:
+  explicit MutexRelease(const zt::fnd::osdep::Mutex& mutex) : m_mutex(&mutex) {}
+  ~MutexRelease() {
+    if (m_mutex != nullptr) m_mutex->unlock();
+  }
+  MutexRelease(const MutexRelease&) = delete;
+  MutexRelease& operator=(const MutexRelease&) = delete;
+  void keep() { m_mutex = nullptr; }
+
+ private:
+  const zt::fnd::osdep::Mutex* m_mutex;
+};
+
+}  // namespace
+
+// ---- CztEvent
+
+CztEvent::CztEvent(const char* name, bool initialState, bool manualReset)
+    : m_event(manualReset, initialState, true), m_name(name != nullptr ? name : "") {}
+
+CztEvent::CztEvent(bool pumpMsgs, const char* name, bool initialState, bool manualReset)
+    : CztEvent(name, initialState, manualReset) {
+  m_pumpMsgs = pumpMsgs;
+}
+
+bool CztEvent::Lock(int timeoutMs) {
+  WaitFor(m_event, timeoutMs, m_pumpMsgs);
+  return true;
+}
+
+bool CztEvent::Unlock() {
+  m_event.set();
+  return true;
+}
+
+// ---- CztSemaphore
+
+CztSemaphore::CztSemaphore(const wchar_t* name, int maximum, int initial)
+    : m_count(initial),
+      m_maximum(maximum),
+      m_event(true, false, true),
+      m_name(name != nullptr ? name : L"") {}
+
+bool CztSemaphore::Lock(int timeoutMs) {
+  while (!take()) WaitFor(m_event, timeoutMs, m_pumpMsgs);
+  return true;
+}
+
+bool CztSemaphore::take() const {
+  zt::fnd::osdep::CriticalSectionGuard guard(m_section);
+  if (m_count <= 0) return false;
+  if (--m_count == 0) m_event.reset();
+  return true;
+}
+
+bool CztSemaphore::Unlock() {
+  Release(1);
+  return true;
+}
+
+int CztSemaphore::Release(int n) {
+  zt::fnd::osdep::CriticalSectionGuard guard(m_section);
+  const std::int32_t before = m_count;
+  const std::int64_t sum = std::max<std::int64_t>(static_cast<std::int64_t>(before) + n,
+                                                  std::numeric_limits<std::int32_t>::min());
+  m_count = static_cast<std::int32_t>(std::min<std::int64_t>(sum, m_maximum));
+  // With nothing left a set event would keep the waiters running in circles.
+  if (m_count > 0) {
+    m_event.set();
+  } else {
+    m_event.reset();
+  }
+  return before;
+}
+
+// ---- CztStatefulMutex
+
+CztStatefulMutex::CztStatefulMutex(const zt::fnd::String& name)
+    : m_mutex(name + L"-mutex"), m_event(name + L"-event", true, false) {}
+
+bool CztStatefulMutex::Lock(int timeoutMs) { return LockAndSetState(true, timeoutMs); }
+
+bool CztStatefulMutex::Unlock() { return UnlockAndResetState(true); }
+
+bool CztStatefulMutex::LockAndSetState(bool setState, int wait) {
+  if (wait != 0) {
+    m_mutex.lock();
+  } else if (!m_mutex.tryLock()) {
+    return false;
+  }
+  MutexRelease release(m_mutex);
+  if (setState) m_event.set();
+  release.keep();
+  return true;
+}
+
+bool CztStatefulMutex::UnlockAndResetState(bool resetState) {
+  MutexRelease release(m_mutex);
+  if (resetState) m_event.reset();
+  return true;
+}
+
+}  // namespace Toolyard

@@ -1,0 +1,415 @@
+#include "source/Common/ZtUtils/General/ztSync.h"
+
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/ipc.h>
+#include <sys/sem.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <chrono>
+#include <ctime>
+#include <future>
+#include <limits>
+#include <memory>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "tests/support/Child.h"
+#include "tests/support/EventPlace.h"
+#include "tests/support/PosixErrorOf.h"
+#include "tests/support/TempDir.h"
+
+namespace Toolyard {
+namespace {
+
+using vlt::test::BlockedIn;
+using vlt::test::Child;
+using vlt::test::EventPlace;
+using vlt::test::Eventually;
+using vlt::test::Keeper;
+using vlt::test::PosixErrorOf;
+using zt::fnd::String;
+using Clock = std::chrono::steady_clock;
+
+long MsSince(Clock::time_point begin) {
+  return static_cast<long>(
+      std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - begin).count());
+}
+
+// A process that waits in the kernel for the lock of a file.
+bool WaitsForFile(const Child& child) { return BlockedIn(child.pid(), SYS_flock); }
+
+struct Described : CztSyncObject {
+  int locks = 0;
+  bool Lock(int) override { return ++locks > 0; }
+  bool Unlock() override { return --locks == 0; }
+  bool pumps() const { return m_pumpMsgs; }
+};
+
+TEST(Sync, BaseKeepsThePumpFlagWhichBeginsFalse) {
+  Described object;
+  EXPECT_FALSE(object.pumps());
+  object.SetPumpMsgs(true);
+  EXPECT_TRUE(object.pumps());
+}
+
+TEST(Sync, HoldLocksAndUnlocksThroughTheBase) {
+  Described object;
+  {
+    CztHold hold(object);
+    EXPECT_EQ(1, object.locks);
+  }
+  EXPECT_EQ(0, object.locks);
+}
+
+// ---- CztCS
+
+TEST(SyncCS, IsRecursiveAndExcludesOtherThreads) {
+  CztCS section;
+  EXPECT_TRUE(section.Lock(0));
+  EXPECT_TRUE(section.Lock(-1));
+  std::atomic<bool> entered{false};
+  std::thread other([&] {
+    EXPECT_TRUE(section.Lock(0));  // the timeout is ignored
+    entered = true;
+    section.Unlock();
+  });
+  EXPECT_TRUE(section.Unlock());
+  std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  EXPECT_FALSE(entered);
+  EXPECT_TRUE(section.Unlock());
+  other.join();
+  EXPECT_TRUE(entered);
+}
+
+// ---- CztMutex
+
+TEST(SyncMutex, NullAndEmptyNamesAreOneAcrossProcesses) {
+  EventPlace place;
+  CztMutex null(nullptr, false), named(L"UNNAMED_MUTEX", false);
+  null.Lock(-1);
+  Child other([] {
+    CztMutex empty(L"", false);
+    empty.Lock(-1);
+    return 0;
+  });
+  ASSERT_TRUE(Eventually([&] { return WaitsForFile(other); }));
+  null.Unlock();
+  EXPECT_EQ(0, other.wait());
+  named.Lock(-1);
+  Child another([] {
+    CztMutex mutex(nullptr, true);
+    return 0;
+  });
+  ASSERT_TRUE(Eventually([&] { return WaitsForFile(another); }));
+  named.Unlock();
+  EXPECT_EQ(0, another.wait());
+}
+
+TEST(SyncMutex, LockOfZeroBlocks) {
+  EventPlace place;
+  CztMutex mutex(L"name", true);
+  Child other([] { return CztMutex(L"name", false).Lock(0) ? 0 : 1; });
+  ASSERT_TRUE(Eventually([&] { return WaitsForFile(other); }));
+  EXPECT_TRUE(mutex.Unlock());
+  EXPECT_EQ(0, other.wait());
+}
+
+TEST(SyncMutex, InitiallyOwnedAndRecursive) {
+  EventPlace place;
+  CztMutex mutex(true, L"name", true);
+  EXPECT_TRUE(mutex.Lock(5));
+  EXPECT_TRUE(mutex.Unlock());
+  Child other([] { return CztMutex(L"name", true).Unlock() ? 0 : 1; });
+  ASSERT_TRUE(Eventually([&] { return WaitsForFile(other); }));
+  EXPECT_TRUE(mutex.Unlock());
+  EXPECT_EQ(0, other.wait());
+}
+
+TEST(SyncMutex, FailureOfThePrimitivePassesThrough) {
+  EventPlace place;
+  const std::string name(256, 'n');
+  EXPECT_EQ(ENAMETOOLONG, PosixErrorOf([&] { CztMutex m(String(name.c_str()).c_str(), true); }));
+}
+
+// ---- CztEvent
+
+TEST(SyncEvent, LockOfAnUnsetEventIsTrueAfterItsTime) {
+  CztEvent event("name", false, true);
+  auto begin = Clock::now();
+  EXPECT_TRUE(event.Lock(100));
+  EXPECT_GE(MsSince(begin), 99);
+  EXPECT_TRUE(event.Lock(0));
+}
+
+TEST(SyncEvent, InitialStateComesBeforeManualReset) {
+  auto begin = Clock::now();
+  CztEvent set("name", true, true);
+  EXPECT_TRUE(set.Lock(20000));
+  EXPECT_TRUE(set.Lock(20000));  // manual: stays set
+  CztEvent automatic(true, "name", true, false);
+  EXPECT_TRUE(automatic.Lock(20000));
+  EXPECT_LT(MsSince(begin), 15000);
+  begin = Clock::now();
+  EXPECT_TRUE(automatic.Lock(50));  // was cleared by the first
+  EXPECT_GE(MsSince(begin), 49);
+}
+
+TEST(SyncEvent, UnlockSetsAndEndsAWaitWithoutLimit) {
+  CztEvent event(nullptr, false, false);
+  std::atomic<bool> released{false};
+  std::thread waiter([&] {
+    EXPECT_TRUE(event.Lock(-1));
+    released = true;
+  });
+  std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  EXPECT_FALSE(released);
+  EXPECT_TRUE(event.Unlock());
+  waiter.join();
+}
+
+TEST(SyncEvent, OtherNegativeTimeoutsAreLongOnes) {
+  CztEvent event("name", false, false);
+  std::atomic<bool> released{false};
+  std::thread waiter([&] {
+    EXPECT_TRUE(event.Lock(-2));
+    EXPECT_TRUE(event.Lock(std::numeric_limits<int>::min()));
+    released = true;
+  });
+  std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  EXPECT_FALSE(released);
+  event.Unlock();
+  while (!released) {
+    event.Unlock();
+    std::this_thread::yield();
+  }
+  waiter.join();
+}
+
+// ---- CztSemaphore
+
+TEST(SyncSemaphore, ReleaseClampsToTheMaximumAndTellsTheOldCount) {
+  CztSemaphore semaphore(L"name", 2, 1);
+  EXPECT_EQ(1, semaphore.Release(5));
+  EXPECT_EQ(2, semaphore.Release(0));
+  EXPECT_EQ(2, semaphore.Release(std::numeric_limits<int>::max()));
+  EXPECT_EQ(2, semaphore.Release(1));
+}
+
+TEST(SyncSemaphore, FullFromTheBeginDoesNotWait) {
+  CztSemaphore semaphore(L"name", 2, 2);
+  auto begin = Clock::now();
+  EXPECT_TRUE(semaphore.Lock(20000));
+  EXPECT_TRUE(semaphore.Lock(-1));
+  EXPECT_LT(MsSince(begin), 15000);
+  EXPECT_EQ(0, semaphore.Release(0));
+}
+
+TEST(SyncSemaphore, TimeoutLimitsEachWaitAndNotTheCall) {
+  CztSemaphore semaphore(nullptr, 1, 0);
+  std::atomic<bool> got{false};
+  std::thread waiter([&] {
+    EXPECT_TRUE(semaphore.Lock(10));
+    got = true;
+  });
+  std::this_thread::sleep_for(std::chrono::milliseconds(80));
+  EXPECT_FALSE(got);
+  EXPECT_TRUE(semaphore.Unlock());
+  waiter.join();
+  EXPECT_EQ(0, semaphore.Release(0));
+}
+
+TEST(SyncSemaphore, ReleaseWakesAsManyAsThereAreUnits) {
+  CztSemaphore semaphore(L"name", 10, 0);
+  std::atomic<int> got{0};
+  std::vector<std::thread> waiters;
+  for (int i = 0; i < 4; ++i) {
+    waiters.emplace_back([&] {
+      semaphore.Lock(-1);
+      ++got;
+    });
+  }
+  EXPECT_EQ(0, semaphore.Release(3));
+  EXPECT_TRUE(Eventually([&] { return got == 3; }));
+  std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  EXPECT_EQ(3, got);
+  semaphore.Release(1);
+  for (auto& waiter : waiters) waiter.join();
+  EXPECT_EQ(0, semaphore.Release(0));
+}
+
+// A set event with nothing to take would keep the waiter awake.
+TEST(SyncSemaphore, ReleaseOfNothingLeavesWaitersAsleep) {
+  CztSemaphore semaphore(L"name", 10, 0);
+  std::promise<clockid_t> clock;
+  std::thread waiter([&] {
+    clockid_t id;
+    pthread_getcpuclockid(pthread_self(), &id);
+    clock.set_value(id);
+    semaphore.Lock(-1);
+  });
+  clockid_t id = clock.get_future().get();
+  EXPECT_EQ(0, semaphore.Release(0));
+  std::this_thread::sleep_for(std::chrono::milliseconds(200));
+  timespec used;
+  clock_gettime(id, &used);
+  EXPECT_LT(used.tv_sec * 1000 + used.tv_nsec / 1000000, 50);
+  semaphore.Release(1);
+  waiter.join();
+}
+
+TEST(SyncSemaphore, NegativeReleasesAreDebts) {
+  CztSemaphore semaphore(L"name", 5, 1);
+  EXPECT_EQ(1, semaphore.Release(-3));
+  EXPECT_EQ(-2, semaphore.Release(std::numeric_limits<int>::min()));
+  EXPECT_EQ(std::numeric_limits<int>::min(), semaphore.Release(std::numeric_limits<int>::max()));
+  EXPECT_EQ(-1, semaphore.Release(2));
+  EXPECT_TRUE(semaphore.Lock(-1));
+  EXPECT_EQ(0, semaphore.Release(0));
+}
+
+TEST(SyncSemaphore, UnitsAreNeitherLostNorMade) {
+  CztSemaphore semaphore(L"name", 3, 3);
+  std::atomic<int> inside{0}, most{0};
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 6; ++t) {
+    threads.emplace_back([&] {
+      for (int i = 0; i < 300; ++i) {
+        CztHold hold(semaphore);
+        int now = ++inside;
+        for (int seen = most; now > seen && !most.compare_exchange_weak(seen, now);) {
+        }
+        std::this_thread::yield();
+        --inside;
+      }
+    });
+  }
+  for (auto& thread : threads) thread.join();
+  EXPECT_LE(most, 3);
+  EXPECT_EQ(3, semaphore.Release(0));
+}
+
+// ---- CztStatefulMutex
+
+using zt::fnd::osdep::NamedEvent;
+
+TEST(SyncStatefulMutex, OthersSeeInTheEventWhetherItIsHeld) {
+  EventPlace place;
+  CztStatefulMutex mutex(L"name");
+  Keeper observer([] { return std::make_unique<NamedEvent>(L"name-event", true, false); });
+  ASSERT_TRUE(observer.good());
+  NamedEvent event(L"name-event", true, true);  // joins; its initial state is ignored
+  EXPECT_FALSE(event.checkOnly());
+  EXPECT_TRUE(mutex.Lock(-1));
+  EXPECT_TRUE(event.checkOnly());
+  EXPECT_TRUE(event.check());  // manual: looking changes nothing
+  EXPECT_TRUE(mutex.Unlock());
+  EXPECT_FALSE(event.checkOnly());
+}
+
+TEST(SyncStatefulMutex, NamesOfItsParts) {
+  EventPlace place;
+  CztStatefulMutex mutex(L"name");
+  EXPECT_EQ((std::vector<std::string>{"name-event", "sem_1"}), place.files());
+  EXPECT_TRUE(
+      vlt::test::Exists(std::string(getenv("ZTFNDTMPSHAREDFILEDIR")) + "/mutex/name-mutex"));
+}
+
+TEST(SyncStatefulMutex, LockWithoutStateLeavesTheEventAlone) {
+  EventPlace place;
+  CztStatefulMutex mutex(L"name");
+  NamedEvent event(L"name-event", true, false);
+  EXPECT_TRUE(mutex.LockAndSetState(false, 1));
+  EXPECT_FALSE(event.checkOnly());
+  Child other([] { return CztStatefulMutex(L"name").LockAndSetState(true, 0) ? 1 : 0; });
+  EXPECT_EQ(0, other.wait());
+  EXPECT_FALSE(event.checkOnly());
+  event.set();
+  EXPECT_TRUE(mutex.UnlockAndResetState(false));
+  EXPECT_TRUE(event.checkOnly());
+}
+
+TEST(SyncStatefulMutex, WaitOfZeroTries) {
+  EventPlace place;
+  CztStatefulMutex mutex(L"name");
+  EXPECT_TRUE(mutex.LockAndSetState(true, 0));
+  Child other([] {
+    CztStatefulMutex mine(L"name");
+    if (mine.LockAndSetState(true, 0)) return 1;
+    return mine.Lock(0) ? 2 : 0;
+  });
+  EXPECT_EQ(0, other.wait());
+  EXPECT_TRUE(mutex.Unlock());
+  Child next([] { return CztStatefulMutex(L"name").Lock(0) ? 0 : 1; });
+  EXPECT_EQ(0, next.wait());
+}
+
+TEST(SyncStatefulMutex, AnyOtherWaitIsWithoutLimit) {
+  EventPlace place;
+  CztStatefulMutex mutex(L"name");
+  mutex.Lock(-1);
+  Child other([] { return CztStatefulMutex(L"name").Lock(1) ? 0 : 1; });
+  ASSERT_TRUE(Eventually([&] { return WaitsForFile(other); }));
+  std::this_thread::sleep_for(std::chrono::milliseconds(50));
+  EXPECT_TRUE(other.running());
+  mutex.Unlock();
+  EXPECT_EQ(0, other.wait());
+}
+
+TEST(SyncStatefulMutex, HolderThatDiesLeavesTheLockFreeAndTheEventSet) {
+  EventPlace place;
+  NamedEvent event(L"name-event", true, false);
+  Keeper holder([] {
+    auto mutex = std::make_unique<CztStatefulMutex>(L"name");
+    mutex->Lock(-1);
+    return mutex;
+  });
+  ASSERT_TRUE(holder.good());
+  EXPECT_TRUE(event.checkOnly());
+  holder.kill();
+  EXPECT_TRUE(event.checkOnly());
+  CztStatefulMutex mutex(L"name");
+  EXPECT_TRUE(mutex.Lock(0));
+  EXPECT_TRUE(mutex.Unlock());
+  EXPECT_FALSE(event.checkOnly());
+}
+
+TEST(SyncStatefulMutex, EventThatFailsLeavesNoLockBehind) {
+  EventPlace place;
+  CztStatefulMutex mutex(L"name");
+  auto freeElsewhere = [] {
+    return Child([] {
+             CztMutex other(L"name-mutex", false);
+             alarm(5);
+             return other.Lock(0) ? 0 : 1;
+           }).wait() == 0;
+  };
+  mutex.LockAndSetState(true, 1);
+  ASSERT_EQ(0, semctl(place.setOf(1), 0, IPC_RMID));
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { mutex.UnlockAndResetState(true); }));
+  EXPECT_TRUE(freeElsewhere());
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { mutex.LockAndSetState(true, 1); }));
+  EXPECT_TRUE(freeElsewhere());
+  EXPECT_EQ(EINVAL, PosixErrorOf([&] { mutex.LockAndSetState(true, 0); }));
+  EXPECT_TRUE(freeElsewhere());
+  EXPECT_TRUE(mutex.LockAndSetState(false, 1));
+  EXPECT_TRUE(mutex.UnlockAndResetState(false));
+}
+
+TEST(SyncStatefulMutex, ConstructorThatFailsCleansUp) {
+  EventPlace place;
+  { CztStatefulMutex mutex(L"warm up"); }
+  int descriptors = vlt::test::OpenDescriptors();
+  // The mutex can be made, the event not: its name is one of the other kind.
+  NamedEvent taken(L"name-event", false, false);
+  int with = vlt::test::OpenDescriptors();
+  EXPECT_EQ(EINVAL, PosixErrorOf([] { CztStatefulMutex mutex(L"name"); }));
+  EXPECT_EQ(with, vlt::test::OpenDescriptors());
+  EXPECT_GT(with, descriptors);
+}
+
+}  // namespace
+}  // namespace Toolyard

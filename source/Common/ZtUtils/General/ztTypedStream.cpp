@@ -1,0 +1,136 @@
+#include "source/Common/ZtUtils/General/ztTypedStream.h"
+
+#include <algorithm>
+
+#include "ztcom/ztcore/ztcom.h"
+
+namespace {
+
+// Long texts are read piece by piece, so that a length that is not true costs no memory.
+constexpr uint64_t kTextPiece = 64 * 1024;
+constexpr uint64_t kLongestText = 0xFFFFFFFF;
+
+CztComPtr<IztStream2> SubStreamsOf(IztStream* stream) {
+  return CztComPtr<IztStream2>::Attach(ZtTryQueryInterface<IztStream2>(IID_IztStream2, stream));
+}
+
+}  // namespace
+
+void ztReadStreamBytes(IztStream* stream, void* bytes, unsigned int count) {
+  HRESULT result = stream->Read(bytes, count, nullptr);
+  if (result == ZT_E_END_OF_STREAM) throw CztEndOfStreamException();
+  if (result < 0) throw CztStreamException();
+}
+
+void ztWriteStreamBytes(IztStream* stream, const void* bytes, unsigned int count) {
+  if (stream->Write(bytes, count, nullptr) < 0) throw CztStreamException();
+}
+
+constinit int32_t CztStreamBase::s_ModuleMajorVersion = 0;
+constinit int32_t CztStreamBase::s_ModuleMinorVersion = 0;
+constinit int32_t CztStreamBase::s_ModuleSequenceNumber = 0;
+constinit const int32_t CztStreamBase::s_SystemByteOrder = 0;
+
+CztStreamBase::CztStreamBase(IztStream* stream)
+    : m_stream(stream),
+      m_majorVersion(s_ModuleMajorVersion),
+      m_minorVersion(s_ModuleMinorVersion),
+      m_sequenceNumber(s_ModuleSequenceNumber),
+      m_byteOrder(s_SystemByteOrder) {}
+
+void CztStreamBase::SetModuleStreamVersion(int major, int minor, int sequence) {
+  s_ModuleMajorVersion = major;
+  s_ModuleMinorVersion = minor;
+  s_ModuleSequenceNumber = sequence;
+}
+
+CztOutStream::CztOutStream(IztStream* stream) : CztStreamBase(stream) { writeHeader(); }
+
+CztOutStream::CztOutStream(IztStream* stream, int major, int minor, int sequence)
+    : CztStreamBase(stream) {
+  m_majorVersion = major;
+  m_minorVersion = minor;
+  m_sequenceNumber = sequence;
+  writeHeader();
+}
+
+CztOutStream::CztOutStream(const CztOutStream& outer) : CztOutStream(outer.m_stream) {}
+
+CztOutStream::CztOutStream(const CztOutStream& outer, int major, int minor, int sequence)
+    : CztOutStream(outer.m_stream, major, minor, sequence) {}
+
+void CztOutStream::writeHeader() {
+  *this << static_cast<unsigned char>(m_byteOrder) << m_majorVersion << m_minorVersion
+        << m_sequenceNumber;
+}
+
+CztOutStream& CztOutStream::operator<<(const zt::fnd::AnsiString& text) {
+  *this << text.length();
+  if (!text.empty()) ztWriteStreamBytes(m_stream, text.c_str(), text.length());
+  return *this;
+}
+
+CztOutStream& CztOutStream::operator<<(const GUID& guid) {
+  *this << guid.Data1 << guid.Data2 << guid.Data3;
+  for (unsigned char byte : guid.Data4) *this << byte;
+  return *this;
+}
+
+IztStream* CztOutStream::CreateSubStream(const zt::fnd::String& name) {
+  IztStream* out = nullptr;
+  CztComPtr<IztStream2> streams = SubStreamsOf(m_stream);
+  return streams && streams->CreateSubStream(name.c_str(), &out) >= 0 ? out : nullptr;
+}
+
+CztInStream::CztInStream(IztStream* stream) : CztStreamBase(stream) { readHeader(); }
+CztInStream::CztInStream(CztInStream& outer) : CztInStream(outer.m_stream) {}
+
+void CztInStream::readHeader() {
+  unsigned char order = 0;
+  ztReadStreamBytes(m_stream, &order, sizeof order);
+  m_byteOrder = order;
+  *this >> m_majorVersion >> m_minorVersion >> m_sequenceNumber;
+}
+
+void CztInStream::readNumber(void* number, unsigned int sizeBytes) {
+  ztReadStreamBytes(m_stream, number, sizeBytes);
+  if (m_byteOrder == s_SystemByteOrder) return;
+  auto* bytes = static_cast<unsigned char*>(number);
+  std::reverse(bytes, bytes + sizeBytes);
+}
+
+uint64_t CztInStream::ReadLong() {
+  unsigned long number = 0;
+  readNumber(&number, sizeof number);
+  return number;
+}
+
+CztInStream& CztInStream::operator>>(zt::fnd::AnsiString& text) {
+  uint64_t left = ReadLong();
+  if (left > kLongestText) throw CztStreamException();
+  zt::fnd::AnsiString read;
+  while (left > 0) {
+    auto piece = static_cast<unsigned int>(std::min(left, kTextPiece));
+    unsigned int start = read.length();
+    read.append(piece, '\0');
+    ztReadStreamBytes(m_stream, read.begin() + start, piece);
+    left -= piece;
+  }
+  text = read;
+  return *this;
+}
+
+CztInStream& CztInStream::operator>>(GUID& guid) {
+  GUID read = {};
+  read.Data1 = static_cast<uint32_t>(ReadLong());
+  *this >> read.Data2 >> read.Data3;
+  for (unsigned char& byte : read.Data4) *this >> byte;
+  guid = read;
+  return *this;
+}
+
+IztStream* CztInStream::OpenSubStream(const zt::fnd::String& name) {
+  IztStream* out = nullptr;
+  CztComPtr<IztStream2> streams = SubStreamsOf(m_stream);
+  return streams && streams->OpenSubStream(name.c_str(), &out) >= 0 ? out : nullptr;
+}

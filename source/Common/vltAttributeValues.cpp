@@ -1,0 +1,291 @@
+#include "source/Common/vltAttributeValues.h"
+
+#include <stdlib.h>
+
+#include <algorithm>
+
+#include "source/Common/vltFailure.h"
+#include "source/Common/vltcmn.h"
+#include "source/Utilities/vltHookPoints.h"
+#include "source/Utilities/vltTestHook.h"
+#include "ztcom/ztcore/ztcom.h"
+
+namespace {
+
+using zt::fnd::String;
+
+template <class T>
+using ValueGetter = HRESULT (IvltObject::*)(vltAttributeID, T*);
+template <class T>
+using ArrayGetter = HRESULT (IvltObject::*)(vltAttributeID, uint32_t capacity, T* buffer,
+                                            uint32_t* count);
+
+// A step that hands out an interface. A failed one hands out no reference, whatever it wrote.
+template <class I, class Step>
+HRESULT Obtain(CztComPtr<I>* out, Step step) {
+  I* found = nullptr;
+  HRESULT result = step(&found);
+  if (result < 0) return result;
+  // The storage broke its contract, and nothing that it says can be relied upon.
+  if (!found) abort();
+  *out = CztComPtr<I>::Attach(found);
+  return result;
+}
+
+GUID IdentityOf(IvltObject* object) {
+  GUID id = GUID_NULL;
+  object->GetObjectID(&id);
+  return id;
+}
+
+// ---- Array elements. Each appends its text and gives back what the storage handed out.
+
+HRESULT AppendText(String& text, wchar_t* element) {
+  TaskMem<wchar_t> owned(element);
+  if (!owned) return E_OUTOFMEMORY;
+  text += owned.get();
+  return S_OK;
+}
+
+template <class T, ArrayGetter<T> Getter, wchar_t* (*ToText)(T)>
+struct PlainElements {
+  using Element = T;
+  static constexpr ArrayGetter<T> kGet = Getter;
+  static HRESULT Append(String& text, T& element) { return AppendText(text, ToText(element)); }
+  static void Release(T&) {}
+};
+
+using I32Elements = PlainElements<int32_t, &IvltObject::GetI32ArrayAttribute, &vltI32ToString2>;
+using U32Elements = PlainElements<uint32_t, &IvltObject::GetU32ArrayAttribute, &vltU32ToString2>;
+using F64Elements = PlainElements<double, &IvltObject::GetF64ArrayAttribute, &vltF64ToString2>;
+using GuidElements = PlainElements<GUID, &IvltObject::GetGuidArrayAttribute, &vltGuidToString2>;
+
+struct StringElements {
+  using Element = wchar_t*;
+  static constexpr ArrayGetter<Element> kGet = &IvltObject::GetStringArrayAttribute;
+  static HRESULT Append(String& text, Element& element) {
+    text += element;  // null is empty
+    return S_OK;
+  }
+  static void Release(Element& element) {
+    vltTaskMemFree(element);
+    element = nullptr;
+  }
+};
+
+struct ReferenceElements {
+  using Element = IvltObject*;
+  static constexpr ArrayGetter<Element> kGet = &IvltObject::GetReferenceArrayAttribute;
+  static HRESULT Append(String& text, Element& element) {
+    if (element) return AppendText(text, vltGuidToString2(IdentityOf(element)));
+    text += L"NULL";
+    return S_OK;
+  }
+  static void Release(Element& element) {
+    if (element) element->Release();
+    element = nullptr;
+  }
+};
+
+// Zeroed room for the elements, which are given back with it. Pages that the storage does not fill
+// cost nothing, so that a count that is not true does no harm.
+template <class Kind>
+class ElementBuffer {
+ public:
+  using Element = typename Kind::Element;
+
+  explicit ElementBuffer(uint32_t capacity)
+      : m_elements(static_cast<Element*>(calloc(capacity, sizeof(Element)))),
+        m_capacity(capacity) {}
+  ~ElementBuffer() {
+    for (uint32_t i = 0; i < m_count; ++i) Kind::Release(m_elements[i]);
+    free(m_elements);
+  }
+  ElementBuffer(const ElementBuffer&) = delete;
+  ElementBuffer& operator=(const ElementBuffer&) = delete;
+
+  explicit operator bool() const { return m_elements != nullptr; }
+  HRESULT fill(IvltObject* object, unsigned id) {
+    uint32_t count = m_capacity;
+    HRESULT result = (object->*Kind::kGet)(id, m_capacity, m_elements, &count);
+    m_count = std::min(count, m_capacity);
+    return result;
+  }
+  Element* begin() { return m_elements; }
+  Element* end() { return m_elements + m_count; }
+
+ private:
+  Element* m_elements;
+  uint32_t m_capacity;
+  uint32_t m_count = 0;
+};
+
+HRESULT ReportOutOfMemory() {
+  return vltReportOutOfMemory(
+      "HRESULT vltGetArrayValueAsString(IvltObject*, vltAttributeID, vltAttributeType, "
+      "zt::fnd::String&)");
+}
+
+// S_OK, or E_OUTOFMEMORY when an element has no text. Elements go back as soon as they are told.
+template <class Kind>
+HRESULT AppendElements(ElementBuffer<Kind>& buffer, String& text) {
+  HRESULT result = S_OK;
+  for (auto& element : buffer) {
+    if (&element != buffer.begin()) text += L',';
+    HRESULT appended = Kind::Append(text, element);
+    if (appended < 0) result = appended;
+    Kind::Release(element);
+  }
+  return result;
+}
+
+template <class Kind>
+HRESULT AppendArray(IvltObject* object, unsigned id, const char* hookPoint, String& text) {
+  uint32_t count = 0;
+  HRESULT result = (object->*Kind::kGet)(id, 0, nullptr, &count);
+  if (result >= 0 && count > 0) {
+    if (vltTestHook(hookPoint)) return ReportOutOfMemory();
+    ElementBuffer<Kind> buffer(count);
+    if (!buffer) return ReportOutOfMemory();
+    result = buffer.fill(object, id);
+    HRESULT appended = AppendElements(buffer, text);
+    if (result >= 0 && appended < 0) result = appended;
+  }
+  text += L'}';
+  return result;
+}
+
+// ---- Single values
+
+// Stores a text that was made for a value that was read with this result.
+HRESULT HandOut(wchar_t* made, HRESULT result, wchar_t** text) {
+  if (!made) return result < 0 ? result : E_OUTOFMEMORY;
+  *text = made;
+  return result;
+}
+
+template <class T>
+HRESULT ValueText(IvltObject* object, unsigned id, ValueGetter<T> get, wchar_t* (*toText)(T),
+                  wchar_t** text) {
+  T value{};
+  HRESULT result = (object->*get)(id, &value);
+  return result < 0 ? result : HandOut(toText(value), result, text);
+}
+
+HRESULT StringText(IvltObject* object, unsigned id, wchar_t** text) {
+  wchar_t* value = nullptr;
+  HRESULT result = object->GetStringAttribute(id, &value);
+  if (result < 0) return result;
+  TaskMem<wchar_t> owned(value);
+  if (value) return HandOut(Dup(value), result, text);
+  *text = nullptr;
+  return result;
+}
+
+HRESULT ReferenceText(IvltObject* object, unsigned id, wchar_t** text) {
+  IvltObject* found = nullptr;
+  HRESULT result = object->GetReferenceAttribute(id, &found);
+  if (result < 0) found = nullptr;
+  auto owned = CztComPtr<IvltObject>::Attach(found);
+  return HandOut(vltGuidToString2(found ? IdentityOf(found) : GUID_NULL), result, text);
+}
+
+HRESULT ArrayText(IvltObject* object, unsigned id, _vltAttributeType type, wchar_t** text) {
+  String list;
+  HRESULT result = vltGetArrayValueAsString(object, id, type, list);
+  return HandOut(Dup(list.c_str()), result, text);
+}
+
+}  // namespace
+
+HRESULT vltGetAttributeType(IvltObject* object, unsigned id, _vltAttributeType* type) {
+  if (!object || !type) return E_POINTER;
+  CztComPtr<IvltClass> itsClass;
+  HRESULT result = Obtain(&itsClass, [&](IvltClass** out) { return object->GetClass(out); });
+  if (result < 0) return result;
+  CztComPtr<IvltMetaAttribute> attribute;
+  result = Obtain(&attribute,
+                  [&](IvltMetaAttribute** out) { return itsClass->GetMetaAttribute(id, out); });
+  return result < 0 ? result : attribute->GetAttributeType(type);
+}
+
+HRESULT vltSetAttributeValueFromString2(IvltObject* object, unsigned id, const wchar_t* text) {
+  _vltAttributeType type = vltUnspecifiedType;
+  HRESULT result = vltGetAttributeType(object, id, &type);
+  if (result < 0) return result;
+  switch (type) {
+    case vltI32Type:
+      return object->SetI32Attribute(id, vltI32FromString2(text));
+    case vltU32Type:
+      return object->SetU32Attribute(id, vltU32FromString2(text));
+    case vltF64Type:
+      return object->SetF64Attribute(id, vltF64FromString2(text));
+    case vltStringType:
+      return object->SetStringAttribute(id, text);
+    case vltGuidType:
+      return object->SetGuidAttribute(id, vltGuidFromString2(text));
+    default:
+      return E_FAIL;
+  }
+}
+
+HRESULT vltGetAttributeValueAsString2(IvltObject* object, unsigned id, wchar_t** text) {
+  if (!text) return E_POINTER;
+  _vltAttributeType type = vltUnspecifiedType;
+  HRESULT result = vltGetAttributeType(object, id, &type);
+  if (result < 0) return result;
+  switch (type) {
+    case vltI32Type:
+      return ValueText(object, id, &IvltObject::GetI32Attribute, &vltI32ToString2, text);
+    case vltU32Type:
+      return ValueText(object, id, &IvltObject::GetU32Attribute, &vltU32ToString2, text);
+    case vltF64Type:
+      return ValueText(object, id, &IvltObject::GetF64Attribute, &vltF64ToString2, text);
+    case vltGuidType:
+      return ValueText(object, id, &IvltObject::GetGuidAttribute, &vltGuidToString2, text);
+    case vltStringType:
+      return StringText(object, id, text);
+    case vltReferenceType:
+      return ReferenceText(object, id, text);
+    case vltI32ArrayType:
+    case vltU32ArrayType:
+    case vltF64ArrayType:
+    case vltStringArrayType:
+    case vltReferenceArrayType:
+    case vltGuidArrayType:
+      return ArrayText(object, id, type, text);
+    default:
+      return E_FAIL;
+  }
+}
+
+HRESULT vltGetAttributeValueAsStringImpl(IvltObject* object, unsigned id, wchar_t** text) {
+  if (!text) return E_POINTER;
+  TaskMem<wchar_t> made;
+  HRESULT result = vltGetAttributeValueAsString2(object, id, made.out());
+  if (result >= 0) *text = made.release();
+  return result;
+}
+
+HRESULT vltGetArrayValueAsString(IvltObject* object, unsigned id, _vltAttributeType type,
+                                 String& text) {
+  if (!object) return E_POINTER;
+  text = L"{";
+  switch (type) {
+    case vltI32ArrayType:
+      return AppendArray<I32Elements>(object, id, vlt::hook::kArrayI32, text);
+    case vltU32ArrayType:
+      return AppendArray<U32Elements>(object, id, vlt::hook::kArrayU32, text);
+    case vltF64ArrayType:
+      return AppendArray<F64Elements>(object, id, vlt::hook::kArrayF64, text);
+    case vltGuidArrayType:
+      return AppendArray<GuidElements>(object, id, vlt::hook::kArrayGuid, text);
+    case vltStringArrayType:
+      return AppendArray<StringElements>(object, id, vlt::hook::kArrayString, text);
+    case vltReferenceArrayType:
+      return AppendArray<ReferenceElements>(object, id, vlt::hook::kArrayReference, text);
+    default:
+      text += L'}';
+      return E_FAIL;
+  }
+}

@@ -1,0 +1,665 @@
+#include "source/Pharlap/vltPharlapRegistrar.h"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <string.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "source/Common/vltFileSecurity.h"
+#include "source/Pharlap/TestRegistrar.h"
+#include "source/Pharlap/registrarText.h"
+#include "tests/support/SaveCounter.h"
+#include "vlloader/source/vlloader.h"
+#include "zt/fnd/Exception.h"
+
+namespace vlt::test {
+namespace {
+
+constexpr uid_t kNobody = 65534;
+
+std::string BadName(const Installation& i) {
+  return i.database() + std::string(zt::fnd::AnsiString(vlrGetCurrentLocalTime()).c_str()) + ".bad";
+}
+
+std::vector<std::string> Entries(const std::string& directory) {
+  std::vector<std::string> names;
+  for (const auto& entry : std::filesystem::directory_iterator(directory)) {
+    names.push_back(entry.path().filename());
+  }
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+// Other users must reach the installation below the test's own directories.
+void OpenUp(const Installation& i) {
+  chmod(std::filesystem::path(i.root()).parent_path().c_str(), 0755);
+  chmod(getenv("ZTFNDTMPSHAREDFILEDIR"), 0777);
+}
+
+// ---- GUID texts
+
+template <class Char>
+void ExpectStripped(const std::basic_string<Char>& text, HRESULT result,
+                    const std::basic_string<Char>& left) {
+  std::basic_string<Char> buffer = text + Char();
+  EXPECT_EQ(CvltPharlapRegistrar::StripBracesFromGuid(buffer.data()), result);
+  EXPECT_EQ(std::basic_string<Char>(buffer.c_str()), left);
+}
+
+TEST(RegistrarGuidText, BracesAreCutFromTheWholeFormOnly) {
+  std::string bare = GText(7);
+  struct Row {
+    std::string text;
+    HRESULT result;
+    std::string left;
+  };
+  const Row rows[] = {{"{" + bare + "}", S_OK, bare},
+                      {bare, S_FALSE, bare},
+                      {"", S_FALSE, ""},
+                      {"{" + bare + "}x", S_FALSE, "{" + bare + "}x"},
+                      {"(" + bare + "}", E_FAIL, "(" + bare + "}"},
+                      {"{" + bare + ")", E_FAIL, "{" + bare + ")"},
+                      {"{" + std::string(36, '}') + "}", S_OK, std::string(36, '}')}};
+  for (const Row& row : rows) {
+    ExpectStripped(row.text, row.result, row.left);
+    ExpectStripped(Wide(row.text), row.result, Wide(row.left));
+  }
+  EXPECT_EQ(CvltPharlapRegistrar::StripBracesFromGuid(static_cast<char*>(nullptr)), E_POINTER);
+  EXPECT_EQ(CvltPharlapRegistrar::StripBracesFromGuid(static_cast<wchar_t*>(nullptr)), E_POINTER);
+}
+
+// ---- Interfaces
+
+TEST(RegistrarInterfaces, EachAnswersAndForwardsItsReferences) {
+  Installation i;
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              void* out = nullptr;
+              for (const GUID& iid : {IID_IUnknown, IID_IvltRegistrar2, IID_IvltRegistrar}) {
+                EXPECT_EQ(r->QueryInterface(iid, &out), S_OK);
+                EXPECT_EQ(out, static_cast<IvltRegistrar2*>(&*r));
+                EXPECT_EQ(r->Release(), 1u);
+              }
+              for (const GUID& iid : {IID_IvltPharlapRegistrarEx, IID_IvltDynamicRegistrar,
+                                      IID_IvltDowngradeRegistrar}) {
+                ASSERT_EQ(r->QueryInterface(iid, &out), S_OK);
+                auto* side = static_cast<IUnknown*>(out);
+                EXPECT_EQ(side->AddRef(), 3u);
+                void* back = nullptr;
+                EXPECT_EQ(side->QueryInterface(IID_IUnknown, &back), S_OK);
+                EXPECT_EQ(back, static_cast<IvltRegistrar2*>(&*r));
+                EXPECT_EQ(r->Release(), 3u);
+                EXPECT_EQ(side->Release(), 2u);
+                EXPECT_EQ(side->Release(), 1u);
+              }
+              EXPECT_EQ(r->QueryInterface(IID_IvltEnumComponent, &out), E_NOINTERFACE);
+              EXPECT_EQ(out, nullptr);
+              EXPECT_EQ(r->QueryInterface(IID_IUnknown, nullptr), E_POINTER);
+            }),
+            0);
+}
+
+// The side interfaces are called through their own tables: a wrong order of operations shows here.
+TEST(RegistrarInterfaces, SideInterfacesReachTheirOperations) {
+  Installation i;
+  i.addDictionary("D", "Dict", GText(1), 3, "d");
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              void* out = nullptr;
+              ASSERT_EQ(r->QueryInterface(IID_IvltPharlapRegistrarEx, &out), S_OK);
+              EXPECT_EQ(static_cast<IvltPharlapRegistrarEx*>(out)->ResetDDUpdatedFlags(), S_OK);
+              static_cast<IvltPharlapRegistrarEx*>(out)->Release();
+              ASSERT_EQ(r->QueryInterface(IID_IvltDowngradeRegistrar, &out), S_OK);
+              auto* downgrade = static_cast<IvltDowngradeRegistrar*>(out);
+              unsigned count = 5;
+              wchar_t** paths = nullptr;
+              EXPECT_EQ(downgrade->GetPreviousDictionaries(nullptr, &count, &paths), S_FALSE);
+              EXPECT_EQ(count, 0u);
+              EXPECT_EQ(downgrade->RemovePreviousDictionaries(nullptr), S_FALSE);
+              downgrade->Release();
+              EXPECT_EQ(Bound(*r, vltComponentObjectExpert, G(9), VLT_E_NO_COMPONENT).size(), 0u);
+            }),
+            0);
+}
+
+TEST(RegistrarInterfaces, WhatIsNotKeptHereFailsAndTouchesNothing) {
+  Installation i;
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              wchar_t here[] = L"x";
+              wchar_t* text = here;
+              unsigned number = 7;
+              EXPECT_EQ(r->GetSDKPath(&text), E_FAIL);
+              EXPECT_EQ(r->GetSDKPath(nullptr), E_FAIL);
+              EXPECT_EQ(r->SetSDKPath(L"/x"), E_FAIL);
+              EXPECT_EQ(r->GetStorageClientCacheSize(&number), E_FAIL);
+              EXPECT_EQ(r->SetStorageClientCacheSize(1), E_FAIL);
+              EXPECT_EQ(r->GetSnapshotPath(&text), E_FAIL);
+              EXPECT_EQ(r->SetSnapshotPath(L"/x"), E_FAIL);
+              EXPECT_EQ(r->UnregisterComponent(kVltdd), E_FAIL);
+              EXPECT_EQ(text, here);
+              EXPECT_EQ(number, 7u);
+              EXPECT_EQ(Find(*r, kVltdd), S_OK);
+            }),
+            0);
+}
+
+// ---- Settings
+
+TEST(RegistrarSettings, SchemaVersionIsWrittenWhenItDiffersOnly) {
+  Installation i;
+  SaveCounter saves(i.root(), "vlt.vlr");
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(r->database().EraseItem("KOR", "SchemaVersion"), S_OK);
+              EXPECT_EQ(r->SaveChanges(), S_OK);
+              EXPECT_FALSE(DatabaseText(i.database()).raw("KOR", "SchemaVersion"));
+              int before = saves.count();
+              EXPECT_EQ(r->SetSchemaVersion(0), S_OK);
+              EXPECT_EQ(saves.count(), before + 1);
+              EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "SchemaVersion"), "0");
+              EXPECT_EQ(r->SetSchemaVersion(0), S_OK);
+              EXPECT_EQ(saves.count(), before + 1);
+              EXPECT_EQ(r->SetSchemaVersion(0xFFFFFFFF), S_OK);
+              EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "SchemaVersion"), "4294967295");
+              unsigned version = 7;
+              EXPECT_EQ(r->GetSchemaVersion(&version), S_OK);
+              EXPECT_EQ(version, 0xFFFFFFFFu);
+              EXPECT_EQ(r->GetSchemaVersion(nullptr), E_POINTER);
+              // Equal as numbers is equal.
+              r->database().SetItem("KOR", "SchemaVersion", "0012", true);
+              before = saves.count();
+              EXPECT_EQ(r->SetSchemaVersion(12), S_OK);
+              EXPECT_EQ(saves.count(), before);
+            }),
+            0);
+}
+
+TEST(RegistrarSettings, WhatCannotBeReadIsTheDefault) {
+  Installation i;
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              unsigned number = 7;
+              EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
+              EXPECT_EQ(number, 33554432u);
+              EXPECT_EQ(r->GetStorageServerCacheSize(nullptr), E_POINTER);
+              r->database().SetItem("KOR", "CacheSize", "", true);
+              number = 7;
+              EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
+              EXPECT_EQ(number, 33554432u);
+              r->database().SetItem("KOR", "CacheSize", "words", true);
+              EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
+              EXPECT_EQ(number, 0u);
+              r->database().SetItem("KOR", "SchemaVersion", "", true);
+              number = 7;
+              EXPECT_EQ(r->GetSchemaVersion(&number), S_OK);
+              EXPECT_EQ(number, 0u);
+            }),
+            0);
+}
+
+TEST(RegistrarSettings, CacheSizeIsWrittenEachTimeAndOutlivesTheProcess) {
+  Installation i;
+  SaveCounter saves(i.root(), "vlt.vlr");
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              int before = saves.count();
+              EXPECT_EQ(r->SetStorageServerCacheSize(4096), S_OK);
+              EXPECT_EQ(r->SetStorageServerCacheSize(4096), S_OK);
+              EXPECT_EQ(saves.count(), before + 2);
+            }),
+            0);
+  EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "CacheSize"), "4096");
+  EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              unsigned number = 0;
+              EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
+              EXPECT_EQ(number, 4096u);
+            }),
+            0);
+}
+
+TEST(RegistrarSettings, SchemaVersionIsZeroAgainAtEachStart) {
+  Installation i;
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(r->SetSchemaVersion(9), S_OK);
+            }),
+            0);
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              unsigned version = 7;
+              EXPECT_EQ(r->GetSchemaVersion(&version), S_OK);
+              EXPECT_EQ(version, 0u);
+            }),
+            0);
+}
+
+TEST(RegistrarSettings, ConfigurationPathForms) {
+  Installation i;
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              std::wstring data = Wide(i.root()) + L"/Data/";
+              auto get = [&] {
+                wchar_t* path = nullptr;
+                HRESULT result = r->GetConfigurationPath(&path);
+                return Path(result, path);
+              };
+              EXPECT_EQ(get(), data + L"config3.vlt");
+              EXPECT_EQ(r->GetConfigurationPath(nullptr), E_POINTER);
+              EXPECT_EQ(r->SetConfigurationPath(nullptr), E_POINTER);
+              r->database().SetItem("KOR", "ConfigFile", "CONFIG3.VLT", true);
+              EXPECT_EQ(get(), data + L"CONFIG3.VLT");
+              r->database().SetItem("KOR", "ConfigFile", "other.vlt", true);
+              EXPECT_EQ(get(), L"other.vlt");
+              r->database().SetItem("KOR", "ConfigFile", "", true);
+              EXPECT_EQ(get(), L"/Library/Application Support/Zentrex/KOR/Data/config3.vlt");
+              r->database().EraseItem("KOR", "ConfigFile");
+              EXPECT_EQ(get(), L"/Library/Application Support/Zentrex/KOR/Data/config3.vlt");
+              EXPECT_EQ(r->SetConfigurationPath(L"Config3.VLT"), S_OK);
+              EXPECT_EQ(get(), data + L"Config3.VLT");
+            }),
+            0);
+}
+
+TEST(RegistrarSettings, ConfigurationPathIsWrittenWhenItDiffersBeyondCase) {
+  Installation i;
+  SaveCounter saves(i.root(), "vlt.vlr");
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(r->SetConfigurationPath(L"/A/\"b\"\\c.vlt"), S_OK);
+              int before = saves.count();
+              EXPECT_EQ(r->SetConfigurationPath(L"/a/\"B\"\\C.VLT"), S_OK);
+              EXPECT_EQ(saves.count(), before);
+              EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "ConfigFile"),
+                        R"("/A/\"b\"\\c.vlt")");
+              EXPECT_EQ(r->SetConfigurationPath(L"relative"), S_OK);
+              EXPECT_EQ(saves.count(), before + 1);
+              EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "ConfigFile"), "\"relative\"");
+            }),
+            0);
+}
+
+// The next start puts its own path back, as the stored one differs from it.
+TEST(RegistrarSettings, ConfigurationPathIsThatOfTheRootAtEachStart) {
+  Installation i;
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(r->SetConfigurationPath(L"/elsewhere"), S_OK);
+            }),
+            0);
+  EXPECT_EQ(StartOnce(i), 0);
+  EXPECT_EQ(DatabaseText(i.database()).quoted("KOR", "ConfigFile"), i.root() + "/Data/config3.vlt");
+}
+
+TEST(RegistrarSettings, ALongConfigurationPathIsKeptWhole) {
+  Installation i;
+  std::wstring path = L"/" + std::wstring(70000, L'p');
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(r->SetConfigurationPath(path.c_str()), S_OK);
+              wchar_t* got = nullptr;
+              HRESULT result = r->GetConfigurationPath(&got);
+              EXPECT_EQ(Path(result, got), path);
+            }),
+            0);
+}
+
+// A bare name in a process that has no right to make the missing data directory.
+TEST(RegistrarSettings, ABareNameIsHandedOutEvenWithAFailure) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  Installation i;
+  OpenUp(i);
+  ASSERT_EQ(StartOnce(i), 0);
+  ASSERT_TRUE(std::filesystem::remove(i.root() + "/Data"));
+  EXPECT_EQ(InChild([&] {
+              ASSERT_EQ(setresuid(kNobody, kNobody, kNobody), 0);
+              LinuxStart r(i);
+              r->database().SetItem("KOR", "ConfigFile", "config3.vlt", true);
+              wchar_t* path = nullptr;
+              HRESULT result = r->GetConfigurationPath(&path);
+              EXPECT_EQ(Path(result, path, E_FAIL), Wide(i.root()) + L"/Data/config3.vlt");
+            }),
+            0);
+}
+
+// ---- Start
+
+TEST(RegistrarStart, MakesDirectoriesAndFilesOpenToAllWhateverTheUmask) {
+  Installation i;
+  ScopedUmask mask(077);
+  ASSERT_EQ(StartOnce(i), 0);
+  for (const char* name : {"/Data", "/Data Dictionaries", "/Experts", "/vlt.vlr", "/vlt.vl5"}) {
+    EXPECT_EQ(ModeOf(i.root() + name), 0777) << name;
+  }
+  EXPECT_EQ(Entries(i.root()), (std::vector<std::string>{"Data", "Data Dictionaries", "Experts",
+                                                         "vlt.vl5", "vlt.vlr"}));
+  EXPECT_EQ(Entries(i.root() + "/Data").size(), 0u);
+}
+
+TEST(RegistrarStart, LeavesTheModesOfDirectoriesThatAreThere) {
+  Installation i;
+  for (const char* name : {"/Data", "/Data Dictionaries", "/Experts"}) {
+    ASSERT_EQ(mkdir((i.root() + name).c_str(), 0750), 0);
+  }
+  ASSERT_EQ(StartOnce(i), 0);
+  for (const char* name : {"/Data", "/Data Dictionaries", "/Experts"}) {
+    EXPECT_EQ(ModeOf(i.root() + name), 0750) << name;
+  }
+}
+
+TEST(RegistrarStart, WritesTheBuiltInDictionary) {
+  Installation i;
+  ASSERT_EQ(StartOnce(i), 0);
+  DatabaseText db(i.database());
+  EXPECT_EQ(db.sections(), (std::vector<std::string>{"KOR", "KORComponents", "vltdd"}));
+  std::string file = i.root() + "/Data Dictionaries/vltdd.framework";
+  EXPECT_EQ(db.items("vltdd"),
+            (DatabaseText::Items{{"Identifier", "\"790F6A90-E0D8-11D3-AA15-005004D131EE\""},
+                                 {"FileName", "\"" + file + "\""},
+                                 {"SchemaVersion", "0"},
+                                 {"FragmentRegistered", "0"},
+                                 {"LastInstalledSchemaVersion", "0"},
+                                 {"Prefix", "\"vl\""}}));
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              Received d;
+              ASSERT_EQ(r->GetComponent(kVltdd, &d.value), S_OK);
+              EXPECT_EQ(d.value.type, vltComponentDataDictionary);
+              EXPECT_EQ(d.value.version, 2u);
+              EXPECT_EQ(d.name(), L"vltdd");
+              EXPECT_EQ(d.file(), Wide(file));
+              EXPECT_EQ(d.prefix(), L"vl");
+              EXPECT_EQ(d.value.dictionary.schemaVersion, 0u);
+              EXPECT_EQ(d.value.dictionary.lastInstalledSchemaVersion, 0u);
+            }),
+            0);
+}
+
+TEST(RegistrarStart, WithoutADirectoryTheNamesStayBare) {
+  Installation i;
+  Installation::setDir("");
+  EXPECT_EQ(InChild([&] {
+              EXPECT_EQ(GetCurrentVltPath(), nullptr);
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, kVltdd), S_OK);
+              wchar_t* path = nullptr;
+              HRESULT result = r->GetConfigurationPath(&path);
+              EXPECT_EQ(Path(result, path, E_FAIL), L"config3.vlt");
+              CvltPharlapRegistrar::RegistrationFiles files;
+              EXPECT_EQ(r->FindRegistrationFiles(files), E_FAIL);
+              EXPECT_EQ(files.size(), 0u);
+            }),
+            0);
+  DatabaseText db(i.database());
+  EXPECT_EQ(db.quoted("KOR", "ConfigFile"), "config3.vlt");
+  EXPECT_EQ(db.quoted("vltdd", "FileName"), "vltdd.framework");
+  EXPECT_EQ(Entries(i.root()), (std::vector<std::string>{"vlt.vl5", "vlt.vlr"}));
+}
+
+TEST(RegistrarStart, MissingRightsToMakeDirectoriesAreSwallowed) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  Installation i;
+  OpenUp(i);
+  chmod(i.root().c_str(), 0555);
+  TempDir place;
+  chmod(place.path().c_str(), 0777);
+  EXPECT_EQ(InChild([&] {
+              ASSERT_EQ(setresuid(kNobody, kNobody, kNobody), 0);
+              Started<OpenLinux> r(S(place / "vlt.vlr"), S(i.root()));
+              EXPECT_EQ(Find(*r, kVltdd), S_OK);
+              CvltPharlapRegistrar::RegistrationFiles files;
+              EXPECT_EQ(r->FindRegistrationFiles(files), E_FAIL);
+            }),
+            0);
+  EXPECT_TRUE(Entries(i.root()).empty());
+  EXPECT_EQ(ModeOf(place / "vlt.vlr"), 0777);
+}
+
+TEST(RegistrarStart, AFileInADirectorysPlaceIsRaisedAndFreesTheLock) {
+  Installation i;
+  WriteBytes(i.root() + "/Data", "in the way");
+  EXPECT_EQ(InChild([&] {
+              EXPECT_THROW(LinuxStart r(i), zt::fnd::exception::ObjectAlreadyExists);
+              EXPECT_EQ(unlink((i.root() + "/Data").c_str()), 0);
+              LinuxStart again(i);
+              EXPECT_EQ(Find(*again, kVltdd), S_OK);
+            }),
+            0);
+}
+
+// ---- The database and its sidecar
+
+TEST(RegistrarDatabase, AShortSidecarSetsTheDatabaseAsideAndTheNextStartWorks) {
+  Installation i;
+  i.addDictionary("D", "Dict", GText(1), 3, "d");
+  ASSERT_EQ(StartOnce(i), 0);
+  std::string contents = ReadBytes(i.database());
+  WriteBytes(i.sidecar(), std::string(15, 'x'));
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_TRUE(r->isOpen());
+              EXPECT_EQ(Find(*r, kVltdd), E_INVALIDARG);
+              EXPECT_TRUE(Names(*r, vltComponentDataDictionary).empty());
+              EXPECT_EQ(ReadBytes(i.database()), "");
+              EXPECT_FALSE(Exists(i.sidecar()));
+              unsigned version = 7;
+              EXPECT_EQ(r->GetSchemaVersion(&version), S_OK);
+              EXPECT_EQ(version, 0u);
+            }),
+            0);
+  EXPECT_EQ(ReadBytes(BadName(i)), contents);
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, kVltdd), S_OK);
+              EXPECT_EQ(Find(*r, G(1)), S_OK);
+            }),
+            0);
+  EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
+}
+
+TEST(RegistrarDatabase, ACopySetAsideEarlierThatDayIsOverwritten) {
+  Installation i;
+  ASSERT_EQ(StartOnce(i), 0);
+  std::string contents = ReadBytes(i.database());
+  WriteBytes(BadName(i), "stale");
+  WriteBytes(i.sidecar(), "");
+  ASSERT_EQ(StartOnce(i), 0);
+  EXPECT_EQ(ReadBytes(BadName(i)), contents);
+}
+
+TEST(RegistrarDatabase, WithoutASidecarTheFileIsTakenAsItIs) {
+  Installation i;
+  ASSERT_EQ(StartOnce(i), 0);
+  WriteBytes(i.database(), ReadBytes(i.database()) + "[Mine]\nx = 1\n");
+  unlink(i.sidecar().c_str());
+  ASSERT_EQ(StartOnce(i), 0);
+  EXPECT_EQ(DatabaseText(i.database()).raw("Mine", "x"), "1");
+  EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
+  EXPECT_FALSE(Exists(BadName(i)));
+}
+
+// What stops the save between the mark and the digest shows the mark.
+TEST(RegistrarDatabase, TheFirstSaveWritesTheMarkBeforeTheFile) {
+  Installation i;
+  ASSERT_EQ(StartOnce(i), 0);
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              unlink(i.sidecar().c_str());
+              std::filesystem::create_directories(i.root() + "/vlt.TMP/full");
+              EXPECT_LT(r->SetStorageServerCacheSize(5), 0);
+              EXPECT_EQ(ReadBytes(i.sidecar()), "0000000000000000");
+              std::filesystem::remove_all(i.root() + "/vlt.TMP");
+              EXPECT_EQ(r->SaveChanges(), S_OK);
+              EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
+            }),
+            0);
+}
+
+TEST(RegistrarDatabase, TheMarkMatchesNothingAndCostsNothing) {
+  Installation i;
+  i.addDictionary("D", "Dict", GText(1), 3, "d");
+  ASSERT_EQ(StartOnce(i), 0);
+  WriteBytes(i.sidecar(), "0000000000000000");
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, G(1)), S_OK);
+            }),
+            0);
+  EXPECT_FALSE(Exists(BadName(i)));
+  EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
+}
+
+TEST(RegistrarDatabase, AFailedSaveKeepsTheChangeInMemoryAndTheSidecarOld) {
+  Installation i;
+  ASSERT_EQ(StartOnce(i), 0);
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              std::string file = ReadBytes(i.database()), digest = ReadBytes(i.sidecar());
+              std::filesystem::create_directories(i.root() + "/vlt.TMP/full");
+              EXPECT_LT(r->SetStorageServerCacheSize(5), 0);
+              unsigned size = 0;
+              EXPECT_EQ(r->GetStorageServerCacheSize(&size), S_OK);
+              EXPECT_EQ(size, 5u);
+              EXPECT_EQ(ReadBytes(i.database()), file);
+              EXPECT_EQ(ReadBytes(i.sidecar()), digest);
+              std::filesystem::remove_all(i.root() + "/vlt.TMP");
+              EXPECT_EQ(r->SaveChanges(), S_OK);
+              EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "CacheSize"), "5");
+            }),
+            0);
+}
+
+TEST(RegistrarDatabase, ADifferingDigestKeepsTheContents) {
+  Installation i;
+  i.addDictionary("D", "Dict", GText(1), 3, "d");
+  ASSERT_EQ(StartOnce(i), 0);
+  WriteBytes(i.database(), ReadBytes(i.database()) + "[Mine]\nx = 1\n");
+  SaveCounter saves(i.root(), "vlt.vlr");
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, G(1)), S_OK);
+            }),
+            0);
+  EXPECT_EQ(saves.count(), 1);  // that of the built-in dictionary: nothing is merged anew
+  EXPECT_FALSE(Exists(BadName(i)));
+  EXPECT_EQ(DatabaseText(i.database()).raw("Mine", "x"), "1");
+  EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
+}
+
+constexpr char kUtf16[] = "\xFF\xFE[\0K\0]\0";
+
+TEST(RegistrarDatabase, WhatCannotBeParsedIsSetAsideAndEverythingRegisteredAnew) {
+  Installation i;
+  i.addDictionary("D", "Dict", GText(1), 3, "d");
+  ASSERT_EQ(StartOnce(i), 0);
+  std::string damaged(kUtf16, sizeof kUtf16 - 1);
+  WriteBytes(i.database(), damaged);
+  unlink(i.sidecar().c_str());
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, kVltdd), S_OK);
+              EXPECT_EQ(Find(*r, G(1)), S_OK);
+            }),
+            0);
+  EXPECT_EQ(ReadBytes(BadName(i)), damaged);
+  EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
+}
+
+// The digest speaks first; the file is only found to be unreadable by the second opening, whose
+// failure is the caller's.
+TEST(RegistrarDatabase, DamageWithAStaleDigestIsRaisedOnceAndThenHealed) {
+  Installation i;
+  i.addDictionary("D", "Dict", GText(1), 3, "d");
+  ASSERT_EQ(StartOnce(i), 0);
+  std::string damaged(kUtf16, sizeof kUtf16 - 1);
+  WriteBytes(i.database(), damaged);
+  EXPECT_EQ(InChild([&] {
+              EXPECT_THROW(LinuxStart r(i), int);
+              EXPECT_EQ(ReadBytes(BadName(i)), damaged);
+              EXPECT_FALSE(Exists(i.sidecar()));
+              LinuxStart again(i);
+              EXPECT_EQ(Find(*again, G(1)), S_OK);
+            }),
+            0);
+}
+
+TEST(RegistrarDatabase, IsOpenUntilTheRegistrarGoesAndFreeThen) {
+  Installation i;
+  ASSERT_EQ(StartOnce(i), 0);
+  Signal open, close, closed, end;
+  Child first([&] {
+    {
+      LinuxStart r(i);
+      open.notify();
+      if (!close.await()) return 1;
+    }
+    closed.notify();
+    return end.await() ? 0 : 2;
+  });
+  ASSERT_TRUE(open.await());
+  Signal secondOpen;
+  Child second([&] {
+    LinuxStart r(i);
+    secondOpen.notify();
+    return 0;
+  });
+  EXPECT_FALSE(secondOpen.await(200));
+  close.notify();
+  ASSERT_TRUE(closed.await());
+  EXPECT_TRUE(secondOpen.await());
+  EXPECT_EQ(second.wait(), 0);
+  end.notify();
+  EXPECT_EQ(first.wait(), 0);
+}
+
+TEST(RegistrarDatabase, LeavesNoDescriptorOpen) {
+  Installation i;
+  i.addDictionary("D", "Dict", GText(1), 3, "d");
+  i.addObjectExpert("E", "Exp", GText(2), "{" + GText(2) + "}:1:{" + GText(3) + "}");
+  EXPECT_EQ(InChild([&] {
+              int before = OpenDescriptors();
+              { LinuxStart r(i); }
+              EXPECT_EQ(OpenDescriptors(), before);
+            }),
+            0);
+}
+
+TEST(RegistrarDatabase, TheParentRunsInitWhenTold) {
+  Installation i;
+  i.addObjectExpert("E", "Exp", GText(2), "{" + GText(2) + "}:1:{" + GText(3) + "}");
+  EXPECT_EQ(InChild([&] {
+              PharlapStart r(i);
+              EXPECT_EQ(Find(*r, G(2)), S_OK);
+              // Only the subclass fills the maps of binding classes.
+              Bound(*r, vltComponentObjectExpert, G(3), VLT_E_NO_COMPONENT);
+              Started<OpenPharlap> idle(S(i.root() + "/other.vlr"), S(i.root()), false);
+              EXPECT_EQ(Find(*idle, kVltdd), E_INVALIDARG);
+              EXPECT_EQ(idle->SaveChanges(), S_OK);
+              EXPECT_FALSE(Exists(i.root() + "/other.vlr"));
+            }),
+            0);
+}
+
+// ---- Freeing
+
+// Whether texts are freed shows to the leak check of InChild, and to AddressSanitizer if twice.
+TEST(RegistrarStart, ItsEndFreesTheTextsOfComponentsThatKeepTheirsElsewhere) {
+  Installation i;
+  i.addResourceExpert("M", "Motion Expert Driver", GText(4), "PNP\\4");
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              Received found;
+              ASSERT_EQ(r->GetComponent(G(4), &found.value), S_OK);
+              EXPECT_EQ(found.name(), L"Motion Expert Driver");
+            }),
+            0);
+}
+
+}  // namespace
+}  // namespace vlt::test

@@ -1,0 +1,563 @@
+// The scan: which registration files are found, what a merge makes of them, what goes with them.
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "source/Pharlap/TestRegistrar.h"
+#include "tests/support/SaveCounter.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/OSException.h"
+
+namespace vlt::test {
+namespace {
+
+namespace fs = std::filesystem;
+
+constexpr char kDictionaries[] = "Data Dictionaries";
+constexpr char kContents[] = "VLRContentsSection";
+
+std::string InfoOf(const Installation& i, const std::string& bundle) {
+  return i.root() + "/" + bundle + "/Resources/Info.vlr";
+}
+
+// The database after one start.
+DatabaseText AfterStart(const Installation& i) {
+  EXPECT_EQ(StartOnce(i), 0);
+  return DatabaseText(i.database());
+}
+
+// ---- Finding
+
+TEST(RegistrarFind, DictionariesComeFirstWithTheirTimesInWholeSeconds) {
+  Installation i;
+  std::string expert = i.addObjectExpert("E", "Exp", GText(2));
+  std::string dictionary = i.addDictionary("D", "Dict", GText(1), 3, "d");
+  Installation::touch(dictionary, Installation::kInstalled + 5);
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              CvltPharlapRegistrar::RegistrationFiles files;
+              EXPECT_EQ(r->FindRegistrationFiles(files), S_OK);
+              ASSERT_EQ(files.size(), 2u);
+              EXPECT_EQ(files[0].first.exactCompare(S(dictionary)), 0);
+              EXPECT_EQ(files[1].first.exactCompare(S(expert)), 0);
+              auto seconds = [&](int n) {
+                return static_cast<time_t>(files[n].second.toLKTIME(true) / 10000000 - 11644473600);
+              };
+              EXPECT_EQ(seconds(0), Installation::kInstalled + 5);
+              EXPECT_EQ(seconds(1), Installation::kInstalled);
+              EXPECT_EQ(files[1].second.toLKTIME(true) % 10000000, 0);
+            }),
+            0);
+}
+
+TEST(RegistrarFind, BundlesAreListedInTheOrderOfTheDirectory) {
+  Installation i;
+  for (int n = 0; n < 20; ++n) {
+    i.addObjectExpert("E" + std::to_string(n), "Exp" + std::to_string(n), GText(n));
+  }
+  std::vector<std::string> order;
+  for (const auto& entry : fs::directory_iterator(i.root() + "/Experts")) {
+    order.push_back(entry.path().string() + "/Resources/Info.vlr");
+  }
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              CvltPharlapRegistrar::RegistrationFiles files;
+              EXPECT_EQ(r->FindRegistrationFiles(files), S_OK);
+              ASSERT_EQ(files.size(), order.size());
+              for (unsigned n = 0; n < files.size(); ++n) {
+                EXPECT_EQ(files[n].first.exactCompare(S(order[n])), 0);
+              }
+            }),
+            0);
+}
+
+// Masks fold case, the path inside the bundle does not.
+TEST(RegistrarFind, WhatIsNoBundleIsSkipped) {
+  Installation i;
+  fs::create_directories(i.root() + "/Experts/empty.vle/Resources");
+  fs::create_directories(i.root() + "/Experts/bare.vle");
+  fs::create_directories(i.root() + "/Experts/dir.vle/Resources/Info.vlr");
+  i.addBundle("Experts", "other.framework", "[KORComponents]\na = \"a\"\n");
+  i.addBundle(kDictionaries, "other.vle", "[KORComponents]\nb = \"b\"\n");
+  i.addBundle("Experts", ".hidden.vle", "[KORComponents]\nc = \"c\"\n");
+  fs::create_directories(i.root() + "/Experts/case.vle/resources");
+  WriteBytes(i.root() + "/Experts/case.vle/resources/Info.vlr", "[KORComponents]\nd = \"d\"\n");
+  WriteBytes(i.root() + "/Experts/file.vle", "a plain file");
+  WriteBytes(i.root() + "/Experts/half.vle.bak", "");
+  std::string found = i.addBundle("Experts", "UPPER.VLE", "[KORComponents]\ne = \"e\"\n");
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              CvltPharlapRegistrar::RegistrationFiles files;
+              EXPECT_EQ(r->FindRegistrationFiles(files), S_OK);
+              ASSERT_EQ(files.size(), 1u);
+              EXPECT_EQ(files[0].first.exactCompare(S(found)), 0);
+            }),
+            0);
+}
+
+TEST(RegistrarFind, BundlesMayBeReachedThroughLinks) {
+  Installation i;
+  TempDir elsewhere;
+  fs::create_directories(elsewhere / "real/Resources");
+  WriteBytes(
+      elsewhere / "real/Resources/Info.vlr",
+      "[KORComponents]\nA = \"A\"\n[A]\nIdentifier = \"" + GText(1) + "\"\nFileName = \"A\"\n");
+  fs::create_directories(i.root() + "/Experts");
+  fs::create_directory_symlink(elsewhere / "real", i.root() + "/Experts/linked.vle");
+  fs::create_symlink("missing", i.root() + "/Experts/dangling.vle");
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, G(1)), S_OK);
+            }),
+            0);
+}
+
+TEST(RegistrarFind, LinksThatGoInCirclesAreSkipped) {
+  Installation i;
+  i.addObjectExpert("E", "Exp", GText(2));
+  fs::create_symlink("loop.vle", i.root() + "/Experts/loop.vle");
+  fs::create_directories(i.root() + "/Experts/inner.vle/Resources");
+  fs::create_symlink("Info.vlr", InfoOf(i, "Experts/inner.vle"));
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, G(2)), S_OK);
+            }),
+            0);
+}
+
+// ---- Merging
+
+TEST(RegistrarMerge, FileNamesBecomePathsBelowTheInstallDirectory) {
+  struct Row {
+    bool dictionary;
+    std::string given, stored;
+  };
+  Installation i;
+  std::string dictionaries = i.root() + "/Data Dictionaries/", experts = i.root() + "/Experts/";
+  const Row rows[] = {{true, "Foo", dictionaries + "Foo.framework"},
+                      {false, "Foo", experts + "Foo.vle"},
+                      {true, "Foo.bar", dictionaries + "Foo.bar"},
+                      {false, "Foo.bar", experts + "Foo.bar"},
+                      {true, "sub/Foo", "sub/Foo.framework"},
+                      {false, "sub/Foo", "sub/Foo.vle"},
+                      {false, "/abs/Foo", "/abs/Foo.vle"},
+                      {false, "/abs/Foo.x", "/abs/Foo.x"},
+                      {false, "a.b/Foo", "a.b/Foo.vle"},
+                      {false, "Foo.", experts + "Foo."},
+                      // A backslash is no separator for the extension, but keeps the directory off.
+                      {false, R"(a\Foo)", R"(a\Foo.vle)"},
+                      {false, R"(a.b\Foo)", R"(a.b\Foo)"}};
+  int n = 0;
+  for (const Row& row : rows) {
+    std::string name = "C" + std::to_string(n++);
+    std::string given = row.given;
+    for (size_t at = 0; (at = given.find('\\', at)) != std::string::npos; at += 2) {
+      given.insert(at, "\\");
+    }
+    i.addBundle(row.dictionary ? kDictionaries : "Experts",
+                name + (row.dictionary ? ".framework" : ".vle"),
+                "[KORComponents]\n" + name + " = \"" + name + "\"\n[" + name + "]\nFILENAME = \"" +
+                    given + "\"\n" + (row.dictionary ? "SchemaVersion = 1\n" : ""));
+  }
+  DatabaseText db = AfterStart(i);
+  n = 0;
+  for (const Row& row : rows) {
+    std::string name = "C" + std::to_string(n++), stored = row.stored;
+    for (size_t at = 0; (at = stored.find('\\', at)) != std::string::npos; at += 2) {
+      stored.insert(at, "\\");
+    }
+    EXPECT_EQ(db.quoted(name, "FILENAME"), stored) << row.given;
+  }
+}
+
+TEST(RegistrarMerge, IdentifiersLoseTheirBracesOnly) {
+  std::string bare = GText(5);
+  const std::pair<std::string, std::string> rows[] = {{bare, bare},
+                                                      {"{" + bare + "}", bare},
+                                                      {"{" + bare, "{" + bare},
+                                                      {"{" + bare + "}}", "{" + bare + "}}"},
+                                                      {"(" + bare + ")", "(" + bare + ")"},
+                                                      {"short", "short"}};
+  for (const auto& [given, stored] : rows) {
+    Installation i;
+    i.addBundle("Experts", "E.vle",
+                "[KORComponents]\nE = \"E\"\n[E]\nidentifier = \"" + given + "\"\n");
+    EXPECT_EQ(AfterStart(i).quoted("E", "identifier"), stored) << given;
+  }
+}
+
+TEST(RegistrarMerge, CopiesEverySectionQuotedAndKeepsWhatItDoesNotKnow) {
+  Installation i;
+  i.addBundle("Experts", "E.vle",
+              "[Extra]\nnumber = 5\ntext = \"a\\tb \\q\\x41\"\n[KORComponents]\nE = \"E\"\n"
+              "[E]\nUnknown Key = yes\n");
+  DatabaseText db = AfterStart(i);
+  EXPECT_EQ(db.raw("Extra", "number"), "\"5\"");
+  // Decoded and encoded again: an escape that means nothing loses its backslash.
+  EXPECT_EQ(db.raw("Extra", "text"), R"("a\tb qA")");
+  EXPECT_EQ(db.raw("E", "Unknown Key"), "\"yes\"");
+  EXPECT_EQ(db.quoted("KORComponents", "E"), "E");
+  EXPECT_EQ(db.quoted(kContents, "E"), InfoOf(i, "Experts/E.vle"));
+}
+
+TEST(RegistrarMerge, ADictionaryIsMarkedAsChangedBehindItsItems) {
+  Installation i;
+  i.addDictionary("D", "Dict", GText(1), 3, "d");
+  i.addObjectExpert("E", "Exp", GText(2));
+  DatabaseText db = AfterStart(i);
+  EXPECT_EQ(db.items("Dict"),
+            (DatabaseText::Items{{"Identifier", "\"" + GText(1) + "\""},
+                                 {"FileName", "\"" + i.root() + "/Data Dictionaries/D.framework\""},
+                                 {"SchemaVersion", "\"3\""},
+                                 {"Prefix", "\"d\""},
+                                 {"FragmentRegistered", "23"}}));
+  EXPECT_FALSE(db.raw("Exp", "FragmentRegistered"));
+}
+
+// The value of the list's item names the component for the contents, its name for the start.
+TEST(RegistrarMerge, ValueAndNameOfTheListServeDifferentEnds) {
+  Installation i;
+  i.addBundle("Experts", "E.vle",
+              "[korcomponents]\nName = \"Value\"\n[Name]\nIdentifier = \"" + GText(1) +
+                  "\"\nFileName = \"N\"\n[Value]\nIdentifier = \"" + GText(2) + "\"\n");
+  DatabaseText db = AfterStart(i);
+  EXPECT_EQ(db.quoted("KORComponents", "Name"), "Value");
+  EXPECT_EQ(db.quoted(kContents, "Value"), InfoOf(i, "Experts/E.vle"));
+  EXPECT_FALSE(db.raw(kContents, "Name"));
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, G(1)), S_OK);
+              EXPECT_EQ(Find(*r, G(2)), E_INVALIDARG);
+            }),
+            0);
+}
+
+TEST(RegistrarMerge, OfTwoFilesWithOneSectionTheLaterWinsKeyByKey) {
+  Installation i;
+  i.addBundle(kDictionaries, "D.framework",
+              "[KORComponents]\nX = \"X\"\n[X]\nOnlyFirst = 1\nBoth = 1\n");
+  i.addBundle("Experts", "E.vle", "[KORComponents]\nx = \"x\"\n[x]\nboth = 2\nOnlySecond = 2\n");
+  DatabaseText db = AfterStart(i);
+  EXPECT_EQ(
+      db.items("X"),
+      (DatabaseText::Items{{"OnlyFirst", "\"1\""}, {"Both", "\"2\""}, {"OnlySecond", "\"2\""}}));
+  EXPECT_EQ(db.quoted(kContents, "X"), InfoOf(i, "Experts/E.vle"));
+}
+
+TEST(RegistrarMerge, AFileWithoutSectionsCounts) {
+  Installation i;
+  std::string file = i.addBundle("Experts", "E.vle", "");
+  DatabaseText db = AfterStart(i);
+  EXPECT_EQ(db.quoted("Registration", file), Installation::stamp(Installation::kInstalled));
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(r->MergeRegistrationFile(S(i.root() + "/"), file.c_str()), S_OK);
+            }),
+            0);
+}
+
+TEST(RegistrarMerge, OpensTheFileUpButNotThroughALink) {
+  Installation i;
+  std::string file = i.addObjectExpert("E", "Exp", GText(2));
+  chmod(file.c_str(), 0600);
+  TempDir elsewhere;
+  WriteBytes(elsewhere / "secret", "[KORComponents]\nS = \"S\"\n");
+  chmod((elsewhere / "secret").c_str(), 0600);
+  fs::create_directories(i.root() + "/Experts/S.vle/Resources");
+  fs::create_symlink(elsewhere / "secret", InfoOf(i, "Experts/S.vle"));
+  ASSERT_EQ(StartOnce(i), 0);
+  EXPECT_EQ(ModeOf(file), 0777);
+  EXPECT_EQ(ModeOf(elsewhere / "secret"), 0600);
+  EXPECT_TRUE(DatabaseText(i.database()).raw("KORComponents", "S"));
+}
+
+// ---- Bringing up to date
+
+TEST(RegistrarUpdate, SavesOncePerChangedFile) {
+  Installation i;
+  SaveCounter saves(i.root(), "vlt.vlr");
+  std::string a = i.addDictionary("D", "Dict", GText(1), 3, "d");
+  i.addObjectExpert("E", "Exp", GText(2));
+  ASSERT_EQ(StartOnce(i), 0);
+  // Path of the configuration, schema version, built-in dictionary, two files.
+  EXPECT_EQ(saves.count(), 5);
+  ASSERT_EQ(StartOnce(i), 0);
+  EXPECT_EQ(saves.count(), 6);
+  Installation::touch(a, Installation::kInstalled + 1);
+  ASSERT_EQ(StartOnce(i), 0);
+  EXPECT_EQ(saves.count(), 8);
+}
+
+TEST(RegistrarUpdate, AnyOtherTimeStampMergesAgain) {
+  for (time_t shift : {1, -1, 86400 * 365, -86400 * 365 * 40}) {
+    Installation i;
+    std::string file = i.addDictionary("D", "Dict", GText(1), 3, "d");
+    EXPECT_EQ(InChild([&] {
+                LinuxStart r(i);
+                EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
+              }),
+              0);
+    EXPECT_EQ(DatabaseText(i.database()).raw("Dict", "FragmentRegistered"), "0");
+    Installation::touch(file, Installation::kInstalled + shift);
+    DatabaseText db = AfterStart(i);
+    EXPECT_EQ(db.raw("Dict", "FragmentRegistered"), "23") << shift;
+    EXPECT_EQ(db.quoted("Registration", file),
+              Installation::stamp(Installation::kInstalled + shift));
+  }
+}
+
+TEST(RegistrarUpdate, AnUnchangedFileIsNotReadAgain) {
+  Installation i;
+  std::string file = i.addDictionary("D", "Dict", GText(1), 3, "d");
+  ASSERT_EQ(StartOnce(i), 0);
+  WriteBytes(file, "[KORComponents]\nOther = \"Other\"\n");
+  Installation::touch(file, Installation::kInstalled);
+  DatabaseText db = AfterStart(i);
+  EXPECT_TRUE(db.has("Dict"));
+  EXPECT_FALSE(db.has("Other"));
+}
+
+TEST(RegistrarUpdate, WhatAChangedFileNoLongerBringsIsGone) {
+  Installation i;
+  std::string file = i.addBundle("Experts", "E.vle",
+                                 "[KORComponents]\nA = \"A\"\nB = \"B\"\n[A]\nKey = 1\nOld = 1\n"
+                                 "[B]\nKey = 1\n");
+  ASSERT_EQ(StartOnce(i), 0);
+  WriteBytes(file, "[KORComponents]\nA = \"A\"\n[A]\nKey = 2\n");
+  Installation::touch(file, Installation::kInstalled + 1);
+  DatabaseText db = AfterStart(i);
+  EXPECT_EQ(db.items("A"), (DatabaseText::Items{{"Key", "\"2\""}}));
+  EXPECT_FALSE(db.has("B"));
+  EXPECT_FALSE(db.raw("KORComponents", "B"));
+  EXPECT_FALSE(db.raw(kContents, "B"));
+}
+
+TEST(RegistrarUpdate, AStampThatCannotBeReadMergesAgain) {
+  for (const char* stamp : {"\"\"", "\"words\"", "\"682648576\"", "\"4977615872 31291819\""}) {
+    Installation i;
+    std::string file = i.addDictionary("D", "Dict", GText(1), 3, "d");
+    ASSERT_EQ(StartOnce(i), 0);
+    std::string bytes = ReadBytes(i.database());
+    std::string good = "\"" + Installation::stamp(Installation::kInstalled) + "\"";
+    size_t at = bytes.find(good);
+    ASSERT_NE(at, std::string::npos);
+    WriteBytes(i.database(), bytes.replace(at, good.size(), stamp));
+    DatabaseText db = AfterStart(i);
+    EXPECT_EQ("\"" + db.quoted("Registration", file) + "\"", good) << stamp;
+  }
+}
+
+// A run of pieces that was left unjoined loses its last piece only.
+TEST(RegistrarUpdate, OfAnItemInPiecesOnlyTheLastPieceGoes) {
+  Installation i;
+  std::string file = i.addObjectExpert("E", "Exp", GText(2));
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              CvlIniMgr& db = r->database();
+              std::string head = file.substr(0, 10), tail = file.substr(10);
+              db.EraseItem(kContents, "Exp");
+              db.SetItem(kContents, "Expert Line0002", head.c_str(), true);
+              db.SetItem(kContents, "Expert Line0003", tail.c_str(), true);
+              db.SetItem("Expert", "x", "1", true);
+              Installation::touch(file, Installation::kInstalled + 1);
+              EXPECT_EQ(r->UpdateRegistrationFile(), S_OK);
+            }),
+            0);
+  DatabaseText db(i.database());
+  EXPECT_TRUE(db.raw(kContents, "Expert Line0002"));
+  EXPECT_FALSE(db.raw(kContents, "Expert Line0003"));
+  EXPECT_FALSE(db.has("Expert"));
+}
+
+// ---- Removing
+
+TEST(RegistrarRemove, AVanishedFileTakesItsComponentsInMemoryAndTheDiskFollowsWithTheNextSave) {
+  Installation i;
+  i.addObjectExpert("E", "Exp", GText(2));
+  std::string gone = i.addObjectExpert("F", "Gone", GText(3));
+  ASSERT_EQ(StartOnce(i), 0);
+  i.removeBundle("Experts", "F.vle");
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, G(3)), E_INVALIDARG);
+              EXPECT_EQ(Find(*r, G(2)), S_OK);
+              DatabaseText disk(i.database());
+              EXPECT_TRUE(disk.has("Gone"));
+              EXPECT_TRUE(disk.raw("Registration", gone));
+              EXPECT_EQ(r->SaveChanges(), S_OK);
+            }),
+            0);
+  DatabaseText db(i.database());
+  EXPECT_FALSE(db.has("Gone"));
+  EXPECT_FALSE(db.raw("KORComponents", "Gone"));
+  EXPECT_FALSE(db.raw("Registration", gone));
+  EXPECT_FALSE(db.raw(kContents, "Gone"));
+  EXPECT_TRUE(db.has("Exp"));
+}
+
+// The start itself saves before the removal, never behind it.
+TEST(RegistrarRemove, AStartWithNothingElseChangedLeavesItOnTheDiskForGood) {
+  Installation i;
+  i.addObjectExpert("F", "Gone", GText(3));
+  ASSERT_EQ(StartOnce(i), 0);
+  ASSERT_EQ(StartOnce(i), 0);  // the blank lines around new sections have gone now
+  i.removeBundle("Experts", "F.vle");
+  std::string before = ReadBytes(i.database());
+  ASSERT_EQ(StartOnce(i), 0);
+  ASSERT_EQ(StartOnce(i), 0);
+  EXPECT_EQ(ReadBytes(i.database()), before);
+}
+
+TEST(RegistrarRemove, ABundleWithoutItsFileHasGone) {
+  Installation i;
+  std::string file = i.addDictionary("a", "Dict", GText(1), 3, "d");
+  ASSERT_EQ(StartOnce(i), 0);
+  unlink(file.c_str());
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, G(1)), E_INVALIDARG);
+              EXPECT_EQ(Find(*r, kVltdd), S_OK);
+            }),
+            0);
+}
+
+TEST(RegistrarRemove, AFileOrALoopInTheBundlesPlaceCountsAsGone) {
+  for (bool loop : {false, true}) {
+    Installation i;
+    i.addDictionary("a", "Dict", GText(1), 3, "d");
+    ASSERT_EQ(StartOnce(i), 0);
+    i.removeBundle(kDictionaries, "a.framework");
+    std::string bundle = i.root() + "/Data Dictionaries/a.framework";
+    if (loop) {
+      fs::create_symlink("a.framework", bundle);
+    } else {
+      WriteBytes(bundle, "a plain file");
+    }
+    EXPECT_EQ(InChild([&] {
+                LinuxStart r(i);
+                EXPECT_EQ(Find(*r, G(1)), E_INVALIDARG);
+                EXPECT_EQ(Find(*r, kVltdd), S_OK);
+              }),
+              0)
+        << loop;
+  }
+}
+
+// Whatever became of its code.
+TEST(RegistrarRemove, TheRegistrationFileDecidesNotTheComponents) {
+  Installation i;
+  i.addBundle("Experts", "E.vle",
+              "[KORComponents]\nE = \"E\"\n[E]\nIdentifier = \"" + GText(1) +
+                  "\"\nFileName = \"/nowhere/E.vle\"\n");
+  for (int start = 0; start < 2; ++start) {
+    EXPECT_EQ(InChild([&] {
+                LinuxStart r(i);
+                EXPECT_EQ(Find(*r, G(1)), S_OK);
+              }),
+              0);
+  }
+}
+
+TEST(RegistrarRemove, ErasesBothNamesOfTheFileAndListsEachPiece) {
+  Installation i;
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              CvlIniMgr& db = r->database();
+              db.SetItem("C", "x", "1", true);
+              db.SetItem("KORComponents", "C", "C", true);
+              db.SetItem("Registration", "Info.vlr", "1 2", true);
+              db.SetItem("Registration", "/gone/Info.vlr", "1 2", true);
+              db.SetItem("Registration", "back.vlr", "1 2", true);
+              db.SetItem(kContents, "first Line0002", "/gone/", true);
+              db.SetItem(kContents, "first Line0003", "x", true);
+              zt::fnd::Vector<zt::fnd::String> list;
+              char section[] = "C", file[] = "/gone/Info.vlr", back[] = "/gone/a\\back.vlr";
+              r->RemoveComponentsIfFileDoesNotExist(section, file, list, 0, 1);
+              ASSERT_EQ(list.size(), 2u);
+              EXPECT_EQ(list[0].exactCompare(L"first Line0002"), 0);
+              EXPECT_EQ(list[1].exactCompare(L"first Line0003"), 0);
+              EXPECT_LT(db.SectionExists("C"), 0);
+              EXPECT_LT(db.ItemExists("KORComponents", "C"), 0);
+              EXPECT_LT(db.ItemExists("Registration", "Info.vlr"), 0);
+              EXPECT_LT(db.ItemExists("Registration", "/gone/Info.vlr"), 0);
+              // Behind the last backslash, if there is one.
+              EXPECT_GE(db.ItemExists("Registration", "back.vlr"), 0);
+              r->RemoveComponentsIfFileDoesNotExist(section, back, list, 0, 0);
+              EXPECT_LT(db.ItemExists("Registration", "back.vlr"), 0);
+              EXPECT_EQ(r->RemoveDeletedComponents(), S_OK);
+              EXPECT_EQ(db.GetNumberOfItems(kContents), 0);
+            }),
+            0);
+}
+
+TEST(RegistrarRemove, AnExistingFileLeavesEverything) {
+  Installation i;
+  std::string file = i.addObjectExpert("E", "Exp", GText(2));
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              zt::fnd::Vector<zt::fnd::String> list;
+              char section[] = "Exp";
+              r->RemoveComponentsIfFileDoesNotExist(section, std::string(file).data(), list, 0, 0);
+              EXPECT_EQ(list.size(), 0u);
+              EXPECT_GE(r->database().SectionExists("Exp"), 0);
+              EXPECT_EQ(r->RemoveDeletedComponents(), S_OK);
+            }),
+            0);
+}
+
+// ---- Files that cannot be used
+
+TEST(RegistrarUnreadable, AFileThatCannotBeParsedIsSetAsideWithItsComponents) {
+  Installation i;
+  std::string file = i.addObjectExpert("E", "Exp", GText(2));
+  ASSERT_EQ(StartOnce(i), 0);
+  WriteBytes(file, std::string("\xFF\xFE[\0", 4));
+  Installation::touch(file, Installation::kInstalled + 1);
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, G(2)), E_INVALIDARG);
+              EXPECT_EQ(Find(*r, kVltdd), S_OK);
+            }),
+            0);
+  EXPECT_FALSE(Exists(file));
+  int beside = 0;
+  for (const auto& entry : fs::directory_iterator(fs::path(file).parent_path())) {
+    EXPECT_EQ(entry.path().extension(), ".bad");
+    ++beside;
+  }
+  EXPECT_EQ(beside, 1);
+  EXPECT_FALSE(DatabaseText(i.database()).has("Exp"));
+  ASSERT_EQ(StartOnce(i), 0);
+}
+
+TEST(RegistrarUnreadable, WhatCannotBeOpenedJustNowStaysAndIsTriedAgain) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  Installation i;
+  chmod(fs::path(i.root()).parent_path().c_str(), 0755);
+  chmod(i.root().c_str(), 0777);
+  chmod(getenv("ZTFNDTMPSHAREDFILEDIR"), 0777);
+  std::string file = i.addObjectExpert("E", "Exp", GText(2));
+  i.addObjectExpert("F", "Other", GText(3));
+  chmod(file.c_str(), 0);
+  EXPECT_EQ(InChild([&] {
+              ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, G(2)), E_INVALIDARG);
+              EXPECT_EQ(Find(*r, G(3)), S_OK);
+            }),
+            0);
+  EXPECT_EQ(ModeOf(file), 0);
+  EXPECT_FALSE(DatabaseText(i.database()).raw("Registration", file));
+  chmod(file.c_str(), 0644);
+  EXPECT_EQ(InChild([&] {
+              ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, G(2)), S_OK);
+            }),
+            0);
+}
+
+}  // namespace
+}  // namespace vlt::test

@@ -1,0 +1,307 @@
+// A process killed at every single system call of a save, by strace's injection. Whatever the
+// moment, the next start opens the database with the old or the new contents, nothing is lost and
+// nothing set aside.
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <stdlib.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <fstream>
+#include <map>
+#include <set>
+
+#include "tests/e2e/Start.h"
+#include "tests/support/MemoryLimit.h"
+
+namespace vlt::test {
+namespace {
+
+constexpr char kBegin[] = "/vlt-save-begins";
+constexpr char kEnd[] = "/vlt-save-ends";
+constexpr unsigned kDefaultCacheSize = 33554432;
+// A sanitizer sees nothing in a process that is killed, and makes each one slow: every seventh call
+// will do there.
+constexpr size_t kCallsPerKill = kCanLimitMemory ? 1 : 7;
+constexpr char kSaveVariable[] = "VLT_E2E_SAVE";
+
+// This program is also the client that is killed: with the variable set it makes the one save that
+// is asked for, between two calls that mark it in a trace, and ends.
+int SaveOnce(const char* what) {
+  IvltRegistrar* registrar = nullptr;
+  if (GetRegistrar(&registrar) != "ok") return 1;
+  void* raw = nullptr;
+  if (registrar->QueryInterface(IID_IvltRegistrar2, &raw) < 0) return 2;
+  auto size = static_cast<unsigned>(strtoul(what, nullptr, 10));
+  access(kBegin, F_OK);
+  HRESULT result = static_cast<IvltRegistrar2*>(raw)->SetStorageServerCacheSize(size);
+  access(kEnd, F_OK);
+  return result == S_OK ? 0 : 3;
+}
+
+__attribute__((constructor)) void ActAsClient() {
+  if (const char* what = getenv(kSaveVariable)) _exit(SaveOnce(what));
+}
+
+// A call of the trace: which of its name, from 1.
+struct Call {
+  std::string name;
+  int when;
+  std::string text;
+};
+
+bool IsAboutMemory(const std::string& name) {
+  static const std::set<std::string> names = {"brk",      "mmap",    "mmap2", "munmap",    "mremap",
+                                              "mprotect", "madvise", "futex", "exit_group"};
+  return names.count(name) != 0;
+}
+
+// "openat(AT_FDCWD, ..." gives "openat".
+std::string NameIn(const std::string& line) {
+  size_t begin = line.find_first_not_of("0123456789 ");
+  size_t end = line.find('(', begin);
+  if (begin == std::string::npos || end == std::string::npos) return "";
+  std::string name = line.substr(begin, end - begin);
+  return name.find_first_not_of("abcdefghijklmnopqrstuvwxyz0123456789_") == std::string::npos ? name
+                                                                                              : "";
+}
+
+class Tracing {
+ public:
+  // `variables` go to the traced program; leak checks do not work under a tracer.
+  Tracing(std::vector<std::string> program, Environment variables)
+      : m_program(std::move(program)), m_variables(std::move(variables)) {
+    m_variables.push_back({"ASAN_OPTIONS", "detect_leaks=0:allocator_may_return_null=1"});
+  }
+
+  // Why the machine cannot do this; empty if it can.
+  static std::string Missing() {
+    ProgramResult result = RunProgram({"strace", "-o", "/dev/null", "true"});
+    if (result.exitCode == 127) return "strace is not installed";
+    return result.exitCode == 0 ? "" : "strace may not trace here: " + result.err;
+  }
+
+  // The calls from the first line with `from` to the last with `to`.
+  std::vector<Call> record(const std::string& from, const std::string& to) const {
+    TempDir dir;
+    EXPECT_EQ(run({"-o", dir / "log", "-s", "300"}).exitCode, 0);
+    std::ifstream in(dir / "log");
+    std::vector<Call> calls;
+    std::map<std::string, int> seen;
+    bool inside = false;
+    size_t last = 0;
+    for (std::string line; std::getline(in, line);) {
+      std::string name = NameIn(line);
+      if (name.empty()) continue;
+      int when = ++seen[name];
+      if (line.find(from) != std::string::npos) inside = true;
+      if (inside && !IsAboutMemory(name)) calls.push_back({name, when, line});
+      if (inside && line.find(to) != std::string::npos) last = calls.size();
+    }
+    calls.resize(last);
+    return calls;
+  }
+
+  // Runs the program anew and kills it on its way into the call. 128 + SIGKILL if it met it.
+  int killAt(const Call& call) const {
+    return run({"-o", "/dev/null", "-e", "trace=" + call.name, "-e",
+                "inject=" + call.name + ":signal=KILL:when=" + std::to_string(call.when)})
+        .exitCode;
+  }
+
+ private:
+  ProgramResult run(const std::vector<std::string>& options) const {
+    std::vector<std::string> argv = {"strace", "-f", "-qq"};
+    argv.insert(argv.end(), options.begin(), options.end());
+    argv.insert(argv.end(), m_program.begin(), m_program.end());
+    return RunProgram(argv, m_variables);
+  }
+
+  std::vector<std::string> m_program;
+  Environment m_variables;
+};
+
+// What a series of kills came to.
+struct Tally {
+  int kills = 0, old = 0, fresh = 0, lost = 0, setAside = 0, refused = 0;
+
+  void print(const char* what) const {
+    printf(
+        "%s: %d kills; %d old contents, %d new contents, %d lost values, %d files set aside, "
+        "%d starts refused\n",
+        what, kills, old, fresh, lost, setAside, refused);
+  }
+  void expectNoLoss() const {
+    EXPECT_EQ(lost, 0);
+    EXPECT_EQ(setAside, 0);
+    EXPECT_EQ(refused, 0);
+    EXPECT_EQ(old + fresh, kills);
+  }
+};
+
+int FilesSetAside(const Installation& i) {
+  int count = 0;
+  for (const auto& entry : std::filesystem::recursive_directory_iterator(i.root())) {
+    if (entry.path().extension() == ".bad") ++count;
+  }
+  return count;
+}
+
+// Exit codes of the start that follows a kill.
+enum After { kOld = 10, kNew = 11, kLost = 12, kRefused = 13 };
+
+void Count(Tally* tally, int code, const Installation& i, const Call& call) {
+  ++tally->kills;
+  if (code == kOld) ++tally->old;
+  if (code == kNew) ++tally->fresh;
+  if (code == kLost) ++tally->lost;
+  if (code != kOld && code != kNew && code != kLost) ++tally->refused;
+  int setAside = FilesSetAside(i);
+  tally->setAside += setAside;
+  EXPECT_TRUE((code == kOld || code == kNew) && setAside == 0)
+      << "killed at " << call.text << ": the next start ends with " << code;
+}
+
+class RegistrarKill : public testing::Test {
+ protected:
+  void SetUp() override {
+    std::string missing = Tracing::Missing();
+    if (!missing.empty()) {
+      printf("NOT TESTED: kills during a save; %s\n", missing.c_str());
+      GTEST_SKIP() << missing;
+    }
+  }
+};
+
+// What a client put there beforehand, and must find again.
+constexpr wchar_t kRegistered[] = L"Registered by a client";
+
+void RegisterOne(IvltRegistrar& r) {
+  Offered d(vltComponentDataDictionary, kRegistered, G(77), L"/x/y.framework", L"rc");
+  EXPECT_EQ(r.RegisterComponent(&d.value), S_OK);
+}
+
+bool HasAll(IvltRegistrar& r, const std::vector<GUID>& all) {
+  for (const GUID& id : all) {
+    if (Find(r, id) != S_OK) return false;
+  }
+  return true;
+}
+
+unsigned CacheSize(IvltRegistrar& r) {
+  void* raw = nullptr;
+  unsigned size = 0;
+  if (r.QueryInterface(IID_IvltRegistrar2, &raw) < 0) return 0;
+  static_cast<IvltRegistrar2*>(raw)->GetStorageServerCacheSize(&size);
+  r.Release();
+  return size;
+}
+
+// A start after a kill: old or new value, and all components.
+int StartAfter(unsigned oldSize, unsigned newSize, const std::vector<GUID>& all) {
+  return Child([&] {
+           IvltRegistrar* r = nullptr;
+           if (GetRegistrar(&r) != "ok") return static_cast<int>(kRefused);
+           unsigned size = CacheSize(*r);
+           if (!HasAll(*r, all)) return static_cast<int>(kLost);
+           if (size == newSize) return static_cast<int>(kNew);
+           return static_cast<int>(size == oldSize ? kOld : kLost);
+         })
+      .wait();
+}
+
+Tracing SavingClient(unsigned size) {
+  return Tracing({std::filesystem::read_symlink("/proc/self/exe")},
+                 {{kSaveVariable, std::to_string(size)}});
+}
+
+void SetUpSaving(Installation& i) {
+  i.addDictionary("Core", "Core", GText(1), 7, "co");
+  i.addObjectExpert("Tank", "Tank", GText(2), "{" + GText(2) + "}:1:{" + GText(9) + "}");
+  ExpectStart([](IvltRegistrar& r) { RegisterOne(r); });
+  ExpectStart("ok");
+}
+
+TEST_F(RegistrarKill, AtEveryCallOfASaveThatAClientAskedFor) {
+  Installation i;
+  SetUpSaving(i);
+  const std::vector<GUID> all = {kVltdd, G(1), G(2), G(77)};
+  std::vector<Call> calls = SavingClient(1).record(kBegin, kEnd);
+  ASSERT_GT(calls.size(), 15u);
+  Tally tally;
+  unsigned present = 1;
+  for (const Call& call : calls) {
+    unsigned wanted = present + 1;
+    ASSERT_EQ(SavingClient(wanted).killAt(call), 128 + SIGKILL) << call.text;
+    int code = StartAfter(present, wanted, all);
+    Count(&tally, code, i, call);
+    if (code == kNew) present = wanted;
+  }
+  tally.print("client's save");
+  tally.expectNoLoss();
+  EXPECT_GT(tally.old, 0);
+  EXPECT_GT(tally.fresh, 0);
+  ExpectWhole(i);
+}
+
+// Whole starts of the command-line client, each from the same state: from the first look at the
+// sidecar to the last call that has to do with the installation.
+void KillStarts(const char* what, const Installation& i, const std::vector<GUID>& all,
+                size_t atLeast, const std::function<void()>& prepare,
+                const std::function<void()>& check) {
+  Tracing start({std::string(VLT_TEST_BIN) + "/vltctl", "list"}, {});
+  prepare();
+  std::vector<Call> calls = start.record("vlt.vl5", i.root());
+  ASSERT_GT(calls.size(), atLeast);
+  Tally tally;
+  for (size_t n = 0; n < calls.size(); n += kCallsPerKill) {
+    const Call& call = calls[n];
+    prepare();
+    ASSERT_EQ(start.killAt(call), 128 + SIGKILL) << call.text;
+    Count(&tally, StartAfter(kDefaultCacheSize, kDefaultCacheSize, all), i, call);
+    check();
+  }
+  tally.print(what);
+  tally.expectNoLoss();
+  ExpectWhole(i);
+}
+
+TEST_F(RegistrarKill, AtEveryCallOfAFirstStart) {
+  Installation i;
+  i.addDictionary("Core", "Core", GText(1), 7, "co");
+  i.addObjectExpert("Tank", "Tank", GText(2));
+  auto prepare = [&] {
+    for (const char* name : {"/vlt.vlr", "/vlt.vl5", "/vlt.TMP", "/vlt.vl5.TMP", "/Data"}) {
+      std::filesystem::remove(i.root() + name);
+    }
+  };
+  KillStarts("first start", i, {kVltdd, G(1), G(2)}, 100, prepare, [] {});
+}
+
+// The save that finds no sidecar writes the mark first.
+TEST_F(RegistrarKill, AtEveryCallOfAStartWithoutASidecar) {
+  Installation i;
+  SetUpSaving(i);
+  KillStarts(
+      "start without a sidecar", i, {kVltdd, G(1), G(2), G(77)}, 30,
+      [&] { std::filesystem::remove(i.sidecar()); }, [] {});
+}
+
+// What the changed file brought before is erased, merged anew and saved.
+TEST_F(RegistrarKill, AtEveryCallOfAStartThatMerges) {
+  Installation i;
+  i.addObjectExpert("Tank", "Tank", GText(2), "{" + GText(2) + "}:1:{" + GText(9) + "}");
+  std::string file = i.addDictionary("Core", "Core", GText(1), 7, "co");
+  ExpectStart([](IvltRegistrar& r) { RegisterOne(r); });
+  time_t time = Installation::kInstalled;
+  KillStarts(
+      "start that merges", i, {kVltdd, G(1), G(2), G(77)}, 50,
+      [&] { Installation::touch(file, ++time); },
+      [&] {
+        EXPECT_EQ(DatabaseText(i.database()).quoted("Registration", file),
+                  Installation::stamp(time));
+      });
+}
+
+}  // namespace
+}  // namespace vlt::test

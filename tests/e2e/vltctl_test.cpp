@@ -1,0 +1,231 @@
+// The command-line client as its users meet it: arguments, output, exit codes.
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <nlohmann/json.hpp>
+
+#include "tests/e2e/Start.h"
+
+namespace vlt::test {
+namespace {
+
+using nlohmann::json;
+
+enum ExitCode { kGood = 0, kNotFound = 1, kUsage = 2, kDataUnusable = 3 };
+
+ProgramResult Vltctl(std::vector<std::string> arguments) {
+  arguments.insert(arguments.begin(), std::string(VLT_TEST_BIN) + "/vltctl");
+  return RunProgram(arguments);
+}
+
+// Dictionary, object expert and resource expert, the latter two bound to one class.
+class Sample : public Installation {
+ public:
+  Sample() {
+    addDictionary("Core", "Core Dictionary", GText(1), 7, "co");
+    addObjectExpert("Tank", "Tank", GText(2), "{" + GText(2) + "}:1:{" + GText(9) + "}");
+    addResourceExpert("Serial", "Serial \"Ports\"", GText(3), "PNP0501",
+                      "{" + GText(3) + "}:1:{" + GText(9) + "}");
+  }
+};
+
+std::string B(uint32_t n) { return "{" + GText(n) + "}"; }
+
+// ---- Arguments
+
+TEST(Vltctl, HelpAndVersionAreGoodAndGoToStandardOutput) {
+  for (const char* option : {"--help", "-h"}) {
+    ProgramResult result = Vltctl({option});
+    EXPECT_EQ(result.exitCode, kGood);
+    EXPECT_EQ(result.err, "");
+    for (const char* word : {"list", "show", "classes", "--version", "Exit codes"}) {
+      EXPECT_NE(result.out.find(word), std::string::npos) << word;
+    }
+  }
+  ProgramResult version = Vltctl({"--version"});
+  EXPECT_EQ(version.exitCode, kGood);
+  EXPECT_EQ(version.out, "1.0.0\n");
+  ProgramResult help = Vltctl({"show", "--help"});
+  EXPECT_EQ(help.exitCode, kGood);
+  EXPECT_NE(help.out.find("--json"), std::string::npos);
+}
+
+TEST(Vltctl, BadArgumentsAreUsageErrorsAndStartNothing) {
+  Installation i;
+  const std::vector<std::vector<std::string>> rows = {{},
+                                                      {"nothing"},
+                                                      {"--nothing"},
+                                                      {"list", "more"},
+                                                      {"list", "--nothing"},
+                                                      {"show"},
+                                                      {"show", "words"},
+                                                      {"show", ""},
+                                                      {"show", GText(1) + "0"},
+                                                      {"show", GText(1), GText(2)},
+                                                      {"classes"},
+                                                      {"classes", "{" + GText(1)}};
+  for (const auto& row : rows) {
+    ProgramResult result = Vltctl(row);
+    EXPECT_EQ(result.exitCode, kUsage) << json(row);
+    EXPECT_NE(result.err, "") << json(row);
+    EXPECT_EQ(result.out, "") << json(row);
+  }
+  EXPECT_FALSE(Exists(i.database()));
+}
+
+// ---- list
+
+TEST(Vltctl, ListShowsATable) {
+  Sample s;
+  ProgramResult result = Vltctl({"list"});
+  EXPECT_EQ(result.exitCode, kGood);
+  EXPECT_EQ(result.err, "");
+  std::vector<std::string> lines;
+  std::istringstream in(result.out);
+  for (std::string line; std::getline(in, line);) lines.push_back(line);
+  ASSERT_EQ(lines.size(), 6u);
+  EXPECT_EQ(lines[0].substr(0, 4), "TYPE");
+  auto holds = [&](int n, const std::vector<std::string>& words) {
+    size_t at = 0;
+    for (const std::string& word : words) {
+      at = lines[n].find(word, at);
+      EXPECT_NE(at, std::string::npos) << word << " in " << lines[n];
+      if (at == std::string::npos) return;
+    }
+  };
+  holds(1, {"dictionary", "Core Dictionary", B(1), "7",
+            s.root() + "/Data Dictionaries/Core.framework"});
+  holds(2,
+        {"dictionary", "vltdd", "{790F6A90-E0D8-11D3-AA15-005004D131EE}", "0", "vltdd.framework"});
+  holds(3, {"object expert", "Tank", B(2), "-", s.root() + "/Experts/Tank.vle"});
+  holds(4, {"resource expert", "Serial \"Ports\"", B(3), "-", s.root() + "/Experts/Serial.vle"});
+  holds(5, {"4 components", "ms"});
+}
+
+TEST(Vltctl, ListAsJson) {
+  Sample s;
+  ProgramResult result = Vltctl({"list", "--json"});
+  EXPECT_EQ(result.exitCode, kGood);
+  json out = json::parse(result.out);
+  EXPECT_GE(out["readyMs"].get<double>(), 0);
+  ASSERT_EQ(out["components"].size(), 4u);
+  EXPECT_EQ(out["components"][0], (json{{"type", "dictionary"},
+                                        {"name", "Core Dictionary"},
+                                        {"guid", B(1)},
+                                        {"file", s.root() + "/Data Dictionaries/Core.framework"},
+                                        {"schemaVersion", 7},
+                                        {"changed", true},
+                                        {"lastInstalledSchemaVersion", 4294967295u},
+                                        {"prefix", "co"}}));
+  EXPECT_EQ(out["components"][2], (json{{"type", "object expert"},
+                                        {"name", "Tank"},
+                                        {"guid", B(2)},
+                                        {"file", s.root() + "/Experts/Tank.vle"}}));
+  EXPECT_EQ(out["components"][3]["name"], "Serial \"Ports\"");
+  EXPECT_EQ(out["components"][3]["pnp"], "PNP0501");
+}
+
+TEST(Vltctl, JsonIsValidWhateverTheNames) {
+  Installation i;
+  i.addBundle("Experts", "x.vle",
+              "[KORComponents]\nx = \"x\"\n[x]\nIdentifier = \"" + GText(1) +
+                  "\"\nFileName = \"/a\\x01\xFF\xC3\x28\\n\\\"b\"\n");
+  for (const char* locale : {"C", "C.UTF-8"}) {
+    ProgramResult result =
+        RunProgram({std::string(VLT_TEST_BIN) + "/vltctl", "list", "--json"}, {{"LC_ALL", locale}});
+    EXPECT_EQ(result.exitCode, kGood) << result.err;
+    EXPECT_FALSE(json::parse(result.out, nullptr, false).is_discarded()) << result.out;
+  }
+}
+
+// ---- show
+
+TEST(Vltctl, ShowTakesEveryFormOfTheIdentifier) {
+  Sample s;
+  for (const std::string& guid :
+       {GText(1), B(1), std::string("{00000001-1111-4222-8333-444444444444}")}) {
+    ProgramResult result = Vltctl({"show", guid});
+    EXPECT_EQ(result.exitCode, kGood) << result.err;
+    for (const char* word : {"Core Dictionary", "schema version", "co", "none", "yes"}) {
+      EXPECT_NE(result.out.find(word), std::string::npos) << word;
+    }
+  }
+  json out = json::parse(Vltctl({"show", "--json", GText(3)}).out);
+  EXPECT_EQ(out["type"], "resource expert");
+  EXPECT_EQ(out["pnp"], "PNP0501");
+}
+
+TEST(Vltctl, ShowOfAnUnknownOneIsNotFound) {
+  Sample s;
+  for (const char* option : {"--json", ""}) {
+    std::vector<std::string> arguments = {"show", GText(77)};
+    if (*option) arguments.push_back(option);
+    ProgramResult result = Vltctl(arguments);
+    EXPECT_EQ(result.exitCode, kNotFound);
+    EXPECT_EQ(result.out, "");
+    EXPECT_NE(result.err.find(GText(77)), std::string::npos);
+  }
+}
+
+// ---- classes
+
+TEST(Vltctl, ClassesListsTheExpertsOfBothTypes) {
+  Sample s;
+  ProgramResult table = Vltctl({"classes", GText(9)});
+  EXPECT_EQ(table.exitCode, kGood);
+  EXPECT_NE(table.out.find("Tank"), std::string::npos);
+  EXPECT_NE(table.out.find("Serial"), std::string::npos);
+  EXPECT_EQ(table.out.find("Core"), std::string::npos);
+  json out = json::parse(Vltctl({"classes", B(9), "--json"}).out);
+  ASSERT_EQ(out.size(), 2u);
+  EXPECT_EQ(out[0]["name"], "Tank");
+  EXPECT_EQ(out[1]["type"], "resource expert");
+}
+
+TEST(Vltctl, ClassesOfAnUnknownClassIsNotFound) {
+  Sample s;
+  ProgramResult result = Vltctl({"classes", GText(2)});
+  EXPECT_EQ(result.exitCode, kNotFound);
+  EXPECT_EQ(result.out, "");
+  EXPECT_NE(result.err, "");
+}
+
+// ---- Unusable data
+
+TEST(Vltctl, DataThatCannotBeUsedIsToldInOneLine) {
+  auto expectUnusable = [] {
+    for (const std::vector<std::string>& command :
+         {std::vector<std::string>{"list"}, {"show", GText(1)}, {"classes", GText(1)}}) {
+      ProgramResult result = Vltctl(command);
+      EXPECT_EQ(result.exitCode, kDataUnusable) << command[0];
+      EXPECT_EQ(result.out, "");
+      EXPECT_EQ(result.err.substr(0, 8), "vltctl: ");
+      EXPECT_EQ(std::count(result.err.begin(), result.err.end(), '\n'), 1);
+    }
+  };
+  Sample s;
+  Installation::setDir("");
+  expectUnusable();
+  Installation::setDir(s.root());
+  ASSERT_EQ(mkfifo(s.database().c_str(), 0666), 0);
+  expectUnusable();
+  unlink(s.database().c_str());
+  WriteBytes(s.root() + "/Data", "in the way");
+  expectUnusable();
+  unlink((s.root() + "/Data").c_str());
+  EXPECT_EQ(Vltctl({"list"}).exitCode, kGood);
+}
+
+TEST(Vltctl, ADatabaseThatWasSetAsideIsToldAndTheNextCallWorks) {
+  Sample s;
+  ASSERT_EQ(Vltctl({"list"}).exitCode, kGood);
+  WriteBytes(s.sidecar(), "short");
+  ProgramResult result = Vltctl({"list"});
+  EXPECT_EQ(result.exitCode, kDataUnusable);
+  EXPECT_NE(result.err.find("set aside"), std::string::npos);
+  EXPECT_EQ(Vltctl({"list"}).exitCode, kGood);
+}
+
+}  // namespace
+}  // namespace vlt::test
