@@ -34,7 +34,7 @@ class CvlIniMgr {
   // Waits for the lock without limit. `lockOnly`: holds the lock and does nothing else; items must
   // not be asked for. `expectedChecksum`: 16 bytes or null for no check. `saveOnDestroy`: the
   // destructor writes. `useEscapes`: values are encoded when set and decoded when read. Throws the
-  // plain int 1 as told above, and what the lock throws (zt::fnd::osdep::PosixError).
+  // plain int 1 as in the table, and what the lock throws (zt::fnd::osdep::PosixError).
   CvlIniMgr(char const* fileName, bool lockOnly, unsigned char const* expectedChecksum,
             bool saveOnDestroy, bool useEscapes);
   virtual ~CvlIniMgr();

@@ -276,7 +276,7 @@ TEST(HookPoints, UnarmedActionsSucceed) {
   }
 }
 
-TEST(HookPoints, ASimulatedFailureHasItsToldResult) {
+TEST(HookPoints, ASimulatedFailureHasItsResult) {
   for (const Point& point : kPoints) {
     EXPECT_EQ(Armed(Hook(point.name, kSimulate), [&] { return Perform(point.action); }),
               point.answered)
@@ -284,7 +284,7 @@ TEST(HookPoints, ASimulatedFailureHasItsToldResult) {
   }
 }
 
-TEST(HookPoints, AThrownFailureHasItsToldResult) {
+TEST(HookPoints, AThrownFailureHasItsResult) {
   for (const Point& point : kPoints) {
     EXPECT_EQ(Armed(Hook(point.name, kThrow), [&] { return Perform(point.action); }), point.thrown)
         << point.name;
@@ -318,7 +318,7 @@ TEST(HookPoints, ExhaustedMemoryIsSurvived) {
       if (setrlimit(RLIMIT_AS, &limit) != 0) return 99;
       return Perform(point.action);
     });
-    EXPECT_LE(result, 4) << point.name;  // the told results or a bad_alloc, and no crash
+    EXPECT_LE(result, 4) << point.name;  // a result or a bad_alloc, and no crash
     EXPECT_NE(result, 3) << point.name;
   }
 }

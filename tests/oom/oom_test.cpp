@@ -1,5 +1,5 @@
 // Out of memory: the 1st, 2nd, 3rd ... allocation of every call fails, once and for all that follow,
-// until the call succeeds. No crash; the told result or std::bad_alloc; nothing leaked; and the call
+// until the call succeeds. No crash; a result or std::bad_alloc; nothing leaked; and the call
 // works again afterwards.
 //
 // The program's own malloc stands before the C library's for every library of the process, so what the

@@ -319,8 +319,8 @@ std::string DeepBytes(unsigned levels) {
 TEST(SubStreamArea, DeepNestingNeitherOverflowsTheStackNorTheMemory) {
   EXPECT_EQ(Loading(DeepBytes(3)), Thrown::Nothing);
   int result = InChild([] {
-    if (kCanLimitMemory) LimitMemoryTo(256 << 20);
-    EXPECT_EQ(Loading(DeepBytes(200000)), Thrown::Stream);
+    if (kCanLimitMemory) LimitMemoryTo(64 << 20);
+    EXPECT_EQ(Loading(DeepBytes(20000)), Thrown::Stream);
   });
   EXPECT_EQ(result, 0);
 }
