@@ -9,7 +9,10 @@ void* vltTaskMemAlloc(size_t sizeBytes) {
 
 void vltTaskMemFree(void* p) { free(p); }
 
-void vltFreeComponent2(_vltComponent2& record) {
+namespace {
+
+template <class Record>
+void FreeTexts(Record& record) {
   vltTaskMemFree(record.name);
   vltTaskMemFree(record.fileName);
   if (record.type == vltComponentDataDictionary) {
@@ -21,14 +24,7 @@ void vltFreeComponent2(_vltComponent2& record) {
   }
 }
 
-void vltFreeComponent(_vltComponent& record) {
-  vltTaskMemFree(record.name);
-  vltTaskMemFree(record.fileName);
-  if (record.type == vltComponentDataDictionary) {
-    vltTaskMemFree(record.dictionary.prefix);
-    vltTaskMemFree(record.dictionary.auxString1);
-    vltTaskMemFree(record.dictionary.auxString2);
-  } else if (record.type == vltComponentResourceExpert) {
-    vltTaskMemFree(record.resource.pnp);
-  }
-}
+}  // namespace
+
+void vltFreeComponent2(_vltComponent2& record) { FreeTexts(record); }
+void vltFreeComponent(_vltComponent& record) { FreeTexts(record); }

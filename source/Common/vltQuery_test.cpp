@@ -427,6 +427,7 @@ TEST(Query, AnArmedReadIsOutOfMemory) {
     _vltQuery query = Query(terms), read = {};
     Reader reader;
     reader.items = Recorded(query);
+    read.terms = reinterpret_cast<_vltQueryTerm*>(uintptr_t{1});
     EXPECT_EQ(vltMarshalQueryFromStream(&reader, &read), E_OUTOFMEMORY);
     EXPECT_EQ(reader.calls, 5);
     EXPECT_EQ(read.termCount, 6u);

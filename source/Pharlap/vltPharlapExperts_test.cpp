@@ -200,7 +200,9 @@ TYPED_TEST(RegistrarReading, KeysDecideTheType) {
       {"schemaversion = 1\n", vltComponentDataDictionary},
       {"PnP = \"\"\n", vltComponentResourceExpert},
       {"Prefix = \"x\"\n", vltComponentObjectExpert}};
-  for (const auto& [items, type] : rows) {
+  for (const auto& row : rows) {
+    const char* items = row.first;
+    _vltComponentType type = row.second;
     Installation i;
     i.addBundle("Experts", "E.vle", OneExpert(items));
     EXPECT_EQ(InChild([&] {

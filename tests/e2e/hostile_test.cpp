@@ -639,6 +639,18 @@ TEST_F(HostileUsers, AnUnreadableRegistrationFileIsSkippedAndNotLost) {
   ExpectStart("ok", [](IvltRegistrar& r) { EXPECT_EQ(Find(r, G(1)), S_OK); });
 }
 
+// What keeps a look into a bundle from being taken is the client's to know; the database and its lock
+// are as they were, and users with the right are served.
+TEST_F(HostileUsers, ABundleThatIsClosedToAUserIsRaisedForThatUser) {
+  chmod(b.root().c_str(), 0777);
+  ExpectStart("ok");
+  fs::create_directories(b.root() + "/Experts/closed.vle/Resources");
+  chmod((b.root() + "/Experts/closed.vle").c_str(), 0700);
+  ExpectStartAsNobody("PosixError " + std::to_string(EACCES));
+  ExpectStart([](IvltRegistrar& r) { EXPECT_EQ(Find(r, G(kGood)), S_OK); });
+  ExpectWhole(b);
+}
+
 // A client without any rights still reads what another user's process has registered.
 TEST_F(HostileUsers, WithoutRightsTheDatabaseIsReadAndNothingIsChanged) {
   ExpectStart("ok");

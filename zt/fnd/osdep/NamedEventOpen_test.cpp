@@ -1,4 +1,4 @@
-// Opening and closing: which slot an event gets, what stands in the files, and what is left.
+// Opening: which slot an event gets, and what stands in the files.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -20,6 +20,7 @@
 
 #include "tests/support/Child.h"
 #include "tests/support/EventPlace.h"
+#include "tests/support/NamedEventFiles.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
@@ -33,11 +34,13 @@ namespace {
 using vlt::test::Child;
 using vlt::test::EventPlace;
 using vlt::test::Exists;
+using vlt::test::HeaderOf;
 using vlt::test::Keeper;
 using vlt::test::ModeOf;
 using vlt::test::OpenDescriptors;
 using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
+using vlt::test::RecordOf;
 using vlt::test::Wide;
 using vlt::test::WriteBytes;
 typedef std::vector<std::string> Names;
@@ -46,9 +49,9 @@ constexpr bool kManual = true, kAutomatic = false, kSet = true, kClear = false;
 
 typedef EventPlace::Slot Slot;
 
-auto Open(const std::string& name, bool manual = kManual, bool initial = kClear) {
-  return std::make_unique<NamedEvent>(Wide(name), manual, initial);
-}
+constexpr auto Open = [](const std::string& name, bool manual = kManual, bool initial = kClear) {
+  return vlt::test::OpenEvent(name, manual, initial);
+};
 
 // The errno that opening the name fails with in another process; 0 if it does not.
 int ErrorElsewhere(const std::string& name, bool manual) {
@@ -57,24 +60,6 @@ int ErrorElsewhere(const std::string& name, bool manual) {
            return error == -1 ? 0 : error;
          })
       .wait();
-}
-
-SetHeader HeaderOf(const std::string& path) {
-  std::string bytes = ReadBytes(path);
-  SetHeader header;
-  SetHeader::Bytes head = {};
-  if (bytes.size() >= head.size()) std::memcpy(head.data(), bytes.data(), head.size());
-  EXPECT_TRUE(header.decode(head)) << path;
-  return header;
-}
-
-SlotRecord RecordOf(const std::string& path, unsigned slot) {
-  std::string bytes = ReadBytes(path);
-  SlotRecord::Bytes record = {};
-  std::size_t at = static_cast<std::size_t>(SlotRecord::Offset(slot));
-  EXPECT_GE(bytes.size(), at + record.size());
-  std::memcpy(record.data(), bytes.data() + at, record.size());
-  return SlotRecord::Decode(record);
 }
 
 // ---- one process
@@ -352,209 +337,6 @@ TEST(NamedEventFiles, SetLivesUntilTheLastOfItsEventsGoes) {
   mine.reset();
   EXPECT_EQ(Names(), place.files());
   EXPECT_EQ(-1, EventPlace::ValueOf(id, 0));
-}
-
-// ---- processes that die
-
-TEST(NamedEventFiles, KilledProcessLeavesItsSlotToTheNextOpener) {
-  EventPlace place;
-  auto other = Open("other");
-  for (bool manual : {kManual, kAutomatic}) {
-    Keeper killed([&] { return Open("name", manual, kClear); });
-    ASSERT_TRUE(killed.good());
-    Slot slot = place.slotOf("name");
-    killed.kill();
-    EXPECT_TRUE(Exists(place.file("name")));
-    auto another = Open("another");  // takes another slot
-    for (bool initial : {kSet, kClear}) {
-      Keeper next([&] { return Open("name", manual, initial); });
-      ASSERT_TRUE(next.good());
-      EXPECT_EQ(slot, place.slotOf("name"));
-      EXPECT_EQ(125u, HeaderOf(place.file("sem_1")).freeCount);
-      Child asks([&] { return Open("name", manual, !initial)->checkOnly() == initial ? 0 : 1; });
-      EXPECT_EQ(0, asks.wait());
-      next.kill();
-    }
-    Open("name", manual);  // closing takes everything away again
-    EXPECT_FALSE(Exists(place.file("name")));
-    EXPECT_EQ(126u, HeaderOf(place.file("sem_1")).freeCount);
-  }
-}
-
-TEST(NamedEventFiles, SetWhoseUsersAllDiedIsMadeAnew) {
-  EventPlace place;
-  int id = -1;
-  {
-    Keeper killed([] {
-      std::vector<std::unique_ptr<NamedEvent>> events;
-      for (int i = 0; i < 5; ++i) events.push_back(Open("e" + std::to_string(i)));
-      return events;
-    });
-    ASSERT_TRUE(killed.good());
-    id = place.setOf(1);
-    killed.kill();
-  }
-  EXPECT_EQ((Slot{1, 4}), place.slotOf("e4"));
-  auto event = Open("e4", kManual, kSet);
-  EXPECT_EQ((Slot{1, 0}), place.slotOf("e4"));
-  EXPECT_EQ(127u, HeaderOf(place.file("sem_1")).freeCount);
-  EXPECT_EQ(id, place.setOf(1));  // the kernel's set is taken over
-  EXPECT_TRUE(event->checkOnly());
-  // A name whose file leads to a slot that is another's by now gets one of its own.
-  auto e0 = Open("e0");
-  EXPECT_EQ((Slot{1, 1}), place.slotOf("e0"));
-  event.reset();
-  e0.reset();
-  EXPECT_EQ((Names{"e1", "e2", "e3"}), place.files());
-  for (int i = 1; i < 4; ++i) Open("e" + std::to_string(i));
-  EXPECT_EQ(Names(), place.files());
-}
-
-TEST(NamedEventFiles, SlotOfADeadEventOfTheOtherKindIsNotTaken) {
-  EventPlace place;
-  auto other = Open("other");
-  Keeper killed([] { return Open("name", kManual); });
-  ASSERT_TRUE(killed.good());
-  killed.kill();
-  auto event = Open("name", kAutomatic, kSet);
-  EXPECT_EQ((Slot{1, 2}), place.slotOf("name"));
-  EXPECT_TRUE(event->check());
-  EXPECT_TRUE(RecordOf(place.file("sem_1"), 1).inUse);
-}
-
-TEST(NamedEventFiles, HolderThatDiesBetweenTwoOthersIsNotMissed) {
-  EventPlace place;
-  Keeper first([] { return Open("name"); });
-  Keeper second([] { return Open("name"); });
-  ASSERT_TRUE(first.good() && second.good());
-  first.kill();
-  auto third = Open("name");
-  EXPECT_EQ((Slot{1, 0}), place.slotOf("name"));
-  EXPECT_TRUE(second.finish());
-  third.reset();
-  EXPECT_EQ(Names(), place.files());
-}
-
-// ---- closing in a changed world
-
-TEST(NamedEventFiles, CloseLeavesALockFileThatIsNotItsOwn) {
-  EventPlace place;
-  auto event = Open("name"), other = Open("other");
-  std::filesystem::remove(place.file("name"));
-  Keeper stranger([] { return Open("name"); });
-  ASSERT_TRUE(stranger.good());
-  EXPECT_EQ((Slot{1, 2}), place.slotOf("name"));
-  event.reset();
-  EXPECT_TRUE(Exists(place.file("name")));
-  EXPECT_EQ((Slot{1, 2}), place.slotOf("name"));
-  EXPECT_FALSE(RecordOf(place.file("sem_1"), 0).inUse);  // its own slot went back
-  EXPECT_TRUE(stranger.finish());
-  EXPECT_FALSE(Exists(place.file("name")));
-}
-
-TEST(NamedEventFiles, CloseGivesBackOnlyWhatIsItsOwn) {
-  EventPlace place;
-  auto event = Open("name"), other = Open("other");
-  std::string state = ReadBytes(place.file("sem_1"));
-  state[18 + 2] = static_cast<char>(state[18 + 2] ^ 0x55);  // another key
-  WriteBytes(place.file("sem_1"), state);
-  event.reset();
-  EXPECT_EQ(state, ReadBytes(place.file("sem_1")));
-  EXPECT_FALSE(Exists(place.file("name")));
-}
-
-TEST(NamedEventFiles, SetThatAnotherUserRemovesLastStaysForTheNext) {
-  if (geteuid() != 0) GTEST_SKIP() << "SKIPPED: needs two users, so the superuser";
-  EventPlace place;
-  auto event = Open("name");
-  int id = place.setOf(1);
-  Keeper other([] {
-    if (setgid(65534) != 0 || setuid(65534) != 0) throw std::runtime_error("setuid");
-    return Open("name");
-  });
-  ASSERT_TRUE(other.good());
-  event.reset();
-  EXPECT_TRUE(other.finish());  // may not remove the set
-  EXPECT_EQ(Names{"sem_1"}, place.files());
-  EXPECT_FALSE(HeaderOf(place.file("sem_1")).ready);
-  EXPECT_EQ(id, place.setOf(1));
-  event = Open("name", kManual, kSet);
-  EXPECT_TRUE(HeaderOf(place.file("sem_1")).ready);
-  EXPECT_EQ(id, place.setOf(1));
-  EXPECT_EQ((Slot{1, 0}), place.slotOf("name"));
-  EXPECT_TRUE(event->checkOnly());
-  event.reset();
-  EXPECT_EQ(Names(), place.files());
-}
-
-TEST(NamedEventFiles, EventsOfAnotherUserAreJoined) {
-  if (geteuid() != 0) GTEST_SKIP() << "SKIPPED: needs two users, so the superuser";
-  EventPlace place;
-  Keeper other([] {
-    umask(0077);
-    if (setgid(65534) != 0 || setuid(65534) != 0) throw std::runtime_error("setuid");
-    return Open("name", kAutomatic, kSet);
-  });
-  ASSERT_TRUE(other.good());
-  EXPECT_TRUE(Open("name", kAutomatic)->check());
-  Child third([] {
-    if (setgid(65533) != 0 || setuid(65533) != 0) return 1;
-    Open("name", kAutomatic)->set();
-    return 0;
-  });
-  EXPECT_EQ(0, third.wait());
-  EXPECT_TRUE(Open("name", kAutomatic)->check());
-  EXPECT_TRUE(other.finish());
-  EXPECT_EQ(Names(), place.files());
-}
-
-TEST(NamedEventFiles, StaticEventsCloseWhenTheProgramEnds) {
-  EventPlace place;
-  Child child([]() -> int {
-    static NamedEvent event(L"name", kManual, kSet);
-    exit(event.checkOnly() ? 0 : 1);
-  });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ(Names(), place.files());
-}
-
-void OpenAfterTheStaticsWent() {
-  if (!Open("late", kManual, kSet)->checkOnly()) _exit(9);
-}
-
-TEST(NamedEventFiles, EventsWorkInExitFunctionsThatRunAfterTheirOwn) {
-  EventPlace place;
-  Child child([]() -> int {
-    std::atexit(OpenAfterTheStaticsWent);  // before the first use, so it runs after
-    Open("name");
-    exit(0);
-  });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ(Names(), place.files());
-}
-
-TEST(NamedEventFiles, ObjectThatOutlivesTheStaticsCloses) {
-  EventPlace place;
-  Child child([]() -> int {
-    static std::unique_ptr<NamedEvent> late;
-    std::atexit([] { late.reset(); });
-    late = Open("name");
-    exit(0);
-  });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ(Names(), place.files());
-}
-
-TEST(NamedEventFiles, EndWithoutClosingLeavesEverythingForTheNext) {
-  EventPlace place;
-  Child child([] {
-    new NamedEvent(L"name", kManual, kSet);
-    return 0;  // _exit
-  });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ((Names{"name", "sem_1"}), place.files());
-  Open("name");
-  EXPECT_EQ(Names(), place.files());
 }
 
 }  // namespace

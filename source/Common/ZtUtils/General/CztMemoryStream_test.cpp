@@ -200,11 +200,11 @@ TEST(MemoryStream, SizesBeyond32BitsAreInvalid) {
   EXPECT_EQ(done, 0u);
   EXPECT_EQ(Contents(stream.get()), "abc");
   EXPECT_EQ(Position(stream.get()), 3);
-#if SIZE_MAX > 0xFFFFFFFF
-  char byte = 0;
-  EXPECT_EQ(stream->AttachBuffer(reinterpret_cast<unsigned char*>(&byte), 0x100000000, true),
-            E_INVALIDARG);
-#endif
+  if (sizeof(unsigned long) > 4) {
+    unsigned char byte = 0;
+    auto beyond = static_cast<unsigned long>(uint64_t{0x100000000});
+    EXPECT_EQ(stream->AttachBuffer(&byte, beyond, true), E_INVALIDARG);
+  }
   EXPECT_EQ(stream->AttachBuffer(nullptr, 1, true), E_INVALIDARG);
   EXPECT_EQ(Contents(stream.get()), "abc");
 }
