@@ -18,6 +18,7 @@
 #include <functional>
 #include <string>
 
+#include "source/Common/ZtUtils/General/vlTracer.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/NamedEvent.h"
 
@@ -220,6 +221,27 @@ void OpenCloseSecondObject(benchmark::State& state) {
   for (auto _ : state) NamedEvent event(name, kManual, kClear);
 }
 BENCHMARK(OpenCloseSecondObject)->Name("OpenClose/second object");
+
+void TraceLine(benchmark::State& state) {
+  std::string directory = (std::filesystem::temp_directory_path() / "vlt.trace").string();
+  std::filesystem::create_directories(directory);
+  vlTracer::Initialize(vlTracer::kSeverityErrors, vlTracer::kTargetFile,
+                       std::wstring(directory.begin(), directory.end()).c_str(), 0);
+  for (auto _ : state) vlt_vlTracer::TraceOutput(' ', "a line of the usual length, say", false);
+  vlTracer::Cleanup();
+  std::filesystem::remove_all(directory);
+}
+BENCHMARK(TraceLine)->Name("TraceLine/TraceOutput");
+
+void TraceLineBare(benchmark::State& state) {
+  std::string file = (std::filesystem::temp_directory_path() / "vlt.bare").string();
+  int fd = open(file.c_str(), O_CREAT | O_WRONLY | O_APPEND | O_CLOEXEC, 0600);
+  const char line[] = "  a line of the usual length, say\n";
+  for (auto _ : state) benchmark::DoNotOptimize(write(fd, line, sizeof line - 1));
+  close(fd);
+  unlink(file.c_str());
+}
+BENCHMARK(TraceLineBare)->Name("TraceLine/write");
 
 }  // namespace
 
