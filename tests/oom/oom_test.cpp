@@ -39,7 +39,7 @@ std::atomic<bool> g_failed{false};
 std::atomic<long> g_live{0};
 
 // True if this allocation is to fail.
-bool Refuse() {
+[[maybe_unused]] bool Refuse() {  // unused where the sanitizer has the malloc
   long left = g_countdown;
   if (left < 0) return false;
   if (left > 0) {
