@@ -247,8 +247,10 @@ TEST_F(SettingsFile, CacheLimitsHaveDefaults) {
                         "ClientBufferCacheFlushPercentage", "GarbageCollectorInterval"};
   const unsigned defaults[] = {150000, 20, 33554432, 2097152, 20, 20000};
   for (int changed = -1; changed < 6; ++changed) {
-    for (const auto& [text, number] :
+    for (const auto& row :
          {std::pair<const char*, unsigned>{"77", 77}, {"x", 0}, {"-1", 0xFFFFFFFFu}}) {
+      const char* text = row.first;
+      unsigned number = row.second;
       write(changed < 0 ? "" : std::string(keys[changed]) + "=" + text + "\n");
       EXPECT_EQ(Child([&] {
                   unsigned v[6] = {};
