@@ -13,8 +13,7 @@ using zt::fnd::Vector;
 HRESULT CvltRegistrar::QueryInterface(const GUID& iid, void** out) {
   if (!out) return E_POINTER;
   *out = nullptr;
-  if (!(iid == IID_IUnknown) && !(iid == IID_IvltRegistrar2) &&
-      !(iid == IID_IvltRegistrar)) {
+  if (!(iid == IID_IUnknown) && !(iid == IID_IvltRegistrar2) && !(iid == IID_IvltRegistrar)) {
     return E_NOINTERFACE;
   }
   AddRef();

@@ -6,9 +6,9 @@
 #include "zt/fnd/osdep/FindFiles.h"
 #include "zt/fnd/osdep/path.h"
 
-using zt::fnd::osdep::path;
 using zt::fnd::AnsiString;
 using zt::fnd::String;
+using zt::fnd::osdep::path;
 
 namespace {
 

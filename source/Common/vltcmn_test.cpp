@@ -176,7 +176,8 @@ int CreateWith(const std::string& source) {
   vlt::test::TempDir dir;
   vlt::test::WriteBytes(dir / "rpc.cpp", source);
   std::vector<std::string> command = {
-      "g++", "-shared", "-fPIC", "-Wl,-soname,libZT-RPC.so", "-o", dir / "libZT-RPC.so", dir / "rpc.cpp"};
+      "g++",          "-shared", "-fPIC", "-Wl,-soname,libZT-RPC.so", "-o", dir / "libZT-RPC.so",
+      dir / "rpc.cpp"};
   if (sizeof(void*) == 4) command.push_back("-m32");
   auto built = vlt::test::RunProgram(command);
   EXPECT_EQ(built.exitCode, 0) << built.err;

@@ -22,9 +22,9 @@
 
 #include "tests/support/AllocFailure.h"
 #include "tests/support/Child.h"
-#include "tests/support/MemoryLimit.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/FailSystemCall.h"
+#include "tests/support/MemoryLimit.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
