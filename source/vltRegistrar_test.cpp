@@ -4,6 +4,7 @@
 #include <string.h>
 #include <wchar.h>
 
+#include <atomic>
 #include <thread>
 
 #include "source/Common/vltcmn.h"
@@ -24,7 +25,7 @@ class TestRegistrar : public CvltRegistrar {
   HRESULT SetSnapshotPath(const wchar_t*) override { return E_NOTIMPL; }
   size_t count() { return components().map.size(); }
 
-  int scans = 0;
+  std::atomic<int> scans{0};
   HRESULT scanResult = S_OK;
 };
 

@@ -72,12 +72,12 @@ class CZTComObject : public T {
   }
 
   uint32_t AddRef() override {
-    if (this->m_refCount == -1) abort();
+    if (ZTInterlockedGet(&this->m_refCount) == -1) abort();
     return static_cast<uint32_t>(T::ThreadingModel::Increment(&this->m_refCount));
   }
 
   uint32_t Release() override {
-    if (this->m_refCount < 1) abort();
+    if (ZTInterlockedGet(&this->m_refCount) < 1) abort();
     int32_t left = T::ThreadingModel::Decrement(&this->m_refCount);
     if (left == 0) delete this;
     return static_cast<uint32_t>(left);

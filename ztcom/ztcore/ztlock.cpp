@@ -38,4 +38,5 @@ bool CZTMutex::IsNesting() const {
 
 int ZTInterlockedInc(int* counter) { return std::atomic_ref<int>(*counter).fetch_add(1) + 1; }
 int ZTInterlockedDec(int* counter) { return std::atomic_ref<int>(*counter).fetch_sub(1) - 1; }
+int ZTInterlockedGet(int* counter) { return std::atomic_ref<int>(*counter).load(); }
 pthread_t ZTGetThreadId() { return pthread_self(); }

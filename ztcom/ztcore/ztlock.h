@@ -7,6 +7,8 @@
 // Changes the counter atomically and returns the new value.
 int ZTInterlockedInc(int* counter);
 int ZTInterlockedDec(int* counter);
+// The value that the counter has at some moment of the call.
+int ZTInterlockedGet(int* counter);
 pthread_t ZTGetThreadId();
 
 // Lock of one process, not recursive, that knows its owner.
