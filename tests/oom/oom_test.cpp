@@ -18,18 +18,8 @@
 #include "source/Utilities/vltutils.h"
 #include "tests/support/Child.h"
 #include "tests/support/Installation.h"
+#include "tests/support/Sanitizer.h"
 #include "zt/fnd/Exception.h"
-
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-#define OWN_MALLOC 0
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-#define OWN_MALLOC 0
-#endif
-#endif
-#ifndef OWN_MALLOC
-#define OWN_MALLOC 1
-#endif
 
 namespace {
 
@@ -53,7 +43,7 @@ std::atomic<long> g_live{0};
 
 }  // namespace
 
-#if OWN_MALLOC
+#if !VLT_ADDRESS_SANITIZER && !VLT_THREAD_SANITIZER
 extern "C" {
 void* __libc_malloc(size_t);
 void* __libc_calloc(size_t, size_t);
@@ -288,7 +278,7 @@ void MakeInstallation(Installation& installation) {
 class OutOfMemory : public testing::TestWithParam<bool> {};
 
 TEST_P(OutOfMemory, EveryCallSurvivesEveryFailedAllocation) {
-  if (!OWN_MALLOC) GTEST_SKIP() << "the sanitizer has a malloc of its own";
+  if (!vlt::test::kCanLimitMemory) GTEST_SKIP() << "the sanitizer has a malloc of its own";
   long total = 0, calls = 0;
   for (const Call& call : Calls()) {
     Installation installation;
@@ -311,7 +301,7 @@ TEST_P(OutOfMemory, EveryCallSurvivesEveryFailedAllocation) {
 
 // Whatever fails in the first start, the next one finds everything.
 TEST_P(OutOfMemory, AFailedFirstStartLosesNothing) {
-  if (!OWN_MALLOC) GTEST_SKIP() << "the sanitizer has a malloc of its own";
+  if (!vlt::test::kCanLimitMemory) GTEST_SKIP() << "the sanitizer has a malloc of its own";
   Installation installation;
   MakeInstallation(installation);
   long tried = 0;

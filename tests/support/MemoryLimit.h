@@ -5,20 +5,9 @@
 
 #include <cstdio>
 
-namespace vlt::test {
+#include "tests/support/Sanitizer.h"
 
-// Sanitizers reserve the address space themselves and end the process where memory runs out.
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-inline constexpr bool kCanLimitMemory = false;
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-inline constexpr bool kCanLimitMemory = false;
-#else
-inline constexpr bool kCanLimitMemory = true;
-#endif
-#else
-inline constexpr bool kCanLimitMemory = true;
-#endif
+namespace vlt::test {
 
 // Lets this process map only so many bytes more than it has now. For a child: there is no way back.
 inline void LimitMemoryTo(unsigned long moreBytes) {

@@ -13,6 +13,7 @@
 #include "tests/support/Child.h"
 #include "tests/support/MutexPlace.h"
 #include "tests/support/PosixErrorOf.h"
+#include "tests/support/Sanitizer.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/Mutex.h"
 
@@ -23,6 +24,7 @@ using vlt::test::BlockedIn;
 using vlt::test::Child;
 using vlt::test::Eventually;
 using vlt::test::FileIsFree;
+using vlt::test::kCanForkWhileThreadsAllocate;
 using vlt::test::MutexPlace;
 using vlt::test::Wide;
 
@@ -103,6 +105,7 @@ TEST(MutexFork, ForkWhileAnotherThreadHoldsLeavesAUsableChild) {
 }
 
 TEST(MutexFork, ForksDuringHeavyUseLeaveUsableChildren) {
+  if (!kCanForkWhileThreadsAllocate) GTEST_SKIP() << "the sanitizer's allocator is not fork-safe";
   MutexPlace place;
   Mutex shared(L"shared");
   std::atomic<bool> stop{false};

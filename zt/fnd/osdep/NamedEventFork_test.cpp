@@ -16,6 +16,7 @@
 #include "tests/support/Child.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/PosixErrorOf.h"
+#include "tests/support/Sanitizer.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/Mutex.h"
@@ -30,6 +31,7 @@ using vlt::test::Child;
 using vlt::test::EventPlace;
 using vlt::test::Eventually;
 using vlt::test::Exists;
+using vlt::test::kCanForkWhileThreadsAllocate;
 using vlt::test::OpenDescriptors;
 using vlt::test::Wide;
 typedef std::vector<std::string> Names;
@@ -231,6 +233,7 @@ TEST(NamedEventFork, ForkWhileAnotherThreadIsInsideLeavesAUsableChild) {
 }
 
 TEST(NamedEventFork, ForksDuringHeavyUseLeaveUsableChildren) {
+  if (!kCanForkWhileThreadsAllocate) GTEST_SKIP() << "the sanitizer's allocator is not fork-safe";
   EventPlace place;
   auto shared = Open("shared", kManual, kSet);
   std::atomic<bool> stop{false};
