@@ -1,18 +1,19 @@
 #include "source/Utilities/vltTestHook.h"
 
 #include <gtest/gtest.h>
+#include <malloc.h>
 #include <string.h>
-#include <sys/resource.h>
 
 #include <chrono>
 #include <functional>
 #include <new>
+#include <vector>
 
-#include "source/Common/vltBindingClasses.h"
-#include "source/Common/vltcmn.h"
 #include "source/Utilities/vltutils.h"
+#include "tests/support/CaughtSleeps.h"
 #include "tests/support/Child.h"
 #include "tests/support/Installation.h"
+#include "tests/support/MemoryLimit.h"
 
 namespace {
 
@@ -111,28 +112,72 @@ TEST(Hook, HangGoesBeforeCrashAndAnswersOne) {
             6);
 }
 
-TEST(Hook, HangWithoutATimeLastsForTheTimeBeing) {
-  Installation installation;
-  WriteBytes(installation.root() + "/VLTHooks.ini", Hook("p", "Hang = true\n"));
-  Signal before;
-  Child child([&] {
-    vltRefreshHook();
-    before.notify();
-    vltTestHook("p");
-    return 0;
-  });
-  ASSERT_TRUE(before.await());
-  EXPECT_TRUE(Eventually([&] {
-    return BlockedIn(child.pid(), 230 /* clock_nanosleep */) ||
-           BlockedIn(child.pid(), 35 /* nanosleep */) || sizeof(void*) == 4;
-  }));
-  EXPECT_TRUE(child.running());
+TEST(Hook, HangWithoutATimeLastsForAsLongAsASleepCan) {
+  EXPECT_EQ(Armed(Hook("p", "Hang = true\n"),
+                  [] {
+                    if (!CatchSleeps()) return 1;
+                    if (vltTestHook("p") != 1) return 2;
+                    return CaughtSleeps() == std::vector<long long>{0x7FFFFFFF} ? 0 : 3;
+                  }),
+            0);
 }
 
-TEST(Hook, PrecedenceIsSimulateThenThrow) {
-  EXPECT_EQ(Armed(Hook("p", std::string(kThrow) + kSimulate),
-                  [] { return vltTestHook("p") == 1 ? 0 : 1; }),
+TEST(Hook, AHangTimeThatIsGoneByTheNextRefreshIsForgotten) {
+  Installation installation;
+  std::string file = installation.root() + "/VLTHooks.ini";
+  WriteBytes(file, Hook("p", "Hang = true\nHangTime = 5\n"));
+  EXPECT_EQ(Child([&] {
+              vltRefreshHook();
+              if (!CatchSleeps()) return 1;
+              vltTestHook("p");
+              WriteBytes(file, Hook("p", ""));  // without "Hang" the time is not looked at
+              vltRefreshHook();
+              vltTestHook("p");
+              WriteBytes(file, Hook("p", "Hang = TRUE\n"));
+              vltRefreshHook();
+              vltTestHook("p");
+              return CaughtSleeps() == std::vector<long long>{5, 5, 0x7FFFFFFF} ? 0 : 2;
+            }).wait(),
             0);
+}
+
+// All five, and then each time without the one that came out.
+TEST(Hook, PrecedenceIsHangCrashSimulateThrowExhaust) {
+  const std::string kExhaust = "MemoryAllocationFailure = true\n";
+  const std::string kCrash = "Crash = true\n", kHang = "Hang = true\nHangTime = 1\n";
+  auto body = [] {
+    if (!CatchSleeps()) return 1;
+    size_t before = mallinfo2().uordblks;
+    unsigned answer = 9;
+    try {
+      answer = vltTestHook("p");
+    } catch (const std::bad_alloc&) {
+      return 40;
+    }
+    if (answer != 1) return 2;
+    if (!CaughtSleeps().empty()) return 20;
+    return mallinfo2().uordblks < before + (1u << 20) ? 30 : 50;
+  };
+  std::string flags = kExhaust + kThrow + kSimulate + kCrash + kHang;
+  EXPECT_EQ(Armed(Hook("p", flags), body), 20);
+  flags.resize(flags.size() - kHang.size());
+  EXPECT_EQ(Armed(Hook("p", flags), body), 0);  // exit(0)
+  flags.resize(flags.size() - kCrash.size());
+  EXPECT_EQ(Armed(Hook("p", flags), body), 30);
+  flags.resize(flags.size() - strlen(kSimulate));
+  EXPECT_EQ(Armed(Hook("p", flags), body), 40);
+}
+
+TEST(Hook, TextsOfFlagsOtherThanTrueSetNothing) {
+  for (const char* text : {"1", "yes", "truely", "tru", "false", "\"\""}) {
+    std::string flags;
+    for (const char* flag :
+         {"Crash", "Hang", "SimulateMemoryAllocationFailure",
+          "SimulateMemoryAllocationFailureAndThrow", "MemoryAllocationFailure"}) {
+      flags += std::string(flag) + " = " + text + "\n";
+    }
+    EXPECT_EQ(Armed(Hook("p", flags), [] { return vltTestHook("p") == 1 ? 6 : 7; }), 6) << text;
+  }
 }
 
 TEST(Hook, ABadHookFileArmsNothing) {
@@ -140,200 +185,34 @@ TEST(Hook, ABadHookFileArmsNothing) {
 }
 
 TEST(Hook, ExhaustMemoryTakesWhatThereIsAndGoesOnFromThere) {
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-  GTEST_SKIP() << "the sanitizer's own memory does not fit below the limit";
-#endif
+  if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer holds the address space";
   EXPECT_EQ(Armed(Hook("p", "MemoryAllocationFailure = true\n"),
                   [] {
-                    rlimit limit = {400u << 20, 400u << 20};
-                    if (setrlimit(RLIMIT_AS, &limit) != 0) return 1;
-                    if (vltTestHook("p") != 1) return 2;
-                    void* large = malloc(64u << 20);
-                    if (large) return 3;
-                    return vltTestHook("p") == 1 ? 0 : 4;  // again: a limit of 1000 small blocks
+                    LimitMemoryTo(200u << 20);
+                    if (vltTestHook("p") != 1) return 1;
+                    if (malloc(4u << 20)) return 2;
+                    return vltTestHook("p") == 1 ? 0 : 3;  // there still is nothing
                   }),
             0);
 }
 
-// ---- The points. Each action drives the code to its point and tells what came out.
-
-int Code(HRESULT result) { return result == S_OK ? 0 : result == E_OUTOFMEMORY ? 1 : 2; }
-
-int AppendAction() {
-  size_t capacity = 2;
-  auto* buffer = static_cast<wchar_t*>(vltAlloc(capacity * sizeof(wchar_t)));
-  wcscpy(buffer, L"a");
-  wchar_t* before = buffer;
-  HRESULT result = vltAppendString2(&buffer, L"bc", &capacity);
-  bool kept = buffer == before && wcscmp(buffer, L"a") == 0 && capacity == 362;
-  vltFree(buffer);
-  return result == E_OUTOFMEMORY && !kept ? 3 : Code(result);
-}
-
-int DuplicateAction() {
-  wchar_t* out = nullptr;
-  HRESULT result = vltDuplicateString2(L"a", &out);
-  if (result < 0 && out) return 3;
-  vltFree(out);
-  return Code(result);
-}
-
-int ClsidAction() {
-  GUID g = {};
-  wchar_t* out = nullptr;
-  HRESULT result = vltStringFromCLSID(&g, &out);
-  if (result < 0 && out) return 3;
-  vltFree(out);
-  return Code(result);
-}
-
-int GuidTextAction() {
-  wchar_t* text = vltGuidToString(GUID{});
-  bool empty = !text || !*text;
-  vltFree(text);
-  return empty ? 1 : 0;
-}
-
-int RegistrarAction() {
-  IvltRegistrar* registrar = nullptr;
-  HRESULT result = vltGetRegistrar(&registrar);
-  if (result < 0 && registrar) return 3;
-  if (registrar) registrar->Release();
-  return Code(result);
-}
-
-const zt::fnd::String kTable(
-    L"{00000001-0000-0000-0000-000000000000}:2:{0000000A-0000-0000-0000-000000000000}:"
-    L"{0000000B-0000-0000-0000-000000000000}:{00000002-0000-0000-0000-000000000000}:0");
-
-_vltComponent2 Expert() {
-  _vltComponent2 record;
-  memset(&record, 0, sizeof record);
-  record.type = vltComponentObjectExpert;
-  record.identifier.Data1 = 1;
-  return record;
-}
-
-// Both classes, or none; anything between is 3.
-int AddClassesAction() {
-  BindingClassesMap map;
-  map.emplace(GUID{0xC, 0, 0, {}}, GUID{9, 0, 0, {}});
-  _vltComponent2 record = Expert();
-  vltAddBindingClasses(&record, CvltBindingClasses(kTable), &map);
-  return map.size() == 3 ? 0 : map.size() == 1 ? 1 : 3;
-}
-
-int GetClassesAction() {
-  BindingClassesMap map;
-  map.emplace(GUID{0xA, 0, 0, {}}, GUID{1, 0, 0, {}});
-  unsigned count = 0;
-  GUID* found = nullptr;
-  HRESULT result = vltGetComponentsForBindingClass(GUID{0xA, 0, 0, {}}, &count, &map, &found);
-  if (result < 0 && (found || count)) return 3;
-  vltFree(found);
-  return Code(result);
-}
-
-int VectorAction() {
-  auto components = CvltBindingClasses(kTable).GetComponentVector();
-  return components.size() == 2 ? 0 : components.size() == 0 ? 1 : 3;
-}
-
-// 4 for a std::bad_alloc that leaves the action.
-int Perform(int (*action)()) {
-  try {
-    return action();
-  } catch (const std::bad_alloc&) {
-    return 4;
-  }
-}
-
-struct Point {
-  const char* name;
-  int (*action)();
-  // What the action gives when the hook answers 1, and when it throws.
-  int answered, thrown;
-};
-
-// At a point before a throwing allocation only the exception counts; it is handled there. Before the
-// others only the answer does, and an exception passes out.
-const Point kPoints[] = {
-    {vlt::hook::kGetRegistrar2, RegistrarAction, 1, 4},
-    {vlt::hook::kGetComponentsForBindingClass, GetClassesAction, 1, 4},
-    {vlt::hook::kCopyComponentOfClass, GetClassesAction, 0, 1},
-    {vlt::hook::kAddBindingClass, AddClassesAction, 0, 1},
-    {vlt::hook::kGetComponentVector, VectorAction, 0, 1},
-    {vlt::hook::kDuplicateString2, DuplicateAction, 1, 4},
-    {vlt::hook::kDuplicateString2, GuidTextAction, 1, 4},
-    {vlt::hook::kAppendString2, AppendAction, 1, 4},
-    {vlt::hook::kStringFromClsid, ClsidAction, 1, 4},
-    {vlt::hook::kStringFromClsid, GuidTextAction, 1, 4},
-};
-
-TEST(HookPoints, UnarmedActionsSucceed) {
-  for (const Point& point : kPoints) {
-    EXPECT_EQ(Armed("", [&] { return Perform(point.action); }), 0) << point.name;
-  }
-}
-
-TEST(HookPoints, ASimulatedFailureHasItsResult) {
-  for (const Point& point : kPoints) {
-    EXPECT_EQ(Armed(Hook(point.name, kSimulate), [&] { return Perform(point.action); }),
-              point.answered)
-        << point.name;
-  }
-}
-
-TEST(HookPoints, AThrownFailureHasItsResult) {
-  for (const Point& point : kPoints) {
-    EXPECT_EQ(Armed(Hook(point.name, kThrow), [&] { return Perform(point.action); }), point.thrown)
-        << point.name;
-  }
-}
-
-TEST(HookPoints, AHangAnswersAfterItsTime) {
-  for (const Point& point : kPoints) {
-    EXPECT_EQ(Armed(Hook(point.name, "Hang = true\nHangTime = 1\n"),
-                    [&] { return Perform(point.action); }),
-              point.answered)
-        << point.name;
-  }
-}
-
-TEST(HookPoints, ACrashIsANormalEnd) {
-  for (const Point& point : kPoints) {
-    EXPECT_EQ(Armed(Hook(point.name, "Crash = true\n"), [&] { return 10 + Perform(point.action); }),
-              0)
-        << point.name;
-  }
-}
-
-TEST(HookPoints, ExhaustedMemoryIsSurvived) {
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-  GTEST_SKIP() << "the sanitizer's own memory does not fit below the limit";
-#endif
-  for (const Point& point : kPoints) {
-    int result = Armed(Hook(point.name, "MemoryAllocationFailure = true\n"), [&] {
-      rlimit limit = {400u << 20, 400u << 20};
-      if (setrlimit(RLIMIT_AS, &limit) != 0) return 99;
-      return Perform(point.action);
-    });
-    EXPECT_LE(result, 4) << point.name;  // a result or a bad_alloc, and no crash
-    EXPECT_NE(result, 3) << point.name;
-  }
-}
-
-TEST(HookPoints, AFailedCreationLeavesTheRegistrarToTheNextCall) {
-  Installation installation;
-  std::string file = installation.root() + "/VLTHooks.ini";
-  WriteBytes(file, Hook(vlt::hook::kGetRegistrar2, kSimulate));
-  EXPECT_EQ(Child([&] {
-              vltRefreshHook();
-              if (RegistrarAction() != 1) return 1;
-              WriteBytes(file, Hook("elsewhere", ""));
-              vltRefreshHook();
-              return RegistrarAction();
-            }).wait(),
+// A second call begins where the first one ended, at blocks of 4 KiB, and stops after at most 1000: it
+// does not double again and take all of what has become free.
+TEST(Hook, ASecondExhaustionTakesSmallBlocksOnly) {
+  if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer holds the address space";
+  EXPECT_EQ(Armed(Hook("p", "MemoryAllocationFailure = true\n"),
+                  [] {
+                    LimitMemoryTo(64u << 20);
+                    vltTestHook("p");
+                    LimitMemoryTo(256u << 20);
+                    size_t before = mallinfo2().uordblks;
+                    vltTestHook("p");
+                    size_t taken = mallinfo2().uordblks - before;
+                    if (taken < 4096 || taken > 1000 * 4200) return 1;
+                    void* large = malloc(128u << 20);
+                    free(large);
+                    return large ? 0 : 2;
+                  }),
             0);
 }
 

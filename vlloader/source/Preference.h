@@ -7,7 +7,6 @@
 //
 // On Linux: the item `key` of the section "Preferences" in <config>/<domain>.ini, where <config> is
 // $XDG_CONFIG_HOME (default $HOME/.config), then each of $XDG_CONFIG_DIRS (default /etc/xdg); the
-// first file that has the item wins. Relative directories are ignored (XDG Base Directory
-// Specification). A value may be empty. Nothing is created, changed or locked, and each call reads
-// anew.
+// first file that has the item wins. Relative directories are ignored, as the XDG base directory rules
+// want it. A value may be empty. Nothing is created, changed or locked, and each call reads anew.
 std::optional<std::string> vlReadPreference(const std::string& domain, const std::string& key);

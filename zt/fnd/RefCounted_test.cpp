@@ -3,12 +3,16 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
-#include <chrono>
+#include <memory>
 #include <thread>
 #include <vector>
 
+#include "tests/support/ThreadState.h"
+
 namespace zt::fnd {
 namespace {
+
+using vlt::test::WatchedThread;
 
 struct Thing : RefCountedThreadSafePolicy {
   static inline int alive = 0;
@@ -55,37 +59,38 @@ TEST(BufferRefPtr, PlainCountWorksTheSameInOneThread) {
 
 struct SectionThing : RefCountedCriticalSectionPolicy {
   const osdep::CriticalSection& section;
-  std::thread& probe;
+  std::unique_ptr<WatchedThread>& probe;
   std::atomic<bool>& entered;
   bool& enteredWhileGoing;
-  SectionThing(const osdep::CriticalSection& s, std::thread& p, std::atomic<bool>& e, bool& w)
+  SectionThing(const osdep::CriticalSection& s, std::unique_ptr<WatchedThread>& p,
+               std::atomic<bool>& e, bool& w)
       : RefCountedCriticalSectionPolicy(&s),
         section(s),
         probe(p),
         entered(e),
         enteredWhileGoing(w) {}
   ~SectionThing() override {
-    probe = std::thread([&s = section, &e = entered] {
+    probe = std::make_unique<WatchedThread>([&s = section, &e = entered] {
       osdep::CriticalSectionGuard guard(s);
       e = true;
     });
-    std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    EXPECT_TRUE(probe->blocksInLock());
     enteredWhileGoing = entered;
   }
 };
 
 TEST(BufferRefPtr, SectionCountedObjectGoesInsideItsSection) {
   osdep::CriticalSection section;
-  std::thread probe;
+  std::unique_ptr<WatchedThread> probe;
   std::atomic<bool> entered = false;
   bool enteredWhileGoing = true;
   {
     RefPtr<SectionThing> a(new SectionThing(section, probe, entered, enteredWhileGoing)), b(a);
     a = nullptr;
-    EXPECT_FALSE(probe.joinable());
+    EXPECT_FALSE(probe);
   }
-  ASSERT_TRUE(probe.joinable());
-  probe.join();
+  ASSERT_TRUE(probe);
+  probe->join();
   EXPECT_TRUE(entered);
   EXPECT_FALSE(enteredWhileGoing);
 }

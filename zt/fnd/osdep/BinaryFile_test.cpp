@@ -16,6 +16,7 @@
 #include "tests/support/Child.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
+#include "tests/support/ThreadState.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/OSException.h"
@@ -218,10 +219,10 @@ TEST(FileBinary, ExactTransferSurvivesSignals) {
   ASSERT_EQ(0, pipe2(fds, O_CLOEXEC));
   std::atomic<int> result{-2};
   char bytes[4];
-  std::thread reader([&] { result = BinaryFile::ReadExactSize(fds[0], bytes, 4); });
+  vlt::test::WatchedThread reader([&] { result = BinaryFile::ReadExactSize(fds[0], bytes, 4); });
   for (int i = 0; i < 20; ++i) {
-    pthread_kill(reader.native_handle(), SIGUSR1);
-    std::this_thread::sleep_for(std::chrono::milliseconds(1));
+    ASSERT_TRUE(reader.blocksIn(SYS_read));
+    pthread_kill(reader.handle(), SIGUSR1);
   }
   EXPECT_EQ(-2, result);
   EXPECT_EQ(4, BinaryFile::WriteExactSize(fds[1], "abcd", 4));

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "zt/fnd/String.h"
+#include "zt/fnd/osdep/ProcessStatics.h"
 #include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 
@@ -21,14 +22,6 @@ pthread_once_t s_once = PTHREAD_ONCE_INIT;
 pthread_mutex_t s_lock = PTHREAD_MUTEX_INITIALIZER;  // guards what follows; innermost of all locks
 std::vector<bool>* s_marked = nullptr;               // by descriptor number
 unsigned s_forks = 0;
-
-class Hold {
- public:
-  Hold() { pthread_mutex_lock(&s_lock); }
-  ~Hold() { pthread_mutex_unlock(&s_lock); }
-  Hold(const Hold&) = delete;
-  Hold& operator=(const Hold&) = delete;
-};
 
 void BeforeFork() {
   pthread_mutex_lock(&s_lock);
@@ -51,13 +44,13 @@ void InChild() {
 void Register() { pthread_atfork(BeforeFork, InParent, InChild); }
 
 unsigned ForksSoFar() {
-  Hold hold;
+  PosixMutexHold hold(s_lock);
   return s_forks;
 }
 
 // Marks the descriptor unless there was a fork since the count was taken, which may have copied it.
 bool MarkIfNoFork(int fd, unsigned forks) {
-  Hold hold;
+  PosixMutexHold hold(s_lock);
   if (s_forks != forks) return false;
   if (s_marked == nullptr) s_marked = new std::vector<bool>;
   std::size_t index = static_cast<std::size_t>(fd);
@@ -67,7 +60,7 @@ bool MarkIfNoFork(int fd, unsigned forks) {
 }
 
 void Mark(int fd, bool marked) noexcept {
-  Hold hold;
+  PosixMutexHold hold(s_lock);
   std::size_t index = static_cast<std::size_t>(fd);
   if (s_marked != nullptr && index < s_marked->size()) (*s_marked)[index] = marked;
 }

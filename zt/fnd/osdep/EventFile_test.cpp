@@ -18,6 +18,7 @@
 #include "tests/support/FailSystemCall.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
+#include "tests/support/ThreadState.h"
 #include "zt/fnd/osdep/ScopedFd.h"
 
 namespace zt::fnd::osdep {
@@ -32,6 +33,7 @@ using vlt::test::ModeOf;
 using vlt::test::OpenDescriptors;
 using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
+using vlt::test::Sleeps;
 using vlt::test::WriteBytes;
 using Clock = std::chrono::steady_clock;
 
@@ -67,8 +69,8 @@ TEST(EventLockAccess, WaitsForTheExclusivePhaseOfAnother) {
   ScopedFd first = raw.open(), second = raw.open();
   ASSERT_TRUE(GetLockAccessToFile(first.get()));
   std::atomic<bool> waited{false};
-  std::thread finisher([&] {
-    std::this_thread::sleep_for(std::chrono::milliseconds(100));
+  std::thread finisher([&, opener = gettid()] {
+    EXPECT_TRUE(Eventually([&] { return Sleeps(opener); }));  // in the middle of its rounds
     waited = true;
     Flock(first.get(), LOCK_SH);
   });
@@ -172,10 +174,7 @@ TEST(EventFile, OpenerOfARemovedFileTakesTheNewOne) {
   });
   ASSERT_TRUE(waiting.await());
   // In the middle of its rounds, which sleep a millisecond each.
-  EXPECT_TRUE(Eventually([&] {
-    return vlt::test::BlockedIn(opener.pid(), SYS_clock_nanosleep) ||
-           vlt::test::BlockedIn(opener.pid(), SYS_nanosleep);
-  }));
+  EXPECT_TRUE(Eventually([&] { return Sleeps(opener.pid()); }));
   ASSERT_TRUE(closing.write("old", 3, 0));
   ASSERT_TRUE(closing.unlink());
   closing.close();

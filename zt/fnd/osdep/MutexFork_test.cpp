@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "tests/support/Child.h"
+#include "tests/support/Heir.h"
 #include "tests/support/MutexPlace.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/Sanitizer.h"
@@ -23,7 +24,9 @@ namespace {
 using vlt::test::BlockedIn;
 using vlt::test::Child;
 using vlt::test::Eventually;
+using vlt::test::ExecHeir;
 using vlt::test::FileIsFree;
+using vlt::test::Heir;
 using vlt::test::kCanForkWhileThreadsAllocate;
 using vlt::test::MutexPlace;
 using vlt::test::Wide;
@@ -172,24 +175,20 @@ TEST(MutexFork, GrandchildRenewsAgain) {
 
 TEST(MutexFork, LockOfAKilledParentDoesNotLiveOnInTheChild) {
   MutexPlace place;
-  vlt::test::Signal forked, end;
+  Heir heir;
   Child holder([&] {
     Mutex mutex(L"name"), other(L"other");
     mutex.lock();
-    if (fork() == 0) {
-      forked.notify();
-      end.await();
-      _exit(0);
-    }
+    heir.fork();
     for (;;) pause();
     return 0;
   });
-  ASSERT_TRUE(forked.await());
+  ASSERT_TRUE(heir.await());
   EXPECT_FALSE(FileIsFree(place.file("name")));
   holder.kill(SIGKILL);
   holder.wait();
   EXPECT_TRUE(FileIsFree(place.file("name")));
-  end.notify();
+  heir.end();
 }
 
 TEST(MutexFork, ChildDoesNotCloseADescriptorThatIsNoLongerTheMutexs) {
@@ -210,57 +209,39 @@ TEST(MutexFork, ChildDoesNotCloseADescriptorThatIsNoLongerTheMutexs) {
 
 TEST(MutexFork, ReopenedFileIsNotKeptByAChildEither) {
   MutexPlace place;
-  vlt::test::Signal forked, end;
+  Heir heir;
   Child holder([&] {
     Mutex mutex(L"name");
     unlink(place.file("name").c_str());
     mutex.lock();
-    if (fork() == 0) {
-      forked.notify();
-      end.await();
-      _exit(0);
-    }
+    heir.fork();
     for (;;) pause();
     return 0;
   });
-  ASSERT_TRUE(forked.await());
+  ASSERT_TRUE(heir.await());
   EXPECT_FALSE(FileIsFree(place.file("name")));
   holder.kill(SIGKILL);
   holder.wait();
   EXPECT_TRUE(FileIsFree(place.file("name")));
-  end.notify();
+  heir.end();
 }
 
 TEST(MutexFork, ProgramStartedByExecKeepsNoLock) {
   MutexPlace place;
-  int feed[2], started[2];
-  ASSERT_EQ(0, pipe2(feed, O_CLOEXEC));
-  ASSERT_EQ(0, pipe2(started, O_CLOEXEC));
+  ExecHeir program;
   Child holder([&] {
     Mutex mutex(L"name");
     mutex.lock();
-    if (fork() == 0) {
-      // Lives until the test closes the other end.
-      dup2(feed[0], 0);
-      dup2(started[1], 1);
-      execlp("cat", "cat", static_cast<char*>(nullptr));
-      _exit(1);
-    }
+    program.fork();
     for (;;) pause();
     return 0;
   });
-  ::close(feed[0]);
-  ::close(started[1]);
-  char byte;
-  ASSERT_EQ(1, write(feed[1], "x", 1));
-  ASSERT_EQ(1, read(started[0], &byte, 1));  // the program runs
+  ASSERT_TRUE(program.await());
   EXPECT_FALSE(FileIsFree(place.file("name")));
   holder.kill(SIGKILL);
   holder.wait();
   EXPECT_TRUE(FileIsFree(place.file("name")));
-  ::close(feed[1]);
-  EXPECT_EQ(0, read(started[0], &byte, 1));  // it has lived until now
-  ::close(started[0]);
+  EXPECT_TRUE(program.end());  // it has lived until now
 }
 
 }  // namespace

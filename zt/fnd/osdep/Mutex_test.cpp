@@ -20,6 +20,7 @@
 #include <vector>
 
 #include "tests/support/Child.h"
+#include "tests/support/EventPlace.h"
 #include "tests/support/FailSystemCall.h"
 #include "tests/support/MutexPlace.h"
 #include "tests/support/PosixErrorOf.h"
@@ -36,6 +37,7 @@ using vlt::test::BlockedIn;
 using vlt::test::Child;
 using vlt::test::Eventually;
 using vlt::test::FileIsFree;
+using vlt::test::Keeper;
 using vlt::test::ModeOf;
 using vlt::test::MutexPlace;
 using vlt::test::PosixErrorOf;
@@ -55,20 +57,13 @@ bool TryElsewhere(const Mutex& mutex) {
 }
 
 // A process that holds the name until it is killed.
-struct Holder {
-  vlt::test::Signal held;
-  Child child;
-  explicit Holder(const char* name)
-      : child([this, name] {
-          Mutex mutex{Wide(name)};
-          mutex.lock();
-          held.notify();
-          for (;;) pause();
-          return 0;
-        }) {
-    EXPECT_TRUE(held.await());
-  }
-};
+Keeper HolderOf(const char* name) {
+  return Keeper([name] {
+    auto mutex = std::make_unique<Mutex>(Wide(name));
+    mutex->lock();
+    return mutex;
+  });
+}
 
 TEST(Mutex, LeavesAnEmptyFileOpenToAll) {
   MutexPlace place;
@@ -185,11 +180,11 @@ TEST(Mutex, ProcessesLoseNoStep) {
 TEST(Mutex, TryLockWhileAnotherProcessHoldsItIsFalseAndLeavesNoTrace) {
   MutexPlace place;
   Mutex mutex(L"name");
-  Holder holder("name");
+  Keeper holder = HolderOf("name");
+  ASSERT_TRUE(holder.good());
   EXPECT_FALSE(mutex.tryLock());
   EXPECT_FALSE(TryElsewhere(mutex));
-  holder.child.kill(SIGKILL);
-  EXPECT_EQ(128 + SIGKILL, holder.child.wait());
+  holder.kill();
   // The section is free for any thread, and one unlock frees the file.
   EXPECT_TRUE(TryElsewhere(mutex));
   EXPECT_TRUE(mutex.tryLock());
@@ -199,7 +194,8 @@ TEST(Mutex, TryLockWhileAnotherProcessHoldsItIsFalseAndLeavesNoTrace) {
 
 TEST(Mutex, KilledHolderDoesNotBlockTheNext) {
   MutexPlace place;
-  Holder holder("name");
+  Keeper holder = HolderOf("name");
+  ASSERT_TRUE(holder.good());
   Child waiter([] {
     Mutex mutex(L"name");
     mutex.lock();
@@ -207,13 +203,14 @@ TEST(Mutex, KilledHolderDoesNotBlockTheNext) {
     return 0;
   });
   EXPECT_TRUE(Eventually([&] { return BlockedIn(waiter.pid(), SYS_flock); }));
-  holder.child.kill(SIGKILL);
+  holder.kill();
   EXPECT_EQ(0, waiter.wait());
 }
 
 TEST(Mutex, InterruptedWaitIsResumed) {
   MutexPlace place;
-  Holder holder("name");
+  Keeper holder = HolderOf("name");
+  ASSERT_TRUE(holder.good());
   Child waiter([] {
     struct sigaction action = {};
     action.sa_handler = [](int) {};
@@ -227,7 +224,7 @@ TEST(Mutex, InterruptedWaitIsResumed) {
     waiter.kill(SIGUSR1);
   }
   EXPECT_TRUE(waiter.running());
-  holder.child.kill(SIGKILL);
+  holder.kill();
   EXPECT_EQ(0, waiter.wait());
 }
 
@@ -359,10 +356,10 @@ TEST(Mutex, ReplacedFileIsLockedInPlaceOfTheOldOne) {
   EXPECT_TRUE(FileIsFree(place.file("name")));
   // The same by tryLock, with another process on the new file.
   ASSERT_EQ(0, unlink(place.file("name").c_str()));
-  Holder holder("name");
+  Keeper holder = HolderOf("name");
+  ASSERT_TRUE(holder.good());
   EXPECT_FALSE(mutex.tryLock());
-  holder.child.kill(SIGKILL);
-  holder.child.wait();
+  holder.kill();
   EXPECT_TRUE(mutex.tryLock());
   mutex.unlock();
 }

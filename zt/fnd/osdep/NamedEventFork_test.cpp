@@ -1,13 +1,10 @@
 // Named events and fork(): children that inherit, and openings that a fork cuts in two.
-#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
-#include <sys/file.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
 #include <atomic>
-#include <chrono>
 #include <memory>
 #include <string>
 #include <thread>
@@ -15,13 +12,14 @@
 
 #include "tests/support/Child.h"
 #include "tests/support/EventPlace.h"
+#include "tests/support/Heir.h"
+#include "tests/support/MutexPlace.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/Sanitizer.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/Mutex.h"
 #include "zt/fnd/osdep/NamedEvent.h"
-#include "zt/fnd/osdep/ScopedFd.h"
 
 namespace zt::fnd::osdep {
 namespace {
@@ -30,7 +28,10 @@ using vlt::test::BlockedIn;
 using vlt::test::Child;
 using vlt::test::EventPlace;
 using vlt::test::Eventually;
+using vlt::test::ExecHeir;
 using vlt::test::Exists;
+using vlt::test::FileIsFree;
+using vlt::test::Heir;
 using vlt::test::kCanForkWhileThreadsAllocate;
 using vlt::test::OpenDescriptors;
 using vlt::test::Wide;
@@ -41,12 +42,6 @@ constexpr const wchar_t* kStateFileMutex = L"zt_fnd_osdep_NamedEvent_StateFileMu
 
 auto Open(const std::string& name, bool manual = kManual, bool initial = kClear) {
   return std::make_unique<NamedEvent>(Wide(name), manual, initial);
-}
-
-bool FileIsFree(const std::string& path) {
-  ScopedFd fd(::open(path.c_str(), O_RDWR | O_CLOEXEC));
-  EXPECT_TRUE(fd.valid()) << path;
-  return Flock(fd.get(), LOCK_EX | LOCK_NB) == 0;
 }
 
 TEST(NamedEventFork, ChildUsesTheInheritedObject) {
@@ -155,32 +150,19 @@ TEST(NamedEventFork, ParentClosesWhileAChildLives) {
 
 TEST(NamedEventFork, ProgramStartedByExecHoldsNothing) {
   EventPlace place;
-  int feed[2], started[2];
-  ASSERT_EQ(0, pipe2(feed, O_CLOEXEC));
-  ASSERT_EQ(0, pipe2(started, O_CLOEXEC));
+  ExecHeir program;
   Child holder([&] {
     auto event = Open("name");
-    if (fork() == 0) {
-      dup2(feed[0], 0);
-      dup2(started[1], 1);
-      execlp("cat", "cat", static_cast<char*>(nullptr));
-      _exit(1);
-    }
+    program.fork();
     for (;;) pause();
     return 0;
   });
-  ::close(feed[0]);
-  ::close(started[1]);
-  char byte;
-  ASSERT_EQ(1, write(feed[1], "x", 1));
-  ASSERT_EQ(1, read(started[0], &byte, 1));
+  ASSERT_TRUE(program.await());
   holder.kill(SIGKILL);
   holder.wait();
   EXPECT_TRUE(FileIsFree(place.file("name")));
   EXPECT_TRUE(FileIsFree(place.file("sem_1")));
-  ::close(feed[1]);
-  EXPECT_EQ(0, read(started[0], &byte, 1));
-  ::close(started[0]);
+  EXPECT_TRUE(program.end());
 }
 
 // A thread is in the middle of an opening, with the event's file locked for itself alone, when
@@ -188,20 +170,19 @@ TEST(NamedEventFork, ProgramStartedByExecHoldsNothing) {
 TEST(NamedEventFork, OpeningCutOffByForkAndKillBlocksNobody) {
   EventPlace place;
   Mutex stateFiles{String(kStateFileMutex)};
-  vlt::test::Signal forked, end;
+  Heir heir;
   stateFiles.lock();
   Child parent([&] {
     std::thread opener([] { Open("name"); });
-    while (!Exists(place.file("name")) || FileIsFree(place.file("name"))) usleep(1000);
-    if (fork() == 0) {
-      forked.notify();
-      end.await();
-      _exit(0);
+    if (!Eventually(
+            [&] { return Exists(place.file("name")) && !FileIsFree(place.file("name")); })) {
+      return 1;
     }
+    heir.fork();
     opener.join();
     return 0;
   });
-  ASSERT_TRUE(forked.await());
+  ASSERT_TRUE(heir.await());
   parent.kill(SIGKILL);
   parent.wait();
   EXPECT_TRUE(FileIsFree(place.file("name")));
@@ -209,7 +190,7 @@ TEST(NamedEventFork, OpeningCutOffByForkAndKillBlocksNobody) {
   Child next([] { return Open("name", kManual, kSet)->check() ? 0 : 1; });
   EXPECT_EQ(0, next.wait());
   EXPECT_EQ(Names(), place.files());
-  end.notify();
+  heir.end();
 }
 
 TEST(NamedEventFork, ForkWhileAnotherThreadIsInsideLeavesAUsableChild) {
@@ -225,7 +206,7 @@ TEST(NamedEventFork, ForkWhileAnotherThreadIsInsideLeavesAUsableChild) {
     auto mine = Open("mine");
     return mine->check() ? 1 : 0;
   });
-  std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }));
   stateFiles.unlock();
   opener.join();
   EXPECT_EQ(0, child.wait());

@@ -1,16 +1,14 @@
 #include "zt/fnd/osdep/NamedEventGlobalStatics.h"
 
-#include <pthread.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <cstdlib>
-#include <utility>
 
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/MonotonicClock.h"
 #include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/ProcessStatics.h"
 #include "zt/fnd/osdep/Sleep.h"
 
 namespace zt {
@@ -21,68 +19,13 @@ namespace {
 // How long an event that others hold, but that cannot be joined, is tried again.
 constexpr unsigned kJoinPatienceMs = 2000;
 
-// Plain objects, ready before any initialiser and good after every destructor.
-pthread_once_t s_once = PTHREAD_ONCE_INIT;
-pthread_mutex_t s_lock = PTHREAD_MUTEX_INITIALIZER;
-// One reference. Behind it the statics that came through forks: never released, as their section may
-// belong to a thread that is not here, but kept in sight of leak checkers. Both guarded by s_lock.
-NamedEventGlobalStatics* s_statics = nullptr;
-NamedEventGlobalStatics* s_inherited = nullptr;
-
-class Hold {
- public:
-  Hold() { pthread_mutex_lock(&s_lock); }
-  ~Hold() { pthread_mutex_unlock(&s_lock); }
-  Hold(const Hold&) = delete;
-  Hold& operator=(const Hold&) = delete;
-};
-
-void LockForFork() { pthread_mutex_lock(&s_lock); }
-void UnlockAfterFork() { pthread_mutex_unlock(&s_lock); }
-
-// Sets statics of another process aside. The process id tells a child apart that was made without
-// the handlers of fork(), too.
-void DropInherited() {
-  if (s_statics == nullptr || s_statics->pid == getpid()) return;
-  s_statics->inherited = std::exchange(s_inherited, s_statics);
-  s_statics = nullptr;
-}
-
-void AtExit() {
-  NamedEventGlobalStatics* last;
-  {
-    Hold hold;
-    DropInherited();
-    last = std::exchange(s_statics, nullptr);
-  }
-  if (last != nullptr) last->release();
-}
-
-void Register() {
-  pthread_atfork(LockForFork, UnlockAfterFork, UnlockAfterFork);
-  std::atexit(AtExit);
-}
-
-RefPtr<NamedEventGlobalStatics> Present() {
-  Hold hold;
-  DropInherited();
-  return RefPtr<NamedEventGlobalStatics>(s_statics);
-}
-
 }  // namespace
 
 NamedEventGlobalStatics::NamedEventGlobalStatics()
     : pid(getpid()), stateFileMutex(String(L"zt_fnd_osdep_NamedEvent_StateFileMutex")) {}
 
 RefPtr<NamedEventGlobalStatics> NamedEventGlobalStatics::Get() {
-  pthread_once(&s_once, Register);
-  RefPtr<NamedEventGlobalStatics> present = Present();
-  if (present) return present;
-  // Made outside the lock, as this opens the mutex's file; of two threads one makes it in vain.
-  RefPtr<NamedEventGlobalStatics> fresh(new NamedEventGlobalStatics);
-  Hold hold;
-  if (s_statics == nullptr) s_statics = RefPtr<NamedEventGlobalStatics>(fresh).detach();
-  return RefPtr<NamedEventGlobalStatics>(s_statics);
+  return ProcessStatics<NamedEventGlobalStatics>::Get();
 }
 
 RefPtr<SemaphoreSet> NamedEventGlobalStatics::getOrCreateSemaphoreSet(unsigned number) {
@@ -141,7 +84,7 @@ bool NamedEventGlobalStatics::hasSemaphoreSetOfId(int id) const {
 }
 
 void NamedEventGlobalStatics::ReleaseInherited(const EventData& event) {
-  Hold hold;
+  PosixMutexHold hold(ProcessStatics<NamedEventGlobalStatics>::Lock());
   event.RefCountedThreadUnsafePolicy::release();
 }
 

@@ -21,6 +21,7 @@
 #include "tests/support/EventPlace.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
+#include "tests/support/ThreadState.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/EventStateFile.h"
 #include "zt/fnd/osdep/NamedEvent.h"
@@ -31,11 +32,13 @@ namespace {
 
 using vlt::test::Child;
 using vlt::test::EventPlace;
+using vlt::test::Eventually;
 using vlt::test::Exists;
 using vlt::test::Keeper;
 using vlt::test::OpenDescriptors;
 using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
+using vlt::test::Sleeps;
 using vlt::test::Wide;
 using vlt::test::WriteBytes;
 using Clock = std::chrono::steady_clock;
@@ -318,8 +321,8 @@ TEST(NamedEventHostile, JoinOfAnEventThatIsBeingClosedBeginsAnew) {
     WriteBytes(place.file("name"), bytes);
     ScopedFd other(::open(place.file("name").c_str(), O_RDWR | O_CLOEXEC));
     ASSERT_EQ(0, Flock(other.get(), LOCK_SH));
-    std::thread letGo([&] {
-      std::this_thread::sleep_for(std::chrono::milliseconds(60));
+    std::thread letGo([&, opener = gettid()] {
+      EXPECT_TRUE(Eventually([&] { return Sleeps(opener); }));  // before it begins anew
       other.reset();
     });
     EXPECT_TRUE(Open("name", kAutomatic, kSet)->check());
@@ -338,8 +341,8 @@ TEST(NamedEventHostile, JoinOfAKilledHoldersEventBeginsAnew) {
     ASSERT_EQ(0, Flock(sharer.get(), LOCK_SH));
     killed.kill();  // the set is nobody's now, and an opener makes it anew
   }
-  std::thread letGo([&] {
-    std::this_thread::sleep_for(std::chrono::milliseconds(60));
+  std::thread letGo([&, opener = gettid()] {
+    EXPECT_TRUE(Eventually([&] { return Sleeps(opener); }));
     sharer.reset();
   });
   EXPECT_TRUE(Open("name", kManual, kSet)->check());

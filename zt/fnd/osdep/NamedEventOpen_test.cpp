@@ -15,7 +15,6 @@
 #include <memory>
 #include <stdexcept>
 #include <string>
-#include <thread>
 #include <vector>
 
 #include "tests/support/Child.h"
@@ -23,6 +22,7 @@
 #include "tests/support/NamedEventFiles.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
+#include "tests/support/ThreadState.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/EventStateFile.h"
 #include "zt/fnd/osdep/NamedEvent.h"
@@ -273,7 +273,7 @@ TEST(NamedEventFiles, OpenerWaitsWhileAnotherSetsTheFileUp) {
     return Open("name", kAutomatic, kSet)->check() ? 0 : 1;
   });
   ASSERT_TRUE(begun.await());
-  std::this_thread::sleep_for(std::chrono::milliseconds(50));
+  EXPECT_TRUE(vlt::test::Eventually([&] { return vlt::test::Sleeps(opener.pid()); }));
   EXPECT_TRUE(opener.running());
   EXPECT_EQ("", ReadBytes(place.file("name")));
   Flock(busy.get(), LOCK_UN);  // the opener has a copy of the descriptor

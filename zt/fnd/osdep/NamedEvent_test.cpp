@@ -5,11 +5,9 @@
 #include <sys/ipc.h>
 #include <sys/sem.h>
 #include <sys/syscall.h>
-#include <ucontext.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <atomic>
 #include <chrono>
 #include <cstdlib>
@@ -18,10 +16,11 @@
 #include <thread>
 #include <vector>
 
+#include "tests/support/CaughtSleeps.h"
 #include "tests/support/Child.h"
 #include "tests/support/EventPlace.h"
-#include "tests/support/FailSystemCall.h"
 #include "tests/support/PosixErrorOf.h"
+#include "tests/support/ThreadState.h"
 #include "zt/fnd/String.h"
 
 namespace zt::fnd::osdep {
@@ -32,6 +31,7 @@ using vlt::test::Child;
 using vlt::test::EventPlace;
 using vlt::test::Eventually;
 using vlt::test::PosixErrorOf;
+using vlt::test::Sleeps;
 using Clock = std::chrono::steady_clock;
 
 constexpr unsigned kNoLimit = 0xFFFFFFFFu;
@@ -41,17 +41,6 @@ long MsSince(Clock::time_point begin) {
   return static_cast<long>(
       std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - begin).count());
 }
-
-#if defined(__x86_64__)
-constexpr int kThirdArgument = REG_RDX, kResult = REG_RAX;
-#else
-constexpr int kThirdArgument = REG_EDX, kResult = REG_EAX;
-#endif
-
-// The time of SYS_clock_nanosleep, which serves short sleeps in 32-bit processes, too.
-struct KernelTime {
-  long seconds, nanoseconds;
-};
 
 // The ways into the kernel of a wait; which ones there are depends on the word size.
 constexpr long kWaitCalls[] = {
@@ -147,8 +136,10 @@ TEST(NamedEvent, AutomaticSetReleasesOneOfThreeWaiters) {
     event.set();
     ASSERT_TRUE(Eventually([&] { return waiting() == left; }));
     EXPECT_FALSE(event.checkOnly());
-    std::this_thread::sleep_for(std::chrono::milliseconds(20));
-    EXPECT_EQ(left, waiting());  // and no second one
+    for (Child& waiter : waiters) {  // and no second one
+      EXPECT_TRUE(Eventually([&] { return !waiter.running() || Waiting(waiter.pid()); }));
+    }
+    EXPECT_EQ(left, waiting());
   }
   for (Child& waiter : waiters) EXPECT_EQ(0, waiter.wait());
 }
@@ -192,36 +183,14 @@ TEST(NamedEvent, TimedWaitThatEndsInVainTakesItsTime) {
   }
 }
 
-// Sleeps of this process, in milliseconds, as it asks the kernel for them. From CatchSleeps() on
-// they return at once. For children.
-std::array<long, 8> s_sleeps;
-std::size_t s_sleepCount;
-
-void OnSleep(int, siginfo_t*, void* context) {
-  auto& registers = static_cast<ucontext_t*>(context)->uc_mcontext.gregs;
-  auto* time = reinterpret_cast<const KernelTime*>(registers[kThirdArgument]);
-  s_sleeps.at(s_sleepCount++) = time->seconds * 1000 + time->nanoseconds / 1000000;
-  registers[kResult] = 0;
-}
-
-bool CatchSleeps() {
-  struct sigaction action = {};
-  action.sa_sigaction = OnSleep;
-  action.sa_flags = SA_SIGINFO;
-  sigaction(SIGSYS, &action, nullptr);
-  return vlt::test::TrapSystemCall(SYS_clock_nanosleep);
-}
-
 TEST(NamedEvent, TimedWaitSleeps50MsAndThenTheRest) {
   EventPlace place;
-  auto sleepsOf = [](unsigned ms, std::vector<long> expected) {
+  auto sleepsOf = [](unsigned ms, std::vector<long long> expected) {
     return Child([=] {
              NamedEvent event(L"name", kAutomatic, kClear);
-             if (!CatchSleeps()) return 1;
+             if (!vlt::test::CatchSleeps()) return 1;
              if (event.wait(ms)) return 2;
-             return std::vector<long>(s_sleeps.begin(), s_sleeps.begin() + s_sleepCount) == expected
-                        ? 0
-                        : 3;
+             return vlt::test::CaughtSleeps() == expected ? 0 : 3;
            })
         .wait();
   };
@@ -236,8 +205,8 @@ TEST(NamedEvent, TimedWaitSeesASignal) {
   EventPlace place;
   for (bool manual : {kManual, kAutomatic}) {
     NamedEvent event(L"name", manual, kClear);
-    std::thread setter([&] {
-      std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    std::thread setter([&, waiter = gettid()] {
+      EXPECT_TRUE(Eventually([&] { return Sleeps(waiter); }));
       event.set();
     });
     EXPECT_TRUE(event.wait(20000));
@@ -246,14 +215,14 @@ TEST(NamedEvent, TimedWaitSeesASignal) {
   }
 }
 
-// A look can fall into the pulse, but not each time.
+// A look can fall into the pulse, if the sleep ends just then, but not each time.
 TEST(NamedEvent, PulseBetweenTwoLooksGoesUnseen) {
   EventPlace place;
   NamedEvent event(L"name", kManual, kClear);
   int unseen = 0;
   for (int i = 0; i < 3; ++i) {
-    std::thread pulser([&] {
-      std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    std::thread pulser([&, waiter = gettid()] {
+      EXPECT_TRUE(Eventually([&] { return Sleeps(waiter); }));
       event.set();
       event.reset();
     });

@@ -6,7 +6,8 @@
 
 #include <atomic>
 #include <chrono>
-#include <thread>
+
+#include "tests/support/ThreadState.h"
 
 namespace zt::fnd::osdep {
 namespace {
@@ -26,20 +27,13 @@ TEST(ThreadSleep, SignalDoesNotCutItShort) {
   struct sigaction action = {}, before = {};
   action.sa_handler = [](int) { ++g_signals; };
   sigaction(SIGUSR1, &action, &before);  // without SA_RESTART
-  std::atomic<bool> asleep{false}, done{false};
   Clock::duration slept{};
-  std::thread sleeper([&] {
-    asleep = true;
+  vlt::test::WatchedThread sleeper([&] {
     auto start = Clock::now();
     Sleep(150);
     slept = Clock::now() - start;
-    done = true;
   });
-  while (!asleep) std::this_thread::yield();
-  while (!done) {
-    pthread_kill(sleeper.native_handle(), SIGUSR1);
-    std::this_thread::sleep_for(std::chrono::milliseconds(5));
-  }
+  while (sleeper.fallsAsleep()) pthread_kill(sleeper.handle(), SIGUSR1);
   sleeper.join();
   sigaction(SIGUSR1, &before, nullptr);
   EXPECT_GE(slept, std::chrono::milliseconds(150));

@@ -7,6 +7,7 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <ctime>
@@ -21,6 +22,7 @@
 #include "tests/support/EventPlace.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
+#include "tests/support/ThreadState.h"
 
 namespace Toolyard {
 namespace {
@@ -31,6 +33,7 @@ using vlt::test::EventPlace;
 using vlt::test::Eventually;
 using vlt::test::Keeper;
 using vlt::test::PosixErrorOf;
+using vlt::test::WatchedThread;
 using zt::fnd::String;
 using Clock = std::chrono::steady_clock;
 
@@ -72,13 +75,13 @@ TEST(SyncCS, IsRecursiveAndExcludesOtherThreads) {
   EXPECT_TRUE(section.Lock(0));
   EXPECT_TRUE(section.Lock(-1));
   std::atomic<bool> entered{false};
-  std::thread other([&] {
+  WatchedThread other([&] {
     EXPECT_TRUE(section.Lock(0));  // the timeout is ignored
     entered = true;
     section.Unlock();
   });
   EXPECT_TRUE(section.Unlock());
-  std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  EXPECT_TRUE(other.blocksInLock());
   EXPECT_FALSE(entered);
   EXPECT_TRUE(section.Unlock());
   other.join();
@@ -161,11 +164,11 @@ TEST(SyncEvent, InitialStateComesBeforeManualReset) {
 TEST(SyncEvent, UnlockSetsAndEndsAWaitWithoutLimit) {
   CztEvent event(nullptr, false, false);
   std::atomic<bool> released{false};
-  std::thread waiter([&] {
+  WatchedThread waiter([&] {
     EXPECT_TRUE(event.Lock(-1));
     released = true;
   });
-  std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  EXPECT_TRUE(waiter.blocksInLock());
   EXPECT_FALSE(released);
   EXPECT_TRUE(event.Unlock());
   waiter.join();
@@ -174,12 +177,12 @@ TEST(SyncEvent, UnlockSetsAndEndsAWaitWithoutLimit) {
 TEST(SyncEvent, OtherNegativeTimeoutsAreLongOnes) {
   CztEvent event("name", false, false);
   std::atomic<bool> released{false};
-  std::thread waiter([&] {
+  WatchedThread waiter([&] {
     EXPECT_TRUE(event.Lock(-2));
     EXPECT_TRUE(event.Lock(std::numeric_limits<int>::min()));
     released = true;
   });
-  std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  EXPECT_TRUE(waiter.blocksInLock());
   EXPECT_FALSE(released);
   event.Unlock();
   while (!released) {
@@ -211,11 +214,13 @@ TEST(SyncSemaphore, FullFromTheBeginDoesNotWait) {
 TEST(SyncSemaphore, TimeoutLimitsEachWaitAndNotTheCall) {
   CztSemaphore semaphore(nullptr, 1, 0);
   std::atomic<bool> got{false};
-  std::thread waiter([&] {
+  WatchedThread waiter([&] {
     EXPECT_TRUE(semaphore.Lock(10));
     got = true;
   });
-  std::this_thread::sleep_for(std::chrono::milliseconds(80));
+  // Time is the subject here: several times that of one wait.
+  std::this_thread::sleep_for(std::chrono::milliseconds(50));
+  EXPECT_TRUE(waiter.blocksInLock());
   EXPECT_FALSE(got);
   EXPECT_TRUE(semaphore.Unlock());
   waiter.join();
@@ -225,19 +230,24 @@ TEST(SyncSemaphore, TimeoutLimitsEachWaitAndNotTheCall) {
 TEST(SyncSemaphore, ReleaseWakesAsManyAsThereAreUnits) {
   CztSemaphore semaphore(L"name", 10, 0);
   std::atomic<int> got{0};
-  std::vector<std::thread> waiters;
+  std::vector<std::unique_ptr<WatchedThread>> waiters;
   for (int i = 0; i < 4; ++i) {
-    waiters.emplace_back([&] {
+    waiters.push_back(std::make_unique<WatchedThread>([&] {
       semaphore.Lock(-1);
       ++got;
-    });
+    }));
+    EXPECT_TRUE(waiters.back()->blocksInLock());
   }
   EXPECT_EQ(0, semaphore.Release(3));
-  EXPECT_TRUE(Eventually([&] { return got == 3; }));
-  std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  auto running = [&] {
+    return std::ranges::count_if(waiters, [](auto& waiter) { return !waiter->done(); });
+  };
+  EXPECT_TRUE(Eventually([&] { return running() == 1; }));
   EXPECT_EQ(3, got);
-  semaphore.Release(1);
-  for (auto& waiter : waiters) waiter.join();
+  for (auto& waiter : waiters) EXPECT_TRUE(waiter->done() || waiter->blocksInLock());
+  EXPECT_EQ(0, semaphore.Release(1));
+  for (auto& waiter : waiters) waiter->join();
+  EXPECT_EQ(4, got);
   EXPECT_EQ(0, semaphore.Release(0));
 }
 
@@ -253,6 +263,7 @@ TEST(SyncSemaphore, ReleaseOfNothingLeavesWaitersAsleep) {
   });
   clockid_t id = clock.get_future().get();
   EXPECT_EQ(0, semaphore.Release(0));
+  // Time is the subject here: how much of the processor's the waiter uses of it.
   std::this_thread::sleep_for(std::chrono::milliseconds(200));
   timespec used;
   clock_gettime(id, &used);
@@ -352,8 +363,7 @@ TEST(SyncStatefulMutex, AnyOtherWaitIsWithoutLimit) {
   CztStatefulMutex mutex(L"name");
   mutex.Lock(-1);
   Child other([] { return CztStatefulMutex(L"name").Lock(1) ? 0 : 1; });
-  ASSERT_TRUE(Eventually([&] { return WaitsForFile(other); }));
-  std::this_thread::sleep_for(std::chrono::milliseconds(50));
+  ASSERT_TRUE(Eventually([&] { return WaitsForFile(other); }));  // the kernel knows of no time
   EXPECT_TRUE(other.running());
   mutex.Unlock();
   EXPECT_EQ(0, other.wait());

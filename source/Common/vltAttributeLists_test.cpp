@@ -1,0 +1,172 @@
+// Lists of values as one text.
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <new>
+
+#include "source/Common/FakeStorage.h"
+#include "source/Utilities/vltHookPoints.h"
+#include "tests/support/InChild.h"
+#include "tests/support/Installation.h"
+#include "tests/support/MemoryLimit.h"
+
+namespace vlt::test {
+namespace {
+
+using zt::fnd::String;
+
+HRESULT List(const Answers& answers, String& text, std::vector<uint32_t>* capacities = nullptr) {
+  g_references = 0;
+  Object object(answers);
+  HRESULT result = vltGetArrayValueAsString(&object, kId, answers.type, text);
+  EXPECT_EQ(g_references, 0);
+  if (capacities) *capacities = object.capacities;
+  return result;
+}
+
+std::wstring ListText(const Answers& answers, HRESULT expected) {
+  String text(L"old");
+  EXPECT_EQ(List(answers, text), expected);
+  return text.c_str();
+}
+
+TEST(AttributeList, TypesThatAreNoneGiveAnEmptyOne) {
+  for (int type : {0, 1, 2, 3, 4, 5, 6, 7, 14, 15, -1}) {
+    EXPECT_EQ(ListText(Filled(type), E_FAIL), L"{}") << type;
+  }
+}
+
+TEST(AttributeList, AsksForTheSizeAndThenForTheElements) {
+  for (int type = 8; type <= 13; ++type) {
+    String text;
+    std::vector<uint32_t> capacities;
+    EXPECT_EQ(List(Filled(type), text, &capacities), S_OK);
+    EXPECT_EQ(capacities, (std::vector<uint32_t>{0, 2})) << type;
+    EXPECT_EQ(List(Type(type), text, &capacities), S_OK);
+    EXPECT_EQ(capacities, std::vector<uint32_t>{0}) << type;
+    Answers failing = Filled(type);
+    failing.sizeResult = kFailure;
+    EXPECT_EQ(List(failing, text, &capacities), kFailure);
+    EXPECT_EQ(capacities, std::vector<uint32_t>{0}) << type;
+  }
+}
+
+TEST(AttributeList, FewerElementsThanAnnounced) {
+  for (int type = 8; type <= 13; ++type) {
+    Answers answers = Filled(type);
+    answers.announced = 5;
+    EXPECT_EQ(ListText(answers, S_OK), ListText(Filled(type), S_OK)) << type;
+    answers.given = 0;
+    EXPECT_EQ(ListText(answers, S_OK), L"{}") << type;
+    answers.result = kFailure;
+    EXPECT_EQ(ListText(answers, kFailure), L"{}") << type;
+  }
+}
+
+TEST(AttributeList, MoreElementsThanThereIsRoomFor) {
+  for (int type = 8; type <= 13; ++type) {
+    Answers answers = Filled(type);
+    answers.given = 0xFFFFFFFF;
+    EXPECT_EQ(ListText(answers, S_OK), ListText(Filled(type), S_OK)) << type;
+  }
+}
+
+TEST(AttributeList, ElementsThatDoNotComeAreZeros) {
+  const std::pair<int, const wchar_t*> rows[] = {
+      {8, L"{0,0}"}, {9, L"{0,0}"}, {10, L"{0,0}"}, {11, L"{,}"}, {12, L"{NULL,NULL}"}};
+  for (const auto& [type, text] : rows) {
+    Answers answers = Type(type);
+    answers.announced = answers.given = 2;
+    answers.result = kFailure;
+    EXPECT_EQ(ListText(answers, kFailure), text);
+  }
+}
+
+TEST(AttributeList, ManyElementsTakeTimeInProportion) {
+  Answers answers = Type(vltU32ArrayType);
+  answers.u32.assign(200000, 7);
+  EXPECT_EQ(ListText(answers, S_OK).size(), 400001u);
+}
+
+TEST(AttributeList, ACountThatIsNotTrueIsOutOfMemory) {
+  if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer holds the address space";
+  int code = InChild([] {
+    LimitMemoryTo(64 << 20);
+    for (int type = 8; type <= 13; ++type) {
+      Answers answers = Filled(type);
+      answers.announced = 0xFFFFFFFF;
+      EXPECT_EQ(ListText(answers, E_OUTOFMEMORY), L"{") << type;
+      EXPECT_EQ(TextOf(answers, E_OUTOFMEMORY), L"(untouched)") << type;
+    }
+  });
+  EXPECT_EQ(code, 0);
+}
+
+// Runs expectations in a process that is armed at this point.
+int Armed(const char* point, const char* fault, const std::function<void()>& body) {
+  Installation installation;
+  WriteBytes(installation.root() + "/VLTHooks.ini",
+             std::string("[Hook]\nName = ") + point + "\n" + fault + " = true\n");
+  return InChild([&] {
+    vltRefreshHook();
+    body();
+  });
+}
+
+constexpr const char* kSimulate = "SimulateMemoryAllocationFailure";
+constexpr const char* kThrow = "SimulateMemoryAllocationFailureAndThrow";
+
+TEST(AttributeList, HookPointsActAsAFailedAllocation) {
+  const std::pair<int, const char*> points[] = {{8, "TestHookNT\"./source/Common/vltcmn\"96"},
+                                                {9, "TestHookNT\"./source/Common/vltcmn\"111"},
+                                                {10, "TestHookNT\"./source/Common/vltcmn\"126"},
+                                                {13, "TestHookNT\"./source/Common/vltcmn\"141"},
+                                                {11, "TestHookNT\"./source/Common/vltcmn\"158"},
+                                                {12, "TestHookNT\"./source/Common/vltcmn\"174"}};
+  for (const auto& [type, point] : points) {
+    int code = Armed(point, kSimulate, [type = type] {
+      for (int other = 8; other <= 13; ++other) {
+        if (other == type) {
+          EXPECT_EQ(ListText(Filled(other), E_OUTOFMEMORY), L"{");
+          EXPECT_EQ(TextOf(Filled(other), E_OUTOFMEMORY), L"(untouched)");
+          EXPECT_EQ(TextOf(Filled(other), E_OUTOFMEMORY, kInner), L"{");
+        } else {
+          EXPECT_EQ(ListText(Filled(other), S_OK).back(), L'}');
+        }
+        EXPECT_EQ(ListText(Type(other), S_OK), L"{}");  // passed before an allocation only
+      }
+    });
+    EXPECT_EQ(code, 0) << point;
+  }
+}
+
+TEST(AttributeList, AnExceptionGivesEverythingBack) {
+  int code = Armed(hook::kStringFromClsid, kThrow, [] {
+    for (int type : {5, 6, 12, 13}) {
+      g_references = 0;
+      Answers answers = Filled(type);
+      Object object(answers);
+      wchar_t* text = g_untouched;
+      EXPECT_THROW(vltGetAttributeValueAsString(&object, kId, &text), std::bad_alloc) << type;
+      EXPECT_EQ(text, g_untouched);
+      EXPECT_EQ(g_references, 0);
+    }
+  });
+  EXPECT_EQ(code, 0);
+}
+
+TEST(AttributeList, AnElementWithoutATextIsOutOfMemory) {
+  int code = Armed(hook::kDuplicateString2, kSimulate, [] {
+    for (int type : {12, 13}) EXPECT_EQ(ListText(Filled(type), E_OUTOFMEMORY), L"{,}");
+    for (int type : {5, 6}) {
+      EXPECT_EQ(TextOf(Filled(type), E_OUTOFMEMORY), L"(untouched)");
+      Answers failing = Filled(type);
+      failing.result = kFailure;
+      EXPECT_EQ(TextOf(failing, kFailure, kInner), L"(untouched)");
+    }
+  });
+  EXPECT_EQ(code, 0);
+}
+
+}  // namespace
+}  // namespace vlt::test

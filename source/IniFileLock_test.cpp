@@ -1,0 +1,129 @@
+#include "source/IniFileLock.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <thread>
+
+#include "source/TestIni.h"
+#include "tests/support/Child.h"
+#include "tests/support/Installation.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/Exception.h"
+
+namespace {
+
+using namespace vlt::test;
+
+TEST(IniLock, NameHasNoSeparatorAndIsInCapitals) {
+  auto name = [](const char* file) {
+    return std::string(zt::fnd::AnsiString(IniFileLock::NameForFile(file)).c_str());
+  };
+  EXPECT_EQ(name("/d/vltjar.ini"), "DVLTJARINI");
+  EXPECT_EQ(name("C:\\a b.ini"), "CA BINI");
+  std::string longPath = "/" + std::string(300, 'a');
+  EXPECT_LE(name(longPath.c_str()).size(), 255u);
+  EXPECT_NE(name(longPath.c_str()), name((longPath + "b").c_str()));
+  EXPECT_EQ(name(("/" + std::string(255, 'a')).c_str()), std::string(255, 'A'));
+}
+
+TEST(IniLock, IsRecursiveInAThread) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  CvlIniMgr outer(file.c_str(), true, nullptr, false, false);
+  {
+    CvlIniMgr inner(file.c_str(), false, nullptr, true, true);
+    inner.SetItem("s", "a", "1", true);
+  }
+  CvlIniMgr again(file.c_str(), false, nullptr, false, true);
+  EXPECT_EQ(Value(again, "s", "a"), "1");
+}
+
+TEST(IniLock, AnotherThreadWaits) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  auto outer = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
+  Signal started, entered;
+  std::thread other([&] {
+    started.notify();
+    CvlIniMgr mine(file.c_str(), true, nullptr, false, false);
+    entered.notify();
+  });
+  EXPECT_TRUE(started.await());
+  EXPECT_FALSE(entered.await(50));
+  outer.reset();
+  EXPECT_TRUE(entered.await());
+  other.join();
+}
+
+TEST(IniLock, AnotherProcessWaitsAndGoesOnWhenTheHolderIsKilled) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  Signal held, never, entered;
+  Child holder([&] {
+    CvlIniMgr mine(file.c_str(), true, nullptr, false, false);
+    held.notify();
+    never.await();
+    return 0;
+  });
+  ASSERT_TRUE(held.await());
+  Child waiter([&] {
+    CvlIniMgr mine(file.c_str(), true, nullptr, false, false);
+    entered.notify();
+    return 0;
+  });
+  EXPECT_TRUE(Eventually([&] { return BlockedIn(waiter.pid(), SYS_flock); }));
+  EXPECT_FALSE(entered.await(0));
+  holder.kill(SIGKILL);
+  EXPECT_TRUE(entered.await());
+  EXPECT_EQ(waiter.wait(), 0);
+}
+
+TEST(IniLock, MayBeGivenUpByAnotherThreadAndTakenAgain) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  auto mine = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
+  std::thread([&] { mine.reset(); }).join();
+  CvlIniMgr again(file.c_str(), true, nullptr, false, false);
+  EXPECT_EQ(Child([&] {
+              CvlIniMgr blocked(file.c_str(), true, nullptr, false, false);
+              return 0;
+            }).running(),
+            true);
+}
+
+TEST(IniLock, AForkedChildDoesNotFreeItsParentsLock) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  auto mine = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
+  EXPECT_EQ(Child([&] {
+              mine.reset();
+              return 0;
+            }).wait(),
+            0);
+  Signal entered;
+  Child waiter([&] {
+    CvlIniMgr other(file.c_str(), true, nullptr, false, false);
+    entered.notify();
+    return 0;
+  });
+  EXPECT_TRUE(Eventually([&] { return BlockedIn(waiter.pid(), SYS_flock); }));
+  EXPECT_FALSE(entered.await(0));
+  mine.reset();
+  EXPECT_TRUE(entered.await());
+  EXPECT_EQ(waiter.wait(), 0);
+}
+
+TEST(IniLock, IsFreeAfterAConstructorThatThrows) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "[a]\n");
+  EXPECT_EQ(Open(file, std::string(16, 'q')), 1);
+  EXPECT_EQ(Child([&] { return Open(file); }).wait(), 0);
+}
+
+}  // namespace

@@ -1,0 +1,68 @@
+#include "source/IniSidecar.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <thread>
+
+#include "tests/support/Child.h"
+#include "tests/support/Installation.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/Exception.h"
+
+namespace {
+
+using namespace vlt::test;
+
+TEST(Sidecar, ReadsSixteenBytesAndTellsWhatItFinds) {
+  TempDir dir;
+  std::string name = dir / "x.vl5";
+  unsigned char* digest = reinterpret_cast<unsigned char*>(&name);
+  EXPECT_EQ(IniSidecar::Read(name, &digest), S_FALSE);
+  EXPECT_EQ(digest, nullptr);
+  WriteBytes(name, std::string(15, 'a'));
+  EXPECT_EQ(IniSidecar::Read(name, &digest), E_FAIL);
+  EXPECT_EQ(digest, nullptr);
+  WriteBytes(name, std::string(16, 'a') + "more");
+  EXPECT_EQ(IniSidecar::Read(name, &digest), S_OK);
+  EXPECT_EQ(std::string(reinterpret_cast<char*>(digest), 16), std::string(16, 'a'));
+  delete[] digest;
+  std::filesystem::remove(name);
+  std::filesystem::create_directory(name);
+  EXPECT_EQ(IniSidecar::Read(name, &digest), E_FAIL);
+}
+
+TEST(Sidecar, IsWrittenWholeWithItsModeAndNothingBesideIt) {
+  TempDir dir;
+  std::string name = dir / "x.vl5";
+  ScopedUmask strict(077);
+  auto* first = reinterpret_cast<const unsigned char*>("0123456789abcdef");
+  EXPECT_EQ(IniSidecar::Write(name, first, true), S_OK);
+  EXPECT_EQ(ReadBytes(name), "0123456789abcdef");
+  EXPECT_EQ(ModeOf(name), 0777);
+  WriteBytes(name, std::string(40, 'x'));
+  EXPECT_EQ(IniSidecar::Write(name, IniSidecar::kInvalidMark, false), S_OK);
+  EXPECT_EQ(ReadBytes(name), "0000000000000000");
+  WriteBytes(name, "short");
+  EXPECT_EQ(IniSidecar::Write(name, first, false), S_OK);
+  EXPECT_EQ(ReadBytes(name), "0123456789abcdef");
+  EXPECT_FALSE(Exists(name + ".TMP"));
+}
+
+TEST(Sidecar, IsNotWrittenThroughALinkNorOverALeftover) {
+  TempDir dir;
+  WriteBytes(dir / "victim", "precious");
+  ASSERT_EQ(symlink((dir / "victim").c_str(), (dir / "x.vl5").c_str()), 0);
+  EXPECT_EQ(IniSidecar::Write(dir / "x.vl5", IniSidecar::kInvalidMark, false), E_FAIL);
+  EXPECT_EQ(ReadBytes(dir / "victim"), "precious");
+  ASSERT_EQ(symlink((dir / "victim").c_str(), (dir / "y.vl5.TMP").c_str()), 0);
+  EXPECT_EQ(IniSidecar::Write(dir / "y.vl5", IniSidecar::kInvalidMark, false), S_OK);
+  EXPECT_EQ(ReadBytes(dir / "victim"), "precious");
+  EXPECT_EQ(ReadBytes(dir / "y.vl5"), "0000000000000000");
+}
+
+}  // namespace
