@@ -7,12 +7,10 @@
 #include <unistd.h>
 
 #include <filesystem>
-#include <fstream>
-#include <map>
-#include <set>
 
 #include "tests/e2e/Start.h"
 #include "tests/support/MemoryLimit.h"
+#include "tests/support/Tracing.h"
 
 namespace vlt::test {
 namespace {
@@ -43,110 +41,6 @@ __attribute__((constructor)) void ActAsClient() {
   if (const char* what = getenv(kSaveVariable)) _exit(SaveOnce(what));
 }
 
-// A call of the trace: which of its name, from 1.
-struct Call {
-  std::string name;
-  int when;
-  std::string text;
-};
-
-bool IsAboutMemory(const std::string& name) {
-  static const std::set<std::string> names = {"brk",      "mmap",    "mmap2", "munmap",    "mremap",
-                                              "mprotect", "madvise", "futex", "exit_group"};
-  return names.count(name) != 0;
-}
-
-// "openat(AT_FDCWD, ..." gives "openat".
-std::string NameIn(const std::string& line) {
-  size_t begin = line.find_first_not_of("0123456789 ");
-  size_t end = line.find('(', begin);
-  if (begin == std::string::npos || end == std::string::npos) return "";
-  std::string name = line.substr(begin, end - begin);
-  return name.find_first_not_of("abcdefghijklmnopqrstuvwxyz0123456789_") == std::string::npos ? name
-                                                                                              : "";
-}
-
-class Tracing {
- public:
-  // `variables` go to the traced program; leak checks do not work under a tracer.
-  Tracing(std::vector<std::string> program, Environment variables)
-      : m_program(std::move(program)), m_variables(std::move(variables)) {
-    m_variables.push_back({"ASAN_OPTIONS", "detect_leaks=0:allocator_may_return_null=1"});
-  }
-
-  // Why the machine cannot do this; empty if it can.
-  static std::string Missing() {
-    ProgramResult result = RunProgram({"strace", "-o", "/dev/null", "true"});
-    if (result.exitCode == 127) return "strace is not installed";
-    return result.exitCode == 0 ? "" : "strace may not trace here: " + result.err;
-  }
-
-  // The calls from the first line with `from` to the last with `to`.
-  std::vector<Call> record(const std::string& from, const std::string& to) const {
-    TempDir dir;
-    EXPECT_EQ(run({"-o", dir / "log", "-s", "300"}).exitCode, 0);
-    std::ifstream in(dir / "log");
-    std::vector<Call> calls;
-    std::map<std::string, int> seen;
-    bool inside = false;
-    size_t last = 0;
-    for (std::string line; std::getline(in, line);) {
-      std::string name = NameIn(line);
-      if (name.empty()) continue;
-      int when = ++seen[name];
-      if (line.find(from) != std::string::npos) inside = true;
-      if (inside && !IsAboutMemory(name)) calls.push_back({name, when, line});
-      if (inside && line.find(to) != std::string::npos) last = calls.size();
-    }
-    calls.resize(last);
-    return calls;
-  }
-
-  // Runs the program anew and kills it on its way into the call. 128 + SIGKILL if it met it.
-  int killAt(const Call& call) const {
-    return run({"-o", "/dev/null", "-e", "trace=" + call.name, "-e",
-                "inject=" + call.name + ":signal=KILL:when=" + std::to_string(call.when)})
-        .exitCode;
-  }
-
- private:
-  ProgramResult run(const std::vector<std::string>& options) const {
-    std::vector<std::string> argv = {"strace", "-f", "-qq"};
-    argv.insert(argv.end(), options.begin(), options.end());
-    argv.insert(argv.end(), m_program.begin(), m_program.end());
-    return RunProgram(argv, m_variables);
-  }
-
-  std::vector<std::string> m_program;
-  Environment m_variables;
-};
-
-// What a series of kills came to.
-struct Tally {
-  int kills = 0, old = 0, fresh = 0, lost = 0, setAside = 0, refused = 0;
-
-  void print(const char* what) const {
-    printf(
-        "%s: %d kills; %d old contents, %d new contents, %d lost values, %d files set aside, "
-        "%d starts refused\n",
-        what, kills, old, fresh, lost, setAside, refused);
-  }
-  void expectNoLoss() const {
-    EXPECT_EQ(lost, 0);
-    EXPECT_EQ(setAside, 0);
-    EXPECT_EQ(refused, 0);
-    EXPECT_EQ(old + fresh, kills);
-  }
-};
-
-int FilesSetAside(const Installation& i) {
-  int count = 0;
-  for (const auto& entry : std::filesystem::recursive_directory_iterator(i.root())) {
-    if (entry.path().extension() == ".bad") ++count;
-  }
-  return count;
-}
-
 // Exit codes of the start that follows a kill.
 enum After { kOld = 10, kNew = 11, kLost = 12, kRefused = 13 };
 
@@ -156,7 +50,7 @@ void Count(Tally* tally, int code, const Installation& i, const Call& call) {
   if (code == kNew) ++tally->fresh;
   if (code == kLost) ++tally->lost;
   if (code != kOld && code != kNew && code != kLost) ++tally->refused;
-  int setAside = FilesSetAside(i);
+  int setAside = FilesSetAside(i.root());
   tally->setAside += setAside;
   EXPECT_TRUE((code == kOld || code == kNew) && setAside == 0)
       << "killed at " << call.text << ": the next start ends with " << code;

@@ -22,6 +22,11 @@ inline int FailedExpectations() {
   return failed;
 }
 
+// True if something that this process has allocated can be reached no more; AddressSanitizer knows.
+inline bool Leaks() {
+  return __lsan_do_recoverable_leak_check && __lsan_do_recoverable_leak_check();
+}
+
 // Runs expectations in a forked process, for what a process does only once: look up its
 // installation, make its registrar. Returns 0 if all of them held and nothing leaked, 1 if not, 98
 // for a leak, and Child's codes otherwise.
@@ -32,7 +37,7 @@ inline int InChild(const std::function<void()>& body, int deadlineMs = kDeadline
     int before = FailedExpectations();
     body();
     if (FailedExpectations() != before) return 1;
-    return __lsan_do_recoverable_leak_check && __lsan_do_recoverable_leak_check() ? 98 : 0;
+    return Leaks() ? 98 : 0;
   });
   return child.wait(deadlineMs);
 }
