@@ -27,7 +27,7 @@ GUID GuidField(const String& text, unsigned begin, unsigned end) {
 // of nowhere.
 Vector<GUID> ClassFields(const String& text, long n, unsigned* next) {
   Vector<GUID> classes;
-  while (n-- > 0 && *next != String::npos) {
+  for (; n > 0 && *next != String::npos; --n) {
     unsigned begin = *next + 1;
     *next = text.find(kSeparator, begin);
     classes.push_back(GuidField(text, begin, *next == String::npos ? text.length() : *next));

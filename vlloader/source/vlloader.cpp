@@ -64,8 +64,8 @@ const char* NullIfEmpty(const std::string& text) { return text.empty() ? nullptr
 
 void PathInit(Loader& l) {
   if (l.pathInitialized) return;
-  l.pathInitialized = true;
   l.path.assign(vlLookUpInstallDirectory());
+  l.pathInitialized = true;
 }
 
 template <class Function>
@@ -90,8 +90,8 @@ void Init(Loader& l) {
     ++l.loads;
     return;
   }
-  l.loadTried = true;
   PathInit(l);
+  l.loadTried = true;
   if (l.path.empty()) {
     puts("Failed to get kor install path.");
     return;
