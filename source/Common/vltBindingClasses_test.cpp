@@ -82,6 +82,7 @@ TEST(BindingClasses, TextsAndTheirTables) {
                       // Fewer classes than told.
                       {p + ":5:" + q + ":" + r, {{1, {2, 3}}}},
                       {p + ":2000000000:" + q, {{1, {2}}}},
+                      {p + ":-99999999999999999999:" + q + ":0", {{1, {}}, {2, {}}}},
                       {p + ":99999999999999999999:" + q, {{1, {2}}}}};
   for (const Row& row : rows) ExpectTable(row);
 }
