@@ -1,5 +1,11 @@
 #include "source/Common/vltFileSecurity.h"
 
+#include <stdio.h>
+#include <stdlib.h>
+#include <unistd.h>
+
+#include <string>
+
 #include "source/Common/Posix/ChangeMode.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/DateTime.h"
@@ -25,6 +31,22 @@ void SecureEntries(const String& directory, int mode, HRESULT* status) {
   }
 }
 
+// Made aside, opened up, and put in its place: a process that is killed between making a directory and
+// opening it up would leave one that no other user can ever enter. False, and nothing left, where that
+// cannot be done; the plain way then tells why, or makes the levels above it.
+bool MakeOpenDirectory(const String& directory) {
+  std::string target = AnsiString(directory).c_str();
+  target.erase(target.find_last_not_of('/') + 1);
+  std::string aside = target + ".XXXXXX";
+  if (target[0] != '/' || !mkdtemp(aside.data())) return false;
+  if (vlChangeModeNoFollow(aside.c_str(), kSharedMode) == 0 &&
+      rename(aside.c_str(), target.c_str()) == 0) {
+    return true;
+  }
+  rmdir(aside.c_str());
+  return false;
+}
+
 }  // namespace
 
 HRESULT vltSetFileSecurityImpl(const String& path, int mode, bool recursive) {
@@ -45,7 +67,7 @@ HRESULT vlrSetFileSecurity(const String& path, int mode) {
 }
 
 HRESULT vltMakeSharedDirectory(const String& directory) {
-  if (path::IsDirectory(directory.c_str())) return S_OK;
+  if (path::IsDirectory(directory.c_str()) || MakeOpenDirectory(directory)) return S_OK;
   try {
     path::CreateDir(directory.c_str());
   } catch (const zt::fnd::exception::ObjectAlreadyExists&) {

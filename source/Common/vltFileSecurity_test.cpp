@@ -81,6 +81,9 @@ TEST(FileSecurity, SharedDirectoryIsMadeOrRaises) {
   WriteBytes(dir / "file", "");
   EXPECT_THROW(vltMakeSharedDirectory(zt::fnd::String((dir / "file/").c_str())),
                zt::fnd::exception::Exception);
+  // Neither way leaves anything else behind.
+  EXPECT_EQ(RunProgram({"ls", "-A", dir.path()}).out, "a\nfile\n");
+  EXPECT_EQ(RunProgram({"ls", "-A", dir / "a"}).out, "b\n");
 }
 
 }  // namespace
