@@ -6,6 +6,7 @@
 #include <atomic>
 #include <mutex>
 #include <new>
+#include <set>
 #include <string>
 
 #include "source/Utilities/vltutils.h"
@@ -28,8 +29,16 @@ constinit std::atomic<bool> simulateMemoryAllocationFailure{false};
 constinit std::atomic<bool> simulateMemoryAllocationFailureAndThrow{false};
 constinit std::atomic<bool> causeMemoryAllocationFailure{false};
 constinit std::atomic<uint32_t> hangTimeInMSecs{kForever};
-// Replaced whole and never freed, since another thread may be comparing with the old one.
+// Replaced whole, since another thread may be comparing with the old one.
 constinit std::atomic<const char*> currentHookName{""};
+
+// A copy that stays for good; one for each name, as a process may refresh as often as it likes.
+const char* Kept(const std::string& name) {
+  static auto* names = new std::set<std::string>;
+  static std::mutex lock;
+  std::lock_guard hold(lock);
+  return names->insert(name).first->c_str();
+}
 
 bool IsTrue(const CvlIniMgr& ini, const char* key) {
   std::string value;
@@ -50,9 +59,7 @@ uint32_t HangTime(const CvlIniMgr& ini) {
 void Arm(const CvlIniMgr& ini) {
   std::string name;
   if (ini.GetItem("Hook", "Name", &name) < 0) return;
-  char* copy = strdup(name.c_str());
-  if (!copy) throw std::bad_alloc();
-  currentHookName = copy;
+  currentHookName = Kept(name);
   ArmIfTrue(ini, "Crash", causeCrash);
   if (IsTrue(ini, "Hang")) {
     hangTimeInMSecs = HangTime(ini);

@@ -1,5 +1,5 @@
 // events: the named events of the machine, read from their files without disturbing them.
-#include <dirent.h>
+#include <fcntl.h>
 #include <stdio.h>
 #include <stdlib.h>
 #include <sys/stat.h>
@@ -7,13 +7,12 @@
 
 #include <algorithm>
 #include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <map>
 
 #include "tools/vltctl-admin/Reading.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/EventStateFile.h"
+#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 
 namespace admin {
@@ -24,25 +23,45 @@ using zt::fnd::osdep::EventPlace;
 using zt::fnd::osdep::SetHeader;
 
 constexpr const char* kUnlinked = " (deleted)";
+using zt::fnd::osdep::kStateFileSize;
+using zt::fnd::osdep::ScopedFd;
 
+// As much of a file as an event's can have. Anybody may put anything there: what is no regular file is
+// not waited for, and a large one not read.
 std::string Bytes(const fs::path& file) {
-  std::ifstream in(file, std::ios::binary);
-  return std::string(std::istreambuf_iterator<char>(in), {});
+  ScopedFd fd(open(file.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+  struct stat info;
+  if (!fd.valid() || fstat(fd.get(), &info) != 0 || !S_ISREG(info.st_mode)) return "";
+  char block[kStateFileSize];
+  ssize_t got = read(fd.get(), block, sizeof block);
+  return got > 0 ? std::string(block, static_cast<size_t>(got)) : "";
 }
 
-// Which processes have a file below the directory open: path, as the kernel tells it, to process ids.
-std::map<std::string, std::vector<int>> Holders(const std::string& directory) {
-  std::map<std::string, std::vector<int>> holders;
+// Files below a directory, by their path as the kernel tells it, and who has them open.
+using FileHolders = std::map<std::string, std::vector<int>>;
+struct Holders {
+  FileHolders named, unlinked;
+};
+
+void AddOpenFile(const fs::path& fd, const std::string& directory, int pid, Holders* holders) {
+  std::error_code hidden;  // Other users' processes do not show their files.
+  std::string target = fs::read_symlink(fd, hidden).string();
+  struct stat info;
+  if (hidden || !target.starts_with(directory) || stat(fd.c_str(), &info) != 0) return;
+  auto& pids = (info.st_nlink == 0 ? holders->unlinked : holders->named)[target];
+  if (pids.empty() || pids.back() != pid) pids.push_back(pid);
+}
+
+Holders HoldersBelow(const std::string& directory) {
+  Holders holders;
   std::error_code ignored;
   for (const auto& process : fs::directory_iterator("/proc", ignored)) {
     int pid = atoi(process.path().filename().c_str());
     if (pid <= 0) continue;
-    std::error_code hidden;  // Other users' processes do not show their files.
-    for (const auto& fd : fs::directory_iterator(process.path() / "fd", hidden)) {
-      std::string target = fs::read_symlink(fd.path(), hidden).string();
-      if (hidden || !target.starts_with(directory)) continue;
-      auto& pids = holders[target];
-      if (pids.empty() || pids.back() != pid) pids.push_back(pid);
+    std::error_code hidden;
+    for (fs::directory_iterator fd(process.path() / "fd", hidden), end; !hidden && fd != end;
+         fd.increment(hidden)) {
+      AddOpenFile(fd->path(), directory, pid, &holders);
     }
   }
   return holders;
@@ -85,19 +104,21 @@ std::string DescribeEvent(const std::string& bytes) {
 int Events(bool json) {
   std::string base = zt::fnd::AnsiString(zt::fnd::osdep::GetSharedUnixBase()).c_str();
   std::string directory = base + "/namedEvent/";
-  auto holders = Holders(directory);
+  Holders holders = HoldersBelow(directory);
   std::vector<Row> rows;
   std::error_code missing;
-  for (const auto& entry : fs::directory_iterator(directory, missing)) {
-    std::string name = entry.path().filename();
-    if (!entry.is_regular_file(missing)) continue;
-    std::string bytes = Bytes(entry.path());
+  for (fs::directory_iterator entry(directory, missing), end; !missing && entry != end;
+       entry.increment(missing)) {
+    std::error_code gone;
+    std::string name = entry->path().filename();
+    if (!fs::is_regular_file(entry->symlink_status(gone))) continue;
+    std::string bytes = Bytes(entry->path());
     rows.push_back({name, IsSetFile(name) ? DescribeSet(bytes) : DescribeEvent(bytes),
-                    "held by " + List(holders[directory + name])});
+                    "held by " + List(holders.named[directory + name])});
   }
-  for (const auto& [path, pids] : holders) {
-    if (!path.ends_with(kUnlinked)) continue;
+  for (const auto& [path, pids] : holders.unlinked) {
     std::string name = path.substr(directory.size());
+    if (!name.ends_with(kUnlinked)) name += kUnlinked;  // the kernel says so itself
     rows.push_back({name, "its file is gone", "held by " + List(pids)});
   }
   std::sort(rows.begin(), rows.end(), [](const Row& a, const Row& b) { return a.name < b.name; });

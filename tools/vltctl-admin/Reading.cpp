@@ -131,6 +131,26 @@ void PrintJson(const nlohmann::json& value) {
   puts(value.dump(2, ' ', false, nlohmann::json::error_handler_t::replace).c_str());
 }
 
+namespace {
+
+// Control characters as \xNN: names and values come from files that others write, and a terminal obeys
+// what it is sent.
+std::string Shown(const std::string& text) {
+  std::string out;
+  for (unsigned char c : text) {
+    char code[8];
+    snprintf(code, sizeof code, "\\x%02X", c);
+    if (c < 0x20 || c == 0x7F) {
+      out += code;
+    } else {
+      out += static_cast<char>(c);
+    }
+  }
+  return out;
+}
+
+}  // namespace
+
 void Print(const std::vector<Row>& rows, bool json) {
   if (json) {
     nlohmann::json out = nlohmann::json::object();
@@ -139,12 +159,12 @@ void Print(const std::vector<Row>& rows, bool json) {
   }
   size_t names = 0, values = 0;
   for (const Row& row : rows) {
-    names = std::max(names, row.name.size());
-    values = std::max(values, row.value.size());
+    names = std::max(names, Shown(row.name).size());
+    values = std::max(values, Shown(row.value).size());
   }
   for (const Row& row : rows) {
-    printf("%-*s  %-*s  %s\n", static_cast<int>(names), row.name.c_str(), static_cast<int>(values),
-           row.value.c_str(), row.origin.c_str());
+    printf("%-*s  %-*s  %s\n", static_cast<int>(names), Shown(row.name).c_str(),
+           static_cast<int>(values), Shown(row.value).c_str(), Shown(row.origin).c_str());
   }
 }
 

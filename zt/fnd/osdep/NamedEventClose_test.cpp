@@ -146,7 +146,7 @@ TEST(NamedEventFiles, CloseGivesBackOnlyWhatIsItsOwn) {
 }
 
 TEST(NamedEventFiles, SetThatAnotherUserRemovesLastStaysForTheNext) {
-  if (geteuid() != 0) GTEST_SKIP() << "SKIPPED: needs two users, so the superuser";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   EventPlace place;
   auto event = Open("name");
   int id = place.setOf(1);
@@ -170,7 +170,7 @@ TEST(NamedEventFiles, SetThatAnotherUserRemovesLastStaysForTheNext) {
 }
 
 TEST(NamedEventFiles, EventsOfAnotherUserAreJoined) {
-  if (geteuid() != 0) GTEST_SKIP() << "SKIPPED: needs two users, so the superuser";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   EventPlace place;
   Keeper other([] {
     umask(0077);

@@ -82,9 +82,9 @@ std::size_t CountFiles(const std::string& dir) {
     }                                                                 \
   } while (false)
 
-#define SKIP_UNLESS(allowed)                                                              \
-  if ((allowed) == Allowed::No) {                                                         \
-    GTEST_SKIP() << "SKIPPED: no right to mount and to make name spaces on this machine"; \
+#define SKIP_UNLESS(allowed)                                                                 \
+  if ((allowed) == Allowed::No) {                                                            \
+    GTEST_SKIP() << "NOT TESTED: no right to mount and to make name spaces on this machine"; \
   }
 
 bool SetSemaphoreLimits(const char* limits) {
@@ -257,7 +257,7 @@ TEST(NamedEventLimits, PlaceThatTurnsReadOnlyUnderAnEventLetsItClose) {
 }
 
 TEST(NamedEventLimits, PlaceThatMayNotBeWrittenIsEACCES) {
-  if (geteuid() != 0) GTEST_SKIP() << "SKIPPED: needs two users, so the superuser";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   EventPlace place;
   Open("warm up");
   std::string dir = std::filesystem::path(place.file("x")).parent_path();
@@ -273,7 +273,7 @@ TEST(NamedEventLimits, PlaceThatMayNotBeWrittenIsEACCES) {
 
 // The event's own file can be opened, but no state file made, each after three attempts.
 TEST(NamedEventLimits, StateFilesThatMayNotBeMadeAreENOLCK) {
-  if (geteuid() != 0) GTEST_SKIP() << "SKIPPED: needs two users, so the superuser";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   EventPlace place;
   Open("warm up");
   std::string dir = std::filesystem::path(place.file("x")).parent_path();
