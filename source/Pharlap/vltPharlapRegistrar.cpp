@@ -152,6 +152,8 @@ HRESULT CvltPharlapRegistrar::GetChecksumForCacheFile(unsigned char** digest) {
   *digest = nullptr;
   try {
     return IniSidecar::Read(sidecarName(), digest);
+  } catch (const std::bad_alloc&) {
+    throw;  // Says nothing of the sidecar: the database must not be set aside for it.
   } catch (const std::exception&) {
     return E_FAIL;  // A sidecar that cannot be read for any reason is an unusable one.
   }
@@ -228,6 +230,13 @@ HRESULT CvltPharlapRegistrar::GetSchemaVersion(unsigned int* version) {
   return S_OK;
 }
 
+// A name of our own is not set only where memory is out. Then nothing is saved, or the caller would be
+// told that it was.
+HRESULT CvltPharlapRegistrar::setAndSave(const char* key, const char* value, bool quote) {
+  if (m_registrationIni->SetItem(kGlobalSection, key, value, quote) < 0) return E_OUTOFMEMORY;
+  return SaveChanges();
+}
+
 HRESULT CvltPharlapRegistrar::SetSchemaVersion(unsigned int version) {
   std::lock_guard hold(m_iniLock);
   if (!m_registrationIni) return E_FAIL;
@@ -236,8 +245,7 @@ HRESULT CvltPharlapRegistrar::SetSchemaVersion(unsigned int version) {
       !present.empty() && Number(present) == version) {
     return S_OK;
   }
-  m_registrationIni->SetItem(kGlobalSection, kSchemaVersion, Decimal(version).c_str(), false);
-  return SaveChanges();
+  return setAndSave(kSchemaVersion, Decimal(version).c_str(), false);
 }
 
 HRESULT CvltPharlapRegistrar::GetStorageServerCacheSize(unsigned int* sizeBytes) {
@@ -250,8 +258,7 @@ HRESULT CvltPharlapRegistrar::GetStorageServerCacheSize(unsigned int* sizeBytes)
 HRESULT CvltPharlapRegistrar::SetStorageServerCacheSize(unsigned int sizeBytes) {
   std::lock_guard hold(m_iniLock);
   if (!m_registrationIni) return E_FAIL;
-  m_registrationIni->SetItem(kGlobalSection, kCacheSize, Decimal(sizeBytes).c_str(), false);
-  return SaveChanges();
+  return setAndSave(kCacheSize, Decimal(sizeBytes).c_str(), false);
 }
 
 HRESULT CvltPharlapRegistrar::dataDirectory(String* directory) {
@@ -290,8 +297,7 @@ HRESULT CvltPharlapRegistrar::SetConfigurationPath(const wchar_t* path) {
     dataDirectory(&value);
     value += path;
   }
-  m_registrationIni->SetItem(kGlobalSection, kConfigFile, Narrow(value).c_str(), true);
-  return SaveChanges();
+  return setAndSave(kConfigFile, Narrow(value).c_str(), true);
 }
 
 // ---- GUID texts

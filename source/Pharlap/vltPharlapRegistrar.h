@@ -141,6 +141,7 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   void registerBuiltInDictionary();
   void readComponents();
   HRESULT dataDirectory(zt::fnd::String* directory);
+  HRESULT setAndSave(const char* key, const char* value, bool quote);
   bool isRegistered(const std::string& file, uint32_t low, uint32_t high);
   void eraseComponentsOf(const std::string& file);
   void mergeItem(CvlIniMgr& fragment, const zt::fnd::String& installDirectory, const char* file,

@@ -69,6 +69,14 @@ HRESULT WithPreparedJar(String& dataDir, Use use) {
   return WithJar(jar.get(), [&](CvlIniMgr& ini) { return use(jar.get(), ini); });
 }
 
+// For names of the library's own, which are not set only where memory is out. Then nothing is saved, or
+// the caller would be told that it was.
+HRESULT SetAndSave(const wchar_t* jar, CvlIniMgr& ini, const char* section, const char* item,
+                   const std::string& value) {
+  if (ini.SetItem(section, item, value.c_str(), false) < 0) return E_OUTOFMEMORY;
+  return VltjarSaveChanges(jar, &ini);
+}
+
 }  // namespace
 
 String vltjar::ExistingDataDirectory() {
@@ -103,8 +111,7 @@ HRESULT vltSetServerCookie(int cookie) {
   std::unique_ptr<wchar_t[]> jar(GetJarFilePath());
   if (!jar) return E_FAIL;
   return WithJar(jar.get(), [&](CvlIniMgr& ini) {
-    ini.SetItem(kCookieSection, kLastServerCookie, std::to_string(cookie).c_str(), false);
-    return VltjarSaveChanges(jar.get(), &ini);
+    return SetAndSave(jar.get(), ini, kCookieSection, kLastServerCookie, std::to_string(cookie));
   });
 }
 
@@ -114,8 +121,7 @@ HRESULT vltGetServerCookieFromFile(int* out, String& dataDir) {
     HRESULT result = ini.GetItem(kCookieSection, kLastServerCookie, &value);
     *out = result >= 0 ? atoi(value.c_str()) : 0;
     if (result >= 0) return result;
-    ini.SetItem(kCookieSection, kLastServerCookie, "0", false);
-    return VltjarSaveChanges(jar, &ini);
+    return SetAndSave(jar, ini, kCookieSection, kLastServerCookie, "0");
   });
 }
 
@@ -135,8 +141,8 @@ HRESULT vltGetServerIdentityFromFile(GUID* out, String& dataDir) {
     }
     if (vltCreateGuid2(out) < 0) return result;
     TaskMem<wchar_t> text(vltGuidToString2(*out));
-    ini.SetItem(kServerSection, kServerIdentity, Narrow(text.get()).c_str(), false);
-    return VltjarSaveChanges(jar, &ini);
+    if (!text) return E_OUTOFMEMORY;  // Never an empty identity, which would stay.
+    return SetAndSave(jar, ini, kServerSection, kServerIdentity, Narrow(text.get()));
   });
 }
 

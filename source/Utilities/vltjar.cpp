@@ -54,7 +54,7 @@ HRESULT VltjarOpenIniWithValidation(const wchar_t* file, CvlIniMgr** out) {
   std::string narrow = Narrow(file);
   CvlIniMgr* created = nullptr;
   try {
-    if (status < 0) VltjarDeleteIniFile(file);
+    if (status < 0 && status != E_OUTOFMEMORY) VltjarDeleteIniFile(file);
     created = Create(vlt::hook::kJarOpen, narrow, digest.get());
   } catch (...) {
     // Whatever it was - a digest that differs, a file that has just been set aside, a shortage that
@@ -118,6 +118,8 @@ HRESULT VltjarGetChecksumForCacheFile(const wchar_t* file, unsigned char** diges
   *digest = nullptr;
   try {
     return IniSidecar::Read(SidecarOf(file), digest);
+  } catch (const std::bad_alloc&) {
+    return E_OUTOFMEMORY;  // Says nothing of the sidecar: the file must not be set aside for it.
   } catch (...) {
     return E_FAIL;  // A sidecar that cannot be read for any reason is an unusable one.
   }

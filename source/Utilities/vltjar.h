@@ -38,7 +38,8 @@ HRESULT VltjarSaveChanges(const wchar_t* path, CvlIniMgr* ini);
 // Sets the file aside and removes its sidecar. E_FAIL if the system refuses, E_UNEXPECTED otherwise.
 HRESULT VltjarDeleteIniFile(const wchar_t* path);
 bool VltjarChecksumFileExists(const wchar_t* path);
-// S_OK and a new[] digest; S_FALSE if there is none; E_FAIL if it is short.
+// S_OK and a new[] digest; S_FALSE if there is none; E_FAIL if it is short. E_OUTOFMEMORY, which says
+// nothing of the sidecar: an opening that meets it sets nothing aside, and takes the file as it is.
 HRESULT VltjarGetChecksumForCacheFile(const wchar_t* path, unsigned char** digest);
 HRESULT VltjarSetChecksumForCacheFile(const wchar_t* path, const unsigned char* digest);
 

@@ -6,6 +6,7 @@
 #include <poll.h>
 #include <signal.h>
 #include <string.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -19,7 +20,7 @@ namespace vltctl {
 namespace {
 
 constexpr auto kTimeLimit = std::chrono::seconds(10);
-constexpr char kMessage = 'M', kNote = 'N';
+constexpr char kMessage = 'M', kNote = 'N', kEnd = 'E';
 
 [[noreturn]] void Fail(const char* what) {
   throw std::system_error(errno, std::generic_category(), what);
@@ -77,7 +78,8 @@ void SendMessages(int fd, IEnumString* list) {
   }
 }
 
-// The child: exit code 0 for a sound component, 1 for one with problems.
+// The child: exit code 0 for a sound component, 1 for one with problems. Its last word is kEnd, without
+// which the code is somebody else's: a library may end the process with any code while it is loaded.
 int CheckInside(const Component& component, int fd) {
   IEnumString* list = nullptr;
   HRESULT result = vltCheckComponent(ParseGuid(component.guid), &list);
@@ -86,10 +88,17 @@ int CheckInside(const Component& component, int fd) {
     list->Release();
   }
   if (result < 0 && component.type != "dictionary") SendLoadersWords(fd, component.file);
+  Send(fd, kEnd, "");
   return result < 0 ? 1 : 0;
 }
 
-// What came through the pipe until its end; false past the time limit.
+bool HasEnded(const std::string& text) {
+  const char end[] = {kEnd, '\n', 0};
+  return text == end || text.ends_with(std::string("\n") + end);
+}
+
+// What came through the pipe until its end, or the child's last word: processes that a library has
+// started keep the pipe open. False past the time limit.
 bool ReadUntilEnd(int fd, std::string* text) {
   auto end = std::chrono::steady_clock::now() + kTimeLimit;
   char block[4096];
@@ -102,6 +111,7 @@ bool ReadUntilEnd(int fd, std::string* text) {
     if (got < 0 && errno == EINTR) continue;
     if (got <= 0) return true;
     text->append(block, static_cast<size_t>(got));
+    if (HasEnded(*text)) return true;
   }
 }
 
@@ -109,48 +119,65 @@ void Sort(const std::string& text, Finding* finding) {
   for (size_t begin = 0; begin < text.size();) {
     size_t end = text.find('\n', begin);
     if (end == std::string::npos) end = text.size();
-    auto& lines = text[begin] == kMessage ? finding->messages : finding->notes;
-    lines.push_back(text.substr(begin + 1, end - begin - 1));
+    std::string line = text.substr(begin + 1, end - begin - 1);
+    if (text[begin] == kMessage) finding->messages.push_back(line);
+    if (text[begin] == kNote) finding->notes.push_back(line);
     begin = end + 1;
   }
+}
+
+// In a process group of its own, so that what a library starts can be ended with it.
+pid_t StartChild(const Component& component, int (&pipeEnds)[2]) {
+  if (pipe2(pipeEnds, O_CLOEXEC) != 0) Fail("pipe");
+  fflush(nullptr);
+  pid_t parent = getpid();
+  pid_t child = fork();
+  if (child < 0) Fail("fork");
+  if (child > 0) {
+    setpgid(child, child);  // here too: whoever comes first
+    close(pipeEnds[1]);
+    return child;
+  }
+  setpgid(0, 0);
+  prctl(PR_SET_PDEATHSIG, SIGKILL);  // what is typed at the terminal no longer reaches it
+  if (getppid() != parent) _exit(1);
+  close(pipeEnds[0]);
+  // What the library prints while it is loaded is not ours.
+  int null = open("/dev/null", O_RDWR | O_CLOEXEC);
+  dup2(null, 1);
+  dup2(null, 2);
+  _exit(CheckInside(component, pipeEnds[1]));
+}
+
+// What became of the child, where that is worth a word.
+std::string FateOf(int status, bool inTime, bool ended) {
+  if (!inTime) return "the library did not load within 10 s; its process was killed";
+  if (WIFSIGNALED(status) && !ended) {
+    return std::string("the process that loaded the library died: ") + strsignal(WTERMSIG(status));
+  }
+  if (!ended) return "the library ended its process with " + std::to_string(WEXITSTATUS(status));
+  return "";
 }
 
 Finding CheckOne(const Component& component) {
   Finding finding;
   finding.component = component;
   int pipeEnds[2];
-  if (pipe2(pipeEnds, O_CLOEXEC) != 0) Fail("pipe");
-  fflush(nullptr);
-  pid_t child = fork();
-  if (child < 0) Fail("fork");
-  if (child == 0) {
-    close(pipeEnds[0]);
-    // What the library prints while it is loaded is not ours.
-    int null = open("/dev/null", O_RDWR | O_CLOEXEC);
-    dup2(null, 1);
-    dup2(null, 2);
-    _exit(CheckInside(component, pipeEnds[1]));
-  }
-  close(pipeEnds[1]);
+  pid_t child = StartChild(component, pipeEnds);
   std::string text;
   bool inTime = ReadUntilEnd(pipeEnds[0], &text);
   close(pipeEnds[0]);
+  bool ended = HasEnded(text);
   if (!inTime) kill(child, SIGKILL);
   int status = 0;
   while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
   }
+  kill(-child, SIGKILL);  // what the library has started and left behind
   Sort(text, &finding);
-  if (!inTime) {
-    finding.notes.push_back("the library did not load within 10 s; its process was killed");
-  } else if (WIFSIGNALED(status)) {
-    finding.notes.push_back(std::string("the process that loaded the library died: ") +
-                            strsignal(WTERMSIG(status)));
-  } else if (WEXITSTATUS(status) > 1) {
-    finding.notes.push_back("the library ended its process with " +
-                            std::to_string(WEXITSTATUS(status)));
-  }
+  std::string fate = FateOf(status, inTime, ended);
+  if (!fate.empty()) finding.notes.push_back(fate);
   finding.sound =
-      inTime && WIFEXITED(status) && WEXITSTATUS(status) == 0 && finding.messages.empty();
+      ended && WIFEXITED(status) && WEXITSTATUS(status) == 0 && finding.messages.empty();
   return finding;
 }
 

@@ -1,6 +1,8 @@
+#include <errno.h>
 #include <stdlib.h>
 
 #include <memory>
+#include <new>
 #include <vector>
 
 #include "vlloader/source/Preference.h"
@@ -49,9 +51,14 @@ struct Dispose {
 std::optional<std::string> ReadItem(const std::string& file, const std::string& key) {
   constexpr int32_t kQuotesOfBothKinds = 2 | 4;
   std::unique_ptr<IniStructForwardReferenceTag, Dispose> document(IniNew(0));
-  if (!document) return std::nullopt;
+  if (!document) throw std::bad_alloc();
   IniSetReadOptions(document.get(), kQuotesOfBothKinds);
-  if (IniReadFromFile(document.get(), file.c_str()) < 0) return std::nullopt;
+  errno = 0;
+  int32_t status = IniReadFromFile(document.get(), file.c_str());
+  bool outOfMemory = status == kIniOutOfMemory || (status == kIniCannotOpen && errno == ENOMEM);
+  // Not "no value", which would lead a process to another installation for its whole life.
+  if (outOfMemory) throw std::bad_alloc();
+  if (status < 0) return std::nullopt;
   const char* value = nullptr;
   if (IniGetPointerToRawString(document.get(), "Preferences", key.c_str(), &value) != 1) {
     return std::nullopt;

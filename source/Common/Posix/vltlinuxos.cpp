@@ -9,6 +9,7 @@
 
 #include <atomic>
 #include <memory>
+#include <new>
 
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
@@ -42,8 +43,12 @@ unsigned ReadTraceFlags() {
   // Not fopen, which would wait for the other end of a pipe in the file's place.
   ScopedFd fd(zt::fnd::osdep::RetryEintr(
       [&] { return open(file.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY); }));
+  char buffer[256];  // outlives the stream
   std::unique_ptr<FILE, int (*)(FILE*)> in(fd.valid() ? fdopen(fd.get(), "r") : nullptr, fclose);
+  // The answer is kept, so that a passing want of memory must not become it.
+  if (fd.valid() && !in) throw std::bad_alloc();
   if (in) fd.release();
+  if (in) setvbuf(in.get(), buffer, _IOFBF, sizeof buffer);
   unsigned first = 0, second = 0;
   // A short file leaves its zeros.
   if (in && fscanf(in.get(), "%u %u", &first, &second) < 0) return 0;

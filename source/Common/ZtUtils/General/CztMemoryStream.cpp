@@ -60,6 +60,9 @@ HRESULT CztMemoryStream::growTo(uint64_t size) {
 
 HRESULT CztMemoryStream::resizeBlock(uint32_t capacity) {
   void* block = realloc(m_begin, capacity);
+  // A heap may refuse to shrink a block, which is then longer than it is taken for: taking back what was
+  // written does not fail for that.
+  if (!block && m_begin && capacity <= m_capacity) block = m_begin;
   if (!block) return E_FAIL;
   m_begin = static_cast<unsigned char*>(block);
   m_capacity = capacity;

@@ -61,6 +61,22 @@ TEST(SubStreamArea, NestedAreasAreCompleteInTheParents) {
   EXPECT_EQ(Contents(one.get()), inner);
 }
 
+// The same bytes on both word sizes.
+TEST(SubStreamArea, BytesOfNestedAreas) {
+  MemoryPtr stream = MemoryOf("o");
+  Made(Nested(Made(stream.get(), L"s", "i")).get(), L"d", "c");
+  EXPECT_EQ(stream->WriteSubStreamInfo(), S_OK);
+  EXPECT_EQ(Hexed(Contents(stream.get())),
+            "6F "
+            "00 01 00 00 00 00 00 00 00 00 00 00 00 01 00 00 00 "
+            "01 00 00 00 73 00 00 00 37 00 00 00 "
+            "69 "
+            "00 01 00 00 00 00 00 00 00 00 00 00 00 01 00 00 00 "
+            "01 00 00 00 64 00 00 00 01 00 00 00 63 "
+            "A1 BB 00 D3 D6 C3 CF 47 B7 52 CB 9F FD 8A BC CC 01 00 00 00 00 00 00 00 "
+            "A1 BB 00 D3 D6 C3 CF 47 B7 52 CB 9F FD 8A BC CC 01 00 00 00 00 00 00 00 ");
+}
+
 TEST(SubStreamArea, TheAreaStandsAtTheEndWhereverTheCursorIs) {
   MemoryPtr stream = MemoryOf("data");
   Made(stream.get(), L"a", "1");
@@ -262,6 +278,24 @@ TEST(SubStreamArea, EveryTruncationPointThrows) {
       EXPECT_TRUE(thrown == Thrown::Stream || thrown == Thrown::EndOfStream) << size;
     }
     EXPECT_EQ(Loading(whole), Thrown::Nothing);
+  }
+}
+
+// Which of the two exceptions, by the value that the cut goes through.
+TEST(SubStreamArea, EveryTruncationPointGivesItsException) {
+  const size_t lengthEnd = 17 + sizeof(unsigned long), nameEnd = lengthEnd + 4;
+  for (Order order : {Order::Little, Order::Big}) {
+    std::string area = Area({{L"a", "xyz"}}, 0, Width::Reader, order);
+    area.resize(area.size() - 24);
+    ASSERT_EQ(area.size(), nameEnd + 4 + 3);
+    for (size_t size = 0; size < area.size(); ++size) {
+      Thrown expected = Thrown::Stream;                     // no room for the header
+      if (size >= 13) expected = Thrown::EndOfStream;       // in the count
+      if (size >= 17) expected = Thrown::Stream;            // a count beyond the bytes
+      if (size >= nameEnd) expected = Thrown::EndOfStream;  // in the length of the data
+      if (size >= nameEnd + 4) expected = Thrown::Stream;   // in the data
+      EXPECT_EQ(Loading("data" + area.substr(0, size) + Trailer(4)), expected) << size;
+    }
   }
 }
 

@@ -1,0 +1,355 @@
+// The component check over a real tree of libraries that are missing, damaged or hostile: the exact
+// messages of the export, and what vltctl says of them and how it ends.
+#include <elf.h>
+#include <gtest/gtest.h>
+#include <string.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <filesystem>
+#include <fstream>
+#include <nlohmann/json.hpp>
+
+#include "tests/e2e/Start.h"
+
+namespace vlt::test {
+namespace {
+
+using nlohmann::json;
+using Messages = std::vector<std::string>;
+
+enum ExitCode { kGood = 0, kNotFound = 1, kDataUnusable = 3 };
+
+constexpr const char* kGoodEntry = "extern \"C\" int vltCreateObjectExpert() { return 0; }\n";
+
+// Compiles the text to a shared object of this word size, without the C library's start files.
+void Build(const std::string& file, const std::string& source,
+           const std::vector<std::string>& more = {}) {
+  TempDir dir;
+  WriteBytes(dir / "x.cpp", source);
+  std::vector<std::string> command = {
+      "c++", sizeof(void*) == 4 ? "-m32" : "-m64", "-shared", "-fPIC", "-o", file, dir / "x.cpp"};
+  command.insert(command.end(), more.begin(), more.end());
+  ProgramResult built = RunProgram(command);
+  ASSERT_EQ(built.exitCode, 0) << built.err;
+}
+
+// A library for the other word size: by the compiler, or, where it cannot, its head alone.
+void BuildForTheOtherWordSize(const std::string& file) {
+  TempDir dir;
+  WriteBytes(dir / "x.cpp", kGoodEntry);
+  ProgramResult built = RunProgram({"c++", sizeof(void*) == 4 ? "-m64" : "-m32", "-shared", "-fPIC",
+                                    "-nostdlib", "-o", file, dir / "x.cpp"});
+  if (built.exitCode == 0) return;
+  std::string head(64, '\0');
+  head.replace(0, 7,
+               {ELFMAG0, ELFMAG1, ELFMAG2, ELFMAG3, sizeof(void*) == 4 ? ELFCLASS64 : ELFCLASS32,
+                ELFDATA2LSB, EV_CURRENT});
+  WriteBytes(file, head);
+}
+
+// An installation whose object expert number n has its library at file(name).
+class Experts : public Installation {
+ public:
+  std::string file(const std::string& name) const { return root() + "/" + name + ".so"; }
+  // Registers the library, which need not be there.
+  std::string add(uint32_t n, const std::string& name) {
+    addBundle("Experts", name + ".vle",
+              "[KORComponents]\n" + name + " = \"" + name + "\"\n[" + name + "]\nIdentifier = \"" +
+                  GText(n) + "\"\nFileName = \"" + file(name) + "\"\n");
+    return file(name);
+  }
+};
+
+std::string DoesNotLoad(const std::string& file) {
+  return "failed to load library \"" + file +
+         "\" while checking for entry point \"vltCreateObjectExpert\"";
+}
+std::string HasNoEntry(const std::string& file) {
+  return "failed to find entry point \"vltCreateObjectExpert\" in library \"" + file + "\"";
+}
+std::string IsNot(const char* what, const std::string& file) {
+  return "the object expert \"" + file + "\" is registered but " + what;
+}
+
+// One component's result and messages by the export, in this process.
+std::pair<HRESULT, Messages> Checked(GUID id) {
+  IEnumString* list = nullptr;
+  HRESULT result = vltCheckComponent(id, &list);
+  Messages messages;
+  if (!list) return {result, {"no list"}};
+  wchar_t* text = nullptr;
+  unsigned fetched = 0;
+  while (list->Next(1, &text, &fetched) == S_OK) {
+    messages.emplace_back(text, text + wcslen(text));
+    vltFree(text);
+  }
+  list->Release();
+  return {result, messages};
+}
+
+ProgramResult Vltctl(std::vector<std::string> arguments) {
+  arguments.insert(arguments.begin(), std::string(VLT_TEST_BIN) + "/vltctl");
+  return RunProgram(arguments);
+}
+
+struct Found {
+  int exitCode;
+  bool sound;
+  Messages messages, notes;
+};
+
+// What "vltctl check GUID --json" says of one component.
+Found Check(uint32_t n) {
+  ProgramResult result = Vltctl({"check", GText(n), "--json"});
+  json out = json::parse(result.out, nullptr, false);
+  if (!out.is_array() || out.size() != 1) {
+    ADD_FAILURE() << result.out << result.err;
+    return {result.exitCode, false, {}, {}};
+  }
+  return {result.exitCode, out[0]["sound"], out[0]["messages"], out[0]["notes"]};
+}
+
+// The library is told by the export, in a fresh process, and by the tool, with these notes.
+void ExpectTold(uint32_t n, const Messages& messages, const Messages& notes) {
+  ExpectStart([&](IvltRegistrar&) {
+    auto [result, told] = Checked(G(n));
+    EXPECT_EQ(result, messages.empty() ? S_OK : E_FAIL);
+    EXPECT_EQ(told, messages);
+  });
+  Found found = Check(n);
+  EXPECT_EQ(found.exitCode, messages.empty() ? kGood : kDataUnusable);
+  EXPECT_EQ(found.sound, messages.empty());
+  EXPECT_EQ(found.messages, messages);
+  EXPECT_EQ(found.notes, notes);
+}
+
+// ---- Libraries that are not what they should be
+
+TEST(CheckTree, ASoundLibraryHasNothingToTell) {
+  Experts e;
+  Build(e.add(1, "good"), kGoodEntry);
+  ExpectTold(1, {}, {});
+  ProgramResult text = Vltctl({"check", GText(1)});
+  EXPECT_EQ(text.exitCode, kGood);
+  EXPECT_EQ(text.out, "object expert good: sound\n");
+}
+
+TEST(CheckTree, AMissingEntryPoint) {
+  Experts e;
+  std::string file = e.add(1, "bare");
+  Build(file, "extern \"C\" int vltCreateObjectExpertToo() { return 0; }\n");
+  ExpectTold(1, {HasNoEntry(file)}, {});
+  ProgramResult text = Vltctl({"check", GText(1)});
+  EXPECT_EQ(text.out, "object expert bare: NOT SOUND\n  " + HasNoEntry(file) + "\n");
+}
+
+TEST(CheckTree, AMissingDependency) {
+  Experts e;
+  std::string file = e.add(1, "needy");
+  TempDir dir;
+  Build(dir / "libvlt_gone.so", "int gone() { return 0; }\n", {"-Wl,-soname,libvlt_gone.so"});
+  Build(file, std::string("int gone(); int use() { return gone(); }\n") + kGoodEntry,
+        {"-L" + dir.path(), "-lvlt_gone"});
+  std::filesystem::remove(dir / "libvlt_gone.so");
+  ExpectTold(1, {DoesNotLoad(file)},
+             {"libvlt_gone.so: cannot open shared object file: No such file or directory"});
+}
+
+TEST(CheckTree, AMissingSymbol) {
+  Experts e;
+  std::string file = e.add(1, "unresolved");
+  Build(file,
+        std::string("extern \"C\" int vltGone(); int use() { return vltGone(); }\n") + kGoodEntry);
+  ExpectTold(1, {DoesNotLoad(file)}, {file + ": undefined symbol: vltGone"});
+}
+
+TEST(CheckTree, ATextFileAndAnEmptyOne) {
+  Experts e;
+  std::string text = e.add(1, "text"), empty = e.add(2, "empty");
+  WriteBytes(text, std::string(200, 't'));
+  WriteBytes(empty, "");
+  ExpectTold(1, {DoesNotLoad(text)}, {text + ": invalid ELF header"});
+  ExpectTold(2, {DoesNotLoad(empty)}, {empty + ": file too short"});
+}
+
+TEST(CheckTree, ALibraryThatIsCutAtAnyPlaceTakesNothingDown) {
+  Experts e;
+  std::string file = e.add(1, "cut");
+  Build(file, kGoodEntry);
+  std::string whole = ReadBytes(file);
+  for (size_t size : {size_t{16}, size_t{52}, size_t{64}, size_t{400}, whole.size() / 2}) {
+    WriteBytes(file, whole.substr(0, size));
+    Found found = Check(1);
+    EXPECT_EQ(found.exitCode, kDataUnusable) << size;
+    EXPECT_FALSE(found.sound) << size;
+    EXPECT_FALSE(found.messages.empty() && found.notes.empty()) << size;
+  }
+}
+
+TEST(CheckTree, ALibraryForTheOtherWordSize) {
+  Experts e;
+  std::string file = e.add(1, "foreign");
+  BuildForTheOtherWordSize(file);
+  bool is64 = sizeof(void*) == 8;
+  ExpectTold(1, {DoesNotLoad(file)},
+             {file + ": wrong ELF class: " + (is64 ? "ELFCLASS32" : "ELFCLASS64"),
+              is64 ? "the library is built for 32 bits, this program for 64"
+                   : "the library is built for 64 bits, this program for 32"});
+}
+
+TEST(CheckTree, AMissingFileAndADirectoryDoNotExist) {
+  Experts e;
+  std::string missing = e.add(1, "missing"), directory = e.add(2, "directory");
+  std::filesystem::create_directory(directory);
+  ExpectTold(1, {IsNot("does not exist", missing)}, {});
+  ExpectTold(2, {IsNot("does not exist", directory)}, {});
+}
+
+TEST(CheckTree, AFileThatMayNotBeRead) {
+  Experts e;
+  std::string file = e.add(1, "secret");
+  Build(file, kGoodEntry);
+  ASSERT_EQ(chmod(file.c_str(), 0), 0);
+  // The registrar is had with all rights, so that only the file is out of reach.
+  ExpectStart([&](IvltRegistrar&) {
+    if (geteuid() == 0) {
+      ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+    }
+    EXPECT_EQ(Checked(G(1)),
+              (std::pair<HRESULT, Messages>{E_FAIL, {IsNot("is not readable", file)}}));
+  });
+}
+
+// The same by the tool, which runs as somebody else from the start.
+TEST(CheckTree, TheToolToldOfAFileThatMayNotBeRead) {
+  Experts e;
+  std::string file = e.add(1, "secret");
+  Build(file, kGoodEntry);
+  bool root = geteuid() == 0;
+  ASSERT_EQ(chmod(file.c_str(), 0), 0);
+  if (root) RunProgram({"chmod", "-R", "a+rwX", getenv("VLT_TEST_ROOT")});
+  ASSERT_EQ(chmod(file.c_str(), 0), 0);
+  EXPECT_EQ(InChild([&] {
+              if (root) {
+                ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+              }
+              Found found = Check(1);
+              EXPECT_EQ(found.exitCode, kDataUnusable);
+              EXPECT_EQ(found.messages, Messages{IsNot("is not readable", file)});
+            }),
+            0);
+}
+
+// ---- Libraries that do harm while they are loaded. Only the tool survives them.
+
+std::string AtLoad(const std::string& statement) {
+  return "#include <signal.h>\n#include <stdlib.h>\n#include "
+         "<unistd.h>\n__attribute__((constructor)) void start() { " +
+         statement + " }\n" + kGoodEntry;
+}
+
+void ExpectNote(const std::string& statement, const std::string& note) {
+  Experts e;
+  Build(e.add(1, "harm"), AtLoad(statement));
+  Found found = Check(1);
+  EXPECT_EQ(found.exitCode, kDataUnusable) << statement;
+  EXPECT_FALSE(found.sound) << statement;
+  EXPECT_EQ(found.messages, Messages{}) << statement;
+  EXPECT_EQ(found.notes, Messages{note}) << statement;
+}
+
+TEST(CheckTree, ACrashAtLoad) {
+  ExpectNote("abort();", "the process that loaded the library died: Aborted");
+  ExpectNote("signal(SIGSEGV, SIG_DFL); raise(SIGSEGV);",
+             "the process that loaded the library died: Segmentation fault");
+}
+
+// Whatever the code, none of them means that the component is sound.
+TEST(CheckTree, AnExitAtLoadIsNeverSound) {
+  for (int code : {0, 1, 7}) {
+    std::string text = std::to_string(code);
+    ExpectNote("exit(" + text + ");", "the library ended its process with " + text);
+    ExpectNote("_exit(" + text + ");", "the library ended its process with " + text);
+  }
+}
+
+TEST(CheckTree, AHangAtLoadEndsAtTheTimeLimit) {
+  auto begin = std::chrono::steady_clock::now();
+  ExpectNote("for (;;) pause();", "the library did not load within 10 s; its process was killed");
+  std::chrono::duration<double> taken = std::chrono::steady_clock::now() - begin;
+  printf("a library that hangs: %.1f s\n", taken.count());
+  EXPECT_GE(taken.count(), 10);
+  EXPECT_LT(taken.count(), 25);
+}
+
+// What a library starts neither holds the check up nor outlives it.
+TEST(CheckTree, AProcessStartedAtLoad) {
+  Experts e;
+  TempDir dir;
+  std::string pidFile = dir / "pid";
+  std::string writePid = "FILE* f = fopen(\"" + pidFile + ".new\", \"w\"); " +
+                         "fprintf(f, \"%d\", (int)getpid()); fclose(f); rename(\"" + pidFile +
+                         ".new\", \"" + pidFile + "\"); ";
+  Build(e.add(1, "starter"),
+        "#include <stdio.h>\n" +
+            AtLoad("if (fork() == 0) { " + writePid + "for (;;) pause(); } while (access(\"" +
+                   pidFile + "\", F_OK) != 0) usleep(1000);"));
+  auto begin = std::chrono::steady_clock::now();
+  Found found = Check(1);
+  std::chrono::duration<double> taken = std::chrono::steady_clock::now() - begin;
+  EXPECT_TRUE(found.sound);
+  EXPECT_LT(taken.count(), 9);
+  std::string pid = ReadBytes(pidFile);
+  EXPECT_FALSE(pid.empty());
+  EXPECT_TRUE(Eventually([&] {
+    std::string state;
+    std::ifstream("/proc/" + pid + "/stat") >> state >> state >> state;
+    return state.empty() || state == "Z";  // gone, or nobody has asked for it yet
+  })) << pid;
+}
+
+TEST(CheckTree, WhatALibraryPrintsAtLoadIsNotShown) {
+  Experts e;
+  Build(e.add(1, "noisy"),
+        AtLoad("(void)!write(1, \"MMMnoise\\n\", 9); (void)!write(2, \"E\\n\", 2);"));
+  ProgramResult result = Vltctl({"check", GText(1)});
+  EXPECT_EQ(result.exitCode, kGood);
+  EXPECT_EQ(result.out, "object expert noisy: sound\n");
+  EXPECT_EQ(result.err, "");
+}
+
+// ---- The whole tree
+
+TEST(CheckTree, OneBadLibraryHidesNoOther) {
+  Experts e;
+  Build(e.add(1, "good"), kGoodEntry);
+  Build(e.add(2, "crash"), AtLoad("abort();"));
+  std::string missing = e.add(3, "missing");
+  ProgramResult result = Vltctl({"check"});
+  EXPECT_EQ(result.exitCode, kDataUnusable);
+  EXPECT_NE(result.out.find("object expert good: sound\n"
+                            "object expert crash: NOT SOUND\n"
+                            "    the process that loaded the library died: Aborted\n"
+                            "object expert missing: NOT SOUND\n"
+                            "  " +
+                            IsNot("does not exist", missing) + "\n"),
+            std::string::npos)
+      << result.out;
+  EXPECT_NE(result.out.find("dictionary vltdd: NOT SOUND\n"), std::string::npos);
+}
+
+TEST(CheckTree, AnUnknownComponentIsNotFound) {
+  Experts e;
+  ProgramResult result = Vltctl({"check", GText(77)});
+  EXPECT_EQ(result.exitCode, kNotFound);
+  EXPECT_EQ(result.out, "");
+  EXPECT_EQ(result.err, "vltctl: no component " + GText(77) + "\n");
+  ExpectStart([](IvltRegistrar&) {
+    EXPECT_EQ(Checked(G(77)), (std::pair<HRESULT, Messages>{E_INVALIDARG, {}}));
+  });
+}
+
+}  // namespace
+}  // namespace vlt::test
