@@ -243,6 +243,32 @@ TEST(IniFileWriter, LongPathsWork) {
   }
 }
 
+// Items without a section come first. What begins one of their names must not be taken for a mark of
+// the whole file, which then would be refused, or lose these bytes.
+TEST(IniFileWriter, ANameLikeAByteOrderMarkDoesNotBeginTheFile) {
+  for (const std::string name : {"\xFE\xFFname", "\xFF\xFEname", "\xEF\xBB\xBFname"}) {
+    TempDir dir;
+    WriteBytes(dir / "x.ini", "\n" + name + " = 1\n[s]\na = 2\n");
+    Document doc = NewDocument();
+    IniSetReadOptions(doc.get(), kIniReadColons);
+    ASSERT_EQ(IniReadFromFile(doc.get(), (dir / "x.ini").c_str()), 0);
+    IniSetWriteOptions(doc.get(), -1, 32, kIniWriteSpaces | kIniWriteTight);
+    for (int round = 0; round < 2; ++round) {
+      ASSERT_EQ(IniWriteToFile(doc.get(), (dir / "x.ini").c_str()), 0);
+      EXPECT_EQ(ReadBytes(dir / "x.ini"), "\n" + name + " = 1\n[s]\na = 2\n");
+      doc = NewDocument();
+      IniSetReadOptions(doc.get(), kIniReadColons);
+      IniSetWriteOptions(doc.get(), -1, 32, kIniWriteSpaces | kIniWriteTight);
+      ASSERT_EQ(IniReadFromFile(doc.get(), (dir / "x.ini").c_str()), 0);
+      EXPECT_EQ(RawValue(doc, "(null)", name.c_str()), "1");
+    }
+    // Behind a mark of the file's own there is nothing to be taken for one.
+    IniSetWriteOptions(doc.get(), -1, 32, kIniWriteMark | kIniWriteSpaces | kIniWriteTight);
+    ASSERT_EQ(IniWriteToFile(doc.get(), (dir / "x.ini").c_str()), 0);
+    EXPECT_EQ(ReadBytes(dir / "x.ini"), "\xEF\xBB\xBF" + name + " = 1\n[s]\na = 2\n");
+  }
+}
+
 TEST(IniFileWriter, TheMarkOfAReadFileIsWrittenBackOnlyWhenAskedFor) {
   TempDir dir;
   const std::string path = dir / "a.ini";

@@ -3,6 +3,7 @@
 #include <cstring>
 #include <utility>
 
+#include "ztini/ByteOrderMark.h"
 #include "ztini/Document.h"
 #include "ztini/LineReader.h"
 #include "ztini/OpenFile.h"
@@ -10,24 +11,16 @@
 
 namespace {
 
-// Byte order marks. The names of the 16-bit ones are the wrong way round for the bytes that they
-// hold; both are refused alike.
-constexpr unsigned char utf32le[] = {0xFF, 0xFE, 0x00, 0x00};
-constexpr unsigned char utf32be[] = {0x00, 0x00, 0xFE, 0xFF};
-constexpr unsigned char utf8[] = {0xEF, 0xBB, 0xBF};
-constexpr unsigned char utf16be[] = {0xFF, 0xFE};
-constexpr unsigned char utf16le[] = {0xFE, 0xFF};
-
-template <size_t size>
-bool Begins(const char* bytes, size_t read, const unsigned char (&mark)[size]) {
-  return read >= size && memcmp(bytes, mark, size) == 0;
-}
-
 // Where the text begins, or kIniUnsupportedEncoding.
 int32_t TextOffset(const char* bytes, size_t read) {
-  if (Begins(bytes, read, utf32le) || Begins(bytes, read, utf32be)) return kIniUnsupportedEncoding;
-  if (Begins(bytes, read, utf8)) return sizeof utf8;
-  if (Begins(bytes, read, utf16be) || Begins(bytes, read, utf16le)) return kIniUnsupportedEncoding;
+  switch (ztini::MarkIn(bytes, read)) {
+    case ztini::ByteOrderMark::kWide:
+      return kIniUnsupportedEncoding;
+    case ztini::ByteOrderMark::kUtf8:
+      return ztini::kUtf8MarkSize;
+    case ztini::ByteOrderMark::kNone:
+      break;
+  }
   return 0;
 }
 

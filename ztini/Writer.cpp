@@ -1,6 +1,7 @@
 #include <cstring>
 #include <string_view>
 
+#include "ztini/ByteOrderMark.h"
 #include "ztini/Document.h"
 #include "ztini/TextBuffer.h"
 
@@ -8,8 +9,6 @@ namespace {
 
 // " Line", four digits and a separator of three, whether or not it is that wide.
 constexpr int64_t kPieceOverhead = 12;
-
-constexpr char kUtf8Mark[] = "\xEF\xBB\xBF";
 
 // Emits a document line by line. Every operation gives 0 or a negative status.
 class DocumentWriter {
@@ -138,11 +137,34 @@ int32_t IniFileOutputFunc(void* file, const char* line) {
   return status < 0 ? status : ztini_WriteStringToFile(stream, "\n");
 }
 
+namespace {
+
+struct FirstLine {
+  FILE* file;
+  bool comes;
+};
+
+// A name may begin with the bytes of a byte order mark. As the first bytes of the file they would be
+// lost or get the whole file refused, so an empty line goes before them.
+int32_t PutLine(void* state, const char* line) {
+  auto* first = static_cast<FirstLine*>(state);
+  int32_t status = 0;
+  if (first->comes && ztini::MarkIn(line, strnlen(line, 4)) != ztini::ByteOrderMark::kNone) {
+    status = ztini_WriteStringToFile(first->file, "\n");
+  }
+  first->comes = false;
+  return status < 0 ? status : IniFileOutputFunc(first->file, line);
+}
+
+}  // namespace
+
 int32_t ztini_IniWriteToFileHelper(IniStructForwardReferenceTag* doc, FILE* file) {
   if (!doc || !file) return 0;
   int32_t status = 0;
-  if (doc->writeOptions & kIniWriteMark) status = ztini_WriteStringToFile(file, kUtf8Mark);
-  if (status >= 0) status = IniWrite(doc, IniFileOutputFunc, file);
+  const bool marked = (doc->writeOptions & kIniWriteMark) != 0;
+  FirstLine first = {file, !marked};
+  if (marked) status = ztini_WriteStringToFile(file, ztini::kUtf8Mark);
+  if (status >= 0) status = IniWrite(doc, PutLine, &first);
   if (status >= 0 && fflush(file) != 0) status = kIniWriteFailed;
   return status;
 }

@@ -3,7 +3,8 @@
 #include <stdarg.h>
 #include <stdio.h>
 
-#include <new>
+#include <exception>
+#include <memory>
 
 #include "source/Common/ZtUtils/General/vlTracer.h"
 #include "zt/fnd/String.h"
@@ -21,15 +22,22 @@ void vltTraceError(const char* format, ...) {
 
 namespace {
 
+using zt::fnd::osdep::NamedEvent;
+
+std::unique_ptr<NamedEvent> OpenLockdown() {
+  try {
+    return std::make_unique<NamedEvent>(zt::fnd::String(L"LockdownVLTEvent"), true, true);
+  } catch (const std::exception&) {
+    // There is none to be had where memory is really out, or semaphores, or where the place of the
+    // events is closed. The caller's result tells what has failed; this must not take its place.
+    return nullptr;
+  }
+}
+
 // Whoever wants to know holds the event open; without such a process the signal is for nobody, and
 // the event goes again with this object.
 void SignalLockdown() {
-  try {
-    zt::fnd::osdep::NamedEvent lockdown(zt::fnd::String(L"LockdownVLTEvent"), true, true);
-    lockdown.set();
-  } catch (const std::bad_alloc&) {
-    // Where memory is really out the event cannot be made either; the caller's result still tells.
-  }
+  if (std::unique_ptr<NamedEvent> lockdown = OpenLockdown()) lockdown->set();
 }
 
 }  // namespace

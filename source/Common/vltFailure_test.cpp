@@ -38,6 +38,21 @@ TEST(FailureReport, LeavesNoEventWithoutAHolder) {
   EXPECT_FALSE(event.check());
 }
 
+TEST(FailureReport, WhereNoEventCanBeHadTheResultIsTheSame) {
+  TempDir dir;
+  WriteBytes(dir / "file", "");
+  EXPECT_EQ(Child([&] {
+              setenv("ZTFNDTMPSHAREDFILEDIR", (dir / "file").c_str(), 1);
+              try {
+                NamedEvent event(zt::fnd::String(kLockdown), true, false);
+                return 2;
+              } catch (const std::exception&) {
+              }
+              return vltReportOutOfMemory("void f()") == E_OUTOFMEMORY ? 0 : 1;
+            }).wait(),
+            0);
+}
+
 // What the body writes to standard error.
 template <class Body>
 std::string Errors(Body body) {

@@ -1,0 +1,24 @@
+#pragma once
+
+#include <cstddef>
+#include <cstring>
+
+namespace ztini {
+
+enum class ByteOrderMark { kNone, kUtf8, kWide };  // kWide: UTF-16 or UTF-32, which are refused
+
+inline constexpr char kUtf8Mark[] = "\xEF\xBB\xBF";
+inline constexpr size_t kUtf8MarkSize = sizeof kUtf8Mark - 1;
+
+// What the first bytes of a file, at most four of them, announce.
+inline ByteOrderMark MarkIn(const char* bytes, size_t count) {
+  auto begins = [&](const char* mark, size_t size) {
+    return count >= size && memcmp(bytes, mark, size) == 0;
+  };
+  if (begins("\xFF\xFE\0\0", 4) || begins("\0\0\xFE\xFF", 4)) return ByteOrderMark::kWide;
+  if (begins(kUtf8Mark, kUtf8MarkSize)) return ByteOrderMark::kUtf8;
+  if (begins("\xFF\xFE", 2) || begins("\xFE\xFF", 2)) return ByteOrderMark::kWide;
+  return ByteOrderMark::kNone;
+}
+
+}  // namespace ztini
