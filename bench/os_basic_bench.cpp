@@ -11,6 +11,7 @@
 #include <mutex>
 #include <string>
 
+#include "bench/Place.h"
 #include "zt/fnd/AutoBuffer.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/CriticalSection.h"
@@ -21,26 +22,6 @@ namespace {
 
 using namespace zt::fnd;
 using namespace zt::fnd::osdep;
-
-// A directory for the whole run; the shared objects live inside it.
-class Place {
- public:
-  Place() {
-    m_path = (std::filesystem::temp_directory_path() / "vlt.bench.XXXXXX").string();
-    if (!mkdtemp(m_path.data())) abort();
-    setenv("ZTFNDTMPSHAREDFILEDIR", m_path.c_str(), 1);
-  }
-  ~Place() { std::filesystem::remove_all(m_path); }
-  const std::string& path() const { return m_path; }
-
- private:
-  std::string m_path;
-};
-
-const Place& ThePlace() {
-  static Place place;
-  return place;
-}
 
 int OpenOrAbort(const std::string& path) {
   int fd = open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600);

@@ -18,6 +18,7 @@
 #include <functional>
 #include <string>
 
+#include "bench/Place.h"
 #include "source/Common/ZtUtils/General/vlTracer.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/NamedEvent.h"
@@ -28,30 +29,6 @@ using zt::fnd::String;
 using zt::fnd::osdep::NamedEvent;
 
 constexpr bool kManual = true, kAutomatic = false, kClear = false;
-
-// A directory for the whole run; and semaphores of its own, where that is allowed.
-class Place {
- public:
-  Place() {
-    if (unshare(CLONE_NEWIPC) != 0) fprintf(stderr, "uses the machine's semaphores\n");
-    m_path = (std::filesystem::temp_directory_path() / "vlt.bench.XXXXXX").string();
-    if (!mkdtemp(m_path.data())) abort();
-    setenv("ZTFNDTMPSHAREDFILEDIR", m_path.c_str(), 1);
-  }
-  ~Place() {
-    std::error_code ignored;  // what cannot be removed lies in the temporary directory anyway
-    std::filesystem::remove_all(m_path, ignored);
-  }
-  const std::string& path() const { return m_path; }
-
- private:
-  std::string m_path;
-};
-
-const Place& ThePlace() {
-  static Place place;
-  return place;
-}
 
 // A process that repeats something until the object goes.
 class Partner {
@@ -245,4 +222,9 @@ BENCHMARK(TraceLineBare)->Name("TraceLine/write");
 
 }  // namespace
 
-BENCHMARK_MAIN();
+int main(int argc, char** argv) {
+  // Semaphores of its own, where that is allowed.
+  if (unshare(CLONE_NEWIPC) != 0) fprintf(stderr, "uses the machine's semaphores\n");
+  benchmark::Initialize(&argc, argv);
+  benchmark::RunSpecifiedBenchmarks();
+}

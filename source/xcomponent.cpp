@@ -101,6 +101,16 @@ void ZeroVariant(_vltComponent2* record) {
   memset(&record->dictionary, 0, sizeof record->dictionary);
 }
 
+// All but the stamps and the variant; frees nothing.
+void ForgetFields(_vltComponent2* record) {
+  record->type = vltComponentNone;
+  record->name = nullptr;
+  record->identifier = GUID_NULL;
+  record->fileName = nullptr;
+  memset(record->opaqueQuad, 0, sizeof record->opaqueQuad);
+  record->opaqueWord = 0;
+}
+
 bool HandedItsTextsOut(const wchar_t* name) {
   return name && wcsstr(name, L"Motion") && wcsstr(name, L"Expert");
 }
@@ -108,12 +118,7 @@ bool HandedItsTextsOut(const wchar_t* name) {
 }  // namespace
 
 void CvltComponent::InitDataMembers() {
-  m_record.type = vltComponentNone;
-  m_record.name = nullptr;
-  m_record.identifier = GUID_NULL;
-  m_record.fileName = nullptr;
-  memset(m_record.opaqueQuad, 0, sizeof m_record.opaqueQuad);
-  m_record.opaqueWord = 0;
+  ForgetFields(&m_record);
   ZeroVariant(&m_record);
 }
 
@@ -184,12 +189,7 @@ void CvltComponent::Clear() {
   } else if (m_record.type == vltComponentResourceExpert && !exempt) {
     ZtTaskMemFree(m_record.resource.pnp);
   }
-  m_record.type = vltComponentNone;
-  m_record.name = nullptr;
-  m_record.identifier = GUID_NULL;
-  m_record.fileName = nullptr;
-  memset(m_record.opaqueQuad, 0, sizeof m_record.opaqueQuad);
-  m_record.opaqueWord = 0;
+  ForgetFields(&m_record);
 }
 
 HRESULT CvltComponent::DuplicateStringNullOK(const wchar_t* source, wchar_t** target) {

@@ -8,6 +8,9 @@ namespace vlt::test {
 // the system's mathematics library, which is loaded as a module of its own.)
 void MakeModule(const std::string& path);
 
+// True if this is what such a module exports: it answers like the function.
+bool IsCosine(void* function);
+
 // True if the file at the path is mapped into this process.
 bool IsMapped(const std::string& path);
 

@@ -48,6 +48,9 @@ struct Dispose {
   void operator()(IniStructForwardReferenceTag* document) const { IniDispose(document); }
 };
 
+// The file may well be there: the process or the machine has nothing left to open it with.
+bool IsExhaustion(int error) { return error == ENOMEM || error == EMFILE || error == ENFILE; }
+
 std::optional<std::string> ReadItem(const std::string& file, const std::string& key) {
   constexpr int32_t kQuotesOfBothKinds = 2 | 4;
   std::unique_ptr<IniStructForwardReferenceTag, Dispose> document(IniNew(0));
@@ -55,9 +58,10 @@ std::optional<std::string> ReadItem(const std::string& file, const std::string& 
   IniSetReadOptions(document.get(), kQuotesOfBothKinds);
   errno = 0;
   int32_t status = IniReadFromFile(document.get(), file.c_str());
-  bool outOfMemory = status == kIniOutOfMemory || (status == kIniCannotOpen && errno == ENOMEM);
   // Not "no value", which would lead a process to another installation for its whole life.
-  if (outOfMemory) throw std::bad_alloc();
+  if (status == kIniOutOfMemory || (status == kIniCannotOpen && IsExhaustion(errno))) {
+    throw std::bad_alloc();
+  }
   if (status < 0) return std::nullopt;
   const char* value = nullptr;
   if (IniGetPointerToRawString(document.get(), "Preferences", key.c_str(), &value) != 1) {

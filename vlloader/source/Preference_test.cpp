@@ -1,10 +1,16 @@
 #include "vlloader/source/Preference.h"
 
+#include <errno.h>
 #include <gtest/gtest.h>
 #include <stdlib.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
+#include <new>
+
+#include "tests/support/FailSystemCall.h"
 #include "tests/support/InChild.h"
 #include "tests/support/TempDir.h"
 #include "vlloader/source/vlloader.h"
@@ -115,6 +121,37 @@ TEST(LoaderPreference, WhatIsNoFileDoesNotHoldUp) {
     EXPECT_EQ(Read(), "first");
     p.put("first", std::string("\xFF\xFE", 2));
     EXPECT_EQ(Read(), "(none)");
+  });
+}
+
+// Otherwise a busy process would work on another installation for the rest of its life.
+TEST(LoaderPreference, WithoutMemoryOrDescriptorsThereIsNoAnswer) {
+  for (int error : {ENOMEM, EMFILE, ENFILE}) {
+    In([&](const Places& p) {
+      p.put("first", "[Preferences]\nDir = first\n");
+      ASSERT_TRUE(FailSystemCall(SYS_openat, error));
+      EXPECT_THROW(Read(), std::bad_alloc) << error;
+    });
+  }
+  In([](const Places& p) {
+    p.put("first", "[Preferences]\nDir = first\n");
+    ASSERT_TRUE(FailSystemCall(SYS_openat, EACCES));
+    EXPECT_EQ(Read(), "(none)");
+  });
+}
+
+TEST(LoaderPreference, ALackOfDescriptorsIsNotRemembered) {
+  In([](const Places& p) {
+    p.put("first", "");
+    WriteBytes(p.path("first") + "/com.zentrex.kor.ini", "[Preferences]\nDir = /there\n");
+    struct rlimit before, none;
+    ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
+    none = before;
+    none.rlim_cur = 0;
+    ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &none), 0);
+    EXPECT_THROW(GetCurrentVltPath(), std::bad_alloc);
+    ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &before), 0);
+    EXPECT_STREQ(GetCurrentVltPath(), "/there");
   });
 }
 

@@ -17,14 +17,11 @@
 namespace zt::fnd::osdep {
 namespace {
 
+using vlt::test::IsCosine;
 using vlt::test::IsMapped;
 using vlt::test::MakeModule;
 using vlt::test::TempDir;
 using vlt::test::Wide;
-
-bool Works(void* function) {
-  return function != nullptr && reinterpret_cast<double (*)(double)>(function)(0.0) == 1.0;
-}
 
 TEST(LibraryBundle, DecorateName) {
   const char* rows[][2] = {
@@ -46,7 +43,7 @@ TEST(LibraryBundle, OpensTheFirstModuleInsideThatLoads) {
         Bundle bundle(Wide(dir / name));
         EXPECT_TRUE(bundle.isOpened()) << inside << " in " << name;
         EXPECT_TRUE(bundle.isLoaded());
-        EXPECT_TRUE(Works(bundle.getFunctionPointer(L"cos", false)));
+        EXPECT_TRUE(IsCosine(bundle.getFunctionPointer(L"cos", false)));
         EXPECT_TRUE(IsMapped(module));
       }
       EXPECT_FALSE(IsMapped(module));
@@ -114,7 +111,7 @@ TEST(LibraryBundle, CopiesShareTheModule) {
     Bundle copy(*first);
     delete first;
     EXPECT_TRUE(copy.isOpened());
-    EXPECT_TRUE(Works(copy.getFunctionPointer(L"cos", false)));
+    EXPECT_TRUE(IsCosine(copy.getFunctionPointer(L"cos", false)));
   }
   EXPECT_FALSE(IsMapped(dir / "X.bundle/libX.so"));
 }

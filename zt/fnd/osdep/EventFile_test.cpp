@@ -14,6 +14,7 @@
 #include <thread>
 
 #include "tests/support/Child.h"
+#include "tests/support/Elapsed.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/FailSystemCall.h"
 #include "tests/support/PosixErrorOf.h"
@@ -25,22 +26,18 @@ namespace zt::fnd::osdep {
 namespace {
 
 using vlt::test::Child;
+using vlt::test::Clock;
 using vlt::test::EventPlace;
 using vlt::test::Eventually;
 using vlt::test::Exists;
 using vlt::test::Keeper;
 using vlt::test::ModeOf;
+using vlt::test::MsSince;
 using vlt::test::OpenDescriptors;
 using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
 using vlt::test::Sleeps;
 using vlt::test::WriteBytes;
-using Clock = std::chrono::steady_clock;
-
-long MsSince(Clock::time_point begin) {
-  return static_cast<long>(
-      std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - begin).count());
-}
 
 ScopedFd OpenRaw(const std::string& path) {
   return ScopedFd(::open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666));

@@ -9,18 +9,19 @@
 #include <vector>
 
 #include "tests/support/Child.h"
+#include "tests/support/Elapsed.h"
+#include "tests/support/EventKinds.h"
 #include "zt/fnd/Exception.h"
 
 namespace zt::fnd::osdep {
 namespace {
 
-using Clock = std::chrono::steady_clock;
-
-std::int64_t MsSince(Clock::time_point start) {
-  return std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - start).count();
-}
-
-constexpr bool kManual = true, kAutomatic = false, kSet = true, kClear = false;
+using vlt::test::Clock;
+using vlt::test::kAutomatic;
+using vlt::test::kClear;
+using vlt::test::kManual;
+using vlt::test::kSet;
+using vlt::test::MsSince;
 
 TEST(ThreadEvent, StartsAsTold) {
   EXPECT_TRUE(Event(kManual, kSet).check());

@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "tests/support/Child.h"
+#include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/NamedEventFiles.h"
 #include "tests/support/TempDir.h"
@@ -24,14 +25,17 @@ using vlt::test::Child;
 using vlt::test::EventPlace;
 using vlt::test::Exists;
 using vlt::test::HeaderOf;
+using vlt::test::kAutomatic;
+using vlt::test::kClear;
 using vlt::test::Keeper;
+using vlt::test::kManual;
+using vlt::test::kSet;
 using vlt::test::ReadBytes;
 using vlt::test::RecordOf;
 using vlt::test::WriteBytes;
 typedef std::vector<std::string> Names;
 typedef EventPlace::Slot Slot;
 
-constexpr bool kManual = true, kAutomatic = false, kSet = true, kClear = false;
 constexpr auto Open = [](const std::string& name, bool manual = kManual, bool initial = kClear) {
   return vlt::test::OpenEvent(name, manual, initial);
 };

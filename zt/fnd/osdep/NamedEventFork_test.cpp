@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "tests/support/Child.h"
+#include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/Heir.h"
 #include "tests/support/MutexPlace.h"
@@ -32,12 +33,15 @@ using vlt::test::ExecHeir;
 using vlt::test::Exists;
 using vlt::test::FileIsFree;
 using vlt::test::Heir;
+using vlt::test::kAutomatic;
 using vlt::test::kCanForkWhileThreadsAllocate;
+using vlt::test::kClear;
+using vlt::test::kManual;
+using vlt::test::kSet;
 using vlt::test::OpenDescriptors;
 using vlt::test::Wide;
 typedef std::vector<std::string> Names;
 
-constexpr bool kManual = true, kAutomatic = false, kSet = true, kClear = false;
 constexpr const wchar_t* kStateFileMutex = L"zt_fnd_osdep_NamedEvent_StateFileMutex";
 
 auto Open(const std::string& name, bool manual = kManual, bool initial = kClear) {

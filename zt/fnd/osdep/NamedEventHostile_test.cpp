@@ -18,6 +18,7 @@
 #include <vector>
 
 #include "tests/support/Child.h"
+#include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
@@ -34,7 +35,11 @@ using vlt::test::Child;
 using vlt::test::EventPlace;
 using vlt::test::Eventually;
 using vlt::test::Exists;
+using vlt::test::kAutomatic;
+using vlt::test::kClear;
 using vlt::test::Keeper;
+using vlt::test::kManual;
+using vlt::test::kSet;
 using vlt::test::OpenDescriptors;
 using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
@@ -45,7 +50,6 @@ using Clock = std::chrono::steady_clock;
 typedef std::vector<std::string> Names;
 typedef EventPlace::Slot Slot;
 
-constexpr bool kManual = true, kAutomatic = false, kSet = true, kClear = false;
 constexpr auto kSoon = std::chrono::seconds(5);
 
 auto Open(const std::string& name, bool manual = kManual, bool initial = kClear) {

@@ -22,6 +22,7 @@
 
 #include "tests/support/AllocFailure.h"
 #include "tests/support/Child.h"
+#include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/FailSystemCall.h"
 #include "tests/support/MemoryLimit.h"
@@ -37,6 +38,8 @@ using vlt::test::Allowed;
 using vlt::test::Child;
 using vlt::test::EventPlace;
 using vlt::test::Exists;
+using vlt::test::kClear;
+using vlt::test::kManual;
 using vlt::test::OpenDescriptors;
 using vlt::test::PosixErrorOf;
 using vlt::test::Wide;
@@ -44,7 +47,6 @@ using vlt::test::WriteBytes;
 using Clock = std::chrono::steady_clock;
 typedef std::vector<std::string> Names;
 
-constexpr bool kManual = true, kClear = false;
 constexpr auto kSoon = std::chrono::seconds(5);
 // A 32-bit process has two ways to ask for a set.
 constexpr long kSemget[] = {

@@ -18,6 +18,7 @@
 #include <vector>
 
 #include "tests/support/Child.h"
+#include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/NamedEventFiles.h"
 #include "tests/support/PosixErrorOf.h"
@@ -35,7 +36,11 @@ using vlt::test::Child;
 using vlt::test::EventPlace;
 using vlt::test::Exists;
 using vlt::test::HeaderOf;
+using vlt::test::kAutomatic;
+using vlt::test::kClear;
 using vlt::test::Keeper;
+using vlt::test::kManual;
+using vlt::test::kSet;
 using vlt::test::ModeOf;
 using vlt::test::OpenDescriptors;
 using vlt::test::PosixErrorOf;
@@ -44,8 +49,6 @@ using vlt::test::RecordOf;
 using vlt::test::Wide;
 using vlt::test::WriteBytes;
 typedef std::vector<std::string> Names;
-
-constexpr bool kManual = true, kAutomatic = false, kSet = true, kClear = false;
 
 typedef EventPlace::Slot Slot;
 

@@ -18,6 +18,8 @@
 
 #include "tests/support/CaughtSleeps.h"
 #include "tests/support/Child.h"
+#include "tests/support/Elapsed.h"
+#include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/ThreadState.h"
@@ -28,19 +30,18 @@ namespace {
 
 using vlt::test::BlockedIn;
 using vlt::test::Child;
+using vlt::test::Clock;
 using vlt::test::EventPlace;
 using vlt::test::Eventually;
+using vlt::test::kAutomatic;
+using vlt::test::kClear;
+using vlt::test::kManual;
+using vlt::test::kSet;
+using vlt::test::MsSince;
 using vlt::test::PosixErrorOf;
 using vlt::test::Sleeps;
-using Clock = std::chrono::steady_clock;
 
 constexpr unsigned kNoLimit = 0xFFFFFFFFu;
-constexpr bool kManual = true, kAutomatic = false, kSet = true, kClear = false;
-
-long MsSince(Clock::time_point begin) {
-  return static_cast<long>(
-      std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - begin).count());
-}
 
 // The ways into the kernel of a wait; which ones there are depends on the word size.
 constexpr long kWaitCalls[] = {

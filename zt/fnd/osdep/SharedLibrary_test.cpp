@@ -19,14 +19,11 @@
 namespace zt::fnd::osdep {
 namespace {
 
+using vlt::test::IsCosine;
 using vlt::test::IsMapped;
 using vlt::test::MakeModule;
 using vlt::test::TempDir;
 using vlt::test::Wide;
-
-bool Works(void* function) {
-  return function != nullptr && reinterpret_cast<double (*)(double)>(function)(0.0) == 1.0;
-}
 
 TEST(Library, EmptyNameLoadsNothing) {
   SharedLibrary none;
@@ -45,8 +42,8 @@ TEST(Library, NameWithoutADotIsDecoratedInItsDirectory) {
     SharedLibrary library(Wide(dir / "foo"), true, false);
     EXPECT_TRUE(library.isLoaded());
     EXPECT_TRUE(IsMapped(dir / "libfoo.so"));
-    EXPECT_TRUE(Works(library.getFunctionPointer(AnsiString("cos"), false)));
-    EXPECT_TRUE(Works(library.getFunctionPointer(String(L"cos"), false)));
+    EXPECT_TRUE(IsCosine(library.getFunctionPointer(AnsiString("cos"), false)));
+    EXPECT_TRUE(IsCosine(library.getFunctionPointer(String(L"cos"), false)));
   }
   EXPECT_FALSE(IsMapped(dir / "libfoo.so"));
 }
@@ -94,7 +91,7 @@ TEST(Library, SearchOrderIsFrameworkBundleLibrary) {
     SharedLibrary loaded(Wide(dir / "X"), true, false);
     EXPECT_TRUE(IsMapped(bundle));
     EXPECT_FALSE(IsMapped(library));
-    EXPECT_TRUE(Works(loaded.getFunctionPointer(AnsiString("cos"), false)));
+    EXPECT_TRUE(IsCosine(loaded.getFunctionPointer(AnsiString("cos"), false)));
   }
   dir.makeDir("X.framework");
   MakeModule(framework);
@@ -194,7 +191,7 @@ TEST(Library, ModuleStaysWhenTheObjectIsToldSo) {
       function = library.getFunctionPointer(AnsiString("cos"), false);
     }
     EXPECT_TRUE(IsMapped(module)) << bundle;
-    EXPECT_TRUE(Works(function));
+    EXPECT_TRUE(IsCosine(function));
   }
 }
 

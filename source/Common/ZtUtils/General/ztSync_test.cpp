@@ -19,6 +19,7 @@
 #include <vector>
 
 #include "tests/support/Child.h"
+#include "tests/support/Elapsed.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
@@ -29,18 +30,14 @@ namespace {
 
 using vlt::test::BlockedIn;
 using vlt::test::Child;
+using vlt::test::Clock;
 using vlt::test::EventPlace;
 using vlt::test::Eventually;
 using vlt::test::Keeper;
+using vlt::test::MsSince;
 using vlt::test::PosixErrorOf;
 using vlt::test::WatchedThread;
 using zt::fnd::String;
-using Clock = std::chrono::steady_clock;
-
-long MsSince(Clock::time_point begin) {
-  return static_cast<long>(
-      std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - begin).count());
-}
 
 // A process that waits in the kernel for the lock of a file.
 bool WaitsForFile(const Child& child) { return BlockedIn(child.pid(), SYS_flock); }
