@@ -92,6 +92,9 @@ namespace {
 constexpr Value k_most(0x7FFFFFFF, 0xFFFFFFFF, 0, 0);
 constexpr Value k_least(0x80000000, 0, 0, 0);
 
+// Seconds from 1904 in which 64 bits of ticks surely end, on either side, and well before 65 would.
+constexpr Value k_ticksEnd(1000000000000LL);
+
 std::int64_t Limit(bool negative) {
   return negative ? std::numeric_limits<std::int64_t>::min()
                   : std::numeric_limits<std::int64_t>::max();
@@ -143,6 +146,9 @@ std::int64_t AbsTime::toTime_T(bool round) const noexcept {
 }
 
 std::int64_t AbsTime::toLKTIME(bool round) const noexcept {
+  // The change of its sign tells a product that is too large, but only up to twice the range.
+  const bool negative = m_value.IsNegative();
+  if (negative ? m_value < -k_ticksEnd : m_value > k_ticksEnd) return Limit(negative);
   return CountSince(m_value, k_lktimeEpoch, nZTSS100::kTimeUnitTicks, round);
 }
 

@@ -95,6 +95,35 @@ TEST(TimeAbsTime, WhatDoesNotFitEndsAtTheLimits) {
   EXPECT_EQ(k_least, AbsTime(-1e12, 0).toLKTIME(true));
 }
 
+// Products that pass the range more than once come back with the sign that they should have.
+TEST(TimeAbsTime, FarTimesEndAtTheLimitsOfTicks) {
+  for (double seconds : {1.9e12, 2e12, 1e13, 1e15, 1e17, 9e18}) {
+    for (bool round : {false, true}) {
+      EXPECT_EQ(k_most, AbsTime(seconds, 0).toLKTIME(round)) << seconds;
+      EXPECT_EQ(k_least, AbsTime(-seconds, 0).toLKTIME(round)) << seconds;
+      EXPECT_EQ(static_cast<std::int64_t>(seconds) - 2082844800,
+                AbsTime(seconds, 0).toTime_T(round));
+    }
+  }
+}
+
+TEST(TimeAbsTime, TicksAroundTheLimit) {
+  // The last tick of 64 bits is 922337203685.4775807 seconds away from 1601, which is in 1904:
+  const auto after = [](std::int64_t seconds, int ticks) {
+    return AbsTime(Fixed(seconds) + Fixed(ticks) / Fixed(10000000));
+  };
+  EXPECT_EQ(k_most - 1, after(912775574885, 4775806).toLKTIME(true));
+  EXPECT_EQ(k_most, after(912775574885, 4775807).toLKTIME(true));
+  EXPECT_EQ(k_most, after(912775574885, 4775808).toLKTIME(true));
+  EXPECT_EQ(k_most, after(912775574886, 0).toLKTIME(false));
+  EXPECT_EQ(k_most, after(912775574887, 0).toLKTIME(false));
+  EXPECT_EQ(k_least + 1, after(-931898832485, -4775807).toLKTIME(true));
+  EXPECT_EQ(k_least, after(-931898832485, -4775808).toLKTIME(true));
+  EXPECT_EQ(k_least, after(-931898832485, -4775809).toLKTIME(true));
+  EXPECT_EQ(k_least, after(-931898832486, 0).toLKTIME(false));
+  EXPECT_EQ(k_least, after(-931898832487, 0).toLKTIME(false));
+}
+
 TEST(TimeAbsTime, SecondsTruncateTowardZero) {
   EXPECT_EQ(1, AbsTime(1, 0.75).getSeconds());
   EXPECT_EQ(-1, AbsTime(-1.25, 0).getSeconds());

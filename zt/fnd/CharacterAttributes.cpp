@@ -9,8 +9,9 @@ namespace fnd {
 namespace {
 
 std::locale NamedLocale(const char* name) {
+  if (name == nullptr) ZT_RAISE(exception::InvalidArgument2("no locale name"));
   try {
-    return std::locale(name == nullptr ? "" : name);
+    return std::locale(name);
   } catch (const std::exception& e) {
     // Callers know the foundation's exceptions only; the library's reason goes along as text.
     ZT_RAISE(exception::InvalidArgument2(e.what()));

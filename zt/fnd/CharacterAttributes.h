@@ -13,8 +13,8 @@ class CharacterAttributes {
   // The locale "C", which folds ASCII only.
   CharacterAttributes();
 
-  // A locale by name; null counts as "". Throws InvalidArgument2 with the text of what the standard
-  // library raised for a name that it does not know.
+  // A locale by name; "" is that of the environment. Throws InvalidArgument2 with the reason as
+  // text for a name that the standard library does not know, and for null.
   explicit CharacterAttributes(const char* name);
 
   T toUpper(T c) const { return std::use_facet<std::ctype<T>>(m_locale).toupper(c); }

@@ -2,8 +2,10 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdlib>
 #include <cstring>
 
+#include "tests/support/Child.h"
 #include "tests/support/ScopedLocale.h"
 #include "zt/fnd/Exception.h"
 
@@ -36,4 +38,16 @@ TEST(TextCharacterAttributes, UnknownNameRaisesWithTheReason) {
     EXPECT_EQ(0, std::strncmp(e.what(), "Invalid argument(s): ", 21));
     EXPECT_GT(std::strlen(e.what()), 21u);
   }
+}
+
+TEST(TextCharacterAttributes, NullIsNoNameAndEmptyIsTheEnvironments) {
+  EXPECT_THROW(CharacterAttributes<char>(static_cast<const char*>(nullptr)),
+               exception::InvalidArgument2);
+  EXPECT_THROW(CharacterAttributes<wchar_t>(static_cast<const char*>(nullptr)),
+               exception::InvalidArgument2);
+  vlt::test::Child child([] {
+    setenv("LC_ALL", "C.UTF-8", 1);
+    return CharacterAttributes<wchar_t>("").toUpper(L'\xE9') == L'\xC9' ? 0 : 1;
+  });
+  EXPECT_EQ(0, child.wait());
 }

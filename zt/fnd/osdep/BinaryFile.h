@@ -11,7 +11,8 @@ namespace osdep {
 
 // Owner of one open file.
 //
-// Operations report by their results, with errno behind a -1; only those that say so throw. On a
+// Operations report by their results, with errno behind a -1, which is 0 where a file ends before
+// an exact read does, and ENOMEM where a buffer cannot grow; only those that say so throw. On a
 // closed object reads, writes and seek() give -1, the others do nothing. Files are opened
 // close-on-exec. Threads: one at a time.
 class BinaryFile {

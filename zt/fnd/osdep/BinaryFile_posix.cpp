@@ -80,6 +80,7 @@ unsigned char* MakeRoom(AutoBuffer& buffer, unsigned int n) {
   try {
     buffer.Skip(n);
   } catch (const std::exception&) {  // Reads report by their result; the buffer is unchanged.
+    errno = ENOMEM;
     return nullptr;
   }
   return buffer.Data() + length;
@@ -144,7 +145,10 @@ long BinaryFile::read(AutoBuffer& buffer, unsigned int n) const {
 }
 
 int BinaryFile::readExactSize(AutoBuffer& buffer, unsigned int n) const {
-  if (n > kCheckedReadSize && EndsBefore(m_fd, n)) return -1;
+  if (n > kCheckedReadSize && EndsBefore(m_fd, n)) {
+    errno = 0;  // as for a read that meets the end of the file
+    return -1;
+  }
   unsigned char* room = MakeRoom(buffer, n);
   if (room == nullptr && n > 0) return -1;
   int got = readExactSize(room, n);

@@ -191,9 +191,23 @@ TEST(FileBinary, ExactReadIsAllOrNothing) {
 TEST(FileBinary, HugeExactReadOfASmallFileTakesNoMemory) {
   Opened o("abc");
   AutoBuffer buffer;
+  errno = EDOM;
   EXPECT_EQ(-1, o.file.readExactSize(buffer, 0xFFFFFFF0u));
+  EXPECT_EQ(0, errno);  // the end of the file
   EXPECT_EQ(0u, buffer.Capacity());
   EXPECT_EQ(0, o.position());
+}
+
+TEST(FileBinary, ReadThatNoBufferCanHoldIsENOMEM) {
+  BinaryFile zeros(L"/dev/zero", Mode::Read, false);
+  AutoBuffer buffer(BufferWrapper(std::string(32, 'x').data(), 32));
+  errno = EDOM;
+  EXPECT_EQ(-1, zeros.readExactSize(buffer, 0xFFFFFFF0u));  // more than 32 bits together
+  EXPECT_EQ(ENOMEM, errno);
+  errno = EDOM;
+  EXPECT_EQ(-1, zeros.read(buffer, 0xFFFFFFF0u));
+  EXPECT_EQ(ENOMEM, errno);
+  EXPECT_EQ(std::string(32, 'x'), Text(buffer));
 }
 
 TEST(FileBinary, ExactTransferGoesOnAfterShortOnes) {

@@ -2,6 +2,7 @@
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/Bundle.h"
 #include "zt/fnd/osdep/LoadModule.h"
+#include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/path.h"
 
 namespace zt {
@@ -14,6 +15,15 @@ String Stem(const String& directory) {
   String base = path::BaseName(directory);
   String::size_type dot = base.rfind(L'.');
   return dot == String::npos ? base : base.substr(0, dot);
+}
+
+// Empty for a relative path where the working directory is gone: nothing can be found there.
+String Absolute(const String& path) {
+  try {
+    return path::AbsPath(path);
+  } catch (const PosixError&) {  // Opening reports nothing.
+    return String();
+  }
 }
 
 }  // namespace
@@ -39,7 +49,7 @@ Bundle::Bundle(const String& name) {
 Bundle::~Bundle() = default;
 
 bool Bundle::openFromPath(const String& path) {
-  String directory = path::AbsPath(path);
+  String directory = Absolute(path);
   if (!path::IsDirectory(directory.c_str())) return false;
   String stem = Stem(directory);
   if (stem.empty()) return false;

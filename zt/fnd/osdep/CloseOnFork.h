@@ -1,10 +1,10 @@
 #pragma once
 
-#include <sys/types.h>
-
-#include <utility>
+#include <cstdint>
 
 #include "zt/fnd/StringFwd.h"
+#include "zt/fnd/osdep/ProcessMark.h"
+#include "zt/fnd/osdep/SharedUnixObject.h"
 
 namespace zt {
 namespace fnd {
@@ -16,7 +16,12 @@ namespace osdep {
 // lives, the lock of a parent that was killed would last. The descriptor is closed in the child
 // before fork() returns there, which leaves the parent's lock alone, and the child's copy of the
 // object then owns nothing, whatever has got the number since. A process that was made without
-// fork()'s handlers keeps the descriptor. Threads: one at a time; any may fork.
+// fork()'s handlers keeps the descriptor.
+//
+// The number of the descriptor is the host's to close, as daemons do with all they find. It is the
+// object's only as long as it leads to the file that was opened, and no other object has got it:
+// after that nobody uses, closes or locks it in this object's name, in this process or in a child.
+// Threads: one at a time; any may fork.
 class CloseOnForkFd {
  public:
   CloseOnForkFd() noexcept = default;  // none
@@ -28,8 +33,12 @@ class CloseOnForkFd {
   // that throws, and std::bad_alloc.
   static CloseOnForkFd OpenShared(const AnsiString& path);
 
-  int get() const noexcept { return m_fd; }
+  // The descriptor; -1 for none, for one that the host has closed, and in a child that has no copy.
+  // Asks the system each time. Keeps errno.
+  int get() const noexcept;
+  // Whether one was opened.
   bool valid() const noexcept { return m_fd >= 0; }
+  const FileIdentity& identity() const noexcept { return m_file; }
 
   // Whether a child keeps its copy from here on, and owns it.
   void keepOnFork(bool keep) noexcept;
@@ -38,10 +47,10 @@ class CloseOnForkFd {
   void reset() noexcept;
 
  private:
-  CloseOnForkFd(int fd, pid_t pid) noexcept : m_fd(fd), m_pid(pid) {}
-
   int m_fd = -1;
-  pid_t m_pid = 0;
+  std::uint64_t m_serial = 0;  // of the opening
+  FileIdentity m_file;
+  ProcessMark m_process;
   bool m_kept = false;
 };
 

@@ -4,13 +4,13 @@
 #include <unistd.h>
 
 #include <cstddef>
+#include <cstdint>
 #include <utility>
 #include <vector>
 
 #include "zt/fnd/String.h"
-#include "zt/fnd/osdep/ProcessStatics.h"
+#include "zt/fnd/osdep/PosixMutexHold.h"
 #include "zt/fnd/osdep/ScopedFd.h"
-#include "zt/fnd/osdep/SharedUnixObject.h"
 
 namespace zt {
 namespace fnd {
@@ -20,7 +20,13 @@ namespace {
 // Plain objects, ready before any initialiser and good after every destructor.
 pthread_once_t s_once = PTHREAD_ONCE_INIT;
 pthread_mutex_t s_lock = PTHREAD_MUTEX_INITIALIZER;  // guards what follows; innermost of all locks
-std::vector<bool>* s_marked = nullptr;               // by descriptor number
+struct Mark {
+  std::uint64_t serial = 0;  // of the opening that the number belongs to; 0 for none
+  FileIdentity file;         // which it leads to, unless the host has closed it
+  bool closesInChild = false;
+};
+std::vector<Mark>* s_marks = nullptr;  // by descriptor number
+std::uint64_t s_serial = 0;
 unsigned s_forks = 0;
 
 void BeforeFork() {
@@ -30,13 +36,13 @@ void BeforeFork() {
 
 void InParent() { pthread_mutex_unlock(&s_lock); }
 
+// Makes system calls only, as other threads may have been anywhere at the fork.
 void InChild() {
-  if (s_marked != nullptr) {
-    for (std::size_t fd = 0; fd < s_marked->size(); ++fd) {
-      if (!(*s_marked)[fd]) continue;
-      ::close(static_cast<int>(fd));
-      (*s_marked)[fd] = false;
-    }
+  for (std::size_t fd = 0; s_marks != nullptr && fd < s_marks->size(); ++fd) {
+    Mark& mark = (*s_marks)[fd];
+    if (!mark.closesInChild) continue;
+    if (mark.file.isBehind(static_cast<int>(fd))) ::close(static_cast<int>(fd));
+    mark = Mark();
   }
   pthread_mutex_unlock(&s_lock);
 }
@@ -48,21 +54,24 @@ unsigned ForksSoFar() {
   return s_forks;
 }
 
-// Marks the descriptor unless there was a fork since the count was taken, which may have copied it.
-bool MarkIfNoFork(int fd, unsigned forks) {
+// Marks the descriptor and returns its serial number; 0 if there was a fork since the count was
+// taken, which may have copied it.
+std::uint64_t MarkIfNoFork(int fd, const FileIdentity& file, unsigned forks) {
   PosixMutexHold hold(s_lock);
-  if (s_forks != forks) return false;
-  if (s_marked == nullptr) s_marked = new std::vector<bool>;
+  if (s_forks != forks) return 0;
+  if (s_marks == nullptr) s_marks = new std::vector<Mark>;
   std::size_t index = static_cast<std::size_t>(fd);
-  if (s_marked->size() <= index) s_marked->resize(index + 64);
-  (*s_marked)[index] = true;
-  return true;
+  if (s_marks->size() <= index) s_marks->resize(index + 64);
+  (*s_marks)[index] = Mark{++s_serial, file, true};
+  return s_serial;
 }
 
-void Mark(int fd, bool marked) noexcept {
-  PosixMutexHold hold(s_lock);
+// The mark of this opening, in the hands of whoever holds the lock; null if another has the number.
+Mark* FindMark(int fd, std::uint64_t serial) noexcept {
   std::size_t index = static_cast<std::size_t>(fd);
-  if (s_marked != nullptr && index < s_marked->size()) (*s_marked)[index] = marked;
+  if (s_marks == nullptr || index >= s_marks->size()) return nullptr;
+  Mark& mark = (*s_marks)[index];
+  return mark.serial == serial ? &mark : nullptr;
 }
 
 }  // namespace
@@ -72,7 +81,9 @@ CloseOnForkFd::CloseOnForkFd(CloseOnForkFd&& other) noexcept { *this = std::move
 CloseOnForkFd& CloseOnForkFd::operator=(CloseOnForkFd&& other) noexcept {
   reset();
   m_fd = std::exchange(other.m_fd, -1);
-  m_pid = other.m_pid;
+  m_serial = other.m_serial;
+  m_file = other.m_file;
+  m_process = other.m_process;
   m_kept = other.m_kept;
   return *this;
 }
@@ -82,23 +93,44 @@ CloseOnForkFd CloseOnForkFd::OpenShared(const AnsiString& path) {
   for (;;) {
     unsigned forks = ForksSoFar();
     ScopedFd fd(CreateSharedUnixFile(path));
-    if (MarkIfNoFork(fd.get(), forks)) return CloseOnForkFd(fd.release(), getpid());
+    CloseOnForkFd result;
+    result.m_file = FileIdentity::Of(fd.get());
+    result.m_serial = MarkIfNoFork(fd.get(), result.m_file, forks);
     // The copy in the child is of an open file that nobody locks; this process takes another.
+    if (result.m_serial == 0) continue;
+    result.m_process = ProcessMark::Current();
+    result.m_fd = fd.release();
+    return result;
   }
+}
+
+// What came through fork() is asked for without the lock, as it may be let go under one that a fork
+// takes after this one.
+int CloseOnForkFd::get() const noexcept {
+  if (!valid()) return -1;
+  if (!m_process.isCurrent()) {
+    if (!m_kept) return -1;
+  } else {
+    PosixMutexHold hold(s_lock);
+    if (FindMark(m_fd, m_serial) == nullptr) return -1;
+  }
+  return m_file.isBehind(m_fd) ? m_fd : -1;
 }
 
 void CloseOnForkFd::keepOnFork(bool keep) noexcept {
   if (!valid()) return;
-  Mark(m_fd, !keep);
+  PosixMutexHold hold(s_lock);
+  if (Mark* mark = FindMark(m_fd, m_serial)) mark->closesInChild = !keep;
   m_kept = keep;
 }
 
 void CloseOnForkFd::reset() noexcept {
-  if (!valid()) return;
-  bool ours = m_pid == getpid();
-  // Before the descriptor is closed, as its number may serve another file then.
-  if (ours) Mark(m_fd, false);
-  ScopedFd closes(ours || m_kept ? m_fd : -1);
+  ScopedFd closes(get());
+  if (valid() && m_process.isCurrent()) {
+    // Before the descriptor is closed, as its number may serve another file then.
+    PosixMutexHold hold(s_lock);
+    if (Mark* mark = FindMark(m_fd, m_serial)) *mark = Mark();
+  }
   m_fd = -1;
 }
 

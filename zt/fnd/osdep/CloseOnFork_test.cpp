@@ -7,11 +7,13 @@
 #include <unistd.h>
 
 #include <atomic>
+#include <cerrno>
 #include <string>
 #include <thread>
 #include <vector>
 
 #include "tests/support/Child.h"
+#include "tests/support/HostsFile.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
@@ -21,20 +23,22 @@ namespace zt::fnd::osdep {
 namespace {
 
 using vlt::test::Child;
+using vlt::test::HostsFile;
+using vlt::test::IsOpen;
 using vlt::test::PosixErrorOf;
 using vlt::test::TempDir;
 
 AnsiString Path(const TempDir& dir, const char* name) { return AnsiString((dir / name).c_str()); }
 
-bool IsOpen(int fd) { return fcntl(fd, F_GETFD) != -1; }
-
 TEST(ForkClose, ChildHasTheDescriptorClosedAndTheParentKeepsItsLock) {
   TempDir dir;
   CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
-  ASSERT_EQ(0, Flock(fd.get(), LOCK_EX));
-  Child child([&] { return IsOpen(fd.get()) ? 1 : 0; });
+  const int number = fd.get();
+  ASSERT_EQ(0, Flock(number, LOCK_EX));
+  Child child([&] { return IsOpen(number) || fd.get() != -1 ? 1 : 0; });
   EXPECT_EQ(0, child.wait());
-  EXPECT_TRUE(IsOpen(fd.get()));
+  EXPECT_TRUE(IsOpen(number));
+  EXPECT_EQ(number, fd.get());
   ScopedFd other(::open((dir / "file").c_str(), O_RDWR | O_CLOEXEC));
   EXPECT_NE(0, Flock(other.get(), LOCK_EX | LOCK_NB));
 }
@@ -64,30 +68,68 @@ TEST(ForkClose, LockOfAKilledParentDoesNotOutliveItInTheChild) {
 TEST(ForkClose, UnmarkedAndRemarkedDescriptors) {
   TempDir dir;
   CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
+  const int number = fd.get();
   fd.keepOnFork(true);
   Child keeps([&] {
-    int number = fd.get();
-    if (!IsOpen(number)) return 1;
+    if (!IsOpen(number) || fd.get() != number) return 1;
     fd.reset();
     return IsOpen(number) ? 2 : 0;
   });
   EXPECT_EQ(0, keeps.wait());
   fd.keepOnFork(false);
-  Child closes([&] { return IsOpen(fd.get()) ? 1 : 0; });
+  Child closes([&] { return IsOpen(number) ? 1 : 0; });
   EXPECT_EQ(0, closes.wait());
 }
 
 TEST(ForkClose, GrandchildDoesNotCloseTheNumberAgain) {
   TempDir dir;
   CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
+  const int number = fd.get();
   Child child([&] {
     ScopedFd reused(::open("/dev/null", O_RDONLY | O_CLOEXEC));
-    if (reused.get() != fd.get()) return 1;
+    if (reused.get() != number) return 1;
     Child grandchild([&] { return IsOpen(reused.get()) ? 0 : 2; });
     int code = grandchild.wait();
     fd.reset();  // nor does the object
     return code == 0 && !IsOpen(reused.get()) ? 3 : code;
   });
+  EXPECT_EQ(0, child.wait());
+}
+
+// Daemons close all descriptors they find, and open others.
+TEST(ForkClose, NumberThatTheHostHasTakenIsTheHosts) {
+  TempDir dir;
+  CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
+  CloseOnForkFd kept = CloseOnForkFd::OpenShared(Path(dir, "kept"));
+  kept.keepOnFork(true);
+  HostsFile one(dir / "one", fd.get()), two(dir / "two", kept.get());
+  EXPECT_EQ(-1, fd.get());
+  EXPECT_EQ(-1, kept.get());
+  EXPECT_TRUE(fd.valid());
+  Child child([&] {
+    kept.reset();
+    return one.isOpen() && two.isOpen() ? 0 : 1;
+  });
+  EXPECT_EQ(0, child.wait());
+  errno = EDOM;
+  fd.reset();
+  kept.reset();
+  EXPECT_EQ(EDOM, errno);
+  EXPECT_TRUE(one.isOpen() && two.isOpen());
+}
+
+TEST(ForkClose, NumberThatAnotherObjectHasGotIsTheOthers) {
+  TempDir dir;
+  CloseOnForkFd first = CloseOnForkFd::OpenShared(Path(dir, "file"));
+  const int number = first.get();
+  ::close(number);
+  CloseOnForkFd second = CloseOnForkFd::OpenShared(Path(dir, "file"));
+  ASSERT_EQ(number, second.get());
+  EXPECT_EQ(-1, first.get());
+  first.keepOnFork(true);
+  first.reset();
+  EXPECT_EQ(number, second.get());
+  Child child([&] { return IsOpen(number) ? 1 : 0; });
   EXPECT_EQ(0, child.wait());
 }
 

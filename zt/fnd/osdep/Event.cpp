@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/PosixMutexHold.h"
 
 namespace zt {
 namespace fnd {
@@ -14,17 +15,6 @@ namespace osdep {
 namespace {
 
 constexpr unsigned int kNoLimit = 0xFFFFFFFFu;
-
-class MutexHold {
- public:
-  explicit MutexHold(pthread_mutex_t* mutex) : m_mutex(mutex) { pthread_mutex_lock(m_mutex); }
-  ~MutexHold() { pthread_mutex_unlock(m_mutex); }
-  MutexHold(const MutexHold&) = delete;
-  MutexHold& operator=(const MutexHold&) = delete;
-
- private:
-  pthread_mutex_t* m_mutex;
-};
 
 timespec DeadlineIn(unsigned int ms) {
   timeval now;
@@ -64,7 +54,7 @@ Event::Event(bool manualReset, bool initialState) : m_block(new Block(manualRese
 Event::~Event() { delete m_block; }
 
 void Event::set() const {
-  MutexHold hold(&m_block->mutex);
+  PosixMutexHold hold(m_block->mutex);
   m_block->signaled = true;
   if (m_block->manualReset) {
     pthread_cond_broadcast(&m_block->condition);
@@ -74,7 +64,7 @@ void Event::set() const {
 }
 
 void Event::reset() const {
-  MutexHold hold(&m_block->mutex);
+  PosixMutexHold hold(m_block->mutex);
   m_block->signaled = false;
 }
 
@@ -83,12 +73,12 @@ void Event::resetIfAuto() {
 }
 
 bool Event::check() const {
-  MutexHold hold(&m_block->mutex);
+  PosixMutexHold hold(m_block->mutex);
   return m_block->take();
 }
 
 void Event::wait() const {
-  MutexHold hold(&m_block->mutex);
+  PosixMutexHold hold(m_block->mutex);
   while (!m_block->signaled) pthread_cond_wait(&m_block->condition, &m_block->mutex);
   m_block->take();
 }
@@ -100,7 +90,7 @@ bool Event::wait(unsigned int ms) const {
     return true;
   }
   timespec deadline = DeadlineIn(ms);
-  MutexHold hold(&m_block->mutex);
+  PosixMutexHold hold(m_block->mutex);
   while (!m_block->signaled) {
     if (pthread_cond_timedwait(&m_block->condition, &m_block->mutex, &deadline) != 0) break;
   }

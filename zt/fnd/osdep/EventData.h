@@ -1,10 +1,9 @@
 #pragma once
 
-#include <sys/types.h>
-
 #include "zt/fnd/RefCounted.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/EventFile.h"
+#include "zt/fnd/osdep/ProcessMark.h"
 #include "zt/fnd/osdep/SemaphoreSet.h"
 
 namespace zt {
@@ -50,7 +49,7 @@ class EventData : public RefCountedCriticalSectionPolicy {
   void close();
 
   RefPtr<NamedEventGlobalStatics> m_statics;
-  const pid_t m_pid;
+  const ProcessMark m_process;
   const String m_name;
   const bool m_manualReset;
   EventFile m_file;

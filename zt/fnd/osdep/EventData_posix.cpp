@@ -1,5 +1,4 @@
 #include <sys/stat.h>
-#include <unistd.h>
 
 #include <cerrno>
 #include <string>
@@ -49,7 +48,7 @@ bool ReadPlace(const EventFile& file, EventPlace& place) {
 EventData::EventData(NamedEventGlobalStatics& statics, const String& name, bool manualReset)
     : RefCountedCriticalSectionPolicy(&statics.section),
       m_statics(&statics),
-      m_pid(getpid()),
+      m_process(ProcessMark::Current()),
       m_name(name),
       m_manualReset(manualReset) {}
 
@@ -157,7 +156,7 @@ bool EventData::join(const EventFile& file) {
 // ---- closing
 
 void EventData::drop() {
-  if (m_pid != getpid()) {
+  if (!m_process.isCurrent()) {
     NamedEventGlobalStatics::ReleaseInherited(*this);
     return;
   }
@@ -166,7 +165,7 @@ void EventData::drop() {
 }
 
 EventData::~EventData() {
-  if (m_pid != getpid()) {
+  if (!m_process.isCurrent()) {
     // The statics of the parent are out of bounds; what is this process's own is the descriptors.
     m_statics.detach();
     if (SemaphoreSet* set = m_set.detach()) set->RefCountedThreadUnsafePolicy::release();

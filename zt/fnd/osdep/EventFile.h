@@ -8,6 +8,7 @@
 
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/CloseOnFork.h"
+#include "zt/fnd/osdep/ProcessMark.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 
 namespace zt {
@@ -25,8 +26,9 @@ bool GetLockAccessToFile(int fd);
 // The lock tells who is there: everybody who uses the file shares it, so that the last one, and only
 // the last, can have it alone; the kernel drops it when a process dies. A child that is forked while
 // a file is being opened or closed has no copy of it; a copy of a settled file counts as one more
-// user. An object that came through fork() never unlocks what its parent holds. Threads: one at a
-// time.
+// user. An object that came through fork() never unlocks what its parent holds. After the host has
+// closed the descriptor everything fails, and nothing touches what has got its number.
+// Threads: one at a time.
 class EventFile {
  public:
   EventFile() = default;  // none
@@ -75,11 +77,10 @@ class EventFile {
 
   std::unique_ptr<const AnsiString> m_path;  // a pointer, as moving a string can fail
   CloseOnForkFd m_fd;
-  pid_t m_pid = 0;
+  ProcessMark m_process;
   bool m_exclusive = false;
   bool m_discard = false;
   key_t m_key = -1;
-  FileIdentity m_identity;
 };
 
 }  // namespace osdep

@@ -39,7 +39,7 @@ bool GetLockAccessToFile(int fd) {
 EventFile::EventFile(const AnsiString& path)
     : m_path(std::make_unique<const AnsiString>(path)),
       m_fd(CloseOnForkFd::OpenShared(path)),
-      m_pid(getpid()) {}
+      m_process(ProcessMark::Current()) {}
 
 EventFile::EventFile(EventFile&& other) noexcept { *this = std::move(other); }
 
@@ -47,11 +47,10 @@ EventFile& EventFile::operator=(EventFile&& other) noexcept {
   close();
   m_path = std::move(other.m_path);
   m_fd = std::move(other.m_fd);
-  m_pid = other.m_pid;
+  m_process = other.m_process;
   m_exclusive = other.m_exclusive;
   m_discard = other.m_discard;
   m_key = other.m_key;
-  m_identity = other.m_identity;
   return *this;
 }
 
@@ -69,14 +68,13 @@ EventFile EventFile::Open(const String& name) {
 bool EventFile::identify() {
   struct stat info;
   if (::fstat(m_fd.get(), &info) != 0) ZT_RAISE(PosixError());
-  m_identity = FileIdentity::Of(m_fd.get());
   m_discard = info.st_size == 0;
   m_key = RetryEintr([&] { return ::ftok(m_path->c_str(), kProject); });
   if (m_key == -1) {
     if (errno != ENOENT) ZT_RAISE(PosixError());
     return false;
   }
-  return m_identity.isNamedBy(*m_path);
+  return m_fd.identity().isNamedBy(*m_path);
 }
 
 bool EventFile::read(void* bytes, std::size_t n, std::uint64_t offset) const noexcept {
@@ -109,13 +107,13 @@ bool EventFile::claim() noexcept {
 }
 
 bool EventFile::unlink() const noexcept {
-  if (!m_identity.isNamedBy(*m_path)) return false;
+  if (!m_fd.identity().isNamedBy(*m_path)) return false;
   return RetryEintr([&] { return ::unlink(m_path->c_str()); }) == 0;
 }
 
 void EventFile::close() noexcept {
   if (!m_fd.valid()) return;
-  if (m_pid == getpid()) {
+  if (m_process.isCurrent()) {
     int saved = errno;
     if (m_discard && m_exclusive) unlink();
     Flock(m_fd.get(), LOCK_UN);

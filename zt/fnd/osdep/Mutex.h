@@ -11,7 +11,8 @@ namespace osdep {
 // An flock() on the file "mutex/" + name of the shared directory (SharedUnixObject.h), for the
 // processes, and a section shared by the objects of one name in a process, for its threads. The
 // kernel drops the file lock when the holder dies, so there is no abandoned state. The file stays
-// behind; if it is removed or replaced, the next taker makes it anew.
+// behind; if it is removed or replaced, the next taker makes it anew. So it is after the host has
+// closed the descriptor, as daemons do; whatever has got the number since is left alone.
 //
 // Recursive for the thread that holds it, per object: a second object of the name in the same
 // thread passes the section and waits in flock, as it is another owner of the file. Names that

@@ -1,13 +1,12 @@
 #pragma once
 
-#include <sys/types.h>
-
 #include <map>
 #include <memory>
 
 #include "zt/fnd/RefCounted.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/CriticalSection.h"
+#include "zt/fnd/osdep/ProcessMark.h"
 
 namespace zt {
 namespace fnd {
@@ -36,7 +35,7 @@ class MutexGlobalStatics : public RefCountedThreadSafePolicy {
   Map::iterator attach(const String& name) EXCLUDES(section);
   void detach(Map::iterator data) EXCLUDES(section);
 
-  const pid_t pid;
+  const ProcessMark process;
   MutexGlobalStatics* inherited = nullptr;  // list of those that this process may not use
 
   // Guards the map and the hold counts of the Mutex objects; never held across a wait.

@@ -1,14 +1,12 @@
 #include "zt/fnd/osdep/MutexGlobalStatics.h"
 
-#include <unistd.h>
-
 #include "zt/fnd/osdep/ProcessStatics.h"
 
 namespace zt {
 namespace fnd {
 namespace osdep {
 
-MutexGlobalStatics::MutexGlobalStatics() : pid(getpid()) {}
+MutexGlobalStatics::MutexGlobalStatics() : process(ProcessMark::Current()) {}
 
 RefPtr<MutexGlobalStatics> MutexGlobalStatics::Get() {
   return ProcessStatics<MutexGlobalStatics>::Get();

@@ -1,8 +1,7 @@
 #include <sys/file.h>
-#include <unistd.h>
 
-#include <atomic>
 #include <cerrno>
+#include <exception>
 #include <utility>
 
 #include "zt/fnd/Exception.h"
@@ -11,6 +10,7 @@
 #include "zt/fnd/osdep/Mutex.h"
 #include "zt/fnd/osdep/MutexGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/ProcessMark.h"
 #include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 #include "zt/fnd/osdep/path.h"
@@ -55,13 +55,12 @@ struct Mutex::Record {
         statics(MutexGlobalStatics::Get()),
         file(BuildSharedUnixFilePath(String(kDirectory), name)),
         fd(CloseOnForkFd::OpenShared(file)),
-        identity(FileIdentity::Of(fd.get())),
         data(statics->attach(name)),
-        pid(statics->pid) {}
+        process(statics->process) {}
 
   ~Record();
 
-  bool ofThisProcess() const { return pid.load(std::memory_order_acquire) == getpid(); }
+  bool ofThisProcess() const { return process.isCurrent(); }
   void renewAfterFork();
   void reopen();
   bool addHoldIfHeld();
@@ -75,13 +74,12 @@ struct Mutex::Record {
   // Changed by the section's owner alone, under the statics' section, so that other threads may
   // read it there.
   CloseOnForkFd fd;
-  FileIdentity identity;
   MutexGlobalStatics::Map::iterator data;
   // How often the file lock was taken through this object, and how often the section was entered
   // for it. They differ after an unlock by a thread that does not own the section.
   int holds = 0;
   int entries = 0;
-  std::atomic<pid_t> pid;
+  ProcessMark process;
 };
 
 Mutex::Record::~Record() {
@@ -105,16 +103,14 @@ void Mutex::Record::renewAfterFork() {
   statics.detach();
   statics = fresh;
   fd = std::move(own);
-  identity = FileIdentity::Of(fd.get());
   holds = entries = 0;
-  pid.store(fresh->pid, std::memory_order_release);
+  process = fresh->process;  // last, as other threads ask for it first
 }
 
 void Mutex::Record::reopen() {
   CloseOnForkFd own = OpenLockFile(file);
   CriticalSectionGuard guard(statics->section);
   fd = std::move(own);
-  identity = FileIdentity::Of(fd.get());
 }
 
 // Counts a further lock of the thread that holds the file already.
@@ -126,14 +122,19 @@ bool Mutex::Record::addHoldIfHeld() {
   return true;
 }
 
-// Takes the file lock; false with flock's errno. A lock on a file that the path no longer names
-// excludes nobody who comes later, so the new file is locked instead.
+// Takes the file lock; false with flock's errno, and not locked when reopen() throws. A lock on a
+// file that the path no longer names excludes nobody who comes later, so the new file is locked
+// instead.
 bool Mutex::Record::takeFile(int operation, int attempts) {
   for (int attempt = 1;; ++attempt) {
-    if (Flock(fd.get(), operation) != 0) return false;
-    if (identity.isNamedBy(file)) return true;
+    int number = fd.get();  // none, if the host has closed it
+    if (number >= 0) {
+      if (Flock(number, operation) != 0) return false;
+      if (fd.identity().isNamedBy(file)) return true;
+      // At once, as it may not come to a new file: those who wait for this one have to see it, too.
+      Flock(number, LOCK_UN);
+    }
     if (attempt == attempts) {
-      Flock(fd.get(), LOCK_UN);
       errno = EWOULDBLOCK;
       return false;
     }
@@ -178,7 +179,7 @@ bool Mutex::tryLock() const {
     if (!record.takeFile(LOCK_EX | LOCK_NB, kReplacedFiles)) return false;
     record.finishLock(entry);
     return true;
-  } catch (const exception::Exception&) {  // A file that cannot be made anew is a lock not taken.
+  } catch (const std::exception&) {  // A file that cannot be made anew, or no memory to do it.
     return false;
   }
 }

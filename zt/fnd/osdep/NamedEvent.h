@@ -30,10 +30,10 @@ class EventData;
 class NamedEvent {
  public:
   // Opens or joins the event; `initialState` counts only where no process has it. Waits up to half a
-  // second for others who are opening or closing it, and for the mutex of the state files. Throws
-  // PosixError: EINVAL if this process has the event with the other kind of reset, ENOLCK if another
-  // process has, if it cannot be joined, or if no semaphore can be had; and what CreateSharedUnixFile
-  // and Mutex::lock throw.
+  // second for somebody who has its file alone, tries again for up to two seconds where it is closed
+  // while it is joined, and waits for the mutex of the state files. Throws PosixError: EINVAL if this
+  // process has the event with the other kind of reset, ENOLCK if another process has, if it cannot
+  // be joined, or if no semaphore can be had; and what CreateSharedUnixFile and Mutex::lock throw.
   NamedEvent(const String& name, bool manualReset, bool initialState);
   ~NamedEvent();
   NamedEvent(const NamedEvent&) = delete;

@@ -13,7 +13,9 @@
 #include "tests/support/Child.h"
 #include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
+#include "tests/support/InChild.h"
 #include "tests/support/NamedEventFiles.h"
+#include "tests/support/ScopedLocale.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/NamedEvent.h"
@@ -39,6 +41,26 @@ typedef EventPlace::Slot Slot;
 constexpr auto Open = [](const std::string& name, bool manual = kManual, bool initial = kClear) {
   return vlt::test::OpenEvent(name, manual, initial);
 };
+
+// ---- the host's locale
+
+// The order of names is that of the C locale's upper case, which the host may change at any time.
+TEST(NamedEventFiles, ClosesUnderAnotherLocaleThanItWasOpenedUnder) {
+  EventPlace place;
+  EXPECT_EQ(0, vlt::test::InChild([&] {
+              vlt::test::ScopedLocale plain(LC_ALL, "C");
+              auto first = std::make_unique<NamedEvent>(L"\xCA", kManual, kClear);
+              auto second = std::make_unique<NamedEvent>(L"\xE9", kManual, kClear);
+              vlt::test::ScopedLocale utf8(LC_CTYPE, "C.UTF-8");
+              second.reset();
+              first.reset();
+              ASSERT_EQ(Names(), place.files());
+              NamedEvent again(L"\xE9", kAutomatic, kSet);
+              EXPECT_TRUE(Exists(place.file("\xC3\xA9")));
+              EXPECT_TRUE(again.check());
+              EXPECT_FALSE(again.check());
+            }));
+}
 
 // ---- processes that die
 

@@ -1,7 +1,5 @@
 #pragma once
 
-#include <sys/types.h>
-
 #include <map>
 
 #include "zt/fnd/RefCounted.h"
@@ -9,6 +7,7 @@
 #include "zt/fnd/osdep/CriticalSection.h"
 #include "zt/fnd/osdep/EventData.h"
 #include "zt/fnd/osdep/Mutex.h"
+#include "zt/fnd/osdep/ProcessMark.h"
 #include "zt/fnd/osdep/SemaphoreSet.h"
 
 namespace zt {
@@ -57,7 +56,7 @@ class NamedEventGlobalStatics : public RefCountedThreadSafePolicy {
   // Counts an event down that came through fork(), whose own section cannot be entered.
   static void ReleaseInherited(const EventData& event);
 
-  const pid_t pid;
+  const ProcessMark process;
   NamedEventGlobalStatics* inherited = nullptr;  // list of those that this process may not use
   CriticalSection section;                       // recursive
   Mutex stateFileMutex;

@@ -22,7 +22,8 @@ constexpr unsigned kJoinPatienceMs = 2000;
 }  // namespace
 
 NamedEventGlobalStatics::NamedEventGlobalStatics()
-    : pid(getpid()), stateFileMutex(String(L"zt_fnd_osdep_NamedEvent_StateFileMutex")) {}
+    : process(ProcessMark::Current()),
+      stateFileMutex(String(L"zt_fnd_osdep_NamedEvent_StateFileMutex")) {}
 
 RefPtr<NamedEventGlobalStatics> NamedEventGlobalStatics::Get() {
   return ProcessStatics<NamedEventGlobalStatics>::Get();
@@ -47,7 +48,7 @@ RefPtr<EventData> NamedEventGlobalStatics::getOrCreateNamedEvent(const String& n
     RefPtr<EventData> event = openOrFind(name, manualReset, initialState);
     if (event) return event;
     if (MonotonicTicks() >= end) ZT_RAISE(PosixError(ENOLCK));
-    Sleep(1 + (static_cast<unsigned>(pid) + attempt) % 5);
+    Sleep(1 + (static_cast<unsigned>(getpid()) + attempt) % 5);
   }
 }
 
@@ -75,7 +76,13 @@ void NamedEventGlobalStatics::removeSemaphoreSet(const SemaphoreSet& set) {
 void NamedEventGlobalStatics::removeNamedEvent(const EventData& event) {
   CriticalSectionGuard guard(section);
   auto found = m_events.find(event.name());
-  if (found != m_events.end() && found->second == &event) m_events.erase(found);
+  if (found != m_events.end() && found->second == &event) {
+    m_events.erase(found);
+    return;
+  }
+  // The map's order is that of the process's locale: after a change of it the name need not lead
+  // here, but the pointer must not stay behind.
+  std::erase_if(m_events, [&](const auto& entry) { return entry.second == &event; });
 }
 
 bool NamedEventGlobalStatics::hasSemaphoreSetOfId(int id) const {

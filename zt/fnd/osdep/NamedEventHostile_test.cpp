@@ -20,6 +20,7 @@
 #include "tests/support/Child.h"
 #include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
+#include "tests/support/HostsFile.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/ThreadState.h"
@@ -32,9 +33,11 @@ namespace zt::fnd::osdep {
 namespace {
 
 using vlt::test::Child;
+using vlt::test::DescriptorOf;
 using vlt::test::EventPlace;
 using vlt::test::Eventually;
 using vlt::test::Exists;
+using vlt::test::HostsFile;
 using vlt::test::kAutomatic;
 using vlt::test::kClear;
 using vlt::test::Keeper;
@@ -44,6 +47,7 @@ using vlt::test::OpenDescriptors;
 using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
 using vlt::test::Sleeps;
+using vlt::test::TempDir;
 using vlt::test::Wide;
 using vlt::test::WriteBytes;
 using Clock = std::chrono::steady_clock;
@@ -396,6 +400,29 @@ TEST(NamedEventHostile, ReplacedStateFileIsLeftToItsOwners) {
   EXPECT_EQ(-1, EventPlace::ValueOf(id, 0));
   EXPECT_EQ((Names{"fresh", "sem_1"}), place.files());
   EXPECT_TRUE(fresh.finish());
+  EXPECT_EQ(Names(), place.files());
+}
+
+// ---- the descriptors
+
+TEST(NamedEventHostile, DescriptorsThatTheHostHasTakenAreTheHosts) {
+  EventPlace place;
+  TempDir dir;
+  auto event = Open("name");
+  HostsFile lock(dir / "lock", DescriptorOf(place.file("name")));
+  HostsFile state(dir / "state", DescriptorOf(place.file("sem_1")));
+  ASSERT_TRUE(lock.lock() && state.lock());
+  event->set();
+  EXPECT_TRUE(event->check());
+  Child child([] { return 0; });
+  EXPECT_EQ(0, child.wait());
+  event.reset();
+  for (const HostsFile* file : {&lock, &state}) {
+    EXPECT_TRUE(file->isOpen() && file->unchanged());
+    EXPECT_FALSE(file->free());
+  }
+  EXPECT_EQ((Names{"name", "sem_1"}), place.files());  // as a killed process leaves it
+  Open("name");
   EXPECT_EQ(Names(), place.files());
 }
 

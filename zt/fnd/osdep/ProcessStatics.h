@@ -1,37 +1,24 @@
 #pragma once
 
 #include <pthread.h>
-#include <sys/types.h>
-#include <unistd.h>
 
 #include <cstdlib>
 #include <utility>
 
 #include "zt/fnd/RefCounted.h"
+#include "zt/fnd/osdep/PosixMutexHold.h"
 
 namespace zt {
 namespace fnd {
 namespace osdep {
 
-// Holds a plain POSIX mutex for a scope; for locks that are taken across fork().
-class PosixMutexHold {
- public:
-  explicit PosixMutexHold(pthread_mutex_t& mutex) : m_mutex(mutex) { pthread_mutex_lock(&m_mutex); }
-  ~PosixMutexHold() { pthread_mutex_unlock(&m_mutex); }
-  PosixMutexHold(const PosixMutexHold&) = delete;
-  PosixMutexHold& operator=(const PosixMutexHold&) = delete;
-
- private:
-  pthread_mutex_t& m_mutex;
-};
-
 // The one Statics of this process: made on demand, shared by reference, let go at exit.
 //
 // A forked child starts without. What it inherits, a thread that is not in the child may have been
 // changing at the fork: it is never touched nor released again, but kept in sight of leak checkers.
-// Statics is reference-counted, is told its process by `const pid_t pid`, and lends the list of the
-// inherited ones its `Statics* inherited`. All functions may be called by any thread at any time,
-// before the first initialiser and after the last destructor, too.
+// Statics is reference-counted, is told its process by `const ProcessMark process`, and lends the
+// list of the inherited ones its `Statics* inherited`. All functions may be called by any thread at
+// any time, before the first initialiser and after the last destructor, too.
 template <class Statics>
 class ProcessStatics {
  public:
@@ -59,9 +46,8 @@ class ProcessStatics {
   static pthread_mutex_t& Lock() { return s_lock; }
 
  private:
-  // The process id tells a child apart that was made without the handlers of fork(), too.
   static void DropInherited() {
-    if (s_statics == nullptr || s_statics->pid == getpid()) return;
+    if (s_statics == nullptr || s_statics->process.isCurrent()) return;
     s_statics->inherited = std::exchange(s_inherited, s_statics);
     s_statics = nullptr;
   }

@@ -31,21 +31,6 @@ class ScopedFd {
 // flock() without EINTR: 0, or -1 with errno.
 int Flock(int fd, int operation) noexcept;
 
-// A lock that flock() gave on a descriptor, freed at the end. The descriptor must outlive it.
-class ScopedFlock {
- public:
-  explicit ScopedFlock(int lockedFd) noexcept : m_fd(lockedFd) {}
-  ~ScopedFlock();
-  ScopedFlock(const ScopedFlock&) = delete;
-  ScopedFlock& operator=(const ScopedFlock&) = delete;
-
-  // The lock stays when the object goes.
-  void keep() noexcept { m_fd = -1; }
-
- private:
-  int m_fd;
-};
-
 }  // namespace osdep
 }  // namespace fnd
 }  // namespace zt

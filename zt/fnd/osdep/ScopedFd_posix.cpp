@@ -20,13 +20,6 @@ int Flock(int fd, int operation) noexcept {
   return RetryEintr([&] { return ::flock(fd, operation); });
 }
 
-ScopedFlock::~ScopedFlock() {
-  if (m_fd < 0) return;
-  int saved = errno;
-  Flock(m_fd, LOCK_UN);
-  errno = saved;
-}
-
 }  // namespace osdep
 }  // namespace fnd
 }  // namespace zt

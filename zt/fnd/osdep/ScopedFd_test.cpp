@@ -7,14 +7,16 @@
 
 #include <cerrno>
 
+#include "tests/support/HostsFile.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/osdep/Retry.h"
 
 namespace zt::fnd::osdep {
 namespace {
 
+using vlt::test::IsOpen;
+
 int OpenNull() { return ::open("/dev/null", O_RDONLY | O_CLOEXEC); }
-bool IsOpen(int fd) { return fcntl(fd, F_GETFD) != -1; }
 
 TEST(FileScopedFd, ClosesOnceAndKeepsErrno) {
   int fd = OpenNull();
@@ -43,22 +45,15 @@ TEST(FileScopedFd, MovesAndReleases) {
   EXPECT_FALSE(IsOpen(fd));
 }
 
-TEST(FileScopedFlock, FreesTheLockUnlessKept) {
+TEST(FileFlock, FailsWithErrnoWhileAnotherHasTheLock) {
   vlt::test::TempDir dir;
   auto open = [&] { return ::open((dir / "f").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600); };
   ScopedFd a(open()), b(open());
-  {
-    ASSERT_EQ(0, Flock(a.get(), LOCK_EX));
-    ScopedFlock hold(a.get());
-    EXPECT_EQ(-1, Flock(b.get(), LOCK_EX | LOCK_NB));
-    EXPECT_EQ(EWOULDBLOCK, errno);
-  }
+  ASSERT_EQ(0, Flock(a.get(), LOCK_EX));
+  EXPECT_EQ(-1, Flock(b.get(), LOCK_EX | LOCK_NB));
+  EXPECT_EQ(EWOULDBLOCK, errno);
+  EXPECT_EQ(0, Flock(a.get(), LOCK_UN));
   EXPECT_EQ(0, Flock(b.get(), LOCK_EX | LOCK_NB));
-  {
-    ScopedFlock hold(b.get());
-    hold.keep();
-  }
-  EXPECT_EQ(-1, Flock(a.get(), LOCK_EX | LOCK_NB));
 }
 
 TEST(FileRetry, RepeatsInterruptedCallsOnly) {

@@ -71,7 +71,7 @@ class SemaphoreSet : public RefCountedCriticalSectionPolicy {
   // Holds the process's statics, and with them the section in which objects are counted.
   RefPtr<NamedEventGlobalStatics> m_statics;
   const unsigned m_number;
-  const pid_t m_pid;
+  const ProcessMark m_process;
   EventFile m_file;
   int m_id = -1;
   bool m_made = false;  // the set is this object's own making

@@ -2,7 +2,6 @@
 
 #include <sys/ipc.h>
 #include <sys/sem.h>
-#include <unistd.h>
 
 #include <cerrno>
 #include <cstring>
@@ -41,7 +40,7 @@ SemaphoreSet::SemaphoreSet(NamedEventGlobalStatics& statics, unsigned number)
     : RefCountedCriticalSectionPolicy(&statics.section),
       m_statics(&statics),
       m_number(number),
-      m_pid(getpid()) {
+      m_process(ProcessMark::Current()) {
   open();
 }
 
@@ -190,7 +189,7 @@ bool SemaphoreSet::setValue(unsigned slot, int value) const {
 // ---- closing
 
 SemaphoreSet::~SemaphoreSet() {
-  if (m_pid != getpid()) {
+  if (!m_process.isCurrent()) {
     // The statics of the parent are out of bounds, and only its descriptor is this process's own.
     m_statics.detach();
     return;

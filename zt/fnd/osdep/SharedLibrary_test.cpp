@@ -14,6 +14,7 @@
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/Bundle.h"
 #include "zt/fnd/osdep/OSException.h"
 
 namespace zt::fnd::osdep {
@@ -33,6 +34,18 @@ TEST(Library, EmptyNameLoadsNothing) {
   EXPECT_EQ(nullptr, none.getHandle());
   EXPECT_FALSE(SharedLibrary(String(), true, false).isLoaded());
   none.unload();
+}
+
+TEST(Library, RelativeNameInAWorkingDirectoryThatIsGoneLoadsNothing) {
+  TempDir dir;
+  vlt::test::Child child([&] {
+    if (chdir(dir.makeDir("gone").c_str()) != 0 || rmdir((dir / "gone").c_str()) != 0) return 1;
+    if (SharedLibrary(Wide("./foo"), true, false).isLoaded()) return 2;
+    if (SharedLibrary(Wide("sub/foo.framework"), true, false).isLoaded()) return 3;
+    if (Bundle(L"./foo").isOpened()) return 4;
+    return SharedLibrary(Wide("libm.so.6"), true, false).isLoaded() ? 0 : 5;  // needs no directory
+  });
+  EXPECT_EQ(0, child.wait());
 }
 
 TEST(Library, NameWithoutADotIsDecoratedInItsDirectory) {

@@ -23,8 +23,8 @@ AnsiString BuildSharedUnixFilePath(const String& dirName, const String& fileName
 
 // Makes the directory with all missing ones above it, and gives it mode 0777, also if it was there;
 // one that belongs to somebody else stays as it is. The path ends in "/". Throws PosixError: with
-// ENOTDIR where a file or a link stands in its place. Passes on AccessDenied from
-// path::CreateDir.
+// ENOTDIR where a file or a link stands in its place, and for a missing directory whose path does
+// not end in "/". Passes on AccessDenied from path::CreateDir.
 void CreateSharedUnixDir(const String& path);
 
 // Opens the file for reading and writing, made if missing, and gives it mode 0666; one that belongs
@@ -39,7 +39,12 @@ struct FileIdentity {
   dev_t device = 0;
   ino_t inode = 0;
 
+  // Throws PosixError.
   static FileIdentity Of(int fd);
+
+  // False if the descriptor leads to another file by now, or is closed. True when the system cannot
+  // be asked. Safe in a signal handler; keeps errno.
+  bool isBehind(int fd) const noexcept;
 
   // False if the path names another file by now, or none. True when it cannot be asked.
   bool isNamedBy(const AnsiString& path) const;

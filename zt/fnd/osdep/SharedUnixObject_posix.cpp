@@ -25,19 +25,20 @@ constexpr const char* kBaseVariable = "ZTFNDTMPSHAREDFILEDIR";
 constexpr mode_t kDirMode = 0777;
 constexpr mode_t kFileMode = 0666;
 constexpr int kRefusedDirs = 5;
-constexpr int kLostRaces = 100;  // one may be lost at each level of a path
+constexpr int kRounds = 100;  // a race may be lost at each level of a path
 constexpr int kRefusedOpens = 3;
 constexpr int kVanishedOpens = 100;
 
 // Makes the directories. Other processes make the same ones: the loser of a race finds a level that
-// stands already, and one of another user may be seen before its mode is set.
+// stands already, and one of another user may be seen before its mode is set. Nor is a success the
+// end: a path whose end is no "/" has its last component left out.
 void MakeDirectories(const String& path) {
-  for (int lost = 0, refused = 0; !path::IsDirectory(path.c_str());) {
+  int refused = 0;
+  for (int round = 0; round < kRounds && !path::IsDirectory(path.c_str()); ++round) {
     try {
       path::CreateDir(path.c_str(), kDirMode);
     } catch (const exception::ObjectAlreadyExists&) {  // A level of a race, or a file for good.
-      if (++lost >= kLostRaces) return;
-    } catch (const exception::AccessDenied&) {  // A level whose mode is about to be opened.
+    } catch (const exception::AccessDenied&) {         // A level whose mode is about to be opened.
       if (++refused >= kRefusedDirs) throw;
       Sleep(1);
     }
@@ -122,13 +123,21 @@ int CreateSharedUnixFile(const AnsiString& path) {
 }
 
 FileIdentity FileIdentity::Of(int fd) {
-  FileIdentity identity;
   struct stat info;
-  if (::fstat(fd, &info) == 0) {
-    identity.device = info.st_dev;
-    identity.inode = info.st_ino;
-  }
+  if (::fstat(fd, &info) != 0) ZT_RAISE(PosixError());
+  FileIdentity identity;
+  identity.device = info.st_dev;
+  identity.inode = info.st_ino;
   return identity;
+}
+
+bool FileIdentity::isBehind(int fd) const noexcept {
+  struct stat info;
+  int saved = errno;
+  bool known = ::fstat(fd, &info) == 0;
+  bool open = known || errno != EBADF;
+  errno = saved;
+  return known ? info.st_dev == device && info.st_ino == inode : open;
 }
 
 bool FileIdentity::isNamedBy(const AnsiString& path) const {

@@ -110,6 +110,29 @@ TEST(FileShared, FileInTheDirectorysPlaceIsENOTDIR) {
   EXPECT_EQ("x", ReadBytes(dir / "d"));
 }
 
+// The last component of such a path is not made, however often it is asked for.
+TEST(FileShared, PathThatEndsInNoDirectoryIsENOTDIR) {
+  TempDir dir;
+  Child child([&] {
+    if (PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "a/b")); }) != ENOTDIR) return 1;
+    String zero = Wide(dir / "c/d") + String(L"\0/e/", 4);
+    if (PosixErrorOf([&] { CreateSharedUnixDir(zero); }) != ENOTDIR) return 2;
+    setenv(kVariable, dir.path().c_str(), 1);
+    String name(L"f\0g", 3);
+    return PosixErrorOf([&] { BuildSharedUnixFilePath(name, L"name"); }) == ENOTDIR ? 0 : 3;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(0777, ModeOf(dir / "a"));
+  EXPECT_FALSE(vlt::test::Exists(dir / "a/b"));
+}
+
+TEST(FileShared, DirectoryNeedsNoSlashAtTheEndOnceItIsThere) {
+  TempDir dir;
+  ASSERT_EQ(0, mkdir((dir / "d").c_str(), 0700));
+  CreateSharedUnixDir(Wide(dir / "d"));
+  EXPECT_EQ(0777, ModeOf(dir / "d"));
+}
+
 TEST(FileShared, LinkInTheDirectorysPlaceIsNotFollowed) {
   TempDir dir;
   ASSERT_EQ(0, mkdir((dir / "target").c_str(), 0700));
@@ -142,7 +165,7 @@ TEST(FileShared, SimultaneousStartsAllSucceed) {
 }
 
 TEST(FileShared, DirectoryOfAnotherUserIsUsedAsItIs) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs to become another user";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   chmod(dir.path().c_str(), 0755);
   ASSERT_EQ(0, mkdir((dir / "d").c_str(), 0755));
@@ -161,7 +184,7 @@ TEST(FileShared, DirectoryOfAnotherUserIsUsedAsItIs) {
 }
 
 TEST(FileShared, OwnDirectoryThatMayNotBeReadIsOpenedToAll) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs to become another user";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   chmod(dir.path().c_str(), 0777);
   Child child([&] {
@@ -187,7 +210,7 @@ TEST(FileShared, DescriptorReadsWritesAndClosesOnExec) {
 }
 
 TEST(FileShared, FileOfAnotherUserIsUsedThoughItsModeCannotBeSet) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs to become another user";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   chmod(dir.path().c_str(), 0777);
   WriteBytes(dir / "f", "x");
@@ -204,7 +227,7 @@ TEST(FileShared, FileOfAnotherUserIsUsedThoughItsModeCannotBeSet) {
 }
 
 TEST(FileShared, RefusedFileIsTriedThreeTimes) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs to become another user";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   chmod(dir.path().c_str(), 0777);
   WriteBytes(dir / "f", "x");

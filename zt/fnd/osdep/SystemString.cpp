@@ -1,5 +1,6 @@
 #include "zt/fnd/osdep/SystemString.h"
 
+#include <cstdint>
 #include <cstring>
 #include <cwchar>
 #include <limits>
@@ -38,14 +39,6 @@ wchar_t* SystemAllocStringLen(const wchar_t* s, unsigned int n) {
 
 void SystemFreeString(wchar_t* s) {
   if (s != nullptr) DLLFree(reinterpret_cast<char*>(s) - sizeof(Count));
-}
-
-std::uint32_t SystemStringLen(const wchar_t* s) {
-  Count count = 0;
-  if (s != nullptr) {
-    std::memcpy(&count, reinterpret_cast<const char*>(s) - sizeof count, sizeof count);
-  }
-  return count;
 }
 
 }  // namespace osdep

@@ -1,7 +1,5 @@
 #pragma once
 
-#include <cstdint>
-
 namespace zt {
 namespace fnd {
 namespace osdep {
@@ -19,9 +17,6 @@ wchar_t* SystemAllocStringLen(const wchar_t* s, unsigned int n);
 
 // Null does nothing.
 void SystemFreeString(wchar_t* s);
-
-// The count of such a text; 0 for null.
-std::uint32_t SystemStringLen(const wchar_t* s);
 
 }  // namespace osdep
 }  // namespace fnd

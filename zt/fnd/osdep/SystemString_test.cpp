@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdint>
 #include <cstring>
 #include <cwchar>
 
@@ -12,13 +13,20 @@
 using namespace zt::fnd;
 using namespace zt::fnd::osdep;
 
+namespace {
+
+std::uint32_t CountOf(const wchar_t* s) {
+  std::uint32_t count;
+  std::memcpy(&count, reinterpret_cast<const char*>(s) - 4, 4);
+  return count;
+}
+
+}  // namespace
+
 TEST(TextSystemString, CountStandsInFrontOfTheText) {
   wchar_t* const s = SystemAllocStringLen(L"ab", 2);
-  std::uint32_t count;
-  std::memcpy(&count, reinterpret_cast<char*>(s) - 4, 4);
-  EXPECT_EQ(2u, count);
+  EXPECT_EQ(2u, CountOf(s));
   EXPECT_STREQ(L"ab", s);
-  EXPECT_EQ(2u, SystemStringLen(s));
   DLLFree(reinterpret_cast<char*>(s) - 4);
 }
 
@@ -28,7 +36,7 @@ TEST(TextSystemString, TakesForcedLengths) {
   SystemFreeString(part);
   wchar_t* const zeros = SystemAllocStringLen(L"a\0b", 3);
   EXPECT_EQ(0, std::wmemcmp(zeros, L"a\0b", 4));
-  EXPECT_EQ(3u, SystemStringLen(zeros));
+  EXPECT_EQ(3u, CountOf(zeros));
   SystemFreeString(zeros);
   wchar_t* const empty = SystemAllocStringLen(L"", 0);
   EXPECT_STREQ(L"", empty);
@@ -38,7 +46,7 @@ TEST(TextSystemString, TakesForcedLengths) {
 TEST(TextSystemString, NullTextLeavesRoomToFill) {
   wchar_t* const s = SystemAllocStringLen(nullptr, 5);
   ASSERT_NE(nullptr, s);
-  EXPECT_EQ(5u, SystemStringLen(s));
+  EXPECT_EQ(5u, CountOf(s));
   std::wmemset(s, L'x', 5);
   EXPECT_STREQ(L"xxxxx", s);
   SystemFreeString(s);
@@ -47,7 +55,7 @@ TEST(TextSystemString, NullTextLeavesRoomToFill) {
 TEST(TextSystemString, CopiesTerminatedText) {
   wchar_t* const s = SystemAllocString(L"text");
   EXPECT_STREQ(L"text", s);
-  EXPECT_EQ(4u, SystemStringLen(s));
+  EXPECT_EQ(4u, CountOf(s));
   SystemFreeString(s);
   EXPECT_EQ(nullptr, SystemAllocString(nullptr));
   SystemFreeString(nullptr);

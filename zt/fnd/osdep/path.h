@@ -74,8 +74,9 @@ class path {
   static void RemoveDir(const wchar_t* path);
   static void RemoveDirForce(const wchar_t* path);
 
-  // Replaces `to`. Does nothing where the names differ in case only. Between file systems the file
-  // is copied, then removed.
+  // Replaces `to`. Does nothing where the names differ in case only, or name one file. Between file
+  // systems the file is copied, and removed once the copy is on the disk; throws PosixError,
+  // without the copy, where it does not get there or the source cannot be removed.
   static void RenameFile(const String& from, const String& to);
   // Copies the bytes of a file; a new file has mode 0600. Does nothing where the names differ in
   // case only or name one file. Throws FileAlreadyExists for an existing `to` without overwrite,

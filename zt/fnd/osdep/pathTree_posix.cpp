@@ -1,4 +1,6 @@
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -13,6 +15,7 @@
 #include "zt/fnd/osdep/FindFiles.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/Retry.h"
+#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/path.h"
 
 // Renaming, copying and the operations on trees, which need files and listings.
@@ -34,14 +37,17 @@ void DemandAbsolute(const String& a, const String& b) {
   if (!path::IsAbs(a) || !path::IsAbs(b)) ZT_RAISE(exception::InvalidArgument());
 }
 
-// What an entry is, links followed.
+enum class Links { Followed, Themselves };
+
+// What an entry is.
 struct Entry {
   bool exists = false;
   struct stat info = {};
 
-  explicit Entry(const String& path) {
+  explicit Entry(const String& path, Links links = Links::Followed) {
     AnsiString narrow(path);
-    exists = RetryEintr([&] { return ::stat(narrow.c_str(), &info); }) == 0;
+    int flags = links == Links::Followed ? 0 : AT_SYMLINK_NOFOLLOW;
+    exists = RetryEintr([&] { return ::fstatat(AT_FDCWD, narrow.c_str(), &info, flags); }) == 0;
   }
   // A pipe or a device, which reading or writing could wait for without end.
   bool special() const { return exists && !S_ISREG(info.st_mode) && !S_ISDIR(info.st_mode); }
@@ -63,11 +69,41 @@ void CopyBytes(const BinaryFile& from, BinaryFile& to) {
   }
 }
 
-// The rename between file systems.
+// CpFile; leaves the copy open, or nothing where there is nothing to copy.
+void CopyInto(BinaryFile& copy, const String& from, const String& to, bool overwrite) {
+  DemandAbsolute(from, to);
+  if (!overwrite && path::DoesFileExist(to)) ZT_RAISE(exception::FileAlreadyExists());
+  if (SameFileByName(from, to)) return;
+  Entry source(from), target(to);
+  if (source.sameAs(target)) return;
+  if (source.special()) ZT_RAISE(exception::FileReadFailed());
+  if (target.special()) ZT_RAISE(exception::FileWriteFailed());
+  typedef BinaryFile::Mode Mode;
+  BinaryFile in;
+  in.open(from, Mode::Read);
+  Mode write = Mode::ReadWrite | Mode::Create;
+  copy.open(to, overwrite ? write | Mode::Truncate : write);
+  CopyBytes(in, copy);
+}
+
+// Puts the entries of the file's directory on the disk; one that may not be read is left to the
+// system.
+void SyncDirectoryOf(const String& file) {
+  AnsiString dir(path::DirName(file));
+  ScopedFd fd(RetryEintr([&] { return ::open(dir.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); }));
+  if (!fd.valid() || RetryEintr([&] { return ::fsync(fd.get()); }) == 0) return;
+  if (errno != EINVAL) ZT_RAISE(PosixError());  // some systems have no such thing for directories
+}
+
+// The rename between file systems. A crash finds at least one of the two files whole: the copy is
+// on the disk before the source goes.
 void CopyAndRemove(const String& from, const String& to) {
   if (path::DoesFileExist(to)) path::RemoveFile(to);
-  path::CpFile(from, to, false);
+  BinaryFile copy;
+  CopyInto(copy, from, to, false);
   try {
+    copy.sync();
+    SyncDirectoryOf(to);
     path::RemoveFile(from);
   } catch (...) {  // The file must not stand in two places; the first failure is the one to tell.
     AnsiString narrow(to);
@@ -149,23 +185,18 @@ void path::RenameFile(const String& from, const String& to) {
   AnsiString narrowFrom(from), narrowTo(to);
   if (RetryEintr([&] { return ::rename(narrowFrom.c_str(), narrowTo.c_str()); }) == 0) return;
   if (errno != EXDEV) ZT_RAISE(PosixError());
+  Entry target(to, Links::Themselves);
+  // One file through two mounts, which the system takes for two file systems; where it sees that
+  // two names are one file, it does nothing, too.
+  if (Entry(from, Links::Themselves).sameAs(target)) return;
+  // A link whose file is at its place already.
+  if (Entry(from).sameAs(target)) return RemoveFile(from);
   CopyAndRemove(from, to);
 }
 
 void path::CpFile(const String& from, const String& to, bool overwrite) {
-  DemandAbsolute(from, to);
-  if (!overwrite && DoesFileExist(to)) ZT_RAISE(exception::FileAlreadyExists());
-  if (SameFileByName(from, to)) return;
-  Entry source(from), target(to);
-  if (source.sameAs(target)) return;
-  if (source.special()) ZT_RAISE(exception::FileReadFailed());
-  if (target.special()) ZT_RAISE(exception::FileWriteFailed());
-  typedef BinaryFile::Mode Mode;
-  BinaryFile in, out;
-  in.open(from, Mode::Read);
-  Mode write = Mode::ReadWrite | Mode::Create;
-  out.open(to, overwrite ? write | Mode::Truncate : write);
-  CopyBytes(in, out);
+  BinaryFile copy;
+  CopyInto(copy, from, to, overwrite);
 }
 
 void path::CpDir(const String& from, const String& to) {

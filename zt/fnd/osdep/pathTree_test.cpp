@@ -1,15 +1,20 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
+#include <sys/mount.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <filesystem>
 #include <string>
 
 #include "tests/support/Child.h"
+#include "tests/support/EventPlace.h"
+#include "tests/support/FailSystemCall.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
@@ -102,6 +107,9 @@ TEST(PathTree, RenameFailures) {
   EXPECT_EQ("x", ReadBytes(dir / "file"));
 }
 
+constexpr const char* kOneFileSystem =
+    "NOT TESTED: no second file system to write to on this machine";
+
 // A directory of another file system than the temporary one, if this machine has one to write to.
 class OtherFileSystem {
  public:
@@ -129,7 +137,7 @@ class OtherFileSystem {
 TEST(PathTree, RenameBetweenFileSystemsCopiesAndRemoves) {
   TempDir dir;
   OtherFileSystem other(dir.path());
-  if (other.path().empty()) GTEST_SKIP() << "one file system only";
+  if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
   std::string bytes(100000, 'b');
   WriteBytes(dir / "from", bytes);
   WriteBytes(other.path() + "/to", "old and to be replaced");
@@ -142,7 +150,7 @@ TEST(PathTree, RenameBetweenFileSystemsCopiesAndRemoves) {
 TEST(PathTree, RenameOfADirectoryBetweenFileSystemsFailsToRead) {
   TempDir dir;
   OtherFileSystem other(dir.path());
-  if (other.path().empty()) GTEST_SKIP() << "one file system only";
+  if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
   dir.makeDir("d");
   EXPECT_THROW(path::RenameFile(Wide(dir / "d"), Wide(other.path() + "/d")),
                exception::FileReadFailed);
@@ -152,8 +160,8 @@ TEST(PathTree, RenameOfADirectoryBetweenFileSystemsFailsToRead) {
 TEST(PathTree, RenameThatCannotRemoveTheSourceTakesTheCopyBack) {
   TempDir dir;
   OtherFileSystem other(dir.path());
-  if (other.path().empty()) GTEST_SKIP() << "one file system only";
-  if (geteuid() != 0) GTEST_SKIP() << "needs another user's rights";
+  if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   WriteBytes(dir.makeDir("ro") + "/from", "x");
   chmod((dir / "ro/from").c_str(), 0644);
   chmod((dir / "ro").c_str(), 0755);
@@ -168,6 +176,64 @@ TEST(PathTree, RenameThatCannotRemoveTheSourceTakesTheCopyBack) {
   EXPECT_EQ(0, child.wait());
   EXPECT_TRUE(Exists(dir / "ro/from"));
   EXPECT_FALSE(Exists(other.path() + "/to"));
+}
+
+TEST(PathTree, RenameBetweenFileSystemsKeepsTheSourceUntilTheCopyIsOnTheDisk) {
+  TempDir dir;
+  OtherFileSystem other(dir.path());
+  if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
+  WriteBytes(dir / "from", "bytes");
+  vlt::test::Child child([&] {
+    if (!vlt::test::FailSystemCall(SYS_fsync, EIO)) return 1;
+    auto rename = [&] { path::RenameFile(Wide(dir / "from"), Wide(other.path() + "/to")); };
+    return PosixErrorOf(rename) == EIO ? 0 : 2;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ("bytes", ReadBytes(dir / "from"));
+  EXPECT_FALSE(Exists(other.path() + "/to"));
+}
+
+TEST(PathTree, RenameOfALinkOntoItsTargetInAnotherFileSystemKeepsTheBytes) {
+  TempDir dir;
+  OtherFileSystem other(dir.path());
+  if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
+  std::string target = other.path() + "/target";
+  WriteBytes(target, "kept");
+  ASSERT_EQ(0, symlink(target.c_str(), (dir / "link").c_str()));
+  path::RenameFile(Wide(dir / "link"), Wide(target));
+  EXPECT_EQ("kept", ReadBytes(target));
+  EXPECT_FALSE(Exists(dir / "link"));
+  // The other way round the link is replaced by the bytes.
+  ASSERT_EQ(0, symlink(target.c_str(), (dir / "link").c_str()));
+  path::RenameFile(Wide(target), Wide(dir / "link"));
+  EXPECT_FALSE(path::IsSymLink(Wide(dir / "link").c_str()));
+  EXPECT_EQ("kept", ReadBytes(dir / "link"));
+  EXPECT_FALSE(Exists(target));
+}
+
+// The system calls two mounts of one directory two file systems.
+TEST(PathTree, RenameOfAFileOntoItselfThroughAnotherMountKeepsIt) {
+  int code = -1;
+  auto allowed = vlt::test::RunInOwnTmp(
+      "size=4m",
+      [] {
+        const std::string one = "/tmp/one", two = "/tmp/two";
+        mkdir(one.c_str(), 0777);
+        mkdir(two.c_str(), 0777);
+        if (mount(one.c_str(), two.c_str(), nullptr, MS_BIND, nullptr) != 0) return 1;
+        WriteBytes(one + "/file", "kept");
+        if (link((one + "/file").c_str(), (one + "/hard").c_str()) != 0) return 2;
+        if (rename((one + "/file").c_str(), (two + "/file").c_str()) == 0) return 3;
+        if (errno != EXDEV) return 4;
+        path::RenameFile(Wide(one + "/file"), Wide(two + "/file"));
+        path::RenameFile(Wide(one + "/file"), Wide(two + "/hard"));
+        if (ReadBytes(one + "/file") != "kept" || ReadBytes(two + "/hard") != "kept") return 5;
+        path::RenameFile(Wide(one + "/file"), Wide(two + "/moved"));
+        return ReadBytes(one + "/moved") == "kept" && !Exists(one + "/file") ? 0 : 6;
+      },
+      &code);
+  if (allowed == vlt::test::Allowed::No) GTEST_SKIP() << "NOT TESTED: no right to mount";
+  EXPECT_EQ(0, code);
 }
 
 TEST(PathTree, CpFileCopiesBytesIntoAPrivateFile) {

@@ -46,6 +46,8 @@ class CztMutex : public CztSyncObject {
   CztMutex(bool pumpMsgs, const wchar_t* name, bool initiallyOwned);
   bool Lock(int timeoutMs) override;
   bool Unlock() override;
+  // Takes the mutex if that needs no wait; false if not, or if it fails.
+  bool TryLock() { return m_mutex.tryLock(); }
 
  private:
   zt::fnd::osdep::Mutex m_mutex;
@@ -79,7 +81,8 @@ class CztSemaphore : public CztSyncObject {
  public:
   CztSemaphore(const wchar_t* name, int maximum, int initial);
 
-  // Takes a unit, and returns only then: the timeout limits each wait, not the call.
+  // Takes a unit, and returns only then: the timeout limits each wait, not the call. One of 0 is a
+  // wait without limit.
   bool Lock(int timeoutMs) override;
   bool Unlock() override;  // Release(1)
 

@@ -64,7 +64,9 @@ CztSemaphore::CztSemaphore(const wchar_t* name, int maximum, int initial)
       m_name(name != nullptr ? name : L"") {}
 
 bool CztSemaphore::Lock(int timeoutMs) {
-  while (!take()) WaitFor(m_event, timeoutMs, m_pumpMsgs);
+  // A wait of no time would come back at once, again and again, until there is a unit.
+  const int eachMs = timeoutMs == 0 ? kNoLimit : timeoutMs;
+  while (!take()) WaitFor(m_event, eachMs, m_pumpMsgs);
   return true;
 }
 

@@ -224,6 +224,16 @@ TEST(SyncSemaphore, TimeoutLimitsEachWaitAndNotTheCall) {
   EXPECT_EQ(0, semaphore.Release(0));
 }
 
+// A wait of no time at all, again and again, would keep a processor busy.
+TEST(SyncSemaphore, TimeoutOfNothingSleepsUntilThereIsAUnit) {
+  CztSemaphore semaphore(nullptr, 1, 0);
+  WatchedThread waiter([&] { EXPECT_TRUE(semaphore.Lock(0)); });
+  EXPECT_TRUE(waiter.blocksInLock());
+  EXPECT_TRUE(semaphore.Unlock());
+  waiter.join();
+  EXPECT_EQ(0, semaphore.Release(0));
+}
+
 TEST(SyncSemaphore, ReleaseWakesAsManyAsThereAreUnits) {
   CztSemaphore semaphore(L"name", 10, 0);
   std::atomic<int> got{0};
