@@ -61,6 +61,23 @@ HRESULT CopyVariant(Target* target, const Source* source) {
   }
 }
 
+void FreeAndNull(wchar_t** text) {
+  ZtTaskMemFree(*text);
+  *text = nullptr;
+}
+
+// Takes back what a copy made whose variant failed: the caller of a failed copy frees nothing, and fills
+// the record anew. The text that failed is null already.
+template <class Target>
+void TakeBack(Target* target) {
+  FreeAndNull(&target->name);
+  FreeAndNull(&target->fileName);
+  if (target->type == vltComponentDataDictionary) {
+    FreeAndNull(&target->dictionary.auxString1);
+    FreeAndNull(&target->dictionary.prefix);
+  }
+}
+
 // All of a deep copy but the stamps.
 template <class Target, class Source>
 HRESULT CopyFields(Target* target, const Source* source) {
@@ -69,15 +86,16 @@ HRESULT CopyFields(Target* target, const Source* source) {
   if (result < 0) return result;
   result = CvltComponent::DuplicateStringNullOK(source->fileName, &target->fileName);
   if (result < 0) {
-    ZtTaskMemFree(target->name);
-    target->name = nullptr;
+    FreeAndNull(&target->name);
     return result;
   }
   target->type = source->type;
   target->identifier = source->identifier;
   CopyOpaque(target, source);
   HRESULT variantResult = CopyVariant(target, source);
-  return variantResult < 0 ? variantResult : result;
+  if (variantResult >= 0) return result;
+  TakeBack(target);
+  return variantResult;
 }
 
 template <class Source>

@@ -16,7 +16,7 @@ class CvltComponent {
  public:
   // Null identifier, no texts; size is that of the record, version 0xFFFFFFFF.
   CvltComponent();
-  // Takes over the source's texts, or copies them. A failed copy leaves the texts copied so far.
+  // Takes over the source's texts, or copies them. A failed copy leaves a component without texts.
   CvltComponent(_vltComponent* source, bool attach);
   CvltComponent(_vltComponent2* source, bool attach);
   CvltComponent(const CvltComponent&) = delete;
@@ -40,8 +40,9 @@ class CvltComponent {
 
   // Deep copies of a source record into an uninitialised target.
   //
-  // The first negative result of name and fileName ends the copy with nothing owned by the target;
-  // of the variant's texts the last one's result counts. E_OUTOFMEMORY is the only failure.
+  // The first negative result of name and fileName ends the copy; of the variant's texts the last
+  // one's result counts, and an earlier one that failed is null. E_OUTOFMEMORY is the only failure.
+  // The target then owns nothing and its texts, as far as the copy came, are null.
   static HRESULT Copy(_vltComponent2* target, const _vltComponent* source);
   static HRESULT Copy2(_vltComponent2* target, const _vltComponent2* source);
   static HRESULT Copy2(_vltComponent2point1* target, const _vltComponent2* source);

@@ -2,6 +2,7 @@
 
 #include "source/Pharlap/registrarText.h"
 #include "source/vlIniMgr.h"
+#include "zt/fnd/osdep/StringCompare.h"
 
 namespace {
 
@@ -35,9 +36,40 @@ std::vector<ContentsItem> ReadContents(const CvlIniMgr& database) {
       items.back().file += value;
       items.back().last = i;
     } else {
-      items.push_back({component, value, i, i});
+      items.push_back({component, value, i, i, piece});
     }
     inPieces = piece;
   }
   return items;
+}
+
+bool ContentsFiles::CaseLess::operator()(const std::string& a, const std::string& b) const {
+  return zt::fnd::osdep::StringCaseCompare(a.c_str(), b.c_str()) < 0;
+}
+
+void ContentsFiles::learn(const std::vector<ContentsItem>& items) {
+  forget();
+  for (const ContentsItem& item : items) {
+    if (item.inPieces) return;
+    m_files.insert(item.file);
+  }
+  m_known = true;
+}
+
+void ContentsFiles::add(const CvlIniMgr& database, const std::string& item) {
+  if (!m_known) return;
+  // Both as they are kept: a name loses the white space around it, and a new one comes last.
+  std::string name, file;
+  int count = database.GetNumberOfItems(registrar::kContents);
+  if (database.GetNthItemName(registrar::kContents, count, &name) < 0 || IsPiece(name)) {
+    forget();
+  } else {
+    database.GetItem(registrar::kContents, item.c_str(), &file);
+    m_files.insert(file);
+  }
+}
+
+void ContentsFiles::forget() {
+  m_known = false;
+  m_files.clear();
 }

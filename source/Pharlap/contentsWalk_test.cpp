@@ -72,5 +72,64 @@ TEST(RegistrarContents, AnyFourCharactersMayFollowTheMark) {
              {{"name", "/1", 0, 0}, {"name line0002", "/2", 1, 1}, {"name Line00001", "/3", 2, 2}});
 }
 
+// ---- The files that the items hold
+
+class RegistrarContentsFiles : public testing::Test {
+ protected:
+  void set(const char* item, const char* file) {
+    ini.SetItem("VLRContentsSection", item, file, true);
+    files.add(ini, item);
+  }
+  void learn() { files.learn(ReadContents(ini)); }
+
+  TempDir dir;
+  CvlIniMgr ini{(dir / "x.ini").c_str(), false, nullptr, false, true};
+  ContentsFiles files;
+};
+
+TEST_F(RegistrarContentsFiles, BeforeAWalkAnyFileMayBeThere) {
+  EXPECT_TRUE(files.mayHave("/1"));
+  set("a", "/1");
+  EXPECT_TRUE(files.mayHave("/2"));
+}
+
+TEST_F(RegistrarContentsFiles, AWalkKnowsThemInAnyCase) {
+  ini.SetItem("VLRContentsSection", "a", "/One", true);
+  learn();
+  EXPECT_TRUE(files.mayHave("/oNE"));
+  EXPECT_FALSE(files.mayHave("/On"));
+  EXPECT_FALSE(files.mayHave("/two"));
+}
+
+TEST_F(RegistrarContentsFiles, WhatIsSetBehindTheWalkIsKnownAsItIsKept) {
+  learn();
+  set("  a ", "/o\\n\te");
+  EXPECT_TRUE(files.mayHave("/O\\n\tE"));
+  EXPECT_FALSE(files.mayHave("/two"));
+  set("a", "/two");  // the same item
+  EXPECT_TRUE(files.mayHave("/two"));
+}
+
+TEST_F(RegistrarContentsFiles, AfterOtherChangesAnyFileMayBeThere) {
+  learn();
+  files.forget();
+  EXPECT_TRUE(files.mayHave("/1"));
+}
+
+// A change may join pieces to a file that no item has.
+TEST_F(RegistrarContentsFiles, WithPiecesAnyFileMayBeThere) {
+  ini.SetItem("VLRContentsSection", "name Line0002", "/1", true);
+  learn();
+  EXPECT_TRUE(files.mayHave("/2"));
+  set("b", "/3");
+  EXPECT_TRUE(files.mayHave("/2"));
+}
+
+TEST_F(RegistrarContentsFiles, APieceThatComesMakesAnyFilePossible) {
+  learn();
+  set("name Line0002 ", "/1");
+  EXPECT_TRUE(files.mayHave("/2"));
+}
+
 }  // namespace
 }  // namespace vlt::test

@@ -7,7 +7,9 @@
 
 #include <string>
 
+#include "source/vlrHelpers.h"
 #include "zt/fnd/String.h"
+#include "ztcom/ztcore/ztmemmgr.h"
 #include "ztcom/ztcore/ztunknown.h"
 
 namespace registrar {
@@ -28,6 +30,10 @@ inline constexpr const char* kPrefix = "Prefix";
 inline constexpr const char* kPnp = "PnP";
 inline constexpr const char* kBindingClasses = "BINDING_CLASSES";
 
+// Record versions.
+inline constexpr uint32_t kDictionaryVersion = 2;
+inline constexpr uint32_t kExpertVersion = 3;
+
 inline constexpr const wchar_t* kDictionaries = L"Data Dictionaries";
 inline constexpr const wchar_t* kExperts = L"Experts";
 
@@ -37,6 +43,20 @@ inline std::string Narrow(const wchar_t* text) {
 }
 inline std::string Narrow(const zt::fnd::String& text) { return Narrow(text.c_str()); }
 inline zt::fnd::String Widen(const std::string& text) { return zt::fnd::String(text.c_str()); }
+
+// A record's text that is a copy; null for null, and where memory is out.
+inline wchar_t* CopyOf(const wchar_t* text) {
+  wchar_t* copy = nullptr;
+  if (text) vlrDuplicateString(text, &copy);
+  return copy;
+}
+
+// Frees the record's text and puts a copy in its place.
+inline void ReplaceText(wchar_t** text, const wchar_t* by) {
+  wchar_t* copy = CopyOf(by);
+  ZtTaskMemFree(*text);
+  *text = copy;
+}
 
 inline std::string Decimal(uint32_t value) { return std::to_string(value); }
 inline uint32_t Number(const std::string& text) {

@@ -7,7 +7,6 @@
 #include "source/Pharlap/vltPharlapRegistrar.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/path.h"
-#include "ztcom/ztcore/ztmemmgr.h"
 
 using zt::fnd::osdep::path;
 using namespace registrar;
@@ -59,12 +58,6 @@ bool HasPortConfiguration(const _vltStartupOptions* options) {
          (reinterpret_cast<const unsigned char*>(options)[kFlagsOffset] & kPortConfigurationBit);
 }
 
-void ReplaceText(wchar_t** text, const wchar_t* by) {
-  ZtTaskMemFree(*text);
-  *text = nullptr;
-  if (by) vlrDuplicateString(by, text);
-}
-
 }  // namespace
 
 HRESULT CvltPharlapRegistrar::RegisterDataDictionary(_vltComponent2* record) {
@@ -89,10 +82,10 @@ HRESULT CvltPharlapRegistrar::RegisterDataDictionary(_vltComponent2* record) {
   CztHold holdMap(components().lock);
   CvltComponent* component = nullptr;
   if (InternalGetComponentNoScan(record->identifier, component) < 0) return result;
-  // A component of another type under this identifier has no place for the rest.
-  if (component->record().type != vltComponentDataDictionary) return result;
   ReplaceText(&component->record().name, record->name);
   ReplaceText(&component->record().fileName, record->fileName);
+  // A component of another type under this identifier has no place for the rest.
+  if (component->record().type != vltComponentDataDictionary) return result;
   vltDictVariant& known = component->record().dictionary;
   ReplaceText(&known.prefix, variant.prefix);
   known.schemaVersion = variant.schemaVersion;

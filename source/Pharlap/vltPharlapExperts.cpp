@@ -8,7 +8,6 @@
 #include "source/Pharlap/registrarText.h"
 #include "source/Pharlap/vltPharlapRegistrar.h"
 #include "zt/fnd/osdep/path.h"
-#include "ztcom/ztcore/ztmemmgr.h"
 
 using zt::fnd::osdep::path;
 using namespace registrar;
@@ -17,22 +16,9 @@ using zt::fnd::String;
 
 namespace {
 
-constexpr uint32_t kDictionaryVersion = 2;
-constexpr uint32_t kExpertVersion = 3;
 constexpr uint32_t kNoSchemaVersion = 0xFFFFFFFF;
 
-wchar_t* Copy(const wchar_t* text) {
-  wchar_t* copy = nullptr;
-  if (text) vlrDuplicateString(text, &copy);
-  return copy;
-}
-
-wchar_t* Copy(const std::string& text) { return Copy(Widen(text).c_str()); }
-
-void Replace(wchar_t** text, wchar_t* by) {
-  ZtTaskMemFree(*text);
-  *text = by;
-}
+wchar_t* CopyOfNarrow(const std::string& text) { return CopyOf(Widen(text).c_str()); }
 
 }  // namespace
 
@@ -65,14 +51,14 @@ HRESULT CvltPharlapRegistrar::EnumComponents(_vltComponentType type,
 HRESULT CvltPharlapRegistrar::Duplicate(_vltComponent2* target, const _vltComponent2* source) {
   memcpy(target, source, sizeof *target);
   // Each text starts from null, so that a failed copy never hands out the registrar's own.
-  target->name = Copy(source->name);
-  target->fileName = Copy(source->fileName);
+  target->name = CopyOf(source->name);
+  target->fileName = CopyOf(source->fileName);
   if (source->type == vltComponentDataDictionary) {
-    target->dictionary.auxString1 = Copy(source->dictionary.auxString1);
-    target->dictionary.prefix = Copy(source->dictionary.prefix);
-    target->dictionary.auxString2 = Copy(source->dictionary.auxString2);
+    target->dictionary.auxString1 = CopyOf(source->dictionary.auxString1);
+    target->dictionary.prefix = CopyOf(source->dictionary.prefix);
+    target->dictionary.auxString2 = CopyOf(source->dictionary.auxString2);
   } else if (source->type == vltComponentResourceExpert) {
-    target->resource.pnp = Copy(source->resource.pnp);
+    target->resource.pnp = CopyOf(source->resource.pnp);
   }
   return S_OK;
 }
@@ -103,11 +89,11 @@ HRESULT CvltPharlapRegistrar::SaveExpert(const _vltComponent2* record) {
   CvltComponent* component = nullptr;
   if (InternalGetComponentNoScan(record->identifier, component) < 0) return result;
   _vltComponent2& known = component->record();
-  Replace(&known.name, Copy(record->name));
-  Replace(&known.fileName,
-          Copy(path::BaseName(String(record->fileName ? record->fileName : L"")).c_str()));
+  ReplaceText(&known.name, record->name);
+  String file(record->fileName ? record->fileName : L"");
+  ReplaceText(&known.fileName, path::BaseName(file).c_str());
   if (record->type == vltComponentResourceExpert && known.type == vltComponentResourceExpert) {
-    Replace(&known.resource.pnp, Copy(record->resource.pnp));
+    ReplaceText(&known.resource.pnp, record->resource.pnp);
   }
   return result;
 }
@@ -137,8 +123,8 @@ void CvltPharlapRegistrar::readDictionary(const std::string& section, _vltCompon
   std::string value;
   record->version = kDictionaryVersion;
   record->type = vltComponentDataDictionary;
-  if (read(kFileName, &value)) record->fileName = Copy(value);
-  if (read(kPrefix, &value)) record->dictionary.prefix = Copy(value);
+  if (read(kFileName, &value)) record->fileName = CopyOfNarrow(value);
+  if (read(kPrefix, &value)) record->dictionary.prefix = CopyOfNarrow(value);
   record->dictionary.schemaVersion = number(kSchemaVersion, 0);
   record->dictionary.fragmentRegistered = number(kFragmentRegistered, 0);
   record->dictionary.lastInstalledSchemaVersion =
@@ -161,10 +147,10 @@ bool CvltPharlapRegistrar::readExpert(const std::string& section, EmptyFileName 
       m_registrationIni->SetItem(section.c_str(), kFileName, file.c_str(), true);
       changed = true;
     }
-    record->fileName = Copy(file);
+    record->fileName = CopyOfNarrow(file);
   }
   if (isResourceExpert && m_registrationIni->GetItem(section.c_str(), kPnp, &pnp) >= 0) {
-    record->resource.pnp = Copy(pnp);
+    record->resource.pnp = CopyOfNarrow(pnp);
   }
   return changed;
 }
@@ -179,7 +165,7 @@ HRESULT CvltPharlapRegistrar::ReadSection(const wchar_t* wideSection, EmptyFileN
   _vltComponent2& record = component->record();
   // The stamp is that of the object: clients tell by it that the record came from here.
   record.size = sizeof(CvltComponent);
-  record.name = Copy(wideSection);
+  record.name = CopyOf(wideSection);
   std::string identifier;
   if (m_registrationIni->GetItem(section.c_str(), kIdentifier, &identifier) >= 0 &&
       !identifier.empty()) {

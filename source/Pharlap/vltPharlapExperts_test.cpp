@@ -132,7 +132,11 @@ TEST(RegistrarExpert, ARecordOfAnotherTypeUnderTheSameIdentifierDoesNoHarm) {
               Received dictionary, expert;
               ASSERT_EQ(r->GetComponent(G(1), &dictionary.value), S_OK);
               ASSERT_EQ(r->GetComponent(G(2), &expert.value), S_OK);
+              EXPECT_EQ(dictionary.name(), L"A");
+              EXPECT_EQ(dictionary.file(), L"a.vle");
               EXPECT_EQ(dictionary.prefix(), L"prefix");
+              EXPECT_EQ(expert.name(), L"B");
+              EXPECT_EQ(expert.file(), L"/x/b");
               EXPECT_EQ(expert.pnp(), L"pnp");
             }),
             0);

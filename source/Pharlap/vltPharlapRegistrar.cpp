@@ -20,7 +20,6 @@ namespace {
 
 constexpr GUID kBuiltInDictionary = {
     0x790F6A90, 0xE0D8, 0x11D3, {0xAA, 0x15, 0x00, 0x50, 0x04, 0xD1, 0x31, 0xEE}};
-constexpr uint32_t kDictionaryVersion = 2;
 
 }  // namespace
 
@@ -129,6 +128,8 @@ void CvltPharlapRegistrar::readComponents() {
 
 HRESULT CvltPharlapRegistrar::OpenIniWithValidation() {
   std::string file = Narrow(m_registrationFilePath);
+  // From the sidecar on: another process may be about to mend what this one would set aside.
+  IniFileLock hold(IniFileLock::NameForFile(file.c_str()));
   unsigned char* found = nullptr;
   HRESULT result = GetChecksumForCacheFile(&found);
   std::unique_ptr<unsigned char[]> digest(found);
@@ -178,15 +179,7 @@ bool CvltPharlapRegistrar::ChecksumFileExists() {
 
 HRESULT CvltPharlapRegistrar::DeleteIniFile() {
   try {
-    String badEnd = vlrGetCurrentLocalTime() + L".bad";
-    if (path::DoesFileExist(m_registrationFilePath)) {
-      path::RenameFile(m_registrationFilePath, m_registrationFilePath + badEnd);
-    }
-    String sidecar = Widen(sidecarName());
-    if (path::DoesFileExist(sidecar)) path::RemoveFile(sidecar);
-    // A directory in its place goes out of the way as well. Left there, it would have the next start
-    // set the empty database of this one aside, over the copy that was just made.
-    if (path::IsDirectory(sidecar.c_str())) path::RenameFile(sidecar, sidecar + badEnd);
+    CvlIniMgr::SetAside(m_registrationFilePath);
     return S_OK;
   } catch (const zt::fnd::exception::Exception&) {
     return E_FAIL;  // What cannot be set aside is opened as it is.

@@ -8,6 +8,7 @@
 
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/Common/vltBindingClasses.h"
+#include "source/Pharlap/contentsWalk.h"
 #include "source/vlIniMgr.h"
 #include "source/vltRegistrar.h"
 #include "zt/fnd/AbsTime.h"
@@ -162,4 +163,5 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   bool m_lastMergeOpened = false;
   // Registration files that FindRegistrationFiles has seen: asked for once a start is enough.
   std::set<std::string> m_filesSeen;
+  ContentsFiles m_contentsFiles;
 };

@@ -99,7 +99,7 @@ TEST(RegistrarInterfaces, EachAnswersAndForwardsItsReferences) {
             0);
 }
 
-// The side interfaces are called through their own tables: a wrong order of operations shows here.
+// The side interfaces are called through their own tables, which must lead to the registrar's operations.
 TEST(RegistrarInterfaces, SideInterfacesReachTheirOperations) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");

@@ -16,6 +16,7 @@
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/StringCompare.h"
 #include "zt/fnd/osdep/path.h"
+#include "ztini/StringTools.h"
 
 using zt::fnd::osdep::path;
 using namespace registrar;
@@ -77,12 +78,6 @@ void ListBundles(const String& directory, const String& mask,
   }
 }
 
-// The directory of the bundles. Unlike elsewhere, a failure ends the search.
-HRESULT BundleDirectory(const wchar_t* name, String* directory) {
-  HRESULT result = vlrMakeRootDirectory(name, directory);
-  return result < 0 ? result : S_OK;
-}
-
 // True if the path names a regular file; what keeps the look from being taken is raised.
 bool FileIsThere(const std::string& file) {
   try {
@@ -98,10 +93,11 @@ bool FileIsThere(const std::string& file) {
 
 HRESULT CvltPharlapRegistrar::FindRegistrationFiles(RegistrationFiles& files) {
   String directory;
-  HRESULT result = BundleDirectory(kDictionaries, &directory);
+  // Unlike elsewhere, a directory that cannot be made ends the search.
+  HRESULT result = vlrMakeRootDirectory(kDictionaries, &directory);
   if (result < 0) return result;
   ListBundles(directory, String(L"*.framework"), files);
-  result = BundleDirectory(kExperts, &directory);
+  result = vlrMakeRootDirectory(kExperts, &directory);
   if (result < 0) return result;
   ListBundles(directory, String(L"*.vle"), files);
   return S_OK;
@@ -116,11 +112,14 @@ bool CvltPharlapRegistrar::isRegistered(const std::string& file, uint32_t low, u
 }
 
 void CvltPharlapRegistrar::eraseComponentsOf(const std::string& file) {
+  if (!m_contentsFiles.mayHave(file)) return;
   // Erasing a component that bears the name of a list edits the list; the walk is over its copy.
   std::vector<ContentsItem> contents = ReadContents(*m_registrationIni);
+  m_contentsFiles.learn(contents);
   std::vector<std::string> eraseList;
   for (const ContentsItem& item : contents) {
     if (!SameName(item.file, file.c_str())) continue;
+    m_contentsFiles.forget();  // Of two items of one name the second shows when the first is gone.
     m_registrationIni->EraseSection(item.component.c_str());
     m_registrationIni->EraseItem(kComponents, item.component.c_str());
     // Of an item in pieces only the last piece goes. The others are met again, and point to the
@@ -140,6 +139,7 @@ HRESULT CvltPharlapRegistrar::UpdateRegistrationFile() {
   path::MakePathEndInSlash(directory);
   RegistrationFiles files;
   FindRegistrationFiles(files);
+  m_contentsFiles.forget();  // Others may have changed the section since the last time.
   for (const auto& [file, time] : files) {
     std::string narrow = Narrow(file);
     m_filesSeen.insert(narrow);
@@ -188,9 +188,11 @@ void CvltPharlapRegistrar::mergeItem(CvlIniMgr& fragment, const String& installD
     if (StripBracesFromGuid(value.data()) == S_OK) value.resize(strlen(value.c_str()));
   }
   m_registrationIni->SetItem(section.c_str(), item.c_str(), value.c_str(), true);
+  if (ztini_StrICmpWithoutSurrWhiteSpace(section.c_str(), kContents) == 0) m_contentsFiles.forget();
   // A value that is no name would write something else into the database, down to whole lines.
   if (SameName(section, kComponents) && CanBeItemName(value)) {
     m_registrationIni->SetItem(kContents, value.c_str(), file, true);
+    m_contentsFiles.add(*m_registrationIni, value);
   }
 }
 

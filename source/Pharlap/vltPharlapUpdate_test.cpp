@@ -122,6 +122,40 @@ TEST(RegistrarUpdate, OfAnItemInPiecesOnlyTheLastPieceGoes) {
   EXPECT_FALSE(db.has("Expert"));
 }
 
+// Items that an earlier file of the same start has brought count for the new files behind it. Dictionaries
+// come before experts.
+TEST(RegistrarUpdate, ANewFileErasesWhatWasEnteredUnderItsNameJustBefore) {
+  for (const char* pieces :
+       {"Planted = \"%s%s\"\n", "Planted Line0002 = \"%s\"\nPlanted Line0003 = \"%s\"\n"}) {
+    Installation i;
+    std::string expert = i.addObjectExpert("E", "Exp", GText(2));
+    std::string upper = i.root() + "/Experts/E.VLE/Resources/INFO.VLR", items = pieces;
+    items.replace(items.find("%s"), 2, upper.substr(0, 10));
+    items.replace(items.find("%s"), 2, upper.substr(10));
+    i.addBundle(kDictionaries, "D.framework",
+                "[KORComponents]\nKept = \"Kept\"\n[Kept]\nx = 1\n[Planted]\nx = 1\n[" +
+                    std::string(kContents) + "]\n" + items);
+    DatabaseText db = AfterStart(i);
+    EXPECT_FALSE(db.has("Planted")) << items;
+    EXPECT_TRUE(db.has("Kept"));
+    EXPECT_TRUE(db.has("Exp"));
+    EXPECT_EQ(db.quoted(kContents, "Exp"), expert);
+  }
+}
+
+// Paths that differ in case only are one file to the database.
+TEST(RegistrarUpdate, OfTwoNewFilesWithOneNameTheLaterStays) {
+  Installation i;
+  std::string one = i.addObjectExpert("Twin", "A", GText(1));
+  std::string two = i.addObjectExpert("TWIN", "B", GText(2));
+  Installation::touch(two, Installation::kInstalled + 1);
+  i.addObjectExpert("Other", "C", GText(3));
+  DatabaseText db = AfterStart(i);
+  EXPECT_NE(db.has("A"), db.has("B"));
+  EXPECT_NE(db.raw(kContents, "A").has_value(), db.raw(kContents, "B").has_value());
+  EXPECT_TRUE(db.has("C"));
+}
+
 // ---- Removing
 
 TEST(RegistrarRemove, AVanishedFileTakesItsComponentsInMemoryAndTheDiskFollowsWithTheNextSave) {

@@ -221,7 +221,25 @@ TEST(RegistrarBinding, APositionBeyondTheClassesIsRaisedAndTheDatabaseStaysUsabl
               Offered o(vltComponentObjectExpert, L"Obj", G(2),
                         Wide(i.root()) + L"/Experts/One.vle");
               EXPECT_THROW(r->RegisterComponent(&o.value), zt::fnd::exception::OutOfRange);
+              EXPECT_EQ(DatabaseText(i.database()).quoted("Obj", "Identifier"), GText(2));
+              Received known;
+              ASSERT_EQ(r->GetComponent(G(2), &known.value), S_OK);
+              EXPECT_EQ(known.file(), Wide(i.root()) + L"/Experts/One.vle");
               EXPECT_EQ(r->SetStorageServerCacheSize(5), S_OK);
+            }),
+            0);
+  // The items before the classes were set, and went out with the next save.
+  DatabaseText db(i.database());
+  EXPECT_EQ(db.raw("KOR", "CacheSize"), "5");
+  EXPECT_EQ(
+      db.items("Obj"),
+      (DatabaseText::Items{{"Identifier", "\"" + B(2) + "\""},
+                           {"FileName", "\"One.vle\""},
+                           {"BINDING_CLASSES", "\"" + B(1) + ":0:" + B(2) + ":1:" + B(7) + "\""}}));
+  EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_EQ(Find(*r, G(2)), S_OK);
             }),
             0);
 }

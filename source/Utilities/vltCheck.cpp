@@ -12,6 +12,7 @@
 #include "source/Utilities/vltHookPoints.h"
 #include "source/Utilities/vltTestHook.h"
 #include "source/Utilities/vltutils.h"
+#include "zt/fnd/Guid.h"
 #include "zt/fnd/osdep/BinaryFile.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/SharedLibrary.h"
@@ -52,22 +53,27 @@ HRESULT TellOfFile(vltErrors& errors, const wchar_t* word, const wchar_t* file, 
 constexpr const char* kMissing = "does not exist";
 constexpr const char* kUnreadable = "is not readable";
 
-// A relative path is nowhere: dictionaries keep their prefix in a field that is checked as a file.
+// A relative path is nowhere: dictionaries keep their prefix in a field that is checked as a file. What
+// keeps the system from looking says nothing of the file, and is the caller's to hear.
 bool IsThere(const wchar_t* file) {
-  return path::IsPathAbsolute(file) && path::DoesFileExist(String(file));
+  if (!path::IsPathAbsolute(file)) return false;
+  try {
+    return path::DoesFileExist(String(file));
+  } catch (const zt::fnd::osdep::PosixError& error) {
+    if (error.whatcode() != ENOTDIR) throw;
+    return false;  // Nothing can be below what is no directory.
+  }
 }
 
 }  // namespace
 
 HRESULT CheckFileExistence(const wchar_t* file, const wchar_t* word, vltErrors& errors) {
+  if (!IsThere(file)) return TellOfFile(errors, word, file, kMissing);
   try {
-    if (!IsThere(file)) return TellOfFile(errors, word, file, kMissing);
     BinaryFile(String(file), BinaryFile::Mode::Read, false).close();
     return S_OK;
-  } catch (const zt::fnd::osdep::OSException& error) {
-    // A problem of the file is what the check is there to tell.
-    bool missing = error.whatcode() == ENOTDIR;
-    return TellOfFile(errors, word, file, missing ? kMissing : kUnreadable);
+  } catch (const zt::fnd::osdep::OSException&) {
+    return TellOfFile(errors, word, file, kUnreadable);  // what the check is there to tell
   }
 }
 
@@ -160,8 +166,8 @@ HRESULT vltCheckComponent(vltID id, IEnumString** errors) {
   HRESULT status = vltGetRegistrar(registrar.out());
   if (status < 0) return status;
   vltErrors found;
-  bool all = memcmp(&id, &GUID_NULL, sizeof id) == 0;
-  status = all ? CheckAll(registrar.get(), found) : CheckOne(registrar.get(), id, found);
+  status =
+      id == GUID_NULL ? CheckAll(registrar.get(), found) : CheckOne(registrar.get(), id, found);
   CEnumErrorString* list = nullptr;
   if (!vltTestHook(vlt::hook::kCheckComponent)) list = new (std::nothrow) CEnumErrorString(found);
   if (!list) return vltReportOutOfMemory("BOOL vltCheckComponent(vltID, IEnumString**)");
@@ -173,10 +179,7 @@ HRESULT vltCheckComponent(vltID id, IEnumString** errors) {
 HRESULT CEnumErrorString::QueryInterface(const GUID& iid, void** out) {
   if (!out) return E_POINTER;
   *out = nullptr;
-  if (memcmp(&iid, &IID_IUnknown, sizeof iid) != 0 &&
-      memcmp(&iid, &IID_IEnumString, sizeof iid) != 0) {
-    return E_NOINTERFACE;
-  }
+  if (!(iid == IID_IUnknown) && !(iid == IID_IEnumString)) return E_NOINTERFACE;
   AddRef();
   *out = static_cast<IEnumString*>(this);
   return S_OK;

@@ -1,6 +1,7 @@
 // The component check over a real tree of libraries that are missing, damaged or hostile: the exact
 // messages of the export, and what vltctl says of them and how it ends.
 #include <elf.h>
+#include <errno.h>
 #include <gtest/gtest.h>
 #include <string.h>
 #include <sys/stat.h>
@@ -54,11 +55,13 @@ class Experts : public Installation {
  public:
   std::string file(const std::string& name) const { return root() + "/" + name + ".so"; }
   // Registers the library, which need not be there.
-  std::string add(uint32_t n, const std::string& name) {
+  std::string add(uint32_t n, const std::string& name) { return add(GText(n), name, file(name)); }
+  std::string add(const std::string& identifier, const std::string& name,
+                  const std::string& library) {
     addBundle("Experts", name + ".vle",
               "[KORComponents]\n" + name + " = \"" + name + "\"\n[" + name + "]\nIdentifier = \"" +
-                  GText(n) + "\"\nFileName = \"" + file(name) + "\"\n");
-    return file(name);
+                  identifier + "\"\nFileName = \"" + library + "\"\n");
+    return library;
   }
 };
 
@@ -207,12 +210,17 @@ TEST(CheckTree, AMissingFileAndADirectoryDoNotExist) {
   ExpectTold(2, {IsNot("does not exist", directory)}, {});
 }
 
+// Another user may go everywhere in the test's places, but for the one whose mode is given.
+void OpenAllBut(const std::string& place, mode_t mode) {
+  if (geteuid() == 0) RunProgram({"chmod", "-R", "a+rwX", getenv("VLT_TEST_ROOT")});
+  ASSERT_EQ(chmod(place.c_str(), mode), 0);
+}
+
 TEST(CheckTree, AFileThatMayNotBeRead) {
   Experts e;
   std::string file = e.add(1, "secret");
   Build(file, kGoodEntry);
-  ASSERT_EQ(chmod(file.c_str(), 0), 0);
-  // The registrar is had with all rights, so that only the file is out of reach.
+  OpenAllBut(file, 0);
   ExpectStart([&](IvltRegistrar&) {
     if (geteuid() == 0) {
       ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
@@ -227,17 +235,62 @@ TEST(CheckTree, TheToolToldOfAFileThatMayNotBeRead) {
   Experts e;
   std::string file = e.add(1, "secret");
   Build(file, kGoodEntry);
-  bool root = geteuid() == 0;
-  ASSERT_EQ(chmod(file.c_str(), 0), 0);
-  if (root) RunProgram({"chmod", "-R", "a+rwX", getenv("VLT_TEST_ROOT")});
-  ASSERT_EQ(chmod(file.c_str(), 0), 0);
+  OpenAllBut(file, 0);
   EXPECT_EQ(InChild([&] {
-              if (root) {
+              if (geteuid() == 0) {
                 ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
               }
               Found found = Check(1);
               EXPECT_EQ(found.exitCode, kDataUnusable);
               EXPECT_EQ(found.messages, Messages{IsNot("is not readable", file)});
+            }),
+            0);
+}
+
+// ---- Paths that the system does not even let the check look at
+
+// The export raises the error; the tool says so in its own words, and stays alive.
+void ExpectCannotLook(uint32_t n, int error, const std::string& note) {
+  ExpectStart([&](IvltRegistrar&) {
+    try {
+      Checked(G(n));
+      ADD_FAILURE() << "nothing was raised";
+    } catch (const zt::fnd::osdep::PosixError& raised) {
+      EXPECT_EQ(raised.whatcode(), static_cast<uint32_t>(error));
+    }
+  });
+  Found found = Check(n);
+  EXPECT_EQ(found.exitCode, kDataUnusable);
+  EXPECT_FALSE(found.sound);
+  EXPECT_EQ(found.messages, Messages{});
+  EXPECT_EQ(found.notes, Messages{"the check could not be finished: " + note});
+}
+
+TEST(CheckTree, ANameThatIsTooLong) {
+  Experts e;
+  e.add(GText(1), "long", e.file(std::string(300, 'x')));
+  ExpectCannotLook(1, ENAMETOOLONG, "File name too long");
+}
+
+TEST(CheckTree, LinksThatGoInCircles) {
+  Experts e;
+  std::string file = e.add(1, "circle");
+  std::filesystem::create_symlink(file, file);
+  ExpectCannotLook(1, ELOOP, "Too many levels of symbolic links");
+}
+
+TEST(CheckTree, ADirectoryThatMayNotBeEntered) {
+  if (geteuid() != 0) {
+    printf("NOT TESTED: needs root, to have a directory of another user\n");
+    GTEST_SKIP();
+  }
+  Experts e;
+  std::filesystem::create_directory(e.root() + "/locked");
+  Build(e.add(GText(1), "locked", e.file("locked/expert")), kGoodEntry);
+  OpenAllBut(e.root() + "/locked", 0700);
+  EXPECT_EQ(InChild([&] {
+              ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+              ExpectCannotLook(1, EACCES, "Permission denied");
             }),
             0);
 }
@@ -338,6 +391,27 @@ TEST(CheckTree, OneBadLibraryHidesNoOther) {
             std::string::npos)
       << result.out;
   EXPECT_NE(result.out.find("dictionary vltdd: NOT SOUND\n"), std::string::npos);
+}
+
+// The null identifier is the library's word for all components: what the others do, and that one of them
+// ends the process, is not this one's.
+TEST(CheckTree, AComponentWithoutAnIdentifierIsNotTakenForAll) {
+  Experts e;
+  Build(e.add(1, "crash"), AtLoad("abort();"));
+  Build(e.add("unreadable", "nameless", e.file("nameless")), kGoodEntry);
+  const char* const kNull = "00000000-0000-0000-0000-000000000000";
+  const std::string told =
+      "object expert nameless: NOT SOUND\n"
+      "    it has no identifier of its own, so it cannot be checked alone\n";
+  ProgramResult one = Vltctl({"check", kNull});
+  EXPECT_EQ(one.exitCode, kDataUnusable);
+  EXPECT_EQ(one.out, told);
+  ProgramResult all = Vltctl({"check"});
+  EXPECT_NE(all.out.find(told + "object expert crash: NOT SOUND\n"), std::string::npos) << all.out;
+  Experts others;
+  ProgramResult none = Vltctl({"check", kNull});
+  EXPECT_EQ(none.exitCode, kNotFound);
+  EXPECT_EQ(none.out, "");
 }
 
 TEST(CheckTree, AnUnknownComponentIsNotFound) {

@@ -19,6 +19,7 @@ inline std::string g_root;  // of the installation
 
 inline constexpr GUID kExpert = {1, 0, 0, {}};
 inline constexpr GUID kDictionary = {2, 0, 0, {}};
+inline constexpr GUID kResourceExpert = {3, 0, 0, {}};
 inline constexpr GUID kBindingClass = {0xA, 0, 0, {}};
 
 // A text that was handed out: freed, and a failure if there is none.

@@ -103,9 +103,9 @@ inline std::vector<Call> CheckListCalls() {
   };
 }
 
-inline HRESULT Enumerate(unsigned atATime) {
+inline HRESULT Enumerate(unsigned atATime, _vltComponentType type = vltComponentObjectExpert) {
   IvltEnumComponent* e = nullptr;
-  HRESULT result = g_registrar->EnumComponents(vltComponentObjectExpert, &e);
+  HRESULT result = g_registrar->EnumComponents(type, &e);
   if (result < 0) return result;
   Record records[2];
   for (unsigned fetched = 0; (result = e->Next(atATime, records, &fetched)) == S_OK; fetched = 0) {
@@ -140,6 +140,10 @@ inline std::vector<Call> EnumeratorCalls() {
        }},
       {"IvltEnumComponent::Next, one at a time", [] { return Enumerate(1); }},
       {"IvltEnumComponent::Next, two at a time", [] { return Enumerate(2); }},
+      {"IvltEnumComponent::Next over resource experts",
+       [] { return Enumerate(1, vltComponentResourceExpert); }},
+      {"IvltEnumComponent::Next over dictionaries",
+       [] { return Enumerate(1, vltComponentDataDictionary); }},
       {"IvltEnumComponent::Skip",
        [enumerator] { return ByDesign(enumerator()->Skip(1), E_NOTIMPL); }},
       {"IvltEnumComponent::Reset", [enumerator] { return enumerator()->Reset(); }},
@@ -256,6 +260,11 @@ inline std::vector<Call> RegistrarCalls() {
        [] {
          Record record;
          return g_registrar->GetComponent(kDictionary, &record);
+       }},
+      {"IvltRegistrar::GetComponent of a resource expert",
+       [] {
+         Record record;
+         return g_registrar->GetComponent(kResourceExpert, &record);
        }},
   };
 }

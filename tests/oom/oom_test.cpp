@@ -45,6 +45,9 @@ void MakeInstallation(Installation& installation) {
   std::string guid = "00000001-0000-0000-0000-000000000000";
   installation.addObjectExpert("a", "A", guid,
                                "{" + guid + "}:1:{0000000A-0000-0000-0000-000000000000}");
+  installation.addResourceExpert("r", "R", "00000003-0000-0000-0000-000000000000", "pnp");
+  // Two: the second is met where the first could not be copied.
+  installation.addResourceExpert("s", "S", "00000004-0000-0000-0000-000000000000", "pnp");
   installation.addDictionary("d", "D", "00000002-0000-0000-0000-000000000000", 3, "d");
   std::filesystem::create_directories(g_root + "/Data Dictionaries/Last");
   WriteBytes(g_root + "/VLTHooks.ini", "[Hook]\nName = no such point\nHang = false\n");
@@ -72,7 +75,7 @@ void ReportOnce() {
 // In a process that finds all components, with nothing set aside as damaged.
 int FindsEverything(const std::string& root) {
   if (!HasRegistrar()) return 1;
-  for (const GUID& id : {kExpert, kDictionary}) {
+  for (const GUID& id : {kExpert, kDictionary, kResourceExpert}) {
     Record record;
     if (g_registrar->GetComponent(id, &record) != S_OK || !record.name) return 2;
   }

@@ -12,6 +12,7 @@
 #include <unistd.h>
 
 #include <chrono>
+#include <exception>
 #include <fstream>
 #include <memory>
 #include <system_error>
@@ -78,15 +79,31 @@ void SendMessages(int fd, IEnumString* list) {
   }
 }
 
-// The child: exit code 0 for a sound component, 1 for one with problems. Its last word is kEnd, without
-// which the code is somebody else's: a library may end the process with any code while it is loaded.
-int CheckInside(const Component& component, int fd) {
+HRESULT CheckByTheLibrary(const Component& component, int fd) {
   IEnumString* list = nullptr;
   HRESULT result = vltCheckComponent(ParseGuid(component.guid), &list);
   if (list) {
     SendMessages(fd, list);
     list->Release();
   }
+  return result;
+}
+
+// What the check raises - a path that the system does not even let it look at - is told in place of the
+// messages, which are lost with it.
+HRESULT CheckOrTellWhyNot(const Component& component, int fd) {
+  try {
+    return CheckByTheLibrary(component, fd);
+  } catch (const std::exception& error) {
+    Send(fd, kNote, std::string("the check could not be finished: ") + error.what());
+    return E_FAIL;
+  }
+}
+
+// The child: exit code 0 for a sound component, 1 for one with problems. Its last word is kEnd, without
+// which the code is somebody else's: a library may end the process with any code while it is loaded.
+int CheckInside(const Component& component, int fd) {
+  HRESULT result = CheckOrTellWhyNot(component, fd);
   if (result < 0 && component.type != "dictionary") SendLoadersWords(fd, component.file);
   Send(fd, kEnd, "");
   return result < 0 ? 1 : 0;
@@ -159,9 +176,17 @@ std::string FateOf(int status, bool inTime, bool ended) {
   return "";
 }
 
+bool HasIdentifier(const Component& component) { return component.guid != GuidText(GUID_NULL); }
+
 Finding CheckOne(const Component& component) {
   Finding finding;
   finding.component = component;
+  // To the library the null identifier stands for all components: their problems would be told as
+  // this one's.
+  if (!HasIdentifier(component)) {
+    finding.notes.push_back("it has no identifier of its own, so it cannot be checked alone");
+    return finding;
+  }
   int pipeEnds[2];
   pid_t child = StartChild(component, pipeEnds);
   std::string text;

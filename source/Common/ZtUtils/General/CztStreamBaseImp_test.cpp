@@ -3,20 +3,12 @@
 #include <gtest/gtest.h>
 
 #include "tests/support/AllocFailure.h"
+#include "tests/support/SlotOf.h"
 #include "tests/support/StreamBytes.h"
 #include "ztcom/ztcore/ztmemmgr.h"
 
 namespace vlt::test {
 namespace {
-
-// Place of a virtual operation in its table, by the pointer form of the platform's C++ ABI.
-template <class Member>
-size_t SlotOf(Member member) {
-  uintptr_t words[2];
-  static_assert(sizeof member == sizeof words);
-  memcpy(words, &member, sizeof words);
-  return (words[0] - 1) / sizeof(void*);
-}
 
 TEST(StreamInterfaces, SlotsStandInOrder) {
   EXPECT_EQ(SlotOf(&IUnknown::Release), 2u);
