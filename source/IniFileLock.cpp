@@ -1,7 +1,6 @@
 #include "source/IniFileLock.h"
 
 #include <pthread.h>
-#include <unistd.h>
 #include <wctype.h>
 
 #include <atomic>
@@ -15,6 +14,7 @@
 #include "source/Cmd5vlt.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/Mutex.h"
+#include "zt/fnd/osdep/ProcessMark.h"
 
 using zt::fnd::AnsiString;
 using zt::fnd::String;
@@ -29,6 +29,7 @@ uint64_t ThisThread() {
 }
 
 constexpr uint64_t kNobody = 0;
+constexpr uint64_t kReleasing = UINT64_MAX;  // no thread's number: the last hold is being ended
 
 // The directory of the locks may be made by two processes at once, and one of them is told so.
 std::unique_ptr<zt::fnd::osdep::Mutex> CreateMutex(const String& name) {
@@ -43,7 +44,7 @@ std::unique_ptr<zt::fnd::osdep::Mutex> CreateMutex(const String& name) {
 
 struct IniFileLock::Entry {
   std::string name;
-  pid_t pid;
+  zt::fnd::osdep::ProcessMark process;
   std::unique_ptr<zt::fnd::osdep::Mutex> mutex;  // present while somebody owns the lock
   uint64_t owner = kNobody;
   unsigned depth = 0;
@@ -81,7 +82,7 @@ class IniFileLock::Table {
 IniFileLock::Entry* IniFileLock::Table::enter(std::unique_lock<std::mutex>& hold,
                                               const std::string& name, bool* mine) {
   auto& slot = m_entries[name];
-  if (!slot) slot.reset(new Entry{name, getpid(), nullptr});
+  if (!slot) slot.reset(new Entry{name, zt::fnd::osdep::ProcessMark::Current(), nullptr});
   Entry* entry = slot.get();
   ++entry->users;
   *mine = entry->owner == ThisThread();
@@ -125,6 +126,9 @@ void IniFileLock::Table::release(Entry* entry) {
     return;
   }
   auto mutex = std::move(entry->mutex);
+  // The owner is another thread where a hold ends on a thread that did not begin it, and must wait as
+  // all others do.
+  entry->owner = kReleasing;
   hold.unlock();
   mutex->unlock();
   // Before the next owner: when the hold ends on another thread than it began on, the section
@@ -138,7 +142,7 @@ void IniFileLock::Table::release(Entry* entry) {
 IniFileLock::IniFileLock(const String& name) : m_entry(Table::Instance().acquire(name)) {}
 
 IniFileLock::~IniFileLock() {
-  if (m_entry->pid != getpid()) {
+  if (!m_entry->process.isCurrent()) {
     // A copy of the parent's. Closing it leaves the lock with the parent; unlocking would not.
     m_entry->mutex.reset();
     return;

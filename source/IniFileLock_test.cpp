@@ -6,12 +6,15 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <filesystem>
 #include <thread>
 
 #include "source/TestIni.h"
 #include "tests/support/Child.h"
+#include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
+#include "tests/support/MutexPlace.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
 
@@ -89,11 +92,33 @@ TEST(IniLock, MayBeGivenUpByAnotherThreadAndTakenAgain) {
   auto mine = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
   std::thread([&] { mine.reset(); }).join();
   CvlIniMgr again(file.c_str(), true, nullptr, false, false);
-  EXPECT_EQ(Child([&] {
-              CvlIniMgr blocked(file.c_str(), true, nullptr, false, false);
-              return 0;
-            }).running(),
-            true);
+  Child other([&] {
+    CvlIniMgr blocked(file.c_str(), true, nullptr, false, false);
+    return 0;
+  });
+  EXPECT_TRUE(Eventually([&] { return BlockedIn(other.pid(), SYS_flock); }));
+}
+
+// The thread that began the hold must not take the lock for its own while another one ends the hold.
+TEST(IniLock, TheFirstOwnerWaitsForTheThreadThatGivesUp) {
+  EXPECT_EQ(InChild([] {
+              MutexPlace place;
+              zt::fnd::String name(L"name");
+              for (int round = 0; round < 300; ++round) {
+                auto first = std::make_unique<IniFileLock>(name);
+                std::atomic<bool> ending{false};
+                std::thread other([&] {
+                  ending = true;
+                  first.reset();
+                });
+                while (!ending) {
+                }
+                { IniFileLock again(name); }
+                other.join();
+                ASSERT_TRUE(FileIsFree(place.file("name"))) << round;
+              }
+            }),
+            0);
 }
 
 TEST(IniLock, AForkedChildDoesNotFreeItsParentsLock) {

@@ -54,11 +54,9 @@ bool Create(const std::string& sidecar, const unsigned char* digest, bool durabl
   unlink(temporary.c_str());  // What a killed process left, maybe another user's.
   {
     ScopedFd fd = Open(temporary, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW);
-    // Always synced: a rename that outlives its file's bytes in a power cut would leave a short
-    // one.
-    // Its mode before the rename, so that a kill right after it leaves no sidecar that others cannot
-    // write.
+    // Before the rename, so that a kill right after it leaves no sidecar that others cannot write.
     if (fd.valid()) fchmod(fd.get(), kSharedMode);
+    // Always synced: a rename that outlives its file's bytes in a power cut would leave a short one.
     if (!fd.valid() || !Overwrite(fd.get(), digest, true) ||
         rename(temporary.c_str(), sidecar.c_str()) != 0) {
       if (fd.valid()) unlink(temporary.c_str());

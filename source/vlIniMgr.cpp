@@ -19,6 +19,7 @@
 #include "zt/fnd/osdep/path.h"
 #include "ztini/ztini.h"
 
+using zt::fnd::AnsiString;
 using zt::fnd::String;
 using zt::fnd::osdep::path;
 using zt::fnd::osdep::RetryEintr;
@@ -64,6 +65,14 @@ HRESULT CopyOut(const char* value, char** out) {
 HRESULT CopyOut(const char* value, std::string* out) {
   *out = value;
   return S_OK;
+}
+
+void SetAsideIfPossible(const std::string& fileName) {
+  try {
+    CvlIniMgr::SetAside(String(fileName.c_str()));
+  } catch (const zt::fnd::exception::Exception&) {
+    // The caller is about to throw anyway; a file that cannot be set aside is met again next time.
+  }
 }
 
 bool IsNull(char** out) { return !out || !*out; }
@@ -184,7 +193,7 @@ void CvlIniMgr::DisposeDocument() {
 void CvlIniMgr::CleanupAndThrow(bool setAside) {
   if (m_ini) {
     DisposeDocument();
-    if (setAside) DeleteBadIniFile();
+    if (setAside) SetAsideIfPossible(m_fileName);
   }
   m_lock.reset();
   throw 1;
@@ -194,17 +203,14 @@ std::string CvlIniMgr::SidecarName(const std::string& fileName) {
   return fileName.substr(0, fileName.rfind('.')) + ".vl5";
 }
 
-void CvlIniMgr::DeleteBadIniFile() {
-  try {
-    String file(m_fileName.c_str());
-    if (path::DoesFileExist(file)) {
-      path::RenameFile(file, file + vlrGetCurrentLocalTime() + L".bad");
-    }
-    String sidecar(SidecarName(m_fileName).c_str());
-    if (path::DoesFileExist(sidecar)) path::RemoveFile(sidecar);
-  } catch (const zt::fnd::exception::Exception&) {
-    // The caller is about to throw anyway; a file that cannot be set aside is met again next time.
-  }
+void CvlIniMgr::SetAside(const String& fileName) {
+  String badEnd = vlrGetCurrentLocalTime() + L".bad";
+  String sidecar(SidecarName(AnsiString(fileName).c_str()).c_str());
+  // A directory in the sidecar's place goes first. Left there, it would have every later opening set the
+  // file aside once more: the empty one of this opening over the copy that is made here.
+  if (path::IsDirectory(sidecar.c_str())) path::RenameFile(sidecar, sidecar + badEnd);
+  if (path::DoesFileExist(fileName)) path::RenameFile(fileName, fileName + badEnd);
+  if (path::DoesFileExist(sidecar)) path::RemoveFile(sidecar);
 }
 
 HRESULT CvlIniMgr::Write() {

@@ -72,6 +72,11 @@ class CvlIniMgr {
   // Path of the sidecar: the part from the last "." of the whole path on becomes ".vl5".
   static std::string SidecarName(const std::string& fileName);
 
+  // Renames the file, if it is there, to NAME_mmddyyyy.bad over an earlier one of that day, and does away
+  // with its sidecar. The caller holds the lock. Throws what zt::fnd::osdep::path throws; a directory
+  // in the sidecar's place that cannot be moved leaves the file.
+  static void SetAside(const zt::fnd::String& fileName);
+
  private:
   void Initialize(unsigned char const* digest);
   void CreateFile();
@@ -80,7 +85,6 @@ class CvlIniMgr {
   static void GetMD5Checksum(const unsigned char* data, unsigned long lengthBytes,
                              unsigned char* digest);
   int32_t InitializeIniBindings();
-  void DeleteBadIniFile();
   [[noreturn]] void CleanupAndThrow(bool setAside);
   HRESULT DigestFile(unsigned char** digest) const;
   void DisposeDocument();

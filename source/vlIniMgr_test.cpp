@@ -169,6 +169,27 @@ TEST(IniManager, LockOnlyTouchesNothing) {
   EXPECT_FALSE(Exists(dir / "d"));
 }
 
+TEST(IniManager, LockOnlyLeavesWhatIsThere) {
+  TempDir dir;
+  std::string file = dir / "x.ini", bytes = "\xFF\xFE[";  // which does not parse
+  WriteBytes(file, bytes);
+  WriteBytes(dir / "x.vl5", std::string(15, 'x'));
+  ASSERT_EQ(chmod(file.c_str(), 0600), 0);
+  struct stat before, after;
+  ASSERT_EQ(stat(file.c_str(), &before), 0);
+  {
+    unsigned char digest[16] = {};
+    CvlIniMgr ini(file.c_str(), true, digest, true, false);
+  }
+  ASSERT_EQ(stat(file.c_str(), &after), 0);
+  EXPECT_EQ(after.st_ino, before.st_ino);
+  EXPECT_EQ(after.st_mode, before.st_mode);
+  EXPECT_EQ(ReadBytes(file), bytes);
+  EXPECT_EQ(ReadBytes(dir / "x.vl5"), std::string(15, 'x'));
+  std::filesystem::directory_iterator entries(dir.path()), end;
+  EXPECT_EQ(std::distance(entries, end), 2);
+}
+
 TEST(IniManager, WritesTheDialectAndReadsItBack) {
   TempDir dir;
   std::string file = dir / "x.ini";

@@ -13,8 +13,6 @@
 namespace {
 
 constexpr int32_t kTypesWithVariant = 8;
-constexpr uint64_t kLongestText = 0xFFFFFFFF;
-constexpr uint64_t kTextPiece = 64 * 1024;
 
 void WriteText(CztOutStream& out, const wchar_t* text) {
   zt::fnd::AnsiString narrow(text);
@@ -56,7 +54,7 @@ std::string ReadBytes(CztInStream& in, uint64_t length) {
   bool ended = false;
   std::string piece;
   for (HRESULT result = S_OK; length > 0 && result >= 0;) {
-    piece.assign(std::min(length, kTextPiece), '\0');
+    piece.assign(std::min(length, kStreamTextPiece), '\0');
     result = in.GetStream()->Read(piece.data(), static_cast<unsigned int>(piece.size()), nullptr);
     length -= piece.size();
     if (!ended) text.append(piece.c_str());
@@ -67,7 +65,7 @@ std::string ReadBytes(CztInStream& in, uint64_t length) {
 
 void ReadText(CztInStream& in, wchar_t*& text) {
   uint64_t length = in.ReadLong();
-  if (length > kLongestText) ZT_RAISE(zt::fnd::exception::OutOfRange());
+  if (length > kLongestStreamText) ZT_RAISE(zt::fnd::exception::OutOfRange());
   zt::fnd::String wide(ReadBytes(in, length).c_str());
   // What the field points to is not freed: it need not be a block of the record's own.
   if (vlrDuplicateString(wide.c_str(), &text) < 0) throw std::bad_alloc();

@@ -40,18 +40,16 @@ GUID IdentityOf(IvltObject* object) {
 
 // ---- Array elements. Each appends its text and gives back what the storage handed out.
 
-HRESULT AppendText(String& text, wchar_t* element) {
+void AppendText(String& text, wchar_t* element) {
   TaskMem<wchar_t> owned(element);
-  if (!owned) return E_OUTOFMEMORY;
-  text += owned.get();
-  return S_OK;
+  text += owned.get();  // null, when memory is out, is empty
 }
 
 template <class T, ArrayGetter<T> Getter, wchar_t* (*ToText)(T)>
 struct PlainElements {
   using Element = T;
   static constexpr ArrayGetter<T> kGet = Getter;
-  static HRESULT Append(String& text, T& element) { return AppendText(text, ToText(element)); }
+  static void Append(String& text, T& element) { AppendText(text, ToText(element)); }
   static void Release(T&) {}
 };
 
@@ -63,10 +61,7 @@ using GuidElements = PlainElements<GUID, &IvltObject::GetGuidArrayAttribute, &vl
 struct StringElements {
   using Element = wchar_t*;
   static constexpr ArrayGetter<Element> kGet = &IvltObject::GetStringArrayAttribute;
-  static HRESULT Append(String& text, Element& element) {
-    text += element;  // null is empty
-    return S_OK;
-  }
+  static void Append(String& text, Element& element) { text += element; }  // null is empty
   static void Release(Element& element) {
     vltTaskMemFree(element);
     element = nullptr;
@@ -76,10 +71,12 @@ struct StringElements {
 struct ReferenceElements {
   using Element = IvltObject*;
   static constexpr ArrayGetter<Element> kGet = &IvltObject::GetReferenceArrayAttribute;
-  static HRESULT Append(String& text, Element& element) {
-    if (element) return AppendText(text, vltGuidToString2(IdentityOf(element)));
-    text += L"NULL";
-    return S_OK;
+  static void Append(String& text, Element& element) {
+    if (!element) {
+      text += L"NULL";
+      return;
+    }
+    AppendText(text, vltGuidToString2(IdentityOf(element)));
   }
   static void Release(Element& element) {
     if (element) element->Release();
@@ -126,17 +123,14 @@ HRESULT ReportOutOfMemory() {
       "zt::fnd::String&)");
 }
 
-// S_OK, or E_OUTOFMEMORY when an element has no text. Elements go back as soon as they are told.
+// Elements go back as soon as they are told.
 template <class Kind>
-HRESULT AppendElements(ElementBuffer<Kind>& buffer, String& text) {
-  HRESULT result = S_OK;
+void AppendElements(ElementBuffer<Kind>& buffer, String& text) {
   for (auto& element : buffer) {
     if (&element != buffer.begin()) text += L',';
-    HRESULT appended = Kind::Append(text, element);
-    if (appended < 0) result = appended;
+    Kind::Append(text, element);
     Kind::Release(element);
   }
-  return result;
 }
 
 template <class Kind>
@@ -148,8 +142,7 @@ HRESULT AppendArray(IvltObject* object, unsigned id, const char* hookPoint, Stri
     ElementBuffer<Kind> buffer(count);
     if (!buffer) return ReportOutOfMemory();
     result = buffer.fill(object, id);
-    HRESULT appended = AppendElements(buffer, text);
-    if (result >= 0 && appended < 0) result = appended;
+    AppendElements(buffer, text);
   }
   text += L'}';
   return result;
@@ -157,19 +150,13 @@ HRESULT AppendArray(IvltObject* object, unsigned id, const char* hookPoint, Stri
 
 // ---- Single values
 
-// Stores a text that was made for a value that was read with this result.
-HRESULT HandOut(wchar_t* made, HRESULT result, wchar_t** text) {
-  if (!made) return result < 0 ? result : E_OUTOFMEMORY;
-  *text = made;
-  return result;
-}
-
 template <class T>
 HRESULT ValueText(IvltObject* object, unsigned id, ValueGetter<T> get, wchar_t* (*toText)(T),
                   wchar_t** text) {
   T value{};
   HRESULT result = (object->*get)(id, &value);
-  return result < 0 ? result : HandOut(toText(value), result, text);
+  if (result >= 0) *text = toText(value);
+  return result;
 }
 
 HRESULT StringText(IvltObject* object, unsigned id, wchar_t** text) {
@@ -177,8 +164,7 @@ HRESULT StringText(IvltObject* object, unsigned id, wchar_t** text) {
   HRESULT result = object->GetStringAttribute(id, &value);
   if (result < 0) return result;
   TaskMem<wchar_t> owned(value);
-  if (value) return HandOut(Dup(value), result, text);
-  *text = nullptr;
+  *text = Dup(value);
   return result;
 }
 
@@ -187,13 +173,15 @@ HRESULT ReferenceText(IvltObject* object, unsigned id, wchar_t** text) {
   HRESULT result = object->GetReferenceAttribute(id, &found);
   if (result < 0) found = nullptr;
   auto owned = CztComPtr<IvltObject>::Attach(found);
-  return HandOut(vltGuidToString2(found ? IdentityOf(found) : GUID_NULL), result, text);
+  *text = vltGuidToString2(found ? IdentityOf(found) : GUID_NULL);
+  return result;
 }
 
 HRESULT ArrayText(IvltObject* object, unsigned id, _vltAttributeType type, wchar_t** text) {
   String list;
   HRESULT result = vltGetArrayValueAsString(object, id, type, list);
-  return HandOut(Dup(list.c_str()), result, text);
+  *text = Dup(list.c_str());
+  return result;
 }
 
 }  // namespace

@@ -6,8 +6,9 @@
 //
 // Every reference and text that the storage hands out is given back, also when an exception leaves:
 // std::bad_alloc or zt::fnd::exception::OutOfRange of the texts, nothing else. Texts handed out are
-// vltTaskMemAlloc blocks. Results beside those told: E_POINTER for a null object or out-pointer,
-// E_OUTOFMEMORY, and the failures of the storage as they come. Threads: as the storage allows.
+// vltTaskMemAlloc blocks. Results beside those told: E_POINTER for a null object or out-pointer, and
+// the storage's as they come. A text that memory does not suffice for is null whatever the result, in
+// a list it is empty: test it. Threads: as the storage allows.
 
 #include "source/Utilities/vltInterfaces.h"
 #include "zt/fnd/StringFwd.h"

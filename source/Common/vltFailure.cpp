@@ -11,7 +11,7 @@
 #include "zt/fnd/osdep/NamedEvent.h"
 
 void vltTraceError(const char* format, ...) {
-  if (!(vlTracer::gs_traceMask & kTraceErrors)) return;
+  if (!(vlt_vlTracer::GetTraceMask() & kTraceErrors)) return;
   char message[2048];  // As much as one line of the log takes.
   va_list args;
   va_start(args, format);

@@ -87,6 +87,14 @@ TEST(FailureReport, TracesUnderTheErrorBitOnly) {
             "  Memory allocation failure in void f(int)\n  text 7\n");
 }
 
+TEST(FailureReport, APendingCallbackStartsTheLog) {
+  EXPECT_EQ(Errors([] {
+              vlTracer::Initialize([] { Start(2); });
+              vltTraceError("first");
+            }),
+            "  first\n");
+}
+
 TEST(FailureReport, LongMessagesAreCut) {
   std::string text = Errors([] {
     Start(2);

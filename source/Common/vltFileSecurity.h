@@ -14,7 +14,7 @@ inline constexpr int kSharedMode = 0777;
 // are not visited. The first failure ends the walk: E_FAIL.
 HRESULT vltSetFileSecurityImpl(const zt::fnd::String& path, int mode, bool recursive);
 
-// chmod of one path, which follows links. S_OK or E_FAIL.
+// The same for the path alone. S_OK or E_FAIL.
 HRESULT vlrSetFileSecurity(const zt::fnd::String& path, int mode);
 
 // Makes the directory, with the missing ones above it, unless it is there. Its mode becomes

@@ -58,7 +58,7 @@ wchar_t* Dup(const char* text);
 wchar_t* Dup(const wchar_t* text);
 
 // ---- GUIDs.
-wchar_t* vltGuidToString2(GUID g);          // null when memory is out
+wchar_t* vltGuidToString2(GUID g);          // null, or empty, when memory is out
 wchar_t* vltGuidToStructString2(GUID g);    // null when memory is out
 GUID vltGuidFromString2(const wchar_t* s);  // the null GUID for bad text
 int vltDceGuidCompare2(const GUID& a, const GUID& b);

@@ -141,7 +141,8 @@ HRESULT vltGetServerIdentityFromFile(GUID* out, String& dataDir) {
     }
     if (vltCreateGuid2(out) < 0) return result;
     TaskMem<wchar_t> text(vltGuidToString2(*out));
-    if (!text) return E_OUTOFMEMORY;  // Never an empty identity, which would stay.
+    // Never an empty identity: nobody could read it again.
+    if (!text || !*text.get()) return E_OUTOFMEMORY;
     return SetAndSave(jar, ini, kServerSection, kServerIdentity, Narrow(text.get()));
   });
 }

@@ -47,11 +47,13 @@ HRESULT HandOver(CvlIniMgr* created, HRESULT status, CvlIniMgr** out) {
 
 HRESULT VltjarOpenIniWithValidation(const wchar_t* file, CvlIniMgr** out) {
   *out = nullptr;
+  std::string narrow = Narrow(file);
+  // From the sidecar on: another process may be about to mend what this one would set aside.
+  IniFileLock hold(IniFileLock::NameForFile(narrow.c_str()));
   unsigned char* found = nullptr;
   HRESULT status = VltjarGetChecksumForCacheFile(file, &found);
   std::unique_ptr<unsigned char[]> digest(found);
   if (status == S_FALSE) status = S_OK;
-  std::string narrow = Narrow(file);
   CvlIniMgr* created = nullptr;
   try {
     if (status < 0 && status != E_OUTOFMEMORY) VltjarDeleteIniFile(file);
@@ -88,12 +90,7 @@ HRESULT VltjarSaveChanges(const wchar_t* file, CvlIniMgr* ini) {
 
 HRESULT VltjarDeleteIniFile(const wchar_t* file) {
   try {
-    String whole(file);
-    if (path::DoesFileExist(whole)) {
-      path::RenameFile(whole, whole + vlrGetCurrentLocalTime() + L".bad");
-    }
-    String sidecar(SidecarOf(file).c_str());
-    if (path::DoesFileExist(sidecar)) path::RemoveFile(sidecar);
+    CvlIniMgr::SetAside(String(file));
     return S_OK;
   } catch (const zt::fnd::osdep::OSException&) {
     // The file stays where it is; the caller opens it as it is.

@@ -1,7 +1,9 @@
 #include "source/Utilities/vltjar.h"
 
+#include <dlfcn.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <filesystem>
@@ -11,7 +13,10 @@
 
 #include "source/Common/vltFileSecurity.h"
 #include "source/Common/vltcmn.h"
+#include "source/Utilities/vltHookPoints.h"
+#include "source/Utilities/vltTestHook.h"
 #include "source/Utilities/vltutils.h"
+#include "tests/support/BuildModule.h"
 #include "tests/support/Child.h"
 #include "tests/support/Installation.h"
 
@@ -147,6 +152,50 @@ TEST_F(Jar, IdentityIsReadByEveryLaterCaller) {
   EXPECT_EQ(run(first), 0);  // bad text is the null GUID
 }
 
+// A library whose every identity is another one, in place of the one that makes them.
+class Identities {
+ public:
+  Identities() {
+    BuildModule(m_dir / "libZT-RPC.so",
+                "extern \"C\" int UuidCreate(unsigned* id) { static unsigned n; id[0] = ++n; "
+                "return 0; }\n");
+  }
+  // For this process: what was loaded by its path is found by its name.
+  bool load() const { return dlopen((m_dir / "libZT-RPC.so").c_str(), RTLD_NOW) != nullptr; }
+
+ private:
+  TempDir m_dir;
+};
+
+TEST_F(Jar, IdentityIsMadeOnce) {
+  Identities identities;
+  makeData();
+  auto ask = [&] {
+    GUID first = {}, second = {};
+    if (!identities.load() || vltCreateGuid2(&first) != S_OK) return 1;
+    if (vltGetServerIdentity(&first) != S_OK || vltGetServerIdentity(&second) != S_OK) return 2;
+    return first.Data1 == 2 && second.Data1 == 2 ? 0 : 3;
+  };
+  EXPECT_EQ(run(ask), 0);
+  EXPECT_EQ(run(ask), 0);
+  expectSealed();
+}
+
+TEST_F(Jar, AnIdentityWithoutATextIsNotTold) {
+  Identities identities;
+  makeData();
+  WriteBytes(installation.root() + "/VLTHooks.ini",
+             std::string("[Hook]\nName = ") + vlt::hook::kStringFromClsid +
+                 "\nSimulateMemoryAllocationFailure = true\n");
+  EXPECT_EQ(run([&] {
+              GUID id = {};
+              vltRefreshHook();
+              return identities.load() && vltGetServerIdentity(&id) == E_OUTOFMEMORY ? 0 : 1;
+            }),
+            0);
+  EXPECT_EQ(ReadBytes(jar()), "");
+}
+
 // ---- Endpoints
 
 std::string Endpoint(const wchar_t* storage) {
@@ -248,6 +297,50 @@ TEST_F(GuardedFile, AShortSidecarGivesUpTheFile) {
   EXPECT_EQ(ReadBytes(BadName(file)), "[s]\na=1\n");
   EXPECT_EQ(ReadBytes(file), "");
   EXPECT_FALSE(Exists(dir / "x.vl5"));
+}
+
+// Every opening would set the file aside, the second one the empty file over the copy of the first.
+TEST_F(GuardedFile, ADirectoryInTheSidecarsPlaceCostsTheFileOnce) {
+  WriteBytes(file, "[s]\na=1\n");
+  WriteBytes(dir.makeDir("x.vl5") + "/inside", "kept");
+  EXPECT_EQ(open(), E_FAIL);
+  EXPECT_EQ(ReadBytes(BadName(file)), "[s]\na=1\n");
+  EXPECT_EQ(ReadBytes(BadName(dir / "x.vl5") + "/inside"), "kept");
+  ini->SetItem("s", "a", "2", false);
+  EXPECT_EQ(VltjarSaveChanges(wide.c_str(), ini.get()), S_OK);
+  ini.reset();
+  EXPECT_EQ(open(), S_OK);
+  EXPECT_EQ(value("s", "a"), "2");
+  EXPECT_EQ(ReadBytes(BadName(file)), "[s]\na=1\n");
+}
+
+TEST_F(GuardedFile, WithADirectoryThatCannotBeMovedTheFileStays) {
+  WriteBytes(file, "[s]\na=1\n");
+  WriteBytes(dir.makeDir("x.vl5") + "/inside", "kept");
+  std::filesystem::create_directories(BadName(dir / "x.vl5") + "/in the way");
+  for (int opening = 0; opening < 2; ++opening) {
+    EXPECT_EQ(open(), E_FAIL);
+    EXPECT_EQ(value("s", "a"), "1");
+    ini.reset();
+  }
+  EXPECT_FALSE(Exists(BadName(file)));
+}
+
+// Two that find the sidecar short: the second must see what the first has made of it.
+TEST_F(GuardedFile, AShortSidecarIsJudgedUnderTheLock) {
+  WriteBytes(file, "[s]\na=1\n");
+  WriteBytes(dir / "x.vl5", std::string(15, 'x'));
+  auto lock = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
+  Child second([&] { return open() == S_OK && value("s", "a") == "new" ? 0 : 1; });
+  ASSERT_TRUE(Eventually([&] { return BlockedIn(second.pid(), SYS_flock); }));
+  ASSERT_EQ(open(), E_FAIL);
+  ini->SetItem("s", "a", "new", false);
+  ASSERT_EQ(VltjarSaveChanges(wide.c_str(), ini.get()), S_OK);
+  ini.reset();
+  lock.reset();
+  EXPECT_EQ(second.wait(), 0);
+  EXPECT_EQ(ReadBytes(BadName(file)), "[s]\na=1\n");
+  EXPECT_EQ(Hex(ReadBytes(dir / "x.vl5")), Md5Sum(file));
 }
 
 TEST_F(GuardedFile, AWrongDigestCostsNothingAndIsRepaired) {

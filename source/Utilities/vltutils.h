@@ -3,19 +3,17 @@
 // The exported surface of libvltutils.
 //
 // Rules for every function here:
-// 1. Results. HRESULTs are negative on failure; test the sign. Functions that return a value have
-// no
+// 1. Results. HRESULTs are negative on failure; test the sign. Functions that return a value have no
 //    failure of their own: bad text reads as 0 or as the null GUID.
-// 2. Ownership. A text or array that a call hands out comes from vltAlloc and is ended with
-// vltFree.
+// 2. Ownership. A text or array that a call hands out comes from vltAlloc and is ended with vltFree.
 //    A record's texts are ended with vltutilsFreeComponent2, an interface with Release.
 //    `const wchar_t*` results are static and never freed.
 // 3. Null. A required null pointer gives E_POINTER and changes nothing, unless told otherwise.
 // 4. Text. Wide text is UTF-32 in the host's byte order, narrow text is in the encoding of the
 //    process's locale (setlocale); what that encoding lacks becomes "?".
 // 5. Exceptions. Nothing is caught at the surface: failures below it that have no result code of
-//    their own pass out as zt::fnd::exception::Exception (zt/fnd/Exception.h) or std::bad_alloc. A
-//    call that ends so has released its locks.
+//    their own pass out as zt::fnd::exception::Exception (zt/fnd/Exception.h), as std::bad_alloc or,
+//    where a shared file cannot be opened, as the int 1. A call that ends so has released its locks.
 // 6. Threads. Every function may be called from every thread, unless told otherwise.
 // 7. Waiting. Calls that open a shared file wait, without limit, for other processes that have it.
 
@@ -52,7 +50,9 @@ VLT_EXPORT HRESULT vltLoadDataDictionaries2(IvltRegistrar* registrar);
 
 // Checks the files and entry points of one component, or of all for the null GUID. *errors walks the
 // messages and is handed out also when the result is a failure, but for E_POINTER, E_OUTOFMEMORY and a
-// registrar that cannot be had. Loads the libraries of experts into this process, and unloads them.
+// registrar that cannot be had. Loads the libraries of experts into this process, and unloads them. A
+// path that the system does not let it look at raises PosixError (a directory that is closed to the
+// user, a name too long).
 VLT_EXPORT HRESULT vltCheckComponent(vltID id, IEnumString** errors);
 // vltGetRegistrar for a null storage or the default one; E_FAIL for others. The same function twice.
 VLT_EXPORT HRESULT vltGetNamedRegistrar(const wchar_t* storage, IvltRegistrar** out);
@@ -127,8 +127,8 @@ VLT_EXPORT HRESULT vltCreateGuid(GUID* out);
 // Field by field, as unsigned numbers: -1, 0 or 1.
 VLT_EXPORT int vltDceGuidCompare(const GUID& a, const GUID& b);
 VLT_EXPORT GUID vltGuidFromString(const wchar_t* s);  // with or without braces
-VLT_EXPORT wchar_t* vltGuidToString(GUID g);        // {38 characters}, upper case; null: no memory
-VLT_EXPORT wchar_t* vltGuidToStructString(GUID g);  // a C initialiser
+VLT_EXPORT wchar_t* vltGuidToString(GUID g);          // {38 characters}; no memory: null or empty
+VLT_EXPORT wchar_t* vltGuidToStructString(GUID g);    // a C initialiser
 
 // ---- Type vocabulary.
 VLT_EXPORT _vltAttributeStorage vltAttributeStorageFromString(const wchar_t* s);
@@ -155,7 +155,7 @@ VLT_EXPORT unsigned vltLumMakeTypedTag(unsigned type, unsigned id);  // low halv
 
 // Text of any attribute: numbers, GUIDs and texts as they are, a reference as the GUID of its object
 // (all zeros for none), an array as "{a,b}" without quotes. E_FAIL for blobs and fast references;
-// *text is untouched on failure.
+// *text is untouched on failure, and may be null on success where memory is out.
 VLT_EXPORT HRESULT vltGetAttributeValueAsString(IvltObject* object, unsigned id, wchar_t** text);
 // Sets a number, a GUID or a text; E_FAIL for other types.
 VLT_EXPORT HRESULT vltSetAttributeValueFromString(IvltObject* object, unsigned id,

@@ -9,13 +9,15 @@
 
 namespace vlt::test {
 
-// Compiles the C++ text to a shared object of this process's word size at the path.
+// Compiles the C++ text to a shared object of this process's word size at the path. Once it is loaded by
+// that path, it is found by its bare name as well.
 inline void BuildModule(const std::string& path, const std::string& source) {
   TempDir dir;
   WriteBytes(dir / "module.cpp", source);
+  std::string name = path.substr(path.rfind('/') + 1);
   ProgramResult result =
-      RunProgram({"c++", "-shared", "-fPIC", sizeof(void*) == 4 ? "-m32" : "-m64", "-o", path,
-                  dir / "module.cpp"});
+      RunProgram({"c++", "-shared", "-fPIC", sizeof(void*) == 4 ? "-m32" : "-m64",
+                  "-Wl,-soname," + name, "-o", path, dir / "module.cpp"});
   ASSERT_EQ(result.exitCode, 0) << result.err;
 }
 

@@ -1,5 +1,6 @@
 #include "vlloader/source/vlloader.h"
 
+#include <limits.h>
 #include <stdio.h>
 
 #include <memory>
@@ -64,7 +65,8 @@ const char* NullIfEmpty(const std::string& text) { return text.empty() ? nullptr
 
 void PathInit(Loader& l) {
   if (l.pathInitialized) return;
-  l.path.assign(vlLookUpInstallDirectory());
+  const std::string found = vlLookUpInstallDirectory();
+  l.path.assign(found);  // by bytes: to move it would give the text's memory away
   l.pathInitialized = true;
 }
 
@@ -87,7 +89,7 @@ void FetchEntries(Loader& l) {
 void Init(Loader& l) {
   if (l.inEffect) return;
   if (l.loadTried) {
-    ++l.loads;
+    if (l.loads < INT_MAX) ++l.loads;
     return;
   }
   PathInit(l);

@@ -218,6 +218,23 @@ TEST(Loader, AfterACleanUpThePreferenceIsReadAnew) {
             0);
 }
 
+// A caller may still be copying the text while another one cleans up.
+TEST(Loader, ThePathOutlivesACleanUp) {
+  Storage s;
+  EXPECT_EQ(InChild([&] {
+              KorInitialize();
+              const char* text = GetCurrentVltPath();
+              EXPECT_GT(s.root().size(), 16u);  // no text that lies in its object
+              std::string other = "/elsewhere" + s.root();
+              Installation::setDir(other);
+              KorFinalize();
+              EXPECT_STREQ(text, "");
+              EXPECT_EQ(GetCurrentVltPath(), other);
+              EXPECT_EQ(text, other);
+            }),
+            0);
+}
+
 // Each forwarded call before KorInitialize counts a load that nothing takes back.
 TEST(Loader, LoadsBeforeInitializeKeepTheModules) {
   Storage s;

@@ -33,6 +33,7 @@ struct Question {
   unsigned maxLength;
   std::string joined;
   HRESULT result = E_FAIL;
+  bool outOfMemory = false;  // the result says nothing of the next time
 };
 
 }  // namespace
@@ -99,6 +100,7 @@ bool vltStringResources::Database::fileNameOf(const char* section, std::string* 
 bool vltStringResources::Database::take(Question& q, const char* section) {
   if (IniItemExists(document, section, q.key.c_str()) == 1) {
     TaskMem<char> text(static_cast<char*>(q.maxLength ? vltTaskMemAlloc(q.maxLength) : nullptr));
+    if (!text && q.maxLength) q.outOfMemory = true;
     int32_t status = 0;
     if (text) {
       status = IniGetStringIntoBuffer(document, section, q.key.c_str(), text.get(), q.maxLength);
@@ -130,7 +132,7 @@ void vltStringResources::Database::walk(Question& q) {
 
 void vltStringResources::Database::index() {
   if (indexed) return;
-  indexed = true;
+  sectionsOf.clear();  // of an attempt that ran out of memory
   int32_t count = IniNumberOfItems(document, kComponents);
   for (int32_t n = 1; n <= count; ++n) {
     const char* section = nullptr;
@@ -138,6 +140,7 @@ void vltStringResources::Database::index() {
     if (IniNthItemName(document, kComponents, n, &section) != 1) continue;
     if (fileNameOf(section, &base)) sectionsOf[base].push_back(section);
   }
+  indexed = true;
 }
 
 void vltStringResources::Database::answer(Question& q) {
@@ -152,13 +155,15 @@ void vltStringResources::Database::answer(Question& q) {
   if (Warns()) return walk(q);
   index();
   Kind kind(q.separator != nullptr, q.separator ? q.separator : "", q.key, q.maxLength);
-  auto [known, isNew] = answers[kind].try_emplace(q.target);
-  if (isNew) {
-    search(q);
-    known->second = {q.result, q.joined.substr(0, q.maxLength)};
+  auto& known = answers[kind];
+  if (auto found = known.find(q.target); found != known.end()) {
+    q.result = found->second.result;
+    q.joined = found->second.text;
+    return;
   }
-  q.result = known->second.result;
-  q.joined = known->second.text;
+  search(q);
+  q.joined.resize(std::min<size_t>(q.joined.size(), q.maxLength));
+  if (!q.outOfMemory) known.emplace(q.target, Answer{q.result, q.joined});
 }
 
 void vltStringResources::Database::search(Question& q) {

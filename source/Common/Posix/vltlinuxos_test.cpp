@@ -14,6 +14,7 @@
 #include "source/Utilities/vltutils.h"
 #include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
+#include "tests/support/MemoryLimit.h"
 #include "vlloader/source/vlloader.h"
 #include "ztini/ztini.h"
 
@@ -181,6 +182,26 @@ TEST(StringResource, ManyQuestionsReadTheDatabaseOnce) {
               EXPECT_EQ(ask(), "third");
               resources.forget();
               EXPECT_EQ(ask(), "n");
+            }),
+            0);
+}
+
+TEST(StringResource, AWantOfMemoryIsNotRemembered) {
+  if (!kCanLimitMemory) GTEST_SKIP() << "NOT TESTED: the sanitizer owns the address space";
+  Database d;
+  EXPECT_EQ(InChild([&] {
+              constexpr unsigned kMuch = 128u << 20;
+              vltStringResources resources;
+              auto ask = [&] {
+                TaskMem<char> out;
+                return resources.get(nullptr, L"/two.vle", L"Key", out.out(), kMuch);
+              };
+              rlimit before;
+              getrlimit(RLIMIT_AS, &before);
+              LimitMemoryTo(kMuch / 2);
+              EXPECT_EQ(ask(), E_FAIL);
+              setrlimit(RLIMIT_AS, &before);
+              EXPECT_EQ(ask(), S_OK);
             }),
             0);
 }

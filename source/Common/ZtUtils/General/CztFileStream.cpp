@@ -115,6 +115,11 @@ HRESULT CztFileStream::SetSize(uint64_t size) {
   return resized ? S_OK : E_FAIL;
 }
 
+// Not SetSize, which opens the file anew for size 0 and so would leave what is to go.
+void CztFileStream::takeBack(int64_t size) {
+  Succeeds([&] { m_file->resize(size); });
+}
+
 HRESULT CztFileStream::openAnew() try {
   zt::fnd::String name(m_fileName);
   // The arguments stand one place to the left of where one expects them, and files in the field

@@ -36,6 +36,7 @@ class CztFileStream : public CztStreamBaseImp {
  protected:
   CztFileStream() = default;
   ~CztFileStream();
+  void takeBack(int64_t size) override;
 
  private:
   HRESULT openAnew();

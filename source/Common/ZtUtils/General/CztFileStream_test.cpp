@@ -6,6 +6,7 @@
 #include <unistd.h>
 
 #include <csignal>
+#include <filesystem>
 
 #include "tests/support/AllocFailure.h"
 #include "tests/support/InChild.h"
@@ -311,20 +312,25 @@ TEST_F(FileStream, ClearStreamsStartsOver) {
 }
 
 TEST_F(FileStream, AnAreaThatDoesNotFitIsTakenBack) {
-  int result = InChild([this] {
-    {
-      FilePtr stream = Open(path, Access::Both);
-      Put(stream.get(), "data");
-      Made(stream.get(), L"one", std::string(100, 'x'));
-      rlimit limit = {80, 80};
-      signal(SIGXFSZ, SIG_IGN);
-      setrlimit(RLIMIT_FSIZE, &limit);
-      EXPECT_EQ(stream->WriteSubStreamInfo(), E_FAIL);
-      EXPECT_EQ(Count(stream.get()), 1u);
+  for (Access access : {Access::Both, Access::Write}) {
+    for (std::string data : {"data", ""}) {
+      std::filesystem::remove(path);
+      int result = InChild([&] {
+        {
+          FilePtr stream = Open(path, access);
+          Put(stream.get(), data);
+          Made(stream.get(), L"one", std::string(100, 'x'));
+          rlimit limit = {80, 80};
+          signal(SIGXFSZ, SIG_IGN);
+          setrlimit(RLIMIT_FSIZE, &limit);
+          EXPECT_EQ(stream->WriteSubStreamInfo(), E_FAIL);
+          EXPECT_EQ(Count(stream.get()), 1u);
+        }
+        EXPECT_EQ(ReadBytes(path), data);
+      });
+      EXPECT_EQ(result, 0);
     }
-    EXPECT_EQ(ReadBytes(path), "data");
-  });
-  EXPECT_EQ(result, 0);
+  }
 }
 
 TEST_F(FileStream, WithoutMemoryTheFileStaysAndNothingLeaks) {

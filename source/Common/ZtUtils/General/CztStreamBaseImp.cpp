@@ -145,6 +145,8 @@ HRESULT CztStreamBaseImp::cutArea() {
   return result;
 }
 
+void CztStreamBaseImp::takeBack(int64_t size) { SetSize(static_cast<uint64_t>(size)); }
+
 bool CztStreamBaseImp::nestsDeeperThan(unsigned levels) const {
   if (m_subStreams.empty()) return false;
   if (levels == 0) return true;
@@ -164,7 +166,7 @@ HRESULT CztStreamBaseImp::WriteSubStreamInfo() {
   if (result < 0) return result;
   result = Guarded([&] { return WriteSubStreamArea(this, m_subStreams, start); });
   if (result < 0) {
-    SetSize(static_cast<uint64_t>(start));
+    takeBack(start);
     return result;
   }
   m_subStreams.clear();

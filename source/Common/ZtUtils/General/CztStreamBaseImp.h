@@ -43,6 +43,9 @@ class CztStreamBaseImp : public IztStream3, public CZTComObjectRootEx<CZTComMult
   // LoadSubStreamInfo of a stream that lies `depth` areas below the outermost one.
   HRESULT loadSubStreams(bool writable, unsigned depth);
 
+  // Cuts off what a failed writing has left behind the first `size` bytes.
+  virtual void takeBack(int64_t size);
+
  private:
   HRESULT loadArea(int64_t offset, int64_t areaEnd, unsigned depth);
   HRESULT cutArea();

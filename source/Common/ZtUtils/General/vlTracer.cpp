@@ -1,7 +1,9 @@
 #include "source/Common/ZtUtils/General/vlTracer.h"
 
+#include <fcntl.h>
 #include <stdio.h>
 #include <string.h>
+#include <sys/stat.h>
 #include <sys/statvfs.h>
 #include <unistd.h>
 
@@ -13,6 +15,7 @@
 
 #include "source/Common/ZtUtils/General/ztSync.h"
 #include "zt/fnd/osdep/DateTime.h"
+#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/ThreadID.h"
 
 using zt::fnd::AnsiString;
@@ -24,7 +27,10 @@ constinit std::atomic<uint32_t> vlTracer::gs_traceMask{0};
 namespace {
 
 constexpr size_t kLongestLine = 2047;
+constexpr mode_t kLogMode = 0666;  // less the process's mask
 constexpr unsigned long kArgumentTextSize = 1024;
+constexpr int kCleanupTries = 100;  // a second in all
+constexpr useconds_t kCleanupPauseMicroseconds = 10000;
 constexpr const char* kDiskShort =
     "** Available disk space is below the desired threshold. Aborting tracing. **";
 
@@ -86,7 +92,14 @@ void OpenLog(LogFile& log) {
     log.diskShort = true;
     return;
   }
-  log.stream = fopen(log.name.c_str(), "ae");
+  // Others may write to the directory: a link or a pipe under the log's name is not what was meant.
+  ScopedFd file(open(log.name.c_str(),
+                     O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY,
+                     kLogMode));
+  struct stat info;
+  if (!file.valid() || fstat(file.get(), &info) != 0 || !S_ISREG(info.st_mode)) return;
+  log.stream = fdopen(file.get(), "a");
+  if (log.stream) file.release();
 }
 
 void CloseLog(LogFile& log) {
@@ -173,8 +186,14 @@ void vlTracer::Initialize(void (*callback)()) { gs_traceInitCallback = callback;
 void vlTracer::Cleanup() {
   Toolyard::CztMutex* sync = gs_traceSync.exchange(nullptr);
   if (!sync) return;
-  OutputLock lock(*sync);
+  // A thread may stand in a write that does not end, to a full pipe. It must not keep the process from
+  // ending; what is written is in the file already.
+  for (int tries = 0; !sync->TryLock(); ++tries) {
+    if (tries == kCleanupTries) return;
+    usleep(kCleanupPauseMicroseconds);
+  }
   CloseLog(Log());
+  sync->Unlock();
 }
 
 unsigned vlt_vlTracer::GetTraceMask() {
@@ -189,6 +208,7 @@ void vlt_vlTracer::TraceOutput(char marker, const char* text, bool detail) {
   Toolyard::CztMutex* sync = gs_traceSync;
   if (!sync) return;
   OutputLock lock(*sync);
+  if (gs_traceSync != sync) return;  // The log was closed while this line waited.
   char line[kLongestLine + 1];
   snprintf(line, sizeof line, "%c %s", marker, text ? text : "");
   WriteLine(line);

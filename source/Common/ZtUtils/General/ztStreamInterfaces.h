@@ -32,8 +32,9 @@ struct IztStream2 : IztStream {
   // Takes the sub-streams that stand behind the stream's data into memory, once in the object's
   // life: 0 done (or done before), 1 there are none. With `writable` they are cut off the stream,
   // to be written anew; without, they stay and the stream never writes any.
-  // Throws CztStreamException or CztEndOfStreamException for damaged ones, std::bad_alloc; the
-  // stream is then as before, without sub-streams.
+  // Throws CztStreamException or CztEndOfStreamException for damaged ones, std::bad_alloc. Its bytes
+  // are then as before; it counts as loaded, without sub-streams, and what stands behind the data is
+  // data from then on.
   virtual HRESULT LoadSubStreamInfo(int writable) = 0;
   // Appends the sub-streams to the stream and forgets them, once in the object's life; later calls
   // do nothing. A failure leaves the stream's own data alone behind.

@@ -405,6 +405,10 @@ TEST(SubStreamArea, LoadingWithoutMemoryLeavesTheStream) {
     EXPECT_EQ(thrown, Thrown::BadAlloc) << nth;
     EXPECT_EQ(Contents(stream.get()), bytes);
     EXPECT_EQ(Count(stream.get()), 0u);
+    EXPECT_EQ(stream->LoadSubStreamInfo(1), S_OK);  // counts as loaded
+    EXPECT_EQ(stream->WriteSubStreamInfo(), S_OK);
+    EXPECT_EQ(Count(stream.get()), 0u);
+    EXPECT_EQ(Contents(stream.get()), bytes);
   }
   EXPECT_GE(failures, 6);
 }

@@ -6,10 +6,6 @@
 
 namespace {
 
-// Long texts are read piece by piece, so that a length that is not true costs no memory.
-constexpr uint64_t kTextPiece = 64 * 1024;
-constexpr uint64_t kLongestText = 0xFFFFFFFF;
-
 CztComPtr<IztStream2> SubStreamsOf(IztStream* stream) {
   return CztComPtr<IztStream2>::Attach(ZtTryQueryInterface<IztStream2>(IID_IztStream2, stream));
 }
@@ -107,10 +103,10 @@ uint64_t CztInStream::ReadLong() {
 
 CztInStream& CztInStream::operator>>(zt::fnd::AnsiString& text) {
   uint64_t left = ReadLong();
-  if (left > kLongestText) throw CztStreamException();
+  if (left > kLongestStreamText) throw CztStreamException();
   zt::fnd::AnsiString read;
   while (left > 0) {
-    auto piece = static_cast<unsigned int>(std::min(left, kTextPiece));
+    auto piece = static_cast<unsigned int>(std::min(left, kStreamTextPiece));
     unsigned int start = read.length();
     read.append(piece, '\0');
     ztReadStreamBytes(m_stream, read.begin() + start, piece);

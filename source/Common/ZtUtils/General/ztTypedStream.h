@@ -9,6 +9,11 @@
 void ztReadStreamBytes(IztStream* stream, void* bytes, unsigned int count);
 void ztWriteStreamBytes(IztStream* stream, const void* bytes, unsigned int count);
 
+// Longest text of a stream, and how much of one is read at a time, so that a length that is not true
+// costs no memory. In bytes.
+inline constexpr uint64_t kLongestStreamText = 0xFFFFFFFF;
+inline constexpr uint64_t kStreamTextPiece = 64 * 1024;
+
 // Stream and version of a typed stream. The byte stream is not counted: the caller keeps it alive
 // for the wrapper's life.
 class CztStreamBase {
