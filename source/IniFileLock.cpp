@@ -150,6 +150,15 @@ IniFileLock::~IniFileLock() {
   Table::Instance().release(m_entry);
 }
 
+std::unique_ptr<IniFileLock> IniFileLock::ForFile(const char* fileName) {
+  String name = NameForFile(fileName);
+  try {
+    return std::make_unique<IniFileLock>(name);
+  } catch (...) {
+    return std::make_unique<IniFileLock>(name);
+  }
+}
+
 String IniFileLock::NameForFile(const char* fileName) {
   constexpr size_t kLongestEntry = 255;
   constexpr size_t kKept = 200;

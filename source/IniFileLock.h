@@ -1,5 +1,7 @@
 #pragma once
 
+#include <memory>
+
 #include "zt/fnd/String.h"
 
 // Hold on the named lock of one guarded INI file, for the object's life.
@@ -25,6 +27,9 @@ class IniFileLock {
   ~IniFileLock();
   IniFileLock(const IniFileLock&) = delete;
   IniFileLock& operator=(const IniFileLock&) = delete;
+
+  // Hold on a file. A failure may have passed, so it is tried twice; what the second try throws counts.
+  static std::unique_ptr<IniFileLock> ForFile(const char* fileName);
 
   // Name of the lock of a file: its path without "\", "/", ":" and ".", in capitals. A name that
   // would be too long for a directory entry ends in a digest instead of its tail.

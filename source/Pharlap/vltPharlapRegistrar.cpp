@@ -129,7 +129,7 @@ void CvltPharlapRegistrar::readComponents() {
 HRESULT CvltPharlapRegistrar::OpenIniWithValidation() {
   std::string file = Narrow(m_registrationFilePath);
   // From the sidecar on: another process may be about to mend what this one would set aside.
-  IniFileLock hold(IniFileLock::NameForFile(file.c_str()));
+  std::unique_ptr<IniFileLock> hold = IniFileLock::ForFile(file.c_str());
   unsigned char* found = nullptr;
   HRESULT result = GetChecksumForCacheFile(&found);
   std::unique_ptr<unsigned char[]> digest(found);

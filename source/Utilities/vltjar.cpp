@@ -49,7 +49,7 @@ HRESULT VltjarOpenIniWithValidation(const wchar_t* file, CvlIniMgr** out) {
   *out = nullptr;
   std::string narrow = Narrow(file);
   // From the sidecar on: another process may be about to mend what this one would set aside.
-  IniFileLock hold(IniFileLock::NameForFile(narrow.c_str()));
+  std::unique_ptr<IniFileLock> hold = IniFileLock::ForFile(narrow.c_str());
   unsigned char* found = nullptr;
   HRESULT status = VltjarGetChecksumForCacheFile(file, &found);
   std::unique_ptr<unsigned char[]> digest(found);
