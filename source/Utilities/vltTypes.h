@@ -40,7 +40,7 @@ enum _vltAttributeType : int32_t {
   vltFastReferenceType
 };
 enum _vltAttributeStorage : int32_t {};  // 0 dynamic, 1 static
-enum _vltClient : int32_t {};            // 0 unknown, 1 programmatic, 2 specification
+enum _vltClient : int32_t {};            // 0 to 2; vltClientToString has their texts
 enum _vltComponentType : int32_t {
   vltComponentNone = 0,
   vltComponentDataDictionary = 2,

@@ -6,7 +6,6 @@
 #include <signal.h>
 #include <stdlib.h>
 #include <sys/mount.h>
-#include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
@@ -24,7 +23,6 @@
 #include "tests/support/Child.h"
 #include "tests/support/FailSystemCall.h"
 #include "tests/support/TempDir.h"
-#include "tests/support/ThreadState.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/ThreadID.h"
 
@@ -237,82 +235,6 @@ TEST(Tracer, AFailedLockDoesNotStopTheOutput) {
   });
   EXPECT_EQ(t.exitCode, 0);
   EXPECT_TRUE(std::regex_match(t.log, std::regex("  one\n  two\n  Thread = .*\n"))) << t.log;
-}
-
-// The names that a log started within the next seconds may get.
-std::vector<std::string> ComingNames(const std::string& directory) {
-  std::vector<std::string> names;
-  for (time_t at = time(nullptr); names.size() < 5; ++at) {
-    tm local;
-    localtime_r(&at, &local);
-    char name[64], suffix[32];
-    strftime(name, sizeof name, "%Y%m%d_%H%M%S", &local);
-    snprintf(suffix, sizeof suffix, "-vlTracer-%08lX.log", static_cast<unsigned long>(getpid()));
-    names.push_back(directory + "/" + name + suffix);
-  }
-  return names;
-}
-
-TEST(Tracer, WhatOthersPutUnderTheLogsNameIsLeftAlone) {
-  for (bool pipe : {true, false}) {
-    TempDir dir;
-    std::string logs = dir.makeDir("logs"), errors = dir / "err", target = dir / "target";
-    WriteBytes(target, "mine\n");
-    EXPECT_EQ(Child([&] {
-                for (const std::string& name : ComingNames(logs)) {
-                  int made =
-                      pipe ? mkfifo(name.c_str(), 0666) : symlink(target.c_str(), name.c_str());
-                  if (made != 0) return 1;
-                }
-                dup2(open(errors.c_str(), O_CREAT | O_WRONLY, 0600), 2);
-                Start(vlTracer::kTargetFile | vlTracer::kTargetError,
-                      std::wstring(logs.begin(), logs.end()).c_str());
-                vlt_vlTracer::TraceOutput(' ', "x", false);
-                return 0;
-              }).wait(),
-              0);
-    EXPECT_EQ(ReadBytes(target), "mine\n");
-    EXPECT_EQ(ReadBytes(errors), "  x\n");
-    std::filesystem::directory_iterator entries(logs), end;
-    EXPECT_EQ(std::distance(entries, end), 5);
-  }
-}
-
-// Standard error is a pipe that nobody empties: its writer stands there with the lock.
-TEST(Tracer, TheEndDoesNotWaitForAWriteThatDoesNotEnd) {
-  EXPECT_EQ(Child([] {
-              int ends[2];
-              if (pipe(ends) != 0) return 1;
-              dup2(ends[1], 2);
-              fcntl(ends[1], F_SETFL, O_NONBLOCK);
-              while (write(ends[1], "x", 1) == 1) {
-              }
-              fcntl(ends[1], F_SETFL, 0);
-              Start(vlTracer::kTargetError, nullptr);
-              WatchedThread writer([] { vlt_vlTracer::TraceOutput(' ', "stuck", false); });
-              if (!writer.blocksIn(SYS_write)) return 2;
-              WatchedThread waiter([] { vlt_vlTracer::TraceOutput(' ', "late", false); });
-              if (!waiter.blocksInLock()) return 3;
-              vlTracer::Cleanup();
-              if (writer.done()) return 4;
-              // Emptied, all of them come to an end; the line that waited is not written any more.
-              std::string text;
-              char buffer[4096];
-              fcntl(ends[0], F_SETFL, O_NONBLOCK);
-              if (!Eventually([&] {
-                    for (ssize_t n; (n = read(ends[0], buffer, sizeof buffer)) > 0;) {
-                      text.append(buffer, static_cast<size_t>(n));
-                    }
-                    return writer.done() && waiter.done();
-                  })) {
-                return 5;
-              }
-              for (ssize_t n; (n = read(ends[0], buffer, sizeof buffer)) > 0;) {
-                text.append(buffer, static_cast<size_t>(n));
-              }
-              return text.ends_with("x  stuck\n") ? 0 : 6;
-            }).wait(),
-            0);
 }
 
 TEST(Tracer, LinesAreInTheFileWhenTheCallReturns) {
