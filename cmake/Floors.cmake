@@ -18,17 +18,18 @@ function(vlt_floor name)
   endforeach()
 endfunction()
 
-vlt_floor(ztini GLOBS ztini/*.cpp)
-vlt_floor(ztfnd GLOBS zt/fnd/*.cpp zt/fnd/osdep/*.cpp)
-vlt_floor(ztcore LINKS ztfnd ztini
+vlt_floor(ztposix GLOBS zt/posix/*.cpp)
+vlt_floor(ztini LINKS ztposix GLOBS ztini/*.cpp)
+vlt_floor(ztfnd LINKS ztposix GLOBS zt/fnd/*.cpp zt/fnd/osdep/*.cpp)
+vlt_floor(ztcore LINKS ztfnd ztini ztposix
   GLOBS ztcom/ztcore/*.cpp source/Common/ZtUtils/COM/*.cpp source/Common/ZtUtils/General/*.cpp)
-vlt_floor(vlcore LINKS ztcore ztfnd ztini
+vlt_floor(vlcore LINKS ztcore ztfnd ztini ztposix
   GLOBS source/*.cpp source/Common/*.cpp source/Common/Posix/*.cpp source/Pharlap/*.cpp
         source/Posix/*.cpp source/Utilities/*.cpp vlloader/source/*.cpp)
 
 # Everything, for tests of the inside. A process never links this and the shared library both.
 add_library(vltutils_static INTERFACE)
-foreach(floor vlcore ztcore ztfnd ztini)
+foreach(floor vlcore ztcore ztfnd ztini ztposix)
   if(TARGET ${floor})
     target_link_libraries(vltutils_static INTERFACE ${floor})
   endif()

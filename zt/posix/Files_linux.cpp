@@ -1,0 +1,386 @@
+#include "zt/posix/Files.h"
+
+#include <errno.h>
+#include <fcntl.h>
+#include <limits.h>
+#include <linux/openat2.h>
+#include <stdio.h>
+#include <stdlib.h>
+#include <string.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <memory>
+
+#include "zt/posix/Retry.h"
+
+namespace zt::posix {
+namespace {
+
+constexpr int kMostLinks = 40;  // as the kernel's own limit
+constexpr int kMostRaces = 100;
+constexpr int kMostSetAside = 10000;
+constexpr int kFirstFreeDescriptor = 3;
+constexpr int kAlways = O_CLOEXEC | O_NOCTTY | O_NONBLOCK;
+
+struct Free {
+  void operator()(char* text) const { free(text); }
+};
+using Text = std::unique_ptr<char, Free>;
+
+ScopedFd OpenAt(int directory, const char* name, int flags, mode_t mode = 0) {
+  return ScopedFd(RetryEintr([&] { return openat(directory, name, flags | O_CLOEXEC, mode); }));
+}
+
+ScopedFd Failure(int error) {
+  errno = error;
+  return ScopedFd();
+}
+
+bool IsTrusted(const struct stat& link, const struct stat& target) {
+  return link.st_uid == 0 || link.st_uid == geteuid() || link.st_uid == target.st_uid;
+}
+
+// Walks a path one component at a time, so that each link on the way can be judged.
+class Walk {
+ public:
+  // What the path names below `at`, as O_PATH.
+  ScopedFd resolve(int at, const char* path, bool follow);
+
+ private:
+  ScopedFd start(int at, const char* path);
+  ScopedFd step(ScopedFd directory, const char* name, bool follow);
+  ScopedFd followLink(const ScopedFd& directory, const ScopedFd& link, const struct stat& info);
+
+  int m_links = 0;
+};
+
+ScopedFd Walk::start(int at, const char* path) {
+  if (!*path) return Failure(ENOENT);
+  if (*path == '/') return OpenAt(AT_FDCWD, "/", O_PATH | O_DIRECTORY);
+  return OpenAt(at, ".", O_PATH | O_DIRECTORY);
+}
+
+ScopedFd Walk::followLink(const ScopedFd& directory, const ScopedFd& link,
+                          const struct stat& info) {
+  if (++m_links > kMostLinks) return Failure(ELOOP);
+  Text text(static_cast<char*>(malloc(PATH_MAX)));
+  if (!text) return Failure(ENOMEM);
+  ssize_t length = RetryEintr([&] { return readlinkat(link.get(), "", text.get(), PATH_MAX); });
+  if (length < 0) return ScopedFd();
+  if (length == PATH_MAX) return Failure(ENAMETOOLONG);
+  text.get()[length] = 0;
+  ScopedFd target = resolve(directory.get(), text.get(), true);
+  struct stat led;
+  if (!target || fstat(target.get(), &led) != 0) return ScopedFd();
+  return IsTrusted(info, led) ? std::move(target) : Failure(ELOOP);
+}
+
+ScopedFd Walk::step(ScopedFd directory, const char* name, bool follow) {
+  ScopedFd found = OpenAt(directory.get(), name, O_PATH | O_NOFOLLOW);
+  struct stat info;
+  if (!found || fstat(found.get(), &info) != 0) return ScopedFd();
+  if (!S_ISLNK(info.st_mode) || !follow) return found;
+  return followLink(directory, found, info);
+}
+
+ScopedFd Walk::resolve(int at, const char* path, bool follow) {
+  ScopedFd here = start(at, path);
+  char name[NAME_MAX + 1];
+  while (here) {
+    path += strspn(path, "/");
+    if (!*path) break;
+    size_t length = strcspn(path, "/");
+    if (length > NAME_MAX) return Failure(ENAMETOOLONG);
+    memcpy(name, path, length);
+    name[length] = 0;
+    path += length;
+    bool last = !*path;
+    here = step(std::move(here), name, follow || !last);
+    // A slash at the end asks for a directory.
+    struct stat info;
+    if (here && *path && (fstat(here.get(), &info) != 0 || !S_ISDIR(info.st_mode))) {
+      return Failure(ENOTDIR);
+    }
+  }
+  return here;
+}
+
+// The kernel walks a path without links in one call. ELOOP: it has one, which is judged by the slow
+// walk; ENOSYS, EPERM and EINVAL: an older kernel, or a sandbox that does not know the call.
+bool NeedsSlowWalk(int error) {
+  return error == ELOOP || error == ENOSYS || error == EPERM || error == EINVAL;
+}
+
+ScopedFd LookUpWithoutLinks(const char* path, bool follow) {
+  struct open_how how;
+  memset(&how, 0, sizeof how);
+  how.flags = static_cast<unsigned>(O_PATH | O_CLOEXEC | (follow ? 0 : O_NOFOLLOW));
+  how.resolve = RESOLVE_NO_SYMLINKS;
+  return ScopedFd(static_cast<int>(
+      RetryEintr([&] { return syscall(SYS_openat2, AT_FDCWD, path, &how, sizeof how); })));
+}
+
+// The path of a descriptor in /proc, through which O_PATH ones can be opened for real.
+class DescriptorPath {
+ public:
+  explicit DescriptorPath(int fd) { snprintf(m_text, sizeof m_text, "/proc/self/fd/%d", fd); }
+  const char* text() const { return m_text; }
+
+ private:
+  char m_text[32];
+};
+
+bool SameFile(int a, int b) {
+  struct stat left, right;
+  return fstat(a, &left) == 0 && fstat(b, &right) == 0 && left.st_dev == right.st_dev &&
+         left.st_ino == right.st_ino;
+}
+
+// Opens for real what was looked up.
+ScopedFd Reopen(const ScopedFd& found, const char* path, int flags) {
+  ScopedFd fd = OpenAt(AT_FDCWD, DescriptorPath(found.get()).text(), flags | kAlways);
+  // Without /proc by the path once more: the same file, or none.
+  if (!fd && errno == ENOENT) {
+    fd = OpenAt(AT_FDCWD, path, flags | kAlways);
+    if (fd && !SameFile(fd.get(), found.get())) return Failure(ELOOP);
+  }
+  return AboveStandardStreams(std::move(fd));
+}
+
+}  // namespace
+
+ScopedFd AboveStandardStreams(ScopedFd fd) {
+  if (!fd || fd.get() >= kFirstFreeDescriptor) return fd;
+  return ScopedFd(fcntl(fd.get(), F_DUPFD_CLOEXEC, kFirstFreeDescriptor));
+}
+
+ScopedFd LookUp(const char* path, bool follow) {
+  ScopedFd found = LookUpWithoutLinks(path, follow);
+  if (found || !NeedsSlowWalk(errno)) return found;
+  return Walk().resolve(AT_FDCWD, path, follow);
+}
+
+ScopedFd OpenExisting(const char* path, int flags, Kind kind, LastLink link) {
+  ScopedFd found = LookUp(path, link == LastLink::Judged);
+  struct stat info;
+  if (!found || fstat(found.get(), &info) != 0) return ScopedFd();
+  if (S_ISLNK(info.st_mode)) return Failure(ELOOP);
+  if (S_ISDIR(info.st_mode)) {
+    if (kind != Kind::FileOrDirectory) return Failure(EISDIR);
+  } else if (!S_ISREG(info.st_mode)) {
+    return Failure(ENXIO);
+  }
+  return Reopen(found, path, flags);
+}
+
+ScopedFd CreateNew(const char* path, int flags, mode_t mode) {
+  Entry entry(path);
+  if (!entry.valid()) return ScopedFd();
+  return AboveStandardStreams(OpenAt(entry.directory.get(), entry.name,
+                                     flags | kAlways | O_CREAT | O_EXCL | O_NOFOLLOW, mode));
+}
+
+ScopedFd OpenOrCreate(const char* path, int flags, mode_t mode) {
+  // Another process may make or remove the file between the two attempts.
+  for (int race = 0; race < kMostRaces; ++race) {
+    ScopedFd fd = OpenExisting(path, flags);
+    if (fd || errno != ENOENT) return fd;
+    fd = CreateNew(path, flags, mode);
+    if (fd || errno != EEXIST) return fd;
+    // What is there, but leads nowhere, is a dangling link.
+    struct stat info;
+    ScopedFd found = LookUp(path, false);
+    if (found && fstat(found.get(), &info) == 0 && S_ISLNK(info.st_mode)) return Failure(ELOOP);
+  }
+  return Failure(EEXIST);
+}
+
+ScopedFd OpenDirectory(const char* path) {
+  ScopedFd found = LookUp(path);
+  if (!found) return found;
+  return Reopen(found, path, O_RDONLY | O_DIRECTORY);
+}
+
+Entry::Entry(const char* path) : name(path) {
+  // Slashes at the end belong to the name: they ask for a directory.
+  size_t end = strlen(path);
+  while (end > 0 && path[end - 1] == '/') --end;
+  while (end > 0 && path[end - 1] != '/') --end;
+  if (end == 0) {
+    directory = LookUp(*path == '/' ? "/" : ".");
+    return;
+  }
+  name = path + end;
+  Text text(static_cast<char*>(malloc(end + 1)));
+  if (!text) {
+    errno = ENOMEM;
+    return;
+  }
+  memcpy(text.get(), path, end);
+  text.get()[end] = 0;
+  directory = LookUp(text.get());
+}
+
+int Rename(const char* from, const char* to) {
+  Entry source(from), target(to);
+  if (!source.valid() || !target.valid()) return -1;
+  return RetryEintr([&] {
+    return renameat(source.directory.get(), source.name, target.directory.get(), target.name);
+  });
+}
+
+int Unlink(const char* path) {
+  Entry entry(path);
+  if (!entry.valid()) return -1;
+  return RetryEintr([&] { return unlinkat(entry.directory.get(), entry.name, 0); });
+}
+
+int Link(const char* existing, const char* path) {
+  Entry source(existing), target(path);
+  if (!source.valid() || !target.valid()) return -1;
+  return RetryEintr([&] {
+    return linkat(source.directory.get(), source.name, target.directory.get(), target.name, 0);
+  });
+}
+
+int RenameToNew(int directory, const char* from, const char* to) {
+  long result = RetryEintr(
+      [&] { return syscall(SYS_renameat2, directory, from, directory, to, RENAME_NOREPLACE); });
+  if (result == 0 || (errno != ENOSYS && errno != EINVAL && errno != EPERM)) {
+    return static_cast<int>(result);
+  }
+  // Some file systems do not know the flag. Look first; a race here would need two files set aside at
+  // one moment under the file's lock.
+  struct stat info;
+  if (fstatat(directory, to, &info, AT_SYMLINK_NOFOLLOW) == 0) {
+    errno = EEXIST;
+    return -1;
+  }
+  return RetryEintr([&] { return renameat(directory, from, directory, to); });
+}
+
+int MoveAside(const char* path, const char* stamp) {
+  Entry entry(path);
+  if (!entry.valid()) return -1;
+  char name[NAME_MAX + 1];
+  for (int number = 0; number < kMostSetAside; ++number) {
+    int length = number == 0
+                     ? snprintf(name, sizeof name, "%s%s.bad", entry.name, stamp)
+                     : snprintf(name, sizeof name, "%s%s.%d.bad", entry.name, stamp, number);
+    if (length >= static_cast<int>(sizeof name)) {
+      errno = ENAMETOOLONG;
+      return -1;
+    }
+    if (RenameToNew(entry.directory.get(), entry.name, name) == 0) return 0;
+    if (errno != EEXIST) return -1;
+  }
+  return -1;
+}
+
+int MakeRoom(const char* path) {
+  if (Unlink(path) == 0 || errno == ENOENT) return 0;
+  // A directory: EISDIR on Linux, EPERM by POSIX.
+  return errno == EISDIR || errno == EPERM ? MoveAside(path) : -1;
+}
+
+int ChangeMode(int fd, mode_t mode) {
+  int result = RetryEintr([&] { return fchmod(fd, mode); });
+  if (result == 0 || errno != EBADF) return result;
+  // O_PATH: fchmod does not take it.
+  result = RetryEintr([&] { return chmod(DescriptorPath(fd).text(), mode); });
+  if (result == 0 || errno != ENOENT) return result;
+    // Without /proc: Linux 6.6 has a call for it, and a directory can be opened.
+#ifdef SYS_fchmodat2
+  constexpr long kChangeModeAt = SYS_fchmodat2;
+#else
+  constexpr long kChangeModeAt = 452;  // on every architecture
+#endif
+  if (RetryEintr([&] { return syscall(kChangeModeAt, fd, "", mode, AT_EMPTY_PATH); }) == 0) {
+    return 0;
+  }
+  ScopedFd directory = OpenAt(fd, ".", O_RDONLY | O_DIRECTORY);
+  return directory ? RetryEintr([&] { return fchmod(directory.get(), mode); }) : -1;
+}
+
+int SetSharedMode(int fd, mode_t mode) {
+  struct stat info;
+  if (fstat(fd, &info) != 0) return -1;
+  if (S_ISREG(info.st_mode) && info.st_nlink > 1) {
+    errno = EMLINK;
+    return -1;
+  }
+  if (info.st_uid != 0 && info.st_uid != geteuid()) {
+    errno = EPERM;
+    return -1;
+  }
+  return ChangeMode(fd, mode);
+}
+
+int SetSharedMode(const char* path, mode_t mode) {
+  ScopedFd found = LookUp(path, false);
+  struct stat info;
+  if (!found || fstat(found.get(), &info) != 0) return -1;
+  if (S_ISLNK(info.st_mode)) return 0;
+  return SetSharedMode(found.get(), mode);
+}
+
+bool IsPassing(int error) {
+  switch (error) {
+    case EIO:
+    case ESTALE:
+    case EINTR:
+    case ENOMEM:
+    case EMFILE:
+    case ENFILE:
+    case ENOSPC:
+    case ETIMEDOUT:
+      return true;
+    default:
+      return false;
+  }
+}
+
+bool WriteAll(int fd, const void* data, size_t sizeBytes) {
+  const char* next = static_cast<const char*>(data);
+  while (sizeBytes > 0) {
+    ssize_t done = RetryEintr([&] { return write(fd, next, sizeBytes); });
+    if (done <= 0) return false;
+    next += done;
+    sizeBytes -= static_cast<size_t>(done);
+  }
+  return true;
+}
+
+bool WriteAllAt(int fd, const void* data, size_t sizeBytes, off_t offset) {
+  const char* next = static_cast<const char*>(data);
+  while (sizeBytes > 0) {
+    ssize_t done = RetryEintr([&] { return pwrite(fd, next, sizeBytes, offset); });
+    if (done <= 0) return false;
+    next += done;
+    offset += done;
+    sizeBytes -= static_cast<size_t>(done);
+  }
+  return true;
+}
+
+bool Sync(int fd) {
+  if (RetryEintr([&] { return fsync(fd); }) == 0) return true;
+  return errno == EINVAL || errno == ENOSYS || errno == EROFS;
+}
+
+bool SyncDirectory(const char* path) {
+  ScopedFd fd = OpenDirectory(path);
+  if (!fd) return errno == EACCES;
+  return Sync(fd.get());
+}
+
+bool SyncDirectoryOf(const char* path) {
+  Entry entry(path);
+  if (!entry.valid()) return false;
+  ScopedFd fd = OpenAt(entry.directory.get(), ".", O_RDONLY | O_DIRECTORY);
+  if (!fd) return errno == EACCES;
+  return Sync(fd.get());
+}
+
+}  // namespace zt::posix
