@@ -32,13 +32,7 @@ void FreeGuts(AutoBufferGuts* guts) noexcept {
 AutoBufferGuts* NewGuts(std::uint32_t capacity) {
   void* place = std::malloc(sizeof(AutoBufferGuts));
   if (place == nullptr) throw std::bad_alloc();
-  AutoBufferGuts* guts;
-  try {
-    guts = new (place) AutoBufferGuts;
-  } catch (...) {  // The count needs memory of its own; the place is not yet anybody's.
-    std::free(place);
-    throw;
-  }
+  AutoBufferGuts* guts = new (place) AutoBufferGuts;
   if (capacity == 0) return guts;
   guts->data = static_cast<unsigned char*>(std::malloc(capacity));
   if (guts->data == nullptr) {

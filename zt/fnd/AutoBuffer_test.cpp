@@ -10,7 +10,6 @@
 #include <thread>
 #include <vector>
 
-#include "tests/support/AllocFailure.h"
 #include "tests/support/Child.h"
 #include "tests/support/MemoryLimit.h"
 #include "zt/fnd/Exception.h"
@@ -236,24 +235,6 @@ TEST(BufferAuto, FailedAllocationLeavesTheBytes) {
     return Text(b) == "abcd" ? 0 : 3;
   });
   EXPECT_EQ(0, child.wait());
-}
-
-TEST(BufferAuto, FailedCountLeavesTheBytesAndLeaksNothing) {
-  AutoBuffer source = Of("abc");
-  for (int nth = 1;; ++nth) {
-    AutoBuffer shared(source);
-    vlt::test::FailAllocation fail(nth);
-    try {
-      shared.Append("d", 1);
-      EXPECT_GT(nth, 1);
-      EXPECT_EQ("abcd", Text(shared));
-      break;
-    } catch (const std::bad_alloc&) {
-      EXPECT_EQ("abc", Text(shared));
-    }
-    ASSERT_LT(nth, 20);
-  }
-  EXPECT_EQ("abc", Text(source));
 }
 
 TEST(BufferAuto, CompareIsByByteThenByLength) {

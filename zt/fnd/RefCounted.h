@@ -4,6 +4,7 @@
 
 #include "zt/fnd/DLLAlloc.h"
 #include "zt/fnd/osdep/AtomicInt.h"
+#include "zt/fnd/osdep/CriticalSection.h"
 
 namespace zt {
 namespace fnd {

@@ -1,34 +1,29 @@
 #include "zt/fnd/osdep/AtomicInt.h"
 
-#include <utility>
-
 namespace zt {
 namespace fnd {
 namespace osdep {
 
-int AtomicInt::getCount() const {
-  CriticalSectionGuard guard(m_section);
-  return m_value;
+int AtomicInt::getCount() const { return m_value.load(); }
+
+namespace {
+
+// Unsigned, as the signed sum could overflow.
+int Sum(std::int32_t value, std::uint32_t n) {
+  return static_cast<std::int32_t>(static_cast<std::uint32_t>(value) + n);
 }
 
-int AtomicInt::add(std::uint32_t n) {
-  CriticalSectionGuard guard(m_section);
-  m_value = static_cast<std::int32_t>(static_cast<std::uint32_t>(m_value) + n);
-  return m_value;
-}
+}  // namespace
 
-int AtomicInt::increment() { return add(1); }
-int AtomicInt::decrement() { return add(0xFFFFFFFFu); }
+int AtomicInt::increment() { return Sum(m_value.fetch_add(1), 1); }
+int AtomicInt::decrement() { return Sum(m_value.fetch_sub(1), 0xFFFFFFFFu); }
 
 int AtomicInt::compareExchange(int expected, int replacement) {
-  CriticalSectionGuard guard(m_section);
-  return m_value == expected ? std::exchange(m_value, replacement) : m_value;
+  m_value.compare_exchange_strong(expected, replacement);
+  return expected;
 }
 
-int AtomicInt::replaceAndReturn(int value) {
-  CriticalSectionGuard guard(m_section);
-  return std::exchange(m_value, value);
-}
+int AtomicInt::replaceAndReturn(int value) { return m_value.exchange(value); }
 
 }  // namespace osdep
 }  // namespace fnd

@@ -1,18 +1,17 @@
 #pragma once
 
+#include <atomic>
 #include <cstdint>
-
-#include "zt/fnd/osdep/CriticalSection.h"
 
 namespace zt {
 namespace fnd {
 namespace osdep {
 
-// A 32-bit signed number on which each operation is one indivisible step, under a section of its
-// own. Arithmetic wraps. Throws std::bad_alloc from the constructor only. Threads: any.
+// A 32-bit signed number on which each operation is one indivisible step. Arithmetic wraps. No
+// locks: a child that is forked during a step of another thread can go on. Threads: any.
 class AtomicInt {
  public:
-  explicit AtomicInt(int value) : m_value(value) {}
+  explicit AtomicInt(int value) noexcept : m_value(value) {}
   AtomicInt(const AtomicInt&) = delete;
   AtomicInt& operator=(const AtomicInt&) = delete;
 
@@ -31,10 +30,9 @@ class AtomicInt {
   bool operator>=(int value) const { return getCount() >= value; }
 
  private:
-  int add(std::uint32_t n);
-
-  std::int32_t m_value GUARDED_BY(m_section);
-  CriticalSection m_section;
+  std::atomic<std::int32_t> m_value;
+  [[maybe_unused]] void* m_reserved =
+      nullptr;  // of the size that objects with a number in them have always had
 };
 
 }  // namespace osdep

@@ -1,5 +1,6 @@
 #include "zt/fnd/osdep/BinaryFile.h"
 
+#include <errno.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>

@@ -31,7 +31,11 @@ class CloseOnForkFd {
 
   // CreateSharedUnixFile. No fork gets hold of the descriptor while it is being opened. Throws what
   // that throws, and std::bad_alloc.
-  static CloseOnForkFd OpenShared(const AnsiString& path);
+  static CloseOnForkFd OpenShared(const AnsiString& path, InTheWay way = InTheWay::Refused);
+
+  // Has fork() know of the descriptors before the first is opened; for those whose own handlers must
+  // run before these.
+  static void RegisterForkHandlers();
 
   // The descriptor; -1 for none, for one that the host has closed, and in a child that has no copy.
   // Asks the system each time. Keeps errno.

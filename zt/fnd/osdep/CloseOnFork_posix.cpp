@@ -88,11 +88,13 @@ CloseOnForkFd& CloseOnForkFd::operator=(CloseOnForkFd&& other) noexcept {
   return *this;
 }
 
-CloseOnForkFd CloseOnForkFd::OpenShared(const AnsiString& path) {
-  pthread_once(&s_once, Register);
+void CloseOnForkFd::RegisterForkHandlers() { pthread_once(&s_once, Register); }
+
+CloseOnForkFd CloseOnForkFd::OpenShared(const AnsiString& path, InTheWay way) {
+  RegisterForkHandlers();
   for (;;) {
     unsigned forks = ForksSoFar();
-    ScopedFd fd(CreateSharedUnixFile(path));
+    ScopedFd fd(CreateSharedUnixFile(path, way));
     CloseOnForkFd result;
     result.m_file = FileIdentity::Of(fd.get());
     result.m_serial = MarkIfNoFork(fd.get(), result.m_file, forks);

@@ -14,6 +14,7 @@
 
 #include "tests/support/Child.h"
 #include "tests/support/HostsFile.h"
+#include "tests/support/InChild.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
@@ -81,19 +82,22 @@ TEST(ForkClose, UnmarkedAndRemarkedDescriptors) {
   EXPECT_EQ(0, closes.wait());
 }
 
+// In a process of its own, where no other object's number is free after a fork.
 TEST(ForkClose, GrandchildDoesNotCloseTheNumberAgain) {
   TempDir dir;
-  CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
-  const int number = fd.get();
-  Child child([&] {
-    ScopedFd reused(::open("/dev/null", O_RDONLY | O_CLOEXEC));
-    if (reused.get() != number) return 1;
-    Child grandchild([&] { return IsOpen(reused.get()) ? 0 : 2; });
-    int code = grandchild.wait();
-    fd.reset();  // nor does the object
-    return code == 0 && !IsOpen(reused.get()) ? 3 : code;
-  });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(0, vlt::test::InChild([&] {
+              CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
+              const int number = fd.get();
+              Child child([&] {
+                ScopedFd reused(fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, number));
+                if (reused.get() != number) return 1;
+                Child grandchild([&] { return IsOpen(reused.get()) ? 0 : 2; });
+                int code = grandchild.wait();
+                fd.reset();  // nor does the object
+                return code == 0 && !IsOpen(reused.get()) ? 3 : code;
+              });
+              EXPECT_EQ(0, child.wait());
+            }));
 }
 
 // Daemons close all descriptors they find, and open others.

@@ -5,6 +5,8 @@
 
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
+#include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/LeakedInstance.h"
 
 namespace zt {
 namespace fnd {
@@ -16,6 +18,12 @@ constexpr std::size_t k_textSize = 512;
 constexpr unsigned k_powersOfTen[k_mostDigits + 1] = {1, 10, 100, 1000};
 
 const AbsTime::Value k_unixEpoch(static_cast<long long>(AbsTime::k_unixEpoch));
+
+// The C library keeps time zone and locale under locks of its own, which a child may find held for
+// good.
+struct SystemTimes {
+  ForkSafeMutex lock{AtFork::Wait, 90};
+};
 
 String SeparatorText(int separator) {
   if (separator == 1) return L".";
@@ -59,6 +67,7 @@ String Join(const String& first, const String& second) {
 String Format(const std::tm& fields, const String& format) {
   char text[k_textSize];
   const AnsiString narrow(format);
+  ForkSafeHold hold(LeakedInstance<SystemTimes>().lock);
   const std::size_t n = std::strftime(text, sizeof text, narrow.c_str(), &fields);
   return String(static_cast<const char*>(text), static_cast<String::size_type>(n));
 }
@@ -67,11 +76,13 @@ template <class BreakDown>
 std::tm ToFields(const AbsTime& time, bool round, BreakDown breakDown) {
   const std::time_t seconds = static_cast<std::time_t>(time.toTime_T(round));
   std::tm fields;
+  ForkSafeHold hold(LeakedInstance<SystemTimes>().lock);
   if (breakDown(&seconds, &fields) == nullptr) ZT_RAISE(exception::OutOfRange());
   return fields;
 }
 
 String SystemFormat(const wchar_t* format) {
+  ForkSafeHold hold(LeakedInstance<SystemTimes>().lock);
   std::setlocale(LC_TIME, "");
   return String(format);
 }

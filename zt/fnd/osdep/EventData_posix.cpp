@@ -14,20 +14,41 @@ namespace fnd {
 namespace osdep {
 namespace {
 
-// Unusable sets in a row after which there is none to be had. Some take long to tell, and count for
-// more: a file that may not be opened 2 ms, one that somebody else keeps locked half a second.
-constexpr unsigned kUnusableSets = 1024;
-
-unsigned Weight(const SemaphoreSet& set) {
-  switch (set.state()) {
-    case SemaphoreSet::State::Busy:
-      return 128;
-    case SemaphoreSet::State::Closed:
-      return 4;
-    default:
-      return 1;
+// Counts the sets without a slot, up to the number after which the search ends.
+//
+// Some take long to find out, and count for more: a file that cannot be made 2 ms, one that another
+// process keeps locked half a second. Any user may put what cannot be opened under the names of state
+// files, though, so that some thousands of those count nothing.
+class Search {
+ public:
+  // False at the end of the search.
+  bool goesOnAfter(const SemaphoreSet& set, SemaphoreSet::Room room) {
+    if (room == SemaphoreSet::Room::None) {
+      m_unusable = 0;
+    } else if (set.state() != SemaphoreSet::State::Closed || ++m_closed > kClosedSets) {
+      m_unusable += Weight(set.state());
+    }
+    return m_unusable < kUnusableSets;
   }
-}
+
+ private:
+  static constexpr unsigned kUnusableSets = 1024;  // in a row
+  static constexpr unsigned kClosedSets = 4096;    // in all
+
+  static unsigned Weight(SemaphoreSet::State state) {
+    switch (state) {
+      case SemaphoreSet::State::Busy:
+        return 128;
+      case SemaphoreSet::State::Closed:
+      case SemaphoreSet::State::Missing:
+        return 4;
+      default:
+        return 1;
+    }
+  }
+
+  unsigned m_unusable = 0, m_closed = 0;
+};
 
 // A set of this number belongs to a program that keeps its events elsewhere.
 bool IsReserved(unsigned number) {
@@ -115,15 +136,14 @@ bool EventData::takeOver(const EventFile& file, RefPtr<SemaphoreSet>& seen) {
 }
 
 void EventData::allocate(const EventFile& file) {
-  unsigned unusable = 0;
+  Search search;
   for (unsigned number = 1;; ++number) {
     if (IsReserved(number)) continue;
     RefPtr<SemaphoreSet> set = m_statics->getOrCreateSemaphoreSet(number);
     unsigned slot = 0;
     SemaphoreSet::Room room = set->usable() ? set->firstFree(slot) : SemaphoreSet::Room::Damaged;
     if (room == SemaphoreSet::Room::Some && allocateIn(*set, slot, file)) return;
-    unusable = room == SemaphoreSet::Room::None ? 0 : unusable + Weight(*set);
-    if (unusable >= kUnusableSets) ZT_RAISE(PosixError(ENOLCK));
+    if (!search.goesOnAfter(*set, room)) ZT_RAISE(PosixError(ENOLCK));
   }
 }
 

@@ -42,6 +42,9 @@ class EventFile {
   // again and again.
   static EventFile Open(const String& name);
 
+  // Whether the name is taken, by a file or anything else. False also where that cannot be known.
+  static bool Exists(const String& name) noexcept;
+
   bool valid() const noexcept { return m_fd.valid(); }
   bool exclusive() const noexcept { return m_exclusive; }
   // ftok(path, 1); never -1.

@@ -12,6 +12,7 @@
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/Retry.h"
 #include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/fnd/osdep/SharedObjectName.h"
 #include "zt/fnd/osdep/Sleep.h"
 
 namespace zt {
@@ -56,10 +57,20 @@ EventFile& EventFile::operator=(EventFile&& other) noexcept {
 
 EventFile EventFile::Open(const String& name) {
   for (int attempt = 1;; ++attempt) {
-    EventFile file(BuildSharedUnixFilePath(String(kDirectory), name));
+    EventFile file(SharedObjectPath(String(kDirectory), name));
     file.m_exclusive = GetLockAccessToFile(file.m_fd.get());
     if (file.identify()) return file;
     if (attempt == kReplacedFiles) ZT_RAISE(PosixError(ENOLCK));
+  }
+}
+
+bool EventFile::Exists(const String& name) noexcept {
+  try {
+    const AnsiString path = SharedObjectPath(String(kDirectory), name);
+    struct stat info;
+    return RetryEintr([&] { return ::lstat(path.c_str(), &info); }) == 0;
+  } catch (const std::exception&) {  // Without the directory there is nothing in it.
+    return false;
   }
 }
 

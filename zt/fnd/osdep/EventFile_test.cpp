@@ -17,6 +17,7 @@
 #include "tests/support/Elapsed.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/FailSystemCall.h"
+#include "tests/support/InChild.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/ThreadState.h"
@@ -214,21 +215,24 @@ TEST(EventFile, FailuresLeaveNoDescriptor) {
   EXPECT_EQ(before, OpenDescriptors());
 }
 
+// In a process of its own, where no other object's descriptor is closed by a fork.
 TEST(EventFile, ChildOfAnOpeningHasNoCopyAndOneOfASettledFileUnlocksNothing) {
   EventPlace place;
-  EventFile file = EventFile::Open(L"name");
-  int before = OpenDescriptors();
-  Child early([&] { return OpenDescriptors() == before - 1 ? 0 : 1; });
-  EXPECT_EQ(0, early.wait());
-  ASSERT_TRUE(file.share());
-  file.settle();
-  Child late([&] {
-    if (OpenDescriptors() != before) return 1;
-    file.close();
-    return OpenDescriptors() == before - 1 ? 0 : 2;
-  });
-  EXPECT_EQ(0, late.wait());
-  EXPECT_NE(0, Flock(OpenRaw(place.file("name")).get(), LOCK_EX | LOCK_NB));
+  EXPECT_EQ(0, vlt::test::InChild([&] {
+              EventFile file = EventFile::Open(L"name");
+              int before = OpenDescriptors();
+              Child early([&] { return OpenDescriptors() == before - 1 ? 0 : 1; });
+              EXPECT_EQ(0, early.wait());
+              ASSERT_TRUE(file.share());
+              file.settle();
+              Child late([&] {
+                if (OpenDescriptors() != before) return 1;
+                file.close();
+                return OpenDescriptors() == before - 1 ? 0 : 2;
+              });
+              EXPECT_EQ(0, late.wait());
+              EXPECT_NE(0, Flock(OpenRaw(place.file("name")).get(), LOCK_EX | LOCK_NB));
+            }));
 }
 
 TEST(EventFile, FileOfAnOpeningThatFailsIsGone) {

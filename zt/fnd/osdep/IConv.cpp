@@ -6,18 +6,33 @@
 #include <cstddef>
 
 #include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/LeakedInstance.h"
 
 namespace zt {
 namespace fnd {
 namespace osdep {
 namespace {
 
+// The C library opens and closes under a lock of its own, which a child may find held for good.
+struct Opening {
+  ForkSafeMutex lock{AtFork::Wait, 95};
+};
+
+iconv_t Open(const char* toCode, const char* fromCode) {
+  ForkSafeHold hold(LeakedInstance<Opening>().lock);
+  return iconv_open(toCode, fromCode);
+}
+
 class ScopedIconv {
  public:
-  ScopedIconv(const char* toCode, const char* fromCode) : m_cd(iconv_open(toCode, fromCode)) {
+  ScopedIconv(const char* toCode, const char* fromCode) : m_cd(Open(toCode, fromCode)) {
     if (m_cd == reinterpret_cast<iconv_t>(-1)) ZT_RAISE(exception::InvalidLocale());
   }
-  ~ScopedIconv() { iconv_close(m_cd); }
+  ~ScopedIconv() {
+    ForkSafeHold hold(LeakedInstance<Opening>().lock);
+    iconv_close(m_cd);
+  }
   ScopedIconv(const ScopedIconv&) = delete;
   ScopedIconv& operator=(const ScopedIconv&) = delete;
 

@@ -3,6 +3,8 @@
 
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
+#include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/LeakedInstance.h"
 #include "zt/fnd/osdep/LoadModule.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/Retry.h"
@@ -12,6 +14,17 @@ namespace zt {
 namespace fnd {
 namespace osdep {
 
+namespace {
+
+// The loader has a lock of its own, which a child may find held for good.
+struct Loading {
+  ForkSafeMutex lock{AtFork::Wait, 80};
+};
+
+ForkSafeMutex& LoadingLock() { return LeakedInstance<Loading>().lock; }
+
+}  // namespace
+
 void* LoadModule(const String& name) {
   AnsiString narrow(name);
   struct stat info;
@@ -20,14 +33,20 @@ void* LoadModule(const String& name) {
       RetryEintr([&] { return ::stat(narrow.c_str(), &info); }) == 0 && !S_ISREG(info.st_mode)) {
     return nullptr;
   }
+  ForkSafeHold hold(LoadingLock());
   return ::dlopen(narrow.c_str(), RTLD_NOW | RTLD_GLOBAL);
 }
 
 void UnloadModule(void* module) {
-  if (module != nullptr) ::dlclose(module);
+  if (module == nullptr) return;
+  ForkSafeHold hold(LoadingLock());
+  ::dlclose(module);
 }
 
-void* FindFunction(void* module, const AnsiString& name) { return ::dlsym(module, name.c_str()); }
+void* FindFunction(void* module, const AnsiString& name) {
+  ForkSafeHold hold(LoadingLock());
+  return ::dlsym(module, name.c_str());
+}
 
 void RaiseLoaderError() {
   const char* text = ::dlerror();

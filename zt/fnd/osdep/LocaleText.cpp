@@ -27,47 +27,117 @@ const char* EncodingOf(const char* locale) {
   return locale == nullptr || Same(locale, "carbon") ? "" : locale;
 }
 
-// What stands for itself in the encoding, so that iconv need not be asked.
-enum class ByHand { Nothing, AsciiRun, Everything };
+// The encodings that need no iconv, which is slow to open and has locks of its own.
+enum class ByHand {
+  Nothing,
+  Ascii,        // "US-ASCII": "?" for all else
+  LocaleAscii,  // the same, but the invisible tag characters are left out, as iconv does
+  Utf8,
+};
 
 // The host may change its locale at any time, so the answer for "" is never kept.
 ByHand ByHandOf(const char* encoding) {
-  if (Same(encoding, "US-ASCII")) return ByHand::Everything;
+  if (Same(encoding, "US-ASCII")) return ByHand::Ascii;
+  if (Same(encoding, "UTF-8")) return ByHand::Utf8;
   if (*encoding != '\0') return ByHand::Nothing;
   const char* const codeset = nl_langinfo(CODESET);
-  const bool extendsAscii = Same(codeset, "UTF-8") || Same(codeset, "ANSI_X3.4-1968");
-  return extendsAscii ? ByHand::AsciiRun : ByHand::Nothing;
+  if (Same(codeset, "UTF-8")) return ByHand::Utf8;
+  return Same(codeset, "ANSI_X3.4-1968") ? ByHand::LocaleAscii : ByHand::Nothing;
 }
 
 bool IsAscii(char c) { return static_cast<unsigned char>(c) < 0x80; }
 bool IsAscii(wchar_t c) { return static_cast<std::uint32_t>(c) < 0x80; }
+bool IsTag(char) { return false; }
+bool IsTag(wchar_t c) { return static_cast<std::uint32_t>(c) >> 7 == 0xE0000 >> 7; }
 
-// Copies up to the first character that is not ASCII, or all with "?" in the place of such.
+// Copies as far as there is room, with "?" in the place of what is not ASCII. Returns the end.
 template <class In, class Out>
-void CopyAscii(const In*& begin, const In* end, Out*& dest, Out* destEnd, bool replace) {
-  for (; begin != end && dest != destEnd; ++begin, ++dest) {
-    if (IsAscii(*begin)) {
-      *dest = static_cast<Out>(*begin);
-    } else if (replace) {
-      *dest = static_cast<Out>('?');
-    } else {
-      return;
-    }
+Out* CopyAscii(const In* begin, const In* end, Out* dest, Out* destEnd, bool leaveOutTags) {
+  for (; begin != end && dest != destEnd; ++begin) {
+    if (leaveOutTags && IsTag(*begin)) continue;
+    *dest++ = IsAscii(*begin) ? static_cast<Out>(*begin) : static_cast<Out>('?');
   }
+  return dest;
+}
+
+bool IsCharacter(std::uint32_t c) { return c < 0xD800 || (c > 0xDFFF && c <= 0x10FFFF); }
+
+// Bytes of the sequence that a byte begins; 0 for one that begins none.
+std::size_t LengthByLead(unsigned char lead) {
+  if (lead < 0x80) return 1;
+  if (lead < 0xC2) return 0;
+  if (lead < 0xE0) return 2;
+  if (lead < 0xF0) return 3;
+  return lead < 0xF5 ? 4 : 0;
+}
+
+// Reads a character. Returns its bytes; 0, with `c` undefined, where there is no whole and valid one.
+std::size_t ReadUtf8(const char* begin, const char* end, std::uint32_t& c) {
+  static constexpr unsigned char k_leadBits[] = {0, 0x7F, 0x1F, 0x0F, 0x07};
+  static constexpr std::uint32_t k_least[] = {0, 0, 0x80, 0x800, 0x10000};
+  const std::size_t n = LengthByLead(static_cast<unsigned char>(*begin));
+  if (n == 0 || static_cast<std::size_t>(end - begin) < n) return 0;
+  c = static_cast<unsigned char>(*begin) & k_leadBits[n];
+  for (std::size_t i = 1; i < n; ++i) {
+    const unsigned char next = static_cast<unsigned char>(begin[i]);
+    if ((next & 0xC0) != 0x80) return 0;
+    c = c << 6 | (next & 0x3F);
+  }
+  return c >= k_least[n] && IsCharacter(c) ? n : 0;
+}
+
+// Of each malformed sequence every byte becomes a "?" of its own.
+wchar_t* ConvertUtf8(const char* begin, const char* end, wchar_t* dest, wchar_t* destEnd) {
+  for (; begin != end && dest != destEnd; ++dest) {
+    std::uint32_t c;
+    const std::size_t n = ReadUtf8(begin, end, c);
+    *dest = n == 0 ? L'?' : static_cast<wchar_t>(c);
+    begin += n == 0 ? 1 : n;
+  }
+  return dest;
+}
+
+std::size_t Utf8Length(std::uint32_t c) {
+  if (c < 0x80) return 1;
+  if (c < 0x800) return 2;
+  return c < 0x10000 ? 3 : 4;
+}
+
+void WriteUtf8(std::uint32_t c, std::size_t n, char* dest) {
+  static constexpr unsigned char k_mark[] = {0, 0, 0xC0, 0xE0, 0xF0};
+  for (std::size_t i = n; --i > 0; c >>= 6) dest[i] = static_cast<char>(0x80 | (c & 0x3F));
+  *dest = static_cast<char>(k_mark[n] | c);
+}
+
+// A character that has no room becomes a "?" too, and the next ones may have room again.
+char* ConvertUtf8(const wchar_t* begin, const wchar_t* end, char* dest, char* destEnd) {
+  for (; begin != end && dest != destEnd; ++begin) {
+    std::uint32_t c = static_cast<std::uint32_t>(*begin);
+    std::size_t n = Utf8Length(c);
+    if (!IsCharacter(c) || n > static_cast<std::size_t>(destEnd - dest)) {
+      c = '?';
+      n = 1;
+    }
+    WriteUtf8(c, n, dest);
+    dest += n;
+  }
+  return dest;
 }
 
 template <class In, class Out>
 std::uint32_t Convert(const In* begin, const In* end, const char* encoding, Out* dest,
                       Out*& destEnd, const char* fromCode, const char* toCode) {
   if (begin == nullptr) end = begin;
-  Out* out = dest;
-  const ByHand byHand = ByHandOf(encoding);
-  if (byHand != ByHand::Nothing) {
-    CopyAscii(begin, end, out, destEnd, byHand == ByHand::Everything);
-    if (begin == end || out == destEnd) destEnd = out;
-  }
-  if (destEnd != out || byHand == ByHand::Nothing) {
-    IConv(begin, end, fromCode, out, destEnd, toCode);
+  switch (const ByHand byHand = ByHandOf(encoding)) {
+    case ByHand::Ascii:
+    case ByHand::LocaleAscii:
+      destEnd = CopyAscii(begin, end, dest, destEnd, byHand == ByHand::LocaleAscii);
+      break;
+    case ByHand::Utf8:
+      destEnd = ConvertUtf8(begin, end, dest, destEnd);
+      break;
+    case ByHand::Nothing:
+      IConv(begin, end, fromCode, dest, destEnd, toCode);
   }
   return NumericCast<std::uint32_t>(destEnd - dest);
 }

@@ -16,7 +16,8 @@ namespace osdep {
 //
 // Recursive for the thread that holds it, per object: a second object of the name in the same
 // thread passes the section and waits in flock, as it is another owner of the file. Names that
-// differ in case only share the section and have two files.
+// differ only in the case of a-z share the section and have two files. The file's name is the UTF-8
+// form of the mutex's (SharedObjectName.h), so that it is the same in processes of any locale.
 //
 //   state of the object    lock               tryLock               unlock
 //   free                   waits; held, 1     held, 1, or false     nothing
@@ -30,7 +31,7 @@ namespace osdep {
 // Threads: one object may be shared. Lock order: the name's section, then the file.
 class Mutex {
  public:
-  // Makes the file; throws what CreateSharedUnixFile and BuildSharedUnixFilePath throw.
+  // Makes the file; throws what CreateSharedUnixFile and SharedObjectPath throw.
   explicit Mutex(const String& name);
 
   // Frees what the object holds.
@@ -48,6 +49,15 @@ class Mutex {
 
   // Never throws. A failing system call leaves the file locked.
   void unlock() const;
+
+  // True while the lock that this object holds keeps others out: in the process that took it, with the
+  // descriptor still open and the path still naming the locked file. A fork, a host that closes all
+  // descriptors and a cleaner of old files each end that without a word. For any thread.
+  bool excludesOthers() const;
+
+  // Takes the file lock of a held object again after it was lost, without waiting. False where another
+  // process has it, for every failure, and in a forked child, which holds nothing. For any thread.
+  bool retake() const;
 
  private:
   struct Record;

@@ -7,6 +7,7 @@
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/CriticalSection.h"
 #include "zt/fnd/osdep/ProcessMark.h"
+#include "zt/fnd/osdep/SharedObjectName.h"
 
 namespace zt {
 namespace fnd {
@@ -24,7 +25,7 @@ struct MutexData {
 // at the fork, are never touched again.
 class MutexGlobalStatics : public RefCountedThreadSafePolicy {
  public:
-  typedef std::map<String, MutexData> Map;  // folds case
+  typedef std::map<String, MutexData, SharedObjectNameLess> Map;
 
   // The statics of the calling process, made where there are none.
   static RefPtr<MutexGlobalStatics> Get();

@@ -12,6 +12,7 @@
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/ProcessMark.h"
 #include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/fnd/osdep/SharedObjectName.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 #include "zt/fnd/osdep/path.h"
 
@@ -29,7 +30,7 @@ CloseOnForkFd OpenLockFile(const AnsiString& file) {
   String dir = path::DirName(String(file));
   path::MakePathEndInSlash(dir);
   CreateSharedUnixDir(dir);
-  return CloseOnForkFd::OpenShared(file);
+  return CloseOnForkFd::OpenShared(file, InTheWay::MovedAside);
 }
 
 // Leaves a section again unless the lock was taken whole.
@@ -53,8 +54,8 @@ struct Mutex::Record {
   explicit Record(const String& mutexName)
       : name(mutexName),
         statics(MutexGlobalStatics::Get()),
-        file(BuildSharedUnixFilePath(String(kDirectory), name)),
-        fd(CloseOnForkFd::OpenShared(file)),
+        file(SharedObjectPath(String(kDirectory), name)),
+        fd(CloseOnForkFd::OpenShared(file, InTheWay::MovedAside)),
         data(statics->attach(name)),
         process(statics->process) {}
 
@@ -196,6 +197,28 @@ void Mutex::unlock() const {
     if (leave) --record.entries;
   }
   if (leave) record.section().leave();
+}
+
+bool Mutex::excludesOthers() const {
+  const Record& record = *m_record;
+  if (!record.ofThisProcess()) return false;
+  CriticalSectionGuard guard(record.statics->section);
+  return record.holds > 0 && record.fd.get() >= 0 && record.fd.identity().isNamedBy(record.file);
+}
+
+bool Mutex::retake() const {
+  Record& record = *m_record;
+  if (!record.ofThisProcess()) return false;
+  try {
+    CloseOnForkFd own = OpenLockFile(record.file);
+    CriticalSectionGuard guard(record.statics->section);
+    if (record.holds == 0 || Flock(own.get(), LOCK_EX | LOCK_NB) != 0) return false;
+    if (!own.identity().isNamedBy(record.file)) return false;
+    record.fd = std::move(own);
+    return true;
+  } catch (const std::exception&) {  // A file that cannot be made again, or no memory to do it.
+    return false;
+  }
 }
 
 }  // namespace osdep

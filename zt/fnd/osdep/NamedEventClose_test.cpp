@@ -44,7 +44,7 @@ constexpr auto Open = [](const std::string& name, bool manual = kManual, bool in
 
 // ---- the host's locale
 
-// The order of names is that of the C locale's upper case, which the host may change at any time.
+// The host may change its locale at any time; files and entries are found under any.
 TEST(NamedEventFiles, ClosesUnderAnotherLocaleThanItWasOpenedUnder) {
   EventPlace place;
   EXPECT_EQ(0, vlt::test::InChild([&] {

@@ -9,6 +9,7 @@
 #include "zt/fnd/osdep/Mutex.h"
 #include "zt/fnd/osdep/ProcessMark.h"
 #include "zt/fnd/osdep/SemaphoreSet.h"
+#include "zt/fnd/osdep/SharedObjectName.h"
 
 namespace zt {
 namespace fnd {
@@ -65,7 +66,7 @@ class NamedEventGlobalStatics : public RefCountedThreadSafePolicy {
   RefPtr<EventData> openOrFind(const String& name, bool manualReset, bool initialState);
 
   std::map<unsigned, SemaphoreSet*> m_sets GUARDED_BY(section);
-  std::map<String, EventData*> m_events GUARDED_BY(section);  // folds case
+  std::map<String, EventData*, SharedObjectNameLess> m_events GUARDED_BY(section);
 };
 
 }  // namespace osdep

@@ -76,13 +76,7 @@ void NamedEventGlobalStatics::removeSemaphoreSet(const SemaphoreSet& set) {
 void NamedEventGlobalStatics::removeNamedEvent(const EventData& event) {
   CriticalSectionGuard guard(section);
   auto found = m_events.find(event.name());
-  if (found != m_events.end() && found->second == &event) {
-    m_events.erase(found);
-    return;
-  }
-  // The map's order is that of the process's locale: after a change of it the name need not lead
-  // here, but the pointer must not stay behind.
-  std::erase_if(m_events, [&](const auto& entry) { return entry.second == &event; });
+  if (found != m_events.end() && found->second == &event) m_events.erase(found);
 }
 
 bool NamedEventGlobalStatics::hasSemaphoreSetOfId(int id) const {

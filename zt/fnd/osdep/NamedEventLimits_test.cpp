@@ -15,9 +15,11 @@
 #include <filesystem>
 #include <fstream>
 #include <functional>
+#include <iterator>
 #include <memory>
 #include <new>
 #include <string>
+#include <system_error>
 #include <vector>
 
 #include "tests/support/AllocFailure.h"
@@ -390,16 +392,23 @@ TEST(NamedEventLimits, ThousandUnusableSetsInARowAreTheEnd) {
   EXPECT_EQ((EventPlace::Slot{1026, 0}), place.slotOf("name"));
 }
 
-TEST(NamedEventLimits, StateFilesThatCannotBeOpenedAreTheEndSooner) {
+TEST(NamedEventLimits, StateFilesThatCannotBeOpenedCountNothingUpToSomeThousands) {
   EventPlace place;
   Open("warm up");
-  for (int n = 1; n <= 255; ++n) {
-    mkdir(place.file("sem_" + std::to_string(n)).c_str(), 0777);
-  }
+  auto obstruct = [&](int first, int last) {
+    for (int n = first; n <= last; ++n) {
+      mkdir(place.file("sem_" + std::to_string(n)).c_str(), 0777);
+    }
+  };
+  obstruct(1, 3000);
   auto event = Open("name");
-  EXPECT_EQ((EventPlace::Slot{256, 0}), place.slotOf("name"));
+  EXPECT_EQ((EventPlace::Slot{3001, 0}), place.slotOf("name"));
   event.reset();
-  mkdir(place.file("sem_256").c_str(), 0777);
+  obstruct(3001, 4096 + 255);
+  event = Open("name");
+  EXPECT_EQ((EventPlace::Slot{4096 + 256, 0}), place.slotOf("name"));
+  event.reset();
+  obstruct(4096 + 256, 4096 + 256);
   EXPECT_EQ(ENOLCK, SoonErrorOfOpening("name"));
   EXPECT_FALSE(Exists(place.file("name")));
 }

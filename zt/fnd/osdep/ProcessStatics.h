@@ -24,7 +24,7 @@ class ProcessStatics {
  public:
   // Null if there are none yet.
   static RefPtr<Statics> Present() {
-    pthread_once(&s_once, Register);
+    RegisterForkHandlers();
     PosixMutexHold hold(s_lock);
     DropInherited();
     return RefPtr<Statics>(s_statics);
@@ -41,6 +41,10 @@ class ProcessStatics {
     if (s_statics == nullptr) s_statics = RefPtr<Statics>(fresh).detach();
     return RefPtr<Statics>(s_statics);
   }
+
+  // Has fork() know of the statics before there are any; for those whose own handlers must run before
+  // these.
+  static void RegisterForkHandlers() { pthread_once(&s_once, Register); }
 
   // The lock, which no fork comes in between: for counts that a child keeps on what it inherited.
   static pthread_mutex_t& Lock() { return s_lock; }

@@ -2,19 +2,13 @@
 
 #include <cerrno>
 
+#include "zt/posix/Retry.h"
+
 namespace zt {
 namespace fnd {
 namespace osdep {
 
-// Makes a system call again as long as it reports -1 with EINTR; returns its last result, with
-// errno as that call left it. Never for close(): the descriptor is gone even when it reports EINTR.
-template <class Call>
-auto RetryEintr(Call call) -> decltype(call()) {
-  for (;;) {
-    auto result = call();
-    if (result != -1 || errno != EINTR) return result;
-  }
-}
+using zt::posix::RetryEintr;
 
 }  // namespace osdep
 }  // namespace fnd

@@ -28,9 +28,9 @@ class SemaphoreSet : public RefCountedCriticalSectionPolicy {
   ~SemaphoreSet() override;
 
   unsigned number() const { return m_number; }
-  // Unusable: the file was locked, but there is no set. Busy: somebody else had it alone all the
-  // time. Closed: it could not be opened.
-  enum class State { Usable, Unusable, Busy, Closed };
+  // Unusable: the file was locked, but there is no set. Busy: another process had it alone all the
+  // time. Closed: what has the file's name cannot be opened. Missing: no file could be made.
+  enum class State { Usable, Unusable, Busy, Closed, Missing };
   State state() const { return m_state; }
   bool usable() const { return m_file.valid(); }
   int id() const { return m_id; }
@@ -75,7 +75,7 @@ class SemaphoreSet : public RefCountedCriticalSectionPolicy {
   EventFile m_file;
   int m_id = -1;
   bool m_made = false;  // the set is this object's own making
-  State m_state = State::Closed;
+  State m_state = State::Missing;
 };
 
 }  // namespace osdep

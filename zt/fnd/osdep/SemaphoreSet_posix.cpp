@@ -47,8 +47,9 @@ SemaphoreSet::SemaphoreSet(NamedEventGlobalStatics& statics, unsigned number)
 // ---- opening
 
 void SemaphoreSet::open() {
+  const String name(("sem_" + std::to_string(m_number)).c_str());
   try {
-    EventFile file = EventFile::Open(String(("sem_" + std::to_string(m_number)).c_str()));
+    EventFile file = EventFile::Open(name);
     m_state = State::Unusable;
     if (file.exclusive() ? build(file) : join(file)) {
       m_file = std::move(file);
@@ -58,7 +59,11 @@ void SemaphoreSet::open() {
     }
     if (m_made) RemoveSet(m_id);
   } catch (const PosixError& e) {  // A set that cannot be had is skipped by its users.
-    if (e.whatcode() == EWOULDBLOCK) m_state = State::Busy;
+    if (e.whatcode() == EWOULDBLOCK) {
+      m_state = State::Busy;
+    } else if (m_state == State::Missing && EventFile::Exists(name)) {
+      m_state = State::Closed;
+    }
   } catch (const std::exception&) {  // The same.
   }
   m_id = -1;

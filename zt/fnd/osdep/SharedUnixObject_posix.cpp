@@ -14,6 +14,7 @@
 #include "zt/fnd/osdep/SharedUnixObject.h"
 #include "zt/fnd/osdep/Sleep.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Files.h"
 
 namespace zt {
 namespace fnd {
@@ -28,6 +29,7 @@ constexpr int kRefusedDirs = 5;
 constexpr int kRounds = 100;  // a race may be lost at each level of a path
 constexpr int kRefusedOpens = 3;
 constexpr int kVanishedOpens = 100;
+constexpr int kClearings = 10;
 
 // Makes the directories. Other processes make the same ones: the loser of a race finds a level that
 // stands already, and one of another user may be seen before its mode is set. Nor is a success the
@@ -45,44 +47,47 @@ void MakeDirectories(const String& path) {
   }
 }
 
-int OpenDirectory(const char* path, int flags) {
-  return RetryEintr([&] { return ::open(path, flags | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC); });
-}
-
-// fchmod for a directory that may not be read; that needs a way around the descriptor.
-int ChangeModeOfUnreadable(const char* path) {
-  ScopedFd fd(OpenDirectory(path, O_PATH));
-  if (!fd.valid()) return -1;
-  std::string link = "/proc/self/fd/" + std::to_string(fd.get());
-  return RetryEintr([&] { return ::chmod(link.c_str(), kDirMode); });
-}
-
-// chmod that does not follow a link in the last place.
-int ChangeDirMode(const char* path) {
-  ScopedFd fd(OpenDirectory(path, O_RDONLY));
-  if (fd.valid()) return RetryEintr([&] { return ::fchmod(fd.get(), kDirMode); });
-  return errno == EACCES ? ChangeModeOfUnreadable(path) : -1;
-}
-
-// Opens, or returns -1 with errno.
+// Opens, or returns -1 with errno. Another process may make or remove the file between the attempts.
 ScopedFd OpenShared(const AnsiString& path) {
-  constexpr int kFlags = O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY;
-  return ScopedFd(RetryEintr([&] { return ::open(path.c_str(), kFlags, kFileMode); }));
-}
-
-// Opens through the moments in which another user's file has not got its mode yet.
-ScopedFd OpenSharedPatiently(const AnsiString& path) {
-  for (int refused = 0;;) {
-    ScopedFd fd = OpenShared(path);
-    if (fd.valid()) return fd;
-    if (errno != EACCES || ++refused >= kRefusedOpens) ZT_RAISE(PosixError());
-    Sleep(1);
+  for (int race = 0;; ++race) {
+    ScopedFd fd = zt::posix::OpenExisting(path.c_str(), O_RDWR, zt::posix::Kind::File,
+                                          zt::posix::LastLink::Refused);
+    if (fd || errno != ENOENT) return fd;
+    fd = zt::posix::CreateNew(path.c_str(), O_RDWR, kFileMode);
+    if (fd || errno != EEXIST || race == kRounds) return fd;
   }
 }
 
-void OpenToEverybody(int fd) {
-  if (RetryEintr([&] { return ::fchmod(fd, kFileMode); }) == 0) return;
-  if (errno != EPERM) ZT_RAISE(PosixError(EPERM));
+// What may be in the place of a file: a link, a directory, a pipe or a device, a file with a second name.
+bool IsInTheWay(int error) {
+  return error == ELOOP || error == EISDIR || error == ENXIO || error == EMLINK;
+}
+
+[[noreturn]] void RaiseInTheWay(const AnsiString& path, int error) {
+  std::string message = std::string("\"") + path.c_str() +
+                        "\" is no file of its own: remove it, or have its owner remove it";
+  ZT_RAISE(PosixError(message.c_str(), error));
+}
+
+// Opens through the moments in which another user's file has not got its mode yet.
+ScopedFd OpenSharedPatiently(const AnsiString& path, InTheWay way) {
+  for (int refused = 0, cleared = 0;;) {
+    ScopedFd fd = OpenShared(path);
+    struct stat info;
+    if (fd && ::fstat(fd.get(), &info) != 0) ZT_RAISE(PosixError());
+    if (fd && info.st_nlink <= 1) return fd;
+    int error = fd ? EMLINK : errno;
+    fd.reset();
+    if (IsInTheWay(error)) {
+      bool gone = way == InTheWay::MovedAside && ++cleared < kClearings &&
+                  (zt::posix::MoveAside(path.c_str()) == 0 || errno == ENOENT);
+      if (!gone) RaiseInTheWay(path, error);
+    } else if (error != EACCES || ++refused >= kRefusedOpens) {
+      ZT_RAISE(PosixError(error));
+    } else {
+      Sleep(1);
+    }
+  }
 }
 
 }  // namespace
@@ -106,18 +111,24 @@ void CreateSharedUnixDir(const String& path) {
   // With a slash at the end a link would be followed after all.
   String::size_type last = path.find_last_not_of(L'/');
   AnsiString narrow(last == String::npos ? path : path.substr(0, last + 1));
-  if (ChangeDirMode(narrow.c_str()) != 0 && errno != EPERM) ZT_RAISE(PosixError());
+  ScopedFd found = zt::posix::LookUp(narrow.c_str(), false);
+  struct stat info;
+  if (!found || ::fstat(found.get(), &info) != 0) ZT_RAISE(PosixError());
+  if (!S_ISDIR(info.st_mode)) ZT_RAISE(PosixError(ENOTDIR));
+  if (zt::posix::SetSharedMode(found.get(), kDirMode) != 0 && errno != EPERM) {
+    ZT_RAISE(PosixError());
+  }
 }
 
-int CreateSharedUnixFile(const AnsiString& path) {
+int CreateSharedUnixFile(const AnsiString& path, InTheWay way) {
   for (int vanished = 0;; ++vanished) {
-    ScopedFd fd = OpenSharedPatiently(path);
+    ScopedFd fd = OpenSharedPatiently(path, way);
     struct stat info;
     if (::fstat(fd.get(), &info) != 0) ZT_RAISE(PosixError());
-    if (!S_ISREG(info.st_mode)) ZT_RAISE(PosixError(ENXIO));
-    if (info.st_nlink > 1) ZT_RAISE(PosixError(EMLINK));
     if (info.st_nlink == 0 && vanished < kVanishedOpens) continue;  // removed just now
-    OpenToEverybody(fd.get());
+    if (zt::posix::SetSharedMode(fd.get(), kFileMode) != 0 && errno != EPERM) {
+      ZT_RAISE(PosixError(EPERM));
+    }
     return fd.release();
   }
 }

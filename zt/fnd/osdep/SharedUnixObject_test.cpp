@@ -244,31 +244,58 @@ TEST(FileShared, RefusedFileIsTriedThreeTimes) {
   EXPECT_EQ(0, child.wait());
 }
 
-TEST(FileShared, WhatIsNoFileOfItsOwnIsRefusedUntouched) {
+TEST(FileShared, WhatIsNoFileOfItsOwnIsRefusedOrMovedAside) {
   TempDir dir;
-  dir.makeDir("directory");
+  dir.makeDir("directory/inside");
   ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0600));
   WriteBytes(dir / "victim", "x");
   chmod((dir / "victim").c_str(), 0600);
   ASSERT_EQ(0, symlink("victim", (dir / "link").c_str()));
   ASSERT_EQ(0, symlink("nowhere", (dir / "dangling").c_str()));
-  int before = vlt::test::OpenDescriptors();
-  EXPECT_EQ(EISDIR, PosixErrorOf([&] { Open(dir / "directory"); }));
-  EXPECT_EQ(ENXIO, PosixErrorOf([&] { Open(dir / "fifo"); }));
-  EXPECT_EQ(ELOOP, PosixErrorOf([&] { Open(dir / "link"); }));
-  EXPECT_EQ(ELOOP, PosixErrorOf([&] { Open(dir / "dangling"); }));
   ASSERT_EQ(0, link((dir / "victim").c_str(), (dir / "hard").c_str()));
-  EXPECT_EQ(EMLINK, PosixErrorOf([&] { Open(dir / "hard"); }));
+  int before = vlt::test::OpenDescriptors();
+  const std::pair<const char*, int> rows[] = {{"directory", EISDIR},
+                                              {"fifo", ENXIO},
+                                              {"link", ELOOP},
+                                              {"dangling", ELOOP},
+                                              {"hard", EMLINK}};
+  for (const auto& [name, error] : rows) {
+    EXPECT_EQ(error, PosixErrorOf([&, name = name] { Open(dir / name); })) << name;
+    EXPECT_FALSE(vlt::test::Exists(dir / (std::string(name) + ".bad"))) << name;
+    ScopedFd moved(CreateSharedUnixFile(AnsiString((dir / name).c_str()), InTheWay::MovedAside));
+    EXPECT_EQ(0666, ModeOf(dir / name)) << name;
+    EXPECT_TRUE(vlt::test::Exists(dir / (std::string(name) + ".bad"))) << name;
+  }
   EXPECT_EQ(ENOENT, PosixErrorOf([&] { Open(dir / "missing/f"); }));
   EXPECT_EQ(ENAMETOOLONG, PosixErrorOf([&] { Open(dir / std::string(256, 'x')); }));
   EXPECT_EQ(before, vlt::test::OpenDescriptors());
   EXPECT_EQ(0600, ModeOf(dir / "victim"));
-  EXPECT_EQ(0600, ModeOf(dir / "fifo"));
+  EXPECT_EQ(0600, ModeOf(dir / "fifo.bad"));
+  EXPECT_TRUE(vlt::test::Exists(dir / "directory.bad/inside"));
   EXPECT_FALSE(vlt::test::Exists(dir / "nowhere"));
+}
+
+TEST(FileShared, WhatThisUserMayNotMoveIsNamed) {
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
+  TempDir dir;
+  chmod(dir.path().c_str(), 0755);
+  ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0666));
+  Child child([&] {
+    if (setresuid(kSomeUser, kSomeUser, kSomeUser) != 0) return 1;
+    try {
+      CreateSharedUnixFile(AnsiString((dir / "fifo").c_str()), InTheWay::MovedAside);
+    } catch (const PosixError& error) {
+      if (error.whatcode() != ENXIO) return 2;
+      return std::string(error.what()).find(dir / "fifo") == std::string::npos ? 3 : 0;
+    }
+    return 4;
+  });
+  EXPECT_EQ(0, child.wait());
 }
 
 TEST(FileShared, FailureToSetTheModeIsAlwaysEPERM) {
   TempDir dir;
+  dir.makeDir("d");
   Child child([&] {
     if (!vlt::test::FailSystemCall(SYS_fchmod, EIO)) return 1;
     int before = vlt::test::OpenDescriptors();
@@ -282,6 +309,7 @@ TEST(FileShared, FailureToSetTheModeIsAlwaysEPERM) {
 
 TEST(FileShared, RefusedModeIsAcceptedForFilesAndDirectories) {
   TempDir dir;
+  dir.makeDir("d");
   Child child([&] {
     if (!vlt::test::FailSystemCall(SYS_fchmod, EPERM)) return 1;
     CreateSharedUnixDir(Wide(dir / "d/"));

@@ -15,8 +15,8 @@
 #include "zt/fnd/osdep/FindFiles.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/Retry.h"
-#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Files.h"
 
 // Renaming, copying and the operations on trees, which need files and listings.
 namespace zt {
@@ -86,13 +86,10 @@ void CopyInto(BinaryFile& copy, const String& from, const String& to, bool overw
   CopyBytes(in, copy);
 }
 
-// Puts the entries of the file's directory on the disk; one that may not be read is left to the
-// system.
+// Puts the entries of the file's directory on disk; one that may not be read is left to the system.
 void SyncDirectoryOf(const String& file) {
-  AnsiString dir(path::DirName(file));
-  ScopedFd fd(RetryEintr([&] { return ::open(dir.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); }));
-  if (!fd.valid() || RetryEintr([&] { return ::fsync(fd.get()); }) == 0) return;
-  if (errno != EINVAL) ZT_RAISE(PosixError());  // some systems have no such thing for directories
+  AnsiString narrow(file);
+  if (!zt::posix::SyncDirectoryOf(narrow.c_str())) ZT_RAISE(PosixError());
 }
 
 // The rename between file systems. A crash finds at least one of the two files whole: the copy is
@@ -183,7 +180,7 @@ void path::RenameFile(const String& from, const String& to) {
   DemandAbsolute(from, to);
   if (SameFileByName(from, to)) return;
   AnsiString narrowFrom(from), narrowTo(to);
-  if (RetryEintr([&] { return ::rename(narrowFrom.c_str(), narrowTo.c_str()); }) == 0) return;
+  if (zt::posix::Rename(narrowFrom.c_str(), narrowTo.c_str()) == 0) return;
   if (errno != EXDEV) ZT_RAISE(PosixError());
   Entry target(to, Links::Themselves);
   // One file through two mounts, which the system takes for two file systems; where it sees that

@@ -1,3 +1,4 @@
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -12,6 +13,7 @@
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/Retry.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Files.h"
 
 // The operations on single entries of the file system.
 namespace zt {
@@ -41,16 +43,27 @@ bool IsDirectoryText(const char* path) {
   return Stat(path, &info) == 0 && S_ISDIR(info.st_mode);
 }
 
-// Makes one directory; 0, or the errno of the failed step.
+bool LeadsToDirectory(const char* path) {
+  zt::posix::ScopedFd found = zt::posix::LookUp(path);
+  struct stat info;
+  return found && ::fstat(found.get(), &info) == 0 && S_ISDIR(info.st_mode);
+}
+
+// Makes one directory, in the directory that the path led to when it was looked up; 0, or the errno of
+// the failed step.
 int MakeOneDir(const char* path, bool useMode, mode_t mode) {
-  if (RetryEintr([&] { return ::mkdir(path, useMode ? mode : kPrivateDirMode); }) != 0) {
-    return errno;
-  }
+  zt::posix::Entry entry(path);
+  if (!entry.valid()) return errno;
+  int parent = entry.directory.get();
+  mode_t first = useMode ? mode : kPrivateDirMode;
+  if (RetryEintr([&] { return ::mkdirat(parent, entry.name, first); }) != 0) return errno;
   if (!useMode) return 0;
   // The umask may have cut the mode.
-  if (RetryEintr([&] { return ::chmod(path, mode); }) == 0) return 0;
+  zt::posix::ScopedFd made(RetryEintr(
+      [&] { return ::openat(parent, entry.name, O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC); }));
+  if (made && zt::posix::ChangeMode(made.get(), mode) == 0) return 0;
   int failure = errno;
-  RetryEintr([&] { return ::rmdir(path); });
+  RetryEintr([&] { return ::unlinkat(parent, entry.name, AT_REMOVEDIR); });
   return failure;
 }
 
@@ -60,11 +73,11 @@ void CreateDirWorker(const wchar_t* path, bool useMode, mode_t mode) {
   std::string text(narrow.c_str());
   text.erase(text.rfind('/') + 1);
   if (text.empty()) ZT_RAISE(exception::InvalidArgument());
-  if (IsDirectoryText(text.c_str())) return;
+  if (LeadsToDirectory(text.c_str())) return;
   for (std::string::size_type slash = 0; slash != std::string::npos;) {
     slash = text.find('/', slash + 1);
     std::string prefix = text.substr(0, slash);
-    if (IsDirectoryText(prefix.c_str())) continue;
+    if (LeadsToDirectory(prefix.empty() ? "/" : prefix.c_str())) continue;
     int failure = MakeOneDir(prefix.c_str(), useMode, mode);
     if (failure == 0) continue;
     if (failure == EEXIST) ZT_RAISE(exception::ObjectAlreadyExists());
@@ -95,7 +108,7 @@ String path::AbsPath(const String& path) {
 }
 
 String path::TempDirName() {
-  const char* dir = std::getenv("TMPDIR");
+  const char* dir = ::secure_getenv("TMPDIR");
   return dir == nullptr ? String(L"/var/tmp/") : String(dir);
 }
 
@@ -138,7 +151,7 @@ void path::CreateDir(const wchar_t* path, unsigned int mode) {
 void path::RemoveFile(const wchar_t* path) {
   DemandAbsolute(path);
   AnsiString narrow{String(path)};
-  if (RetryEintr([&] { return ::unlink(narrow.c_str()); }) != 0) ZT_RAISE(PosixError());
+  if (zt::posix::Unlink(narrow.c_str()) != 0) ZT_RAISE(PosixError());
 }
 
 void path::RemoveFile(const String& path) { RemoveFile(path.c_str()); }

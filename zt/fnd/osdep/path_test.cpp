@@ -293,7 +293,7 @@ TEST(Path, CreateDirThroughAFileIsRefusedByTheFailingPart) {
 TEST(Path, CreateDirWhoseModeCannotBeSetTakesTheDirectoryAway) {
   TempDir dir;
   vlt::test::Child child([&] {
-    if (!vlt::test::FailSystemCall(SYS_chmod, EIO)) return 1;
+    if (!vlt::test::FailSystemCall(SYS_fchmod, EIO)) return 1;
     std::string text =
         AccessDeniedTextOf([&] { path::CreateDir(Wide(dir / "a/b/").c_str(), 0777); });
     return text == "Access denied: " + (dir / "a") ? 0 : 2;

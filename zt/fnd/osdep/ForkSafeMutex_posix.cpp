@@ -1,0 +1,181 @@
+#include <algorithm>
+#include <cstdint>
+#include <ctime>
+#include <utility>
+
+#include "zt/fnd/osdep/CloseOnFork.h"
+#include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/MutexGlobalStatics.h"
+#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
+#include "zt/fnd/osdep/PosixMutexHold.h"
+#include "zt/fnd/osdep/ProcessStatics.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+constexpr std::int64_t kNanosecondsPerSecond = 1000000000;
+constexpr std::int64_t kPatience = kNanosecondsPerSecond;  // of a fork, in all
+constexpr std::int64_t kTurn = kPatience / 20;             // for one mutex, while others are held
+
+std::int64_t Now() {
+  timespec now;
+  clock_gettime(CLOCK_MONOTONIC, &now);
+  return std::int64_t{now.tv_sec} * kNanosecondsPerSecond + now.tv_nsec;
+}
+
+// Takes it if it becomes free before the moment.
+bool TakeUntil(pthread_mutex_t& mutex, std::int64_t moment) {
+  timespec end;
+  end.tv_sec = static_cast<std::time_t>(moment / kNanosecondsPerSecond);
+  end.tv_nsec = static_cast<long>(moment % kNanosecondsPerSecond);
+  return pthread_mutex_clocklock(&mutex, CLOCK_MONOTONIC, &end) == 0;
+}
+
+}  // namespace
+
+// All mutexes of the process, in the order of their ranks. Plain objects, ready before any
+// initialiser and good after every destructor.
+class ForkSafeMutex::Registry {
+ public:
+  static void Add(ForkSafeMutex& mutex) {
+    pthread_once(&s_once, Register);
+    PosixMutexHold hold(s_lock);
+    ForkSafeMutex** place = &s_first;
+    while (*place != nullptr && (*place)->m_rank <= mutex.m_rank) place = &(*place)->m_next;
+    mutex.m_next = *place;
+    *place = &mutex;
+  }
+
+  static void Remove(ForkSafeMutex& mutex) {
+    PosixMutexHold hold(s_lock);
+    ForkSafeMutex** place = &s_first;
+    while (*place != &mutex) place = &(*place)->m_next;
+    *place = mutex.m_next;
+  }
+
+ private:
+  // Handlers before a fork run from the last registered to the first. Those of the floor below go
+  // first here: what they hold, a thread with one of these mutexes may need to get on.
+  static void Register() {
+    CloseOnForkFd::RegisterForkHandlers();
+    ProcessStatics<MutexGlobalStatics>::RegisterForkHandlers();
+    ProcessStatics<NamedEventGlobalStatics>::RegisterForkHandlers();
+    pthread_atfork(BeforeFork, InParent, InChild);
+  }
+
+  static void BeforeFork() {
+    pthread_mutex_lock(&s_lock);
+    const std::int64_t end = Now() + kPatience;
+    ForkSafeMutex* missed = TakeAll(nullptr, end);
+    while (missed != nullptr && Now() < end) {
+      GiveBack();
+      missed = TakeAll(missed, end);
+    }
+  }
+
+  // Takes `first`, where one is given, before the others, and waits for it to the end: its holder may
+  // have been waiting for one that comes earlier in the order. The others have a short turn each.
+  // Returns the first that was missed; once the end has come all that are free are taken.
+  static ForkSafeMutex* TakeAll(ForkSafeMutex* first, std::int64_t end) {
+    ForkSafeMutex* missed = nullptr;
+    if (first != nullptr && !Take(*first, end)) missed = first;
+    for (ForkSafeMutex* m = s_first; m != nullptr; m = m->m_next) {
+      if (m == first || m->m_atFork != AtFork::Wait || m->mine()) continue;
+      if (Take(*m, std::min(Now() + kTurn, end))) continue;
+      if (missed == nullptr) missed = m;
+      if (Now() < end) break;
+    }
+    return missed;
+  }
+
+  static bool Take(ForkSafeMutex& mutex, std::int64_t moment) {
+    return mutex.m_takenByFork = TakeUntil(mutex.m_mutex, moment);
+  }
+
+  static void GiveBack() {
+    for (ForkSafeMutex* m = s_first; m != nullptr; m = m->m_next) {
+      if (std::exchange(m->m_takenByFork, false)) pthread_mutex_unlock(&m->m_mutex);
+    }
+  }
+
+  static void InParent() {
+    GiveBack();
+    pthread_mutex_unlock(&s_lock);
+  }
+
+  static void InChild() {
+    for (ForkSafeMutex* m = s_first; m != nullptr; m = m->m_next) m->renew();
+    pthread_mutex_unlock(&s_lock);
+  }
+
+  static inline pthread_once_t s_once = PTHREAD_ONCE_INIT;
+  static inline pthread_mutex_t s_lock = PTHREAD_MUTEX_INITIALIZER;
+  static inline ForkSafeMutex* s_first = nullptr;  // guarded by s_lock
+};
+
+ForkSafeMutex::ForkSafeMutex(AtFork atFork, int rank) : m_atFork(atFork), m_rank(rank) {
+  Registry::Add(*this);
+}
+
+ForkSafeMutex::~ForkSafeMutex() {
+  Registry::Remove(*this);
+  pthread_mutex_destroy(&m_mutex);
+}
+
+// Another thread's answer may be out of date, but is never true.
+bool ForkSafeMutex::mine() const noexcept {
+  return m_owned.load(std::memory_order_acquire) &&
+         pthread_equal(m_owner.load(std::memory_order_relaxed), pthread_self()) != 0;
+}
+
+void ForkSafeMutex::own() noexcept {
+  m_owner.store(pthread_self(), std::memory_order_relaxed);
+  m_owned.store(true, std::memory_order_release);
+  m_depth = 1;
+}
+
+void ForkSafeMutex::lock() {
+  if (mine()) {
+    ++m_depth;
+    return;
+  }
+  pthread_mutex_lock(&m_mutex);
+  own();
+}
+
+bool ForkSafeMutex::try_lock() {
+  if (mine()) {
+    ++m_depth;
+    return true;
+  }
+  if (pthread_mutex_trylock(&m_mutex) != 0) return false;
+  own();
+  return true;
+}
+
+void ForkSafeMutex::unlock() {
+  if (--m_depth > 0) return;
+  m_owned.store(false, std::memory_order_release);
+  pthread_mutex_unlock(&m_mutex);
+}
+
+// In the child, whose one thread this is.
+void ForkSafeMutex::renew() noexcept {
+  if (mine()) return;
+  if (std::exchange(m_takenByFork, false)) {
+    pthread_mutex_unlock(&m_mutex);
+    return;
+  }
+  // Held also if the owner has not written itself down yet, or no longer.
+  if (pthread_mutex_trylock(&m_mutex) != 0) m_interrupted = true;
+  const pthread_mutex_t fresh = PTHREAD_MUTEX_INITIALIZER;
+  m_mutex = fresh;
+  m_owned = false;
+  m_depth = 0;
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt

@@ -1,0 +1,50 @@
+#include "zt/fnd/osdep/SharedObjectName.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <memory>
+
+#include "zt/fnd/String.h"
+#include "zt/fnd/osdep/LocaleText.h"
+#include "zt/fnd/osdep/SharedUnixObject.h"
+
+namespace zt {
+namespace fnd {
+namespace osdep {
+namespace {
+
+bool IsAscii(wchar_t c) { return static_cast<std::uint32_t>(c) < 0x80; }
+
+wchar_t Folded(wchar_t c) { return c >= L'a' && c <= L'z' ? static_cast<wchar_t>(c - 32) : c; }
+
+}  // namespace
+
+AnsiString SharedObjectFileName(const String& name) {
+  char* text;
+  char* end;
+  WideToAnsi(name.begin(), name.end(), "UTF-8", text, end);
+  const std::unique_ptr<char[]> owner(text);
+  return AnsiString(static_cast<const char*>(text), static_cast<AnsiString::size_type>(end - text));
+}
+
+// What path::Join would make of the two, but for the bytes of the name.
+AnsiString SharedObjectPath(const String& dirName, const String& name) {
+  if (std::all_of(name.begin(), name.end(), IsAscii)) return BuildSharedUnixFilePath(dirName, name);
+  const AnsiString directory = BuildSharedUnixFilePath(dirName, String());
+  const AnsiString fileName = SharedObjectFileName(name);
+  return fileName[0] == '/' ? fileName : directory + fileName;
+}
+
+bool SharedObjectNameLess::operator()(const String& a, const String& b) const noexcept {
+  const wchar_t* left = a.c_str();
+  const wchar_t* right = b.c_str();
+  while (*left != L'\0' && Folded(*left) == Folded(*right)) {
+    ++left;
+    ++right;
+  }
+  return Folded(*left) < Folded(*right);
+}
+
+}  // namespace osdep
+}  // namespace fnd
+}  // namespace zt
