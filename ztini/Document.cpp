@@ -81,18 +81,46 @@ IniEntry* IniNewEntry(const char* name, const char* value, int32_t readOptions) 
   return entry;
 }
 
+IniSection* IniReadSection(IniStructForwardReferenceTag* doc, const char* name) {
+  void* place = doc->arena.record(sizeof(IniSection));
+  char* copy = place ? doc->arena.text(name, strlen(name)) : nullptr;
+  if (!copy) return nullptr;
+  auto* section = new (place) IniSection(&doc->fold);
+  section->flags = doc->sectionFlags;
+  section->name = copy;
+  section->nameInArena = section->recordInArena = 1;
+  return section;
+}
+
+IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, const char* name, const char* value) {
+  void* place = doc->arena.record(sizeof(IniEntry));
+  char* nameCopy = place ? doc->arena.text(name, strlen(name)) : nullptr;
+  char* valueCopy = nameCopy ? doc->arena.text(value, strlen(value)) : nullptr;
+  if (!valueCopy) return nullptr;
+  auto* entry = new (place) IniEntry;
+  entry->name = nameCopy;
+  entry->value = valueCopy;
+  entry->nameInArena = entry->valueInArena = entry->recordInArena = 1;
+  IniNewEntryHandleQuotes(entry, doc->readOptions);
+  return entry;
+}
+
 void IniDisposeSection(IniSection* section) {
   if (!section) return;
   for (int32_t n = section->items.count(); n >= 1; --n) IniDisposeEntry(section->item(n));
-  std::free(section->name);
-  ztini::Delete(section);
+  if (!section->nameInArena) std::free(section->name);
+  if (section->recordInArena) {
+    section->~IniSection();
+  } else {
+    ztini::Delete(section);
+  }
 }
 
 void IniDisposeEntry(IniEntry* entry) {
   if (!entry) return;
-  std::free(entry->name);
-  std::free(entry->value);
-  ztini::Delete(entry);
+  if (!entry->nameInArena) std::free(entry->name);
+  if (!entry->valueInArena) std::free(entry->value);
+  if (!entry->recordInArena) ztini::Delete(entry);
 }
 
 void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions) {
@@ -109,8 +137,9 @@ void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions) {
 }
 
 void IniReplaceValue(IniEntry* entry, char* value) {
-  std::free(entry->value);
+  if (!entry->valueInArena) std::free(entry->value);
   entry->value = value;
+  entry->valueInArena = 0;
 }
 
 bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section) {
@@ -135,4 +164,5 @@ void IniEmptyDocument(IniStructForwardReferenceTag* doc) {
   doc->currentSection = nullptr;
   for (int32_t n = doc->sections.count(); n >= 1; --n) IniDisposeSection(doc->section(n));
   doc->sections.keepFirst(0);
+  doc->arena.clear();
 }

@@ -3,17 +3,22 @@
 #include <cstdint>
 
 #include "ztini/Alloc.h"
+#include "ztini/Arena.h"
 #include "ztini/Handle.h"
 #include "ztini/NameFold.h"
 #include "ztini/NameList.h"
 #include "ztini/ztini.h"
 
 // The records behind the engine's handles. Callers outside see the functions of ztini.h only.
+//
+// What is read lies in the document's arena: records, names and values take no malloc block each, and
+// go when the document is emptied. What is put, and a name or value that is changed, has a block of its
+// own, so that a document that is edited for months does not grow.
 
 inline constexpr char kIniNullSectionName[] = "(null)";
 
 struct IniEntry : ztini::NameNode {
-  char* value = nullptr;  // owned; without surrounding white space and enclosing quotes
+  char* value = nullptr;  // without surrounding white space and enclosing quotes
   int32_t line = -1;      // -1: not from a file
   int32_t quote = 0;      // what encloses the value in the file: 0, 34, 39, or as put
 };
@@ -29,6 +34,7 @@ struct IniSection : ztini::NameNode {
 };
 
 struct IniStructForwardReferenceTag {
+  ztini::Arena arena;  // of what was read
   ztini::NameFold fold;
   ztini::NameList sections{&fold};       // of IniSection
   IniSection* currentSection = nullptr;  // the section last found, asked first
@@ -54,23 +60,34 @@ struct IniStructForwardReferenceTag {
   }
 };
 
-// Records that belong to no list yet; null without memory.
+// Records that belong to no list yet, in malloc blocks; null without memory.
 IniSection* IniNewSection(IniStructForwardReferenceTag* doc, const char* name);
 IniEntry* IniNewEntry(const char* name, const char* value, int32_t readOptions);
 
-// Frees the record and what it holds; it must be in no list. Null is allowed.
+// The same in the document's arena; the texts have no surrounding white space.
+IniSection* IniReadSection(IniStructForwardReferenceTag* doc, const char* name);
+IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, const char* name, const char* value);
+
+// Frees the record and what it holds, but for what lies in the arena; it must be in no list. Null is
+// allowed.
 void IniDisposeSection(IniSection* section);
 void IniDisposeEntry(IniEntry* entry);
 
 // Removes the quotes that enclose the value, where the options ask for it, and sets `quote`.
 void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions);
 
-// Takes over a malloc block as the value and frees the old one.
+// Takes over a malloc block as the value and frees the old one if it is one, too.
 void IniReplaceValue(IniEntry* entry, char* value);
 
 // Appends the record, or disposes it. False without memory.
 bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section);
 bool IniAppendEntry(IniSection* section, IniEntry* entry);
+
+// IniFindSection and IniFindEntry for those who ask again and again: 0 with the record or null, or
+// kIniOutOfMemory with null where only a scan of many names could tell.
+int32_t IniSeekSection(IniStructForwardReferenceTag* doc, const char* name, IniSection** found);
+int32_t IniSeekEntry(IniStructForwardReferenceTag* doc, IniSection* section, const char* name,
+                     IniEntry** found);
 
 // Removes all sections, the last one first.
 void IniEmptyDocument(IniStructForwardReferenceTag* doc);

@@ -1,5 +1,10 @@
 #pragma once
 
+#include <malloc.h>
+
+#include <cstddef>
+#include <cstdlib>
+
 #include "ztini/Alloc.h"
 
 namespace ztini::test {
@@ -28,6 +33,53 @@ class FailFromAllocation {
  private:
   inline static int s_left = 0;
   inline static bool s_failed = false;
+  ReallocFunction m_before;
+};
+
+// As FailFromAllocation, but the allocation of that number alone fails.
+class FailOneAllocation {
+ public:
+  explicit FailOneAllocation(int number) : m_before(g_realloc) {
+    s_left = number;
+    g_realloc = [](void* block, size_t size) -> void* {
+      return s_left > 0 && --s_left == 0 ? nullptr : std::realloc(block, size);
+    };
+  }
+  ~FailOneAllocation() { g_realloc = m_before; }
+  FailOneAllocation(const FailOneAllocation&) = delete;
+  FailOneAllocation& operator=(const FailOneAllocation&) = delete;
+
+  // True once the allocation was refused.
+  bool failed() const { return s_left == 0; }
+
+ private:
+  inline static int s_left = 0;
+  ReallocFunction m_before;
+};
+
+// For tests: counts what the engine allocates while an object lives. What is freed stays counted; a
+// block that grows counts once, with its last size.
+class CountAllocations {
+ public:
+  CountAllocations() : m_before(g_realloc) {
+    s_bytes = s_blocks = 0;
+    g_realloc = [](void* block, size_t size) -> void* {
+      const size_t before = block ? malloc_usable_size(block) : 0;
+      if (!block) ++s_blocks;
+      if (size > before) s_bytes += size - before;
+      return std::realloc(block, size);
+    };
+  }
+  ~CountAllocations() { g_realloc = m_before; }
+  CountAllocations(const CountAllocations&) = delete;
+  CountAllocations& operator=(const CountAllocations&) = delete;
+
+  size_t bytes() const { return s_bytes; }
+  size_t blocks() const { return s_blocks; }
+
+ private:
+  inline static size_t s_bytes = 0;
+  inline static size_t s_blocks = 0;
   ReallocFunction m_before;
 };
 

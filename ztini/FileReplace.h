@@ -1,9 +1,10 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
+#include "zt/posix/ScopedFd.h"
 #include "ztini/Alloc.h"
-#include "ztini/OpenFile.h"
 #include "ztini/ztini.h"
 
 namespace ztini {
@@ -17,7 +18,7 @@ char* SiblingTemporaryName(const char* target);
 // For mkstemp: "ini$$.TMPXXXXXX" in the target's directory.
 char* UniqueTemporaryTemplate(const char* target);
 
-// One save of one file: open, write to stream(), commit. An object that goes without a commit
+// One save of one file: open, write, commit. An object that goes without a commit
 // removes what it wrote, and the target is then as before.
 //
 //   state      open()                 commit()              destructor
@@ -37,28 +38,29 @@ class FileReplacement {
   // 0, or kIniNotReplaceable, kIniNoTemporary, kIniCannotCreate, kIniOutOfMemory.
   int32_t open();
 
-  FILE* stream() const { return m_stream.get(); }
+  // All of the bytes, or kIniWriteFailed; interrupted and short writes go on.
+  int32_t write(const char* bytes, size_t size);
 
-  // Closes the file, which was flushed, and puts it in place. 0, or kIniWriteFailed,
-  // kIniNotReplaceable.
+  // Closes the file and puts it in place. 0, or kIniWriteFailed,
+  // kIniNotReplaceable. kIniWriteFailed after the rename, with the new file in place, if its directory
+  // could not be synced: a power cut may still lose it.
   int32_t commit(IniDurability durability);
 
  private:
   bool safely() const { return m_temporary != nullptr; }
-  ScopedFd openUnique();
-  ScopedFd openSibling();
+  zt::posix::ScopedFd openUnique();
+  zt::posix::ScopedFd openSibling();
   int32_t openTemporary();
   int32_t openTarget();
-  int32_t finish(ScopedFd fd);
   void inheritFromTarget();
-  int32_t closeStream();
+  int32_t closeFile();
   const char* written() const { return m_temporary ? m_temporary.get() : m_target; }
   void discard();
 
   const char* m_target;
   int32_t m_options;
   OwnedText m_temporary;  // null when the target itself is written
-  Stream m_stream;
+  zt::posix::ScopedFd m_file;
   bool m_pending = false;  // the written file is ours to remove
 };
 

@@ -9,8 +9,12 @@
 #include <cstring>
 #include <utility>
 
-#include "ztini/Retry.h"
+#include "zt/posix/Files.h"
+#include "zt/posix/Retry.h"
 #include "ztini/StringTools.h"
+
+using zt::posix::RetryEintr;
+using zt::posix::ScopedFd;
 
 namespace ztini {
 namespace {
@@ -18,7 +22,9 @@ namespace {
 constexpr char kExtension[] = "TMP";
 constexpr char kUniqueName[] = "ini$$.TMPXXXXXX";
 constexpr mode_t kUniqueMode = 0644;
-constexpr mode_t kModeBits = 07777;
+constexpr mode_t kNewFileMode = 0666;  // less the process's mask
+// Without set-user-id and set-group-id, which the owner of the old file may not give a file of ours.
+constexpr mode_t kModeBits = 01777;
 
 // The first `length` bytes of the head and the tail.
 char* Join(const char* head, size_t length, const char* tail) {
@@ -30,26 +36,18 @@ char* Join(const char* head, size_t length, const char* tail) {
   return text;
 }
 
-bool Exists(const char* path) {
-  struct stat status;
-  return stat(path, &status) == 0;
-}
-
-// Whether a file could be made at a path where there is none; leaves none behind. O_EXCL first:
-// a file that another process makes meanwhile must not be emptied or removed.
+// Whether a file could be made at a path where there is none; leaves none behind. Another process's
+// file, made meanwhile, is neither emptied nor removed.
 bool CanCreate(const char* path) {
-  ScopedFd fresh = CreateNew(path);
-  if (!fresh && errno == EEXIST) {
-    if (Exists(path)) return static_cast<bool>(OpenExisting(path));
-    fresh = OpenOrCreate(path);  // a dangling link
-  }
-  if (!fresh) return false;
-  unlink(path);
-  return true;
+  ScopedFd fresh = zt::posix::CreateNew(path, O_WRONLY, kNewFileMode);
+  if (fresh) return zt::posix::Unlink(path) == 0;
+  // A dangling link. The rename replaces the link; nothing is made where it leads.
+  return errno == EEXIST;
 }
 
 bool Replaceable(const char* path) {
-  return Exists(path) ? static_cast<bool>(OpenExisting(path)) : CanCreate(path);
+  if (zt::posix::OpenExisting(path, O_RDWR)) return true;
+  return errno == ENOENT && CanCreate(path);
 }
 
 }  // namespace
@@ -72,8 +70,8 @@ FileReplacement::FileReplacement(const char* target, int32_t writeOptions)
 FileReplacement::~FileReplacement() { discard(); }
 
 void FileReplacement::discard() {
-  m_stream.reset();
-  if (m_pending) unlink(written());
+  m_file.reset();
+  if (m_pending) zt::posix::Unlink(written());
   m_pending = false;
 }
 
@@ -84,24 +82,27 @@ int32_t FileReplacement::open() {
 }
 
 int32_t FileReplacement::openTarget() {
-  ScopedFd fd = OpenOrCreate(m_target);
-  if (!fd || !Truncate(fd)) return kIniCannotCreate;
+  m_file = zt::posix::OpenOrCreate(m_target, O_WRONLY, kNewFileMode);
+  // Truncated only once it is known to be a file of ours to write.
+  if (!m_file || RetryEintr([&] { return ftruncate(m_file.get(), 0); }) != 0) {
+    return kIniCannotCreate;
+  }
   m_pending = true;
-  return finish(std::move(fd));
+  return 0;
 }
 
 int32_t FileReplacement::openTemporary() {
   const bool unique = (m_options & kIniWriteUniqueTemporary) != 0;
   m_temporary.reset(unique ? UniqueTemporaryTemplate(m_target) : SiblingTemporaryName(m_target));
   if (!m_temporary) return kIniOutOfMemory;
-  ScopedFd fd = unique ? openUnique() : openSibling();
-  if (!fd) return unique ? kIniNoTemporary : kIniCannotCreate;
+  m_file = unique ? openUnique() : openSibling();
+  if (!m_file) return unique ? kIniNoTemporary : kIniCannotCreate;
   m_pending = true;
-  return finish(std::move(fd));
+  return 0;
 }
 
 ScopedFd FileReplacement::openUnique() {
-  ScopedFd fd(mkostemp(m_temporary.get(), O_CLOEXEC));
+  ScopedFd fd = zt::posix::AboveStandardStreams(ScopedFd(mkostemp(m_temporary.get(), O_CLOEXEC)));
   if (fd) fchmod(fd.get(), kUniqueMode);
   return fd;
 }
@@ -109,57 +110,60 @@ ScopedFd FileReplacement::openUnique() {
 // A writer that was killed leaves the sibling behind, perhaps as another user's file that cannot be
 // opened; and nothing planted at its name may be written through.
 ScopedFd FileReplacement::openSibling() {
-  unlink(m_temporary.get());
-  return CreateNew(m_temporary.get());
+  if (zt::posix::MakeRoom(m_temporary.get()) != 0) return ScopedFd();
+  return zt::posix::CreateNew(m_temporary.get(), O_WRONLY, kNewFileMode);
 }
 
-int32_t FileReplacement::finish(ScopedFd fd) {
-  m_stream = StreamOver(std::move(fd), "wb");
-  return m_stream ? 0 : kIniCannotCreate;
+int32_t FileReplacement::write(const char* bytes, size_t size) {
+  return zt::posix::WriteAll(m_file.get(), bytes, size) ? 0 : kIniWriteFailed;
 }
 
 // Before the rename, so that a kill right after it leaves no file that others cannot write.
 void FileReplacement::inheritFromTarget() {
   struct stat status;
-  if (stat(m_target, &status) != 0) return;
-  const int fd = fileno(m_stream.get());
+  ScopedFd target = zt::posix::LookUp(m_target);
+  if (!target || fstat(target.get(), &status) != 0) return;
+  const int fd = m_file.get();
   if (fchmod(fd, status.st_mode & kModeBits) != 0 ||
       fchown(fd, status.st_uid, status.st_gid) != 0) {
     // A writer who is not the owner keeps the file for itself; that is no reason not to save.
   }
 }
 
-// The bytes were flushed before. An interrupted close has closed the descriptor all the same.
-int32_t FileReplacement::closeStream() {
-  return fclose(m_stream.release()) == 0 || errno == EINTR ? 0 : kIniWriteFailed;
+// Some file systems report at the close what they could not write. An interrupted close has closed the
+// descriptor all the same.
+int32_t FileReplacement::closeFile() {
+  return close(m_file.release()) == 0 || errno == EINTR ? 0 : kIniWriteFailed;
 }
 
 int32_t FileReplacement::commit(IniDurability durability) {
-  const bool synced = durability == IniDurability::Synced;
+  const bool synced = durability != IniDurability::None;
   if (safely()) inheritFromTarget();
-  int32_t status = synced && !SyncDescriptor(fileno(m_stream.get())) ? kIniWriteFailed : 0;
-  const int32_t closed = closeStream();
+  int32_t status = synced && !zt::posix::Sync(m_file.get()) ? kIniWriteFailed : 0;
+  const int32_t closed = closeFile();
   if (status == 0) status = closed;
-  if (status == 0 && safely() && rename(written(), m_target) != 0) status = kIniNotReplaceable;
+  if (status == 0 && safely() && zt::posix::Rename(written(), m_target) != 0) {
+    status = kIniNotReplaceable;
+  }
   if (status != 0) {
     discard();
     return status;
   }
   m_pending = false;
-  // The rename cannot be taken back any more, so a failure here must not be reported as one.
-  if (synced) SyncDirectoryOf(m_target);
-  return 0;
+  const bool whole = durability != IniDurability::Synced || zt::posix::SyncDirectoryOf(m_target);
+  return whole ? 0 : kIniWriteFailed;
 }
 
 }  // namespace ztini
 
 int32_t ztini_SyncFile(const char* path) {
-  ztini::Stream file = path ? ztini::OpenForReading(path) : nullptr;
+  if (!path) return kIniBadPath;
+  ScopedFd file = zt::posix::OpenExisting(path, O_RDONLY);
   if (!file) return kIniBadPath;
-  const bool synced = ztini::SyncDescriptor(fileno(file.get())) && ztini::SyncDirectoryOf(path);
+  const bool synced = zt::posix::Sync(file.get()) && zt::posix::SyncDirectoryOf(path);
   return synced ? 0 : kIniWriteFailed;
 }
 
 void ztini_RemoveFileIfExists(const char* path) {
-  if (path) unlink(path);
+  if (path) zt::posix::Unlink(path);
 }

@@ -3,10 +3,14 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <string>
 
+#include "tests/support/Child.h"
+#include "tests/support/FailSystemCall.h"
 #include "tests/support/TempDir.h"
 #include "ztini/FailingAlloc.h"
 
@@ -56,7 +60,7 @@ TEST(IniFileReplace, WithoutACommitTheTargetIsAsBeforeAndNothingElseRemains) {
     {
       FileReplacement file(path.c_str(), options);
       ASSERT_EQ(file.open(), 0);
-      fputs("new", file.stream());
+      EXPECT_EQ(file.write("new", 3), 0);
       EXPECT_EQ(ReadBytes(path), "old");
     }
     EXPECT_EQ(ReadBytes(path), "old");
@@ -66,13 +70,26 @@ TEST(IniFileReplace, WithoutACommitTheTargetIsAsBeforeAndNothingElseRemains) {
   }
 }
 
-TEST(IniFileReplace, TheStreamIsCloseOnExec) {
+// The flags of the one open file below the directory; -1 if there is none.
+int DescriptorFlagsBelow(const TempDir& dir) {
+  for (int fd = 3; fd < 100; ++fd) {
+    char target[4096];
+    const ssize_t length =
+        readlink(("/proc/self/fd/" + std::to_string(fd)).c_str(), target, sizeof target);
+    if (length > 0 && std::string(target, static_cast<size_t>(length)).rfind(dir.path(), 0) == 0) {
+      return fcntl(fd, F_GETFD);
+    }
+  }
+  return -1;
+}
+
+TEST(IniFileReplace, TheFileIsCloseOnExec) {
   for (int32_t options : {0, 2, 6}) {
     TempDir dir;
     const std::string path = dir / "a.ini";
     FileReplacement file(path.c_str(), options);
     ASSERT_EQ(file.open(), 0);
-    EXPECT_EQ(fcntl(fileno(file.stream()), F_GETFD) & FD_CLOEXEC, FD_CLOEXEC) << options;
+    EXPECT_EQ(DescriptorFlagsBelow(dir), FD_CLOEXEC) << options;
   }
 }
 
@@ -88,8 +105,7 @@ TEST(IniFileReplace, TheNewFileHasModeAndOwnerBeforeItIsInPlace) {
   for (int32_t options : {2, 6}) {
     FileReplacement file(path.c_str(), options);
     ASSERT_EQ(file.open(), 0);
-    fputs("new", file.stream());
-    fflush(file.stream());
+    EXPECT_EQ(file.write("new", 3), 0);
     EXPECT_EQ(file.commit(IniDurability::None), 0);
     EXPECT_EQ(ReadBytes(path), "new");
     EXPECT_EQ(ModeOf(path), 0604);
@@ -125,21 +141,52 @@ TEST(IniFileReplace, AStaleSiblingIsReplacedAndAPlantedLinkNotFollowed) {
   ASSERT_EQ(symlink(victim.c_str(), temporary.c_str()), 0);
   FileReplacement file(path.c_str(), 2);
   ASSERT_EQ(file.open(), 0);
-  fputs("new", file.stream());
-  fflush(file.stream());
+  EXPECT_EQ(file.write("new", 3), 0);
   EXPECT_EQ(file.commit(IniDurability::Synced), 0);
   EXPECT_EQ(ReadBytes(victim), "precious");
   EXPECT_EQ(ReadBytes(path), "new");
 }
 
-TEST(IniFileReplace, ADirectoryInTheSiblingsPlaceIsAnError) {
+TEST(IniFileReplace, ADirectoryInTheSiblingsPlaceIsMovedAside) {
   TempDir dir;
   const std::string path = dir / "a.ini";
-  dir.makeDir("a.TMP");
+  dir.makeDir("a.TMP/inside");
+  {
+    FileReplacement file(path.c_str(), 2);
+    ASSERT_EQ(file.open(), 0);
+    EXPECT_EQ(file.commit(IniDurability::Synced), 0);
+  }
+  EXPECT_TRUE(Exists(dir / "a.TMP.bad/inside"));
+  EXPECT_TRUE(Exists(path));
+}
+
+TEST(IniFileReplace, AFileOfAnotherUserLosesItsSetUserIdBit) {
+  TempDir dir;
+  const std::string path = dir / "a.ini";
+  WriteBytes(path, "old");
+  ASSERT_EQ(chmod(path.c_str(), 06755), 0);
   FileReplacement file(path.c_str(), 2);
-  EXPECT_EQ(file.open(), kIniCannotCreate);
-  EXPECT_TRUE(Exists(dir / "a.TMP"));
-  EXPECT_FALSE(Exists(path));
+  ASSERT_EQ(file.open(), 0);
+  EXPECT_EQ(file.commit(IniDurability::None), 0);
+  EXPECT_EQ(ModeOf(path), 0755);
+}
+
+TEST(IniFileReplace, AFailedSyncIsAFailedSave) {
+  for (IniDurability durability : {IniDurability::ContentOnly, IniDurability::Synced}) {
+    TempDir dir;
+    const std::string path = dir / "a.ini";
+    WriteBytes(path, "old");
+    vlt::test::Child child([&] {
+      if (!vlt::test::FailSystemCall(SYS_fsync, EIO)) return 1;
+      FileReplacement file(path.c_str(), 2);
+      if (file.open() != 0) return 2;
+      EXPECT_EQ(file.write("new", 3), 0);
+      return file.commit(durability) == kIniWriteFailed ? 0 : 3;
+    });
+    EXPECT_EQ(child.wait(), 0);
+    EXPECT_EQ(ReadBytes(path), "old");
+    EXPECT_FALSE(Exists(dir / "a.TMP"));
+  }
 }
 
 TEST(IniFileReplace, OpenWithoutMemoryLeavesNothing) {

@@ -2,7 +2,9 @@
 
 #include "ztini/Document.h"
 #include "ztini/FileReplace.h"
+#include "ztini/Render.h"
 #include "ztini/StringTools.h"
+#include "ztini/TextBuffer.h"
 
 int32_t IniWriteToFile(IniStructForwardReferenceTag* doc, const char* path) {
   if (!doc || !path || !*path) return kIniBadPath;
@@ -11,7 +13,9 @@ int32_t IniWriteToFile(IniStructForwardReferenceTag* doc, const char* path) {
   if (!name) return kIniOutOfMemory;
   ztini::FileReplacement file(path, doc->writeOptions);
   int32_t status = file.open();
-  if (status == 0) status = ztini_IniWriteToFileHelper(doc, file.stream());
+  ztini::TextBuffer text;
+  if (status == 0) status = ztini::IniRender(doc, &text);
+  if (status == 0) status = file.write(text.text(), text.size());
   if (status == 0) status = file.commit(doc->durability);
   if (status < 0) return status;
   int64_t written = 0;

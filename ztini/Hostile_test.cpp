@@ -5,6 +5,7 @@
 #include <string>
 
 #include "tests/support/TempDir.h"
+#include "ztini/FailingAlloc.h"
 #include "ztini/TestDocument.h"
 
 namespace {
@@ -68,6 +69,54 @@ TEST(IniHostile, AMillionRepeatsOfOneNameWithoutDuplicateChecking) {
   for (int i = 1; i < 1000; ++i) {
     ASSERT_EQ(IniRemoveSection(doc.get(), "s"), 1);
     ASSERT_EQ(RawValue(doc, "S", "X"), std::to_string(i));
+  }
+}
+
+// What reading takes from the heap, tables that were outgrown included. A file may hold 256 MiB, and
+// the shortest records take 4 bytes of it, so it is these figures that keep a planted file from taking
+// all memory of a machine.
+struct Cost {
+  double bytes, blocks;  // of one record
+};
+
+Cost CostOfReading(const std::string& text, int records) {
+  Document doc = NewDocument();
+  IniSetReadOptions(doc.get(), 22);
+  ztini::test::CountAllocations count;
+  EXPECT_EQ(ztini::test::Read(doc, text), 0);
+  return {static_cast<double>(count.bytes()) / records,
+          static_cast<double>(count.blocks()) / records};
+}
+
+std::string Repeat(int records, std::string (*record)(int)) {
+  std::string text;
+  for (int i = 0; i < records; ++i) text += record(i);
+  return text;
+}
+
+TEST(IniHostile, RecordsOfAFileTakeFewBytesAndFewBlocks) {
+  constexpr int kRecords = 100000;
+  const struct {
+    const char* what;
+    std::string text;
+    double bytes, blocks;
+  } rows[] = {
+      {"empty sections", Repeat(kRecords, [](int i) { return "[" + std::to_string(i) + "]\n"; }),
+       128, 0.01},
+      {"items of one section",
+       "[s]\n" + Repeat(kRecords, [](int i) { return std::to_string(i) + "=\"\"\n"; }), 96, 0.01},
+      {"sections of one item",
+       Repeat(kRecords, [](int i) { return "[" + std::to_string(i) + "]\na=1\n"; }), 164, 0.01},
+      {"sections of three items",
+       Repeat(kRecords, [](int i) { return "[" + std::to_string(i) + "]\na=1\nb=1\nc=1\n"; }), 264,
+       1.01},
+      {"one item again and again",
+       "[s]\n" + Repeat(kRecords, [](int i) { return "a=" + std::to_string(i) + "\n"; }), 8, 1.01},
+  };
+  for (const auto& row : rows) {
+    const Cost cost = CostOfReading(row.text, kRecords);
+    EXPECT_LT(cost.bytes, row.bytes) << row.what;
+    EXPECT_LT(cost.blocks, row.blocks) << row.what;
   }
 }
 

@@ -88,8 +88,7 @@ bool SectionJoin::merge(int32_t begin, int32_t end) {
   ztini::OwnedText value(JoinedValue(m_items + begin, m_items + end));
   if (!name || !value) return false;
   IniReplaceValue(first, value.release());
-  std::free(first->name);
-  first->name = name.release();
+  ztini::ReplaceName(first, name.release());
   for (int32_t piece = begin + 1; piece < end; ++piece) IniDisposeEntry(item(piece));
   return true;
 }

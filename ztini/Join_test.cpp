@@ -127,8 +127,7 @@ TEST(IniJoin, WithoutMemoryTheRemainingRunsStayInPieces) {
   Document doc = Parse("[s]\na=1\nb=2\nc=3\nd=4\n");
   const char* const names[] = {"A Line1", "A Line2", "B Line1", "B Line2"};
   for (int i = 0; i < 4; ++i) {
-    std::free(doc->section(1)->item(i + 1)->name);
-    doc->section(1)->item(i + 1)->name = strdup(names[i]);
+    ztini::ReplaceName(doc->section(1)->item(i + 1), strdup(names[i]));
   }
   {
     ztini::test::FailFromAllocation fail(3);

@@ -3,6 +3,7 @@
 #include <climits>
 
 #include "ztini/Alloc.h"
+#include "ztini/OpenFile.h"
 #include "ztini/ztini.h"
 
 namespace {
@@ -57,7 +58,7 @@ LineFile* LineFileNew(FILE* file) {
 void LineFileDispose(LineFile* state) { std::free(state); }
 
 int32_t LineFileReadFromFile(LineFile* state) {
-  const size_t bytes = fread(state->buffer, 1, sizeof state->buffer, state->file);
+  const size_t bytes = ztini::ReadBytes(state->buffer, sizeof state->buffer, state->file);
   state->cursor = state->buffer;
   state->bytesLeft = 0;
   if (ferror(state->file)) return kIniReadFailed;

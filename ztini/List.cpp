@@ -8,7 +8,7 @@
 namespace {
 
 constexpr uint32_t kMostItems = INT32_MAX - 1;  // count + 1 is still a position
-constexpr uint32_t kFirstCapacity = 4;
+constexpr uint32_t kFirstCapacity = 3;  // three pointers fill the smallest malloc block but one
 
 // How many bytes MemBlockCompare looks at: a compare function receives the two items only. Of each
 // thread, because documents of different threads share nothing else.
@@ -19,6 +19,7 @@ int MemBlockCompare(const void* left, const void* right) {
 }
 
 char* Place(const ztini_ListRecord* list, uint32_t index) {
+  if (!list->capacity) return const_cast<char*>(list->only);
   return list->block + static_cast<size_t>(list->first + index) * list->itemSize;
 }
 
@@ -48,13 +49,16 @@ void MoveToFront(ztini_List list) {
 }
 
 bool Grow(ztini_List list, uint32_t needed) {
-  uint64_t capacity = list->capacity + static_cast<uint64_t>(list->capacity) / 2;
+  // By a quarter: most lists of a large document are short, and what they leave free adds up.
+  uint64_t capacity = list->capacity + static_cast<uint64_t>(list->capacity) / 4 + 1;
   if (capacity < kFirstCapacity) capacity = kFirstCapacity;
   if (capacity > kMostItems) capacity = kMostItems;
   if (capacity < needed) capacity = needed;
   if (capacity > SIZE_MAX / list->itemSize) return false;
-  void* block = ztini::Reallocate(list->block, static_cast<size_t>(capacity) * list->itemSize);
+  const size_t bytes = static_cast<size_t>(capacity) * list->itemSize;
+  void* block = ztini::Reallocate(list->capacity ? list->block : nullptr, bytes);
   if (!block) return false;
+  if (!list->capacity && list->count) memcpy(block, list->only, list->itemSize);
   list->block = static_cast<char*>(block);
   list->capacity = static_cast<uint32_t>(capacity);
   return true;
@@ -77,7 +81,7 @@ void ztini_ListDispose(ztini_List list) {
 
 void ztini_ListClear(ztini_List list) {
   if (!list) return;
-  std::free(list->block);
+  if (list->capacity) std::free(list->block);
   list->block = nullptr;
   list->capacity = list->first = list->count = 0;
 }
@@ -90,6 +94,7 @@ int32_t ztini_ListReserve(ztini_List list, uint32_t extra) {
   if (!list || extra > kMostItems - list->count) return 0;
   const uint32_t needed = list->count + extra;
   if (list->first + needed <= list->capacity) return 1;
+  if (!list->capacity && needed <= 1 && list->itemSize <= sizeof list->only) return 1;
   // Half the block free at the front pays for the move; less would move on every few inserts.
   if (needed <= list->capacity && list->first >= list->capacity / 2) {
     MoveToFront(list);

@@ -12,9 +12,12 @@
 // Any other position, and a null list, does nothing (get, remove) or gives 0 (find, insert).
 //
 // Growth is geometric; removal moves the shorter side, so that emptying a list from either end is
-// linear.
+// linear. A list without a block (capacity 0) still holds one item that is no larger than a pointer.
 struct ztini_ListRecord {
-  char* block = nullptr;
+  union {
+    char* block = nullptr;
+    char only[sizeof(char*)];  // the one item of a list without a block
+  };
   uint32_t itemSize = 0;
   uint32_t capacity = 0;
   uint32_t first = 0;  // place of item 1 in the block

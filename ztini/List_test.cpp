@@ -154,6 +154,31 @@ TEST(IniList, ReservedRoomMakesInsertIndependentOfMemory) {
   }
 }
 
+TEST(IniList, OneItemOfAPointersSizeNeedsNoBlock) {
+  Owned list(ztini_ListNew(sizeof(void*))), wide(ztini_ListNew(sizeof(void*) + 1));
+  const char* texts[] = {"a", "b", "c"};
+  {
+    FailFromAllocation fail(1);
+    for (int round = 0; round < 3; ++round) {
+      EXPECT_EQ(ztini_ListInsertItem(list.get(), &texts[0], 0), 1);
+      EXPECT_EQ(list->capacity, 0u);
+      EXPECT_EQ(ztini_ListFindItem(list.get(), &texts[0], 1, nullptr), 1);
+      const char* out = nullptr;
+      ztini_ListRemoveItem(list.get(), &out, 1);
+      EXPECT_EQ(out, texts[0]);
+      EXPECT_EQ(ztini_ListNumItems(list.get()), 0);
+    }
+    EXPECT_EQ(ztini_ListInsertItem(list.get(), &texts[1], 0), 1);
+    EXPECT_EQ(ztini_ListInsertItem(list.get(), &texts[2], 0), 0);
+    EXPECT_EQ(ztini_ListReserve(wide.get(), 1), 0);
+  }
+  EXPECT_EQ(ztini_ListInsertItem(list.get(), &texts[2], 0), 1);
+  EXPECT_EQ(ztini_ListInsertItem(list.get(), &texts[0], -1), 1);
+  for (int32_t at = 1; at <= 3; ++at) {
+    EXPECT_EQ(*static_cast<const char**>(ztini_ListItem(list.get(), at)), texts[at - 1]);
+  }
+}
+
 TEST(IniList, ImpossibleSizesAreRefused) {
   Owned list(ztini_ListNew(UINT32_MAX));
   EXPECT_EQ(ztini_ListReserve(list.get(), UINT32_MAX), 0);

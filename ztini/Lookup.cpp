@@ -37,6 +37,25 @@ IniSection* IniFindSection(Doc* doc, const char* section) {
   return static_cast<IniSection*>(found);
 }
 
+int32_t IniSeekSection(Doc* doc, const char* name, IniSection** found) {
+  *found = nullptr;
+  ztini::NameNode* node = nullptr;
+  if (IsCurrent(doc, name)) {
+    node = doc->currentSection;
+  } else if (!doc->sections.seek(name, doc->match(), &node)) {
+    return kIniOutOfMemory;
+  }
+  if (node) doc->currentSection = *found = static_cast<IniSection*>(node);
+  return 0;
+}
+
+int32_t IniSeekEntry(Doc* doc, IniSection* section, const char* name, IniEntry** found) {
+  ztini::NameNode* node = nullptr;
+  const bool good = section->items.seek(name, doc->match(), &node);
+  *found = static_cast<IniEntry*>(node);
+  return good ? 0 : kIniOutOfMemory;
+}
+
 int32_t IniFindSectionIndex(Doc* doc, const char* section) {
   IniSection* found = IniFindSection(doc, section);
   return found ? doc->sections.positionOf(found) : 0;

@@ -1,5 +1,6 @@
 #include "ztini/NameIndex.h"
 
+#include <algorithm>
 #include <cstring>
 
 #include "ztini/Alloc.h"
@@ -8,59 +9,54 @@
 namespace ztini {
 namespace {
 
+constexpr size_t kFewestSlots = 16;
+constexpr uint32_t kFirstTwins = 8;
+constexpr uint32_t kMostTwins = (uint32_t(1) << 29) - 1;  // NameNode::twin
+
 uint32_t ShortHash(const NameFold& fold, const char* name) {
   return static_cast<uint32_t>(HashName(fold, name));
 }
 
-// Chains are rings backwards: the first one's prevSame is the last.
-void LinkInOrder(NameNode** head, NameNode* node) {
-  NameNode* first = *head;
-  NameNode* last = first->prevSame;
-  if (node->sequence < first->sequence) {
-    node->nextSame = first;
-    node->prevSame = last;
-    first->prevSame = node;
-    *head = node;
-    return;
-  }
-  NameNode* before = last;
-  while (before->sequence > node->sequence) before = before->prevSame;
-  node->nextSame = before->nextSame;
-  node->prevSame = before;
-  (node->nextSame ? node->nextSame : first)->prevSame = node;
-  before->nextSame = node;
-}
-
-// The chain keeps at least one node.
-void Unlink(NameNode** head, NameNode* node) {
-  NameNode* first = *head;
-  if (node == first) {
-    node->nextSame->prevSame = node->prevSame;
-    *head = node->nextSame;
-    return;
-  }
-  node->prevSame->nextSame = node->nextSame;
-  (node->nextSame ? node->nextSame : first)->prevSame = node->prevSame;
-}
-
 }  // namespace
+
+uint32_t NodesInOrder::placeOf(uint32_t sequence) const {
+  if (!count || sequence < begin[0]->sequence) return count;
+  // Every gap before the node moves it towards the front, nothing moves it the other way.
+  const uint32_t last = sequence - begin[0]->sequence;
+  if (last < count && begin[last]->sequence == sequence) return last;
+  NameNode** end = begin + std::min(last, count);
+  NameNode** at = std::lower_bound(begin, end, sequence, [](const NameNode* node, uint32_t wanted) {
+    return node->sequence < wanted;
+  });
+  return at < end && (*at)->sequence == sequence ? static_cast<uint32_t>(at - begin) : count;
+}
 
 void NameIndex::clear() {
   std::free(m_slots);
+  std::free(m_twins);
   m_slots = nullptr;
+  m_twins = nullptr;
   m_mask = m_used = 0;
+  m_twinCapacity = m_unusedTwin = 0;
+  m_twinEnd = 1;
 }
 
-bool NameIndex::create(size_t names) {
+bool NameIndex::create(const NameFold& fold, size_t names) {
   clear();
-  size_t slots = 16;
-  while (slots / 2 < names) {
-    if (slots > SIZE_MAX / 2 / sizeof(Slot)) return false;
+  size_t slots = kFewestSlots;
+  while (slots - slots / 4 < names) {
+    if (slots > SIZE_MAX / 2) return false;
     slots *= 2;
   }
+  m_generation = fold.generation();
+  return allocateSlots(slots);
+}
+
+bool NameIndex::allocateSlots(size_t slots) {
+  if (slots > SIZE_MAX / sizeof(Slot)) return false;
   m_slots = static_cast<Slot*>(Allocate(slots * sizeof(Slot)));
   if (!m_slots) return false;
-  memset(m_slots, 0, slots * sizeof(Slot));
+  memset(m_slots, 0xff, slots * sizeof(Slot));
   m_mask = slots - 1;
   return true;
 }
@@ -68,76 +64,151 @@ bool NameIndex::create(size_t names) {
 bool NameIndex::grow() {
   Slot* old = m_slots;
   const size_t slots = m_mask + 1;
-  const size_t used = m_used;
-  m_slots = nullptr;
-  if (!create(slots)) {
-    std::free(old);
+  if (!allocateSlots(slots * 2)) {
+    m_slots = old;
     return false;
   }
   for (size_t i = 0; i < slots; ++i) {
-    if (!old[i].head) continue;
+    if (old[i].head == kNoSequence) continue;
     size_t at = old[i].hash & m_mask;
-    while (m_slots[at].head) at = (at + 1) & m_mask;
+    while (m_slots[at].head != kNoSequence) at = (at + 1) & m_mask;
     m_slots[at] = old[i];
   }
-  m_used = used;
   std::free(old);
   return true;
 }
 
-size_t NameIndex::find(const NameFold& fold, const char* name, uint32_t hash) const {
+size_t NameIndex::find(const NameFold& fold, NodesInOrder nodes, const char* name,
+                       uint32_t hash) const {
   size_t at = hash & m_mask;
-  while (m_slots[at].head) {
-    if (m_slots[at].hash == hash && SameFoldedName(fold, m_slots[at].head->name, name)) break;
-    at = (at + 1) & m_mask;
+  for (; m_slots[at].head != kNoSequence; at = (at + 1) & m_mask) {
+    const Slot& slot = m_slots[at];
+    if (slot.hash == hash && SameFoldedName(fold, nodes.bySequence(slot.head)->name, name)) break;
   }
   return at;
 }
 
-bool NameIndex::insert(const NameFold& fold, NameNode* node) {
-  if ((m_used + 1) * 4 > (m_mask + 1) * 3 && !grow()) {
+bool NameIndex::insert(const NameFold& fold, NodesInOrder nodes, NameNode* node) {
+  if (full() && !grow()) {
     clear();
     return false;
   }
+  node->twin = 0;
   const uint32_t hash = ShortHash(fold, node->name);
-  Slot& slot = m_slots[find(fold, node->name, hash)];
-  if (slot.head) {
-    LinkInOrder(&slot.head, node);
+  Slot* slot = &m_slots[find(fold, nodes, node->name, hash)];
+  if (slot->head == kNoSequence) {
+    *slot = {hash, node->sequence};
+    ++m_used;
     return true;
   }
-  node->nextSame = nullptr;
-  node->prevSame = node;
-  slot = {node, hash};
-  ++m_used;
+  if (addTwin(slot, nodes, node)) return true;
+  clear();
+  return false;
+}
+
+bool NameIndex::addTwin(Slot* slot, NodesInOrder nodes, NameNode* node) {
+  if (!reserveTwins()) return false;
+  NameNode* first = nodes.bySequence(slot->head);
+  if (!first->twin) giveTwin(first);
+  giveTwin(node);
+  linkInOrder(slot, first->twin, node->twin);
   return true;
 }
 
-void NameIndex::remove(const NameFold& fold, NameNode* node) {
-  const size_t at = find(fold, node->name, ShortHash(fold, node->name));
-  if (!m_slots[at].head) return;
-  if (m_slots[at].head == node && !node->nextSame) {
-    freeSlot(at);
+// Makes room for two.
+bool NameIndex::reserveTwins() {
+  if (m_twinEnd + 1 < m_twinCapacity) return true;
+  if (m_twinCapacity > kMostTwins / 2) return false;
+  const uint32_t capacity = m_twinCapacity ? m_twinCapacity * 2 : kFirstTwins;
+  void* twins = Reallocate(m_twins, capacity * sizeof(Twin));
+  if (!twins) return false;
+  m_twins = static_cast<Twin*>(twins);
+  m_twinCapacity = capacity;
+  return true;
+}
+
+// As the only one of a chain.
+void NameIndex::giveTwin(NameNode* node) {
+  uint32_t twin = m_unusedTwin;
+  if (twin) {
+    m_unusedTwin = m_twins[twin].next;
   } else {
-    Unlink(&m_slots[at].head, node);
+    twin = m_twinEnd++;
   }
+  m_twins[twin] = {node->sequence, 0, twin};
+  node->twin = twin & kMostTwins;
+}
+
+void NameIndex::linkInOrder(Slot* slot, uint32_t first, uint32_t added) {
+  Twin& node = m_twins[added];
+  const uint32_t last = m_twins[first].prev;
+  if (node.sequence < m_twins[first].sequence) {
+    node.next = first;
+    node.prev = last;
+    m_twins[first].prev = added;
+    slot->head = node.sequence;
+    return;
+  }
+  uint32_t before = last;
+  while (m_twins[before].sequence > node.sequence) before = m_twins[before].prev;
+  node.next = m_twins[before].next;
+  node.prev = before;
+  m_twins[node.next ? node.next : first].prev = added;
+  m_twins[before].next = added;
+}
+
+void NameIndex::remove(const NameFold& fold, NodesInOrder nodes, NameNode* node) {
+  const size_t at = find(fold, nodes, node->name, ShortHash(fold, node->name));
+  Slot* slot = &m_slots[at];
+  if (slot->head == kNoSequence) return;
+  const uint32_t gone = node->twin;
+  node->twin = 0;
+  if (gone && m_twins[gone].prev != gone) {
+    unlink(slot, nodes.bySequence(slot->head)->twin, gone);
+  } else {
+    freeSlot(at);
+  }
+  if (!gone) return;
+  m_twins[gone].next = m_unusedTwin;
+  m_unusedTwin = gone;
+}
+
+// The chain keeps at least one node. The first node has lost its twin number already when it is the
+// one that goes.
+void NameIndex::unlink(Slot* slot, uint32_t first, uint32_t gone) {
+  const Twin& node = m_twins[gone];
+  if (slot->head == node.sequence) {
+    m_twins[node.next].prev = node.prev;
+    slot->head = m_twins[node.next].sequence;
+    return;
+  }
+  m_twins[node.prev].next = node.next;
+  m_twins[node.next ? node.next : first].prev = node.prev;
 }
 
 // Moves later slots of the same run back over the gap, so that probing never needs marks for
 // slots that were used once.
 void NameIndex::freeSlot(size_t at) {
   size_t gap = at;
-  for (size_t next = (at + 1) & m_mask; m_slots[next].head; next = (next + 1) & m_mask) {
+  for (size_t next = (at + 1) & m_mask; m_slots[next].head != kNoSequence;
+       next = (next + 1) & m_mask) {
     const size_t home = m_slots[next].hash & m_mask;
     if (((next - home) & m_mask) < ((next - gap) & m_mask)) continue;
     m_slots[gap] = m_slots[next];
     gap = next;
   }
-  m_slots[gap].head = nullptr;
+  m_slots[gap].head = kNoSequence;
   --m_used;
 }
 
-NameNode* NameIndex::chain(const NameFold& fold, const char* name) const {
-  return m_slots[find(fold, name, ShortHash(fold, name))].head;
+NameNode* NameIndex::chain(const NameFold& fold, NodesInOrder nodes, const char* name) const {
+  const Slot& slot = m_slots[find(fold, nodes, name, ShortHash(fold, name))];
+  return slot.head == kNoSequence ? nullptr : nodes.bySequence(slot.head);
+}
+
+NameNode* NameIndex::nextSame(NodesInOrder nodes, const NameNode* node) const {
+  const uint32_t next = node->twin ? m_twins[node->twin].next : 0;
+  return next ? nodes.bySequence(m_twins[next].sequence) : nullptr;
 }
 
 }  // namespace ztini

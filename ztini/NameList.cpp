@@ -1,9 +1,9 @@
 #include "ztini/NameList.h"
 
-#include <climits>
 #include <cstdlib>
 #include <cstring>
 
+#include "ztini/Alloc.h"
 #include "ztini/NameCompare.h"
 
 namespace ztini {
@@ -19,8 +19,11 @@ bool Matches(const NameFold& fold, NameMatch match, const char* stored, const ch
 
 }  // namespace
 
-NameList::NameList(NameFold* fold) : m_fold(fold), m_buildFrom(kIndexFrom) {
-  m_list.itemSize = sizeof(NameNode*);
+NameList::NameList(NameFold* fold) : m_fold(fold) { m_list.itemSize = sizeof(NameNode*); }
+
+NameList::~NameList() {
+  dropIndex();
+  ztini_ListClear(&m_list);
 }
 
 NameNode* NameList::at(int32_t position) const {
@@ -32,10 +35,23 @@ NameNode** NameList::nodes() const { return static_cast<NameNode**>(ztini_ListIt
 
 NameNode* NameList::find(const char* name, NameMatch match) {
   if (!name) return nullptr;
-  m_fold->refresh();
-  if (!useIndex()) return scan(name, match);
-  NameNode* node = m_index.chain(*m_fold, name);
-  while (node && !Matches(*m_fold, match, node->name, name)) node = node->nextSame;
+  return wayToFind() == Way::Index ? findInIndex(name, match) : scan(name, match);
+}
+
+bool NameList::seek(const char* name, NameMatch match, NameNode** found) {
+  *found = nullptr;
+  if (!name) return true;
+  const Way way = wayToFind();
+  if (way == Way::OutOfMemory) return false;
+  *found = way == Way::Index ? findInIndex(name, match) : scan(name, match);
+  return true;
+}
+
+NameNode* NameList::findInIndex(const char* name, NameMatch match) const {
+  NameNode* node = m_index->chain(*m_fold, inOrder(), name);
+  while (node && !Matches(*m_fold, match, node->name, name)) {
+    node = m_index->nextSame(inOrder(), node);
+  }
   return node;
 }
 
@@ -47,58 +63,61 @@ NameNode* NameList::scan(const char* name, NameMatch match) const {
   return nullptr;
 }
 
-bool NameList::useIndex() {
-  if (m_index.built() && !indexIsCurrent()) m_index.clear();
-  if (!m_index.built() && count() >= m_buildFrom) build();
-  return m_index.built();
+NameList::Way NameList::wayToFind() {
+  m_fold->refresh();
+  if (m_index && !indexIsCurrent()) dropIndex();
+  if (m_index) return Way::Index;
+  if (count() < kIndexFrom) return Way::Scan;
+  return build() ? Way::Index : Way::OutOfMemory;
 }
 
-void NameList::build() {
-  m_generation = m_fold->generation();
-  bool good = m_index.create(m_list.count);
+bool NameList::build() {
+  m_index = New<NameIndex>();
+  bool good = m_index && m_index->create(*m_fold, m_list.count);
   NameNode** all = nodes();
-  for (uint32_t i = 0; good && i < m_list.count; ++i) good = m_index.insert(*m_fold, all[i]);
-  // Without memory the next try waits until the list has doubled, or every look-up would fail at
-  // the same place first.
-  m_buildFrom = good ? kIndexFrom : count() > INT32_MAX / 2 ? INT32_MAX : count() * 2;
+  for (uint32_t i = 0; good && i < m_list.count; ++i) {
+    good = m_index->insert(*m_fold, inOrder(), all[i]);
+  }
+  if (!good) dropIndex();
+  return good;
 }
 
-void NameList::addToIndex(NameNode* node) {
-  if (!m_index.built()) return;
-  if (!indexIsCurrent()) {
-    m_index.clear();
-  } else if (!m_index.insert(*m_fold, node)) {
-    m_buildFrom = count() > INT32_MAX / 2 ? INT32_MAX : count() * 2;
-  }
+void NameList::dropIndex() {
+  Delete(m_index);
+  m_index = nullptr;
 }
 
 int32_t NameList::positionOf(const NameNode* node) const {
+  const uint32_t place = inOrder().placeOf(node->sequence);
+  return place < m_list.count && nodes()[place] == node ? static_cast<int32_t>(place) + 1 : 0;
+}
+
+// The last one's and 1. When the numbers run out, all records are numbered again.
+uint32_t NameList::nextSequence() {
+  if (!m_list.count) return 0;
   NameNode** all = nodes();
-  uint32_t low = 0, high = m_list.count;
-  while (low < high) {
-    const uint32_t middle = low + (high - low) / 2;
-    if (all[middle]->sequence < node->sequence) {
-      low = middle + 1;
-    } else {
-      high = middle;
-    }
+  if (all[m_list.count - 1]->sequence + 1 < NameIndex::kNoSequence) {
+    return all[m_list.count - 1]->sequence + 1;
   }
-  return low < m_list.count && all[low] == node ? static_cast<int32_t>(low) + 1 : 0;
+  dropIndex();
+  for (uint32_t i = 0; i < m_list.count; ++i) all[i]->sequence = i;
+  return m_list.count;
 }
 
 void NameList::append(NameNode* node) {
-  node->sequence = m_nextSequence++;
+  node->sequence = nextSequence();
   ztini_ListInsertItem(&m_list, &node, 0);
-  addToIndex(node);
+  if (!m_index) return;
+  if (!indexIsCurrent() || !m_index->insert(*m_fold, inOrder(), node)) dropIndex();
 }
 
 void NameList::remove(NameNode* node) {
   const int32_t position = positionOf(node);
   if (!position) return;
   if (indexIsCurrent()) {
-    m_index.remove(*m_fold, node);
+    m_index->remove(*m_fold, inOrder(), node);
   } else {
-    m_index.clear();
+    dropIndex();
   }
   ztini_ListRemoveItem(&m_list, nullptr, position);
 }
@@ -106,20 +125,24 @@ void NameList::remove(NameNode* node) {
 void NameList::rename(NameNode* node, char* name) {
   const bool indexed = indexIsCurrent();
   if (indexed) {
-    m_index.remove(*m_fold, node);
+    m_index->remove(*m_fold, inOrder(), node);
   } else {
-    m_index.clear();
+    dropIndex();
   }
-  std::free(node->name);
-  node->name = name;
-  if (indexed) addToIndex(node);
+  ReplaceName(node, name);
+  if (indexed && !m_index->insert(*m_fold, inOrder(), node)) dropIndex();
 }
 
 void NameList::keepFirst(int32_t count) {
   m_list.count = static_cast<uint32_t>(count);
   if (!count) m_list.first = 0;
-  m_index.clear();
-  m_buildFrom = kIndexFrom;
+  dropIndex();
+}
+
+void ReplaceName(NameNode* node, char* name) {
+  if (!node->nameInArena) std::free(node->name);
+  node->name = name;
+  node->nameInArena = 0;
 }
 
 }  // namespace ztini

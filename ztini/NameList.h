@@ -13,14 +13,15 @@ enum class NameMatch { IgnoreCase, Exact };
 // Named records in order, with look-up by name.
 //
 // Holds pointers and owns none of the records. Short lists are scanned; longer ones get an index,
-// built at the first look-up and kept up from then on. If there is no memory for the index, look-up
-// scans, with the same results. Records are only ever appended, so their sequence numbers ascend,
-// and a record's position is found by bisection.
+// built at the first look-up and kept up from then on. Without memory for the index, find() scans,
+// with the same results, and seek() reports it: whoever asks once per line of a file must not pay for
+// the whole list each time. Records are only ever appended, so their sequence numbers ascend, and a
+// record's position is found by bisection.
 class NameList {
  public:
   // The fold is shared by all lists of a document and outlives them.
   explicit NameList(NameFold* fold);
-  ~NameList() { ztini_ListClear(&m_list); }
+  ~NameList();
   NameList(const NameList&) = delete;
   NameList& operator=(const NameList&) = delete;
 
@@ -32,8 +33,13 @@ class NameList {
   // The records as an array of count() pointers; valid until the list changes.
   NameNode** nodes() const;
 
-  // First in order with this name, or null.
+  // First in order with this name, or null. Takes time linear in count() while there is no memory
+  // for the index of a long list; each call tries to build it.
   NameNode* find(const char* name, NameMatch match);
+
+  // As find(), into `found`, but never scans a long list: false, with null, without memory for its
+  // index.
+  bool seek(const char* name, NameMatch match, NameNode** found);
 
   // 1-based position of a record of the list.
   int32_t positionOf(const NameNode* node) const;
@@ -47,25 +53,32 @@ class NameList {
   // Takes a record of the list out; it is the caller's afterwards.
   void remove(NameNode* node);
 
-  // Gives a record of the list another name, which it takes over; the old one is freed.
+  // Gives a record of the list another name, a malloc block that it takes over; the old one is freed
+  // if it is one, too.
   void rename(NameNode* node, char* name);
 
-  // After the array was compacted in place: keeps the first `count` and looks at all names anew.
+  // After the array was compacted in place: keeps the first `count` and looks at all names again.
   void keepFirst(int32_t count);
 
  private:
-  bool useIndex();
-  bool indexIsCurrent() const { return m_index.built() && m_generation == m_fold->generation(); }
-  void build();
-  void addToIndex(NameNode* node);
+  enum class Way { Scan, Index, OutOfMemory };
+
+  Way wayToFind();
+  bool indexIsCurrent() const { return m_index && m_index->generation() == m_fold->generation(); }
+  bool build();
+  void dropIndex();
+  NodesInOrder inOrder() const { return {nodes(), m_list.count}; }
+  uint32_t nextSequence();
   NameNode* scan(const char* name, NameMatch match) const;
+  NameNode* findInIndex(const char* name, NameMatch match) const;
 
   ztini_ListRecord m_list;
-  NameIndex m_index;
+  NameIndex* m_index = nullptr;  // null: none; otherwise it is built
   NameFold* m_fold;
-  uint64_t m_nextSequence = 0;
-  uint32_t m_generation = 0;  // of the fold when the index was built
-  int32_t m_buildFrom;        // no index below this count
 };
+
+// Gives the record another name, a malloc block; the old one is freed if it is one, too. Of a record
+// of a list only when the list's keepFirst() follows.
+void ReplaceName(NameNode* node, char* name);
 
 }  // namespace ztini

@@ -22,7 +22,7 @@ class IniNameList : public testing::Test {
     for (NameNode& node : m_nodes) std::free(node.name);
   }
   NameNode* add(const std::string& name) {
-    m_nodes.push_back(NameNode{ztini_StrDup(name.c_str()), 0, nullptr, nullptr});
+    m_nodes.push_back(NameNode{ztini_StrDup(name.c_str())});
     EXPECT_TRUE(list.reserveOne());
     list.append(&m_nodes.back());
     return &m_nodes.back();
@@ -137,6 +137,44 @@ TEST_F(IniNameList, CompactionForgetsTheIndex) {
   EXPECT_EQ(find("n39"), all[39]);
   EXPECT_EQ(find("n30"), nullptr);
   EXPECT_EQ(list.positionOf(all[39]), 2);
+}
+
+TEST_F(IniNameList, SeekReportsTheMissingIndexOfALongListOnly) {
+  std::vector<NameNode*> all;
+  for (int i = 0; i < 15; ++i) all.push_back(add("n" + std::to_string(i)));
+  NameNode* found = nullptr;
+  {
+    ztini::test::FailFromAllocation fail(1);
+    EXPECT_TRUE(list.seek("N3", NameMatch::IgnoreCase, &found));
+    EXPECT_EQ(found, all[3]);
+  }
+  add("n15");
+  {
+    ztini::test::FailFromAllocation fail(1);
+    EXPECT_FALSE(list.seek("n3", NameMatch::IgnoreCase, &found));
+    EXPECT_EQ(found, nullptr);
+  }
+  EXPECT_TRUE(list.seek("n3", NameMatch::IgnoreCase, &found));
+  EXPECT_EQ(found, all[3]);
+  EXPECT_TRUE(list.seek("none", NameMatch::IgnoreCase, &found));
+  EXPECT_EQ(found, nullptr);
+  EXPECT_TRUE(list.seek(nullptr, NameMatch::IgnoreCase, &found));
+}
+
+TEST_F(IniNameList, RecordsAreNumberedAgainWhenTheNumbersRunOut) {
+  std::vector<NameNode*> all;
+  for (int i = 0; i < 40; ++i) all.push_back(add(i % 10 == 3 ? "same" : "n" + std::to_string(i)));
+  all.back()->sequence = ztini::NameIndex::kNoSequence - 2;
+  EXPECT_EQ(find("n38"), all[38]);  // builds the index
+  list.remove(all[5]);
+  for (int i = 40; i < 60; ++i) all.push_back(add("n" + std::to_string(i)));
+  EXPECT_LT(all.back()->sequence, 100u);
+  EXPECT_EQ(find("n59"), all[59]);
+  EXPECT_EQ(find("n39"), all[39]);
+  EXPECT_EQ(find("same"), all[3]);
+  list.remove(all[3]);
+  EXPECT_EQ(find("SAME"), all[13]);
+  EXPECT_EQ(list.positionOf(all[59]), 58);
 }
 
 }  // namespace

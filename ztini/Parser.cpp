@@ -59,7 +59,8 @@ int32_t DocumentBuilder::takeHeader(char* afterBracket, int32_t line) {
   char* name = SkipWhite(afterBracket);
   char* end = strchr(name, ']');
   if (!end || !CutTrailingWhite(name, end)) return badLine(line);
-  IniSection* known = m_doc->duplicateChecking ? IniFindSection(m_doc, name) : nullptr;
+  IniSection* known = nullptr;
+  if (m_doc->duplicateChecking && IniSeekSection(m_doc, name, &known) < 0) return kIniOutOfMemory;
   if (!known) return openSection(name, line);
   known->line = line;
   m_section = known;
@@ -67,7 +68,7 @@ int32_t DocumentBuilder::takeHeader(char* afterBracket, int32_t line) {
 }
 
 int32_t DocumentBuilder::openSection(const char* name, int32_t line) {
-  IniSection* section = IniNewSection(m_doc, name);
+  IniSection* section = IniReadSection(m_doc, name);
   if (!section) return kIniOutOfMemory;
   section->line = line;
   if (!IniAppendSection(m_doc, section)) return kIniOutOfMemory;
@@ -94,8 +95,10 @@ int32_t DocumentBuilder::store(const char* name, const char* value, int32_t line
     const int32_t status = openSection(kIniNullSectionName, -1);
     if (status < 0) return status;
   }
-  IniEntry* known =
-      m_doc->duplicateChecking ? IniFindEntry(m_section, m_doc->caseSensitive, name) : nullptr;
+  IniEntry* known = nullptr;
+  if (m_doc->duplicateChecking && IniSeekEntry(m_doc, m_section, name, &known) < 0) {
+    return kIniOutOfMemory;
+  }
   return known ? replace(known, value, line) : appendEntry(name, value, line);
 }
 
@@ -109,7 +112,7 @@ int32_t DocumentBuilder::replace(IniEntry* entry, const char* value, int32_t lin
 }
 
 int32_t DocumentBuilder::appendEntry(const char* name, const char* value, int32_t line) {
-  IniEntry* entry = IniNewEntry(name, value, m_doc->readOptions);
+  IniEntry* entry = IniReadEntry(m_doc, name, value);
   if (!entry) return kIniOutOfMemory;
   entry->line = line;
   return IniAppendEntry(m_section, entry) ? 0 : kIniOutOfMemory;

@@ -11,8 +11,8 @@ using Doc = IniStructForwardReferenceTag;
 // Puts the item into a section that may not be in the document yet.
 bool PutIntoSection(Doc* doc, IniSection* section, const char* item, const char* value,
                     int32_t quote) {
-  IniEntry* known =
-      doc->duplicateChecking ? IniFindEntry(section, doc->caseSensitive, item) : nullptr;
+  IniEntry* known = nullptr;
+  if (doc->duplicateChecking && IniSeekEntry(doc, section, item, &known) < 0) return false;
   if (known) {
     // The old value goes last: the new one may be a part of it.
     char* copy = ztini_StrDupWithoutSurrWhiteSpace(value);
@@ -39,7 +39,8 @@ int32_t IniPut(Doc* doc, const char* section, const char* item, const char* valu
   if (!doc) return 0;
   if (!ztini_HasNonWhiteSpace(section) || !ztini_HasNonWhiteSpace(item)) return kIniEmptyName;
   if (!value) value = "";
-  IniSection* known = IniFindSection(doc, section);
+  IniSection* known = nullptr;
+  if (IniSeekSection(doc, section, &known) < 0) return OutOfMemory(doc);
   if (known) {
     return PutIntoSection(doc, known, item, value, quoteCharacter) ? 1 : OutOfMemory(doc);
   }

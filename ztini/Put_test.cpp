@@ -95,6 +95,28 @@ TEST(IniPut, ReplacingWithoutMemoryKeepsTheOldValue) {
   EXPECT_EQ(Show(doc), "[a@1] x=\"1\"@2");
 }
 
+TEST(IniPut, WithoutMemoryForTheIndexOfManyNamesNothingChanges) {
+  std::string sections, items = "[s]\n";
+  for (int i = 0; i < 20; ++i) {
+    sections += "[s" + std::to_string(i) + "]\n";
+    items += "i" + std::to_string(i) + "=1\n";
+  }
+  for (const std::string& text : {sections, items}) {
+    Document doc = Parse(text, 2, 0);  // builds no index
+    IniSetDuplicateChecking(doc.get(), 1);
+    const std::string before = Show(doc);
+    {
+      ztini::test::FailOneAllocation fail(1);
+      EXPECT_EQ(IniPut(doc.get(), "s", "i3", "2", 0), kIniOutOfMemory);
+      EXPECT_TRUE(fail.failed());
+    }
+    EXPECT_EQ(doc->currentSection, nullptr);
+    EXPECT_EQ(Show(doc), before);
+    EXPECT_EQ(IniPut(doc.get(), "s", "i3", "2", 0), 1);
+    EXPECT_EQ(RawValue(doc, "s", "i3"), "2");
+  }
+}
+
 TEST(IniPut, StringsQuoteAndEscapeAsAsked) {
   const struct {
     const char* value;

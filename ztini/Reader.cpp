@@ -35,7 +35,10 @@ int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* fil
   int result = fseek(file, 0, SEEK_SET);
   if (result < 0) return result;
   char start[4];
-  const int32_t offset = TextOffset(start, fread(start, 1, sizeof start, file));
+  const size_t read = ztini::ReadBytes(start, sizeof start, file);
+  // The bytes may hold a mark that the next read, which may succeed, would not see.
+  if (ferror(file)) return kIniReadFailed;
+  const int32_t offset = TextOffset(start, read);
   if (offset < 0) return offset;
   result = fseek(file, offset, SEEK_SET);
   if (result < 0) return result;

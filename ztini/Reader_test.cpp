@@ -178,7 +178,7 @@ TEST(IniReader, AReadErrorLeavesWhatWasReadBefore) {
 TEST(IniReader, EveryFailedAllocationIsOutOfMemory) {
   TempDir dir;
   const std::string path = dir / "a.ini";
-  WriteBytes(path, "[a]\nx=1\n");
+  WriteBytes(path, "[a]\nx=1\nx=2\ny=3\n[b]\nx=1\nx=2\ny=3\n");
   const int descriptors = vlt::test::OpenDescriptors();
   for (int number = 1; number < 100; ++number) {
     Document doc = NewDocument();

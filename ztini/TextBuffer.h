@@ -21,6 +21,7 @@ class TextBuffer {
 
   // Terminated; valid until the next append.
   const char* text() const { return m_text ? m_text.get() : ""; }
+  size_t size() const { return m_length; }
 
  private:
   bool fit(size_t length);

@@ -3,6 +3,7 @@
 
 #include "ztini/ByteOrderMark.h"
 #include "ztini/Document.h"
+#include "ztini/Render.h"
 #include "ztini/TextBuffer.h"
 
 namespace {
@@ -140,31 +141,38 @@ int32_t IniFileOutputFunc(void* file, const char* line) {
 namespace {
 
 struct FirstLine {
-  FILE* file;
+  ztini::TextBuffer* text;
   bool comes;
 };
 
 // A name may begin with the bytes of a byte order mark. As the first bytes of the file they would be
 // lost or get the whole file refused, so an empty line goes before them.
-int32_t PutLine(void* state, const char* line) {
+int32_t AppendLine(void* state, const char* line) {
   auto* first = static_cast<FirstLine*>(state);
-  int32_t status = 0;
   if (first->comes && ztini::MarkIn(line, strnlen(line, 4)) != ztini::ByteOrderMark::kNone) {
-    status = ztini_WriteStringToFile(first->file, "\n");
+    first->text->append('\n');
   }
   first->comes = false;
-  return status < 0 ? status : IniFileOutputFunc(first->file, line);
+  first->text->append(line).append('\n');
+  return first->text->ok() ? 0 : kIniOutOfMemory;
 }
 
 }  // namespace
 
+int32_t ztini::IniRender(IniStructForwardReferenceTag* doc, TextBuffer* text) {
+  const bool marked = (doc->writeOptions & kIniWriteMark) != 0;
+  FirstLine first = {text, !marked};
+  if (marked) text->append(kUtf8Mark);
+  const int32_t status = IniWrite(doc, AppendLine, &first);
+  if (status < 0) return status;
+  return text->ok() ? 0 : kIniOutOfMemory;
+}
+
 int32_t ztini_IniWriteToFileHelper(IniStructForwardReferenceTag* doc, FILE* file) {
   if (!doc || !file) return 0;
-  int32_t status = 0;
-  const bool marked = (doc->writeOptions & kIniWriteMark) != 0;
-  FirstLine first = {file, !marked};
-  if (marked) status = ztini_WriteStringToFile(file, ztini::kUtf8Mark);
-  if (status >= 0) status = IniWrite(doc, PutLine, &first);
-  if (status >= 0 && fflush(file) != 0) status = kIniWriteFailed;
-  return status;
+  ztini::TextBuffer text;
+  const int32_t status = ztini::IniRender(doc, &text);
+  if (status < 0) return status;
+  const size_t written = fwrite(text.text(), 1, text.size(), file);
+  return written == text.size() && fflush(file) == 0 ? 0 : kIniWriteFailed;
 }

@@ -16,7 +16,8 @@
 //    as they are unless the result is 1.
 // 4. Positions are 1-based; 0 is the last and -1 the first.
 // 5. With several sections or items of one name the first in order is found.
-// 6. Nothing throws. Memory that runs out gives kIniOutOfMemory.
+// 6. Nothing throws. Memory that runs out gives kIniOutOfMemory. Look-up needs none: without memory
+//    for the index of many names it takes linear time, while reading and putting report it.
 // 7. Threads. Nothing locks: a document belongs to one caller at a time. Different documents share
 //    nothing.
 // 8. Cost. Look-up takes constant time on average, reading and writing linear time.
@@ -59,8 +60,10 @@ enum IniWriteOption : int32_t {
 };
 
 enum class IniDurability : int32_t {
-  None,    // a process that is killed loses nothing; a power cut may lose the save
-  Synced,  // the file's bytes before the rename, and its directory after it, are on the medium
+  None,         // a process that is killed loses nothing; a power cut may lose the file
+  ContentOnly,  // the file's bytes are on disk before the rename: a power cut leaves the old or the new
+                // file
+  Synced,       // and so is its directory after it: a power cut leaves the new file
 };
 
 // Fills `buffer` with at most `maximum` bytes of the present line and a terminator. Sets both flags
@@ -95,7 +98,8 @@ IniDurability IniSetDurability(IniStructForwardReferenceTag* doc, IniDurability 
 // ---- Reading. Empties the document first; a failed read leaves what was read so far.
 
 // kIniCannotOpen, kIniUnsupportedEncoding and a failed first allocation leave the document as it
-// was. A named pipe or a device cannot be opened; the call never waits for one.
+// was. A named pipe, a device, a file of more than 256 MiB and a symbolic link that another user may
+// have planted (zt/posix/Files.h) cannot be opened; the call never waits.
 int32_t IniReadFromFile(IniStructForwardReferenceTag* doc, const char* path);
 int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* file);
 int32_t IniRead(IniStructForwardReferenceTag* doc, IniLineInputFunction input, void* context);
@@ -189,7 +193,8 @@ int32_t IniPutDouble(IniStructForwardReferenceTag* doc, const char* section, con
 // ---- Writing. Leaves the document as it is, but for the file's path and time.
 
 // With kIniWriteSafely a failure leaves the target exactly as it was, and the new file has the old
-// one's mode, owner and group; without it a failed write deletes the target. Never waits for a
+// one's mode, owner and group. The exception: with IniDurability::Synced the new file is in place
+// although kIniWriteFailed is returned, where its directory could not be synced. Without it a failed write deletes the target. Never waits for a
 // named pipe; targets other than regular files are refused.
 int32_t IniWriteToFile(IniStructForwardReferenceTag* doc, const char* path);
 // The byte order mark, if asked for, and the text; flushes.
@@ -200,8 +205,8 @@ int32_t IniFileOutputFunc(void* file, const char* line);
 // The text as it is; kIniWriteFailed if not all of it could be written.
 int32_t ztini_WriteStringToFile(FILE* file, const char* text);
 
-// Brings a file that was written without IniDurability::Synced, and its directory, to the medium,
-// so that many saves can share the wait of one. 0, kIniBadPath or kIniWriteFailed.
+// Syncs a file that was written without IniDurability::Synced, and its directory, so that many saves
+// can share the wait of one. 0, kIniBadPath or kIniWriteFailed.
 int32_t ztini_SyncFile(const char* path);
 
 // Does nothing if there is none; tells nothing.

@@ -1,0 +1,47 @@
+#pragma once
+
+#include <cstddef>
+
+namespace ztini {
+
+// Memory for the records and texts of one document that is read: given piece by piece, freed as one.
+//
+// Blocks grow from about 512 bytes to 1 MiB, so that a small document takes little and a large one few
+// blocks. In a block, records go up from the front, aligned, and texts come down from the back, with
+// no byte between them; a piece that would fill a quarter of a new block gets a block of its own.
+class Arena {
+ public:
+  Arena() = default;
+  ~Arena() { clear(); }
+  Arena(const Arena&) = delete;
+  Arena& operator=(const Arena&) = delete;
+
+  // Uninitialised bytes, aligned for a pointer; null without memory.
+  void* record(size_t sizeBytes);
+
+  // A terminated copy of the bytes; null without memory.
+  char* text(const char* begin, size_t length);
+
+  // Frees everything at once.
+  void clear();
+
+ private:
+  struct Block {
+    Block* next;
+  };
+
+  char* addBlock(size_t sizeBytes);
+  bool makeRoom(size_t sizeBytes);
+  bool needsOwnBlock(size_t sizeBytes) const { return sizeBytes > m_nextBlockBytes / 4; }
+  size_t roomLeft() const { return static_cast<size_t>(m_back - m_front); }
+
+  static constexpr size_t kFirstBlockBytes = 512;
+  static constexpr size_t kLargestBlockBytes = size_t(1) << 20;
+
+  Block* m_blocks = nullptr;
+  char* m_front = nullptr;  // both ends of the free part of the present block
+  char* m_back = nullptr;
+  size_t m_nextBlockBytes = kFirstBlockBytes;
+};
+
+}  // namespace ztini

@@ -1,0 +1,14 @@
+#pragma once
+
+#include <cstdint>
+
+#include "ztini/TextBuffer.h"
+#include "ztini/ztini.h"
+
+namespace ztini {
+
+// Appends the bytes of the document's file: the byte order mark, if asked for, and the text. 0,
+// kIniOutOfMemory, or what IniWrite returns.
+int32_t IniRender(IniStructForwardReferenceTag* doc, TextBuffer* text);
+
+}  // namespace ztini
