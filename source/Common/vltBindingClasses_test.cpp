@@ -178,6 +178,7 @@ TEST(BindingClasses, OutOfMemoryGivesAnEmptyComponentVector) {
               CvltBindingClasses table = Parse(text);
               EXPECT_EQ(table.GetComponentVector().size(), kMany);
               LimitMemoryTo(kLargeBlock);
+              UseUpBlocksOf(kLargeBlock);
               unsigned found = table.GetComponentVector().size();
               LiftMemoryLimit();
               EXPECT_EQ(found, 0u);
@@ -223,6 +224,7 @@ TEST(BindingClasses, OutOfMemoryIsAResultOfTheQuery) {
               unsigned count = 7;
               GUID* components = nullptr;
               LimitMemoryTo(kLargeBlock);
+              UseUpBlocksOf(kLargeBlock);
               HRESULT result = vltGetComponentsForBindingClass(G(8), &count, &map, &components);
               LiftMemoryLimit();
               EXPECT_EQ(result, E_OUTOFMEMORY);

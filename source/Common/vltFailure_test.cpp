@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 #include <unistd.h>
 
+#include <exception>
 #include <filesystem>
 
 #include "source/Common/ZtUtils/General/vlTracer.h"

@@ -1,69 +1,123 @@
 #include "source/Common/vltFileSecurity.h"
 
-#include <stdio.h>
-#include <stdlib.h>
+#include <dirent.h>
+#include <errno.h>
+#include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
+#include <memory>
 #include <string>
 
-#include "source/Common/Posix/ChangeMode.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/DateTime.h"
-#include "zt/fnd/osdep/FindFiles.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Files.h"
 
 using zt::fnd::AnsiString;
 using zt::fnd::String;
 using zt::fnd::osdep::path;
+using zt::posix::ScopedFd;
 
 namespace {
 
-// Leaves the status alone if there are no entries; else it becomes that of the last one visited.
-void SecureEntries(const String& directory, int mode, HRESULT* status) {
-  zt::fnd::Vector<String> entries =
-      zt::fnd::osdep::FindFiles().getFilenames(path::Join(directory, String(L"*")));
-  String self = path::Join(directory, String(L"."));
-  String parent = path::Join(directory, String(L".."));
-  for (const String& entry : entries) {
-    if (entry.exactCompare(self) == 0 || entry.exactCompare(parent) == 0) continue;
-    *status = vltSetFileSecurityImpl(entry, mode, true);
-    if (*status < 0) break;
+// A fixed name, so that one that a killed process leaves is found and used by the next.
+constexpr const char* kUnfinished = ".NEW";
+
+std::string WithoutSlashes(const String& directory) {
+  std::string target = AnsiString(directory).c_str();
+  target.erase(target.find_last_not_of('/') + 1);
+  return target;
+}
+
+bool IsDirectoryAt(int parent, const char* name) {
+  struct stat info;
+  return fstatat(parent, name, &info, AT_SYMLINK_NOFOLLOW) == 0 && S_ISDIR(info.st_mode);
+}
+
+// Makes the directory under another name, with its mode, and gives it its name: a process that is killed
+// between making a directory and changing its mode would leave one that no other user can enter. False,
+// with nothing left, where that cannot be done; the plain way then reports why, or makes the levels
+// above.
+bool MakeOpenDirectory(const String& directory) {
+  std::string target = WithoutSlashes(directory);
+  if (target.empty() || target[0] != '/') return false;
+  zt::posix::Entry entry(target.c_str());
+  if (!entry.valid()) return false;
+  int parent = entry.directory.get();
+  std::string unfinished = std::string(entry.name) + kUnfinished;
+  if (mkdirat(parent, unfinished.c_str(), kSharedMode) != 0 && errno != EEXIST) return false;
+  ScopedFd made(openat(parent, unfinished.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  if (made.valid() && zt::posix::SetSharedMode(made.get(), kSharedMode) == 0 &&
+      zt::posix::RenameToNew(parent, unfinished.c_str(), entry.name) == 0) {
+    return zt::posix::SyncDirectoryOf(target.c_str());
+  }
+  // Another process may have finished the same directory.
+  unlinkat(parent, unfinished.c_str(), AT_REMOVEDIR);
+  return IsDirectoryAt(parent, entry.name);
+}
+
+// Puts the entries of all levels of a path on disk: some of them may be new.
+void SyncLevels(const String& directory) {
+  for (std::string level = WithoutSlashes(directory); !level.empty();
+       level.erase(level.rfind('/'))) {
+    zt::posix::SyncDirectoryOf(level.c_str());
   }
 }
 
-// Made aside, opened up, and put in its place: a process that is killed between making a directory and
-// opening it up would leave one that no other user can ever enter. False, and nothing left, where that
-// cannot be done; the plain way then tells why, or makes the levels above it.
-bool MakeOpenDirectory(const String& directory) {
-  std::string target = AnsiString(directory).c_str();
-  target.erase(target.find_last_not_of('/') + 1);
-  std::string aside = target + ".XXXXXX";
-  if (target[0] != '/' || !mkdtemp(aside.data())) return false;
-  if (vlChangeModeNoFollow(aside.c_str(), kSharedMode) == 0 &&
-      rename(aside.c_str(), target.c_str()) == 0) {
-    return true;
+HRESULT ResultOf(int status) { return status == 0 ? S_OK : E_FAIL; }
+
+// Mode changes of a tree by descriptors: whatever is moved or replaced meanwhile, no change goes through
+// a link or leaves the tree.
+class TreeMode {
+ public:
+  explicit TreeMode(int mode) : m_mode(static_cast<mode_t>(mode)) {}
+
+  // The thing the descriptor (O_PATH) leads to and all that is in it, without entries whose name begins
+  // with a dot. The first failure ends the walk.
+  HRESULT change(int found) {
+    struct stat info;
+    if (fstat(found, &info) != 0) return E_FAIL;
+    if (S_ISLNK(info.st_mode)) return S_OK;
+    HRESULT status = ResultOf(zt::posix::ChangeMode(found, m_mode));
+    return S_ISDIR(info.st_mode) ? changeEntries(found, status) : status;
   }
-  rmdir(aside.c_str());
-  return false;
-}
+
+ private:
+  // Leaves the status alone if there are no entries; else returns that of the last one visited.
+  HRESULT changeEntries(int directory, HRESULT status) {
+    ScopedFd fd(openat(directory, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    std::unique_ptr<DIR, int (*)(DIR*)> entries(fd.valid() ? fdopendir(fd.get()) : nullptr,
+                                                closedir);
+    if (!entries) return status;  // a directory that may not be read has no entries to be seen
+    fd.release();
+    while (const dirent* entry = readdir(entries.get())) {
+      if (entry->d_name[0] == '.') continue;
+      ScopedFd found(openat(dirfd(entries.get()), entry->d_name, O_PATH | O_NOFOLLOW | O_CLOEXEC));
+      if (!found.valid() && errno == ENOENT) continue;  // removed just now
+      status = found.valid() ? change(found.get()) : E_FAIL;
+      if (status < 0) break;
+    }
+    return status;
+  }
+
+  mode_t m_mode;
+};
 
 }  // namespace
 
 HRESULT vltSetFileSecurityImpl(const String& path, int mode, bool recursive) {
-  HRESULT status = vlrSetFileSecurity(path, mode);
-  if (!recursive || !path::IsDirectory(path.c_str()) || path::IsSymLink(path.c_str()))
-    return status;
-  try {
-    SecureEntries(path, mode, &status);
-    return status;
-  } catch (const std::exception&) {
-    return E_FAIL;  // Entries come and go while others work here; the caller only learns that it
-                    // failed.
-  }
+  AnsiString narrow(path);
+  ScopedFd found = zt::posix::LookUp(narrow.c_str(), false);
+  struct stat info;
+  if (!found || fstat(found.get(), &info) != 0) return E_FAIL;
+  if (S_ISLNK(info.st_mode)) return S_OK;
+  if (!recursive) return ResultOf(zt::posix::ChangeMode(found.get(), static_cast<mode_t>(mode)));
+  return TreeMode(mode).change(found.get());
 }
 
 HRESULT vlrSetFileSecurity(const String& path, int mode) {
-  return vlChangeModeNoFollow(AnsiString(path).c_str(), mode) == 0 ? S_OK : E_FAIL;
+  return ResultOf(zt::posix::SetSharedMode(AnsiString(path).c_str(), static_cast<mode_t>(mode)));
 }
 
 HRESULT vltMakeSharedDirectory(const String& directory) {
@@ -74,7 +128,8 @@ HRESULT vltMakeSharedDirectory(const String& directory) {
     // Another process was first, which is as good. A file in its place is not.
     if (!path::IsDirectory(directory.c_str())) throw;
   }
-  return vltSetFileSecurityImpl(directory, kSharedMode, false);
+  SyncLevels(directory);
+  return vlrSetFileSecurity(directory, kSharedMode);
 }
 
 String vlrGetCurrentLocalTime() {

@@ -3,6 +3,8 @@
 #include <stdio.h>
 #include <string.h>
 
+#include <iterator>
+
 #include "source/Common/vltQuery.h"
 #include "source/Common/vltcmn.h"
 #include "tests/support/Child.h"

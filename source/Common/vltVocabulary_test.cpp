@@ -1,5 +1,7 @@
 #include <gtest/gtest.h>
 
+#include <utility>
+
 #include "source/Common/vltcmn.h"
 #include "source/Utilities/vltutils.h"
 

@@ -4,34 +4,43 @@
 #include <stdio.h>
 #include <stdlib.h>
 
-#include "ztcom/ztcore/ztlock.h"
+#include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/LeakedInstance.h"
+
+using zt::fnd::osdep::AtFork;
+using zt::fnd::osdep::ForkSafeHold;
+using zt::fnd::osdep::ForkSafeMutex;
+using zt::fnd::osdep::LeakedInstance;
 
 IZTDebugOutputStream* g_pZTDebugOutputStream = nullptr;
 
 namespace {
 
-bool g_InZTTrace = false;
+struct Trace {
+  ForkSafeMutex lock{AtFork::Wait, 65};
+  bool inProgress = false;
+};
 
-CZTMutex& TraceMutex() {
-  // Never destroyed: exit handlers of other libraries may still trace.
-  static CZTMutex* g_pZTTraceMutex = new CZTMutex;
-  return *g_pZTTraceMutex;
-}
+class InTrace {
+ public:
+  explicit InTrace(Trace& trace) : m_trace(trace) { m_trace.inProgress = true; }
+  ~InTrace() { m_trace.inProgress = false; }
+  InTrace(const InTrace&) = delete;
+  InTrace& operator=(const InTrace&) = delete;
 
-struct InTrace {
-  InTrace() { g_InZTTrace = true; }
-  ~InTrace() { g_InZTTrace = false; }
+ private:
+  Trace& m_trace;
 };
 
 }  // namespace
 
 void ZTTrace(const char* format, ...) {
-  CZTMutex& mutex = TraceMutex();
-  // Before the lock, which a nested call of the same thread would never get.
-  if (mutex.IsNesting()) abort();
-  CZTMutexHold hold(mutex);
-  if (g_InZTTrace) abort();
-  InTrace inTrace;
+  Trace& trace = LeakedInstance<Trace>();
+  ForkSafeHold hold(trace.lock);
+  if (trace.lock.takeInterrupted())
+    trace.inProgress = false;     // of a thread that is not in this child
+  if (trace.inProgress) abort();  // a nested call of this thread
+  InTrace inTrace(trace);
   if (!g_pZTDebugOutputStream) return;
   char text[1024];
   va_list args;

@@ -17,7 +17,7 @@ constexpr size_t kFileNameSize = 260;
 
 bool Warns() { return (vltGetTraceFlagsImpl() & kEarlyTraceMask) >= kEarlyTraceWarnings; }
 
-// What stands behind the last slash; the whole text without one.
+// What follows the last slash; the whole text without one.
 std::string BaseName(const std::string& file) { return file.substr(file.rfind('/') + 1); }
 
 struct NameLess {
@@ -124,7 +124,7 @@ void vltStringResources::Database::walk(Question& q) {
     const char* section = nullptr;
     std::string base;
     if (IniNthItemName(document, kComponents, n, &section) != 1) continue;
-    if (!fileNameOf(section, &base)) continue;
+    if (!fileNameOf(section, &base) || base.empty()) continue;  // an empty name matches nothing
     if (zt::fnd::osdep::StringCaseCompare(base.c_str(), q.target.c_str()) != 0) continue;
     if (take(q, section)) return;
   }
@@ -138,7 +138,7 @@ void vltStringResources::Database::index() {
     const char* section = nullptr;
     std::string base;
     if (IniNthItemName(document, kComponents, n, &section) != 1) continue;
-    if (fileNameOf(section, &base)) sectionsOf[base].push_back(section);
+    if (fileNameOf(section, &base) && !base.empty()) sectionsOf[base].push_back(section);
   }
   indexed = true;
 }

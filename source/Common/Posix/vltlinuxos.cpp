@@ -1,5 +1,6 @@
 #include "source/Common/Posix/vltlinuxos.h"
 
+#include <errno.h>
 #include <fcntl.h>
 #include <pthread.h>
 #include <stdarg.h>
@@ -13,9 +14,9 @@
 
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
-#include "zt/fnd/osdep/Retry.h"
 #include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Files.h"
 #include "ztini/ztini.h"
 
 using zt::fnd::AnsiString;
@@ -40,12 +41,11 @@ constexpr unsigned kFlagsUnread = 0xFFFFFFFF;
 
 unsigned ReadTraceFlags() {
   std::string file = vlLookUpInstallDirectory() + "/vlttrace.txt";
-  // Not fopen, which would wait for the other end of a pipe in the file's place.
-  ScopedFd fd(zt::fnd::osdep::RetryEintr(
-      [&] { return open(file.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY); }));
+  ScopedFd fd = zt::posix::OpenExisting(file.c_str(), O_RDONLY);
+  // The answer is kept, so that a failure that passes must not become it.
+  if (!fd && zt::posix::IsPassing(errno)) throw std::bad_alloc();
   char buffer[256];  // outlives the stream
   std::unique_ptr<FILE, int (*)(FILE*)> in(fd.valid() ? fdopen(fd.get(), "r") : nullptr, fclose);
-  // The answer is kept, so that a passing want of memory must not become it.
   if (fd.valid() && !in) throw std::bad_alloc();
   if (in) fd.release();
   if (in) setvbuf(in.get(), buffer, _IOFBF, sizeof buffer);
@@ -72,7 +72,8 @@ String vlDiagnosticsIni() {
 }
 
 String vlLogDirectory() {
-  const char* home = getenv("HOME");
+  // Not from the environment of a user who runs a program with more rights than the own.
+  const char* home = secure_getenv("HOME");
   String root(L"/tmp/zentrex");
   if (geteuid() == 0) {
     root = L"/Library/Logs";

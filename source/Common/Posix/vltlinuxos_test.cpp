@@ -5,6 +5,7 @@
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
+#include <sys/auxv.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -67,11 +68,17 @@ TEST(StringResource, AFileWithoutASlashMatchesNothing) {
   Expect(Ask(nullptr, nullptr), E_FAIL, "(untouched)");
 }
 
-// Its base name is the empty one, which a stored name that ends in a slash has too.
-TEST(StringResource, AnEmptyBaseNameIsAName) {
-  Database d("[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/dir/\"\nKey = \"k\"\n");
-  Expect(Ask(nullptr, L"/other/"), S_OK, "k");
-  Expect(Ask(nullptr, L"none"), S_OK, "k");
+// A stored name that ends in a slash has no base name either, and is no component's file. The second
+// round walks the list as the early trace has it.
+TEST(StringResource, AnEmptyBaseNameMatchesNothing) {
+  for (const char* flags : {"", "2 0"}) {
+    Database d("[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/dir/\"\nKey = \"k\"\n");
+    WriteBytes(d.root() + "/vlttrace.txt", flags);
+    for (const wchar_t* file : {L"/other/", L"none", L"/", L""}) {
+      Expect(Ask(nullptr, file), E_FAIL, "(untouched)");
+      Expect(Ask(";", file), E_FAIL, "(untouched)");
+    }
+  }
 }
 
 TEST(StringResource, ASeparatorJoinsTheTextsInTheOrderOfTheList) {
@@ -410,6 +417,30 @@ TEST(TracerOptions, ComeFromTheSectionThenFromAllComponentsThenFromDefaults) {
   EXPECT_EQ(target, 1u);
   EXPECT_EQ(threshold, 0u);
   IniDispose(empty);
+}
+
+// ---- set-user-id programs
+
+TEST(LogDirectory, DISABLED_PrintsItself) {
+  printf("directory=%s secure=%lu\n", zt::fnd::AnsiString(vlLogDirectory()).c_str(),
+         getauxval(AT_SECURE));
+}
+
+TEST(LogDirectory, HomeOfTheCallerOfASetUserIdProgramIsNotTaken) {
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
+  TempDir dir;
+  const std::string program = dir / "program";
+  std::filesystem::copy_file("/proc/self/exe", program);
+  ASSERT_EQ(chown(program.c_str(), 65534, 65534), 0);
+  ASSERT_EQ(chmod(program.c_str(), 04755), 0);
+  ProgramResult result = RunProgram({program, "--gtest_also_run_disabled_tests",
+                                     "--gtest_filter=LogDirectory.DISABLED_PrintsItself"},
+                                    {{"HOME", "/callers"}});
+  if (result.out.find("secure=0") != std::string::npos) {
+    GTEST_SKIP() << "NOT TESTED: programs keep their caller's rights in this file system";
+  }
+  EXPECT_NE(result.out.find("directory=/tmp/zentrex/KOR/ secure=1"), std::string::npos)
+      << result.out << result.err;
 }
 
 }  // namespace

@@ -238,7 +238,7 @@ HRESULT CztStreamBaseImp::GetSubStreamInfo(wchar_t*** names, unsigned int* count
 }
 
 HRESULT CztStreamBaseImp::Clone(IztStream* target) {
-  if (!target) return E_POINTER;
+  if (!target) return E_FAIL;  // It does not answer to the interface, as any other that does not.
   auto streams =
       CztComPtr<IztStream2>::Attach(ZtTryQueryInterface<IztStream2>(IID_IztStream2, target));
   if (!streams) return E_FAIL;

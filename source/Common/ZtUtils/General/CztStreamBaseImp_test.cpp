@@ -82,7 +82,7 @@ TEST(SubStreams, NullPointersAreRefused) {
   EXPECT_EQ(stream->NumSubStreams(nullptr), E_POINTER);
   EXPECT_EQ(stream->GetSubStreamInfo(nullptr, &count), E_POINTER);
   EXPECT_EQ(stream->GetSubStreamInfo(&names, nullptr), E_POINTER);
-  EXPECT_EQ(stream->Clone(nullptr), E_POINTER);
+  EXPECT_EQ(stream->Clone(nullptr), E_FAIL);
   EXPECT_EQ(Count(stream.get()), 0u);
 }
 

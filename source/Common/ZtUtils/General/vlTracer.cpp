@@ -1,5 +1,6 @@
 #include "source/Common/ZtUtils/General/vlTracer.h"
 
+#include <errno.h>
 #include <fcntl.h>
 #include <stdio.h>
 #include <string.h>
@@ -15,8 +16,13 @@
 
 #include "source/Common/ZtUtils/General/ztSync.h"
 #include "zt/fnd/osdep/DateTime.h"
+#include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/LeakedInstance.h"
+#include "zt/fnd/osdep/Retry.h"
 #include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/fnd/osdep/SharedUnixObject.h"
 #include "zt/fnd/osdep/ThreadID.h"
+#include "zt/posix/Files.h"
 
 using zt::fnd::AnsiString;
 using zt::fnd::String;
@@ -41,22 +47,25 @@ constinit std::atomic<void (*)()> gs_traceInitCallback{nullptr};
 // inside while another one cleans up.
 constinit std::atomic<Toolyard::CztMutex*> gs_traceSync{nullptr};
 
-// What the lock above guards. Made at the first start and never freed, as exit handlers trace too.
+// What the lock above guards. Never freed, as exit handlers trace too.
 struct LogFile {
   std::string directory, name;
-  FILE* stream = nullptr;
+  int fd = -1;
+  FileIdentity
+      identity;  // of the file behind the descriptor, which the host may close and use again
   bool diskShort = false;
 };
 
-LogFile& Log() {
-  static LogFile* log = new LogFile;
-  return *log;
-}
+LogFile& Log() { return LeakedInstance<LogFile>(); }
 
-Toolyard::CztCS& InitSection() {
-  static auto* gs_traceInitCS = new Toolyard::CztCS;
-  return *gs_traceInitCS;
-}
+struct Start {
+  ForkSafeMutex lock{AtFork::Wait, 60};  // gs_traceInitCS
+  // Output locks are never destroyed, since threads may be inside one while the log is closed. Held
+  // here, they do not count as lost.
+  std::vector<Toolyard::CztMutex*> outputLocks;
+};
+
+Start& TheStart() { return LeakedInstance<Start>(); }
 
 // The lock, if it can be had: a line that may stand between another's is better than none.
 class OutputLock {
@@ -92,33 +101,50 @@ void OpenLog(LogFile& log) {
     log.diskShort = true;
     return;
   }
-  // Others may write to the directory: a link or a pipe under the log's name is not what was meant.
-  ScopedFd file(open(log.name.c_str(),
-                     O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY,
-                     kLogMode));
+  // Others may write to the directory: a link or a pipe under the log's name, or a file with a second
+  // name, is not what was meant.
+  const char* name = log.name.c_str();
+  ScopedFd file = zt::posix::OpenExisting(name, O_WRONLY | O_APPEND, zt::posix::Kind::File,
+                                          zt::posix::LastLink::Refused);
+  if (!file && errno == ENOENT) {
+    file = zt::posix::CreateNew(name, O_WRONLY | O_APPEND, kLogMode);
+  }
   struct stat info;
-  if (!file.valid() || fstat(file.get(), &info) != 0 || !S_ISREG(info.st_mode)) return;
-  log.stream = fdopen(file.get(), "a");
-  if (log.stream) file.release();
+  if (!file || fstat(file.get(), &info) != 0 || info.st_nlink > 1) return;
+  log.identity.device = info.st_dev;
+  log.identity.inode = info.st_ino;
+  log.fd = file.release();
 }
 
+// Closes what is still the log, and never what the host has opened under its number.
 void CloseLog(LogFile& log) {
-  if (log.stream) fclose(log.stream);
-  log.stream = nullptr;
+  ScopedFd closes(log.fd >= 0 && log.identity.isBehind(log.fd) ? log.fd : -1);
+  log.fd = -1;
+}
+
+// Writes the line with its end. Allocates nothing: lines are about memory, too.
+void AppendLine(int fd, const char* line) {
+  char text[kLongestLine + 2];
+  snprintf(text, sizeof text, "%.*s\n", static_cast<int>(kLongestLine), line);
+  const size_t size = strlen(text);
+  for (size_t done = 0; done < size;) {
+    ssize_t n = RetryEintr([&] { return write(fd, text + done, size - done); });
+    if (n <= 0) return;
+    done += static_cast<size_t>(n);
+  }
 }
 
 // Writes the line to the file; on a disk that has become short, the message in the line's place, for
 // all targets, and that is the file's last one.
 const char* WriteToLog(LogFile& log, const char* line) {
-  if (!log.stream) OpenLog(log);
-  if (!log.stream) return line;
+  if (log.fd >= 0 && !log.identity.isBehind(log.fd)) log.fd = -1;
+  if (log.fd < 0) OpenLog(log);
+  if (log.fd < 0) return line;
   if (DiskIsShort(log)) {
     line = kDiskShort;
     log.diskShort = true;
   }
-  fputs(line, log.stream);
-  fputc('\n', log.stream);
-  fflush(log.stream);
+  AppendLine(log.fd, line);
   if (log.diskShort) CloseLog(log);
   return line;
 }
@@ -152,11 +178,10 @@ char* CopyText(const std::string& text, char* buffer, unsigned long sizeBytes) {
   return buffer;
 }
 
-// Output locks are never destroyed, since threads may stand in one while the log is closed. Held here,
-// they do not count as lost.
-std::vector<Toolyard::CztMutex*>& OutputLocks() {
-  static auto* locks = new std::vector<Toolyard::CztMutex*>;
-  return *locks;
+// The second line of a call with detail.
+std::string DetailLine() {
+  std::string thread = AnsiString(ThreadID::getCallingID().getDisplayStringHex()).c_str();
+  return "  Thread = 0x" + thread + ", Time = " + LocalTime(L"%Y%m%d", L"%H%M%S", 3);
 }
 
 }  // namespace
@@ -169,15 +194,16 @@ int64_t CalcFreeSpace(const char* path) {
 
 void vlTracer::Initialize(SeverityLevel mask, TraceTarget target, const wchar_t* directory,
                           long threshold) {
-  Toolyard::CztHold hold(InitSection());
+  ForkSafeHold hold(TheStart().lock);
   gs_traceMask = mask;
   gs_traceTarget = target;
   gs_traceLowDiskThreshold = threshold;
   if (gs_traceSync) return;
+  LogFile& log = Log();  // also for a later start with a file, which may find no memory
   std::string name = NewLogName();
   auto* sync = new Toolyard::CztMutex(String(name.c_str()).c_str(), false);
-  if ((target & kTargetFile) && Log().name.empty() && directory) PlaceLog(Log(), directory, name);
-  OutputLocks().push_back(sync);
+  if ((target & kTargetFile) && log.name.empty() && directory) PlaceLog(log, directory, name);
+  TheStart().outputLocks.push_back(sync);
   gs_traceSync = sync;  // Last: whoever sees it sees the rest.
 }
 
@@ -198,7 +224,7 @@ void vlTracer::Cleanup() {
 
 unsigned vlt_vlTracer::GetTraceMask() {
   if (!gs_traceSync && gs_traceInitCallback) {
-    Toolyard::CztHold hold(InitSection());
+    ForkSafeHold hold(TheStart().lock);
     if (!gs_traceSync) gs_traceInitCallback.load()();
   }
   return vlTracer::gs_traceMask;
@@ -207,16 +233,14 @@ unsigned vlt_vlTracer::GetTraceMask() {
 void vlt_vlTracer::TraceOutput(char marker, const char* text, bool detail) {
   Toolyard::CztMutex* sync = gs_traceSync;
   if (!sync) return;
+  // The time before the lock: what the system's own locks hold up must not hold up the log.
+  const std::string detailLine = detail ? DetailLine() : std::string();
   OutputLock lock(*sync);
   if (gs_traceSync != sync) return;  // The log was closed while this line waited.
   char line[kLongestLine + 1];
   snprintf(line, sizeof line, "%c %s", marker, text ? text : "");
   WriteLine(line);
-  if (!detail) return;
-  std::string thread = AnsiString(ThreadID::getCallingID().getDisplayStringHex()).c_str();
-  std::string time = LocalTime(L"%Y%m%d", L"%H%M%S", 3);
-  snprintf(line, sizeof line, "  Thread = 0x%s, Time = %s", thread.c_str(), time.c_str());
-  WriteLine(line);
+  if (detail) WriteLine(detailLine.c_str());
 }
 
 void vlt_vlTracer::TraceArgsHelper() {

@@ -1,8 +1,10 @@
 #pragma once
 
 #include <atomic>
+#include <climits>
 #include <cstdint>
 #include <ostream>
+#include <utility>
 
 #include "source/Common/ZtUtils/General/vlt_vlTracer.h"
 
@@ -53,6 +55,12 @@ class vlTracer : public Toolyard::IStringObjectA {
   static void Initialize(void (*callback)());
   // Closes the file; nothing is written any more.
   static void Cleanup();
+
+  // The threshold for a number of bytes out of the options. What a long cannot hold, on 32 bits, is its
+  // largest: a limit in any case.
+  static constexpr long Threshold(uint32_t bytes) {
+    return std::cmp_greater(bytes, LONG_MAX) ? LONG_MAX : static_cast<long>(bytes);
+  }
 
   static std::atomic<uint32_t> gs_traceMask;  // 0 until the start
 

@@ -7,6 +7,7 @@
 
 #include <ctime>
 #include <filesystem>
+#include <iterator>
 #include <vector>
 
 #include "source/Common/ZtUtils/General/vlTracer.h"

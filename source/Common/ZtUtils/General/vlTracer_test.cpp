@@ -346,6 +346,14 @@ TEST(Tracer, AFullFileSystemWithoutALimitIsSilent) {
   EXPECT_EQ(result, 0);
 }
 
+TEST(Tracer, ThresholdOfTheOptionsNeverTurnsNegative) {
+  EXPECT_EQ(vlTracer::Threshold(0), 0);
+  EXPECT_EQ(vlTracer::Threshold(2147483647u), 2147483647);
+  for (uint32_t bytes : {2147483648u, 4294967295u}) {
+    EXPECT_EQ(vlTracer::Threshold(bytes), sizeof(long) == 4 ? LONG_MAX : static_cast<long>(bytes));
+  }
+}
+
 TEST(Tracer, FreeSpaceOfAMissingPathIsMinusOne) {
   EXPECT_EQ(CalcFreeSpace("/no/such/path"), -1);
   EXPECT_GT(CalcFreeSpace("/"), 0);
