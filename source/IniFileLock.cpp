@@ -1,7 +1,6 @@
 #include "source/IniFileLock.h"
 
 #include <pthread.h>
-#include <wctype.h>
 
 #include <atomic>
 #include <condition_variable>
@@ -15,8 +14,8 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/Mutex.h"
 #include "zt/fnd/osdep/ProcessMark.h"
+#include "zt/fnd/osdep/SharedObjectName.h"
 
-using zt::fnd::AnsiString;
 using zt::fnd::String;
 
 namespace {
@@ -31,6 +30,21 @@ uint64_t ThisThread() {
 constexpr uint64_t kNobody = 0;
 constexpr uint64_t kReleasing = UINT64_MAX;  // no thread's number: the last hold is being ended
 
+void AppendHex(std::string* text, unsigned char byte) {
+  *text += "0123456789ABCDEF"[byte >> 4];
+  *text += "0123456789ABCDEF"[byte & 15];
+}
+
+void AppendToName(std::string* name, unsigned char byte) {
+  if (byte == '\\' || byte == '/' || byte == ':' || byte == '.') return;
+  if (byte >= 0x80) {
+    *name += '%';
+    AppendHex(name, byte);
+  } else {
+    *name += static_cast<char>(byte >= 'a' && byte <= 'z' ? byte - 'a' + 'A' : byte);
+  }
+}
+
 // The directory of the locks may be made by two processes at once, and one of them is told so.
 std::unique_ptr<zt::fnd::osdep::Mutex> CreateMutex(const String& name) {
   try {
@@ -43,7 +57,8 @@ std::unique_ptr<zt::fnd::osdep::Mutex> CreateMutex(const String& name) {
 }  // namespace
 
 struct IniFileLock::Entry {
-  std::string name;
+  std::string name;  // key of the table
+  String mutexName;
   zt::fnd::osdep::ProcessMark process;
   std::unique_ptr<zt::fnd::osdep::Mutex> mutex;  // present while somebody owns the lock
   uint64_t owner = kNobody;
@@ -54,36 +69,52 @@ struct IniFileLock::Entry {
 class IniFileLock::Table {
  public:
   static Table& Instance() {
-    static Table* table = [] {
-      // A child of fork starts afresh: another thread may have held the table at that moment.
-      pthread_atfork(nullptr, nullptr, [] { s_instance = new Table; });
-      return s_instance = new Table;
-    }();
-    (void)table;
-    return *s_instance;
+    pthread_once(&s_once, Register);
+    Table* present = s_instance;
+    if (present) return *present;
+    auto fresh = std::make_unique<Table>();
+    if (s_instance.compare_exchange_strong(present, fresh.get())) present = fresh.release();
+    return *present;
   }
 
   Entry* acquire(const String& name);
+  // Null where that would have to wait.
+  Entry* tryAcquire(const String& name);
   void release(Entry* entry);
 
  private:
-  Entry* enter(std::unique_lock<std::mutex>& hold, const std::string& name, bool* mine);
+  Entry* find(const String& name);
+  Entry* enter(std::unique_lock<std::mutex>& hold, const String& name, bool* mine);
   void leave(Entry* entry);
 
+  // A child of fork starts without: another thread may have held the table at that moment.
+  static void Register() {
+    pthread_atfork(nullptr, nullptr, [] { s_inherited = s_instance.exchange(nullptr); });
+  }
+
+  static inline pthread_once_t s_once = PTHREAD_ONCE_INIT;
   // Leaked: managers of static objects may outlive every destructor that could run here.
   static inline std::atomic<Table*> s_instance{nullptr};
+  // The parent's, never used again, but still reachable: its entries are no leak.
+  static inline Table* s_inherited = nullptr;
 
   std::mutex m_lock;
   std::condition_variable m_ownerGone;
   std::map<std::string, std::unique_ptr<Entry>> m_entries;
 };
 
-// Waits until the entry is this thread's. `mine` tells whether it was before.
+// The name's entry, made where there is none; the table is locked.
+IniFileLock::Entry* IniFileLock::Table::find(const String& name) {
+  std::string key = zt::fnd::osdep::SharedObjectFileName(name).c_str();
+  auto& slot = m_entries[key];
+  if (!slot) slot.reset(new Entry{key, name, zt::fnd::osdep::ProcessMark::Current(), nullptr});
+  return slot.get();
+}
+
+// Waits until the entry is this thread's. `mine` says whether it was before.
 IniFileLock::Entry* IniFileLock::Table::enter(std::unique_lock<std::mutex>& hold,
-                                              const std::string& name, bool* mine) {
-  auto& slot = m_entries[name];
-  if (!slot) slot.reset(new Entry{name, zt::fnd::osdep::ProcessMark::Current(), nullptr});
-  Entry* entry = slot.get();
+                                              const String& name, bool* mine) {
+  Entry* entry = find(name);
   ++entry->users;
   *mine = entry->owner == ThisThread();
   m_ownerGone.wait(hold, [&] { return *mine || entry->owner == kNobody; });
@@ -103,7 +134,7 @@ void IniFileLock::Table::leave(Entry* entry) {
 IniFileLock::Entry* IniFileLock::Table::acquire(const String& name) {
   std::unique_lock<std::mutex> hold(m_lock);
   bool mine = false;
-  Entry* entry = enter(hold, AnsiString(name).c_str(), &mine);
+  Entry* entry = enter(hold, name, &mine);
   if (mine) return entry;
   hold.unlock();  // The wait for other processes must not stop the threads that want other files.
   try {
@@ -117,6 +148,26 @@ IniFileLock::Entry* IniFileLock::Table::acquire(const String& name) {
     leave(entry);
     throw;
   }
+}
+
+IniFileLock::Entry* IniFileLock::Table::tryAcquire(const String& name) {
+  auto mutex = CreateMutex(name);
+  std::lock_guard<std::mutex> hold(m_lock);
+  Entry* entry = find(name);
+  if (entry->owner == ThisThread()) {
+    ++entry->users;
+    ++entry->depth;
+    return entry;
+  }
+  if (entry->owner != kNobody || !mutex->tryLock()) {
+    if (entry->users == 0) m_entries.erase(entry->name);
+    return nullptr;
+  }
+  ++entry->users;
+  entry->owner = ThisThread();
+  entry->depth = 1;
+  entry->mutex = std::move(mutex);
+  return entry;
 }
 
 void IniFileLock::Table::release(Entry* entry) {
@@ -150,6 +201,23 @@ IniFileLock::~IniFileLock() {
   Table::Instance().release(m_entry);
 }
 
+bool IniFileLock::excludesOthers() const {
+  return m_entry->process.isCurrent() && m_entry->mutex && m_entry->mutex->excludesOthers();
+}
+
+bool IniFileLock::retake() {
+  if (m_entry->process.isCurrent()) return m_entry->mutex && m_entry->mutex->retake();
+  try {
+    Entry* own = Table::Instance().tryAcquire(m_entry->mutexName);
+    if (!own) return false;
+    m_entry->mutex.reset();  // a copy of the parent's, whose lock stays
+    m_entry = own;
+    return true;
+  } catch (const std::exception&) {
+    return false;  // A lock file that cannot be made excludes no other process.
+  }
+}
+
 std::unique_ptr<IniFileLock> IniFileLock::ForFile(const char* fileName) {
   String name = NameForFile(fileName);
   try {
@@ -162,23 +230,18 @@ std::unique_ptr<IniFileLock> IniFileLock::ForFile(const char* fileName) {
 String IniFileLock::NameForFile(const char* fileName) {
   constexpr size_t kLongestEntry = 255;
   constexpr size_t kKept = 200;
-  String path(fileName), name;
-  name.reserve(path.length());
-  for (const wchar_t* c = path.begin(); c != path.end(); ++c) {
-    if (*c == L'\\' || *c == L'/' || *c == L':' || *c == L'.') continue;
-    name += static_cast<wchar_t>(towupper(static_cast<wint_t>(*c)));
-  }
-  std::string narrow = AnsiString(name).c_str();
-  if (narrow.size() <= kLongestEntry) return name;
+  // By the bytes of the path, as the kernel has it: the locale, which would fold and convert them, is
+  // not the same in all processes.
+  std::string name;
+  for (; fileName && *fileName; ++fileName)
+    AppendToName(&name, static_cast<unsigned char>(*fileName));
+  if (name.size() <= kLongestEntry) return String(name.c_str());
   unsigned char digest[16];
   Cmd5vlt md5;
-  md5.addString(reinterpret_cast<const unsigned char*>(narrow.data()),
-                static_cast<unsigned>(narrow.size()));
+  md5.addString(reinterpret_cast<const unsigned char*>(name.data()),
+                static_cast<unsigned>(name.size()));
   md5.getDigest(digest);
-  narrow.resize(kKept);
-  for (unsigned char byte : digest) {
-    narrow += "0123456789ABCDEF"[byte >> 4];
-    narrow += "0123456789ABCDEF"[byte & 15];
-  }
-  return String(narrow.c_str());
+  name.resize(kKept);
+  for (unsigned char byte : digest) AppendHex(&name, byte);
+  return String(name.c_str());
 }

@@ -2,7 +2,7 @@
 
 #include <errno.h>
 #include <fcntl.h>
-#include <stdio.h>
+#include <string.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -10,83 +10,93 @@
 
 #include "source/Common/vltFileSecurity.h"
 #include "zt/fnd/osdep/BinaryFile.h"
-#include "zt/fnd/osdep/Retry.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/Files.h"
+#include "zt/posix/Retry.h"
 
-using zt::fnd::String;
 using zt::fnd::osdep::BinaryFile;
-using zt::fnd::osdep::RetryEintr;
-using zt::fnd::osdep::ScopedFd;
+using zt::posix::Kind;
+using zt::posix::LastLink;
+using zt::posix::RetryEintr;
+using zt::posix::ScopedFd;
 
 namespace IniSidecar {
 namespace {
 
-ScopedFd Open(const std::string& path, int flags) {
-  return ScopedFd(RetryEintr(
-      [&] { return open(path.c_str(), flags | O_CLOEXEC | O_NONBLOCK | O_NOCTTY, 0666); }));
-}
+constexpr mode_t kNewFileMode = 0666;
 
-bool Sync(int fd, bool durable) {
-  return !durable || RetryEintr([&] { return fsync(fd); }) == 0;
-}
-
-// One pwrite, then whatever is too long goes.
+// The digest, then whatever is too long goes.
 bool Overwrite(int fd, const unsigned char* digest, bool durable) {
   struct stat info;
-  if (RetryEintr([&] { return pwrite(fd, digest, kSizeBytes, 0); }) != kSizeBytes) return false;
+  if (!zt::posix::WriteAllAt(fd, digest, kSizeBytes, 0)) return false;
   if (fstat(fd, &info) != 0) return false;
   if (info.st_size > kSizeBytes && RetryEintr([&] { return ftruncate(fd, kSizeBytes); }) != 0) {
     return false;
   }
-  return Sync(fd, durable);
-}
-
-bool SyncDirectoryOf(const std::string& path, bool durable) {
-  if (!durable) return true;
-  std::string directory = path.substr(0, path.rfind('/') + 1);
-  ScopedFd fd = Open(directory.empty() ? "." : directory, O_RDONLY | O_DIRECTORY);
-  return fd.valid() && Sync(fd.get(), true);
+  return !durable || zt::posix::Sync(fd);
 }
 
 // Complete under another name first, then renamed into place.
 bool Create(const std::string& sidecar, const unsigned char* digest, bool durable) {
   std::string temporary = sidecar + ".TMP";
-  unlink(temporary.c_str());  // What a killed process left, maybe another user's.
+  // What a killed process left, maybe another user's.
+  if (zt::posix::MakeRoom(temporary.c_str()) != 0) return false;
   {
-    ScopedFd fd = Open(temporary, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW);
+    ScopedFd fd = zt::posix::CreateNew(temporary.c_str(), O_WRONLY, kNewFileMode);
+    if (!fd) return false;
     // Before the rename, so that a kill right after it leaves no sidecar that others cannot write.
-    if (fd.valid()) fchmod(fd.get(), kSharedMode);
+    zt::posix::SetSharedMode(fd.get(), kSharedMode);
     // Always synced: a rename that outlives its file's bytes in a power cut would leave a short one.
-    if (!fd.valid() || !Overwrite(fd.get(), digest, true) ||
-        rename(temporary.c_str(), sidecar.c_str()) != 0) {
-      if (fd.valid()) unlink(temporary.c_str());
+    if (!Overwrite(fd.get(), digest, true) ||
+        zt::posix::Rename(temporary.c_str(), sidecar.c_str()) != 0) {
+      zt::posix::Unlink(temporary.c_str());
       return false;
     }
   }
-  return SyncDirectoryOf(sidecar, durable);
+  return !durable || zt::posix::SyncDirectoryOf(sidecar.c_str());
 }
 
 }  // namespace
 
+State Read(const std::string& sidecar, Digest* digest) {
+  ScopedFd fd =
+      zt::posix::OpenExisting(sidecar.c_str(), O_RDONLY, Kind::FileOrDirectory, LastLink::Refused);
+  if (!fd) return zt::posix::IsPassing(errno) ? State::Unreadable : State::Missing;
+  errno = 0;
+  Digest found;
+  long read = BinaryFile::ReadExactSize(fd.get(), found.data(), kSizeBytes);
+  if (read == kSizeBytes) {
+    *digest = found;
+    return State::Present;
+  }
+  return zt::posix::IsPassing(errno) ? State::Unreadable : State::Short;
+}
+
 HRESULT Read(const std::string& sidecar, unsigned char** digest) {
   *digest = nullptr;
-  ScopedFd fd = Open(sidecar, O_RDONLY);
-  struct stat info;
-  if (!fd.valid() || fstat(fd.get(), &info) != 0) return S_FALSE;
-  // A pipe or a device is nothing that a save has left: it says nothing about the file beside it.
-  if (!S_ISREG(info.st_mode) && !S_ISDIR(info.st_mode)) return S_FALSE;
-  std::unique_ptr<unsigned char[]> found(new unsigned char[kSizeBytes]);
-  if (BinaryFile::ReadExactSize(fd.get(), found.get(), kSizeBytes) != kSizeBytes) return E_FAIL;
-  *digest = found.release();
-  return S_OK;
+  // First, so that without memory nothing is known, rather than that there is no sidecar.
+  std::unique_ptr<unsigned char[]> copy(new unsigned char[kSizeBytes]);
+  Digest found;
+  switch (Read(sidecar, &found)) {
+    case State::Present:
+      memcpy(copy.get(), found.data(), kSizeBytes);
+      *digest = copy.release();
+      return S_OK;
+    case State::Missing:
+      return S_FALSE;
+    default:
+      return E_FAIL;
+  }
 }
 
 HRESULT Write(const std::string& sidecar, const unsigned char* digest, bool durable) {
-  ScopedFd fd = Open(sidecar, O_WRONLY | O_NOFOLLOW);
-  bool written = fd.valid() ? Overwrite(fd.get(), digest, durable)
-                            : errno == ENOENT && Create(sidecar, digest, durable);
-  if (!written) return E_FAIL;
-  vlrSetFileSecurity(String(sidecar.c_str()), kSharedMode);
+  ScopedFd fd = zt::posix::OpenExisting(sidecar.c_str(), O_WRONLY, Kind::File, LastLink::Refused);
+  if (!fd) return errno == ENOENT && Create(sidecar, digest, durable) ? S_OK : E_FAIL;
+  struct stat info;
+  if (fstat(fd.get(), &info) != 0) return E_FAIL;
+  // A file that has a second name elsewhere is not overwritten: the new one takes this name from it.
+  if (info.st_nlink > 1) return Create(sidecar, digest, durable) ? S_OK : E_FAIL;
+  if (!Overwrite(fd.get(), digest, durable)) return E_FAIL;
+  zt::posix::SetSharedMode(fd.get(), kSharedMode);
   return S_OK;
 }
 

@@ -65,4 +65,13 @@ TEST(Sidecar, IsNotWrittenThroughALinkNorOverALeftover) {
   EXPECT_EQ(ReadBytes(dir / "y.vl5"), "0000000000000000");
 }
 
+TEST(Sidecar, AFileWithASecondNameIsReplacedAndNotOverwritten) {
+  TempDir dir;
+  WriteBytes(dir / "victim", "precious bytes!!");
+  ASSERT_EQ(link((dir / "victim").c_str(), (dir / "x.vl5").c_str()), 0);
+  EXPECT_EQ(IniSidecar::Write(dir / "x.vl5", IniSidecar::kInvalidMark, true), S_OK);
+  EXPECT_EQ(ReadBytes(dir / "victim"), "precious bytes!!");
+  EXPECT_EQ(ReadBytes(dir / "x.vl5"), "0000000000000000");
+}
+
 }  // namespace

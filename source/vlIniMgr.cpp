@@ -14,16 +14,17 @@
 #include "source/Common/vltFileSecurity.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/BinaryFile.h"
-#include "zt/fnd/osdep/Retry.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Files.h"
+#include "ztini/OpenFile.h"
 #include "ztini/ztini.h"
 
 using zt::fnd::AnsiString;
 using zt::fnd::String;
 using zt::fnd::osdep::path;
-using zt::fnd::osdep::RetryEintr;
-using zt::fnd::osdep::ScopedFd;
+using zt::fnd::osdep::PosixError;
+using zt::posix::ScopedFd;
 
 namespace {
 
@@ -33,22 +34,15 @@ constexpr int32_t kReadOptions =
 constexpr int32_t kWriteOptions = kIniWriteSafely | kIniWriteSpaces | kIniWriteTight;
 constexpr int32_t kNoLineLimit = -1;
 constexpr int32_t kQuotesOn = 1;
+constexpr mode_t kNewFileMode = 0666;
 
-// Never waits for the other end of a named pipe.
-ScopedFd Open(const std::string& fileName, int flags) {
-  return ScopedFd(RetryEintr(
-      [&] { return open(fileName.c_str(), flags | O_CLOEXEC | O_NONBLOCK | O_NOCTTY, 0666); }));
+ScopedFd OpenForReading(const std::string& fileName) {
+  return zt::posix::OpenExisting(fileName.c_str(), O_RDONLY, zt::posix::Kind::FileOrDirectory);
 }
 
-bool IsFileOrDirectory(int fd) {
-  struct stat info;
-  return fstat(fd, &info) == 0 && (S_ISREG(info.st_mode) || S_ISDIR(info.st_mode));
-}
-
-// Want of memory, of descriptors or of the right to open.
-bool SaysNothingOfTheFile(int32_t status) {
-  return status == kIniOutOfMemory || status == kIniCannotOpen;
-}
+// The machine could not open or read the file now: no memory, no descriptors, no right, a failing disk.
+// The one status of a parser is left over: a file in an encoding that cannot be read.
+bool ConcernsTheContents(int32_t status) { return status == kIniUnsupportedEncoding; }
 
 // The whole file; false if it could not be read to the told length.
 bool ReadWhole(int fd, int32_t lengthBytes, std::vector<unsigned char>* data) {
@@ -75,6 +69,10 @@ void SetAsideIfPossible(const std::string& fileName) {
   }
 }
 
+void MoveAside(const std::string& file, const std::string& stamp) {
+  if (zt::posix::MoveAside(file.c_str(), stamp.c_str()) != 0) ZT_RAISE(PosixError());
+}
+
 bool IsNull(char** out) { return !out || !*out; }
 bool IsNull(const std::string* out) { return !out; }
 
@@ -96,27 +94,27 @@ CvlIniMgr::~CvlIniMgr() {
   try {
     vlrSetFileSecurity(String(m_fileName.c_str()), kSharedMode);
   } catch (const std::exception&) {
-    // A destructor has nobody to tell; the next user opens the file up.
+    // A destructor cannot report it; the next opening sets the mode again.
   }
 }
 
 void CvlIniMgr::Initialize(unsigned char const* digest) {
   m_lock = std::make_unique<IniFileLock>(IniFileLock::NameForFile(m_fileName.c_str()));
   if (m_lockOnly) return;
-  ScopedFd fd = Open(m_fileName, O_RDONLY);
+  ScopedFd fd = OpenForReading(m_fileName);
   if (fd.valid()) {
-    // A pipe or a device in the file's place is left alone.
-    if (!IsFileOrDirectory(fd.get())) CleanupAndThrow(false);
     if (!ValidateFile(fd.get(), digest)) CleanupAndThrow(false);
     fd.reset();
-    vlrSetFileSecurity(String(m_fileName.c_str()), kSharedMode);
+    // By the path, so that what a link leads to keeps its mode.
+    zt::posix::SetSharedMode(m_fileName.c_str(), kSharedMode);
   } else if (errno == ENOENT) {
-    // Only a file that is not there is a new one: one that cannot be opened just now, for want of
-    // descriptors say, must not be given a new beginning.
+    // Only a file that is not there is a new one: one that cannot be opened just now, because of missing
+    // descriptors for example, must not be begun again.
     CreateFile();
   }
   int32_t status = InitializeIniBindings();
-  if (status != 0) CleanupAndThrow(!SaysNothingOfTheFile(status));
+  if (status != 0) CleanupAndThrow(ConcernsTheContents(status));
+  m_known = stateOfFile();
 }
 
 void CvlIniMgr::CreateFile() {
@@ -125,20 +123,20 @@ void CvlIniMgr::CreateFile() {
     path::MakePathEndInSlash(directory);
     vltMakeSharedDirectory(directory);
   } catch (const zt::fnd::exception::Exception&) {
-    // If the directory is really missing the file cannot be made either, and that is what tells.
+    // If the directory is really missing the file cannot be made either, and that is reported.
   }
   m_dirty = true;
-  // Not truncated: whoever was faster than this look may have put something in.
-  ScopedFd fd = Open(m_fileName, O_RDWR | O_CREAT | O_NOFOLLOW);
-  if (!fd.valid()) return;
-  fd.reset();
-  vlrSetFileSecurity(String(m_fileName.c_str()), kSharedMode);
+  // A file that another process has created since the check is used as it is.
+  ScopedFd fd = zt::posix::CreateNew(m_fileName.c_str(), O_RDWR, kNewFileMode);
+  if (fd.valid()) zt::posix::SetSharedMode(fd.get(), kSharedMode);
 }
 
 int32_t CvlIniMgr::GetFileLength(int fd) {
   struct stat info;
-  // Only regular files have a length; files from 2 GiB up are not for this class.
-  if (fstat(fd, &info) != 0 || !S_ISREG(info.st_mode) || info.st_size > INT32_MAX) return -1;
+  // Only regular files have a length. Those that cannot be parsed for their size are not read for their
+  // digest either: any user can make one that large.
+  if (fstat(fd, &info) != 0 || !S_ISREG(info.st_mode)) return -1;
+  if (info.st_size > ztini::kLargestFileBytes) return -1;
   return static_cast<int32_t>(info.st_size);
 }
 
@@ -167,11 +165,10 @@ int32_t CvlIniMgr::InitializeIniBindings() {
   if (!fresh) return kIniOutOfMemory;
   IniSetReadOptions(fresh, kReadOptions);
   IniSetWriteOptions(fresh, kNoLineLimit, ' ', kWriteOptions);
-  IniSetDurability(fresh, m_durable ? IniDurability::Synced : IniDurability::None);
+  IniSetDurability(fresh, m_durability);
   int32_t status = IniReadFromFile(fresh, m_fileName.c_str());
-  // What could not be read for want of memory or descriptors is no reason to forget what is known: the
-  // next save would write the forgetting down.
-  if (m_ini && SaysNothingOfTheFile(status)) {
+  // What is held stays, whatever the status: the next save would otherwise replace the file by less.
+  if (m_ini && status != 0) {
     IniDispose(fresh);
     return status;
   }
@@ -180,9 +177,9 @@ int32_t CvlIniMgr::InitializeIniBindings() {
   return status;
 }
 
-void CvlIniMgr::SetDurable(bool durable) {
-  m_durable = durable;
-  if (m_ini) IniSetDurability(m_ini, durable ? IniDurability::Synced : IniDurability::None);
+void CvlIniMgr::SetDurability(IniDurability durability) {
+  m_durability = durability;
+  if (m_ini) IniSetDurability(m_ini, durability);
 }
 
 void CvlIniMgr::DisposeDocument() {
@@ -204,23 +201,78 @@ std::string CvlIniMgr::SidecarName(const std::string& fileName) {
 }
 
 void CvlIniMgr::SetAside(const String& fileName) {
-  String badEnd = vlrGetCurrentLocalTime() + L".bad";
-  String sidecar(SidecarName(AnsiString(fileName).c_str()).c_str());
+  std::string file = AnsiString(fileName).c_str();
+  std::string stamp = AnsiString(vlrGetCurrentLocalTime()).c_str();
+  std::string sidecar = SidecarName(file);
   // A directory in the sidecar's place goes first. Left there, it would have every later opening set the
-  // file aside once more: the empty one of this opening over the copy that is made here.
-  if (path::IsDirectory(sidecar.c_str())) path::RenameFile(sidecar, sidecar + badEnd);
-  if (path::DoesFileExist(fileName)) path::RenameFile(fileName, fileName + badEnd);
-  if (path::DoesFileExist(sidecar)) path::RemoveFile(sidecar);
+  // file aside once more.
+  if (path::IsDirectory(String(sidecar.c_str()).c_str())) MoveAside(sidecar, stamp);
+  if (path::DoesFileExist(fileName)) MoveAside(file, stamp);
+  if (path::DoesFileExist(String(sidecar.c_str())) && zt::posix::Unlink(sidecar.c_str()) != 0) {
+    ZT_RAISE(PosixError());
+  }
+  zt::posix::SyncDirectoryOf(file.c_str());
+}
+
+CvlIniMgr::FileState CvlIniMgr::stateOfFile() const {
+  FileState state;
+  struct stat info;
+  ScopedFd file = zt::posix::LookUp(m_fileName.c_str());
+  if (!file || fstat(file.get(), &info) != 0) return state;
+  state.device = info.st_dev;
+  state.inode = info.st_ino;
+  state.sizeBytes = info.st_size;
+  state.modifiedSeconds = info.st_mtim.tv_sec;
+  state.modifiedNanoseconds = info.st_mtim.tv_nsec;
+  return state;
+}
+
+// Whether others are kept out, at the latest from now on.
+bool CvlIniMgr::ownsLock() {
+  if (m_lock->excludesOthers()) return true;
+  m_lockWasLost = true;
+  if (m_lock->retake()) return true;
+  vltTraceError("The lock of \"%s\" was lost, and another process has it: nothing is written",
+                m_fileName.c_str());
+  return false;
+}
+
+HRESULT CvlIniMgr::MakeSureOfLock() {
+  if (!ownsLock()) return E_FAIL;
+  if (!m_lockWasLost) return S_OK;
+  FileState now = stateOfFile();
+  if (!isUnchanged(now)) {
+    if (InitializeIniBindings() != 0) return E_FAIL;
+    m_known = now;
+    m_dirty = false;
+  }
+  m_lockWasLost = false;
+  return S_OK;
+}
+
+void CvlIniMgr::AbandonDocument() {
+  // Reachable, so that it is not reported as a leak.
+  static auto* abandoned = new std::vector<IniStructForwardReferenceTag*>;
+  abandoned->push_back(m_ini);
+  m_ini = nullptr;
+  m_dirty = false;
+  m_lockWasLost = true;
+  m_known = FileState();
+  InitializeIniBindings();
 }
 
 HRESULT CvlIniMgr::Write() {
   if (!m_dirty) return S_OK;
-  if (!m_ini) return E_FAIL;
-  return IniWriteToFile(m_ini, m_fileName.c_str()) == 0 ? S_OK : E_FAIL;
+  if (!m_ini || !ownsLock()) return E_FAIL;
+  // The changes may have been made to what the file no longer is.
+  if (m_lockWasLost && !isUnchanged(stateOfFile())) return E_FAIL;
+  int32_t status = IniWriteToFile(m_ini, m_fileName.c_str());
+  m_known = stateOfFile();
+  return status == 0 ? S_OK : E_FAIL;
 }
 
 HRESULT CvlIniMgr::DigestFile(unsigned char** digest) const {
-  ScopedFd fd = Open(m_fileName, O_RDONLY);
+  ScopedFd fd = OpenForReading(m_fileName);
   if (!fd.valid()) return E_FAIL;
   try {
     std::vector<unsigned char> data;

@@ -7,8 +7,7 @@
 
 #include "source/IniFileLock.h"
 #include "source/Utilities/vltTypes.h"
-
-struct IniStructForwardReferenceTag;
+#include "ztini/ztini.h"
 
 // The one door to a shared INI file.
 //
@@ -21,10 +20,11 @@ struct IniStructForwardReferenceTag;
 //   the file is missing                | made, with its directory, mode 0777; the object is dirty
 //   no digest expected, or it matches  | read
 //   the digest differs                 | throws 1; the file stays
-//   the file cannot be parsed          | throws 1; the file is renamed to NAME_mmddyyyy.bad over an
-//                                      | earlier one of that day, and the sidecar removed
+//   the file cannot be parsed          | throws 1; the file is renamed to NAME_mmddyyyy.bad, or
+//                                      | NAME_mmddyyyy.1.bad and so on after earlier ones of that
+//                                      | day, and the sidecar removed
 //   no memory; the file cannot be      | throws 1; the file stays
-//   opened                             |
+//   opened or read; above 256 MiB      |
 //
 // Results are S_OK, E_FAIL, E_POINTER for a null argument, E_OUTOFMEMORY. Names and values are
 // taken as they are: a line feed in a name or, without escapes, in a value breaks the file's lines.
@@ -41,11 +41,28 @@ class CvlIniMgr {
   CvlIniMgr(const CvlIniMgr&) = delete;
   CvlIniMgr& operator=(const CvlIniMgr&) = delete;
 
-  // Replaces the file if anything was changed since construction. A failure leaves the file.
+  // Makes sure that the lock still keeps other processes out: a fork, a host that closes all descriptors
+  // and a removed lock file each end it without a word. A lost lock is taken again without waiting; the
+  // file is read again if it is no longer what this object last read or wrote, and changes that were not
+  // written are dropped. To be called before a change of an object that lives long. E_FAIL, with the
+  // object as it was and a line in the log, where another process has the lock or the file cannot be
+  // read. One thread at a time.
+  HRESULT MakeSureOfLock();
+
+  // Whether the lock keeps other processes out at this moment. Takes nothing, changes nothing.
+  bool HoldsLock() const { return m_lock->excludesOthers(); }
+
+  // For a forked child whose copy of the document another thread was changing at the fork: reads the file
+  // again and leaves the copy, which may be in no state to be freed, where it is. Where the file cannot
+  // be read the object is empty, and MakeSureOfLock fails until it can.
+  void AbandonDocument();
+
+  // Replaces the file if anything was changed since construction. A failure leaves the file. E_FAIL also
+  // where the lock was lost and another process has it, or has changed the file since.
   HRESULT Write();
-  // Write, then the digest of the file as it stands, new[]; then reads the file anew, so that the
-  // object holds exactly what the file holds. Null on failure. Where the file cannot be read anew for
-  // want of memory or because it cannot be opened, the object keeps what it held.
+  // Write, then the digest of the file as it is, new[]; then reads the file again, so that the object
+  // holds exactly what the file holds. Null on failure. Where the file cannot be read again, for whatever
+  // reason, the object keeps what it held.
   HRESULT WriteAndGetChecksum(unsigned char** digest);
 
   // Copies the value to *out, which the caller provides and sizes.
@@ -65,16 +82,15 @@ class CvlIniMgr {
   HRESULT GetNthItemName(char const* section, int n, char** out) const;
   HRESULT GetNthItemName(char const* section, int n, std::string* out) const;
 
-  // With `durable` a Write returns when the medium has the file; otherwise a power cut, but no
-  // killed process, can lose it. Durable at first.
-  void SetDurable(bool durable);
+  // What a Write guarantees when it returns; Synced at first.
+  void SetDurability(IniDurability durability);
 
   // Path of the sidecar: the part from the last "." of the whole path on becomes ".vl5".
   static std::string SidecarName(const std::string& fileName);
 
-  // Renames the file, if it is there, to NAME_mmddyyyy.bad over an earlier one of that day, and does away
-  // with its sidecar. The caller holds the lock. Throws what zt::fnd::osdep::path throws; a directory
-  // in the sidecar's place that cannot be moved leaves the file.
+  // Renames the file, if it is there, to NAME_mmddyyyy.bad, with a number after the date where that is
+  // taken, and removes its sidecar. The caller holds the lock. Throws what zt::fnd::osdep::path throws;
+  // a directory in the sidecar's place that cannot be moved leaves the file.
   static void SetAside(const zt::fnd::String& fileName);
 
  private:
@@ -88,6 +104,18 @@ class CvlIniMgr {
   [[noreturn]] void CleanupAndThrow(bool setAside);
   HRESULT DigestFile(unsigned char** digest) const;
   void DisposeDocument();
+  bool ownsLock();
+
+  // Tells one state of the file from another without reading it.
+  struct FileState {
+    uint64_t device = 0, inode = 0;
+    int64_t sizeBytes = -1, modifiedSeconds = 0, modifiedNanoseconds = 0;
+    bool isKnown() const { return sizeBytes >= 0; }
+    bool operator==(const FileState&) const = default;
+  };
+  FileState stateOfFile() const;
+  // Whether that is the state in which this object last read or wrote the file.
+  bool isUnchanged(const FileState& now) const { return now.isKnown() && now == m_known; }
 
   IniStructForwardReferenceTag* m_ini = nullptr;
   std::string m_fileName;
@@ -95,6 +123,8 @@ class CvlIniMgr {
   bool m_dirty = false;
   bool m_saveOnDestroy;
   bool m_useEscapes;
-  bool m_durable = true;
+  IniDurability m_durability = IniDurability::Synced;
+  FileState m_known;           // of the file as it was last read or written
+  bool m_lockWasLost = false;  // and the file has not been compared with m_known since
   std::unique_ptr<IniFileLock> m_lock;
 };

@@ -2,17 +2,21 @@
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
 #include <filesystem>
+#include <iterator>
 #include <thread>
 
 #include "source/Common/vltFileSecurity.h"
 #include "source/IniSidecar.h"
 #include "source/TestIni.h"
 #include "tests/support/Child.h"
+#include "tests/support/FileSizeLimit.h"
+#include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
@@ -90,7 +94,9 @@ TEST(IniManager, AnUnparsableFileIsSetAsideWithItsSidecar) {
   EXPECT_EQ(Open(file), 1);
   EXPECT_FALSE(Exists(file));
   EXPECT_FALSE(Exists(dir / "x.vl5"));
-  EXPECT_EQ(ReadBytes(BadName(file)).substr(0, 2), "\xFF\xFE");
+  EXPECT_EQ(ReadBytes(BadName(file)), "an earlier one of the day");
+  std::string next = BadName(file);
+  EXPECT_EQ(ReadBytes(next.insert(next.size() - 4, ".1")).substr(0, 2), "\xFF\xFE");
   EXPECT_EQ(Open(file), 0);
 }
 
@@ -309,7 +315,7 @@ TEST(IniManager, AVanishedFileFailsTheDigestAndIsSavedAgain) {
   EXPECT_EQ(ReadBytes(file), "[s]\na = 1\nb = 2\n");
 }
 
-TEST(IniManager, AFileThatSpoiledMeanwhileEmptiesTheObject) {
+TEST(IniManager, AFileThatSpoiledMeanwhileLeavesTheObjectAsItWas) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na=1\n");
@@ -317,7 +323,7 @@ TEST(IniManager, AFileThatSpoiledMeanwhileEmptiesTheObject) {
   WriteBytes(file, "\xFF\xFE[");
   unsigned char* digest = nullptr;
   EXPECT_EQ(ini.WriteAndGetChecksum(&digest), E_FAIL);
-  EXPECT_EQ(Value(ini, "s", "a"), "(none)");
+  EXPECT_EQ(Value(ini, "s", "a"), "1");
 }
 
 TEST(IniManager, AFailedWriteLeavesFileAndDocument) {
@@ -326,8 +332,7 @@ TEST(IniManager, AFailedWriteLeavesFileAndDocument) {
   WriteBytes(file, "[s]\na=1\n");
   CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
   ini.SetItem("s", "a", "2", false);
-  // A directory where the temporary file would be: neither unlinked nor created.
-  dir.makeDir("x.TMP");
+  FileSizeLimit full(4);
   unsigned char* digest = nullptr;
   EXPECT_EQ(ini.WriteAndGetChecksum(&digest), E_FAIL);
   EXPECT_EQ(ReadBytes(file), "[s]\na=1\n");
@@ -338,6 +343,23 @@ TEST(IniManager, SidecarNameCutsAtTheLastPointOfTheWholePath) {
   EXPECT_EQ(CvlIniMgr::SidecarName("/d/vltjar.ini"), "/d/vltjar.vl5");
   EXPECT_EQ(CvlIniMgr::SidecarName("/d.x/file"), "/d.vl5");
   EXPECT_EQ(CvlIniMgr::SidecarName("/d/file"), "/d/file.vl5");
+}
+
+// Any user can make the file as large as the file system allows.
+TEST(IniManager, AFileThatIsTooLargeIsNotReadForItsDigest) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "");
+  ASSERT_EQ(truncate(file.c_str(), off_t{1} << 30), 0);
+  EXPECT_EQ(InChild([&] {
+              unsigned char digest[16] = {};
+              rusage before = {}, after = {};
+              getrusage(RUSAGE_SELF, &before);
+              EXPECT_THROW(CvlIniMgr(file.c_str(), false, digest, false, true), int);
+              getrusage(RUSAGE_SELF, &after);
+              EXPECT_LT(after.ru_maxrss - before.ru_maxrss, 100L << 10);  // in KiB
+            }),
+            0);
 }
 
 }  // namespace

@@ -13,11 +13,11 @@
 #include "zt/fnd/Vector.h"
 #include "zt/fnd/osdep/AtomicInt.h"
 
-// An ordered map with the lock that guards it.
+// An ordered map with the lock that guards it, also in a child that is forked during a change.
 template <class Key, class Value>
 struct CvlrProtectedMap {
   std::map<Key, Value> map;
-  mutable Toolyard::CztCS lock;
+  mutable Toolyard::CztForkSafeCS lock{50};
 };
 
 // Answers from a map of components in memory. Never created by itself: what Scan does, and all that

@@ -6,6 +6,7 @@
 
 #include <atomic>
 #include <thread>
+#include <vector>
 
 #include "source/Common/vltcmn.h"
 #include "source/Utilities/vltutils.h"

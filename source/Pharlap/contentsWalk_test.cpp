@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <utility>
+
 #include "source/vlIniMgr.h"
 #include "tests/support/TempDir.h"
 

@@ -11,6 +11,7 @@
 #include "zt/fnd/String.h"
 #include "ztcom/ztcore/ztmemmgr.h"
 #include "ztcom/ztcore/ztunknown.h"
+#include "ztini/StringTools.h"
 
 namespace registrar {
 
@@ -29,6 +30,15 @@ inline constexpr const char* kLastInstalledSchemaVersion = "LastInstalledSchemaV
 inline constexpr const char* kPrefix = "Prefix";
 inline constexpr const char* kPnp = "PnP";
 inline constexpr const char* kBindingClasses = "BINDING_CLASSES";
+
+// Whether a section of this name belongs to the database itself. A component of such a name would erase
+// or overlay what all others need.
+inline bool IsReserved(const std::string& section) {
+  for (const char* own : {kGlobalSection, kComponents, kRegistrations, kContents}) {
+    if (ztini_StrICmpWithoutSurrWhiteSpace(section.c_str(), own) == 0) return true;
+  }
+  return false;
+}
 
 // Record versions.
 inline constexpr uint32_t kDictionaryVersion = 2;

@@ -11,6 +11,7 @@
 #include "source/Common/vltFileSecurity.h"
 #include "source/Pharlap/TestRegistrar.h"
 #include "source/Pharlap/registrarText.h"
+#include "tests/support/FileSizeLimit.h"
 #include "tests/support/SaveCounter.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
@@ -50,14 +51,16 @@ TEST(RegistrarDatabase, AShortSidecarSetsTheDatabaseAsideAndTheNextStartWorks) {
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
 }
 
-TEST(RegistrarDatabase, ACopySetAsideEarlierThatDayIsOverwritten) {
+TEST(RegistrarDatabase, ACopySetAsideEarlierThatDayStays) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
   std::string contents = ReadBytes(i.database());
   WriteBytes(BadName(i), "stale");
   WriteBytes(i.sidecar(), "");
   ASSERT_EQ(StartOnce(i), 0);
-  EXPECT_EQ(ReadBytes(BadName(i)), contents);
+  EXPECT_EQ(ReadBytes(BadName(i)), "stale");
+  std::string next = BadName(i);
+  EXPECT_EQ(ReadBytes(next.insert(next.size() - 4, ".1")), contents);
 }
 
 TEST(RegistrarDatabase, WithoutASidecarTheFileIsTakenAsItIs) {
@@ -78,10 +81,11 @@ TEST(RegistrarDatabase, TheFirstSaveWritesTheMarkBeforeTheFile) {
   EXPECT_EQ(InChild([&] {
               LinuxStart r(i);
               unlink(i.sidecar().c_str());
-              std::filesystem::create_directories(i.root() + "/vlt.TMP/full");
-              EXPECT_LT(r->SetStorageServerCacheSize(5), 0);
+              {
+                FileSizeLimit markOnly(16);
+                EXPECT_LT(r->SetStorageServerCacheSize(5), 0);
+              }
               EXPECT_EQ(ReadBytes(i.sidecar()), "0000000000000000");
-              std::filesystem::remove_all(i.root() + "/vlt.TMP");
               EXPECT_EQ(r->SaveChanges(), S_OK);
               EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
             }),
@@ -108,14 +112,15 @@ TEST(RegistrarDatabase, AFailedSaveKeepsTheChangeInMemoryAndTheSidecarOld) {
   EXPECT_EQ(InChild([&] {
               LinuxStart r(i);
               std::string file = ReadBytes(i.database()), digest = ReadBytes(i.sidecar());
-              std::filesystem::create_directories(i.root() + "/vlt.TMP/full");
-              EXPECT_LT(r->SetStorageServerCacheSize(5), 0);
+              {
+                FileSizeLimit full(16);
+                EXPECT_LT(r->SetStorageServerCacheSize(5), 0);
+              }
               unsigned size = 0;
               EXPECT_EQ(r->GetStorageServerCacheSize(&size), S_OK);
               EXPECT_EQ(size, 5u);
               EXPECT_EQ(ReadBytes(i.database()), file);
               EXPECT_EQ(ReadBytes(i.sidecar()), digest);
-              std::filesystem::remove_all(i.root() + "/vlt.TMP");
               EXPECT_EQ(r->SaveChanges(), S_OK);
               EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "CacheSize"), "5");
             }),
@@ -234,4 +239,26 @@ TEST(RegistrarDatabase, TheParentRunsInitWhenTold) {
 }
 
 }  // namespace
+// Left by a killed scan, it would otherwise be taken up over what clients save later.
+TEST(RegistrarDatabase, ASecondNameThatAKilledScanLeftGoesWithTheNextStart) {
+  Installation i;
+  ASSERT_EQ(StartOnce(i), 0);
+  WriteBytes(i.database() + ".durable", ReadBytes(i.database()));
+  EXPECT_EQ(InChild([&] {
+              LinuxStart r(i);
+              EXPECT_FALSE(Exists(i.database() + ".durable"));
+            }),
+            0);
+}
+
+TEST(RegistrarDatabase, AScanLeavesNoSecondName) {
+  Installation i;
+  for (int n = 1; n < 5; ++n) {
+    i.addDictionary(("D" + std::to_string(n)).c_str(), ("Dict" + std::to_string(n)).c_str(),
+                    GText(n), 3, "d");
+  }
+  ASSERT_EQ(StartOnce(i), 0);
+  EXPECT_FALSE(Exists(i.database() + ".durable"));
+}
+
 }  // namespace vlt::test

@@ -61,22 +61,27 @@ bool HasPortConfiguration(const _vltStartupOptions* options) {
 }  // namespace
 
 HRESULT CvltPharlapRegistrar::RegisterDataDictionary(_vltComponent2* record) {
-  std::lock_guard hold(m_iniLock);
-  if (!m_registrationIni) return E_FAIL;
+  DatabaseHold hold(*this);
+  if (BeginChange() < 0) return E_FAIL;
   std::string section = Narrow(record->name);
+  if (IsReserved(section)) return E_FAIL;
   std::string identifier = Narrow(vlrGuidToString(record->identifier));
   if (StripBracesFromGuid(identifier.data()) == S_OK) identifier.resize(strlen(identifier.c_str()));
   const vltDictVariant& variant = record->dictionary;
+  HRESULT setResult =
+      m_registrationIni->SetItem(kComponents, section.c_str(), section.c_str(), true);
   auto set = [&](const char* item, const std::string& value, bool quote) {
-    m_registrationIni->SetItem(section.c_str(), item, value.c_str(), quote);
+    if (setResult < 0) return;
+    setResult = m_registrationIni->SetItem(section.c_str(), item, value.c_str(), quote);
   };
-  m_registrationIni->SetItem(kComponents, section.c_str(), section.c_str(), true);
   set(kIdentifier, identifier, true);
   set(kFileName, Narrow(record->fileName), true);
   set(kSchemaVersion, Decimal(variant.schemaVersion), false);
   set(kFragmentRegistered, Decimal(variant.fragmentRegistered), false);
   set(kLastInstalledSchemaVersion, Decimal(variant.lastInstalledSchemaVersion), false);
   set(kPrefix, Narrow(variant.prefix), true);
+  // A name that is empty, or no memory: what was not set is not saved as if it were.
+  if (setResult < 0) return setResult;
   HRESULT result = SaveChanges();
 
   CztHold holdMap(components().lock);
@@ -123,9 +128,10 @@ HRESULT CvltPharlapRegistrar::HasDDChanged(CvlIniMgr& fragment, const wchar_t* w
 }
 
 HRESULT CvltPharlapRegistrar::ResetDDUpdatedFlags() {
-  std::lock_guard hold(m_iniLock);
+  DatabaseHold hold(*this);
   HRESULT result = S_OK;
   bool modified = false;
+  if (m_registrationIni && BeginChange() < 0) return E_FAIL;
   int sections = m_registrationIni ? m_registrationIni->GetNumberOfSections() : 0;
   for (int n = 1; n <= sections; ++n) {
     std::string section, flag;

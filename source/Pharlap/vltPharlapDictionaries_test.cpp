@@ -4,10 +4,12 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <filesystem>
 
 #include "source/Common/vltcmn.h"
 #include "source/Pharlap/TestRegistrar.h"
+#include "tests/support/FileSizeLimit.h"
 #include "tests/support/SaveCounter.h"
 
 namespace vlt::test {
@@ -92,7 +94,7 @@ TEST(RegistrarDictionary, AFailedSaveIsTheResultAndMemoryIsUpToDateAllTheSame) {
   i.addDictionary("D", "Dict", GText(1), 3, "old");
   EXPECT_EQ(InChild([&] {
               LinuxStart r(i);
-              fs::create_directories(i.root() + "/vlt.TMP/full");
+              FileSizeLimit full(16);
               Offered d(vltComponentDataDictionary, L"Dict", G(1), L"/x", L"new");
               EXPECT_EQ(r->RegisterComponent(&d.value), E_FAIL);
               Received known;

@@ -65,22 +65,26 @@ HRESULT CvltPharlapRegistrar::Duplicate(_vltComponent2* target, const _vltCompon
 
 // ---- Registration
 
-std::string CvltPharlapRegistrar::WriteExpert(const _vltComponent2* record, GuidText guidText) {
+HRESULT CvltPharlapRegistrar::WriteExpert(const _vltComponent2* record, GuidText guidText,
+                                          std::string* name) {
   std::string section = Narrow(record->name);
+  *name = section;
+  if (IsReserved(section)) return E_FAIL;
   std::string identifier = Narrow(vlrGuidToString(record->identifier));
   if (guidText == GuidText::WithoutBraces && StripBracesFromGuid(identifier.data()) == S_OK) {
     identifier.resize(strlen(identifier.c_str()));
   }
   // The directory is dropped: the next start puts the expert where experts are.
   String file(record->fileName ? record->fileName : L"");
-  m_registrationIni->SetItem(kComponents, section.c_str(), section.c_str(), true);
-  m_registrationIni->SetItem(section.c_str(), kIdentifier, identifier.c_str(), true);
-  m_registrationIni->SetItem(section.c_str(), kFileName, Narrow(path::BaseName(file)).c_str(),
-                             true);
-  if (record->type == vltComponentResourceExpert) {
-    m_registrationIni->SetItem(section.c_str(), kPnp, Narrow(record->resource.pnp).c_str(), true);
-  }
-  return section;
+  HRESULT result = m_registrationIni->SetItem(kComponents, section.c_str(), section.c_str(), true);
+  auto set = [&](const char* item, const std::string& value) {
+    if (result >= 0)
+      result = m_registrationIni->SetItem(section.c_str(), item, value.c_str(), true);
+  };
+  set(kIdentifier, identifier);
+  set(kFileName, Narrow(path::BaseName(file)));
+  if (record->type == vltComponentResourceExpert) set(kPnp, Narrow(record->resource.pnp));
+  return result;
 }
 
 HRESULT CvltPharlapRegistrar::SaveExpert(const _vltComponent2* record) {
@@ -99,10 +103,11 @@ HRESULT CvltPharlapRegistrar::SaveExpert(const _vltComponent2* record) {
 }
 
 HRESULT CvltPharlapRegistrar::RegisterObjectExpert(_vltComponent2* record) {
-  std::lock_guard hold(m_iniLock);
-  if (!m_registrationIni) return E_FAIL;
-  WriteExpert(record, GuidText::WithoutBraces);
-  return SaveExpert(record);
+  DatabaseHold hold(*this);
+  if (BeginChange() < 0) return E_FAIL;
+  std::string section;
+  HRESULT result = WriteExpert(record, GuidText::WithoutBraces, &section);
+  return result < 0 ? result : SaveExpert(record);
 }
 
 HRESULT CvltPharlapRegistrar::RegisterResourceExpert(_vltComponent2* record) {

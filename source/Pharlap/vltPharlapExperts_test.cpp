@@ -7,6 +7,7 @@
 
 #include "source/Pharlap/TestRegistrar.h"
 #include "tests/support/AllocFailure.h"
+#include "tests/support/FileSizeLimit.h"
 #include "tests/support/SaveCounter.h"
 
 namespace vlt::test {
@@ -108,7 +109,7 @@ TEST(RegistrarExpert, AFailedSaveIsTheResultAndMemoryIsUpToDateAllTheSame) {
   i.addObjectExpert("E", "Obj", GText(1));
   EXPECT_EQ(InChild([&] {
               LinuxStart r(i);
-              fs::create_directories(i.root() + "/vlt.TMP/full");
+              FileSizeLimit full(16);
               Offered o(vltComponentObjectExpert, L"Obj", G(1), L"/x/new.vle");
               EXPECT_EQ(r->RegisterComponent(&o.value), E_FAIL);
               Received c;

@@ -3,6 +3,9 @@
 #include <string.h>
 #include <wchar.h>
 
+#include <functional>
+#include <utility>
+
 #include "source/Common/vltFileSecurity.h"
 #include "source/Common/vltcmn.h"
 #include "source/IniSidecar.h"
@@ -50,7 +53,9 @@ CvltPharlapRegistrar::CvltPharlapRegistrar(const String& registrationFilePath,
 }
 
 CvltPharlapRegistrar::~CvltPharlapRegistrar() {
-  m_registrationIni.reset();  // First of all, so that the lock is free for the next process.
+  if (m_registrationIni && m_durableCopy) finishDurableCopy();
+  // Before the rest, so that the lock is free for the next process.
+  m_registrationIni.reset();
   for (auto& [identifier, component] : components().map) {
     // The records' texts go whole here, whatever their names; a zeroed record leaves the object's
     // own destructor nothing to free.
@@ -75,18 +80,73 @@ HRESULT CvltPharlapRegistrar::QueryInterface(const GUID& iid, void** out) {
   return S_OK;
 }
 
+namespace {
+
+// Ends the scan's saves, however the scan ends: what they have replaced must be on disk even where the
+// constructor is left by an exception.
+class AtEnd {
+ public:
+  explicit AtEnd(std::function<void()> action) : m_action(std::move(action)) {}
+  ~AtEnd() { m_action(); }
+  AtEnd(const AtEnd&) = delete;
+  AtEnd& operator=(const AtEnd&) = delete;
+
+ private:
+  std::function<void()> m_action;
+};
+
+}  // namespace
+
 void CvltPharlapRegistrar::Init() {
   if (OpenIniWithValidation() < 0 || !m_registrationIni) return;
-  m_durable = false;
-  m_registrationIni->SetDurable(false);
+  m_durableCopy = std::make_unique<DurableCopy>(Narrow(m_registrationFilePath));
+  AtEnd end([this] { finishScan(); });
+  m_scanSaves = ScanSaves::None;
+  if (m_durableCopy->isLeft()) coverSaves();
+  update();
+}
+
+void CvltPharlapRegistrar::update() {
   initSettings();
   registerBuiltInDictionary();
   UpdateRegistrationFile();
   readComponents();
   m_resources.forget();
-  m_durable = true;
-  m_registrationIni->SetDurable(true);
-  if (m_saved) ztini_SyncFile(Narrow(m_registrationFilePath).c_str());
+}
+
+// The scan's saves become durable; later ones are durable each. A failure is met again by the next save.
+HRESULT CvltPharlapRegistrar::finishScan() {
+  ScanSaves saves = std::exchange(m_scanSaves, ScanSaves::NotScanning);
+  m_registrationIni->SetDurability(IniDurability::Synced);
+  if (saves == ScanSaves::Covered) return finishDurableCopy() ? S_OK : E_FAIL;
+  if (saves == ScanSaves::First || saves == ScanSaves::Synced) {
+    return m_durableCopy->syncDirectory() ? S_OK : E_FAIL;
+  }
+  return S_OK;
+}
+
+// Without the lock - in a child that was forked in the scan, or after the lock file was removed - the second
+// name may stand for another process's saves by now.
+bool CvltPharlapRegistrar::finishDurableCopy() {
+  if (m_registrationIni->HoldsLock()) return m_durableCopy->finish();
+  m_durableCopy->leave();
+  return false;
+}
+
+CvltPharlapRegistrar::DatabaseHold::DatabaseHold(CvltPharlapRegistrar& registrar)
+    : m_hold(registrar.m_iniLock) {
+  if (registrar.m_iniLock.takeInterrupted() && registrar.m_registrationIni) {
+    registrar.m_registrationIni->AbandonDocument();
+  }
+}
+
+void CvltPharlapRegistrar::ContinueInThisProcess() {
+  DatabaseHold hold(*this);
+  BeginChange();
+}
+
+HRESULT CvltPharlapRegistrar::BeginChange() {
+  return m_registrationIni ? m_registrationIni->MakeSureOfLock() : E_FAIL;
 }
 
 void CvltPharlapRegistrar::initSettings() {
@@ -130,39 +190,32 @@ HRESULT CvltPharlapRegistrar::OpenIniWithValidation() {
   std::string file = Narrow(m_registrationFilePath);
   // From the sidecar on: another process may be about to mend what this one would set aside.
   std::unique_ptr<IniFileLock> hold = IniFileLock::ForFile(file.c_str());
-  unsigned char* found = nullptr;
-  HRESULT result = GetChecksumForCacheFile(&found);
-  std::unique_ptr<unsigned char[]> digest(found);
+  IniSidecar::Digest digest;
+  // Nothing is known of a file that cannot be read now. It stays, and the caller may try again.
+  if (!DurableCopy::takeUp(file)) throw 1;
+  IniSidecar::State state = IniSidecar::Read(sidecarName(), &digest);
+  if (state == IniSidecar::State::Unreadable) state = IniSidecar::Read(sidecarName(), &digest);
+  if (state == IniSidecar::State::Unreadable) throw 1;
+  bool isShort = state == IniSidecar::State::Short;
+  const unsigned char* expected = state == IniSidecar::State::Present ? digest.data() : nullptr;
   try {
-    if (result < 0) DeleteIniFile();
-    if (result == S_FALSE) result = S_OK;
-    m_registrationIni = std::make_unique<CvlIniMgr>(file.c_str(), false, digest.get(), false, true);
+    if (isShort) DeleteIniFile();
+    m_registrationIni = std::make_unique<CvlIniMgr>(file.c_str(), false, expected, false, true);
   } catch (...) {
     // Whatever it was: a digest that differs, a file that has just been set aside, a failure that
     // may have passed. The second opening takes the file as it is, and its failure counts.
     m_registrationIni = std::make_unique<CvlIniMgr>(file.c_str(), false, nullptr, false, true);
   }
-  return result;
+  return isShort ? E_FAIL : S_OK;
 }
 
 std::string CvltPharlapRegistrar::sidecarName() const {
   return CvlIniMgr::SidecarName(Narrow(m_registrationFilePath));
 }
 
-HRESULT CvltPharlapRegistrar::GetChecksumForCacheFile(unsigned char** digest) {
-  *digest = nullptr;
-  try {
-    return IniSidecar::Read(sidecarName(), digest);
-  } catch (const std::bad_alloc&) {
-    throw;  // Says nothing of the sidecar: the database must not be set aside for it.
-  } catch (const std::exception&) {
-    return E_FAIL;  // A sidecar that cannot be read for any reason is an unusable one.
-  }
-}
-
 HRESULT CvltPharlapRegistrar::SetChecksumForCacheFile(const unsigned char* digest) {
   try {
-    return IniSidecar::Write(sidecarName(), digest, m_durable);
+    return IniSidecar::Write(sidecarName(), digest, m_scanSaves == ScanSaves::NotScanning);
   } catch (const std::exception&) {
     return E_FAIL;  // The database stands; only its digest is old, which the next opening survives.
   }
@@ -172,8 +225,7 @@ bool CvltPharlapRegistrar::ChecksumFileExists() {
   try {
     return path::DoesFileExist(Widen(sidecarName()));
   } catch (const std::exception&) {
-    return false;  // Not to be seen is not there: the mark is written, or fails, and that is
-                   // ignored.
+    return false;  // An inaccessible sidecar counts as missing; a failed write of the mark is ignored.
   }
 }
 
@@ -186,10 +238,40 @@ HRESULT CvltPharlapRegistrar::DeleteIniFile() {
   }
 }
 
+// From here on the second name of the database stands for the scan's saves, where it can be made.
+void CvltPharlapRegistrar::coverSaves() {
+  bool covered = m_registrationIni->HoldsLock() && m_durableCopy->begin();
+  m_scanSaves = covered ? ScanSaves::Covered : ScanSaves::Synced;
+  m_registrationIni->SetDurability(covered ? IniDurability::None : IniDurability::ContentOnly);
+}
+
+// Decides how durable the next save is. The first one of a scan is on disk before it takes its name, as
+// most starts make no other. From the second one on the second name of the database stands for all.
+bool CvltPharlapRegistrar::prepareSave() {
+  switch (m_scanSaves) {
+    case ScanSaves::NotScanning:
+      if (m_durableCopy == nullptr) return true;
+      // A scan's end that failed, or another process's scan that was killed while this one had lost the lock.
+      if (m_durableCopy->isLeft()) m_durableCopy->begin();
+      return m_durableCopy->finish();
+    case ScanSaves::None:
+      m_scanSaves = ScanSaves::First;
+      m_registrationIni->SetDurability(IniDurability::ContentOnly);
+      return true;
+    case ScanSaves::First:
+      coverSaves();
+      return true;
+    case ScanSaves::Covered:
+    case ScanSaves::Synced:
+      break;
+  }
+  return true;
+}
+
 HRESULT CvltPharlapRegistrar::SaveChanges() {
   if (!m_registrationIni) return S_OK;
   m_resources.forget();
-  m_saved = true;
+  if (!prepareSave()) return E_FAIL;
   // Without the mark, a crash in the first save would leave a database that looks as if it had
   // never had a sidecar, and so cannot be told from a whole one.
   if (!ChecksumFileExists()) SetChecksumForCacheFile(IniSidecar::kInvalidMark);
@@ -218,7 +300,7 @@ constexpr const wchar_t* kBareConfiguration = L"config3.vlt";
 
 HRESULT CvltPharlapRegistrar::GetSchemaVersion(unsigned int* version) {
   if (!version) return E_POINTER;
-  std::lock_guard hold(m_iniLock);
+  DatabaseHold hold(*this);
   *version = Setting(m_registrationIni.get(), kSchemaVersion, 0);
   return S_OK;
 }
@@ -231,8 +313,8 @@ HRESULT CvltPharlapRegistrar::setAndSave(const char* key, const char* value, boo
 }
 
 HRESULT CvltPharlapRegistrar::SetSchemaVersion(unsigned int version) {
-  std::lock_guard hold(m_iniLock);
-  if (!m_registrationIni) return E_FAIL;
+  DatabaseHold hold(*this);
+  if (BeginChange() < 0) return E_FAIL;
   std::string present;
   if (m_registrationIni->GetItem(kGlobalSection, kSchemaVersion, &present) >= 0 &&
       !present.empty() && Number(present) == version) {
@@ -243,14 +325,14 @@ HRESULT CvltPharlapRegistrar::SetSchemaVersion(unsigned int version) {
 
 HRESULT CvltPharlapRegistrar::GetStorageServerCacheSize(unsigned int* sizeBytes) {
   if (!sizeBytes) return E_POINTER;
-  std::lock_guard hold(m_iniLock);
+  DatabaseHold hold(*this);
   *sizeBytes = Setting(m_registrationIni.get(), kCacheSize, kDefaultCacheSizeBytes);
   return S_OK;
 }
 
 HRESULT CvltPharlapRegistrar::SetStorageServerCacheSize(unsigned int sizeBytes) {
-  std::lock_guard hold(m_iniLock);
-  if (!m_registrationIni) return E_FAIL;
+  DatabaseHold hold(*this);
+  if (BeginChange() < 0) return E_FAIL;
   return setAndSave(kCacheSize, Decimal(sizeBytes).c_str(), false);
 }
 
@@ -261,7 +343,7 @@ HRESULT CvltPharlapRegistrar::dataDirectory(String* directory) {
 HRESULT CvltPharlapRegistrar::GetConfigurationPath(wchar_t** path) {
   if (!path) return E_POINTER;
   *path = nullptr;
-  std::lock_guard hold(m_iniLock);
+  DatabaseHold hold(*this);
   std::string stored;
   if (!m_registrationIni || m_registrationIni->GetItem(kGlobalSection, kConfigFile, &stored) < 0 ||
       stored.empty()) {
@@ -278,8 +360,8 @@ HRESULT CvltPharlapRegistrar::GetConfigurationPath(wchar_t** path) {
 
 HRESULT CvltPharlapRegistrar::SetConfigurationPath(const wchar_t* path) {
   if (!path) return E_POINTER;
-  std::lock_guard hold(m_iniLock);
-  if (!m_registrationIni) return E_FAIL;
+  DatabaseHold hold(*this);
+  if (BeginChange() < 0) return E_FAIL;
   std::string stored;
   if (m_registrationIni->GetItem(kGlobalSection, kConfigFile, &stored) >= 0 && !stored.empty() &&
       Widen(stored) == path) {

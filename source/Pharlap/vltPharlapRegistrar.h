@@ -2,16 +2,17 @@
 
 #include <map>
 #include <memory>
-#include <mutex>
 #include <set>
 #include <string>
 
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/Common/vltBindingClasses.h"
+#include "source/DurableCopy.h"
 #include "source/Pharlap/contentsWalk.h"
 #include "source/vlIniMgr.h"
 #include "source/vltRegistrar.h"
 #include "zt/fnd/AbsTime.h"
+#include "zt/fnd/osdep/ForkSafeMutex.h"
 
 // Keeps the components in one guarded INI file, the registration database, and in memory.
 //
@@ -21,8 +22,13 @@
 // registrar waits for the first one's end.
 //
 // Each changed registration file is saved on its own, so that a start that is killed has done what
-// it has done. The scan does not wait for the medium: all of it can be had again from the
-// registration files; one wait stands at the end. Saves that a client asks for are durable each.
+// it has done. The scan waits for the disk a few times in all (source/DurableCopy.h). Saves that a client
+// asks for are durable each.
+//
+// The lock can be lost: by a fork, by a host that closes all descriptors, by a cleaner that removes the
+// lock file. Every operation that changes the database makes sure of it first (CvlIniMgr::MakeSureOfLock)
+// and fails with E_FAIL, nothing written, where another process has the database now. What is answered
+// from memory is answered all the same.
 //
 // Threads: any after Init. m_iniLock orders the operations that use the database, and is taken
 // before the map's lock.
@@ -63,6 +69,10 @@ class CvltPharlapRegistrar : public CvltRegistrar,
 
   ~CvltPharlapRegistrar() override;
   HRESULT Scan() override { return S_OK; }
+
+  // For the first use in a process that did not make the object: takes the database's lock again, if no
+  // other process has it.
+  void ContinueInThisProcess();
 
   // ---- Behind Scan, in the order of the dispatch table.
   HRESULT ResetDDUpdatedFlags() override;
@@ -110,12 +120,15 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   // the file system refuses, and what the second opening throws, passes.
   void Init();
   HRESULT ReadSection(const wchar_t* section, EmptyFileName emptyFileName);
-  // The items that every expert has; answers the section's name.
-  std::string WriteExpert(const _vltComponent2* record, GuidText guidText);
+  // Sets the items that every expert has, in the section *name. E_FAIL for a reserved name, or where an
+  // item cannot be set; then nothing may be saved.
+  HRESULT WriteExpert(const _vltComponent2* record, GuidText guidText, std::string* name);
   HRESULT SaveExpert(const _vltComponent2* record);
   void AddBindingClasses(const _vltComponent2* record, const CvltBindingClasses& classes);
   HRESULT SaveChanges();
   bool isOpen() const { return m_registrationIni != nullptr; }
+  // S_OK if the database is open and the lock held: the change may be made. E_FAIL.
+  HRESULT BeginChange();
   CvlIniMgr& database() { return *m_registrationIni; }
 
   // By exact comparison of the file's path, unlike the String's own.
@@ -127,12 +140,28 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   std::map<zt::fnd::String, std::unique_ptr<CvltBindingClasses>, ExactLess> m_bindingClassesByFile;
   // Texts of the database as it is on the disk.
   vltStringResources m_resources;
-  std::recursive_mutex m_iniLock;
+  // Orders the operations that use the database.
+  zt::fnd::osdep::ForkSafeMutex m_iniLock{zt::fnd::osdep::AtFork::Wait, 40};
+
+  // Holds m_iniLock for a scope. In a child that was forked while another thread was inside, the document
+  // may be half changed: it is read from the file again.
+  class DatabaseHold {
+   public:
+    explicit DatabaseHold(CvltPharlapRegistrar& registrar);
+
+   private:
+    zt::fnd::osdep::ForkSafeHold m_hold;
+  };
 
  private:
   HRESULT OpenIniWithValidation();
+  void update();
+  HRESULT finishScan();
+  bool finishDurableCopy();
+  bool prepareSave();
+  void coverSaves();
+  bool openFragment(const char* file);
   HRESULT DeleteIniFile();
-  HRESULT GetChecksumForCacheFile(unsigned char** digest);
   HRESULT SetChecksumForCacheFile(const unsigned char* digest);
   bool ChecksumFileExists();
   HRESULT ProcessFileName(bool isDictionary, const zt::fnd::String& installDirectory,
@@ -157,10 +186,14 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   zt::fnd::String m_installDirectory;
   zt::fnd::String m_registrationFilePath;
   std::unique_ptr<CvlIniMgr> m_registrationIni;
-  bool m_durable = true;
-  bool m_saved = false;
-  // Whether the last registration file could be opened at all.
-  bool m_lastMergeOpened = false;
+  // The scan's saves: none, the first, those that the second name of the database covers.
+  enum class ScanSaves { NotScanning, None, First, Covered, Synced };
+  ScanSaves m_scanSaves = ScanSaves::NotScanning;
+  std::unique_ptr<DurableCopy> m_durableCopy;
+  // Whether the scan has dropped entries that no file can stand for: those must not come back.
+  bool m_droppedPlanted = false;
+  // The registration file that is about to be merged, if it is open.
+  std::unique_ptr<CvlIniMgr> m_fragment;
   // Registration files that FindRegistrationFiles has seen: asked for once a start is enough.
   std::set<std::string> m_filesSeen;
   ContentsFiles m_contentsFiles;

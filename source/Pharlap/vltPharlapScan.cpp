@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <utility>
 
 #include "source/Common/vltFileSecurity.h"
 #include "source/Pharlap/contentsWalk.h"
@@ -43,9 +44,15 @@ bool CanBeItemName(const std::string& text) {
          text.find('=') == std::string::npos && !HasLineEnd(text);
 }
 
-// Nothing can be found at the path, now or later: no entry, a file where a directory should be, or
-// links that go in circles.
-bool NamesNothing(int error) { return error == ENOENT || error == ENOTDIR || error == ELOOP; }
+// Nothing can be found at the path, now or later: no entry, a file where a directory should be, links
+// that go in circles, or a name that no file can have.
+bool NamesNothing(int error) {
+  return error == ENOENT || error == ENOTDIR || error == ELOOP || error == ENAMETOOLONG;
+}
+
+// Another user's bundle that this user may not enter. It is none of this process's business, and must
+// not keep it from the others.
+bool MayNotLook(int error) { return error == EACCES || error == EPERM; }
 
 // Time of the last change, in whole seconds, if the path names a regular file. One look answers
 // both whether the file is there and how old it is. A bundle that is no directory, or has something
@@ -55,7 +62,7 @@ bool RegistrationTime(const String& file, zt::fnd::AbsTime* time) {
   struct stat info;
   if (stat(AnsiString(file).c_str(), &info) != 0) {
     int error = errno;
-    if (NamesNothing(error)) return false;
+    if (NamesNothing(error) || MayNotLook(error)) return false;
     ZT_RAISE(zt::fnd::osdep::PosixError(error));
   }
   if (!S_ISREG(info.st_mode)) return false;
@@ -78,13 +85,18 @@ void ListBundles(const String& directory, const String& mask,
   }
 }
 
-// True if the path names a regular file; what keeps the look from being taken is raised.
+// True if the path names a regular file, or may do so where this user may not look: what was registered
+// from there stays. A relative path names no registration file, wherever it came from. Other failures are
+// raised.
 bool FileIsThere(const std::string& file) {
+  if (!path::IsAbs(Widen(file))) return false;
   try {
     return path::DoesFileExist(Widen(file));
   } catch (const zt::fnd::osdep::PosixError& error) {
+    int code = static_cast<int>(error.whatcode());
+    if (MayNotLook(code)) return true;
     // The bundle may have been replaced by a file of its name, or by a link to itself.
-    if (!NamesNothing(static_cast<int>(error.whatcode()))) throw;
+    if (!NamesNothing(code)) throw;
     return false;
   }
 }
@@ -120,7 +132,7 @@ void CvltPharlapRegistrar::eraseComponentsOf(const std::string& file) {
   for (const ContentsItem& item : contents) {
     if (!SameName(item.file, file.c_str())) continue;
     m_contentsFiles.forget();  // Of two items of one name the second shows when the first is gone.
-    m_registrationIni->EraseSection(item.component.c_str());
+    if (!IsReserved(item.component)) m_registrationIni->EraseSection(item.component.c_str());
     m_registrationIni->EraseItem(kComponents, item.component.c_str());
     // Of an item in pieces only the last piece goes. The others are met again, and point to the
     // component that is about to be merged once more.
@@ -146,17 +158,20 @@ HRESULT CvltPharlapRegistrar::UpdateRegistrationFile() {
     auto ticks = static_cast<uint64_t>(time.toLKTIME(true));
     auto low = static_cast<uint32_t>(ticks), high = static_cast<uint32_t>(ticks >> 32);
     if (isRegistered(narrow, low, high)) continue;
+    bool opened = openFragment(narrow.c_str());
+    // A file that could not be opened just now keeps its components and its old stamp, so that the next
+    // start tries again. One that cannot be used has been set aside, and is not met again.
+    if (!opened && FileIsThere(narrow)) continue;
     eraseComponentsOf(narrow);
-    HRESULT merged = MergeRegistrationFile(directory, narrow.c_str());
-    // A file that could not be opened just now keeps its old stamp, so that the next start tries
-    // again. One that cannot be used has been set aside, and is not met again.
-    if (merged == E_FAIL && FileIsThere(narrow) && !m_lastMergeOpened) continue;
+    if (opened) MergeRegistrationFile(directory, narrow.c_str());
+    m_fragment.reset();
     std::string stamp = Decimal(low) + " " + Decimal(high);
     m_registrationIni->SetItem(kRegistrations, narrow.c_str(), stamp.c_str(), true);
     SaveChanges();
   }
   HRESULT result = RemoveDeletedComponents();
   m_filesSeen.clear();
+  if (std::exchange(m_droppedPlanted, false)) SaveChanges();
   return result;
 }
 
@@ -196,18 +211,21 @@ void CvltPharlapRegistrar::mergeItem(CvlIniMgr& fragment, const String& installD
   }
 }
 
-HRESULT CvltPharlapRegistrar::MergeRegistrationFile(const String& installDirectory,
-                                                    const char* file) {
-  m_lastMergeOpened = false;
-  std::unique_ptr<CvlIniMgr> fragment;
+bool CvltPharlapRegistrar::openFragment(const char* file) {
   try {
-    fragment = std::make_unique<CvlIniMgr>(file, false, nullptr, false, true);
+    m_fragment = std::make_unique<CvlIniMgr>(file, false, nullptr, false, true);
+    return true;
   } catch (...) {
     // A file that cannot be parsed has been set aside by its manager already. Any other reason - no
     // memory, no descriptor - says nothing about the file, which stays.
-    return E_FAIL;
+    return false;
   }
-  m_lastMergeOpened = true;
+}
+
+HRESULT CvltPharlapRegistrar::MergeRegistrationFile(const String& installDirectory,
+                                                    const char* file) {
+  if (!m_fragment && !openFragment(file)) return E_FAIL;
+  std::unique_ptr<CvlIniMgr> fragment = std::move(m_fragment);
   HRESULT result = S_OK;
   int sections = fragment->GetNumberOfSections();
   for (int s = 1; s <= sections; ++s) {
@@ -215,6 +233,12 @@ HRESULT CvltPharlapRegistrar::MergeRegistrationFile(const String& installDirecto
     if (fragment->GetNthSectionName(s, &section) < 0) continue;
     // Written without a header, so that its items would fall to whichever section stands before.
     if (section == kHeaderless) continue;
+    // A component that is named like a section of the database itself must not overlay it. The list of
+    // components is one of those, and is extended.
+    if (IsReserved(section) && !SameName(section, kComponents) &&
+        fragment->ItemExists(kComponents, section.c_str()) >= 0) {
+      continue;
+    }
     bool changed = true;
     result = HasDDChanged(*fragment, Widen(section).c_str(), changed);
     int items = fragment->GetNumberOfItems(section.c_str());
@@ -235,7 +259,8 @@ void CvltPharlapRegistrar::RemoveComponentsIfFileDoesNotExist(char* section, cha
                                                               Vector<String>& eraseList, int first,
                                                               int last) {
   if (m_filesSeen.count(file) || FileIsThere(file)) return;
-  m_registrationIni->EraseSection(section);
+  if (!path::IsAbs(Widen(file))) m_droppedPlanted = true;
+  if (!IsReserved(section)) m_registrationIni->EraseSection(section);
   m_registrationIni->EraseItem(kComponents, section);
   std::string whole = file;
   size_t separator = whole.rfind('\\');

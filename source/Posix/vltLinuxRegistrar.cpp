@@ -24,10 +24,11 @@ HRESULT CvltLinuxRegistrar::ReadComponent(const wchar_t* section) {
   return ReadSection(section, EmptyFileName::IsNone);
 }
 
-void CvltLinuxRegistrar::writeBindingClasses(const std::string& section,
-                                             const _vltComponent2* record) {
+HRESULT CvltLinuxRegistrar::writeBindingClasses(const std::string& section,
+                                                const _vltComponent2* record) {
   auto found = m_bindingClassesByFile.find(String(record->fileName ? record->fileName : L""));
-  if (found == m_bindingClassesByFile.end()) return;
+  HRESULT result = S_OK;
+  if (found == m_bindingClassesByFile.end()) return result;
   Vector<GUID> components = found->second->GetComponentVector();
   for (unsigned k = 0; k < components.size(); ++k) {
     if (!(components[k] == record->identifier)) continue;
@@ -40,16 +41,19 @@ void CvltLinuxRegistrar::writeBindingClasses(const std::string& section,
       if (k >= classes.size()) ZT_RAISE(zt::fnd::exception::OutOfRange());
       text += ":" + Narrow(vlrGuidToString(classes[k]));
     }
-    database().SetItem(section.c_str(), kBindingClasses, text.c_str(), true);
+    HRESULT set = database().SetItem(section.c_str(), kBindingClasses, text.c_str(), true);
+    if (result >= 0) result = set;
   }
+  return result;
 }
 
 HRESULT CvltLinuxRegistrar::RegisterObjectExpert(_vltComponent2* record) {
-  std::lock_guard hold(m_iniLock);
-  if (!isOpen()) return E_FAIL;
-  std::string section = WriteExpert(record, GuidText::WithBraces);
-  writeBindingClasses(section, record);
-  return SaveExpert(record);
+  DatabaseHold hold(*this);
+  if (BeginChange() < 0) return E_FAIL;
+  std::string section;
+  HRESULT result = WriteExpert(record, GuidText::WithBraces, &section);
+  if (result >= 0) result = writeBindingClasses(section, record);
+  return result < 0 ? result : SaveExpert(record);
 }
 
 HRESULT CvltLinuxRegistrar::RegisterResourceExpert(_vltComponent2* record) {

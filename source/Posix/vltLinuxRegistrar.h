@@ -21,6 +21,6 @@ class CvltLinuxRegistrar : public CvltPharlapRegistrar {
   HRESULT PopulateBindingClasses(_vltComponent2* record) override;
 
  private:
-  void writeBindingClasses(const std::string& section, const _vltComponent2* record);
+  HRESULT writeBindingClasses(const std::string& section, const _vltComponent2* record);
   void addIfOwn(const _vltComponent2* record, const CvltBindingClasses& classes);
 };

@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
+
 #include "source/Pharlap/TestRegistrar.h"
 #include "tests/support/SaveCounter.h"
 #include "zt/fnd/Exception.h"

@@ -28,7 +28,7 @@ void StartTracer() {
   vlReadTracerOptions(options.get(), "vlt", severity, target, &threshold);
   vlTracer::Initialize(static_cast<vlTracer::SeverityLevel>(severity),
                        static_cast<vlTracer::TraceTarget>(target), directory.c_str(),
-                       static_cast<long>(threshold));
+                       vlTracer::Threshold(threshold));
   if (vlTracer::gs_traceMask & vlTracer::kSeverityLoad) {
     vlt_vlTracer::TraceOutput(' ', "vltutils: Process attach", false);
   }

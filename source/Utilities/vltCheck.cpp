@@ -53,8 +53,8 @@ HRESULT TellOfFile(vltErrors& errors, const wchar_t* word, const wchar_t* file, 
 constexpr const char* kMissing = "does not exist";
 constexpr const char* kUnreadable = "is not readable";
 
-// A relative path is nowhere: dictionaries keep their prefix in a field that is checked as a file. What
-// keeps the system from looking says nothing of the file, and is the caller's to hear.
+// A relative path is nowhere: dictionaries keep their prefix in a field that is checked as a file. Throws
+// what keeps the system from looking.
 bool IsThere(const wchar_t* file) {
   if (!path::IsPathAbsolute(file)) return false;
   try {
@@ -68,12 +68,13 @@ bool IsThere(const wchar_t* file) {
 }  // namespace
 
 HRESULT CheckFileExistence(const wchar_t* file, const wchar_t* word, vltErrors& errors) {
-  if (!IsThere(file)) return TellOfFile(errors, word, file, kMissing);
   try {
+    if (!IsThere(file)) return TellOfFile(errors, word, file, kMissing);
     BinaryFile(String(file), BinaryFile::Mode::Read, false).close();
     return S_OK;
   } catch (const zt::fnd::osdep::OSException&) {
-    return TellOfFile(errors, word, file, kUnreadable);  // what the check is there to tell
+    // What the check is there to find. Raised, it would cost the caller all other messages.
+    return TellOfFile(errors, word, file, kUnreadable);
   }
 }
 

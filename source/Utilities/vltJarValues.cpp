@@ -1,4 +1,5 @@
 // What stands in the jar: the server's process, cookie and identity, and the offline endpoints.
+#include <errno.h>
 #include <stdio.h>
 #include <stdlib.h>
 
@@ -9,6 +10,7 @@
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Files.h"
 
 using vltjar::Narrow;
 using zt::fnd::String;
@@ -52,6 +54,10 @@ HRESULT PrepareDataDirectory(String& dataDir) {
   }
 }
 
+bool DirectoryIsUnknown(const String& directory) {
+  return !zt::posix::LookUp(Narrow(directory.c_str()).c_str()) && zt::posix::IsPassing(errno);
+}
+
 // Runs `use` on the opened jar, if there is one to be had.
 template <class Use>
 HRESULT WithJar(const wchar_t* jar, Use use) {
@@ -65,7 +71,9 @@ HRESULT WithPreparedJar(String& dataDir, Use use) {
   HRESULT result = PrepareDataDirectory(dataDir);
   if (result < 0) return result;
   std::unique_ptr<wchar_t[]> jar(GetJarFilePath());
-  if (!jar) return result;  // The directory stays absent: there is nothing to read or to keep.
+  // The directory stays absent: there is nothing to read or to keep. One that cannot be looked at for the
+  // moment is not absent, and what it holds must not be reported as missing.
+  if (!jar) return DirectoryIsUnknown(dataDir) ? E_FAIL : result;
   return WithJar(jar.get(), [&](CvlIniMgr& ini) { return use(jar.get(), ini); });
 }
 
@@ -81,7 +89,11 @@ HRESULT SetAndSave(const wchar_t* jar, CvlIniMgr& ini, const char* section, cons
 
 String vltjar::ExistingDataDirectory() {
   String directory = DataDirectory();
-  return path::IsDirectory(directory.c_str()) ? directory : String();
+  // Twice: a failure of the machine, which may have passed, must not be taken for "not there".
+  for (int attempt = 0; attempt < 2; ++attempt) {
+    if (path::IsDirectory(directory.c_str())) return directory;
+  }
+  return String();
 }
 
 wchar_t* GetJarFilePath() {
@@ -101,9 +113,10 @@ HRESULT RemoveOfflineStorageInfo(const String&, CvlIniMgr*) { return E_FAIL; }
 HRESULT vltAddSvrProcessIDToJar(const wchar_t* section, long processID) {
   String dataDir;
   return WithPreparedJar(dataDir, [&](const wchar_t* jar, CvlIniMgr& ini) {
-    ini.SetItem(Narrow(section).c_str(), "ServerProcessID", std::to_string(processID).c_str(),
-                false);
-    return VltjarSaveChanges(jar, &ini);
+    // The section is the caller's: a name that no section can have is not kept.
+    HRESULT result = ini.SetItem(Narrow(section).c_str(), "ServerProcessID",
+                                 std::to_string(processID).c_str(), false);
+    return result < 0 ? result : VltjarSaveChanges(jar, &ini);
   });
 }
 

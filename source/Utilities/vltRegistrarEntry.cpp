@@ -1,7 +1,6 @@
 // How a client reaches the one registrar of the process.
 #include "source/Utilities/vltRegistrarEntry.h"
 
-#include <mutex>
 #include <new>
 #include <string>
 
@@ -11,35 +10,50 @@
 #include "source/Utilities/vltTestHook.h"
 #include "source/Utilities/vltutils.h"
 #include "vlloader/source/vlloader.h"
-#include "zt/fnd/osdep/CriticalSection.h"
+#include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/LeakedInstance.h"
+#include "zt/fnd/osdep/ProcessMark.h"
 #include "zt/fnd/osdep/SharedLibrary.h"
 #include "zt/fnd/osdep/path.h"
 #include "ztcom/ztcore/ztcom.h"
 
 using zt::fnd::String;
+using zt::fnd::osdep::AtFork;
+using zt::fnd::osdep::ForkSafeHold;
+using zt::fnd::osdep::ForkSafeMutex;
+using zt::fnd::osdep::LeakedInstance;
 
 namespace {
 
-// Made on first use and never destroyed, like the registrar itself: other libraries ask for it from
-// their exit handlers.
-zt::fnd::osdep::CriticalSection& RegistrarGuard() {
-  static auto* g_RegistrarGuard = new zt::fnd::osdep::CriticalSection;
-  return *g_RegistrarGuard;
-}
+// Never destroyed, like the registrar itself: other libraries ask for it from their exit handlers.
+// The locks here are held while the registrar waits for other processes, so that no fork may wait for
+// them in turn.
+struct RegistrarGuard {
+  ForkSafeMutex lock{AtFork::Renew, 10};
+};
 
 // The process-wide registrar, and the lock of its creation: two first calls would otherwise make
 // two, and the second would wait for the first one's database for ever. Recursive, so that a call
 // from inside the creation can be told apart from one of another thread.
 struct Creation {
-  std::recursive_mutex lock;
+  ForkSafeMutex lock{AtFork::Renew, 20};
   bool inProgress = false;
   IvltRegistrar* s_LinuxRegistrar = nullptr;  // with one reference that is never released
+  CvltLinuxRegistrar* object = nullptr;       // the same
+  zt::fnd::osdep::ProcessMark process;        // the one that made it, or went on with it last
 };
 
-Creation& TheCreation() {
-  static auto* creation = new Creation;
-  return *creation;
-}
+// Holds the creation's lock. In a child that was forked while another thread was making the registrar
+// nothing has begun: what that thread has made so far is left as it is, out of sight.
+class CreationHold {
+ public:
+  explicit CreationHold(Creation& creation) : m_hold(creation.lock) {
+    if (creation.lock.takeInterrupted()) creation.inProgress = false;
+  }
+
+ private:
+  ForkSafeHold m_hold;
+};
 
 class InProgress {
  public:
@@ -56,7 +70,7 @@ bool LookUp(const char* failure, std::string* directory) {
   try {
     *directory = vlLookUpInstallDirectory();
     return true;
-  } catch (const std::bad_alloc&) {
+  } catch (const std::exception&) {
     vltTraceError("%s", failure);  // The caller has a result for this, and nothing was begun yet.
     return false;
   }
@@ -68,12 +82,12 @@ constexpr const char* kGetRegistrar2Signature =
 }  // namespace
 
 void vlPrepareRegistrarEntry() {
-  RegistrarGuard();
-  TheCreation();
+  LeakedInstance<RegistrarGuard>();
+  LeakedInstance<Creation>();
 }
 
 HRESULT vltGetRegistrar(IvltRegistrar** out) {
-  zt::fnd::osdep::CriticalSectionGuard hold(RegistrarGuard());
+  ForkSafeHold hold(LeakedInstance<RegistrarGuard>().lock);
   std::string installDirectory, dataDirectory;
   if (!LookUp("Could not get the VLT install path in vltGetRegistrar", &installDirectory) ||
       !LookUp("Could not get the VLT data path in vltGetRegistrar", &dataDirectory)) {
@@ -90,8 +104,8 @@ HRESULT vltGetRegistrar2(const wchar_t* registrationFile, const wchar_t* install
   if (!registrationFile) return vltGetRegistrar(out);
   if (!out) return E_POINTER;
   *out = nullptr;
-  Creation& creation = TheCreation();
-  std::lock_guard hold(creation.lock);
+  Creation& creation = LeakedInstance<Creation>();
+  CreationHold hold(creation);
   if (creation.inProgress) return E_FAIL;
   if (!creation.s_LinuxRegistrar) {
     CvltLinuxRegistrar* created = nullptr;
@@ -101,8 +115,15 @@ HRESULT vltGetRegistrar2(const wchar_t* registrationFile, const wchar_t* install
           CvltLinuxRegistrar(String(registrationFile), String(installDir ? installDir : L""));
     }
     if (!created) return vltReportOutOfMemory(kGetRegistrar2Signature);
+    creation.object = created;
+    creation.process = zt::fnd::osdep::ProcessMark::Current();
+    // Last: a child that another thread forks in between finds it whole or not at all.
     created->QueryInterface(IID_IvltRegistrar,
                             reinterpret_cast<void**>(&creation.s_LinuxRegistrar));
+  } else if (!creation.process.isCurrent()) {
+    // A forked child has the registrar, but not its lock.
+    creation.object->ContinueInThisProcess();
+    creation.process = zt::fnd::osdep::ProcessMark::Current();
   }
   *out = ZtAddRef(creation.s_LinuxRegistrar);
   return S_OK;

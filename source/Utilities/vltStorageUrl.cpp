@@ -2,7 +2,8 @@
 #include <string.h>
 #include <wchar.h>
 
-#include <mutex>
+#include <atomic>
+#include <memory>
 #include <string>
 
 #include "source/Common/vltcmn.h"
@@ -24,16 +25,10 @@ constexpr const wchar_t* kLocalHost = L"127.0.0.1:";
 constexpr const char* kDefaultEndpoint = "61900";
 constexpr const wchar_t* kOfflineMarker = L"VLTOFFLINESTORAGE=";
 
-// The answer of the first call, which stays whatever the file says later.
-struct LocalServer {
-  std::mutex lock;
-  std::wstring endpoint;
-};
-
-LocalServer& TheLocalServer() {
-  static auto* server = new LocalServer;
-  return *server;
-}
+// The answer of the first call, which stays whatever the file says later; never freed. Without a lock,
+// which a forked child could find held: of two first calls at once each reads the file, and the
+// answer of one counts.
+constinit std::atomic<const std::wstring*> s_localServer{nullptr};
 
 // The port of the settings file; empty if the file cannot be opened.
 HRESULT ReadPort(std::string* port) {
@@ -49,20 +44,26 @@ HRESULT ReadPort(std::string* port) {
   return result;
 }
 
+// The answer that counts, which is this one unless another thread has settled one.
+const std::wstring* Settled(const std::wstring& answer) {
+  auto mine = std::make_unique<const std::wstring>(answer);
+  const std::wstring* settled = nullptr;
+  if (s_localServer.compare_exchange_strong(settled, mine.get())) settled = mine.release();
+  return settled;
+}
+
 }  // namespace
 
 HRESULT vltGetLocalConfigurationURL(wchar_t** url) {
   if (!url) return E_FAIL;  // Not E_POINTER: callers know it so.
-  LocalServer& server = TheLocalServer();
-  std::lock_guard hold(server.lock);
   HRESULT result = S_OK;
-  if (server.endpoint.empty()) {
-    server.endpoint = kLocalHost;
+  const std::wstring* endpoint = s_localServer;
+  if (!endpoint) {
     std::string port;
     result = ReadPort(&port);
-    server.endpoint += String(port.c_str()).c_str();
+    endpoint = Settled(kLocalHost + std::wstring(String(port.c_str()).c_str()));
   }
-  vltDuplicateString2(server.endpoint.c_str(), url);
+  vltDuplicateString2(endpoint->c_str(), url);
   return result;
 }
 

@@ -4,7 +4,6 @@
 #include <string.h>
 
 #include <atomic>
-#include <mutex>
 #include <new>
 #include <set>
 #include <string>
@@ -13,6 +12,8 @@
 #include "source/vlIniMgr.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/String.h"
+#include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/LeakedInstance.h"
 #include "zt/fnd/osdep/Sleep.h"
 #include "zt/fnd/osdep/StringCompare.h"
 #include "zt/fnd/osdep/path.h"
@@ -33,11 +34,15 @@ constinit std::atomic<uint32_t> hangTimeInMSecs{kForever};
 constinit std::atomic<const char*> currentHookName{""};
 
 // A copy that stays for good; one for each name, as a process may refresh as often as it likes.
+struct KeptNames {
+  zt::fnd::osdep::ForkSafeMutex lock{zt::fnd::osdep::AtFork::Wait, 70};
+  std::set<std::string> names;
+};
+
 const char* Kept(const std::string& name) {
-  static auto* names = new std::set<std::string>;
-  static std::mutex lock;
-  std::lock_guard hold(lock);
-  return names->insert(name).first->c_str();
+  KeptNames& kept = zt::fnd::osdep::LeakedInstance<KeptNames>();
+  zt::fnd::osdep::ForkSafeHold hold(kept.lock);
+  return kept.names.insert(name).first->c_str();
 }
 
 bool IsTrue(const CvlIniMgr& ini, const char* key) {
@@ -108,6 +113,8 @@ constexpr uint32_t kSmallChunk = 0x20000;
 constexpr uint32_t kLargestGrowingChunkWords = 100000000;
 
 struct Exhaustion {
+  // Held as long as there is memory, which no fork should wait for.
+  zt::fnd::osdep::ForkSafeMutex lock{zt::fnd::osdep::AtFork::Renew, 70};
   uint32_t s_chunkSize = 1;  // in units of kChunkUnitBytes
   bool s_increaseChunkSize = true;
   uint32_t s_entryNum = 0;
@@ -140,9 +147,8 @@ bool Shrink(Exhaustion& state) {
 }  // namespace
 
 void exhaustMemory() {
-  static Exhaustion state;
-  static std::mutex lock;
-  std::lock_guard hold(lock);
+  Exhaustion& state = zt::fnd::osdep::LeakedInstance<Exhaustion>();
+  zt::fnd::osdep::ForkSafeHold hold(state.lock);
   ++state.s_entryNum;
   uint32_t limit = state.s_entryNum == 1 || state.s_increaseChunkSize ? 10 : 1000;
   uint32_t i = 0;

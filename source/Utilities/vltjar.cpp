@@ -50,14 +50,17 @@ HRESULT VltjarOpenIniWithValidation(const wchar_t* file, CvlIniMgr** out) {
   std::string narrow = Narrow(file);
   // From the sidecar on: another process may be about to mend what this one would set aside.
   std::unique_ptr<IniFileLock> hold = IniFileLock::ForFile(narrow.c_str());
-  unsigned char* found = nullptr;
-  HRESULT status = VltjarGetChecksumForCacheFile(file, &found);
-  std::unique_ptr<unsigned char[]> digest(found);
-  if (status == S_FALSE) status = S_OK;
+  IniSidecar::Digest digest;
+  IniSidecar::State state = IniSidecar::Read(SidecarOf(file), &digest);
+  if (state == IniSidecar::State::Unreadable) state = IniSidecar::Read(SidecarOf(file), &digest);
+  // Nothing is known of the file then. It stays, and the caller may try again.
+  if (state == IniSidecar::State::Unreadable) return E_FAIL;
+  HRESULT status = state == IniSidecar::State::Short ? E_FAIL : S_OK;
   CvlIniMgr* created = nullptr;
   try {
-    if (status < 0 && status != E_OUTOFMEMORY) VltjarDeleteIniFile(file);
-    created = Create(vlt::hook::kJarOpen, narrow, digest.get());
+    if (status < 0) VltjarDeleteIniFile(file);
+    created = Create(vlt::hook::kJarOpen, narrow,
+                     state == IniSidecar::State::Present ? digest.data() : nullptr);
   } catch (...) {
     // Whatever it was - a digest that differs, a file that has just been set aside, a shortage that
     // may have passed - the file is taken as it is now, and a failure of that counts.
@@ -107,7 +110,8 @@ bool VltjarChecksumFileExists(const wchar_t* file) {
   try {
     return path::DoesFileExist(String(SidecarOf(file).c_str()));
   } catch (const zt::fnd::exception::Exception&) {
-    return false;  // Not to be seen is not there: the mark is written, or fails, and that is ignored.
+    // An inaccessible sidecar counts as missing; a failed write of the mark is ignored.
+    return false;
   }
 }
 

@@ -10,7 +10,7 @@
 //   OfflineStorageSection   NextEndpt           next candidate port, 61901 to 62100 in a circle
 //   OfflineStorageSection   a storage's name    its endpoint; written by others
 //
-// Every change is one critical section among all processes, and on the medium when its call returns.
+// Every change is one critical section among all processes, and on disk when its call returns.
 // Results are those of the save; E_FAIL without an install directory or the right to make its data
 // directory. Where the data directory stays absent a function does nothing and returns 0.
 // Lock order: the settings file before the jar.
@@ -26,10 +26,10 @@ wchar_t* GetJarFilePath();
 
 // ---- Guarded files of the rendezvous: the jar and the settings files.
 
-// Opens the file, checked against its sidecar. *out may be set although the result is negative: that
-// tells that the sidecar was unusable and the file was begun anew. A digest that differs costs
-// nothing; a file that cannot be parsed is set aside. Throws what the second opening throws, the int 1
-// of CvlIniMgr included.
+// Opens the file, checked against its sidecar. *out may be set although the result is negative: the
+// sidecar was short, and the file was begun again. A digest that differs costs nothing; a file that
+// cannot be parsed is set aside. E_FAIL and null where the sidecar cannot be read at the moment: nothing
+// is set aside for that. Throws what the second opening throws, the int 1 of CvlIniMgr included.
 HRESULT VltjarOpenIniWithValidation(const wchar_t* path, CvlIniMgr** out);
 // The same, owned. Without an object the result is negative.
 HRESULT VltjarOpen(const wchar_t* path, std::unique_ptr<CvlIniMgr>* out);
@@ -38,8 +38,8 @@ HRESULT VltjarSaveChanges(const wchar_t* path, CvlIniMgr* ini);
 // Sets the file aside and removes its sidecar. E_FAIL if the system refuses, E_UNEXPECTED otherwise.
 HRESULT VltjarDeleteIniFile(const wchar_t* path);
 bool VltjarChecksumFileExists(const wchar_t* path);
-// S_OK and a new[] digest; S_FALSE if there is none; E_FAIL if it is short. E_OUTOFMEMORY, which says
-// nothing of the sidecar: an opening that meets it sets nothing aside, and takes the file as it is.
+// S_OK and a new[] digest; S_FALSE if there is none; E_FAIL if it is short or cannot be read;
+// E_OUTOFMEMORY.
 HRESULT VltjarGetChecksumForCacheFile(const wchar_t* path, unsigned char** digest);
 HRESULT VltjarSetChecksumForCacheFile(const wchar_t* path, const unsigned char* digest);
 

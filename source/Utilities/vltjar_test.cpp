@@ -18,6 +18,8 @@
 #include "source/Utilities/vltutils.h"
 #include "tests/support/BuildModule.h"
 #include "tests/support/Child.h"
+#include "tests/support/FailSystemCall.h"
+#include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
 
 namespace {
@@ -118,10 +120,20 @@ TEST_F(Jar, ProcessIdMakesTheDataDirectory) {
             "[Server A]\nServerProcessID = 4711\n\n[CookieSection]\nLastServerCookie = 3\n\n");
 }
 
-TEST_F(Jar, AnEmptySectionNameSavesAndSucceeds) {
-  EXPECT_EQ(
-      run([] { return vltAddSvrProcessIDToJar(L"", 1) | vltAddSvrProcessIDToJar(nullptr, 1); }), 0);
+// No section has an empty name, so nothing is kept, and what was kept before stays.
+TEST_F(Jar, AProcessIdThatCannotBeSetFails) {
+  EXPECT_EQ(run([] {
+              return vltAddSvrProcessIDToJar(L"", 1) == E_FAIL &&
+                             vltAddSvrProcessIDToJar(nullptr, 1) == E_FAIL
+                         ? 0
+                         : 1;
+            }),
+            0);
   EXPECT_EQ(ReadBytes(jar()), "");
+  EXPECT_EQ(run([] { return vltAddSvrProcessIDToJar(L"A", 7); }), 0);
+  EXPECT_EQ(run([] { return vltAddSvrProcessIDToJar(L"", 1) == E_FAIL ? 0 : 1; }), 0);
+  EXPECT_EQ(ReadBytes(jar()), "[A]\nServerProcessID = 7\n\n");
+  expectSealed();
 }
 
 TEST_F(Jar, IdentityNeedsItsLibraryAndLeavesNoKey) {
@@ -317,12 +329,15 @@ TEST_F(GuardedFile, ADirectoryInTheSidecarsPlaceCostsTheFileOnce) {
 TEST_F(GuardedFile, WithADirectoryThatCannotBeMovedTheFileStays) {
   WriteBytes(file, "[s]\na=1\n");
   WriteBytes(dir.makeDir("x.vl5") + "/inside", "kept");
-  std::filesystem::create_directories(BadName(dir / "x.vl5") + "/in the way");
-  for (int opening = 0; opening < 2; ++opening) {
-    EXPECT_EQ(open(), E_FAIL);
-    EXPECT_EQ(value("s", "a"), "1");
-    ini.reset();
-  }
+  EXPECT_EQ(InChild([&] {
+              ASSERT_TRUE(FailSystemCall(SYS_renameat2, EACCES));
+              for (int opening = 0; opening < 2; ++opening) {
+                EXPECT_EQ(open(), E_FAIL);
+                EXPECT_EQ(value("s", "a"), "1");
+                ini.reset();
+              }
+            }),
+            0);
   EXPECT_FALSE(Exists(BadName(file)));
 }
 

@@ -16,6 +16,13 @@
 //    where a shared file cannot be opened, as the int 1. A call that ends so has released its locks.
 // 6. Threads. Every function may be called from every thread, unless told otherwise.
 // 7. Waiting. Calls that open a shared file wait, without limit, for other processes that have it.
+// 8. Saving. What a call has saved when it returns S_OK survives a kill and a power cut. A call that
+//    changes the registration database makes sure that the process still has the database's lock, which
+//    a fork, a host that closes all descriptors or a removed lock file takes from it. A lost lock is
+//    taken again without waiting; where another process has it the call is E_FAIL and writes nothing.
+//    Questions are answered from memory all the same.
+// 9. Forks. A forked child may call every function, also one of a process with many threads. It has the
+//    parent's registrar, and its lock from the first change on that no other process has it.
 
 #include "source/Common/ZtUtils/General/vlt_vlTracer.h"
 #include "source/Utilities/vltInterfaces.h"
@@ -49,10 +56,9 @@ VLT_EXPORT HRESULT vltLoadDataDictionaries();
 VLT_EXPORT HRESULT vltLoadDataDictionaries2(IvltRegistrar* registrar);
 
 // Checks the files and entry points of one component, or of all for the null GUID. *errors walks the
-// messages and is handed out also when the result is a failure, but for E_POINTER, E_OUTOFMEMORY and a
-// registrar that cannot be had. Loads the libraries of experts into this process, and unloads them. A
-// path that the system does not let it look at raises PosixError (a directory that is closed to the
-// user, a name too long).
+// messages and is returned also when the result is a failure, but for E_POINTER, E_OUTOFMEMORY and a
+// registrar that cannot be made. Loads the libraries of experts into this process, and unloads them. A
+// path that the system does not let it look at is reported as not readable.
 VLT_EXPORT HRESULT vltCheckComponent(vltID id, IEnumString** errors);
 // vltGetRegistrar for a null storage or the default one; E_FAIL for others. The same function twice.
 VLT_EXPORT HRESULT vltGetNamedRegistrar(const wchar_t* storage, IvltRegistrar** out);

@@ -6,6 +6,9 @@
 #include <vector>
 
 #include "vlloader/source/Preference.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/posix/Files.h"
 #include "ztini/ztini.h"
 
 namespace {
@@ -48,8 +51,12 @@ struct Dispose {
   void operator()(IniStructForwardReferenceTag* document) const { IniDispose(document); }
 };
 
-// The file may well be there: the process or the machine has nothing left to open it with.
-bool IsExhaustion(int error) { return error == ENOMEM || error == EMFILE || error == ENFILE; }
+// The machine could not read the file at this moment: it may well be there.
+void RaiseIfUnknown(int32_t status, int error) {
+  bool exhausted = error == ENOMEM || error == EMFILE || error == ENFILE;
+  if (status == kIniOutOfMemory || exhausted) throw std::bad_alloc();
+  if (zt::posix::IsPassing(error)) ZT_RAISE(zt::fnd::osdep::PosixError(error));
+}
 
 std::optional<std::string> ReadItem(const std::string& file, const std::string& key) {
   constexpr int32_t kQuotesOfBothKinds = 2 | 4;
@@ -59,9 +66,7 @@ std::optional<std::string> ReadItem(const std::string& file, const std::string& 
   errno = 0;
   int32_t status = IniReadFromFile(document.get(), file.c_str());
   // Not "no value", which would lead a process to another installation for its whole life.
-  if (status == kIniOutOfMemory || (status == kIniCannotOpen && IsExhaustion(errno))) {
-    throw std::bad_alloc();
-  }
+  if (status < 0) RaiseIfUnknown(status, errno);
   if (status < 0) return std::nullopt;
   const char* value = nullptr;
   if (IniGetPointerToRawString(document.get(), "Preferences", key.c_str(), &value) != 1) {

@@ -4,12 +4,18 @@
 #include <stdio.h>
 
 #include <memory>
-#include <mutex>
 
 #include "vlloader/source/Preference.h"
 #include "vlloader/source/StorageModule.h"
 #include "zt/fnd/String.h"
+#include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/LeakedInstance.h"
 #include "ztcom/ztcore/ztunknown.h"
+
+using zt::fnd::osdep::AtFork;
+using zt::fnd::osdep::ForkSafeHold;
+using zt::fnd::osdep::ForkSafeMutex;
+using zt::fnd::osdep::LeakedInstance;
 
 namespace {
 
@@ -37,7 +43,7 @@ struct Entries {
 };
 
 struct Loader {
-  std::recursive_mutex lock;
+  ForkSafeMutex lock{AtFork::Wait, 30};
   bool pathInitialized = false;
   bool loadTried = false;
   int loads = 0;
@@ -53,13 +59,27 @@ struct Loader {
   Entries entries;
 };
 
-// Made at the first use and never destroyed: host programs call in from their own exit handlers.
-Loader& TheLoader() {
-  static Loader* loader = new Loader;
-  return *loader;
-}
+Loader& TheLoader() { return LeakedInstance<Loader>(); }
 
-using Hold = std::lock_guard<std::recursive_mutex>;
+// Holds the loader. A child that was forked while another thread was loading or unloading, for longer
+// than a fork waits, starts with nothing loaded. What is half changed is left as it is, out of reach.
+class Hold {
+ public:
+  explicit Hold(Loader& loader) : m_hold(loader.lock) {
+    if (loader.lock.takeInterrupted()) Forget(loader);
+  }
+
+ private:
+  static void Forget(Loader& l) {
+    l.pathInitialized = l.loadTried = l.inEffect = false;
+    l.loads = l.users = 0;
+    (void)l.storage.release();
+    (void)l.utilities.release();
+    l.entries = Entries();
+  }
+
+  ForkSafeHold m_hold;
+};
 
 const char* NullIfEmpty(const std::string& text) { return text.empty() ? nullptr : text.c_str(); }
 
@@ -108,7 +128,7 @@ void Init(Loader& l) {
 // The entries after a load was counted, for a call outside the lock.
 Entries LoadedEntries() {
   Loader& l = TheLoader();
-  Hold hold(l.lock);
+  Hold hold(l);
   Init(l);
   return l.entries;
 }
@@ -127,7 +147,7 @@ void* Configuration(bool present, int* status, Call call) {
 
 const char* Path() {
   Loader& l = TheLoader();
-  Hold hold(l.lock);
+  Hold hold(l);
   PathInit(l);
   return NullIfEmpty(l.path);
 }
@@ -154,7 +174,7 @@ const char* GetCurrentKorVersion() { return Path(), ""; }
 
 HRESULT KorInitialize() {
   Loader& l = TheLoader();
-  Hold hold(l.lock);
+  Hold hold(l);
   if (l.inEffect) {
     if (l.users < kSaturated) ++l.users;
     return S_OK;
@@ -168,7 +188,7 @@ HRESULT KorInitialize() {
 
 HRESULT KorFinalize() {
   Loader& l = TheLoader();
-  Hold hold(l.lock);
+  Hold hold(l);
   if (!l.inEffect) return E_FAIL;
   if (--l.users != 0) {
     if (l.users > kSaturated - 2) l.users = kSaturated;
@@ -182,7 +202,7 @@ HRESULT KorFinalize() {
 
 void KorCleanup() {
   Loader& l = TheLoader();
-  Hold hold(l.lock);
+  Hold hold(l);
   if (--l.loads != 0) return;
   l.loadTried = false;
   l.storage.reset();
@@ -212,7 +232,7 @@ void* GetKorConfigurationEx(_vltStartupOptions* options, int* status) {
 
 bool IsKorStoragePresent() {
   Loader& l = TheLoader();
-  Hold hold(l.lock);
+  Hold hold(l);
   Init(l);
   return l.storage && l.utilities;
 }

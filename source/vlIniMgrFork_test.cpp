@@ -1,0 +1,174 @@
+// Guarded files whose lock an object has lost, or has never had in this process: by fork(), by a host that
+// closes descriptors, by a cleaner of the lock directory.
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <stdlib.h>
+#include <sys/file.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "source/TestIni.h"
+#include "source/Utilities/vltjar.h"
+#include "tests/support/Child.h"
+#include "tests/support/InChild.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/osdep/Retry.h"
+#include "zt/fnd/osdep/ScopedFd.h"
+
+namespace {
+
+using namespace vlt::test;
+
+class IniManagerFork : public testing::Test {
+ protected:
+  IniManagerFork() : file(dir / "x.ini") { ini = opened(); }
+
+  std::unique_ptr<CvlIniMgr> opened() const {
+    return std::make_unique<CvlIniMgr>(file.c_str(), false, nullptr, false, true);
+  }
+
+  // As an object that lives long makes a change.
+  static HRESULT Save(CvlIniMgr& ini, const char* item, const char* value) {
+    HRESULT result = ini.MakeSureOfLock();
+    if (result >= 0) result = ini.SetItem("s", item, value, true);
+    return result < 0 ? result : ini.Write();
+  }
+
+  // In another process, which has the file as it is on the disk.
+  void expectOnDisk(const char* item, const char* value) const {
+    EXPECT_EQ(InChild([&] {
+                auto fresh = opened();
+                EXPECT_EQ(Value(*fresh, "s", item), value) << item;
+              }),
+              0);
+  }
+
+  std::string lockFile() const {
+    return std::string(getenv("ZTFNDTMPSHAREDFILEDIR")) + "/mutex/" +
+           zt::fnd::AnsiString(IniFileLock::NameForFile(file.c_str())).c_str();
+  }
+
+  TempDir dir;
+  std::string file;
+  std::unique_ptr<CvlIniMgr> ini;
+};
+
+TEST_F(IniManagerFork, AChildOfALivingHolderIsRefusedAndReads) {
+  ASSERT_EQ(Save(*ini, "parent", "1"), S_OK);
+  std::string before = ReadBytes(file);
+  EXPECT_EQ(InChild([&] {
+              EXPECT_EQ(Save(*ini, "child", "1"), E_FAIL);
+              unsigned char* digest = nullptr;
+              ini->SetItem("s", "child", "2", true);
+              EXPECT_EQ(ini->WriteAndGetChecksum(&digest), E_FAIL);
+              EXPECT_EQ(digest, nullptr);
+              EXPECT_EQ(Value(*ini, "s", "parent"), "1");
+            }),
+            0);
+  EXPECT_EQ(ReadBytes(file), before);
+  EXPECT_EQ(Save(*ini, "parent", "2"), S_OK);
+  ini.reset();
+  expectOnDisk("parent", "2");
+  expectOnDisk("child", "(none)");
+}
+
+TEST_F(IniManagerFork, AChildThatOutlivesTheHolderKeepsWhatTheHolderSavedLast) {
+  ASSERT_EQ(Save(*ini, "parent", "1"), S_OK);
+  Signal gone, saved, end;
+  Child child([&] {
+    if (!gone.await()) return 1;
+    if (Save(*ini, "child", "1") != S_OK) return 2;
+    saved.notify();
+    return end.await() ? 0 : 3;
+  });
+  EXPECT_EQ(Save(*ini, "parent", "2"), S_OK);
+  ini.reset();
+  gone.notify();
+  ASSERT_TRUE(saved.await());
+  // The lock is the child's from its save on.
+  zt::fnd::osdep::ScopedFd fd(open(lockFile().c_str(), O_RDWR | O_CLOEXEC));
+  EXPECT_NE(zt::fnd::osdep::Flock(fd.get(), LOCK_EX | LOCK_NB), 0);
+  fd.reset();
+  end.notify();
+  EXPECT_EQ(child.wait(), 0);
+  expectOnDisk("parent", "2");
+  expectOnDisk("child", "1");
+}
+
+TEST_F(IniManagerFork, WhatAnotherProcessSavedWhileTheLockWasLostStays) {
+  ASSERT_EQ(Save(*ini, "first", "1"), S_OK);
+  std::filesystem::remove(lockFile());
+  Signal saved, end;
+  Child other([&] {
+    auto mine = opened();
+    if (Save(*mine, "other", "1") != S_OK) return 1;
+    saved.notify();
+    return end.await() ? 0 : 2;
+  });
+  ASSERT_TRUE(saved.await());
+  std::string before = ReadBytes(file);
+  EXPECT_EQ(Save(*ini, "refused", "1"), E_FAIL);
+  EXPECT_EQ(ReadBytes(file), before);
+  EXPECT_EQ(Value(*ini, "s", "first"), "1");
+  end.notify();
+  EXPECT_EQ(other.wait(), 0);
+  EXPECT_EQ(Save(*ini, "second", "1"), S_OK);
+  ini.reset();
+  for (const char* item : {"first", "other", "second"}) expectOnDisk(item, "1");
+  expectOnDisk("refused", "(none)");
+}
+
+// The same through the jar's own opening and saving, sidecar included.
+TEST_F(IniManagerFork, AJarIsNotSavedByAChildOfItsHolder) {
+  ini.reset();
+  zt::fnd::String name(file.c_str());
+  std::unique_ptr<CvlIniMgr> jar;
+  ASSERT_EQ(VltjarOpen(name.c_str(), &jar), S_OK);
+  ASSERT_EQ(jar->SetItem("s", "parent", "1", true), S_OK);
+  ASSERT_EQ(VltjarSaveChanges(name.c_str(), jar.get()), S_OK);
+  std::string sidecar = CvlIniMgr::SidecarName(file);
+  std::string before = ReadBytes(file), digestBefore = ReadBytes(sidecar);
+  EXPECT_EQ(InChild([&] {
+              jar->SetItem("s", "child", "1", true);
+              EXPECT_LT(VltjarSaveChanges(name.c_str(), jar.get()), 0);
+            }),
+            0);
+  EXPECT_EQ(ReadBytes(file), before);
+  EXPECT_EQ(ReadBytes(sidecar), digestBefore);
+}
+
+// A thread may have any number of objects of one file, in a child as in its parent.
+TEST_F(IniManagerFork, TheObjectsOfAThreadShareTheLockThatAChildTakes) {
+  auto second = opened();
+  Signal gone;
+  Child child([&] {
+    if (!gone.await()) return 1;
+    if (Save(*ini, "first", "1") != S_OK) return 2;
+    if (Save(*second, "second", "1") != S_OK) return 3;
+    ini.reset();
+    return Save(*second, "third", "1") == S_OK ? 0 : 4;
+  });
+  second.reset();
+  ini.reset();
+  gone.notify();
+  EXPECT_EQ(child.wait(), 0);
+  for (const char* item : {"first", "second", "third"}) expectOnDisk(item, "1");
+}
+
+// An object without a document must not pass for one that holds what the file holds.
+TEST_F(IniManagerFork, AnAbandonedDocumentIsReadAsSoonAsItsFileCanBe) {
+  ASSERT_EQ(Save(*ini, "a", "1"), S_OK);
+  std::string hidden = dir / "hidden";
+  std::filesystem::rename(file, hidden);
+  ini->AbandonDocument();
+  EXPECT_EQ(ini->MakeSureOfLock(), E_FAIL);
+  std::filesystem::rename(hidden, file);
+  EXPECT_EQ(ini->MakeSureOfLock(), S_OK);
+  EXPECT_EQ(Value(*ini, "s", "a"), "1");
+  EXPECT_EQ(Save(*ini, "b", "2"), S_OK);
+  ini.reset();
+  expectOnDisk("a", "1");
+}
+
+}  // namespace
