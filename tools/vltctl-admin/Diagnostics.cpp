@@ -1,14 +1,19 @@
 // trace and hook: where the log goes, and which fault is armed.
 #include <stdio.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <filesystem>
-#include <fstream>
+#include <iterator>
 #include <map>
+#include <sstream>
+#include <stdexcept>
+#include <system_error>
 
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/Utilities/vltHookPoints.h"
 #include "source/vlIniMgr.h"
+#include "tools/common/Terminal.h"
 #include "tools/vltctl-admin/Reading.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/String.h"
@@ -18,7 +23,11 @@ namespace {
 
 namespace fs = std::filesystem;
 
+using vltctl::ForTerminal;
+using zt::fnd::osdep::ScopedFd;
+
 constexpr size_t kLastLines = 10;
+constexpr size_t kTailSize = 256 * 1024;  // a line of the log has at most 2,047 bytes
 
 std::string Narrow(const zt::fnd::String& text) { return zt::fnd::AnsiString(text).c_str(); }
 
@@ -32,20 +41,37 @@ Row Option(const Document& document, const char* key, const char* fallback) {
   return {key, fallback, "built-in default"};
 }
 
-// The log whose name sorts last: names begin with the time of the start.
+// The log whose name sorts last: names begin with the time of the start. Other users can
+// put pipes, devices and links there by such a name; only a regular file is a log.
 std::string NewestLog(const std::string& directory) {
   std::string newest;
   std::error_code ignored;
   for (const auto& entry : fs::directory_iterator(directory, ignored)) {
     std::string name = entry.path().filename();
-    if (name.find("-vlTracer-") != std::string::npos) newest = std::max(newest, name);
+    std::error_code gone;
+    if (name.find("-vlTracer-") == std::string::npos) continue;
+    if (fs::is_regular_file(entry.symlink_status(gone))) newest = std::max(newest, name);
   }
   return newest;
 }
 
+// The last bytes of the file, as many as the last lines can have: what a log has grown to does not count.
+std::string Tail(const std::string& file) {
+  std::string error, bytes(kTailSize, '\0');
+  ScopedFd fd = OpenRegular(file, &error);
+  off_t size = fd.valid() ? lseek(fd.get(), 0, SEEK_END) : -1;
+  if (size < 0) return "";
+  off_t begin = std::max<off_t>(0, size - static_cast<off_t>(kTailSize));
+  ssize_t got = pread(fd.get(), bytes.data(), bytes.size(), begin);
+  bytes.resize(got > 0 ? static_cast<size_t>(got) : 0);
+  if (begin == 0) return bytes;
+  size_t whole = bytes.find('\n');  // The line that the tail begins in is not whole.
+  return whole == std::string::npos ? bytes : bytes.substr(whole + 1);
+}
+
 std::vector<std::string> LastLines(const std::string& file) {
   std::vector<std::string> lines;
-  std::ifstream in(file);
+  std::istringstream in(Tail(file));
   for (std::string line; std::getline(in, line);) {
     lines.push_back(line);
     if (lines.size() > kLastLines) lines.erase(lines.begin());
@@ -71,7 +97,9 @@ int Trace(bool json) {
   }
   Print(rows, false);
   if (newest.empty()) return kGood;
-  for (const std::string& line : LastLines(directory + newest)) printf("| %s\n", line.c_str());
+  for (const std::string& line : LastLines(directory + newest)) {
+    printf("| %s\n", ForTerminal(line).c_str());
+  }
   return kGood;
 }
 
@@ -96,6 +124,14 @@ std::string HookFile() {
   return directory + (directory.ends_with('/') ? "" : "/") + "VLTHooks.ini";
 }
 
+// The library would wait for a pipe, and read whatever size of file: both end the command.
+void ExpectUsable(const std::string& file) {
+  GuardedBytes read = ReadGuarded(file);
+  if (read.state == GuardedBytes::State::Unreadable) {
+    throw std::runtime_error(file + ": " + read.error);
+  }
+}
+
 // "hang=250" arms a hang of so many milliseconds.
 bool SetFlag(CvlIniMgr& ini, const std::string& flag) {
   size_t equals = flag.find('=');
@@ -117,16 +153,17 @@ bool IsPoint(const std::string& name) {
 
 int HookArm(const std::string& name, const std::vector<std::string>& flags) {
   if (!IsPoint(name)) {
-    fprintf(stderr, "vltctl: no such point: %s\n", name.c_str());
+    fprintf(stderr, "vltctl: no such point: %s\n", ForTerminal(name).c_str());
     return kNotFound;
   }
+  ExpectUsable(HookFile());
   CvlIniMgr ini(HookFile().c_str(), false, nullptr, false, false);
   ini.EraseSection("Hook");
   ini.SetItem("Hook", "Name", name.c_str(), false);
   for (const std::string& flag : flags) {
     if (SetFlag(ini, flag)) continue;
     fprintf(stderr, "vltctl: no such flag: %s (hang[=MS], crash, fail, throw, exhaust)\n",
-            flag.c_str());
+            ForTerminal(flag).c_str());
     return kUsage;
   }
   return ini.Write() < 0 ? kDataUnusable : kGood;
@@ -134,6 +171,7 @@ int HookArm(const std::string& name, const std::vector<std::string>& flags) {
 
 int HookClear() {
   if (!fs::exists(HookFile())) return kGood;
+  ExpectUsable(HookFile());
   CvlIniMgr ini(HookFile().c_str(), false, nullptr, false, false);
   ini.EraseSection("Hook");
   return ini.Write() < 0 ? kDataUnusable : kGood;

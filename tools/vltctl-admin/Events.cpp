@@ -8,6 +8,7 @@
 #include <algorithm>
 #include <filesystem>
 #include <map>
+#include <system_error>
 
 #include "tools/vltctl-admin/Reading.h"
 #include "zt/fnd/String.h"
@@ -29,9 +30,9 @@ using zt::fnd::osdep::ScopedFd;
 // As much of a file as an event's can have. Anybody may put anything there: what is no regular file is
 // not waited for, and a large one not read.
 std::string Bytes(const fs::path& file) {
-  ScopedFd fd(open(file.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
-  struct stat info;
-  if (!fd.valid() || fstat(fd.get(), &info) != 0 || !S_ISREG(info.st_mode)) return "";
+  std::string ignored;
+  ScopedFd fd = OpenRegular(file, &ignored);
+  if (!fd.valid()) return "";
   char block[kStateFileSize];
   ssize_t got = read(fd.get(), block, sizeof block);
   return got > 0 ? std::string(block, static_cast<size_t>(got)) : "";

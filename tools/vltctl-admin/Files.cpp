@@ -7,8 +7,11 @@
 #include "source/IniSidecar.h"
 #include "source/Utilities/vltSettingsKeys.h"
 #include "source/vlIniMgr.h"
+#include "tools/common/Terminal.h"
 #include "tools/vltctl-admin/Reading.h"
 #include "zt/fnd/String.h"
+
+using vltctl::ForTerminal;
 
 namespace admin {
 namespace {
@@ -50,7 +53,7 @@ int Settings(unsigned index, bool client, bool server, const std::string& name, 
   std::string file = DataFile((name.empty() ? "kor" : name) + ".ini");
   GuardedBytes read = ReadGuarded(file);
   if (read.state == GuardedBytes::State::Unreadable) {
-    fprintf(stderr, "vltctl: %s: %s\n", file.c_str(), read.error.c_str());
+    fprintf(stderr, "vltctl: %s: %s\n", ForTerminal(file).c_str(), read.error.c_str());
     return kDataUnusable;
   }
   Document document(read.bytes);
@@ -84,7 +87,8 @@ int Jar(bool json) {
   GuardedBytes read = ReadGuarded(file);
   if (read.state != GuardedBytes::State::Read) {
     bool missing = read.state == GuardedBytes::State::Missing;
-    fprintf(stderr, "vltctl: %s: %s\n", file.c_str(), missing ? "no jar" : read.error.c_str());
+    fprintf(stderr, "vltctl: %s: %s\n", ForTerminal(file).c_str(),
+            missing ? "no jar" : read.error.c_str());
     return missing ? kNotFound : kDataUnusable;
   }
   Document document(read.bytes);
@@ -154,7 +158,8 @@ int Verify(const std::string& file, bool json) {
   if (json) {
     PrintJson({{"file", file}, {"found", verdict.found}, {"nextOpen", verdict.nextOpen}});
   } else {
-    printf("%s: %s; the next open %s\n", file.c_str(), verdict.found, verdict.nextOpen);
+    printf("%s: %s; the next open %s\n", ForTerminal(file).c_str(), verdict.found,
+           verdict.nextOpen);
   }
   return verdict.code;
 }

@@ -9,10 +9,12 @@
 
 #include <algorithm>
 
+#include "source/IniSidecar.h"
 #include "source/vlIniMgr.h"
+#include "tools/common/Terminal.h"
 #include "vlloader/source/vlloader.h"
-#include "zt/fnd/osdep/ScopedFd.h"
 
+using vltctl::ForTerminal;
 using zt::fnd::osdep::ScopedFd;
 
 namespace admin {
@@ -37,37 +39,81 @@ Stamp StampOf(const std::string& file) {
   return {info.st_dev, info.st_ino, info.st_size, info.st_mtim};
 }
 
-// 0, or errno. What is no regular file is EINVAL, and not waited for.
-int ReadAll(const std::string& file, std::string* bytes) {
-  ScopedFd fd(open(file.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
-  if (!fd.valid()) return errno;
-  struct stat info;
-  if (fstat(fd.get(), &info) != 0 || !S_ISREG(info.st_mode)) return EINVAL;
+// Appends at most `limit` bytes. 0, or errno.
+int Append(int fd, size_t limit, std::string* bytes) {
   char block[65536];
-  bytes->clear();
-  for (;;) {
-    ssize_t got = read(fd.get(), block, sizeof block);
+  while (limit > 0) {
+    ssize_t got = read(fd, block, std::min(limit, sizeof block));
     if (got < 0) return errno;
     if (got == 0) return 0;
     bytes->append(block, static_cast<size_t>(got));
+    limit -= static_cast<size_t>(got);
   }
+  return 0;
+}
+
+// 0, or errno. A file beyond the limit is EFBIG, and not read; one that grows beyond it meanwhile is
+// read no further.
+int ReadAll(const std::string& file, std::string* bytes, std::string* error) {
+  ScopedFd fd = OpenRegular(file, error);
+  if (!fd.valid()) return errno;
+  struct stat info;
+  bytes->clear();
+  int failed = fstat(fd.get(), &info) != 0 ? errno : 0;
+  bool large = failed == 0 && info.st_size > static_cast<off_t>(kFileLimit);
+  if (!failed && !large) failed = Append(fd.get(), kFileLimit + 1, bytes);
+  if (large || bytes->size() > kFileLimit) {
+    bytes->clear();
+    *error = "it is larger than 256 MiB, which no file of an installation is";
+    return EFBIG;
+  }
+  if (failed) *error = strerror(failed);
+  return failed;
+}
+
+// A sidecar counts by its first bytes only, however many it has.
+std::optional<std::string> ReadSidecar(const std::string& file) {
+  std::string ignored, digest;
+  ScopedFd fd = OpenRegular(file, &ignored);
+  if (!fd.valid() || Append(fd.get(), IniSidecar::kSizeBytes, &digest) != 0) return std::nullopt;
+  return digest;
 }
 
 GuardedBytes ReadOnce(const std::string& file, const std::string& sidecar) {
   GuardedBytes out;
-  std::string digest;
-  int error = ReadAll(file, &out.bytes);
-  if (ReadAll(sidecar, &digest) == 0) out.sidecar = digest;
+  int error = ReadAll(file, &out.bytes, &out.error);
+  out.sidecar = ReadSidecar(sidecar);
   if (error == 0) {
     out.state = GuardedBytes::State::Read;
   } else if (error != ENOENT) {
     out.state = GuardedBytes::State::Unreadable;
-    out.error = error == EINVAL ? "it is no regular file" : strerror(error);
   }
   return out;
 }
 
 }  // namespace
+
+// Opening a pipe or a device does something to it already, so the name is first opened for looking
+// only; what it led to is then opened through that descriptor, whatever the name leads to by now.
+ScopedFd OpenRegular(const std::string& file, std::string* error) {
+  ScopedFd place(open(file.c_str(), O_PATH | O_CLOEXEC));
+  struct stat info;
+  int failed = !place.valid() || fstat(place.get(), &info) != 0 ? errno : 0;
+  if (!failed && !S_ISREG(info.st_mode)) {
+    *error = "it is no regular file";
+    errno = EINVAL;
+    return ScopedFd();
+  }
+  ScopedFd fd;
+  if (!failed) {
+    std::string link = "/proc/self/fd/" + std::to_string(place.get());
+    fd.reset(open(link.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+    if (!fd.valid()) failed = errno;
+  }
+  if (failed) *error = strerror(failed);
+  errno = failed;
+  return fd;
+}
 
 GuardedBytes ReadGuarded(const std::string& file) {
   std::string sidecar = CvlIniMgr::SidecarName(file);
@@ -131,26 +177,6 @@ void PrintJson(const nlohmann::json& value) {
   puts(value.dump(2, ' ', false, nlohmann::json::error_handler_t::replace).c_str());
 }
 
-namespace {
-
-// Control characters as \xNN: names and values come from files that others write, and a terminal obeys
-// what it is sent.
-std::string Shown(const std::string& text) {
-  std::string out;
-  for (unsigned char c : text) {
-    char code[8];
-    snprintf(code, sizeof code, "\\x%02X", c);
-    if (c < 0x20 || c == 0x7F) {
-      out += code;
-    } else {
-      out += static_cast<char>(c);
-    }
-  }
-  return out;
-}
-
-}  // namespace
-
 void Print(const std::vector<Row>& rows, bool json) {
   if (json) {
     nlohmann::json out = nlohmann::json::object();
@@ -159,12 +185,13 @@ void Print(const std::vector<Row>& rows, bool json) {
   }
   size_t names = 0, values = 0;
   for (const Row& row : rows) {
-    names = std::max(names, Shown(row.name).size());
-    values = std::max(values, Shown(row.value).size());
+    names = std::max(names, ForTerminal(row.name).size());
+    values = std::max(values, ForTerminal(row.value).size());
   }
   for (const Row& row : rows) {
-    printf("%-*s  %-*s  %s\n", static_cast<int>(names), Shown(row.name).c_str(),
-           static_cast<int>(values), Shown(row.value).c_str(), Shown(row.origin).c_str());
+    printf("%-*s  %-*s  %s\n", static_cast<int>(names), ForTerminal(row.name).c_str(),
+           static_cast<int>(values), ForTerminal(row.value).c_str(),
+           ForTerminal(row.origin).c_str());
   }
 }
 

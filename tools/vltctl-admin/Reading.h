@@ -6,10 +6,19 @@
 #include <utility>
 #include <vector>
 
+#include "zt/fnd/osdep/ScopedFd.h"
 #include "ztini/ztini.h"
 
 // Reading shared files as an onlooker: without a lock, and without making or changing anything.
 namespace admin {
+
+// No file of an installation comes near this size; a larger one was made to exhaust the reader.
+inline constexpr size_t kFileLimit = size_t{256} << 20;
+
+// The file for reading, if it is a regular one; links are followed. Nothing else is opened, so a pipe
+// is not waited for and a device not touched. Invalid otherwise, with errno (EINVAL for what is no
+// regular file) and why in *error.
+zt::fnd::osdep::ScopedFd OpenRegular(const std::string& file, std::string* error);
 
 // A file and its sidecar as they stood together at one moment.
 struct GuardedBytes {
@@ -17,10 +26,10 @@ struct GuardedBytes {
   State state = State::Missing;
   std::string error;  // why it is unreadable
   std::string bytes;
-  std::optional<std::string> sidecar;
+  std::optional<std::string> sidecar;  // its first bytes, as many as count
 };
 
-// Reads file and sidecar again while somebody writes them in between.
+// A file beyond kFileLimit is unreadable. Reads file and sidecar again if another process writes them in between.
 GuardedBytes ReadGuarded(const std::string& file);
 
 // A document read from bytes, and its status (ztini.h).
@@ -45,7 +54,7 @@ class Document {
 // <install>/Data/NAME.
 std::string DataFile(const std::string& name);
 
-// Prints rows of one width, or the JSON of them.
+// Prints rows of one width, safe for a terminal, or the JSON of them.
 struct Row {
   std::string name, value, origin;
 };

@@ -6,8 +6,11 @@
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
+#include <exception>
 #include <filesystem>
 
+#include "tools/common/Terminal.h"
+#include "tools/common/Usage.h"
 #include "tools/vltctl-admin/Reading.h"
 
 namespace {
@@ -80,7 +83,7 @@ int Run(int argc, char** argv) {
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& error) {
-    return app.exit(error) == 0 ? admin::kGood : admin::kUsage;  // Prints help, or what is wrong.
+    return vltctl::ExitOf(app, error) == 0 ? admin::kGood : admin::kUsage;
   }
   return result;
 }
@@ -93,7 +96,7 @@ int main(int argc, char** argv) {
   try {
     return Run(argc, argv);
   } catch (const std::exception& error) {
-    fprintf(stderr, "vltctl: %s\n", error.what());
+    fprintf(stderr, "vltctl: %s\n", vltctl::ForTerminal(error.what()).c_str());
   } catch (int) {
     fprintf(stderr, "vltctl: the file cannot be opened\n");
   }

@@ -2,6 +2,7 @@
 
 #include <dlfcn.h>
 #include <elf.h>
+#include <errno.h>
 #include <fcntl.h>
 #include <poll.h>
 #include <signal.h>
@@ -15,12 +16,17 @@
 #include <exception>
 #include <fstream>
 #include <memory>
+#include <set>
 #include <system_error>
+
+#include "tools/vltctl/DropRights.h"
+#include "tools/vltctl/LibraryTrust.h"
 
 namespace vltctl {
 namespace {
 
 constexpr auto kTimeLimit = std::chrono::seconds(10);
+constexpr size_t kTextLimit = 1 << 20;
 constexpr char kMessage = 'M', kNote = 'N', kEnd = 'E';
 
 [[noreturn]] void Fail(const char* what) {
@@ -42,6 +48,11 @@ void Send(int fd, char kind, std::string text) {
   }
 }
 
+void DieWith(pid_t parent) {
+  prctl(PR_SET_PDEATHSIG, SIGKILL);
+  if (getppid() != parent) _exit(1);
+}
+
 // A library for the other word size is a likely mistake, and the loader's words for it are dark.
 std::string WordSizeNote(const std::string& file) {
   std::ifstream in(file, std::ios::binary);
@@ -56,9 +67,10 @@ std::string WordSizeNote(const std::string& file) {
 }
 
 // What the loader itself says of the file; nothing if it loads.
+// The check loads no relative path, and neither does this: it would begin in the present directory.
 void SendLoadersWords(int fd, const std::string& file) {
   struct stat info;
-  if (stat(file.c_str(), &info) != 0 || !S_ISREG(info.st_mode)) return;
+  if (!file.starts_with('/') || stat(file.c_str(), &info) != 0 || !S_ISREG(info.st_mode)) return;
   void* handle = dlopen(file.c_str(), RTLD_NOW | RTLD_LOCAL);
   if (handle) {
     dlclose(handle);
@@ -89,8 +101,7 @@ HRESULT CheckByTheLibrary(const Component& component, int fd) {
   return result;
 }
 
-// What the check raises - a path that the system does not even let it look at - is told in place of the
-// messages, which are lost with it.
+// What the check raises is a note in place of the messages, which are lost with it.
 HRESULT CheckOrTellWhyNot(const Component& component, int fd) {
   try {
     return CheckByTheLibrary(component, fd);
@@ -100,9 +111,65 @@ HRESULT CheckOrTellWhyNot(const Component& component, int fd) {
   }
 }
 
+std::string Join(const std::set<uid_t>& users) {
+  std::string out;
+  for (uid_t user : users) out += (out.empty() ? "" : ", ") + std::to_string(user);
+  return out;
+}
+
+// What root must not load, with the reason; or nothing.
+std::string Refusal(const Controllers& controllers) {
+  std::string why;
+  if (!controllers.shared.empty()) {
+    why = "\"" + controllers.shared + "\": " + controllers.reason;
+  } else if (controllers.users.size() > 1) {
+    why = "users " + Join(controllers.users) + " can each change it or a directory on its path";
+  }
+  if (why.empty()) return "";
+  return "not loaded, as root would run the code of other users: " + why +
+         "; check it as an ordinary user, or leave only its owner the right to change the path";
+}
+
+// The library's own conversion of the name may lead elsewhere.
+constexpr const char* kInexact =
+    "not loaded, as its path has characters that the locale lacks, and so root cannot see whose it "
+    "is; "
+    "check it in a UTF-8 locale";
+
+// Why the process could not become the user, or nothing.
+std::string Become(uid_t user, int* fd) {
+  const char* failed = DetachFromParent(fd);
+  if (!failed) failed = DropRights(user);
+  if (!failed) return "";
+  return "not loaded, as root cannot become user " + std::to_string(user) +
+         ", who can change it: " + failed + "; check it as that user";
+}
+
+// Before root loads a library that another user can put there, it becomes that user: a process that
+// shares nothing with the terminal and the files of the command. False, with a note, where it must not
+// be loaded.
+bool PrepareToLoad(const Component& component, pid_t parent, int* fd) {
+  bool isLoaded = component.type != "dictionary" && component.file.starts_with('/');
+  if (geteuid() != 0 || !isLoaded) return true;
+  Controllers controllers = ControllersOfLibrary(component.file);
+  std::string refusal = component.fileIsExact ? Refusal(controllers) : kInexact;
+  if (refusal.empty() && controllers.users.empty()) return true;
+  if (refusal.empty()) refusal = Become(*controllers.users.begin(), fd);
+  if (!refusal.empty()) {
+    Send(*fd, kNote, refusal);
+    return false;
+  }
+  DieWith(parent);  // The change of user has made the kernel forget it.
+  return true;
+}
+
 // The child: exit code 0 for a sound component, 1 for one with problems. Its last word is kEnd, without
 // which the code is somebody else's: a library may end the process with any code while it is loaded.
-int CheckInside(const Component& component, int fd) {
+int CheckInside(const Component& component, pid_t parent, int fd) {
+  if (!PrepareToLoad(component, parent, &fd)) {
+    Send(fd, kEnd, "");
+    return 1;
+  }
   HRESULT result = CheckOrTellWhyNot(component, fd);
   if (result < 0 && component.type != "dictionary") SendLoadersWords(fd, component.file);
   Send(fd, kEnd, "");
@@ -114,21 +181,27 @@ bool HasEnded(const std::string& text) {
   return text == end || text.ends_with(std::string("\n") + end);
 }
 
+// How the reading of what a child says has ended.
+enum class Reading { Ended, TooSlow, TooMuch };
+
 // What came through the pipe until its end, or the child's last word: processes that a library has
-// started keep the pipe open. False past the time limit.
-bool ReadUntilEnd(int fd, std::string* text) {
+// started keep the pipe open. The library may write into it as well, and so no check says that much.
+Reading ReadUntilEnd(int fd, std::string* text) {
   auto end = std::chrono::steady_clock::now() + kTimeLimit;
   char block[4096];
   for (;;) {
     auto left = std::chrono::duration_cast<std::chrono::milliseconds>(
         end - std::chrono::steady_clock::now());
     pollfd wait = {fd, POLLIN, 0};
-    if (left.count() <= 0 || poll(&wait, 1, static_cast<int>(left.count())) == 0) return false;
+    if (left.count() <= 0 || poll(&wait, 1, static_cast<int>(left.count())) == 0) {
+      return Reading::TooSlow;
+    }
     ssize_t got = read(fd, block, sizeof block);
     if (got < 0 && errno == EINTR) continue;
-    if (got <= 0) return true;
+    if (got <= 0) return Reading::Ended;
     text->append(block, static_cast<size_t>(got));
-    if (HasEnded(*text)) return true;
+    if (HasEnded(*text)) return Reading::Ended;
+    if (text->size() > kTextLimit) return Reading::TooMuch;
   }
 }
 
@@ -136,14 +209,14 @@ void Sort(const std::string& text, Finding* finding) {
   for (size_t begin = 0; begin < text.size();) {
     size_t end = text.find('\n', begin);
     if (end == std::string::npos) end = text.size();
-    std::string line = text.substr(begin + 1, end - begin - 1);
-    if (text[begin] == kMessage) finding->messages.push_back(line);
-    if (text[begin] == kNote) finding->notes.push_back(line);
+    std::string line = text.substr(begin, end - begin);
+    if (line.starts_with(kMessage)) finding->messages.push_back(line.substr(1));
+    if (line.starts_with(kNote)) finding->notes.push_back(line.substr(1));
     begin = end + 1;
   }
 }
 
-// In a process group of its own, so that what a library starts can be ended with it.
+// In a session of its own, so that what a library starts can be ended with it, and has no terminal.
 pid_t StartChild(const Component& component, int (&pipeEnds)[2]) {
   if (pipe2(pipeEnds, O_CLOEXEC) != 0) Fail("pipe");
   fflush(nullptr);
@@ -151,24 +224,27 @@ pid_t StartChild(const Component& component, int (&pipeEnds)[2]) {
   pid_t child = fork();
   if (child < 0) Fail("fork");
   if (child > 0) {
-    setpgid(child, child);  // here too: whoever comes first
     close(pipeEnds[1]);
     return child;
   }
-  setpgid(0, 0);
-  prctl(PR_SET_PDEATHSIG, SIGKILL);  // what is typed at the terminal no longer reaches it
-  if (getppid() != parent) _exit(1);
+  setsid();
+  DieWith(parent);  // What is typed at the terminal no longer reaches it.
   close(pipeEnds[0]);
   // What the library prints while it is loaded is not ours.
   int null = open("/dev/null", O_RDWR | O_CLOEXEC);
   dup2(null, 1);
   dup2(null, 2);
-  _exit(CheckInside(component, pipeEnds[1]));
+  _exit(CheckInside(component, parent, pipeEnds[1]));
 }
 
 // What became of the child, where that is worth a word.
-std::string FateOf(int status, bool inTime, bool ended) {
-  if (!inTime) return "the library did not load within 10 s; its process was killed";
+std::string FateOf(int status, Reading reading, bool ended) {
+  if (reading == Reading::TooSlow) {
+    return "the library did not load within 10 s; its process was killed";
+  }
+  if (reading == Reading::TooMuch) {
+    return "the library wrote more than 1 MiB into the check's pipe; its process was killed";
+  }
   if (WIFSIGNALED(status) && !ended) {
     return std::string("the process that loaded the library died: ") + strsignal(WTERMSIG(status));
   }
@@ -190,16 +266,16 @@ Finding CheckOne(const Component& component) {
   int pipeEnds[2];
   pid_t child = StartChild(component, pipeEnds);
   std::string text;
-  bool inTime = ReadUntilEnd(pipeEnds[0], &text);
+  Reading reading = ReadUntilEnd(pipeEnds[0], &text);
   close(pipeEnds[0]);
   bool ended = HasEnded(text);
-  if (!inTime) kill(child, SIGKILL);
+  if (reading != Reading::Ended) kill(child, SIGKILL);
   int status = 0;
   while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
   }
   kill(-child, SIGKILL);  // what the library has started and left behind
   Sort(text, &finding);
-  std::string fate = FateOf(status, inTime, ended);
+  std::string fate = FateOf(status, reading, ended);
   if (!fate.empty()) finding.notes.push_back(fate);
   finding.sound =
       ended && WIFEXITED(status) && WEXITSTATUS(status) == 0 && finding.messages.empty();

@@ -76,6 +76,7 @@ Component Describe(const _vltComponent2& r) {
   c.name = NarrowText(r.name);
   c.guid = GuidText(r.identifier);
   c.file = NarrowText(r.fileName);
+  c.fileIsExact = !r.fileName || wcstombs(nullptr, r.fileName, 0) != static_cast<size_t>(-1);
   c.recordVersion = r.version;
   if (r.type == vltComponentDataDictionary) {
     c.schemaVersion = r.dictionary.schemaVersion;

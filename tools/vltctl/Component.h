@@ -18,6 +18,7 @@ struct DataUnusable : std::runtime_error {
 
 struct Component {
   std::string type, name, guid, file;
+  bool fileIsExact = true;  // no character of `file` is a replacement
   uint32_t recordVersion = 0;
   // Dictionaries only.
   std::optional<uint32_t> schemaVersion, fragmentRegistered, lastInstalledSchemaVersion;

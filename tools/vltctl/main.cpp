@@ -6,6 +6,8 @@
 #include <algorithm>
 #include <nlohmann/json.hpp>
 
+#include "tools/common/Terminal.h"
+#include "tools/common/Usage.h"
 #include "tools/vltctl/Check.h"
 #include "tools/vltctl/Component.h"
 #include "zt/fnd/Exception.h"
@@ -15,6 +17,7 @@ namespace {
 using nlohmann::json;
 using vltctl::Client;
 using vltctl::Component;
+using vltctl::ForTerminal;
 
 enum ExitCode { kGood = 0, kNotFound = 1, kUsage = 2, kDataUnusable = 3 };
 
@@ -45,7 +48,8 @@ void PrintTable(const std::vector<Component>& components) {
   std::vector<std::vector<std::string>> rows = {{"TYPE", "NAME", "GUID", "VERSION", "FILE"}};
   for (const Component& c : components) {
     std::string version = c.schemaVersion ? std::to_string(*c.schemaVersion) : "-";
-    rows.push_back({c.type, c.name, c.guid, version, c.file.empty() ? "-" : c.file});
+    rows.push_back({ForTerminal(c.type), ForTerminal(c.name), ForTerminal(c.guid), version,
+                    c.file.empty() ? "-" : ForTerminal(c.file)});
   }
   std::vector<size_t> widths(rows[0].size());
   for (const auto& row : rows) {
@@ -61,7 +65,7 @@ void PrintTable(const std::vector<Component>& components) {
 
 void PrintOne(const Component& c) {
   auto line = [](const char* name, const std::string& value) {
-    printf("%-26s %s\n", name, value.c_str());
+    printf("%-26s %s\n", name, ForTerminal(value).c_str());
   };
   line("type", c.type);
   line("name", c.name);
@@ -94,7 +98,7 @@ int List(bool asJson) {
 int Show(const std::string& guid, bool asJson) {
   auto component = Client().find(guid);
   if (!component) {
-    fprintf(stderr, "vltctl: no component %s\n", guid.c_str());
+    fprintf(stderr, "vltctl: no component %s\n", ForTerminal(guid).c_str());
     return kNotFound;
   }
   if (asJson) {
@@ -108,7 +112,7 @@ int Show(const std::string& guid, bool asJson) {
 int Classes(const std::string& guid, bool asJson) {
   auto components = Client().classes(guid);
   if (components.empty()) {
-    fprintf(stderr, "vltctl: no component binds to %s\n", guid.c_str());
+    fprintf(stderr, "vltctl: no component binds to %s\n", ForTerminal(guid).c_str());
     return kNotFound;
   }
   if (asJson) {
@@ -132,7 +136,7 @@ int Check(const std::string& guid, bool asJson) {
   auto findings = vltctl::CheckComponents(
       client, guid.empty() ? std::nullopt : std::optional<std::string>(guid));
   if (findings.empty()) {
-    fprintf(stderr, "vltctl: no component %s\n", guid.c_str());
+    fprintf(stderr, "vltctl: no component %s\n", ForTerminal(guid).c_str());
     return kNotFound;
   }
   bool sound = true;
@@ -141,10 +145,10 @@ int Check(const std::string& guid, bool asJson) {
     sound = sound && finding.sound;
     all.push_back(ToJson(finding));
     if (asJson) continue;
-    printf("%s %s: %s\n", finding.component.type.c_str(), finding.component.name.c_str(),
-           finding.sound ? "sound" : "NOT SOUND");
-    for (const std::string& message : finding.messages) printf("  %s\n", message.c_str());
-    for (const std::string& note : finding.notes) printf("    %s\n", note.c_str());
+    printf("%s %s: %s\n", finding.component.type.c_str(),
+           ForTerminal(finding.component.name).c_str(), finding.sound ? "sound" : "NOT SOUND");
+    for (const std::string& text : finding.messages) printf("  %s\n", ForTerminal(text).c_str());
+    for (const std::string& text : finding.notes) printf("    %s\n", ForTerminal(text).c_str());
   }
   if (asJson) Print(all);
   return sound ? kGood : kDataUnusable;
@@ -158,7 +162,7 @@ int Url(bool asJson) {
   if (asJson) {
     Print({{"url", text}});
   } else {
-    printf("%s\n", text.c_str());
+    printf("%s\n", ForTerminal(text).c_str());
   }
   return result < 0 ? kDataUnusable : kGood;
 }
@@ -182,11 +186,6 @@ struct Arguments {
   bool json = false;
   std::string guid;
 };
-
-// CLI11's own codes are many; a usage error has one here, and --help and --version are none.
-int ExitOf(const CLI::App& app, const CLI::ParseError& error) {
-  return app.exit(error) == 0 ? kGood : kUsage;
-}
 
 int Run(int argc, char** argv) {
   Arguments arguments;
@@ -225,7 +224,8 @@ int Run(int argc, char** argv) {
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& error) {
-    return ExitOf(app, error);  // Prints the help or what is wrong with the arguments.
+    // CLI11's own codes are many; a usage error has one here, and --help and --version are none.
+    return vltctl::ExitOf(app, error) == 0 ? kGood : kUsage;
   }
   if (list->parsed()) return List(arguments.json);
   if (check->parsed()) return Check(arguments.guid, arguments.json);
@@ -244,13 +244,13 @@ int main(int argc, char** argv) {
     return Run(argc, argv);
   } catch (const zt::fnd::exception::Exception& error) {
     // What the library throws says that files are not as they should be.
-    fprintf(stderr, "vltctl: %s\n", error.what());
+    fprintf(stderr, "vltctl: %s\n", ForTerminal(error.what()).c_str());
   } catch (const vltctl::DataUnusable& error) {
-    fprintf(stderr, "vltctl: %s\n", error.what());
+    fprintf(stderr, "vltctl: %s\n", ForTerminal(error.what()).c_str());
   } catch (int) {
     fprintf(stderr, "vltctl: the registration database cannot be opened\n");
   } catch (const std::exception& error) {
-    fprintf(stderr, "vltctl: %s\n", error.what());
+    fprintf(stderr, "vltctl: %s\n", ForTerminal(error.what()).c_str());
   }
   return kDataUnusable;
 }

@@ -1,0 +1,62 @@
+#include "tools/common/Terminal.h"
+
+#include <stdio.h>
+#include <wchar.h>
+
+namespace vltctl {
+namespace {
+
+template <class... Values>
+std::string Formatted(const char* format, Values... values) {
+  char text[16];
+  snprintf(text, sizeof text, format, values...);
+  return text;
+}
+
+// Not control characters by their category, yet they change how what follows is laid out.
+bool ChangesLayout(wchar_t c) {
+  return c == 0x061C || c == 0x200E || c == 0x200F || (c >= 0x2028 && c <= 0x202E) ||
+         (c >= 0x2066 && c <= 0x2069);
+}
+
+std::string Character(wchar_t c, std::string_view bytes) {
+  auto code = static_cast<unsigned>(c);
+  if (code < 0x20 || code == 0x7F) return Formatted("\\x%02X", code);
+  if ((code >= 0x80 && code < 0xA0) || ChangesLayout(c)) return Formatted("\\u{%02X}", code);
+  return std::string(bytes);
+}
+
+}  // namespace
+
+std::string ForTerminal(std::string_view text) {
+  std::string out;
+  mbstate_t state = {};
+  while (!text.empty()) {
+    wchar_t c = 0;
+    size_t size = mbrtowc(&c, text.data(), text.size(), &state);
+    if (size == 0) size = 1;  // a zero byte is a character of its own
+    if (size > text.size()) {
+      // No character, or only the beginning of one: this byte is shown, and the next one begins again.
+      state = {};
+      out += Formatted("\\x%02X", static_cast<unsigned char>(text[0]));
+      size = 1;
+    } else {
+      out += Character(c, text.substr(0, size));
+    }
+    text.remove_prefix(size);
+  }
+  return out;
+}
+
+std::string LinesForTerminal(std::string_view text) {
+  std::string out;
+  for (;;) {
+    size_t end = text.find('\n');
+    out += ForTerminal(text.substr(0, end));
+    if (end == std::string_view::npos) return out;
+    out += '\n';
+    text.remove_prefix(end + 1);
+  }
+}
+
+}  // namespace vltctl

@@ -1,0 +1,18 @@
+#pragma once
+
+#include <string>
+#include <string_view>
+
+// Text from files and arguments, made safe for a terminal.
+namespace vltctl {
+
+// The text, in the encoding of the process's locale, with everything that a terminal obeys in place of
+// showing it escaped: control characters below 0x80, line feeds among them, and bytes that are no
+// character of the locale as \xNN; C1 controls (U+0080 to U+009F), line separators and the controls
+// that change the direction of writing as \u{NN}. Other characters, a backslash too, stay as they are.
+std::string ForTerminal(std::string_view text);
+
+// The same for a text of several lines: line feeds stay.
+std::string LinesForTerminal(std::string_view text);
+
+}  // namespace vltctl
