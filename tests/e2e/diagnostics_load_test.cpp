@@ -8,6 +8,7 @@
 
 #include <filesystem>
 #include <regex>
+#include <system_error>
 
 #include "tests/support/EventPlace.h"
 #include "tests/support/InChild.h"

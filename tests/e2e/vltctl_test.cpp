@@ -3,7 +3,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <nlohmann/json.hpp>
+#include <sstream>
 
 #include "tests/e2e/Start.h"
 

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <utility>
+
 #include "tests/oom/Registrar.h"
 
 // Attribute values as text, over an object of the storage that always answers. It is one of a kind and

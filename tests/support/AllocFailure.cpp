@@ -1,5 +1,6 @@
 #include "tests/support/AllocFailure.h"
 
+#include <cstddef>
 #include <cstdlib>
 #include <new>
 

@@ -1,5 +1,6 @@
 #include "tests/support/Child.h"
 
+#include <errno.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <poll.h>
@@ -10,6 +11,7 @@
 #include <unistd.h>
 
 #include <chrono>
+#include <exception>
 #include <fstream>
 #include <stdexcept>
 #include <system_error>

@@ -5,6 +5,7 @@
 #include <stdlib.h>
 #include <sys/stat.h>
 
+#include <cstdint>
 #include <filesystem>
 
 #include "tests/support/Child.h"

@@ -9,7 +9,9 @@
 
 #include <filesystem>
 #include <map>
+#include <new>
 #include <string>
+#include <system_error>
 #include <vector>
 
 #include "source/Utilities/vltutils.h"

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <errno.h>
 #include <limits.h>
 #include <sys/inotify.h>
 #include <unistd.h>

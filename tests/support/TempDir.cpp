@@ -1,5 +1,6 @@
 #include "tests/support/TempDir.h"
 
+#include <errno.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <stdlib.h>

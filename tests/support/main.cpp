@@ -4,6 +4,7 @@
 // XDG_CONFIG_DIRS, TMPDIR and ZTFNDTMPSHAREDFILEDIR below it, and removes that directory at the
 // end. It has to be a second process: the library under test reads some of these while it is being
 // loaded.
+#include <errno.h>
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <stdlib.h>
@@ -15,6 +16,8 @@
 #include <filesystem>
 #include <string>
 #include <string_view>
+#include <system_error>
+#include <utility>
 
 #include "tests/support/PrivateRoot.h"
 
