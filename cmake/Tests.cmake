@@ -9,6 +9,14 @@ file(GLOB support CONFIGURE_DEPENDS tests/support/*.cpp)
 list(FILTER support EXCLUDE REGEX "_test\\.cpp$")
 add_library(vlt_test_support STATIC ${support})
 target_link_libraries(vlt_test_support PUBLIC vlt_strict gtest Threads::Threads)
+# Linked by programs only: one form of code for both, as a precompiled header requires.
+set_target_properties(vlt_test_support PROPERTIES POSITION_INDEPENDENT_CODE OFF)
+target_compile_options(vlt_test_support PRIVATE -fPIE)
+if(VLT_PCH)
+  target_precompile_headers(vlt_test_support PRIVATE <gtest/gtest.h> <algorithm> <atomic> <chrono>
+    <filesystem> <fstream> <functional> <future> <iostream> <map> <memory> <set> <sstream> <string>
+    <thread> <vector>)
+endif()
 
 function(vlt_tests name)
   cmake_parse_arguments(ARG "" "LABELS;TIMEOUT" "GLOBS;LINKS" ${ARGN})
@@ -21,6 +29,9 @@ function(vlt_tests name)
   endif()
   add_executable(${name} ${sources})
   target_link_libraries(${name} PRIVATE vlt_test_support ${ARG_LINKS})
+  if(VLT_PCH)
+    target_precompile_headers(${name} REUSE_FROM vlt_test_support)
+  endif()
   if("vltutils" IN_LIST ARG_LINKS)
     set_target_properties(${name} PROPERTIES
       CROSSCOMPILING_EMULATOR ${CMAKE_SOURCE_DIR}/tests/support/in-private-root)
@@ -33,12 +44,13 @@ function(vlt_tests name)
 endfunction()
 
 set(inside "")
-foreach(floor vlcore ztcore ztfnd ztini)
+foreach(floor vlcore ztcore ztfnd ztini ztposix)
   if(TARGET ${floor})
     list(APPEND inside ${floor})
   endif()
 endforeach()
 vlt_tests(support_tests LABELS unit GLOBS tests/support/*_test.cpp)
+vlt_tests(posix_tests LABELS unit GLOBS zt/posix/*_test.cpp LINKS ztposix)
 vlt_tests(ztini_tests LABELS unit GLOBS ztini/*_test.cpp LINKS ztini)
 vlt_tests(fnd_tests LABELS unit GLOBS zt/fnd/*_test.cpp LINKS ztfnd)
 vlt_tests(osdep_tests LABELS unit GLOBS zt/fnd/osdep/*_test.cpp LINKS ztfnd)
@@ -49,9 +61,12 @@ vlt_tests(vlcore_tests LABELS unit LINKS ${inside}
   GLOBS source/*_test.cpp source/Common/*_test.cpp source/Common/Posix/*_test.cpp
         source/Pharlap/*_test.cpp source/Posix/*_test.cpp source/Utilities/*_test.cpp
         vlloader/source/*_test.cpp)
+# Units of the command, compiled into their tests: they use neither form of the library.
+vlt_tests(tools_tests LABELS unit GLOBS tools/common/*.cpp tools/vltctl/LibraryTrust*.cpp)
 if(TARGET vltutils)
   vlt_tests(oom_tests LABELS e2e TIMEOUT 600 GLOBS tests/oom/*_test.cpp LINKS vltutils)
-  vlt_tests(e2e_tests LABELS e2e TIMEOUT 300 GLOBS tests/e2e/*_test.cpp LINKS vltutils)
+  vlt_tests(e2e_tests LABELS e2e TIMEOUT 300 GLOBS tests/e2e/*_test.cpp tests/power/*.cpp
+    LINKS vltutils)
   if(TARGET e2e_tests)
     find_package(nlohmann_json REQUIRED)
     target_link_libraries(e2e_tests PRIVATE nlohmann_json::nlohmann_json)
@@ -62,4 +77,14 @@ if(TARGET vltutils)
       VLT_TEST_LIBRARY="$<TARGET_FILE:vltutils>" VLT_TEST_BIN="${CMAKE_BINARY_DIR}/bin"
       VLT_TEST_SOURCE="${CMAKE_SOURCE_DIR}")
   endif()
+endif()
+
+# Power cuts below real file systems: not part of any test run, as it mounts (tools/storm/power-blocks).
+find_path(VLT_FUSE3_INCLUDE fuse3/fuse.h)
+find_library(VLT_FUSE3_LIBRARY fuse3)
+if(TARGET vltutils AND VLT_FUSE3_INCLUDE AND VLT_FUSE3_LIBRARY AND NOT VLT_M32)
+  file(GLOB blocks CONFIGURE_DEPENDS tests/power/blocks/*.cpp)
+  add_executable(power_blocks EXCLUDE_FROM_ALL ${blocks})
+  target_include_directories(power_blocks SYSTEM PRIVATE ${VLT_FUSE3_INCLUDE}/fuse3)
+  target_link_libraries(power_blocks PRIVATE vlt_test_support vltutils ${VLT_FUSE3_LIBRARY})
 endif()
