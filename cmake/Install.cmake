@@ -11,7 +11,7 @@ install(EXPORT vltutilsTargets NAMESPACE vltutils:: DESTINATION ${packages})
 # Headers keep their places below the tree's root, as they name each other by them.
 foreach(header
     source/Common/ZtUtils/General/vlt_vlTracer.h
-    source/Utilities/vltutils.h source/Utilities/vltInterfaces.h source/Utilities/vltTypes.h
+    source/Utilities/vltutils.h source/Common/vltInterfaces.h source/Common/vltTypes.h
     zt/fnd/Exception.h zt/fnd/GuidType.h zt/fnd/StringFwd.h zt/fnd/osdep/OSException.h
     ztcom/ztcore/ztunknown.h)
   get_filename_component(directory ${header} DIRECTORY)

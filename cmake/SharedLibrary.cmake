@@ -1,22 +1,13 @@
 # libvltutils.so: all floors in one library that shows the names of cmake/exports.map and no other.
-if(NOT TARGET vlcore)
-  return()
-endif()
 set(exports ${CMAKE_SOURCE_DIR}/cmake/exports.map)
 file(GLOB startup CONFIGURE_DEPENDS source/Utilities/startup.cpp)
 add_library(vltutils SHARED ${startup})
 set_target_properties(vltutils PROPERTIES
   LINKER_LANGUAGE CXX VERSION ${PROJECT_VERSION} SOVERSION ${PROJECT_VERSION_MAJOR}
   LINK_DEPENDS ${exports})
-set(floors "")
-foreach(floor vlcore ztcore ztfnd ztini)
-  if(TARGET ${floor})
-    list(APPEND floors ${floor})
-  endif()
-endforeach()
-target_link_libraries(vltutils PRIVATE vlt_strict ${floors})
+target_link_libraries(vltutils PRIVATE vlt_strict ${VLT_FLOORS})
 # Whole, also where one floor brings another: what nobody refers to is the surface itself.
-list(JOIN floors "," floors)
+list(JOIN VLT_FLOORS "," floors)
 set_property(TARGET vltutils PROPERTY LINK_LIBRARY_OVERRIDE "WHOLE_ARCHIVE,${floors}")
 target_link_options(vltutils PRIVATE -Wl,--version-script=${exports} -Wl,-z,nodelete
   -Wl,-z,relro -Wl,-z,now -Wl,--gc-sections)

@@ -5,11 +5,11 @@
 #include <clocale>
 #include <string>
 
-#include "source/TestIni.h"
 #include "tests/support/Child.h"
 #include "tests/support/CompiledLocales.h"
 #include "tests/support/InChild.h"
 #include "tests/support/TempDir.h"
+#include "tests/support/TestIni.h"
 #include "zt/fnd/String.h"
 
 namespace {

@@ -10,13 +10,13 @@
 #include <filesystem>
 #include <thread>
 
-#include "source/TestIni.h"
 #include "tests/support/Child.h"
 #include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
 #include "tests/support/MutexPlace.h"
 #include "tests/support/Sanitizer.h"
 #include "tests/support/TempDir.h"
+#include "tests/support/TestIni.h"
 #include "zt/fnd/Exception.h"
 
 namespace {

@@ -4,7 +4,7 @@
 #include <cstdint>
 #include <string>
 
-#include "source/Utilities/vltTypes.h"
+#include "source/Common/vltTypes.h"
 
 // The sidecar of a guarded INI file: 16 bytes, the MD5 of every byte of the file.
 //

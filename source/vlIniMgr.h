@@ -5,8 +5,8 @@
 #include <memory>
 #include <string>
 
+#include "source/Common/vltTypes.h"
 #include "source/IniFileLock.h"
-#include "source/Utilities/vltTypes.h"
 #include "ztini/ztini.h"
 
 // The one door to a shared INI file.

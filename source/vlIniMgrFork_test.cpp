@@ -8,11 +8,10 @@
 
 #include <filesystem>
 
-#include "source/TestIni.h"
-#include "source/Utilities/vltjar.h"
 #include "tests/support/Child.h"
 #include "tests/support/InChild.h"
 #include "tests/support/TempDir.h"
+#include "tests/support/TestIni.h"
 #include "zt/fnd/osdep/Retry.h"
 #include "zt/fnd/osdep/ScopedFd.h"
 
@@ -117,25 +116,6 @@ TEST_F(IniManagerFork, WhatAnotherProcessSavedWhileTheLockWasLostStays) {
   ini.reset();
   for (const char* item : {"first", "other", "second"}) expectOnDisk(item, "1");
   expectOnDisk("refused", "(none)");
-}
-
-// The same through the jar's own opening and saving, sidecar included.
-TEST_F(IniManagerFork, AJarIsNotSavedByAChildOfItsHolder) {
-  ini.reset();
-  zt::fnd::String name(file.c_str());
-  std::unique_ptr<CvlIniMgr> jar;
-  ASSERT_EQ(VltjarOpen(name.c_str(), &jar), S_OK);
-  ASSERT_EQ(jar->SetItem("s", "parent", "1", true), S_OK);
-  ASSERT_EQ(VltjarSaveChanges(name.c_str(), jar.get()), S_OK);
-  std::string sidecar = CvlIniMgr::SidecarName(file);
-  std::string before = ReadBytes(file), digestBefore = ReadBytes(sidecar);
-  EXPECT_EQ(InChild([&] {
-              jar->SetItem("s", "child", "1", true);
-              EXPECT_LT(VltjarSaveChanges(name.c_str(), jar.get()), 0);
-            }),
-            0);
-  EXPECT_EQ(ReadBytes(file), before);
-  EXPECT_EQ(ReadBytes(sidecar), digestBefore);
 }
 
 // A thread may have any number of objects of one file, in a child as in its parent.

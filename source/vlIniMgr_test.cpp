@@ -13,12 +13,12 @@
 
 #include "source/Common/vltFileSecurity.h"
 #include "source/IniSidecar.h"
-#include "source/TestIni.h"
 #include "tests/support/Child.h"
 #include "tests/support/FileSizeLimit.h"
 #include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
 #include "tests/support/TempDir.h"
+#include "tests/support/TestIni.h"
 #include "zt/fnd/Exception.h"
 
 namespace {

@@ -2,7 +2,7 @@
 
 // Small helpers of all registrar code.
 
-#include "source/Utilities/vltTypes.h"
+#include "source/Common/vltTypes.h"
 #include "zt/fnd/AbsTime.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/Vector.h"

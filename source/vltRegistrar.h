@@ -6,7 +6,7 @@
 #include <optional>
 
 #include "source/Common/ZtUtils/General/ztSync.h"
-#include "source/Utilities/vltInterfaces.h"
+#include "source/Common/vltInterfaces.h"
 #include "source/vlrHelpers.h"
 #include "source/xcomponent.h"
 #include "zt/fnd/Guid.h"

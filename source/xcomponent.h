@@ -2,7 +2,7 @@
 
 // The component record as an object, and its conversions between generations.
 
-#include "source/Utilities/vltTypes.h"
+#include "source/Common/vltTypes.h"
 
 namespace zt::fnd::osdep {
 class SharedLibrary;

@@ -4,7 +4,7 @@
 #include <string>
 
 #include "tests/support/TempDir.h"
-#include "ztini/TestDocument.h"
+#include "tests/support/TestDocument.h"
 
 namespace {
 

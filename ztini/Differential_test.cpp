@@ -10,7 +10,7 @@
 #include <string>
 #include <string_view>
 
-#include "ztini/TestDocument.h"
+#include "tests/support/TestDocument.h"
 
 namespace {
 

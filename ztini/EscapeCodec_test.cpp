@@ -4,8 +4,8 @@
 
 #include <string>
 
+#include "tests/support/FailingAlloc.h"
 #include "ztini/Alloc.h"
-#include "ztini/FailingAlloc.h"
 
 namespace {
 

@@ -11,8 +11,8 @@
 
 #include "tests/support/Child.h"
 #include "tests/support/FailSystemCall.h"
+#include "tests/support/FailingAlloc.h"
 #include "tests/support/TempDir.h"
-#include "ztini/FailingAlloc.h"
 
 namespace {
 

@@ -8,9 +8,9 @@
 #include <string>
 
 #include "tests/support/Child.h"
+#include "tests/support/FailingAlloc.h"
 #include "tests/support/TempDir.h"
-#include "ztini/FailingAlloc.h"
-#include "ztini/TestDocument.h"
+#include "tests/support/TestDocument.h"
 
 namespace {
 

@@ -5,7 +5,7 @@
 #include <cstring>
 #include <string>
 
-#include "ztini/FailingAlloc.h"
+#include "tests/support/FailingAlloc.h"
 
 namespace {
 

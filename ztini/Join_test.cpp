@@ -5,8 +5,8 @@
 #include <climits>
 #include <string>
 
-#include "ztini/FailingAlloc.h"
-#include "ztini/TestDocument.h"
+#include "tests/support/FailingAlloc.h"
+#include "tests/support/TestDocument.h"
 
 namespace {
 

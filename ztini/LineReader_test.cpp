@@ -4,8 +4,8 @@
 
 #include <string>
 
-#include "ztini/FailingAlloc.h"
-#include "ztini/TestDocument.h"
+#include "tests/support/FailingAlloc.h"
+#include "tests/support/TestDocument.h"
 #include "ztini/ztini.h"
 
 namespace {

@@ -5,7 +5,7 @@
 #include <memory>
 #include <vector>
 
-#include "ztini/FailingAlloc.h"
+#include "tests/support/FailingAlloc.h"
 
 namespace {
 

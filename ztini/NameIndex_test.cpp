@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "ztini/FailingAlloc.h"
+#include "tests/support/FailingAlloc.h"
 
 namespace {
 

@@ -2,8 +2,8 @@
 
 #include <string>
 
-#include "ztini/FailingAlloc.h"
-#include "ztini/TestDocument.h"
+#include "tests/support/FailingAlloc.h"
+#include "tests/support/TestDocument.h"
 
 namespace {
 

@@ -3,8 +3,8 @@
 #include <cmath>
 #include <string>
 
-#include "ztini/FailingAlloc.h"
-#include "ztini/TestDocument.h"
+#include "tests/support/FailingAlloc.h"
+#include "tests/support/TestDocument.h"
 
 namespace {
 

@@ -4,7 +4,7 @@
 
 #include <string>
 
-#include "ztini/FailingAlloc.h"
+#include "tests/support/FailingAlloc.h"
 
 namespace {
 

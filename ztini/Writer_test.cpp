@@ -4,9 +4,9 @@
 #include <string>
 #include <vector>
 
+#include "tests/support/FailingAlloc.h"
 #include "tests/support/TempDir.h"
-#include "ztini/FailingAlloc.h"
-#include "ztini/TestDocument.h"
+#include "tests/support/TestDocument.h"
 
 namespace {
 

@@ -4,8 +4,8 @@
 #include <functional>
 #include <new>
 
-#include "source/Common/FakeStorage.h"
-#include "source/Utilities/vltHookPoints.h"
+#include "tests/support/ArmedHook.h"
+#include "tests/support/FakeStorage.h"
 #include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
 #include "tests/support/MemoryLimit.h"
@@ -102,20 +102,6 @@ TEST(AttributeList, ACountThatIsNotTrueIsOutOfMemory) {
   EXPECT_EQ(code, 0);
 }
 
-// Runs expectations in a process that is armed at this point.
-int Armed(const char* point, const char* fault, const std::function<void()>& body) {
-  Installation installation;
-  WriteBytes(installation.root() + "/VLTHooks.ini",
-             std::string("[Hook]\nName = ") + point + "\n" + fault + " = true\n");
-  return InChild([&] {
-    vltRefreshHook();
-    body();
-  });
-}
-
-constexpr const char* kSimulate = "SimulateMemoryAllocationFailure";
-constexpr const char* kThrow = "SimulateMemoryAllocationFailureAndThrow";
-
 TEST(AttributeList, HookPointsActAsAFailedAllocation) {
   const std::pair<int, const char*> points[] = {{8, "TestHookNT\"./source/Common/vltcmn\"96"},
                                                 {9, "TestHookNT\"./source/Common/vltcmn\"111"},
@@ -124,7 +110,7 @@ TEST(AttributeList, HookPointsActAsAFailedAllocation) {
                                                 {11, "TestHookNT\"./source/Common/vltcmn\"158"},
                                                 {12, "TestHookNT\"./source/Common/vltcmn\"174"}};
   for (const auto& [type, point] : points) {
-    int code = Armed(point, kSimulate, [type = type] {
+    int code = InArmedChild(point, kFailedAllocation, [type = type] {
       for (int other = 8; other <= 13; ++other) {
         if (other == type) {
           EXPECT_EQ(ListText(Filled(other), E_OUTOFMEMORY), L"{");
@@ -141,7 +127,7 @@ TEST(AttributeList, HookPointsActAsAFailedAllocation) {
 }
 
 TEST(AttributeList, AnExceptionGivesEverythingBack) {
-  int code = Armed(hook::kStringFromClsid, kThrow, [] {
+  int code = InArmedChild(hook::kStringFromClsid, kThrownBadAlloc, [] {
     for (int type : {5, 6, 12, 13}) {
       g_references = 0;
       Answers answers = Filled(type);
@@ -156,7 +142,7 @@ TEST(AttributeList, AnExceptionGivesEverythingBack) {
 }
 
 TEST(AttributeList, ATextThatMemoryDoesNotSufficeForIsNullAndInAListEmpty) {
-  int code = Armed(hook::kDuplicateString2, kSimulate, [] {
+  int code = InArmedChild(hook::kDuplicateString2, kFailedAllocation, [] {
     for (int type : {12, 13}) EXPECT_EQ(ListText(Filled(type), S_OK), L"{,}");
     for (int type : {5, 6}) EXPECT_EQ(TextOf(Filled(type), S_OK), L"(null)");
     Answers failing = Filled(5);

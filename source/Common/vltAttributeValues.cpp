@@ -5,9 +5,9 @@
 #include <algorithm>
 
 #include "source/Common/vltFailure.h"
+#include "source/Common/vltHookPoints.h"
+#include "source/Common/vltTestHook.h"
 #include "source/Common/vltcmn.h"
-#include "source/Utilities/vltHookPoints.h"
-#include "source/Utilities/vltTestHook.h"
 #include "ztcom/ztcore/ztcom.h"
 
 namespace {

@@ -10,7 +10,7 @@
 // the storage's as they come. A text that memory does not suffice for is null whatever the result, in
 // a list it is empty: test it. Threads: as the storage allows.
 
-#include "source/Utilities/vltInterfaces.h"
+#include "source/Common/vltInterfaces.h"
 #include "zt/fnd/StringFwd.h"
 
 HRESULT vltGetAttributeType(IvltObject* object, unsigned id, _vltAttributeType* type);

@@ -5,7 +5,7 @@
 
 #include <functional>
 
-#include "source/Common/FakeStorage.h"
+#include "tests/support/FakeStorage.h"
 #include "tests/support/InChild.h"
 
 namespace vlt::test {

@@ -7,9 +7,9 @@
 #include <vector>
 
 #include "source/Common/vltFailure.h"
+#include "source/Common/vltHookPoints.h"
+#include "source/Common/vltTestHook.h"
 #include "source/Common/vltcmn.h"
-#include "source/Utilities/vltHookPoints.h"
-#include "source/Utilities/vltTestHook.h"
 
 using zt::fnd::String;
 using zt::fnd::Vector;

@@ -4,8 +4,7 @@
 
 #include <map>
 
-#include "source/Utilities/vltTypes.h"
-#include "source/vlrHelpers.h"
+#include "source/Common/vltTypes.h"
 #include "zt/fnd/Guid.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/Vector.h"

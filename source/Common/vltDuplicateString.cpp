@@ -3,9 +3,9 @@
 #include <wchar.h>
 
 #include "source/Common/vltFailure.h"
+#include "source/Common/vltHookPoints.h"
+#include "source/Common/vltTestHook.h"
 #include "source/Common/vltcmn.h"
-#include "source/Utilities/vltHookPoints.h"
-#include "source/Utilities/vltTestHook.h"
 
 namespace {
 

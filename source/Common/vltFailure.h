@@ -2,7 +2,7 @@
 
 // The one way in which the library reports a failure beside its result code.
 
-#include "source/Utilities/vltTypes.h"
+#include "source/Common/vltTypes.h"
 
 // Bit of the trace mask under which error messages go out.
 inline constexpr unsigned kTraceErrors = 2;

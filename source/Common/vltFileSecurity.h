@@ -3,7 +3,7 @@
 // The files that the system writes for itself belong to all users of the machine: they are opened
 // up after each change. The functions here do that, and stamp files that are given up.
 
-#include "source/Utilities/vltTypes.h"
+#include "source/Common/vltTypes.h"
 #include "zt/fnd/String.h"
 
 // Mode of every shared file and directory.

@@ -5,9 +5,9 @@
 #include <tuple>
 
 #include "source/Common/vltFailure.h"
+#include "source/Common/vltHookPoints.h"
+#include "source/Common/vltTestHook.h"
 #include "source/Common/vltcmn.h"
-#include "source/Utilities/vltHookPoints.h"
-#include "source/Utilities/vltTestHook.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/Guid.h"
 

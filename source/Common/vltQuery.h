@@ -3,7 +3,7 @@
 // Queries: a GUID, two flags and terms of an attribute id with a typed value. Sent and received
 // over the storage's typed streams, printed as one line, freed.
 
-#include "source/Utilities/vltInterfaces.h"
+#include "source/Common/vltInterfaces.h"
 
 struct _vltQueryTerm {
   vltAttributeID attributeID;

@@ -8,8 +8,8 @@
 #include <functional>
 
 #include "source/Common/vltcmn.h"
-#include "source/Utilities/vltHookPoints.h"
 #include "source/Utilities/vltutils.h"
+#include "tests/support/ArmedHook.h"
 #include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
 #include "tests/support/MemoryLimit.h"
@@ -411,18 +411,8 @@ TEST(Query, ManyLongTextsTakeTimeInProportion) {
 
 // ---- Hook points
 
-int Armed(const char* point, const std::function<void()>& body) {
-  Installation installation;
-  WriteBytes(installation.root() + "/VLTHooks.ini",
-             std::string("[Hook]\nName = ") + point + "\nSimulateMemoryAllocationFailure = true\n");
-  return InChild([&] {
-    vltRefreshHook();
-    body();
-  });
-}
-
 TEST(Query, AnArmedReadIsOutOfMemory) {
-  int code = Armed("TestHookNT\"./source/Common/vltcmn\"1257", [] {
+  int code = InArmedChild("TestHookNT\"./source/Common/vltcmn\"1257", kFailedAllocation, [] {
     std::vector<_vltQueryTerm> terms = AllTerms();
     _vltQuery query = Query(terms), read = {};
     Reader reader;
@@ -438,7 +428,7 @@ TEST(Query, AnArmedReadIsOutOfMemory) {
 }
 
 TEST(Query, AnArmedPrintIsOutOfMemory) {
-  int code = Armed("TestHookNT\"./source/Common/vltcmn\"1132", [] {
+  int code = InArmedChild("TestHookNT\"./source/Common/vltcmn\"1132", kFailedAllocation, [] {
     std::vector<_vltQueryTerm> terms = AllTerms();
     _vltQuery query = Query(terms);
     wchar_t* text = nullptr;
@@ -449,7 +439,7 @@ TEST(Query, AnArmedPrintIsOutOfMemory) {
 }
 
 TEST(Query, WhatCannotBeAppendedIsLeftOut) {
-  int code = Armed(hook::kAppendString2, [] {
+  int code = InArmedChild(hook::kAppendString2, kFailedAllocation, [] {
     std::wstring text(1000, L'x');
     EXPECT_EQ(LineOf({TextTerm(1, 1, text.c_str()), TextTerm(2, 0, text.c_str()), I32Term(3, 4)}),
               kGuidText + L",t,a,1=~,2=,3=4");

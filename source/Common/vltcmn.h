@@ -6,7 +6,7 @@
 //
 // Texts handed out are vltTaskMemAlloc blocks. All functions are reentrant.
 
-#include "source/Utilities/vltInterfaces.h"
+#include "source/Common/vltInterfaces.h"
 #include "zt/fnd/String.h"
 
 // ---- Memory of whatever crosses the surface.

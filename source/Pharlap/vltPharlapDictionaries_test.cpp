@@ -8,9 +8,9 @@
 #include <filesystem>
 
 #include "source/Common/vltcmn.h"
-#include "source/Pharlap/TestRegistrar.h"
 #include "tests/support/FileSizeLimit.h"
 #include "tests/support/SaveCounter.h"
+#include "tests/support/TestRegistrar.h"
 
 namespace vlt::test {
 namespace {

@@ -6,8 +6,8 @@
 #include <filesystem>
 
 #include "source/DurableCopy.h"
-#include "source/Pharlap/TestRegistrar.h"
 #include "tests/support/Child.h"
+#include "tests/support/TestRegistrar.h"
 
 namespace vlt::test {
 namespace {

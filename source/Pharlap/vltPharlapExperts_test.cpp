@@ -5,10 +5,10 @@
 
 #include <filesystem>
 
-#include "source/Pharlap/TestRegistrar.h"
 #include "tests/support/AllocFailure.h"
 #include "tests/support/FileSizeLimit.h"
 #include "tests/support/SaveCounter.h"
+#include "tests/support/TestRegistrar.h"
 
 namespace vlt::test {
 namespace {

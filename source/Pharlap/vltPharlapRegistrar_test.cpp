@@ -11,9 +11,9 @@
 #include <filesystem>
 
 #include "source/Common/vltFileSecurity.h"
-#include "source/Pharlap/TestRegistrar.h"
 #include "source/Pharlap/registrarText.h"
 #include "tests/support/SaveCounter.h"
+#include "tests/support/TestRegistrar.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
 

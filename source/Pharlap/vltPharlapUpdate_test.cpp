@@ -5,8 +5,8 @@
 
 #include <filesystem>
 
-#include "source/Pharlap/TestRegistrar.h"
 #include "tests/support/SaveCounter.h"
+#include "tests/support/TestRegistrar.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/OSException.h"
 

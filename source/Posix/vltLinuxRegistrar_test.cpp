@@ -4,8 +4,8 @@
 
 #include <algorithm>
 
-#include "source/Pharlap/TestRegistrar.h"
 #include "tests/support/SaveCounter.h"
+#include "tests/support/TestRegistrar.h"
 #include "zt/fnd/Exception.h"
 
 namespace vlt::test {

@@ -12,7 +12,7 @@
 // Libraries are loaded for the check and unloaded again, in this process: their initialisers run.
 // No lock is held meanwhile, so they may call this library.
 
-#include "source/Utilities/vltInterfaces.h"
+#include "source/Common/vltInterfaces.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/Vector.h"
 

@@ -5,9 +5,9 @@
 #include <string>
 
 #include "source/Common/vltFailure.h"
+#include "source/Common/vltHookPoints.h"
+#include "source/Common/vltTestHook.h"
 #include "source/Posix/vltLinuxRegistrar.h"
-#include "source/Utilities/vltHookPoints.h"
-#include "source/Utilities/vltTestHook.h"
 #include "source/Utilities/vltutils.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "source/Utilities/vltInterfaces.h"
+#include "source/Common/vltInterfaces.h"
 
 // Makes the locks of the registrar's entry, so that the first call finds them.
 void vlPrepareRegistrarEntry();

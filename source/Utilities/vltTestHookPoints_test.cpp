@@ -15,12 +15,12 @@
 #include <vector>
 
 #include "source/Common/ZtUtils/General/vlTracer.h"
+#include "source/Common/vltTestHook.h"
 #include "source/Common/vltcmn.h"
-#include "source/Utilities/HookPointRows.h"
-#include "source/Utilities/vltTestHook.h"
 #include "source/Utilities/vltjar.h"
 #include "source/Utilities/vltutils.h"
 #include "tests/support/EventPlace.h"
+#include "tests/support/HookPointRows.h"
 #include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
 #include "tests/support/MemoryLimit.h"

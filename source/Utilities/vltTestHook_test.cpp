@@ -1,4 +1,4 @@
-#include "source/Utilities/vltTestHook.h"
+#include "source/Common/vltTestHook.h"
 
 #include <fcntl.h>
 #include <gtest/gtest.h>

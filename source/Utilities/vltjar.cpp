@@ -4,9 +4,9 @@
 
 #include "source/Common/vltFailure.h"
 #include "source/Common/vltFileSecurity.h"
+#include "source/Common/vltHookPoints.h"
+#include "source/Common/vltTestHook.h"
 #include "source/IniSidecar.h"
-#include "source/Utilities/vltHookPoints.h"
-#include "source/Utilities/vltTestHook.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/path.h"
 

@@ -17,7 +17,7 @@
 
 #include <memory>
 
-#include "source/Utilities/vltTypes.h"
+#include "source/Common/vltTypes.h"
 #include "source/vlIniMgr.h"
 #include "zt/fnd/String.h"
 

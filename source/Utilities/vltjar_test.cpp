@@ -12,9 +12,9 @@
 #include <vector>
 
 #include "source/Common/vltFileSecurity.h"
+#include "source/Common/vltHookPoints.h"
+#include "source/Common/vltTestHook.h"
 #include "source/Common/vltcmn.h"
-#include "source/Utilities/vltHookPoints.h"
-#include "source/Utilities/vltTestHook.h"
 #include "source/Utilities/vltutils.h"
 #include "tests/support/BuildModule.h"
 #include "tests/support/Child.h"

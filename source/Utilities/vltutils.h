@@ -25,11 +25,9 @@
 //    parent's registrar, and its lock from the first change on that no other process has it.
 
 #include "source/Common/ZtUtils/General/vlt_vlTracer.h"
-#include "source/Utilities/vltInterfaces.h"
-#include "source/Utilities/vltTypes.h"
+#include "source/Common/vltInterfaces.h"
+#include "source/Common/vltTypes.h"
 #include "zt/fnd/StringFwd.h"
-
-#define VLT_EXPORT extern "C" __attribute__((visibility("default")))
 
 // ---- Memory.
 

@@ -12,7 +12,7 @@
 
 #include <string>
 
-#include "source/Utilities/vltTypes.h"
+#include "source/Common/vltTypes.h"
 
 // Domain of the preference "Dir", and the install directory where it is not set.
 inline constexpr const char* kKorPreferenceDomain = "com.zentrex.kor";

@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "source/Utilities/vltTypes.h"
+#include "source/Common/vltTypes.h"
 #include "zt/fnd/String.h"
 
 struct IniStructForwardReferenceTag;

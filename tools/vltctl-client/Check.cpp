@@ -1,4 +1,4 @@
-#include "tools/vltctl/Check.h"
+#include "tools/vltctl-client/Check.h"
 
 #include <dlfcn.h>
 #include <elf.h>
@@ -19,8 +19,8 @@
 #include <set>
 #include <system_error>
 
-#include "tools/vltctl/DropRights.h"
-#include "tools/vltctl/LibraryTrust.h"
+#include "tools/vltctl-client/DropRights.h"
+#include "tools/vltctl-client/LibraryTrust.h"
 
 namespace vltctl {
 namespace {

@@ -1,4 +1,4 @@
-#include "tools/vltctl-admin/Reading.h"
+#include "tools/vltctl/Reading.h"
 
 #include <errno.h>
 #include <fcntl.h>

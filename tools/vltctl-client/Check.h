@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-#include "tools/vltctl/Component.h"
+#include "tools/vltctl-client/Component.h"
 
 // The component check, each component in a child process: a library that crashes, hangs or ends its
 // process while it is loaded takes nothing else down. A component that is registered without a readable

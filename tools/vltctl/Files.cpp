@@ -8,7 +8,7 @@
 #include "source/Utilities/vltSettingsKeys.h"
 #include "source/vlIniMgr.h"
 #include "tools/common/Terminal.h"
-#include "tools/vltctl-admin/Reading.h"
+#include "tools/vltctl/Reading.h"
 #include "zt/fnd/String.h"
 
 using vltctl::ForTerminal;

@@ -3,7 +3,7 @@
 // Interfaces in the manner of COM: slot 0 QueryInterface, 1 AddRef, 2 Release, then the operations
 // in the order below. No interface has a virtual destructor; the protected one forbids delete.
 
-#include "source/Utilities/vltTypes.h"
+#include "source/Common/vltTypes.h"
 
 // Walks the components of one type, from a snapshot of the identifiers. Belongs to one thread.
 struct IvltEnumComponent : IUnknown {

@@ -1,20 +1,17 @@
-#include "source/Utilities/vltTestHook.h"
+#include "source/Utilities/vltHookFile.h"
 
 #include <stdlib.h>
-#include <string.h>
 
-#include <atomic>
 #include <new>
-#include <set>
 #include <string>
 
+#include "source/Common/vltTestHook.h"
 #include "source/Utilities/vltutils.h"
 #include "source/vlIniMgr.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
-#include "zt/fnd/osdep/Sleep.h"
 #include "zt/fnd/osdep/StringCompare.h"
 #include "zt/fnd/osdep/path.h"
 
@@ -22,76 +19,33 @@ using zt::fnd::String;
 
 namespace {
 
-constexpr uint32_t kForever = 0x7FFFFFFF;
-
-constinit std::atomic<bool> causeHang{false};
-constinit std::atomic<bool> causeCrash{false};
-constinit std::atomic<bool> simulateMemoryAllocationFailure{false};
-constinit std::atomic<bool> simulateMemoryAllocationFailureAndThrow{false};
-constinit std::atomic<bool> causeMemoryAllocationFailure{false};
-constinit std::atomic<uint32_t> hangTimeInMSecs{kForever};
-// Replaced whole, since another thread may be comparing with the old one.
-constinit std::atomic<const char*> currentHookName{""};
-
-// A copy that stays for good; one for each name, as a process may refresh as often as it likes.
-struct KeptNames {
-  zt::fnd::osdep::ForkSafeMutex lock{zt::fnd::osdep::AtFork::Wait, 70};
-  std::set<std::string> names;
-};
-
-const char* Kept(const std::string& name) {
-  KeptNames& kept = zt::fnd::osdep::LeakedInstance<KeptNames>();
-  zt::fnd::osdep::ForkSafeHold hold(kept.lock);
-  return kept.names.insert(name).first->c_str();
-}
-
 bool IsTrue(const CvlIniMgr& ini, const char* key) {
   std::string value;
   return ini.GetItem("Hook", key, &value) >= 0 &&
          zt::fnd::osdep::StringCaseCompare(String(value.c_str()).c_str(), L"true") == 0;
 }
 
-void ArmIfTrue(const CvlIniMgr& ini, const char* key, std::atomic<bool>& flag) {
-  if (IsTrue(ini, key)) flag = true;
-}
-
 uint32_t HangTime(const CvlIniMgr& ini) {
   std::string value;
   return ini.GetItem("Hook", "HangTime", &value) >= 0 ? static_cast<uint32_t>(atol(value.c_str()))
-                                                      : kForever;
+                                                      : vlt::hook::kForeverInMSecs;
 }
 
-void Arm(const CvlIniMgr& ini) {
-  std::string name;
-  if (ini.GetItem("Hook", "Name", &name) < 0) return;
-  currentHookName = Kept(name);
-  ArmIfTrue(ini, "Crash", causeCrash);
-  if (IsTrue(ini, "Hang")) {
-    hangTimeInMSecs = HangTime(ini);
-    causeHang = true;
-  }
-  ArmIfTrue(ini, "SimulateMemoryAllocationFailure", simulateMemoryAllocationFailure);
-  ArmIfTrue(ini, "SimulateMemoryAllocationFailureAndThrow",
-            simulateMemoryAllocationFailureAndThrow);
-  ArmIfTrue(ini, "MemoryAllocationFailure", causeMemoryAllocationFailure);
+vlt::hook::Faults FaultsOf(const CvlIniMgr& ini) {
+  vlt::hook::Faults faults;
+  faults.crash = IsTrue(ini, "Crash");
+  faults.hang = IsTrue(ini, "Hang");
+  faults.hangTimeInMSecs = HangTime(ini);
+  faults.simulateMemoryAllocationFailure = IsTrue(ini, "SimulateMemoryAllocationFailure");
+  faults.simulateMemoryAllocationFailureAndThrow =
+      IsTrue(ini, "SimulateMemoryAllocationFailureAndThrow");
+  if (IsTrue(ini, "MemoryAllocationFailure")) faults.takeMemory = exhaustMemory;
+  return faults;
 }
 
 }  // namespace
 
-extern "C" unsigned vltTestHook(const char* name) {
-  if (!name || strcmp(currentHookName, name) != 0 || !*name) return 0;
-  if (causeHang) {
-    zt::fnd::osdep::Sleep(hangTimeInMSecs);
-    return 1;
-  }
-  if (causeCrash) exit(0);
-  if (simulateMemoryAllocationFailure) return 1;
-  if (simulateMemoryAllocationFailureAndThrow) throw std::bad_alloc();
-  if (causeMemoryAllocationFailure) exhaustMemory();
-  return 1;
-}
-
-extern "C" void vltRefreshHook() {
+void vltRefreshHook() {
   try {
     const char* directory = GetCurrentVltPath();
     if (!directory) return;
@@ -100,7 +54,8 @@ extern "C" void vltRefreshHook() {
     file += L"VLTHooks.ini";
     if (!zt::fnd::osdep::path::DoesFileExist(file)) return;
     CvlIniMgr ini(zt::fnd::AnsiString(file).c_str(), false, nullptr, false, false);
-    Arm(ini);
+    std::string name;
+    if (ini.GetItem("Hook", "Name", &name) >= 0) vlt::hook::Arm(name, FaultsOf(ini));
   } catch (...) {
     // The process under test must not notice a bad hook file; it is simply not armed.
   }

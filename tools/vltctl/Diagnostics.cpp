@@ -11,10 +11,10 @@
 #include <system_error>
 
 #include "source/Common/Posix/vltlinuxos.h"
-#include "source/Utilities/vltHookPoints.h"
+#include "source/Common/vltHookPoints.h"
 #include "source/vlIniMgr.h"
 #include "tools/common/Terminal.h"
-#include "tools/vltctl-admin/Reading.h"
+#include "tools/vltctl/Reading.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/String.h"
 

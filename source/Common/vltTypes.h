@@ -9,6 +9,8 @@
 #include "zt/fnd/GuidType.h"
 #include "ztcom/ztcore/ztunknown.h"
 
+#define VLT_EXPORT extern "C" __attribute__((visibility("default")))
+
 // vltCreateGuid: the library "ZT-RPC" did not load, or has no entry UuidCreate.
 #define VLT_E_UUID_LIBRARY (static_cast<HRESULT>(0x80040325))
 #define VLT_E_UUID_ENTRY (static_cast<HRESULT>(0x80040326))

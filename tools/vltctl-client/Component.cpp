@@ -1,4 +1,4 @@
-#include "tools/vltctl/Component.h"
+#include "tools/vltctl-client/Component.h"
 
 #include <stdlib.h>
 #include <string.h>

@@ -10,7 +10,7 @@
 #include <map>
 #include <system_error>
 
-#include "tools/vltctl-admin/Reading.h"
+#include "tools/vltctl/Reading.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/EventStateFile.h"
 #include "zt/fnd/osdep/ScopedFd.h"

@@ -1,4 +1,4 @@
-#include "tools/vltctl/LibraryTrust.h"
+#include "tools/vltctl-client/LibraryTrust.h"
 
 #include <errno.h>
 #include <limits.h>

@@ -7,13 +7,13 @@
 #include <new>
 #include <set>
 
-#include "source/Common/FakeStorage.h"
 #include "source/Common/vltBindingClasses.h"
+#include "source/Common/vltHookPoints.h"
 #include "source/Common/vltQuery.h"
 #include "source/Common/vltcmn.h"
-#include "source/Utilities/vltHookPoints.h"
 #include "source/Utilities/vltjar.h"
 #include "source/Utilities/vltutils.h"
+#include "tests/support/FakeStorage.h"
 
 namespace vlt::test::points {
 

@@ -1,4 +1,4 @@
-#include "tools/vltctl/DropRights.h"
+#include "tools/vltctl-client/DropRights.h"
 
 #include <fcntl.h>
 #include <grp.h>

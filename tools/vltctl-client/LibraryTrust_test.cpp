@@ -1,4 +1,4 @@
-#include "tools/vltctl/LibraryTrust.h"
+#include "tools/vltctl-client/LibraryTrust.h"
 
 #include <gtest/gtest.h>
 #include <sys/stat.h>
