@@ -8,7 +8,7 @@
 #include "source/Common/vltQuery.h"
 #include "source/Common/vltcmn.h"
 #include "tests/support/Child.h"
-#include "tests/support/FailingHeap.h"
+#include "tests/support/RefusingMalloc.h"
 #include "tests/support/Sanitizer.h"
 #include "tests/support/TempDir.h"
 

@@ -18,7 +18,7 @@ constinit std::atomic<bool> causeCrash{false};
 constinit std::atomic<bool> simulateMemoryAllocationFailure{false};
 constinit std::atomic<bool> simulateMemoryAllocationFailureAndThrow{false};
 constinit std::atomic<void (*)()> causeMemoryAllocationFailure{nullptr};
-constinit std::atomic<uint32_t> hangTimeInMSecs{vlt::hook::kForeverInMSecs};
+constinit std::atomic<uint32_t> hangTimeInMSecs{vlt::hook::Faults::kForeverInMSecs};
 // Replaced whole, since another thread may be comparing with the old one.
 constinit std::atomic<const char*> currentHookName{""};
 

@@ -19,11 +19,10 @@ VLT_EXPORT unsigned vltTestHook(const char* name);
 
 namespace vlt::hook {
 
-// Waits no shorter than any test or administrator does.
-inline constexpr uint32_t kForeverInMSecs = 0x7FFFFFFF;
-
 // What an armed point does. The members are in order of precedence.
 struct Faults {
+  static constexpr uint32_t kForeverInMSecs = 0x7FFFFFFF;
+
   bool hang = false;
   uint32_t hangTimeInMSecs = kForeverInMSecs;  // counts with `hang` only
   bool crash = false;

@@ -28,7 +28,7 @@ bool IsTrue(const CvlIniMgr& ini, const char* key) {
 uint32_t HangTime(const CvlIniMgr& ini) {
   std::string value;
   return ini.GetItem("Hook", "HangTime", &value) >= 0 ? static_cast<uint32_t>(atol(value.c_str()))
-                                                      : vlt::hook::kForeverInMSecs;
+                                                      : vlt::hook::Faults::kForeverInMSecs;
 }
 
 vlt::hook::Faults FaultsOf(const CvlIniMgr& ini) {
