@@ -6,3 +6,13 @@ foreach(source ${benches})
   add_executable(${name} EXCLUDE_FROM_ALL ${source})
   target_link_libraries(${name} PRIVATE vlt_strict vltexports benchmark::benchmark)
 endforeach()
+
+# Beside other libraries: packages of the distribution, needed by this program only.
+find_package(PkgConfig REQUIRED)
+pkg_check_modules(PEERS IMPORTED_TARGET glib-2.0 inih libcrypto spdlog)
+if(PEERS_FOUND)
+  file(GLOB peers CONFIGURE_DEPENDS bench/peers/*.cpp)
+  add_executable(peers EXCLUDE_FROM_ALL ${peers})
+  target_link_libraries(peers PRIVATE vlt_strict vltexports PkgConfig::PEERS)
+  add_dependencies(peers vltutils)
+endif()
