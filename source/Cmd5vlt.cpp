@@ -3,6 +3,7 @@
 #include <string.h>
 
 #include <bit>
+#include <utility>
 
 namespace {
 
@@ -26,17 +27,38 @@ constexpr int kShifts[4][4] = {{7, 12, 17, 22}, {5, 9, 14, 20}, {4, 11, 16, 23},
 constexpr unsigned kWordStep[4] = {1, 5, 3, 7};
 constexpr unsigned kWordStart[4] = {0, 1, 5, 0};
 
-uint32_t Mix(int round, uint32_t x, uint32_t y, uint32_t z) {
-  switch (round) {
-    case 0:
-      return (x & y) | (~x & z);
-    case 1:
-      return (x & z) | (y & ~z);
-    case 2:
-      return x ^ y ^ z;
-    default:
-      return y ^ (x | ~z);
+// Step i of the 64. Each step waits for the b of the one before, so what does not need b is added first:
+// the auxiliary functions of RFC 1321 are written so that b comes in as late as possible.
+template <unsigned i>
+inline void Step(uint32_t& a, uint32_t b, uint32_t c, uint32_t d, const uint32_t* words) {
+  constexpr unsigned round = i / 16;
+  a += words[(kWordStart[round] + i * kWordStep[round]) % 16] + kSines[i];
+  if constexpr (round == 0) {
+    a += d ^ (b & (c ^ d));
+  } else if constexpr (round == 1) {
+    a += c & ~d;
+    a += b & d;
+  } else if constexpr (round == 2) {
+    a += b ^ (c ^ d);
+  } else {
+    a += c ^ (b | ~d);
   }
+  a = std::rotl(a, kShifts[round][i % 4]) + b;
+}
+
+// Four steps bring every word of the state back to its place.
+template <unsigned i>
+inline void FourSteps(uint32_t& a, uint32_t& b, uint32_t& c, uint32_t& d, const uint32_t* words) {
+  Step<i>(a, b, c, d, words);
+  Step<i + 1>(d, a, b, c, words);
+  Step<i + 2>(c, d, a, b, words);
+  Step<i + 3>(b, c, d, a, words);
+}
+
+template <unsigned... quarter>
+inline void AllSteps(uint32_t& a, uint32_t& b, uint32_t& c, uint32_t& d, const uint32_t* words,
+                     std::integer_sequence<unsigned, quarter...>) {
+  (FourSteps<4 * quarter>(a, b, c, d, words), ...);
 }
 
 }  // namespace
@@ -79,15 +101,7 @@ void Cmd5vlt::Transform(unsigned int* state, const unsigned char* block) {
   uint32_t words[16];
   Decode(words, block, kBlock);
   uint32_t a = state[0], b = state[1], c = state[2], d = state[3];
-  for (unsigned i = 0; i < 64; ++i) {
-    unsigned round = i / 16;
-    uint32_t word = words[(kWordStart[round] + i * kWordStep[round]) % 16];
-    uint32_t sum = a + Mix(static_cast<int>(round), b, c, d) + word + kSines[i];
-    a = d;
-    d = c;
-    c = b;
-    b += std::rotl(sum, kShifts[round][i % 4]);
-  }
+  AllSteps(a, b, c, d, words, std::make_integer_sequence<unsigned, 16>());
   state[0] += a;
   state[1] += b;
   state[2] += c;

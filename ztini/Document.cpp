@@ -12,6 +12,13 @@ bool EnclosedIn(char quote, const char* value, size_t length) {
   return length >= 2 && value[0] == quote && value[length - 1] == quote;
 }
 
+// The quote that the options have removed from the value; 0 for none.
+int32_t EnclosingQuote(const char* value, size_t length, int32_t readOptions) {
+  if ((readOptions & kIniReadDoubleQuotes) && EnclosedIn('"', value, length)) return '"';
+  if ((readOptions & kIniReadSingleQuotes) && EnclosedIn('\'', value, length)) return '\'';
+  return 0;
+}
+
 }  // namespace
 
 IniStructForwardReferenceTag* IniNew(int reserved) {
@@ -34,12 +41,15 @@ void IniDispose(IniStructForwardReferenceTag* doc) {
 }
 
 int32_t IniSetDuplicateChecking(IniStructForwardReferenceTag* doc, int32_t value) {
-  return doc ? std::exchange(doc->duplicateChecking, value) : 0;
+  if (!doc) return 0;
+  doc->settled = false;
+  return std::exchange(doc->duplicateChecking, value);
 }
 
 int32_t IniSetReadOptions(IniStructForwardReferenceTag* doc, int32_t bits) {
   if (!doc) return 0;
   doc->readOptions = bits;
+  doc->settled = false;
   return 1;
 }
 
@@ -81,27 +91,28 @@ IniEntry* IniNewEntry(const char* name, const char* value, int32_t readOptions) 
   return entry;
 }
 
-IniSection* IniReadSection(IniStructForwardReferenceTag* doc, const char* name) {
+IniSection* IniReadSection(IniStructForwardReferenceTag* doc, char* name) {
   void* place = doc->arena.record(sizeof(IniSection));
-  char* copy = place ? doc->arena.text(name, strlen(name)) : nullptr;
-  if (!copy) return nullptr;
+  if (!place) return nullptr;
   auto* section = new (place) IniSection(&doc->fold);
   section->flags = doc->sectionFlags;
-  section->name = copy;
+  section->name = name;
   section->nameInArena = section->recordInArena = 1;
   return section;
 }
 
-IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, const char* name, const char* value) {
+IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, char* value, size_t length) {
   void* place = doc->arena.record(sizeof(IniEntry));
-  char* nameCopy = place ? doc->arena.text(name, strlen(name)) : nullptr;
-  char* valueCopy = nameCopy ? doc->arena.text(value, strlen(value)) : nullptr;
-  if (!valueCopy) return nullptr;
+  if (!place) return nullptr;
   auto* entry = new (place) IniEntry;
-  entry->name = nameCopy;
-  entry->value = valueCopy;
+  entry->name = name;
+  entry->value = value;
   entry->nameInArena = entry->valueInArena = entry->recordInArena = 1;
-  IniNewEntryHandleQuotes(entry, doc->readOptions);
+  entry->quote = EnclosingQuote(value, length, doc->readOptions);
+  if (entry->quote) {
+    value[length - 1] = 0;
+    ++entry->value;
+  }
   return entry;
 }
 
@@ -125,12 +136,7 @@ void IniDisposeEntry(IniEntry* entry) {
 
 void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions) {
   const size_t length = strlen(entry->value);
-  entry->quote = 0;
-  if ((readOptions & kIniReadDoubleQuotes) && EnclosedIn('"', entry->value, length)) {
-    entry->quote = '"';
-  } else if ((readOptions & kIniReadSingleQuotes) && EnclosedIn('\'', entry->value, length)) {
-    entry->quote = '\'';
-  }
+  entry->quote = EnclosingQuote(entry->value, length, readOptions);
   if (!entry->quote) return;
   memmove(entry->value, entry->value + 1, length - 2);
   entry->value[length - 2] = 0;
@@ -165,4 +171,6 @@ void IniEmptyDocument(IniStructForwardReferenceTag* doc) {
   for (int32_t n = doc->sections.count(); n >= 1; --n) IniDisposeSection(doc->section(n));
   doc->sections.keepFirst(0);
   doc->arena.clear();
+  doc->text.reset();
+  doc->settled = false;
 }

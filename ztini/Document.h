@@ -11,8 +11,8 @@
 
 // The records behind the engine's handles. Callers outside see the functions of ztini.h only.
 //
-// What is read lies in the document's arena: records, names and values take no malloc block each, and
-// go when the document is emptied. What is put, and a name or value that is changed, has a block of its
+// What is read lies in the document's arena and in the text of its file: records, names and values take
+// no malloc block each, and go when the document is emptied. What is put, and a name or value that is changed, has a block of its
 // own, so that a document that is edited for months does not grow.
 
 inline constexpr char kIniNullSectionName[] = "(null)";
@@ -34,7 +34,8 @@ struct IniSection : ztini::NameNode {
 };
 
 struct IniStructForwardReferenceTag {
-  ztini::Arena arena;  // of what was read
+  ztini::Arena arena;     // of what was read
+  ztini::OwnedText text;  // of the file, cut into names and values; null: they are in the arena
   ztini::NameFold fold;
   ztini::NameList sections{&fold};       // of IniSection
   IniSection* currentSection = nullptr;  // the section last found, asked first
@@ -51,6 +52,10 @@ struct IniStructForwardReferenceTag {
   IniDurability durability = IniDurability::None;
   ztini::OwnedText fileName;  // last read or written successfully; null: none
   int64_t fileTimestamp = 0;
+  // Reading the file that the document would be written to gives this document; as long as the fold has
+  // this generation.
+  bool settled = false;
+  uint32_t settledFold = 0;
 
   ztini::NameMatch match() const {
     return caseSensitive ? ztini::NameMatch::Exact : ztini::NameMatch::IgnoreCase;
@@ -64,9 +69,11 @@ struct IniStructForwardReferenceTag {
 IniSection* IniNewSection(IniStructForwardReferenceTag* doc, const char* name);
 IniEntry* IniNewEntry(const char* name, const char* value, int32_t readOptions);
 
-// The same in the document's arena; the texts have no surrounding white space.
-IniSection* IniReadSection(IniStructForwardReferenceTag* doc, const char* name);
-IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, const char* name, const char* value);
+// The same in the document's arena, over texts that live as long and have no surrounding white space. The
+// quotes that enclose the value are cut off in place, where the options ask for it.
+IniSection* IniReadSection(IniStructForwardReferenceTag* doc, char* name);
+IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, char* value,
+                       size_t valueLength);
 
 // Frees the record and what it holds, but for what lies in the arena; it must be in no list. Null is
 // allowed.

@@ -112,6 +112,14 @@ int32_t AnalyzeItemName(const char* name, size_t* baseLength, long* number) {
   return 1;
 }
 
+bool IniMayBePiece(const char* name, const char* end) {
+  const char* digits = end;
+  while (digits > name && digits[-1] >= '0' && digits[-1] <= '9') --digits;
+  const ptrdiff_t markLength = sizeof kPieceMark - 1;
+  return digits < end && digits - name >= markLength &&
+         memcmp(digits - markLength, kPieceMark, markLength) == 0;
+}
+
 int32_t IniJoinPieces(IniStructForwardReferenceTag* doc) {
   for (int32_t n = 1; n <= doc->sections.count(); ++n) {
     if (!SectionJoin(doc->section(n)).run()) return kIniOutOfMemory;

@@ -15,6 +15,9 @@ inline constexpr size_t kIniLongestBaseName = 255;
 // beyond the platform's long and a base beyond kIniLongestBaseName included.
 int32_t AnalyzeItemName(const char* name, size_t* baseLength, long* number);
 
+// False only if the name is not that of a piece. For a name that is known by its ends.
+bool IniMayBePiece(const char* name, const char* end);
+
 // Merges, in each section, every run of a piece numbered 1 and the pieces with other numbers that
 // follow it into one item. The numbers need not ascend and the base names may differ; the first
 // piece gives name, place, line and quote. 0, or kIniOutOfMemory with the remaining runs unmerged.

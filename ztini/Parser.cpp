@@ -1,53 +1,112 @@
+#include "ztini/Parser.h"
+
 #include <cstring>
 
 #include "ztini/Document.h"
 #include "ztini/Join.h"
 #include "ztini/LineBuffer.h"
-#include "ztini/NameCompare.h"
 #include "ztini/StringTools.h"
+#include "ztini/TextLines.h"
 
 namespace {
 
-using ztini::LocaleFold;
+using ztini::NameFold;
+
+// Whether the text of a line stays where it is for the document's life, or only until the next line.
+enum class TextLife { Document, Line };
+
+// The names of a section's items, as far as a glance at their ends tells them apart. Most sections have
+// too few items for an index, and most names of a section differ in their last characters.
+class ItemKeys {
+ public:
+  using Key = uint64_t;
+
+  // Equal for names that are equal; of a trimmed name that is not empty.
+  static Key Of(const NameFold& fold, const char* begin, const char* end) {
+    const size_t length = static_cast<size_t>(end - begin);
+    Key key = length;
+    for (size_t i = 1; i <= 4 && i <= length; ++i) key = key << 8 | fold.upper(end[-int(i)]);
+    for (size_t i = 0; i < 3 && i < length; ++i) key = key << 8 | fold.upper(begin[i]);
+    return key;
+  }
+
+  // Forgets all; the section that follows has so many items, of which nothing is known.
+  void start(int32_t items) {
+    m_count = 0;
+    m_good = items == 0;
+  }
+  void add(Key key) {
+    m_good = m_good && m_count < kMost;
+    if (m_good) m_keys[m_count++] = key;
+  }
+  // False only if no item has a name of this key.
+  bool mayHave(Key key) const {
+    if (!m_good) return true;
+    for (int i = 0; i < m_count; ++i) {
+      if (m_keys[i] == key) return true;
+    }
+    return false;
+  }
+
+ private:
+  static constexpr int kMost = 16;
+  Key m_keys[kMost];
+  int m_count = 0;
+  bool m_good = false;
+};
 
 // Where a line stands in the document while it is built. A line's text is cut in place.
 class DocumentBuilder {
  public:
-  explicit DocumentBuilder(IniStructForwardReferenceTag* doc) : m_doc(doc) {}
+  DocumentBuilder(IniStructForwardReferenceTag* doc, TextLife life) : m_doc(doc), m_life(life) {}
 
-  // 0, also for a bad line, or kIniOutOfMemory.
-  int32_t takeLine(char* text, int32_t line);
+  // Takes the text [begin, end), of which *end may be written. 0, also for a bad line, or
+  // kIniOutOfMemory.
+  int32_t takeLine(char* begin, char* end, int32_t line);
+
+  // After the last line.
+  int32_t finish();
 
  private:
-  int32_t takeHeader(char* afterBracket, int32_t line);
-  int32_t takeItem(char* text, int32_t line);
-  int32_t store(const char* name, const char* value, int32_t line);
+  int32_t takeHeader(char* begin, char* end, int32_t line);
+  int32_t takeItem(char* begin, char* end, int32_t line);
+  int32_t store(char* name, char* nameEnd, char* value, char* valueEnd, int32_t line);
   int32_t replace(IniEntry* entry, const char* value, int32_t line);
-  int32_t appendEntry(const char* name, const char* value, int32_t line);
-  int32_t openSection(const char* name, int32_t line);
+  int32_t appendEntry(char* name, char* nameEnd, char* value, char* valueEnd, int32_t line);
+  int32_t openSection(char* name, char* nameEnd, int32_t line);
+  int32_t openNullSection();
   int32_t badLine(int32_t line);
+  char* keep(char* begin, char* end);
   bool has(IniReadOption option) const { return (m_doc->readOptions & option) != 0; }
+  bool isSpace(char c) const { return m_doc->fold.isSpace(c); }
+  char* skipWhite(char* begin, const char* end) const;
+  char* cutTrailingWhite(char* begin, char* end) const;
 
   IniStructForwardReferenceTag* m_doc;
+  TextLife m_life;
   IniSection* m_section = nullptr;
+  ItemKeys m_keys;  // of m_section
+  bool m_hasPieces = false;
+  bool m_hasNullSection = false;
 };
 
-char* SkipWhite(char* text) {
-  while (LocaleFold::isSpace(*text)) ++text;
-  return text;
+char* DocumentBuilder::skipWhite(char* begin, const char* end) const {
+  while (begin < end && isSpace(*begin)) ++begin;
+  return begin;
 }
 
-// Ends the text [begin, end) before its trailing white space; false if nothing is left.
-bool CutTrailingWhite(char* begin, char* end) {
-  while (end > begin && LocaleFold::isSpace(end[-1])) --end;
+// Ends the text before its trailing white space; its end, which is `begin` if nothing is left.
+char* DocumentBuilder::cutTrailingWhite(char* begin, char* end) const {
+  while (end > begin && isSpace(end[-1])) --end;
   *end = 0;
-  return end > begin;
+  return end;
 }
 
-int32_t DocumentBuilder::takeLine(char* text, int32_t line) {
-  text = SkipWhite(text);
-  if (*text == ';') return 0;
-  return *text == '[' ? takeHeader(text + 1, line) : takeItem(text, line);
+int32_t DocumentBuilder::takeLine(char* begin, char* end, int32_t line) {
+  begin = skipWhite(begin, end);
+  if (begin == end) return badLine(line);
+  if (*begin == ';') return 0;
+  return *begin == '[' ? takeHeader(begin + 1, end, line) : takeItem(begin, end, line);
 }
 
 int32_t DocumentBuilder::badLine(int32_t line) {
@@ -55,55 +114,76 @@ int32_t DocumentBuilder::badLine(int32_t line) {
   return 0;
 }
 
-int32_t DocumentBuilder::takeHeader(char* afterBracket, int32_t line) {
-  char* name = SkipWhite(afterBracket);
-  char* end = strchr(name, ']');
-  if (!end || !CutTrailingWhite(name, end)) return badLine(line);
+int32_t DocumentBuilder::takeHeader(char* begin, char* end, int32_t line) {
+  char* name = skipWhite(begin, end);
+  auto* bracket = static_cast<char*>(memchr(name, ']', static_cast<size_t>(end - name)));
+  if (!bracket) return badLine(line);
+  char* nameEnd = cutTrailingWhite(name, bracket);
+  if (nameEnd == name) return badLine(line);
   IniSection* known = nullptr;
   if (m_doc->duplicateChecking && IniSeekSection(m_doc, name, &known) < 0) return kIniOutOfMemory;
-  if (!known) return openSection(name, line);
+  if (!known) return openSection(name, nameEnd, line);
   known->line = line;
   m_section = known;
+  m_keys.start(known->items.count());
   return 0;
 }
 
-int32_t DocumentBuilder::openSection(const char* name, int32_t line) {
-  IniSection* section = IniReadSection(m_doc, name);
+int32_t DocumentBuilder::openSection(char* name, char* nameEnd, int32_t line) {
+  char* kept = keep(name, nameEnd);
+  IniSection* section = kept ? IniReadSection(m_doc, kept) : nullptr;
   if (!section) return kIniOutOfMemory;
   section->line = line;
   if (!IniAppendSection(m_doc, section)) return kIniOutOfMemory;
+  m_hasNullSection = m_hasNullSection || IniSectionIsNull(section);
   m_section = section;
+  m_keys.start(0);
   return 0;
 }
 
-int32_t DocumentBuilder::takeItem(char* text, int32_t line) {
-  char* separator = text + strcspn(text, has(kIniReadColons) ? ":=" : "=");
-  if (!*separator || separator == text) return badLine(line);
-  char* value = separator + 1;
-  if (*separator == ':' && *value == '=') ++value;
-  CutTrailingWhite(text, separator);
-  value = SkipWhite(value);
-  if (!CutTrailingWhite(value, value + strlen(value)) && !has(kIniReadKeepEmpty)) {
-    return badLine(line);
-  }
-  return store(text, value, line);
+int32_t DocumentBuilder::openNullSection() {
+  char* name = m_doc->arena.text(kIniNullSectionName, strlen(kIniNullSectionName));
+  return name ? openSection(name, name + strlen(name), -1) : kIniOutOfMemory;
 }
 
-int32_t DocumentBuilder::store(const char* name, const char* value, int32_t line) {
+int32_t DocumentBuilder::takeItem(char* begin, char* end, int32_t line) {
+  auto* separator = static_cast<char*>(memchr(begin, '=', static_cast<size_t>(end - begin)));
+  if (has(kIniReadColons)) {
+    char* before = separator ? separator : end;
+    auto* colon = static_cast<char*>(memchr(begin, ':', static_cast<size_t>(before - begin)));
+    if (colon) separator = colon;
+  }
+  if (!separator || separator == begin) return badLine(line);
+  char* value = separator + 1;
+  if (*separator == ':' && value < end && *value == '=') ++value;
+  char* nameEnd = cutTrailingWhite(begin, separator);
+  value = skipWhite(value, end);
+  char* valueEnd = cutTrailingWhite(value, end);
+  if (value == valueEnd && !has(kIniReadKeepEmpty)) return badLine(line);
+  return store(begin, nameEnd, value, valueEnd, line);
+}
+
+int32_t DocumentBuilder::store(char* name, char* nameEnd, char* value, char* valueEnd,
+                               int32_t line) {
   if (!m_section) {
     if (!has(kIniReadColons)) return 0;
-    const int32_t status = openSection(kIniNullSectionName, -1);
+    const int32_t status = openNullSection();
     if (status < 0) return status;
   }
+  const ItemKeys::Key key = ItemKeys::Of(m_doc->fold, name, nameEnd);
   IniEntry* known = nullptr;
-  if (m_doc->duplicateChecking && IniSeekEntry(m_doc, m_section, name, &known) < 0) {
+  if (m_doc->duplicateChecking && m_keys.mayHave(key) &&
+      IniSeekEntry(m_doc, m_section, name, &known) < 0) {
     return kIniOutOfMemory;
   }
-  return known ? replace(known, value, line) : appendEntry(name, value, line);
+  if (known) return replace(known, value, line);
+  m_keys.add(key);
+  m_hasPieces = m_hasPieces || IniMayBePiece(name, nameEnd);
+  return appendEntry(name, nameEnd, value, valueEnd, line);
 }
 
 int32_t DocumentBuilder::replace(IniEntry* entry, const char* value, int32_t line) {
-  char* copy = ztini_StrDupWithoutSurrWhiteSpace(value);
+  char* copy = ztini_StrDup(value);
   if (!copy) return kIniOutOfMemory;
   IniReplaceValue(entry, copy);
   IniNewEntryHandleQuotes(entry, m_doc->readOptions);
@@ -111,27 +191,66 @@ int32_t DocumentBuilder::replace(IniEntry* entry, const char* value, int32_t lin
   return 0;
 }
 
-int32_t DocumentBuilder::appendEntry(const char* name, const char* value, int32_t line) {
-  IniEntry* entry = IniReadEntry(m_doc, name, value);
+int32_t DocumentBuilder::appendEntry(char* name, char* nameEnd, char* value, char* valueEnd,
+                                     int32_t line) {
+  char* keptName = keep(name, nameEnd);
+  char* keptValue = keptName ? keep(value, valueEnd) : nullptr;
+  if (!keptValue) return kIniOutOfMemory;
+  IniEntry* entry = IniReadEntry(m_doc, keptName, keptValue, static_cast<size_t>(valueEnd - value));
   if (!entry) return kIniOutOfMemory;
   entry->line = line;
   return IniAppendEntry(m_section, entry) ? 0 : kIniOutOfMemory;
 }
 
+char* DocumentBuilder::keep(char* begin, char* end) {
+  return m_life == TextLife::Document
+             ? begin
+             : m_doc->arena.text(begin, static_cast<size_t>(end - begin));
+}
+
+int32_t DocumentBuilder::finish() {
+  const int32_t status = m_hasPieces ? IniJoinPieces(m_doc) : 0;
+  m_doc->settled = status == 0 && !m_hasPieces && !m_hasNullSection && m_doc->duplicateChecking &&
+                   !has(kIniReadColons);
+  m_doc->settledFold = m_doc->fold.generation();
+  return status;
+}
+
+void StartRead(IniStructForwardReferenceTag* doc) {
+  IniEmptyDocument(doc);
+  doc->firstBadLine = -1;
+  doc->fold.refresh();
+}
+
 }  // namespace
+
+int32_t ztini::IniReadText(IniStructForwardReferenceTag* doc, OwnedText text, size_t begin,
+                           size_t end) {
+  StartRead(doc);
+  doc->text = std::move(text);
+  char* bytes = doc->text.get();
+  TextLines lines(bytes + begin, bytes + end);
+  DocumentBuilder builder(doc, TextLife::Document);
+  while (lines.next()) {
+    const int32_t status = builder.takeLine(lines.begin(), lines.end(), lines.lineNumber());
+    if (status < 0) return status;
+  }
+  return builder.finish();
+}
 
 int32_t IniRead(IniStructForwardReferenceTag* doc, IniLineInputFunction input, void* context) {
   if (!doc) return 0;
-  IniEmptyDocument(doc);
-  doc->firstBadLine = -1;
+  StartRead(doc);
   if (!input) return 0;
   ztini::LineBuffer line;
   if (!line.open()) return kIniOutOfMemory;
-  DocumentBuilder builder(doc);
+  DocumentBuilder builder(doc, TextLife::Line);
   do {
     int32_t status = line.next(input, context);
-    if (status >= 0 && line.complete()) status = builder.takeLine(line.text(), line.lineNumber());
+    if (status >= 0 && line.complete()) {
+      status = builder.takeLine(line.text(), line.text() + strlen(line.text()), line.lineNumber());
+    }
     if (status < 0) return status;
   } while (!line.atEnd());
-  return IniJoinPieces(doc);
+  return builder.finish();
 }

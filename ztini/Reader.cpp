@@ -1,12 +1,13 @@
 #include <sys/stat.h>
 
+#include <cstdio>
 #include <cstring>
 #include <utility>
 
 #include "ztini/ByteOrderMark.h"
 #include "ztini/Document.h"
-#include "ztini/LineReader.h"
 #include "ztini/OpenFile.h"
+#include "ztini/Parser.h"
 #include "ztini/StringTools.h"
 
 namespace {
@@ -24,33 +25,71 @@ int32_t TextOffset(const char* bytes, size_t read) {
   return 0;
 }
 
-struct DisposeLineFile {
-  void operator()(LineFile* state) const { LineFileDispose(state); }
+// All that is left of a stream, in one block with a byte to spare.
+struct Bytes {
+  ztini::OwnedText block;
+  size_t size = 0;
 };
+
+constexpr size_t kLeastBlock = 4096;
+constexpr size_t kMostBytes = static_cast<size_t>(ztini::kLargestFileBytes);
+
+// How many bytes to ask for first: one more than the file has, so that its end is seen at once.
+size_t SizeHint(FILE* file) {
+  struct stat status;
+  if (fstat(fileno(file), &status) != 0 || !S_ISREG(status.st_mode)) return kLeastBlock;
+  if (status.st_size < 0 || status.st_size > ztini::kLargestFileBytes) return kLeastBlock;
+  return static_cast<size_t>(status.st_size) + 1;
+}
+
+int32_t ReadRest(FILE* file, Bytes* bytes) {
+  size_t capacity = SizeHint(file);
+  for (;;) {
+    void* block = ztini::Reallocate(bytes->block.get(), capacity + 1);
+    if (!block) return kIniOutOfMemory;
+    (void)bytes->block.release();
+    bytes->block.reset(static_cast<char*>(block));
+    const size_t wanted = capacity - bytes->size;
+    const size_t got = ztini::ReadBytes(bytes->block.get() + bytes->size, wanted, file);
+    bytes->size += got;
+    if (ferror(file)) return kIniReadFailed;
+    if (got < wanted) return 0;
+    // It grows while it is read.
+    if (bytes->size > kMostBytes) return kIniReadFailed;
+    capacity = capacity * 2 + kLeastBlock;
+  }
+}
+
+// After a failure: the document holds the lines that came before it.
+void ReadWholeLines(IniStructForwardReferenceTag* doc, Bytes bytes) {
+  const char* block = bytes.block.get();
+  while (bytes.size && !strchr("\r\n", block[bytes.size - 1])) --bytes.size;
+  const int32_t offset = TextOffset(block, bytes.size);
+  if (offset < 0) return;
+  ztini::IniReadText(doc, std::move(bytes.block), static_cast<size_t>(offset), bytes.size);
+}
 
 }  // namespace
 
 int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* file) {
   if (!doc || !file) return 0;
-  int result = fseek(file, 0, SEEK_SET);
+  const int result = fseek(file, 0, SEEK_SET);
   if (result < 0) return result;
-  char start[4];
-  const size_t read = ztini::ReadBytes(start, sizeof start, file);
-  // The bytes may hold a mark that the next read, which may succeed, would not see.
-  if (ferror(file)) return kIniReadFailed;
-  const int32_t offset = TextOffset(start, read);
+  Bytes bytes;
+  const int32_t status = ReadRest(file, &bytes);
+  if (status == kIniReadFailed) ReadWholeLines(doc, std::move(bytes));
+  if (status < 0) return status;
+  const int32_t offset = TextOffset(bytes.block.get(), bytes.size < 4 ? bytes.size : 4);
   if (offset < 0) return offset;
-  result = fseek(file, offset, SEEK_SET);
-  if (result < 0) return result;
-  std::unique_ptr<LineFile, DisposeLineFile> lines(LineFileNew(file));
-  if (!lines) return kIniOutOfMemory;
-  return IniRead(doc, IniLineFileInputFunction, lines.get());
+  return ztini::IniReadText(doc, std::move(bytes.block), static_cast<size_t>(offset), bytes.size);
 }
 
 int32_t IniReadFromFile(IniStructForwardReferenceTag* doc, const char* path) {
   if (!doc) return 0;
   ztini::Stream file = path ? ztini::OpenForReading(path) : nullptr;
   if (!file) return kIniCannotOpen;
+  // The whole is asked for at once; a buffer would only be copied through.
+  setvbuf(file.get(), nullptr, _IONBF, 0);
   ztini::OwnedText name(ztini_StrDup(path));
   if (!name) return kIniOutOfMemory;
   struct stat status;
