@@ -118,7 +118,10 @@ IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, char* valu
 
 void IniDisposeSection(IniSection* section) {
   if (!section) return;
-  for (int32_t n = section->items.count(); n >= 1; --n) IniDisposeEntry(section->item(n));
+  ztini::NameNode** items = section->items.nodes();
+  for (int32_t n = section->items.count(); n >= 1; --n) {
+    IniDisposeEntry(static_cast<IniEntry*>(items[n - 1]));
+  }
   if (!section->nameInArena) std::free(section->name);
   if (section->recordInArena) {
     section->~IniSection();
@@ -149,7 +152,7 @@ void IniReplaceValue(IniEntry* entry, char* value) {
 }
 
 bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section) {
-  if (!doc->sections.reserveOne()) {
+  if (!doc->sections.reserve(1)) {
     IniDisposeSection(section);
     return false;
   }
@@ -158,7 +161,7 @@ bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section) {
 }
 
 bool IniAppendEntry(IniSection* section, IniEntry* entry) {
-  if (!section->items.reserveOne()) {
+  if (!section->items.reserve(1)) {
     IniDisposeEntry(entry);
     return false;
   }
@@ -168,7 +171,10 @@ bool IniAppendEntry(IniSection* section, IniEntry* entry) {
 
 void IniEmptyDocument(IniStructForwardReferenceTag* doc) {
   doc->currentSection = nullptr;
-  for (int32_t n = doc->sections.count(); n >= 1; --n) IniDisposeSection(doc->section(n));
+  ztini::NameNode** sections = doc->sections.nodes();
+  for (int32_t n = doc->sections.count(); n >= 1; --n) {
+    IniDisposeSection(static_cast<IniSection*>(sections[n - 1]));
+  }
   doc->sections.keepFirst(0);
   doc->arena.clear();
   doc->text.reset();

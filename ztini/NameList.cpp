@@ -31,7 +31,10 @@ NameNode* NameList::at(int32_t position) const {
   return item ? *static_cast<NameNode**>(item) : nullptr;
 }
 
-NameNode** NameList::nodes() const { return static_cast<NameNode**>(ztini_ListItem(&m_list, -1)); }
+NameNode** NameList::nodes() const {
+  if (m_list.capacity) return reinterpret_cast<NameNode**>(m_list.block) + m_list.first;
+  return static_cast<NameNode**>(ztini_ListItem(&m_list, -1));
+}
 
 NameNode* NameList::find(const char* name, NameMatch match) {
   if (!name) return nullptr;
@@ -96,9 +99,8 @@ int32_t NameList::positionOf(const NameNode* node) const {
 uint32_t NameList::nextSequence() {
   if (!m_list.count) return 0;
   NameNode** all = nodes();
-  if (all[m_list.count - 1]->sequence + 1 < NameIndex::kNoSequence) {
-    return all[m_list.count - 1]->sequence + 1;
-  }
+  const uint32_t last = all[m_list.count - 1]->sequence;
+  if (last + 1 < NameIndex::kNoSequence) return last + 1;
   dropIndex();
   for (uint32_t i = 0; i < m_list.count; ++i) all[i]->sequence = i;
   return m_list.count;
@@ -106,7 +108,11 @@ uint32_t NameList::nextSequence() {
 
 void NameList::append(NameNode* node) {
   node->sequence = nextSequence();
-  ztini_ListInsertItem(&m_list, &node, 0);
+  if (m_list.first + m_list.count < m_list.capacity) {
+    nodes()[m_list.count++] = node;
+  } else {
+    ztini_ListInsertItem(&m_list, &node, 0);
+  }
   if (!m_index) return;
   if (!indexIsCurrent() || !m_index->insert(*m_fold, inOrder(), node)) dropIndex();
 }

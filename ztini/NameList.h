@@ -44,8 +44,8 @@ class NameList {
   // 1-based position of a record of the list.
   int32_t positionOf(const NameNode* node) const;
 
-  // Makes sure that the next append needs no memory. False without memory.
-  bool reserveOne() { return ztini_ListReserve(&m_list, 1) != 0; }
+  // Makes sure that the next `records` appends need no memory. False without memory.
+  bool reserve(uint32_t records) { return ztini_ListReserve(&m_list, records) != 0; }
 
   // Adds at the end; room must have been reserved.
   void append(NameNode* node);

@@ -23,7 +23,7 @@ class IniNameList : public testing::Test {
   }
   NameNode* add(const std::string& name) {
     m_nodes.push_back(NameNode{ztini_StrDup(name.c_str())});
-    EXPECT_TRUE(list.reserveOne());
+    EXPECT_TRUE(list.reserve(1));
     list.append(&m_nodes.back());
     return &m_nodes.back();
   }
@@ -116,7 +116,7 @@ TEST_F(IniNameList, AnIndexThatCannotGrowIsReplacedByAScan) {
     extra[i].name = ztini_StrDup(("e" + std::to_string(i)).c_str());
   }
   for (NameNode& node : extra) {
-    ASSERT_TRUE(list.reserveOne());
+    ASSERT_TRUE(list.reserve(1));
     ztini::test::FailFromAllocation fail(1);
     list.append(&node);
     EXPECT_EQ(find(node.name), &node);

@@ -1,5 +1,6 @@
 #include "ztini/Parser.h"
 
+#include <algorithm>
 #include <cstring>
 
 #include "ztini/Document.h"
@@ -14,6 +15,9 @@ using ztini::NameFold;
 
 // Whether the text of a line stays where it is for the document's life, or only until the next line.
 enum class TextLife { Document, Line };
+
+// Sections of one file resemble each other, but a small one after a large one must not take its memory.
+constexpr int32_t kMostExpected = 16;
 
 // The names of a section's items, as far as a glance at their ends tells them apart. Most sections have
 // too few items for an index, and most names of a section differ in their last characters.
@@ -85,7 +89,8 @@ class DocumentBuilder {
   IniStructForwardReferenceTag* m_doc;
   TextLife m_life;
   IniSection* m_section = nullptr;
-  ItemKeys m_keys;  // of m_section
+  int32_t m_itemsExpected = 1;  // besides the first
+  ItemKeys m_keys;              // of m_section
   bool m_hasPieces = false;
   bool m_hasNullSection = false;
 };
@@ -136,6 +141,7 @@ int32_t DocumentBuilder::openSection(char* name, char* nameEnd, int32_t line) {
   section->line = line;
   if (!IniAppendSection(m_doc, section)) return kIniOutOfMemory;
   m_hasNullSection = m_hasNullSection || IniSectionIsNull(section);
+  if (m_section) m_itemsExpected = std::clamp(m_section->items.count() - 1, 1, kMostExpected);
   m_section = section;
   m_keys.start(0);
   return 0;
@@ -199,13 +205,14 @@ int32_t DocumentBuilder::appendEntry(char* name, char* nameEnd, char* value, cha
   IniEntry* entry = IniReadEntry(m_doc, keptName, keptValue, static_cast<size_t>(valueEnd - value));
   if (!entry) return kIniOutOfMemory;
   entry->line = line;
+  // As many as the section before has; without memory the append tries again.
+  if (m_section->items.count() == 1) m_section->items.reserve(m_itemsExpected);
   return IniAppendEntry(m_section, entry) ? 0 : kIniOutOfMemory;
 }
 
 char* DocumentBuilder::keep(char* begin, char* end) {
-  return m_life == TextLife::Document
-             ? begin
-             : m_doc->arena.text(begin, static_cast<size_t>(end - begin));
+  return m_life == TextLife::Document ? begin
+                                      : m_doc->arena.text(begin, static_cast<size_t>(end - begin));
 }
 
 int32_t DocumentBuilder::finish() {
