@@ -2,11 +2,8 @@
 
 #include <errno.h>
 #include <fcntl.h>
-#include <string.h>
 #include <sys/stat.h>
 #include <unistd.h>
-
-#include <memory>
 
 #include "source/Common/vltFileSecurity.h"
 #include "zt/fnd/osdep/BinaryFile.h"
@@ -25,9 +22,9 @@ namespace {
 constexpr mode_t kNewFileMode = 0666;
 
 // The digest, then whatever is too long goes.
-bool Overwrite(int fd, const unsigned char* digest, bool durable) {
+bool Overwrite(int fd, const Digest& digest, bool durable) {
   struct stat info;
-  if (!zt::posix::WriteAllAt(fd, digest, kSizeBytes, 0)) return false;
+  if (!zt::posix::WriteAllAt(fd, digest.data(), kSizeBytes, 0)) return false;
   if (fstat(fd, &info) != 0) return false;
   if (info.st_size > kSizeBytes && RetryEintr([&] { return ftruncate(fd, kSizeBytes); }) != 0) {
     return false;
@@ -36,7 +33,7 @@ bool Overwrite(int fd, const unsigned char* digest, bool durable) {
 }
 
 // Complete under another name first, then renamed into place.
-bool Create(const std::string& sidecar, const unsigned char* digest, bool durable) {
+bool Create(const std::string& sidecar, const Digest& digest, bool durable) {
   std::string temporary = sidecar + ".TMP";
   // What a killed process left, maybe another user's.
   if (zt::posix::MakeRoom(temporary.c_str()) != 0) return false;
@@ -71,24 +68,7 @@ State Read(const std::string& sidecar, Digest* digest) {
   return zt::posix::IsPassing(errno) ? State::Unreadable : State::Short;
 }
 
-HRESULT Read(const std::string& sidecar, unsigned char** digest) {
-  *digest = nullptr;
-  // First, so that without memory nothing is known, rather than that there is no sidecar.
-  std::unique_ptr<unsigned char[]> copy(new unsigned char[kSizeBytes]);
-  Digest found;
-  switch (Read(sidecar, &found)) {
-    case State::Present:
-      memcpy(copy.get(), found.data(), kSizeBytes);
-      *digest = copy.release();
-      return S_OK;
-    case State::Missing:
-      return S_FALSE;
-    default:
-      return E_FAIL;
-  }
-}
-
-HRESULT Write(const std::string& sidecar, const unsigned char* digest, bool durable) {
+HRESULT Write(const std::string& sidecar, const Digest& digest, bool durable) {
   ScopedFd fd = zt::posix::OpenExisting(sidecar.c_str(), O_WRONLY, Kind::File, LastLink::Refused);
   if (!fd) return errno == ENOENT && Create(sidecar, digest, durable) ? S_OK : E_FAIL;
   struct stat info;

@@ -17,7 +17,8 @@ inline constexpr unsigned kSizeBytes = 16;
 using Digest = std::array<uint8_t, kSizeBytes>;
 
 // Sixteen "0" digits: a first save is under way. No digest is expected to be this.
-inline constexpr unsigned char kInvalidMark[kSizeBytes + 1] = "0000000000000000";
+inline constexpr Digest kInvalidMark = {'0', '0', '0', '0', '0', '0', '0', '0',
+                                        '0', '0', '0', '0', '0', '0', '0', '0'};
 
 enum class State {
   Present,     // the digest was read; a longer sidecar counts by its first 16 bytes
@@ -29,12 +30,8 @@ enum class State {
 // Sets the digest for Present only. Never throws.
 State Read(const std::string& sidecar, Digest* digest);
 
-// The same as a result: S_OK and a new[] digest; S_FALSE and null for Missing; E_FAIL and null for Short
-// and Unreadable. Throws std::bad_alloc.
-HRESULT Read(const std::string& sidecar, unsigned char** digest);
-
 // Replaces the digest, or makes the sidecar; mode 0777. With `durable` it is on disk when the call
-// returns. E_FAIL leaves the old sidecar, or none.
-HRESULT Write(const std::string& sidecar, const unsigned char* digest, bool durable);
+// returns. E_FAIL leaves the old sidecar, or none. Throws std::bad_alloc.
+HRESULT Write(const std::string& sidecar, const Digest& digest, bool durable);
 
 }  // namespace IniSidecar

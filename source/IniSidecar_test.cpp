@@ -6,6 +6,7 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <filesystem>
 #include <thread>
 
@@ -18,29 +19,34 @@ namespace {
 
 using namespace vlt::test;
 
-TEST(Sidecar, ReadsSixteenBytesAndTellsWhatItFinds) {
+IniSidecar::Digest Sixteen(const std::string& text) {
+  IniSidecar::Digest digest;
+  std::copy_n(text.begin(), digest.size(), digest.begin());
+  return digest;
+}
+
+TEST(Sidecar, ReadsSixteenBytesAndReportsWhatItFinds) {
   TempDir dir;
   std::string name = dir / "x.vl5";
-  unsigned char* digest = reinterpret_cast<unsigned char*>(&name);
-  EXPECT_EQ(IniSidecar::Read(name, &digest), S_FALSE);
-  EXPECT_EQ(digest, nullptr);
+  const IniSidecar::Digest before = Sixteen("untouched bytes.");
+  IniSidecar::Digest digest = before;
+  EXPECT_EQ(IniSidecar::Read(name, &digest), IniSidecar::State::Missing);
   WriteBytes(name, std::string(15, 'a'));
-  EXPECT_EQ(IniSidecar::Read(name, &digest), E_FAIL);
-  EXPECT_EQ(digest, nullptr);
+  EXPECT_EQ(IniSidecar::Read(name, &digest), IniSidecar::State::Short);
+  EXPECT_EQ(digest, before);
   WriteBytes(name, std::string(16, 'a') + "more");
-  EXPECT_EQ(IniSidecar::Read(name, &digest), S_OK);
-  EXPECT_EQ(std::string(reinterpret_cast<char*>(digest), 16), std::string(16, 'a'));
-  delete[] digest;
+  EXPECT_EQ(IniSidecar::Read(name, &digest), IniSidecar::State::Present);
+  EXPECT_EQ(digest, Sixteen("aaaaaaaaaaaaaaaa"));
   std::filesystem::remove(name);
   std::filesystem::create_directory(name);
-  EXPECT_EQ(IniSidecar::Read(name, &digest), E_FAIL);
+  EXPECT_EQ(IniSidecar::Read(name, &digest), IniSidecar::State::Short);
 }
 
 TEST(Sidecar, IsWrittenWholeWithItsModeAndNothingBesideIt) {
   TempDir dir;
   std::string name = dir / "x.vl5";
   ScopedUmask strict(077);
-  auto* first = reinterpret_cast<const unsigned char*>("0123456789abcdef");
+  const IniSidecar::Digest first = Sixteen("0123456789abcdef");
   EXPECT_EQ(IniSidecar::Write(name, first, true), S_OK);
   EXPECT_EQ(ReadBytes(name), "0123456789abcdef");
   EXPECT_EQ(ModeOf(name), 0777);

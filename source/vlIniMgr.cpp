@@ -12,6 +12,7 @@
 #include "source/Cmd5vlt.h"
 #include "source/Common/vltFailure.h"
 #include "source/Common/vltFileSecurity.h"
+#include "source/Common/vltResultOf.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/BinaryFile.h"
 #include "zt/fnd/osdep/OSException.h"
@@ -271,31 +272,35 @@ HRESULT CvlIniMgr::Write() {
   return status == 0 ? S_OK : E_FAIL;
 }
 
-HRESULT CvlIniMgr::DigestFile(unsigned char** digest) const {
+HRESULT CvlIniMgr::DigestFile(IniSidecar::Digest* digest) const {
   ScopedFd fd = OpenForReading(m_fileName);
   if (!fd.valid()) return E_FAIL;
-  try {
+  // Out of memory is the one failure here that has a result of its own.
+  return vlt::ResultOf<std::bad_alloc>(E_OUTOFMEMORY, [&] {
     std::vector<unsigned char> data;
     if (!ReadWhole(fd.get(), GetFileLength(fd.get()), &data)) return E_FAIL;
-    *digest = new unsigned char[kDigestSize];
-    GetMD5Checksum(data.data(), data.size(), *digest);
+    GetMD5Checksum(data.data(), data.size(), digest->data());
     return S_OK;
-  } catch (const std::bad_alloc&) {
-    return E_OUTOFMEMORY;  // The one failure here that has a result of its own.
-  }
+  });
+}
+
+HRESULT CvlIniMgr::WriteAndGetDigest(IniSidecar::Digest* digest) {
+  HRESULT result = Write();
+  if (result < 0) return result;
+  result = DigestFile(digest);
+  if (InitializeIniBindings() != 0 && result >= 0) result = E_FAIL;
+  return result;
 }
 
 HRESULT CvlIniMgr::WriteAndGetChecksum(unsigned char** digest) {
   if (!digest) return E_POINTER;
   *digest = nullptr;
-  HRESULT result = Write();
+  IniSidecar::Digest written;
+  HRESULT result = WriteAndGetDigest(&written);
   if (result < 0) return result;
-  result = DigestFile(digest);
-  if (InitializeIniBindings() != 0 && result >= 0) result = E_FAIL;
-  if (result < 0) {
-    delete[] * digest;
-    *digest = nullptr;
-  }
+  *digest = new (std::nothrow) unsigned char[written.size()];
+  if (!*digest) return E_OUTOFMEMORY;
+  memcpy(*digest, written.data(), written.size());
   return result;
 }
 

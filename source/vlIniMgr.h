@@ -7,6 +7,7 @@
 
 #include "source/Common/vltTypes.h"
 #include "source/IniFileLock.h"
+#include "source/IniSidecar.h"
 #include "ztini/ztini.h"
 
 // The one door to a shared INI file.
@@ -64,6 +65,8 @@ class CvlIniMgr {
   // holds exactly what the file holds. Null on failure. Where the file cannot be read again, for whatever
   // reason, the object keeps what it held.
   HRESULT WriteAndGetChecksum(unsigned char** digest);
+  // The same into *digest, which is indeterminate on failure.
+  HRESULT WriteAndGetDigest(IniSidecar::Digest* digest);
 
   // Copies the value to *out, which the caller provides and sizes.
   HRESULT GetItem(char const* section, char const* item, char** out) const;
@@ -84,6 +87,7 @@ class CvlIniMgr {
 
   // What a Write guarantees when it returns; Synced at first.
   void SetDurability(IniDurability durability);
+  IniDurability durability() const { return m_durability; }
 
   // Path of the sidecar: the part from the last "." of the whole path on becomes ".vl5".
   static std::string SidecarName(const std::string& fileName);
@@ -102,7 +106,7 @@ class CvlIniMgr {
                              unsigned char* digest);
   int32_t InitializeIniBindings();
   [[noreturn]] void CleanupAndThrow(bool setAside);
-  HRESULT DigestFile(unsigned char** digest) const;
+  HRESULT DigestFile(IniSidecar::Digest* digest) const;
   void DisposeDocument();
   bool ownsLock();
 

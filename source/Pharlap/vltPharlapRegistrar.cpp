@@ -8,7 +8,6 @@
 
 #include "source/Common/vltFileSecurity.h"
 #include "source/Common/vltcmn.h"
-#include "source/IniSidecar.h"
 #include "source/Pharlap/registrarText.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
@@ -23,6 +22,17 @@ namespace {
 
 constexpr GUID kBuiltInDictionary = {
     0x790F6A90, 0xE0D8, 0x11D3, {0xAA, 0x15, 0x00, 0x50, 0x04, 0xD1, 0x31, 0xEE}};
+
+// Fails by exceptions, and has no hook points and no messages.
+constexpr GuardedIniKind kDatabase = {.useEscapes = true,
+                                      .otherFailure = E_FAIL,
+                                      .refusedMessage = nullptr,
+                                      .otherFailureMessage = nullptr,
+                                      .openSignature = nullptr,
+                                      .openPoint = nullptr,
+                                      .retryPoint = nullptr,
+                                      .writtenPoint = nullptr,
+                                      .sealedPoint = nullptr};
 
 }  // namespace
 
@@ -48,7 +58,7 @@ HRESULT vlrMakeRootDirectory(const wchar_t* name, String* directory) {
 
 CvltPharlapRegistrar::CvltPharlapRegistrar(const String& registrationFilePath,
                                            const String& installDirectory, bool init)
-    : m_installDirectory(installDirectory), m_registrationFilePath(registrationFilePath) {
+    : m_installDirectory(installDirectory), m_file(Narrow(registrationFilePath), kDatabase) {
   if (init) Init();
 }
 
@@ -99,7 +109,7 @@ class AtEnd {
 
 void CvltPharlapRegistrar::Init() {
   if (OpenIniWithValidation() < 0 || !m_registrationIni) return;
-  m_durableCopy = std::make_unique<DurableCopy>(Narrow(m_registrationFilePath));
+  m_durableCopy = std::make_unique<DurableCopy>(m_file.file());
   AtEnd end([this] { finishScan(); });
   m_scanSaves = ScanSaves::None;
   if (m_durableCopy->isLeft()) coverSaves();
@@ -187,55 +197,13 @@ void CvltPharlapRegistrar::readComponents() {
 // ---- The database file
 
 HRESULT CvltPharlapRegistrar::OpenIniWithValidation() {
-  std::string file = Narrow(m_registrationFilePath);
-  // From the sidecar on: another process may be about to mend what this one would set aside.
-  std::unique_ptr<IniFileLock> hold = IniFileLock::ForFile(file.c_str());
-  IniSidecar::Digest digest;
+  // Held from the second name on, which decides what the first one is.
+  std::unique_ptr<IniFileLock> hold = IniFileLock::ForFile(m_file.file().c_str());
   // Nothing is known of a file that cannot be read now. It stays, and the caller may try again.
-  if (!DurableCopy::takeUp(file)) throw 1;
-  IniSidecar::State state = IniSidecar::Read(sidecarName(), &digest);
-  if (state == IniSidecar::State::Unreadable) state = IniSidecar::Read(sidecarName(), &digest);
-  if (state == IniSidecar::State::Unreadable) throw 1;
-  bool isShort = state == IniSidecar::State::Short;
-  const unsigned char* expected = state == IniSidecar::State::Present ? digest.data() : nullptr;
-  try {
-    if (isShort) DeleteIniFile();
-    m_registrationIni = std::make_unique<CvlIniMgr>(file.c_str(), false, expected, false, true);
-  } catch (...) {
-    // Whatever it was: a digest that differs, a file that has just been set aside, a failure that
-    // may have passed. The second opening takes the file as it is, and its failure counts.
-    m_registrationIni = std::make_unique<CvlIniMgr>(file.c_str(), false, nullptr, false, true);
-  }
-  return isShort ? E_FAIL : S_OK;
-}
-
-std::string CvltPharlapRegistrar::sidecarName() const {
-  return CvlIniMgr::SidecarName(Narrow(m_registrationFilePath));
-}
-
-HRESULT CvltPharlapRegistrar::SetChecksumForCacheFile(const unsigned char* digest) {
-  try {
-    return IniSidecar::Write(sidecarName(), digest, m_scanSaves == ScanSaves::NotScanning);
-  } catch (const std::exception&) {
-    return E_FAIL;  // The database stands; only its digest is old, which the next opening survives.
-  }
-}
-
-bool CvltPharlapRegistrar::ChecksumFileExists() {
-  try {
-    return path::DoesFileExist(Widen(sidecarName()));
-  } catch (const std::exception&) {
-    return false;  // An inaccessible sidecar counts as missing; a failed write of the mark is ignored.
-  }
-}
-
-HRESULT CvltPharlapRegistrar::DeleteIniFile() {
-  try {
-    CvlIniMgr::SetAside(m_registrationFilePath);
-    return S_OK;
-  } catch (const zt::fnd::exception::Exception&) {
-    return E_FAIL;  // What cannot be set aside is opened as it is.
-  }
+  if (!DurableCopy::takeUp(m_file.file())) throw 1;
+  HRESULT result = m_file.open(&m_registrationIni);
+  if (!m_registrationIni) throw 1;
+  return result;
 }
 
 // From here on the second name of the database stands for the scan's saves, where it can be made.
@@ -272,14 +240,7 @@ HRESULT CvltPharlapRegistrar::SaveChanges() {
   if (!m_registrationIni) return S_OK;
   m_resources.forget();
   if (!prepareSave()) return E_FAIL;
-  // Without the mark, a crash in the first save would leave a database that looks as if it had
-  // never had a sidecar, and so cannot be told from a whole one.
-  if (!ChecksumFileExists()) SetChecksumForCacheFile(IniSidecar::kInvalidMark);
-  unsigned char* written = nullptr;
-  HRESULT result = m_registrationIni->WriteAndGetChecksum(&written);
-  std::unique_ptr<unsigned char[]> digest(written);
-  if (result < 0 || !digest) return result;
-  return SetChecksumForCacheFile(digest.get());
+  return m_file.save(*m_registrationIni);
 }
 
 // ---- Settings

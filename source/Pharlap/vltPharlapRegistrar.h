@@ -8,6 +8,7 @@
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/Common/vltBindingClasses.h"
 #include "source/DurableCopy.h"
+#include "source/GuardedIniFile.h"
 #include "source/Pharlap/contentsWalk.h"
 #include "source/vlIniMgr.h"
 #include "source/vltRegistrar.h"
@@ -161,9 +162,6 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   bool prepareSave();
   void coverSaves();
   bool openFragment(const char* file);
-  HRESULT DeleteIniFile();
-  HRESULT SetChecksumForCacheFile(const unsigned char* digest);
-  bool ChecksumFileExists();
   HRESULT ProcessFileName(bool isDictionary, const zt::fnd::String& installDirectory,
                           std::string& file);
 
@@ -179,12 +177,11 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   HRESULT previousDictionariesFolder(zt::fnd::String* folder);
   void readDictionary(const std::string& section, _vltComponent2* record);
   bool readExpert(const std::string& section, EmptyFileName emptyFileName, _vltComponent2* record);
-  std::string sidecarName() const;
 
   BindingClassesMap m_resourceExpertBindings;
   BindingClassesMap m_objectExpertBindings;
   zt::fnd::String m_installDirectory;
-  zt::fnd::String m_registrationFilePath;
+  GuardedIniFile m_file;
   std::unique_ptr<CvlIniMgr> m_registrationIni;
   // The scan's saves: none, the first, those that the second name of the database covers.
   enum class ScanSaves { NotScanning, None, First, Covered, Synced };

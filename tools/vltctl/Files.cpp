@@ -2,6 +2,8 @@
 #include <stdio.h>
 #include <string.h>
 
+#include <algorithm>
+
 #include "source/Cmd5vlt.h"
 #include "source/Common/vltFileSecurity.h"
 #include "source/IniSidecar.h"
@@ -145,7 +147,7 @@ Verdict Judge(const GuardedBytes& read) {
   if (!read.sidecar) return {"there is no sidecar", kTaken, kGood};
   std::string digest = read.sidecar->substr(0, IniSidecar::kSizeBytes);
   if (digest == Md5(read.bytes)) return {"the digest matches", kTaken, kGood};
-  if (digest == reinterpret_cast<const char*>(IniSidecar::kInvalidMark)) {
+  if (std::equal(digest.begin(), digest.end(), IniSidecar::kInvalidMark.begin())) {
     return {"the sidecar is the mark of a first save under way", kTaken, kGood};
   }
   return {"the digest differs", kTaken, kGood};
