@@ -4,6 +4,7 @@
 // registrar.
 
 #include <stdlib.h>
+#include <string.h>
 
 #include <string>
 
@@ -66,6 +67,24 @@ inline void ReplaceText(wchar_t** text, const wchar_t* by) {
   wchar_t* copy = CopyOf(by);
   ZtTaskMemFree(*text);
   *text = copy;
+}
+
+// Cuts the braces of a 38-character GUID text: S_OK; S_FALSE for another length, E_FAIL for 38 characters
+// without both braces, the text then untouched.
+template <class Char>
+HRESULT StripBraces(Char* text, size_t length) {
+  constexpr size_t kBracedLength = 38;
+  if (length != kBracedLength) return S_FALSE;
+  if (text[0] != '{' || text[kBracedLength - 1] != '}') return E_FAIL;
+  memmove(text, text + 1, (kBracedLength - 2) * sizeof(Char));
+  text[kBracedLength - 2] = 0;
+  return S_OK;
+}
+
+// The text without its braces, or as it is.
+inline std::string WithoutBraces(std::string text) {
+  if (StripBraces(text.data(), text.size()) == S_OK) text.resize(text.size() - 2);
+  return text;
 }
 
 inline std::string Decimal(uint32_t value) { return std::to_string(value); }

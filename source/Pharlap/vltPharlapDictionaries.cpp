@@ -65,8 +65,7 @@ HRESULT CvltPharlapRegistrar::RegisterDataDictionary(_vltComponent2* record) {
   if (BeginChange() < 0) return E_FAIL;
   std::string section = Narrow(record->name);
   if (IsReserved(section)) return E_FAIL;
-  std::string identifier = Narrow(vlrGuidToString(record->identifier));
-  if (StripBracesFromGuid(identifier.data()) == S_OK) identifier.resize(strlen(identifier.c_str()));
+  std::string identifier = WithoutBraces(Narrow(vlrGuidToString(record->identifier)));
   const vltDictVariant& variant = record->dictionary;
   HRESULT setResult =
       m_registrationIni->SetItem(kComponents, section.c_str(), section.c_str(), true);

@@ -71,9 +71,7 @@ HRESULT CvltPharlapRegistrar::WriteExpert(const _vltComponent2* record, GuidText
   *name = section;
   if (IsReserved(section)) return E_FAIL;
   std::string identifier = Narrow(vlrGuidToString(record->identifier));
-  if (guidText == GuidText::WithoutBraces && StripBracesFromGuid(identifier.data()) == S_OK) {
-    identifier.resize(strlen(identifier.c_str()));
-  }
+  if (guidText == GuidText::WithoutBraces) identifier = WithoutBraces(identifier);
   // The directory is dropped: the next start puts the expert where experts are.
   String file(record->fileName ? record->fileName : L"");
   HRESULT result = m_registrationIni->SetItem(kComponents, section.c_str(), section.c_str(), true);

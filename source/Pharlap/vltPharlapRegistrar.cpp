@@ -338,21 +338,6 @@ HRESULT CvltPharlapRegistrar::SetConfigurationPath(const wchar_t* path) {
 
 // ---- GUID texts
 
-namespace {
-
-constexpr size_t kBracedLength = 38;
-
-template <class Char>
-HRESULT StripBraces(Char* text, size_t length) {
-  if (length != kBracedLength) return S_FALSE;
-  if (text[0] != '{' || text[kBracedLength - 1] != '}') return E_FAIL;
-  memmove(text, text + 1, (kBracedLength - 2) * sizeof(Char));
-  text[kBracedLength - 2] = 0;
-  return S_OK;
-}
-
-}  // namespace
-
 HRESULT CvltPharlapRegistrar::StripBracesFromGuid(char* text) {
   return text ? StripBraces(text, strlen(text)) : E_POINTER;
 }

@@ -2,18 +2,20 @@
 
 #include <map>
 #include <memory>
-#include <set>
 #include <string>
 
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/Common/vltBindingClasses.h"
 #include "source/DurableCopy.h"
 #include "source/GuardedIniFile.h"
-#include "source/Pharlap/contentsWalk.h"
+#include "source/Pharlap/registrationFiles.h"
 #include "source/vlIniMgr.h"
 #include "source/vltRegistrar.h"
-#include "zt/fnd/AbsTime.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
+
+namespace registrar {
+class Scan;
+}
 
 // Keeps the components in one guarded INI file, the registration database, and in memory.
 //
@@ -38,7 +40,7 @@ class CvltPharlapRegistrar : public CvltRegistrar,
                              public IvltDynamicRegistrar,
                              public IvltDowngradeRegistrar {
  public:
-  using RegistrationFiles = zt::fnd::Vector<std::pair<zt::fnd::String, zt::fnd::AbsTime>>;
+  using RegistrationFiles = registrar::RegistrationFiles;
 
   // `init` calls Init, with this class's operations. Subclasses pass false and call it themselves.
   CvltPharlapRegistrar(const zt::fnd::String& registrationFilePath,
@@ -161,19 +163,12 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   bool finishDurableCopy();
   bool prepareSave();
   void coverSaves();
-  bool openFragment(const char* file);
-  HRESULT ProcessFileName(bool isDictionary, const zt::fnd::String& installDirectory,
-                          std::string& file);
 
   void initSettings();
   void registerBuiltInDictionary();
   void readComponents();
   HRESULT dataDirectory(zt::fnd::String* directory);
   HRESULT setAndSave(const char* key, const char* value, bool quote);
-  bool isRegistered(const std::string& file, uint32_t low, uint32_t high);
-  void eraseComponentsOf(const std::string& file);
-  void mergeItem(CvlIniMgr& fragment, const zt::fnd::String& installDirectory, const char* file,
-                 const std::string& section, const std::string& item, HRESULT* result);
   HRESULT previousDictionariesFolder(zt::fnd::String* folder);
   void readDictionary(const std::string& section, _vltComponent2* record);
   bool readExpert(const std::string& section, EmptyFileName emptyFileName, _vltComponent2* record);
@@ -187,11 +182,6 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   enum class ScanSaves { NotScanning, None, First, Covered, Synced };
   ScanSaves m_scanSaves = ScanSaves::NotScanning;
   std::unique_ptr<DurableCopy> m_durableCopy;
-  // Whether the scan has dropped entries that no file can stand for: those must not come back.
-  bool m_droppedPlanted = false;
-  // The registration file that is about to be merged, if it is open.
-  std::unique_ptr<CvlIniMgr> m_fragment;
-  // Registration files that FindRegistrationFiles has seen: asked for once a start is enough.
-  std::set<std::string> m_filesSeen;
-  ContentsFiles m_contentsFiles;
+  class ScanHold;
+  registrar::Scan* m_scan = nullptr;  // the one under way, if there is one
 };

@@ -1,0 +1,177 @@
+#include "source/Pharlap/Scan.h"
+
+#include <stdio.h>
+
+#include <utility>
+#include <vector>
+
+#include "source/Pharlap/registrarText.h"
+#include "source/Pharlap/registrationFiles.h"
+#include "source/vlIniMgr.h"
+#include "zt/fnd/osdep/StringCompare.h"
+#include "zt/fnd/osdep/path.h"
+#include "ztini/StringTools.h"
+
+using zt::fnd::String;
+using zt::fnd::osdep::path;
+
+namespace registrar {
+namespace {
+
+constexpr const char* kChangedMark = "23";
+constexpr const char* kHeaderless = "(null)";
+
+bool SameName(const std::string& a, const char* b) {
+  return zt::fnd::osdep::StringCaseCompare(a.c_str(), b) == 0;
+}
+
+// Whether an item of this name is still that item when the file is read again: what follows a "="
+// would be its value, a header or a comment no item at all.
+bool CanBeItemName(const std::string& text) {
+  size_t first = text.find_first_not_of(" \t\v\f");
+  return first != std::string::npos && text[first] != ';' && text[first] != '[' &&
+         text.find('=') == std::string::npos && !HasLineEnd(text);
+}
+
+// The two halves of a time in the database.
+struct Stamp {
+  explicit Stamp(const zt::fnd::AbsTime& time) {
+    auto ticks = static_cast<uint64_t>(time.toLKTIME(true));
+    low = static_cast<uint32_t>(ticks);
+    high = static_cast<uint32_t>(ticks >> 32);
+  }
+  uint32_t low, high;
+};
+
+}  // namespace
+
+Scan::Scan(CvlIniMgr& database) : m_database(database) {}
+Scan::~Scan() = default;
+
+bool Scan::isUpToDate(const std::string& file, const zt::fnd::AbsTime& time) {
+  m_filesSeen.insert(file);
+  std::string stored;
+  if (m_database.GetItem(kRegistrations, file.c_str(), &stored) < 0) return false;
+  Stamp stamp(time);
+  unsigned long low = 0, high = 0;
+  return sscanf(stored.c_str(), "%lu %lu", &low, &high) == 2 && low == stamp.low &&
+         high == stamp.high;
+}
+
+void Scan::setStamp(const std::string& file, const zt::fnd::AbsTime& time) {
+  Stamp stamp(time);
+  std::string text = Decimal(stamp.low) + " " + Decimal(stamp.high);
+  m_database.SetItem(kRegistrations, file.c_str(), text.c_str(), true);
+}
+
+bool Scan::openFragment(const std::string& file) {
+  try {
+    m_fragment = std::make_unique<CvlIniMgr>(file.c_str(), false, nullptr, false, true);
+    return true;
+  } catch (...) {
+    // A file that cannot be parsed has been set aside by its manager already. Any other reason - no
+    // memory, no descriptor - says nothing about the file, which stays.
+    return false;
+  }
+}
+
+std::unique_ptr<CvlIniMgr> Scan::takeFragment(const std::string& file) {
+  if (!m_fragment) openFragment(file);
+  return std::move(m_fragment);
+}
+
+void Scan::eraseComponentsOf(const std::string& file) {
+  if (!m_contentsFiles.mayHave(file)) return;
+  // Erasing a component that bears the name of a list edits the list; the walk is over its copy.
+  std::vector<ContentsItem> contents = ReadContents(m_database);
+  m_contentsFiles.learn(contents);
+  std::vector<std::string> eraseList;
+  for (const ContentsItem& item : contents) {
+    if (!SameName(item.file, file.c_str())) continue;
+    m_contentsFiles.forget();  // Of two items of one name the second shows when the first is gone.
+    if (!IsReserved(item.component)) m_database.EraseSection(item.component.c_str());
+    m_database.EraseItem(kComponents, item.component.c_str());
+    // Of an item in pieces only the last piece goes. The others are met again, and point to the
+    // component that is about to be merged once more.
+    std::string name;
+    if (m_database.GetNthItemName(kContents, item.last + 1, &name) >= 0) eraseList.push_back(name);
+  }
+  for (const std::string& name : eraseList) m_database.EraseItem(kContents, name.c_str());
+}
+
+bool Scan::isMerged(const CvlIniMgr& fragment, const std::string& section) {
+  // Written without a header, so that its items would fall to whichever section comes before.
+  if (section == kHeaderless) return false;
+  // A component that is named like a section of the database itself must not overlay it. The list of
+  // components is one of those, and is extended.
+  return !IsReserved(section) || SameName(section, kComponents) ||
+         fragment.ItemExists(kComponents, section.c_str()) < 0;
+}
+
+bool Scan::mergeItem(const CvlIniMgr& fragment, const String& installDirectory,
+                     const std::string& file, const std::string& section, const std::string& item) {
+  std::string value;
+  if (fragment.GetItem(section.c_str(), item.c_str(), &value) < 0) return false;
+  bool isFileName = SameName(item, kFileName);
+  if (isFileName) {
+    bool isDictionary = fragment.ItemExists(section.c_str(), kSchemaVersion) >= 0;
+    value = ProcessFileName(isDictionary, installDirectory, value);
+  } else if (SameName(item, kIdentifier)) {
+    value = WithoutBraces(value);
+  }
+  m_database.SetItem(section.c_str(), item.c_str(), value.c_str(), true);
+  if (ztini_StrICmpWithoutSurrWhiteSpace(section.c_str(), kContents) == 0) m_contentsFiles.forget();
+  // A value that is no name would write something else into the database, down to whole lines.
+  if (SameName(section, kComponents) && CanBeItemName(value)) {
+    m_database.SetItem(kContents, value.c_str(), file.c_str(), true);
+    m_contentsFiles.add(m_database, value);
+  }
+  return isFileName;
+}
+
+bool Scan::mergeSection(const CvlIniMgr& fragment, const String& installDirectory,
+                        const std::string& file, const std::string& section, bool changed) {
+  bool hasFileName = false;
+  int items = fragment.GetNumberOfItems(section.c_str());
+  for (int i = 1; i <= items; ++i) {
+    std::string item;
+    if (fragment.GetNthItemName(section.c_str(), i, &item) < 0) continue;
+    if (mergeItem(fragment, installDirectory, file, section, item)) hasFileName = true;
+  }
+  if (fragment.ItemExists(section.c_str(), kSchemaVersion) >= 0) {
+    m_database.SetItem(section.c_str(), kFragmentRegistered, changed ? kChangedMark : "0", false);
+  }
+  return hasFileName;
+}
+
+bool Scan::isPresent(const std::string& file) const {
+  return m_filesSeen.count(file) != 0 || FileIsThere(file);
+}
+
+void Scan::erase(const std::string& component, const std::string& file) {
+  if (!path::IsAbs(Widen(file))) m_droppedPlanted = true;
+  if (!IsReserved(component)) m_database.EraseSection(component.c_str());
+  m_database.EraseItem(kComponents, component.c_str());
+  // The file may be registered by its whole path or by its bare name, which follows the last separator of
+  // either system.
+  size_t separator = file.rfind('\\');
+  if (separator == std::string::npos) separator = file.rfind('/');
+  m_database.EraseItem(kRegistrations, file.substr(separator + 1).c_str());
+  m_database.EraseItem(kRegistrations, file.c_str());
+}
+
+std::string ProcessFileName(bool isDictionary, const String& installDirectory,
+                            const std::string& file) {
+  String whole = Widen(file);
+  String base = path::BaseName(whole);
+  if (base.find(L'.') == String::npos) {
+    base += isDictionary ? L".framework" : L".vle";
+    whole = path::Join(path::DirName(whole), base);
+  }
+  std::string name = Narrow(whole);
+  if (name.find_first_of("\\/") != std::string::npos) return name;
+  String below = installDirectory + (isDictionary ? kDictionaries : kExperts) + L"/";
+  return Narrow(below) + name;
+}
+
+}  // namespace registrar

@@ -1,0 +1,74 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <set>
+#include <string>
+
+#include "source/Pharlap/contentsWalk.h"
+#include "zt/fnd/AbsTime.h"
+#include "zt/fnd/String.h"
+
+class CvlIniMgr;
+
+namespace registrar {
+
+// What one comparison of the installation with the database knows, and the changes of the database that
+// it makes. Lives for one CvltPharlapRegistrar::UpdateRegistrationFile, which drives it.
+//
+// Changes the open document only; saving is the caller's. Results of single changes are dropped: what
+// could not be set now is missing in the database, and the file is merged again when it changes.
+// Threads: one.
+class Scan {
+ public:
+  // The database stays open as long as the object lives.
+  explicit Scan(CvlIniMgr& database);
+  ~Scan();
+  Scan(const Scan&) = delete;
+  Scan& operator=(const Scan&) = delete;
+
+  // Notes that the file is in the installation. True if the database has it with this time.
+  bool isUpToDate(const std::string& file, const zt::fnd::AbsTime& time);
+  void setStamp(const std::string& file, const zt::fnd::AbsTime& time);
+
+  // Opens the registration file for takeFragment. False if it cannot be used. One that cannot be parsed
+  // has been set aside then; any other failure leaves it.
+  bool openFragment(const std::string& file);
+  // The file that was opened last; opens it if there is none. Null if it cannot be used.
+  std::unique_ptr<CvlIniMgr> takeFragment(const std::string& file);
+
+  // Erases what the database has from the file.
+  void eraseComponentsOf(const std::string& file);
+
+  // Whether the section is merged: it has a header, and is no component that is named like a section of
+  // the database itself. The list of components is merged, too.
+  static bool isMerged(const CvlIniMgr& fragment, const std::string& section);
+  // Copies the items of one section of the registration file; `changed` becomes the mark of a dictionary.
+  // True if it has a file name.
+  bool mergeSection(const CvlIniMgr& fragment, const zt::fnd::String& installDirectory,
+                    const std::string& file, const std::string& section, bool changed);
+
+  // Whether the file is still in the installation, as far as this user can see.
+  bool isPresent(const std::string& file) const;
+  // Erases a component whose registration file is gone, but for its items in the list of contents.
+  void erase(const std::string& component, const std::string& file);
+  // Whether an entry was erased that no file can stand for: such must not come back with the next start.
+  bool droppedPlanted() const { return m_droppedPlanted; }
+
+ private:
+  bool mergeItem(const CvlIniMgr& fragment, const zt::fnd::String& installDirectory,
+                 const std::string& file, const std::string& section, const std::string& item);
+
+  CvlIniMgr& m_database;
+  std::set<std::string> m_filesSeen;
+  ContentsFiles m_contentsFiles;
+  std::unique_ptr<CvlIniMgr> m_fragment;
+  bool m_droppedPlanted = false;
+};
+
+// Makes the short file name of a registration file a path: adds the extension of its kind to a name
+// without one, and puts a name without a directory below `installDirectory`, which ends in a slash.
+std::string ProcessFileName(bool isDictionary, const zt::fnd::String& installDirectory,
+                            const std::string& file);
+
+}  // namespace registrar

@@ -1,0 +1,124 @@
+#include "source/Pharlap/Scan.h"
+
+#include <gtest/gtest.h>
+
+#include "source/Pharlap/registrarText.h"
+#include "source/vlIniMgr.h"
+#include "tests/support/TempDir.h"
+#include "zt/fnd/osdep/DateTime.h"
+
+namespace registrar {
+namespace {
+
+using vlt::test::TempDir;
+using vlt::test::WriteBytes;
+
+zt::fnd::AbsTime Seconds(long seconds) {
+  timeval time = {};
+  time.tv_sec = seconds;
+  return zt::fnd::osdep::TimevalToAbsTime(time);
+}
+
+std::unique_ptr<CvlIniMgr> Open(const std::string& file) {
+  return std::make_unique<CvlIniMgr>(file.c_str(), false, nullptr, false, true);
+}
+
+struct RegistrarScan : testing::Test {
+  TempDir dir;
+  std::unique_ptr<CvlIniMgr> database = Open(dir / "vlt.vlr");
+  std::unique_ptr<Scan> scan = std::make_unique<Scan>(*database);
+
+  std::string value(const char* section, const char* item) const {
+    std::string text;
+    return database->GetItem(section, item, &text) < 0 ? "none" : text;
+  }
+  std::string addFile(const std::string& name, const std::string& text) {
+    WriteBytes(dir / name, text);
+    return dir / name;
+  }
+  void merge(const std::string& file) {
+    std::unique_ptr<CvlIniMgr> fragment = scan->takeFragment(file);
+    ASSERT_TRUE(fragment);
+    for (int n = 1; n <= fragment->GetNumberOfSections(); ++n) {
+      std::string section;
+      ASSERT_EQ(fragment->GetNthSectionName(n, &section), S_OK);
+      if (!Scan::isMerged(*fragment, section)) continue;
+      scan->mergeSection(*fragment, L"/root/", file, section, true);
+    }
+  }
+};
+
+TEST_F(RegistrarScan, AFileIsUpToDateWithItsStampOnly) {
+  EXPECT_FALSE(scan->isUpToDate("/a", Seconds(1000000)));
+  scan->setStamp("/a", Seconds(1000000));
+  EXPECT_TRUE(scan->isUpToDate("/a", Seconds(1000000)));
+  EXPECT_FALSE(scan->isUpToDate("/a", Seconds(999999)));
+  EXPECT_FALSE(scan->isUpToDate("/b", Seconds(1000000)));
+}
+
+TEST_F(RegistrarScan, AFileThatWasSeenIsPresent) {
+  scan->isUpToDate("/seen", Seconds(1));
+  EXPECT_TRUE(scan->isPresent("/seen"));
+  EXPECT_FALSE(scan->isPresent("/unseen"));
+  EXPECT_TRUE(scan->isPresent(addFile("there", "")));
+}
+
+TEST_F(RegistrarScan, AFileOpenedBeforeIsTheOneThatIsTaken) {
+  std::string file = addFile("a.vlr", "[S]\nx = 1\n");
+  ASSERT_TRUE(scan->openFragment(file));
+  EXPECT_TRUE(scan->takeFragment("/not opened"));
+  EXPECT_FALSE(scan->openFragment(dir.makeDir("directory")));
+}
+
+TEST_F(RegistrarScan, MergesWhatAComponentBringsAndErasesItAgain) {
+  std::string file = addFile("a.vlr",
+                             "[KORComponents]\nC = \"C\"\n[C]\nFileName = \"c\"\n"
+                             "Identifier = \"{00000000-0000-0000-0000-000000000001}\"\n"
+                             "SchemaVersion = 7\n[KOR]\nConfigFile = \"kept\"\n");
+  merge(file);
+  EXPECT_EQ(value("KORComponents", "C"), "C");
+  EXPECT_EQ(value("C", "FileName"), "/root/Data Dictionaries/c.framework");
+  EXPECT_EQ(value("C", "Identifier"), "00000000-0000-0000-0000-000000000001");
+  EXPECT_EQ(value("C", "FragmentRegistered"), "23");
+  EXPECT_EQ(value("VLRContentsSection", "C"), file);
+  scan->eraseComponentsOf(file);
+  EXPECT_LT(database->SectionExists("C"), 0);
+  EXPECT_EQ(value("KORComponents", "C"), "none");
+  EXPECT_EQ(value("VLRContentsSection", "C"), "none");
+}
+
+TEST_F(RegistrarScan, AComponentNamedLikeASectionOfTheDatabaseIsNotMerged) {
+  std::string file = addFile("a.vlr",
+                             "[KORComponents]\nKOR = \"KOR\"\n[KOR]\nConfigFile = \"mine\"\n"
+                             "[Other]\nx = \"1\"\n");
+  merge(file);
+  EXPECT_EQ(value("KOR", "ConfigFile"), "none");
+  EXPECT_EQ(value("Other", "x"), "1");
+}
+
+TEST_F(RegistrarScan, ErasingByARelativePathIsReported) {
+  database->SetItem("Registration", "Info.vlr", "1 2", true);
+  scan->erase("C", "/gone/Info.vlr");
+  EXPECT_EQ(value("Registration", "Info.vlr"), "none");
+  EXPECT_FALSE(scan->droppedPlanted());
+  scan->erase("C", "Info.vlr");
+  EXPECT_TRUE(scan->droppedPlanted());
+}
+
+TEST(RegistrarFileName, IsPutWhereItsKindIs) {
+  struct {
+    bool isDictionary;
+    const char* name;
+    const char* path;
+  } rows[] = {{true, "Foo", "/r/Data Dictionaries/Foo.framework"},
+              {false, "Foo", "/r/Experts/Foo.vle"},
+              {false, "Foo.bar", "/r/Experts/Foo.bar"},
+              {false, "sub/Foo", "sub/Foo.vle"},
+              {true, "/abs/Foo.framework", "/abs/Foo.framework"}};
+  for (const auto& row : rows) {
+    EXPECT_EQ(ProcessFileName(row.isDictionary, L"/r/", row.name), row.path);
+  }
+}
+
+}  // namespace
+}  // namespace registrar

@@ -1,0 +1,78 @@
+#include "source/Pharlap/registrationFiles.h"
+
+#include <errno.h>
+#include <sys/stat.h>
+
+#include "source/Pharlap/registrarText.h"
+#include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/DateTime.h"
+#include "zt/fnd/osdep/FindFiles.h"
+#include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/path.h"
+
+using zt::fnd::AnsiString;
+using zt::fnd::String;
+using zt::fnd::Vector;
+using zt::fnd::osdep::path;
+
+namespace registrar {
+namespace {
+
+constexpr const wchar_t* kRegistrationFile = L"Resources/Info.vlr";
+
+// Nothing can be found at the path, now or later: no entry, a file where a directory should be, links
+// that go in circles, or a name that no file can have.
+bool NamesNothing(int error) {
+  return error == ENOENT || error == ENOTDIR || error == ELOOP || error == ENAMETOOLONG;
+}
+
+// Another user's bundle that this user may not enter. It is none of this process's business, and must
+// not keep it from the others.
+bool MayNotLook(int error) { return error == EACCES || error == EPERM; }
+
+// One stat() answers both whether the file is there and how old it is.
+bool RegistrationTime(const String& file, zt::fnd::AbsTime* time) {
+  struct stat info;
+  if (stat(AnsiString(file).c_str(), &info) != 0) {
+    int error = errno;
+    if (NamesNothing(error) || MayNotLook(error)) return false;
+    ZT_RAISE(zt::fnd::osdep::PosixError(error));
+  }
+  if (!S_ISREG(info.st_mode)) return false;
+  timeval changed = {};
+  changed.tv_sec = info.st_mtime;
+  *time = zt::fnd::osdep::TimevalToAbsTime(changed);
+  return true;
+}
+
+}  // namespace
+
+bool HasLineEnd(const std::string& text) { return text.find_first_of("\r\n") != std::string::npos; }
+
+void AppendRegistrationFiles(const String& directory, const String& mask,
+                             RegistrationFiles& files) {
+  Vector<String> names = zt::fnd::osdep::FindFiles().getFilenames(path::Join(directory, mask));
+  for (const String& name : names) {
+    String bundle = path::IsAbs(name) ? name : path::Join(directory, name);
+    String file = path::Join(bundle, String(kRegistrationFile));
+    // The path becomes the name of an item, where a line end would write lines of its own.
+    if (HasLineEnd(Narrow(file))) continue;
+    zt::fnd::AbsTime time;
+    if (RegistrationTime(file, &time)) files.push_back({file, time});
+  }
+}
+
+bool FileIsThere(const std::string& file) {
+  if (!path::IsAbs(Widen(file))) return false;
+  try {
+    return path::DoesFileExist(Widen(file));
+  } catch (const zt::fnd::osdep::PosixError& error) {
+    int code = static_cast<int>(error.whatcode());
+    if (MayNotLook(code)) return true;
+    // The bundle may have been replaced by a file of its name, or by a link to itself.
+    if (!NamesNothing(code)) throw;
+    return false;
+  }
+}
+
+}  // namespace registrar
