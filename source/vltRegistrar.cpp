@@ -2,8 +2,8 @@
 
 #include <wchar.h>
 
-#include <memory>
 #include <new>
+#include <utility>
 
 #include "ztcom/ztcore/ztcom.h"
 
@@ -84,7 +84,7 @@ HRESULT CvltRegistrar::InternalGetComponentNoScan(GUID identifier, CvltComponent
   CztHold hold(m_components.lock);
   auto found = m_components.map.find(identifier);
   if (found == m_components.map.end()) return E_INVALIDARG;
-  component = found->second;
+  component = found->second.get();
   return S_OK;
 }
 
@@ -101,9 +101,8 @@ HRESULT CvltRegistrar::CopyComponent(GUID identifier, std::optional<_vltComponen
 HRESULT CvltRegistrar::AddComponent(CvltComponent* component) {
   std::unique_ptr<CvltComponent> owned(component);
   CztHold hold(m_components.lock);
-  removeEntry(component->record().identifier);
-  m_components.map.emplace(component->record().identifier, component);
-  owned.release();
+  removeEntry(owned->record().identifier);
+  m_components.map.emplace(owned->record().identifier, std::move(owned));
   return S_OK;
 }
 
@@ -114,14 +113,12 @@ HRESULT CvltRegistrar::RemoveComponent(CvltComponent* component) {
 HRESULT CvltRegistrar::removeEntry(GUID identifier) {
   auto found = m_components.map.find(identifier);
   if (found == m_components.map.end()) return S_FALSE;
-  delete found->second;
   m_components.map.erase(found);
   return S_OK;
 }
 
 HRESULT CvltRegistrar::DeleteComponents() {
   CztHold hold(m_components.lock);
-  for (const auto& [identifier, component] : m_components.map) delete component;
   m_components.map.clear();
   return S_OK;
 }

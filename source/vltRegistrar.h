@@ -3,6 +3,7 @@
 // The registrar's base: the component map in memory, and the enumerator over it.
 
 #include <map>
+#include <memory>
 #include <optional>
 
 #include "source/Common/ZtUtils/General/ztSync.h"
@@ -81,7 +82,7 @@ class CvltRegistrar : public IvltRegistrar2 {
   static _vltComponentType MapStringToType(const wchar_t* text);
 
  protected:
-  using ComponentMap = CvlrProtectedMap<GUID, CvltComponent*>;
+  using ComponentMap = CvlrProtectedMap<GUID, std::unique_ptr<CvltComponent>>;
 
   // All identifiers in map order.
   zt::fnd::Vector<GUID> SnapshotIdentifiers() const;

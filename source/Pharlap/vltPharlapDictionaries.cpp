@@ -16,37 +16,30 @@ using zt::fnd::Vector;
 
 namespace {
 
+// The early-trace lines of this file. Source and numbers are frozen; they do not follow the code.
 constexpr const char* kEarlyTraceSource = "./source/Pharlap/vltPharlapRegistrar";
-constexpr long kPortConfigurationLine = 2208;
 
-// What is missing in one of the two files that are compared, as early tracing tells it.
-struct Warning {
-  long line;
-  const char* text;
+struct EarlyTraceLine {
+  long number;
+  const char* what;
+  const char* where = "";
 };
-constexpr Warning kNoIdentifier = {1857,
-                                   "Warning: Could not read id from section %s, result = %ld"};
-constexpr Warning kNoFileName = {1870,
-                                 "Warning: Could not read file name from section %s, result = %ld"};
-constexpr Warning kNoSchemaVersion = {
-    1882, "Warning: Could not read schema version from section %s, result = %ld"};
-constexpr Warning kNoFragmentIdentifier = {
-    1902, "Warning: Could not read id from section %s in product vlr, result = %ld"};
+constexpr EarlyTraceLine kNoIdentifier = {1857, "id"};
+constexpr EarlyTraceLine kNoFileName = {1870, "file name"};
+constexpr EarlyTraceLine kNoSchemaVersion = {1882, "schema version"};
+constexpr EarlyTraceLine kNoFragmentIdentifier = {1902, "id", " in product vlr"};
+constexpr EarlyTraceLine kPortConfiguration = {2208, "Portcfg options"};
 
-// Reads an item; tells of a failure, and of an empty value where that counts as one. Returns the
-// code.
+// Reads an item; reports a failure, and an empty value where that counts as one. Returns the code.
 HRESULT ReadOrWarn(const CvlIniMgr& ini, const std::string& section, const char* item,
-                   bool mayBeEmpty, const Warning& warning, std::string* value) {
+                   bool mayBeEmpty, const EarlyTraceLine& line, std::string* value) {
   value->clear();
   HRESULT result = ini.GetItem(section.c_str(), item, value);
   if (result >= 0 && (mayBeEmpty || !value->empty())) return result;
-  if ((vltGetTraceFlagsImpl() & kEarlyTraceMask) > 1) {
-    // The formats above are the only ones, each with a text and a number.
-#pragma GCC diagnostic push
-#pragma GCC diagnostic ignored "-Wformat-nonliteral"
-    vltEarlyTrace(kEarlyTraceSource, warning.line, warning.text, section.c_str(),
-                  static_cast<long>(result));
-#pragma GCC diagnostic pop
+  if ((vltGetTraceFlagsImpl() & kEarlyTraceMask) >= kEarlyTraceWarnings) {
+    vltEarlyTrace(kEarlyTraceSource, line.number,
+                  "Warning: Could not read %s from section %s%s, result = %ld", line.what,
+                  section.c_str(), line.where, static_cast<long>(result));
   }
   return result;
 }
@@ -194,9 +187,9 @@ HRESULT CvltPharlapRegistrar::GetPreviousDictionaries(const _vltStartupOptions*,
 HRESULT CvltPharlapRegistrar::RemovePreviousDictionaries(const _vltStartupOptions* options) {
   if (HasPortConfiguration(options)) {
     if (vltGetTraceFlagsImpl() & kEarlyTraceMask) {
-      vltEarlyTrace(kEarlyTraceSource, kPortConfigurationLine,
-                    "Error: Portcfg options specified for pharlap registrar remove previous "
-                    "dictionaries.");
+      vltEarlyTrace(kEarlyTraceSource, kPortConfiguration.number,
+                    "Error: %s specified for pharlap registrar remove previous dictionaries.",
+                    kPortConfiguration.what);
     }
     return E_FAIL;
   }

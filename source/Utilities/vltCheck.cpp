@@ -120,15 +120,10 @@ void FreeComponent(_vltComponent2& record) {
   if (record.type == vltComponentResourceExpert) vltTaskMemFree(record.resource.pnp);
 }
 
-namespace {
+// Every byte: the longest variant is not the one that is initialised by itself.
+OwnedRecord::OwnedRecord() { memset(static_cast<_vltComponent2*>(this), 0, sizeof *this); }
 
-// A record that is ended with its scope.
-struct OwnedRecord : _vltComponent2 {
-  OwnedRecord() : _vltComponent2() { memset(static_cast<_vltComponent2*>(this), 0, sizeof *this); }
-  ~OwnedRecord() { FreeComponent(*this); }
-  OwnedRecord(const OwnedRecord&) = delete;
-  OwnedRecord& operator=(const OwnedRecord&) = delete;
-};
+namespace {
 
 HRESULT CheckAll(IvltRegistrar* registrar, vltErrors& errors) {
   HRESULT status = S_OK;

@@ -53,3 +53,11 @@ HRESULT CheckComponent(const _vltComponent2& component, vltErrors& errors);
 HRESULT CheckComponents(IvltRegistrar* registrar, _vltComponentType type, vltErrors& errors);
 // Frees every text of a record of this library, whatever its type.
 void FreeComponent(_vltComponent2& record);
+
+// A record that a call fills, with the texts that it then has.
+struct OwnedRecord : _vltComponent2 {
+  OwnedRecord();  // zeroed
+  ~OwnedRecord() { FreeComponent(*this); }
+  OwnedRecord(const OwnedRecord&) = delete;
+  OwnedRecord& operator=(const OwnedRecord&) = delete;
+};

@@ -8,6 +8,7 @@
 #include "source/Common/vltHookPoints.h"
 #include "source/Common/vltTestHook.h"
 #include "source/Posix/vltLinuxRegistrar.h"
+#include "source/Utilities/vltCheck.h"
 #include "source/Utilities/vltutils.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
@@ -152,19 +153,6 @@ void TryToLoad(const wchar_t* fileName) {
   }
 }
 
-// Frees the texts of a dictionary's record at the end of a scope.
-struct DictionaryRecord : _vltComponent2 {
-  DictionaryRecord() : _vltComponent2() {}
-  ~DictionaryRecord() {
-    for (wchar_t* text :
-         {dictionary.auxString1, dictionary.prefix, dictionary.auxString2, name, fileName}) {
-      vltFree(text);
-    }
-  }
-  DictionaryRecord(const DictionaryRecord&) = delete;
-  DictionaryRecord& operator=(const DictionaryRecord&) = delete;
-};
-
 }  // namespace
 
 HRESULT vltLoadDataDictionaries2(IvltRegistrar* registrar) {
@@ -173,7 +161,7 @@ HRESULT vltLoadDataDictionaries2(IvltRegistrar* registrar) {
   HRESULT result = registrar->EnumComponents(vltComponentDataDictionary, enumerator.out());
   if (result < 0) return result;
   for (;;) {
-    DictionaryRecord record;
+    OwnedRecord record;
     unsigned int fetched = 0;
     if (enumerator->Next(1, &record, &fetched) != S_OK) return result;
     TryToLoad(record.fileName);
