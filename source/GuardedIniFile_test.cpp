@@ -79,8 +79,7 @@ TEST(GuardedIniFile, ASidecarThatCannotBeReadLeavesTheFile) {
   WriteBytes(place.file, "[s]\na=1\n");
   WriteBytes(place.sidecar, std::string(16, 'x'));
   EXPECT_EQ(InChild([&] {
-              place.ini =
-                  std::make_unique<CvlIniMgr>(place.file.c_str(), true, nullptr, false, false);
+              place.ini.reset(new CvlIniMgr(CvlIniMgr::LockOnly(place.file)));
               ASSERT_TRUE(FailSystemCall(SYS_read, EIO));
               EXPECT_EQ(place.open(kBare), E_FAIL);
               EXPECT_FALSE(place.ini);

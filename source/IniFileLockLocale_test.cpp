@@ -65,14 +65,14 @@ TEST_F(IniLockLocale, ProcessesOfTwoLocalesExcludeEachOther) {
     Signal held, free, entered;
     Child holder([&] {
       if (!m_locales.use(pair.first)) return 1;
-      CvlIniMgr mine(file.c_str(), true, nullptr, false, false);
+      CvlIniMgr mine = CvlIniMgr::LockOnly(file);
       held.notify();
       return free.await() ? 0 : 2;
     });
     ASSERT_TRUE(held.await());
     Child waiter([&] {
       if (!m_locales.use(pair.second)) return 1;
-      CvlIniMgr mine(file.c_str(), true, nullptr, false, false);
+      CvlIniMgr mine = CvlIniMgr::LockOnly(file);
       entered.notify();
       return 0;
     });
@@ -94,7 +94,7 @@ TEST_F(IniLockLocale, WritersOfTwoLocalesLoseNothing) {
       return [this, &file, locale, prefix] {
         if (!m_locales.use(locale)) return 1;
         for (int i = 0; i < kEach; ++i) {
-          CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+          CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
           if (ini.SetItem((prefix + std::to_string(i)).c_str(), "a", "1", true) != S_OK) return 2;
           if (ini.Write() != S_OK) return 3;
         }
@@ -104,7 +104,7 @@ TEST_F(IniLockLocale, WritersOfTwoLocalesLoseNothing) {
     Child first(writes(pair.first, "first")), second(writes(pair.second, "second"));
     EXPECT_EQ(0, first.wait());
     EXPECT_EQ(0, second.wait());
-    CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+    CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
     EXPECT_EQ(2 * kEach, ini.GetNumberOfSections()) << pair.first << " beside " << pair.second;
   }
 }

@@ -38,23 +38,23 @@ TEST(IniLock, NameHasNoSeparatorAndIsInCapitals) {
 TEST(IniLock, IsRecursiveInAThread) {
   TempDir dir;
   std::string file = dir / "x.ini";
-  CvlIniMgr outer(file.c_str(), true, nullptr, false, false);
+  CvlIniMgr outer = CvlIniMgr::LockOnly(file);
   {
-    CvlIniMgr inner(file.c_str(), false, nullptr, true, true);
+    CvlIniMgr inner = CvlIniMgr::OpenAndSaveAtEnd(file);
     inner.SetItem("s", "a", "1", true);
   }
-  CvlIniMgr again(file.c_str(), false, nullptr, false, true);
+  CvlIniMgr again = CvlIniMgr::OpenForUpdate(file);
   EXPECT_EQ(Value(again, "s", "a"), "1");
 }
 
 TEST(IniLock, AnotherThreadWaits) {
   TempDir dir;
   std::string file = dir / "x.ini";
-  auto outer = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
+  std::unique_ptr<CvlIniMgr> outer(new CvlIniMgr(CvlIniMgr::LockOnly(file)));
   Signal started, entered;
   std::thread other([&] {
     started.notify();
-    CvlIniMgr mine(file.c_str(), true, nullptr, false, false);
+    CvlIniMgr mine = CvlIniMgr::LockOnly(file);
     entered.notify();
   });
   EXPECT_TRUE(started.await());
@@ -69,14 +69,14 @@ TEST(IniLock, AnotherProcessWaitsAndGoesOnWhenTheHolderIsKilled) {
   std::string file = dir / "x.ini";
   Signal held, never, entered;
   Child holder([&] {
-    CvlIniMgr mine(file.c_str(), true, nullptr, false, false);
+    CvlIniMgr mine = CvlIniMgr::LockOnly(file);
     held.notify();
     never.await();
     return 0;
   });
   ASSERT_TRUE(held.await());
   Child waiter([&] {
-    CvlIniMgr mine(file.c_str(), true, nullptr, false, false);
+    CvlIniMgr mine = CvlIniMgr::LockOnly(file);
     entered.notify();
     return 0;
   });
@@ -90,11 +90,11 @@ TEST(IniLock, AnotherProcessWaitsAndGoesOnWhenTheHolderIsKilled) {
 TEST(IniLock, MayBeGivenUpByAnotherThreadAndTakenAgain) {
   TempDir dir;
   std::string file = dir / "x.ini";
-  auto mine = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
+  std::unique_ptr<CvlIniMgr> mine(new CvlIniMgr(CvlIniMgr::LockOnly(file)));
   std::thread([&] { mine.reset(); }).join();
-  CvlIniMgr again(file.c_str(), true, nullptr, false, false);
+  CvlIniMgr again = CvlIniMgr::LockOnly(file);
   Child other([&] {
-    CvlIniMgr blocked(file.c_str(), true, nullptr, false, false);
+    CvlIniMgr blocked = CvlIniMgr::LockOnly(file);
     return 0;
   });
   EXPECT_TRUE(Eventually([&] { return BlockedIn(other.pid(), SYS_flock); }));
@@ -128,7 +128,7 @@ TEST(IniLock, TheFirstOwnerWaitsForTheThreadThatGivesUp) {
 TEST(IniLock, AForkedChildDoesNotFreeItsParentsLock) {
   TempDir dir;
   std::string file = dir / "x.ini";
-  auto mine = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
+  std::unique_ptr<CvlIniMgr> mine(new CvlIniMgr(CvlIniMgr::LockOnly(file)));
   EXPECT_EQ(Child([&] {
               mine.reset();
               return 0;
@@ -136,7 +136,7 @@ TEST(IniLock, AForkedChildDoesNotFreeItsParentsLock) {
             0);
   Signal entered;
   Child waiter([&] {
-    CvlIniMgr other(file.c_str(), true, nullptr, false, false);
+    CvlIniMgr other = CvlIniMgr::LockOnly(file);
     entered.notify();
     return 0;
   });

@@ -88,6 +88,22 @@ CvlIniMgr::CvlIniMgr(char const* fileName, bool lockOnly, unsigned char const* e
   Initialize(expectedChecksum);
 }
 
+CvlIniMgr CvlIniMgr::OpenForUpdate(const std::string& fileName) {
+  return CvlIniMgr(fileName.c_str(), false, nullptr, false, true);
+}
+
+CvlIniMgr CvlIniMgr::OpenRaw(const std::string& fileName) {
+  return CvlIniMgr(fileName.c_str(), false, nullptr, false, false);
+}
+
+CvlIniMgr CvlIniMgr::OpenAndSaveAtEnd(const std::string& fileName) {
+  return CvlIniMgr(fileName.c_str(), false, nullptr, true, true);
+}
+
+CvlIniMgr CvlIniMgr::LockOnly(const std::string& fileName) {
+  return CvlIniMgr(fileName.c_str(), true, nullptr, false, false);
+}
+
 CvlIniMgr::~CvlIniMgr() {
   if (m_lockOnly) return;
   if (m_ini && m_saveOnDestroy) Write();

@@ -32,6 +32,17 @@
 // Threads: an object belongs to one at a time; any may destroy it.
 class CvlIniMgr {
  public:
+  // The usual ways to open a file, without a check of its digest. They throw what the constructor throws.
+
+  // Values are in the escape encoding. The caller saves what it changes.
+  static CvlIniMgr OpenForUpdate(const std::string& fileName);
+  // The same, and the destructor saves.
+  static CvlIniMgr OpenAndSaveAtEnd(const std::string& fileName);
+  // Values are as they are in the file. The caller saves what it changes.
+  static CvlIniMgr OpenRaw(const std::string& fileName);
+  // Holds the lock and does nothing else; items must not be asked for.
+  static CvlIniMgr LockOnly(const std::string& fileName);
+
   // Waits for the lock without limit. `lockOnly`: holds the lock and does nothing else; items must
   // not be asked for. `expectedChecksum`: 16 bytes or null for no check. `saveOnDestroy`: the
   // destructor writes. `useEscapes`: values are encoded when set and decoded when read. Throws the

@@ -24,7 +24,7 @@ class IniManagerFork : public testing::Test {
   IniManagerFork() : file(dir / "x.ini") { ini = opened(); }
 
   std::unique_ptr<CvlIniMgr> opened() const {
-    return std::make_unique<CvlIniMgr>(file.c_str(), false, nullptr, false, true);
+    return std::unique_ptr<CvlIniMgr>(new CvlIniMgr(CvlIniMgr::OpenForUpdate(file)));
   }
 
   // As an object that lives long makes a change.

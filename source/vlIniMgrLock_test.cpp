@@ -18,7 +18,7 @@ namespace {
 using namespace vlt::test;
 
 std::unique_ptr<CvlIniMgr> Open(const std::string& file) {
-  return std::make_unique<CvlIniMgr>(file.c_str(), false, nullptr, false, true);
+  return std::unique_ptr<CvlIniMgr>(new CvlIniMgr(CvlIniMgr::OpenForUpdate(file)));
 }
 
 // Sets an item as a client does that holds the object for long: makes sure of the lock, changes, saves.

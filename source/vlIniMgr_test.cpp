@@ -42,7 +42,7 @@ TEST(IniManager, NewFileIsMadeWithItsDirectoryAndModes) {
   std::string file = dir / "a/b/x.ini";
   ScopedUmask strict(077);
   {
-    CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+    CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
     EXPECT_EQ(ReadBytes(file), "");
     EXPECT_EQ(ModeOf(file), 0777);
     EXPECT_EQ(ModeOf(dir / "a/b"), 0777);
@@ -58,7 +58,7 @@ TEST(IniManager, AnEmptyFileIsCleanAndNotWritten) {
   WriteBytes(file, "");
   struct stat before, after;
   {
-    CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+    CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
     ASSERT_EQ(stat(file.c_str(), &before), 0);
     EXPECT_EQ(ini.Write(), S_OK);
     ASSERT_EQ(stat(file.c_str(), &after), 0);
@@ -142,7 +142,7 @@ TEST(IniManager, RunningOutOfDescriptorsLosesNothing) {
     for (int fd; (fd = open("/dev/null", O_RDONLY)) >= 0;) fds.push_back(fd);
     close(fds.back());
     try {
-      CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+      CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
       return 10;
     } catch (int thrown) {
       return thrown;
@@ -162,7 +162,7 @@ TEST(IniManager, SymbolicLinksAreReadButNotOpenedUp) {
   ASSERT_EQ(chmod((dir / "secret").c_str(), 0600), 0);
   ASSERT_EQ(symlink((dir / "secret").c_str(), (dir / "x.ini").c_str()), 0);
   {
-    CvlIniMgr ini((dir / "x.ini").c_str(), false, nullptr, false, true);
+    CvlIniMgr ini = CvlIniMgr::OpenForUpdate(dir / "x.ini");
     EXPECT_EQ(Value(ini, "a", "b"), "1");
   }
   EXPECT_EQ(ModeOf(dir / "secret"), 0600);
@@ -200,14 +200,14 @@ TEST(IniManager, WritesTheDialectAndReadsItBack) {
   TempDir dir;
   std::string file = dir / "x.ini";
   {
-    CvlIniMgr ini(file.c_str(), false, nullptr, true, true);
+    CvlIniMgr ini = CvlIniMgr::OpenAndSaveAtEnd(file);
     EXPECT_EQ(ini.SetItem("s", "quoted", "a b", true), S_OK);
     EXPECT_EQ(ini.SetItem("s", "plain", "7", false), S_OK);
     EXPECT_EQ(ini.SetItem("s", "escaped", "a\nb", true), S_OK);
   }
   // A new section is set apart in the save that brings it.
   EXPECT_EQ(ReadBytes(file), "[s]\nquoted = \"a b\"\nplain = 7\nescaped = \"a\\nb\"\n\n");
-  CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+  CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
   EXPECT_EQ(Value(ini, "S", "QUOTED"), "a b");
   EXPECT_EQ(Value(ini, "s", "escaped"), "a\nb");
 }
@@ -219,7 +219,7 @@ TEST(IniManager, WithoutEscapesALineFeedBreaksTheLine) {
     CvlIniMgr ini(file.c_str(), false, nullptr, true, false);
     EXPECT_EQ(ini.SetItem("s", "i", "a\nb=c", false), S_OK);
   }
-  CvlIniMgr ini(file.c_str(), false, nullptr, false, false);
+  CvlIniMgr ini = CvlIniMgr::OpenRaw(file);
   EXPECT_EQ(Value(ini, "s", "i"), "a");
   EXPECT_EQ(Value(ini, "s", "b"), "c");
 }
@@ -228,7 +228,7 @@ TEST(IniManager, ItemOperationsAnswerByTheirCodes) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na = 1\nb = 2\n[t]\nc = 3\n");
-  CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+  CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
   EXPECT_EQ(ini.GetNumberOfSections(), 2);
   EXPECT_EQ(ini.GetNumberOfItems("s"), 2);
   EXPECT_EQ(ini.GetNumberOfItems("none"), 0);
@@ -270,7 +270,7 @@ TEST(IniManager, ErasingWhatIsAbsentLeavesTheObjectClean) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na=1\n");
-  CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+  CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
   EXPECT_EQ(ini.EraseItem("s", "b"), E_FAIL);
   EXPECT_EQ(ini.EraseSection("t"), E_FAIL);
   EXPECT_EQ(ini.Write(), S_OK);
@@ -285,7 +285,7 @@ TEST(IniManager, ChecksumIsThatOfTheFile) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na=1\n");
-  CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+  CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
   unsigned char* digest = nullptr;
   ASSERT_EQ(ini.WriteAndGetChecksum(&digest), S_OK);  // clean: the file as it stands
   EXPECT_EQ(Hex(std::string(reinterpret_cast<char*>(digest), 16)), Md5Sum(file));
@@ -303,7 +303,7 @@ TEST(IniManager, AVanishedFileFailsTheDigestAndIsSavedAgain) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na=1\n");
-  CvlIniMgr ini(file.c_str(), false, nullptr, true, true);
+  CvlIniMgr ini = CvlIniMgr::OpenAndSaveAtEnd(file);
   std::filesystem::remove(file);
   unsigned char* digest = reinterpret_cast<unsigned char*>(&file);
   EXPECT_EQ(ini.WriteAndGetChecksum(&digest), E_FAIL);
@@ -319,7 +319,7 @@ TEST(IniManager, AFileThatSpoiledMeanwhileLeavesTheObjectAsItWas) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na=1\n");
-  CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+  CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
   WriteBytes(file, "\xFF\xFE[");
   unsigned char* digest = nullptr;
   EXPECT_EQ(ini.WriteAndGetChecksum(&digest), E_FAIL);
@@ -330,7 +330,7 @@ TEST(IniManager, AFailedWriteLeavesFileAndDocument) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na=1\n");
-  CvlIniMgr ini(file.c_str(), false, nullptr, false, true);
+  CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
   ini.SetItem("s", "a", "2", false);
   FileSizeLimit full(4);
   unsigned char* digest = nullptr;

@@ -66,7 +66,7 @@ void Scan::setStamp(const std::string& file, const zt::fnd::AbsTime& time) {
 
 bool Scan::openFragment(const std::string& file) {
   try {
-    m_fragment = std::make_unique<CvlIniMgr>(file.c_str(), false, nullptr, false, true);
+    m_fragment.reset(new CvlIniMgr(CvlIniMgr::OpenForUpdate(file)));
     return true;
   } catch (...) {
     // A file that cannot be parsed has been set aside by its manager already. Any other reason - no

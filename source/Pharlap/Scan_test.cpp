@@ -20,7 +20,7 @@ zt::fnd::AbsTime Seconds(long seconds) {
 }
 
 std::unique_ptr<CvlIniMgr> Open(const std::string& file) {
-  return std::make_unique<CvlIniMgr>(file.c_str(), false, nullptr, false, true);
+  return std::unique_ptr<CvlIniMgr>(new CvlIniMgr(CvlIniMgr::OpenForUpdate(file)));
 }
 
 struct RegistrarScan : testing::Test {

@@ -20,7 +20,7 @@ struct Row {
 void ExpectWalk(const std::vector<std::pair<const char*, const char*>>& items,
                 const std::vector<Row>& expected) {
   TempDir dir;
-  CvlIniMgr ini((dir / "x.ini").c_str(), false, nullptr, false, true);
+  CvlIniMgr ini = CvlIniMgr::OpenForUpdate(dir / "x.ini");
   for (const auto& [name, value] : items) ini.SetItem("VLRContentsSection", name, value, true);
   std::vector<ContentsItem> found = ReadContents(ini);
   ASSERT_EQ(found.size(), expected.size());

@@ -213,9 +213,9 @@ TEST(RegistrarChanged, EveryDictionaryAndNothingElse) {
                 TempDir dir;
                 WriteBytes(dir / "f.vlr", std::string("[S]\n") + row.fragment);
                 WriteBytes(dir / "d.vlr", std::string("[S]\n") + row.database.value_or(""));
-                CvlIniMgr fragment((dir / "f.vlr").c_str(), false, nullptr, false, true);
+                CvlIniMgr fragment = CvlIniMgr::OpenForUpdate(dir / "f.vlr");
                 r->database().EraseSection("S");
-                CvlIniMgr wanted((dir / "d.vlr").c_str(), false, nullptr, false, true);
+                CvlIniMgr wanted = CvlIniMgr::OpenForUpdate(dir / "d.vlr");
                 for (int n = 1; row.database && n <= wanted.GetNumberOfItems("S"); ++n) {
                   std::string name, value;
                   wanted.GetNthItemName("S", n, &name);
@@ -245,7 +245,7 @@ std::string Printed(const Installation& i, const std::function<void(OpenLinux&)>
 
 void CompareEmptyDictionaries(OpenLinux& r, const std::string& place) {
   WriteBytes(place, "[S]\nSchemaVersion = 3\n");
-  CvlIniMgr fragment(place.c_str(), false, nullptr, false, true);
+  CvlIniMgr fragment = CvlIniMgr::OpenForUpdate(place);
   r.database().SetItem("S", "x", "1", true);
   bool changed = false;
   r.HasDDChanged(fragment, L"S", changed);

@@ -53,7 +53,7 @@ void vltRefreshHook() {
     zt::fnd::osdep::path::MakePathEndInSlash(file);
     file += L"VLTHooks.ini";
     if (!zt::fnd::osdep::path::DoesFileExist(file)) return;
-    CvlIniMgr ini(zt::fnd::AnsiString(file).c_str(), false, nullptr, false, false);
+    CvlIniMgr ini = CvlIniMgr::OpenRaw(zt::fnd::AnsiString(file).c_str());
     std::string name;
     if (ini.GetItem("Hook", "Name", &name) >= 0) vlt::hook::Arm(name, FaultsOf(ini));
   } catch (...) {

@@ -206,7 +206,7 @@ HRESULT GetOfflineEndpt(wchar_t* storage, wchar_t** endpoint) {
   std::unique_ptr<wchar_t[]> jar(GetJarFilePath());
   if (!jar) return E_FAIL;
   // Held across the reading and the saving inside, so that both are one step for other processes.
-  CvlIniMgr hold(Narrow(jar.get()).c_str(), true, nullptr, true, false);
+  CvlIniMgr hold = CvlIniMgr::LockOnly(Narrow(jar.get()));
   String found;
   HRESULT result =
       vltGetUniqueOfflineEndpointFromFile(String(storage ? storage : L""), found, String());

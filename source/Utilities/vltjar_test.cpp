@@ -345,7 +345,7 @@ TEST_F(GuardedFile, WithADirectoryThatCannotBeMovedTheFileStays) {
 TEST_F(GuardedFile, AShortSidecarIsJudgedUnderTheLock) {
   WriteBytes(file, "[s]\na=1\n");
   WriteBytes(dir / "x.vl5", std::string(15, 'x'));
-  auto lock = std::make_unique<CvlIniMgr>(file.c_str(), true, nullptr, false, false);
+  std::unique_ptr<CvlIniMgr> lock(new CvlIniMgr(CvlIniMgr::LockOnly(file)));
   Child second([&] { return open() == S_OK && value("s", "a") == "new" ? 0 : 1; });
   ASSERT_TRUE(Eventually([&] { return BlockedIn(second.pid(), SYS_flock); }));
   ASSERT_EQ(open(), E_FAIL);

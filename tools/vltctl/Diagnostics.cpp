@@ -157,7 +157,7 @@ int HookArm(const std::string& name, const std::vector<std::string>& flags) {
     return kNotFound;
   }
   ExpectUsable(HookFile());
-  CvlIniMgr ini(HookFile().c_str(), false, nullptr, false, false);
+  CvlIniMgr ini = CvlIniMgr::OpenRaw(HookFile());
   ini.EraseSection("Hook");
   ini.SetItem("Hook", "Name", name.c_str(), false);
   for (const std::string& flag : flags) {
@@ -172,7 +172,7 @@ int HookArm(const std::string& name, const std::vector<std::string>& flags) {
 int HookClear() {
   if (!fs::exists(HookFile())) return kGood;
   ExpectUsable(HookFile());
-  CvlIniMgr ini(HookFile().c_str(), false, nullptr, false, false);
+  CvlIniMgr ini = CvlIniMgr::OpenRaw(HookFile());
   ini.EraseSection("Hook");
   return ini.Write() < 0 ? kDataUnusable : kGood;
 }
