@@ -39,13 +39,19 @@ ScopedFd CreateNew(const char* path, int flags, mode_t mode);
 
 // An existing file, or a new one. A dangling link is refused with ELOOP: nothing is made where it
 // leads.
-ScopedFd OpenOrCreate(const char* path, int flags, mode_t mode);
+ScopedFd OpenOrCreate(const char* path, int flags, mode_t mode, LastLink link = LastLink::Judged);
 
 ScopedFd OpenDirectory(const char* path);
+
+// The directory of an O_PATH descriptor, opened for reading.
+ScopedFd OpenDirectory(int fd);
 
 // What the path names, for *at() calls and fstat only (O_PATH). `follow` false: a link in the last
 // place is the thing itself.
 ScopedFd LookUp(const char* path, bool follow = true);
+
+// The same for an entry of a directory; a link is the thing itself. `flags`: O_DIRECTORY, or none.
+ScopedFd LookUpEntry(int directory, const char* name, int flags = 0);
 
 // The descriptor, or a copy of it that is 3 or more.
 ScopedFd AboveStandardStreams(ScopedFd fd);
@@ -100,6 +106,11 @@ bool IsPassing(int error);
 // All bytes, from the descriptor's position or from `offset` on; continues after a short write.
 bool WriteAll(int fd, const void* data, size_t sizeBytes);
 bool WriteAllAt(int fd, const void* data, size_t sizeBytes, off_t offset);
+
+// ---- Locks
+
+// flock(2): 0, or -1 with errno.
+int Flock(int fd, int operation);
 
 // ---- Durability
 

@@ -7,12 +7,14 @@
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
+#include <sys/file.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
 #include <memory>
 
 #include "zt/posix/Retry.h"
+#include "zt/posix/Transfer.h"
 
 namespace zt::posix {
 namespace {
@@ -77,7 +79,7 @@ ScopedFd Walk::followLink(const ScopedFd& directory, const ScopedFd& link,
 }
 
 ScopedFd Walk::step(ScopedFd directory, const char* name, bool follow) {
-  ScopedFd found = OpenAt(directory.get(), name, O_PATH | O_NOFOLLOW);
+  ScopedFd found = LookUpEntry(directory.get(), name);
   struct stat info;
   if (!found || fstat(found.get(), &info) != 0) return ScopedFd();
   if (!S_ISLNK(info.st_mode) || !follow) return found;
@@ -161,6 +163,10 @@ ScopedFd LookUp(const char* path, bool follow) {
   return Walk().resolve(AT_FDCWD, path, follow);
 }
 
+ScopedFd LookUpEntry(int directory, const char* name, int flags) {
+  return OpenAt(directory, name, O_PATH | O_NOFOLLOW | flags);
+}
+
 ScopedFd OpenExisting(const char* path, int flags, Kind kind, LastLink link) {
   ScopedFd found = LookUp(path, link == LastLink::Judged);
   struct stat info;
@@ -181,10 +187,10 @@ ScopedFd CreateNew(const char* path, int flags, mode_t mode) {
                                      flags | kAlways | O_CREAT | O_EXCL | O_NOFOLLOW, mode));
 }
 
-ScopedFd OpenOrCreate(const char* path, int flags, mode_t mode) {
+ScopedFd OpenOrCreate(const char* path, int flags, mode_t mode, LastLink link) {
   // Another process may make or remove the file between the two attempts.
   for (int race = 0; race < kMostRaces; ++race) {
-    ScopedFd fd = OpenExisting(path, flags);
+    ScopedFd fd = OpenExisting(path, flags, Kind::File, link);
     if (fd || errno != ENOENT) return fd;
     fd = CreateNew(path, flags, mode);
     if (fd || errno != EEXIST) return fd;
@@ -201,6 +207,8 @@ ScopedFd OpenDirectory(const char* path) {
   if (!found) return found;
   return Reopen(found, path, O_RDONLY | O_DIRECTORY);
 }
+
+ScopedFd OpenDirectory(int fd) { return OpenAt(fd, ".", O_RDONLY | O_DIRECTORY); }
 
 Entry::Entry(const char* path) : name(path) {
   // Slashes at the end belong to the name: they ask for a directory.
@@ -299,7 +307,7 @@ int ChangeMode(int fd, mode_t mode) {
   if (RetryEintr([&] { return syscall(kChangeModeAt, fd, "", mode, AT_EMPTY_PATH); }) == 0) {
     return 0;
   }
-  ScopedFd directory = OpenAt(fd, ".", O_RDONLY | O_DIRECTORY);
+  ScopedFd directory = OpenDirectory(fd);
   return directory ? RetryEintr([&] { return fchmod(directory.get(), mode); }) : -1;
 }
 
@@ -342,26 +350,21 @@ bool IsPassing(int error) {
 }
 
 bool WriteAll(int fd, const void* data, size_t sizeBytes) {
-  const char* next = static_cast<const char*>(data);
-  while (sizeBytes > 0) {
-    ssize_t done = RetryEintr([&] { return write(fd, next, sizeBytes); });
-    if (done <= 0) return false;
-    next += done;
-    sizeBytes -= static_cast<size_t>(done);
-  }
-  return true;
+  auto bytes = static_cast<const char*>(data);
+  return MoveAll(sizeBytes, [&](size_t done, size_t rest) {
+           return write(fd, bytes + done, rest);
+         }) == sizeBytes;
 }
 
 bool WriteAllAt(int fd, const void* data, size_t sizeBytes, off_t offset) {
-  const char* next = static_cast<const char*>(data);
-  while (sizeBytes > 0) {
-    ssize_t done = RetryEintr([&] { return pwrite(fd, next, sizeBytes, offset); });
-    if (done <= 0) return false;
-    next += done;
-    offset += done;
-    sizeBytes -= static_cast<size_t>(done);
-  }
-  return true;
+  auto bytes = static_cast<const char*>(data);
+  return MoveAll(sizeBytes, [&](size_t done, size_t rest) {
+           return pwrite(fd, bytes + done, rest, offset + static_cast<off_t>(done));
+         }) == sizeBytes;
+}
+
+int Flock(int fd, int operation) {
+  return RetryEintr([&] { return flock(fd, operation); });
 }
 
 bool Sync(int fd) {
@@ -378,7 +381,7 @@ bool SyncDirectory(const char* path) {
 bool SyncDirectoryOf(const char* path) {
   Entry entry(path);
   if (!entry.valid()) return false;
-  ScopedFd fd = OpenAt(entry.directory.get(), ".", O_RDONLY | O_DIRECTORY);
+  ScopedFd fd = OpenDirectory(entry.directory.get());
   if (!fd) return errno == EACCES;
   return Sync(fd.get());
 }

@@ -3,6 +3,7 @@
 #include <errno.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
@@ -263,6 +264,23 @@ TEST(PosixFiles, LinksInTheLastPlaceAreRefusedOnRequest) {
   EXPECT_EQ(errno, ELOOP);
   EXPECT_EQ(Contents(OpenExisting((dir / "f").c_str(), O_RDONLY, Kind::File, LastLink::Refused)),
             "x");
+  EXPECT_FALSE(OpenOrCreate((dir / "link").c_str(), O_RDONLY, 0600, LastLink::Refused));
+  EXPECT_EQ(errno, ELOOP);
+}
+
+TEST(PosixFiles, AnEntryThatIsALinkIsLookedUpItself) {
+  TempDir dir;
+  dir.makeDir("d");
+  ASSERT_EQ(symlink("d", (dir / "link").c_str()), 0);
+  ScopedFd directory = OpenDirectory(LookUp(dir.path().c_str()).get());
+  ASSERT_TRUE(directory);
+  ScopedFd link = LookUpEntry(directory.get(), "link");
+  struct stat info = {};
+  ASSERT_EQ(fstat(link.get(), &info), 0);
+  EXPECT_TRUE(S_ISLNK(info.st_mode));
+  EXPECT_FALSE(LookUpEntry(directory.get(), "link", O_DIRECTORY));
+  EXPECT_EQ(errno, ENOTDIR);
+  EXPECT_TRUE(LookUpEntry(directory.get(), "d", O_DIRECTORY));
 }
 
 TEST(PosixFiles, MakeRoomRemovesFilesAndMovesDirectoriesAside) {
@@ -291,6 +309,17 @@ TEST(PosixFiles, WritesGoOnAfterShortOnes) {
   }
   EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ(total, data.size());
+}
+
+TEST(PosixFiles, FlockFailsWithErrnoWhileAnotherHasTheLock) {
+  TempDir dir;
+  ScopedFd a = OpenOrCreate((dir / "f").c_str(), O_RDWR, 0600);
+  ScopedFd b = OpenOrCreate((dir / "f").c_str(), O_RDWR, 0600);
+  ASSERT_EQ(Flock(a.get(), LOCK_EX), 0);
+  EXPECT_EQ(Flock(b.get(), LOCK_EX | LOCK_NB), -1);
+  EXPECT_EQ(errno, EWOULDBLOCK);
+  EXPECT_EQ(Flock(a.get(), LOCK_UN), 0);
+  EXPECT_EQ(Flock(b.get(), LOCK_EX | LOCK_NB), 0);
 }
 
 TEST(PosixFiles, SyncReportsRealFailuresOnly) {

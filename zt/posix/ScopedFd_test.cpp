@@ -6,21 +6,53 @@
 
 #include <utility>
 
+#include "tests/support/HostsFile.h"
 #include "zt/posix/Retry.h"
 
 namespace zt::posix {
 namespace {
 
+using vlt::test::IsOpen;
+
+int OpenNull() { return open("/dev/null", O_RDONLY | O_CLOEXEC); }
+
+TEST(PosixScopedFd, ClosesOnceAndKeepsErrno) {
+  int fd = OpenNull();
+  errno = EDOM;
+  {
+    ScopedFd owner(fd);
+    EXPECT_TRUE(owner.valid());
+    EXPECT_EQ(owner.get(), fd);
+  }
+  EXPECT_EQ(errno, EDOM);
+  EXPECT_FALSE(IsOpen(fd));
+}
+
+TEST(PosixScopedFd, MovesAndReleases) {
+  int fd = OpenNull();
+  ScopedFd first(fd);
+  ScopedFd second(std::move(first));
+  EXPECT_FALSE(first.valid());
+  ScopedFd third;
+  third = std::move(second);
+  EXPECT_TRUE(IsOpen(fd));
+  EXPECT_EQ(third.release(), fd);
+  EXPECT_FALSE(third.valid());
+  third.reset(fd);
+  third.reset();
+  EXPECT_FALSE(IsOpen(fd));
+}
+
 TEST(PosixScopedFd, AnObjectThatIsMovedToItselfKeepsItsDescriptor) {
-  ScopedFd fd(open("/dev/null", O_RDONLY | O_CLOEXEC));
+  ScopedFd fd(OpenNull());
   int number = fd.get();
   ScopedFd& same = fd;
   fd = std::move(same);
   EXPECT_EQ(fd.get(), number);
-  EXPECT_NE(fcntl(number, F_GETFD), -1);
+  EXPECT_TRUE(IsOpen(number));
 }
 
-TEST(PosixRetry, GoesOnAfterInterruptionsOnly) {
+TEST(PosixRetry, RepeatsInterruptedCallsOnly) {
   int calls = 0;
   EXPECT_EQ(RetryEintr([&] {
               errno = EINTR;
@@ -28,6 +60,15 @@ TEST(PosixRetry, GoesOnAfterInterruptionsOnly) {
             }),
             7);
   EXPECT_EQ(calls, 4);
+  calls = 0;
+  EXPECT_EQ(RetryEintr([&] {
+              ++calls;
+              errno = EACCES;
+              return -1;
+            }),
+            -1);
+  EXPECT_EQ(calls, 1);
+  EXPECT_EQ(errno, EACCES);
 }
 
 }  // namespace

@@ -1,0 +1,30 @@
+#pragma once
+
+#include <errno.h>
+#include <limits.h>
+#include <stddef.h>
+#include <sys/types.h>
+
+#include <algorithm>
+
+#include "zt/posix/Retry.h"
+
+namespace zt::posix {
+
+// Moves up to `sizeBytes` bytes by transfer(done, rest), which moves some of the rest as read() and
+// write() do. Ends early where one moves nothing; errno is then that call's, or 0 for one that
+// reported no failure: the end of the file. Returns how many were moved.
+template <class Transfer>
+size_t MoveAll(size_t sizeBytes, Transfer transfer) {
+  size_t done = 0;
+  while (done < sizeBytes) {
+    size_t rest = std::min<size_t>(sizeBytes - done, SSIZE_MAX);
+    ssize_t moved = RetryEintr([&] { return static_cast<ssize_t>(transfer(done, rest)); });
+    if (moved == 0) errno = 0;
+    if (moved <= 0) break;
+    done += static_cast<size_t>(moved);
+  }
+  return done;
+}
+
+}  // namespace zt::posix
