@@ -12,8 +12,7 @@
 #include "tests/support/InChild.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/TestIni.h"
-#include "zt/fnd/osdep/Retry.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/Files.h"
 
 namespace {
 
@@ -86,8 +85,8 @@ TEST_F(IniManagerFork, AChildThatOutlivesTheHolderKeepsWhatTheHolderSavedLast) {
   gone.notify();
   ASSERT_TRUE(saved.await());
   // The lock is the child's from its save on.
-  zt::fnd::osdep::ScopedFd fd(open(lockFile().c_str(), O_RDWR | O_CLOEXEC));
-  EXPECT_NE(zt::fnd::osdep::Flock(fd.get(), LOCK_EX | LOCK_NB), 0);
+  zt::posix::ScopedFd fd(open(lockFile().c_str(), O_RDWR | O_CLOEXEC));
+  EXPECT_NE(zt::posix::Flock(fd.get(), LOCK_EX | LOCK_NB), 0);
   fd.reset();
   end.notify();
   EXPECT_EQ(child.wait(), 0);

@@ -10,7 +10,7 @@
 
 #include "tests/support/MutexPlace.h"
 #include "tests/support/TempDir.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/Files.h"
 
 // The descriptors of this process, which hosts close and use again by their numbers.
 namespace vlt::test {
@@ -34,7 +34,7 @@ class HostsFile {
  public:
   HostsFile(const std::string& path, int number) : m_path(path), m_number(number) {
     WriteBytes(path, kBytes);
-    zt::fnd::osdep::ScopedFd fd(::open(path.c_str(), O_RDWR | O_CLOEXEC));
+    zt::posix::ScopedFd fd(::open(path.c_str(), O_RDWR | O_CLOEXEC));
     EXPECT_EQ(number, dup2(fd.get(), number));
   }
   ~HostsFile() { ::close(m_number); }
@@ -42,7 +42,7 @@ class HostsFile {
   HostsFile& operator=(const HostsFile&) = delete;
 
   // flock() through the number, and whether others can have it.
-  bool lock() const { return zt::fnd::osdep::Flock(m_number, LOCK_EX | LOCK_NB) == 0; }
+  bool lock() const { return zt::posix::Flock(m_number, LOCK_EX | LOCK_NB) == 0; }
   bool free() const { return FileIsFree(m_path); }
   bool isOpen() const { return IsOpen(m_number); }
   bool unchanged() const { return ReadBytes(m_path) == kBytes; }

@@ -8,7 +8,7 @@
 #include <string>
 
 #include "tests/support/TempDir.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/Files.h"
 
 namespace vlt::test {
 
@@ -21,9 +21,9 @@ struct MutexPlace {
 
 // Whether the lock on the file is free for others, told by a descriptor of its own.
 inline bool FileIsFree(const std::string& path) {
-  zt::fnd::osdep::ScopedFd fd(::open(path.c_str(), O_RDWR | O_CLOEXEC));
+  zt::posix::ScopedFd fd(::open(path.c_str(), O_RDWR | O_CLOEXEC));
   EXPECT_TRUE(fd.valid()) << path;
-  return zt::fnd::osdep::Flock(fd.get(), LOCK_EX | LOCK_NB) == 0;
+  return zt::posix::Flock(fd.get(), LOCK_EX | LOCK_NB) == 0;
 }
 
 }  // namespace vlt::test

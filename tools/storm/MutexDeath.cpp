@@ -17,13 +17,13 @@
 #include "tools/storm/Process.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/Mutex.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/ScopedFd.h"
 
 namespace storm {
 namespace {
 
 using zt::fnd::osdep::Mutex;
-using zt::fnd::osdep::ScopedFd;
+using zt::posix::ScopedFd;
 
 constexpr auto kDeadline = std::chrono::seconds(10);
 constexpr int kDeadlineMs = 10000;

@@ -24,7 +24,7 @@ namespace {
 namespace fs = std::filesystem;
 
 using vltctl::ForTerminal;
-using zt::fnd::osdep::ScopedFd;
+using zt::posix::ScopedFd;
 
 constexpr size_t kLastLines = 10;
 constexpr size_t kTailSize = 256 * 1024;  // a line of the log has at most 2,047 bytes

@@ -13,8 +13,8 @@
 #include "tools/vltctl/Reading.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/EventStateFile.h"
-#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
+#include "zt/posix/ScopedFd.h"
 
 namespace admin {
 namespace {
@@ -25,7 +25,7 @@ using zt::fnd::osdep::SetHeader;
 
 constexpr const char* kUnlinked = " (deleted)";
 using zt::fnd::osdep::kStateFileSize;
-using zt::fnd::osdep::ScopedFd;
+using zt::posix::ScopedFd;
 
 // As much of a file as an event's can have. Anybody may put anything there: what is no regular file is
 // not waited for, and a large one not read.

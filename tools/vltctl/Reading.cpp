@@ -15,7 +15,7 @@
 #include "vlloader/source/vlloader.h"
 
 using vltctl::ForTerminal;
-using zt::fnd::osdep::ScopedFd;
+using zt::posix::ScopedFd;
 
 namespace admin {
 namespace {

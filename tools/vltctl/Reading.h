@@ -6,7 +6,7 @@
 #include <utility>
 #include <vector>
 
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/ScopedFd.h"
 #include "ztini/ztini.h"
 
 // Reading shared files as an onlooker: without a lock, and without making or changing anything.
@@ -18,7 +18,7 @@ inline constexpr size_t kFileLimit = size_t{256} << 20;
 // The file for reading, if it is a regular one; links are followed. Nothing else is opened, so a pipe
 // is not waited for and a device not touched. Invalid otherwise, with errno (EINVAL for what is no
 // regular file) and why in *error.
-zt::fnd::osdep::ScopedFd OpenRegular(const std::string& file, std::string* error);
+zt::posix::ScopedFd OpenRegular(const std::string& file, std::string* error);
 
 // A file and its sidecar as they stood together at one moment.
 struct GuardedBytes {
