@@ -47,7 +47,7 @@ bool MakeOpenDirectory(const String& directory) {
   int parent = entry.directory.get();
   std::string unfinished = std::string(entry.name) + kUnfinished;
   if (mkdirat(parent, unfinished.c_str(), kSharedMode) != 0 && errno != EEXIST) return false;
-  ScopedFd made(openat(parent, unfinished.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  ScopedFd made = zt::posix::LookUpEntry(parent, unfinished.c_str(), O_DIRECTORY);
   if (made.valid() && zt::posix::SetSharedMode(made.get(), kSharedMode) == 0 &&
       zt::posix::RenameToNew(parent, unfinished.c_str(), entry.name) == 0) {
     return zt::posix::SyncDirectoryOf(target.c_str());
@@ -86,14 +86,14 @@ class TreeMode {
  private:
   // Leaves the status alone if there are no entries; else returns that of the last one visited.
   HRESULT changeEntries(int directory, HRESULT status) {
-    ScopedFd fd(openat(directory, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    ScopedFd fd = zt::posix::OpenDirectory(directory);
     std::unique_ptr<DIR, int (*)(DIR*)> entries(fd.valid() ? fdopendir(fd.get()) : nullptr,
                                                 closedir);
     if (!entries) return status;  // a directory that may not be read has no entries to be seen
     fd.release();
     while (const dirent* entry = readdir(entries.get())) {
       if (entry->d_name[0] == '.') continue;
-      ScopedFd found(openat(dirfd(entries.get()), entry->d_name, O_PATH | O_NOFOLLOW | O_CLOEXEC));
+      ScopedFd found = zt::posix::LookUpEntry(dirfd(entries.get()), entry->d_name);
       if (!found.valid() && errno == ENOENT) continue;  // removed just now
       status = found.valid() ? change(found.get()) : E_FAIL;
       if (status < 0) break;

@@ -14,7 +14,6 @@
 
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
-#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/path.h"
 #include "zt/posix/Files.h"
 #include "ztini/ztini.h"
@@ -22,7 +21,7 @@
 using zt::fnd::AnsiString;
 using zt::fnd::String;
 using zt::fnd::osdep::path;
-using zt::fnd::osdep::ScopedFd;
+using zt::posix::ScopedFd;
 
 void vltEarlyTrace(const char* sourceName, long line, const char* format, ...) {
   char message[2048];

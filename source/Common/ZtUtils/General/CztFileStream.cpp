@@ -1,12 +1,13 @@
 #include "source/Common/ZtUtils/General/CztFileStream.h"
 
-#include <algorithm>
 #include <new>
 
 #include "source/Common/ZtUtils/General/ztStreamException.h"
 #include "zt/fnd/osdep/OSException.h"
+#include "zt/posix/Transfer.h"
 
 using zt::fnd::osdep::BinaryFile;
+using zt::posix::MoveAll;
 
 namespace {
 
@@ -18,18 +19,6 @@ BinaryFile::Mode OpenMode(bool truncate, bool read, bool write) {
   if (read) return mode | Mode::Read;
   if (write) return mode | Mode::Write | Mode::Create;
   return mode;
-}
-
-// One transfer after the other until all is moved, or one moves nothing.
-template <class Transfer>
-unsigned int MoveAll(unsigned int count, Transfer transfer) {
-  unsigned int moved = 0;
-  while (moved < count) {
-    long n = transfer(moved, count - moved);
-    if (n <= 0) break;
-    moved += static_cast<unsigned int>(n);
-  }
-  return moved;
 }
 
 // Runs what throws for failures of the system; true if it did not.
@@ -73,9 +62,9 @@ HRESULT CztFileStream::Read(void* buffer, unsigned int count, unsigned int* done
   if (done) *done = 0;
   if (!m_canRead) return ZT_E_ACCESS_DENIED;
   if (!m_file || !buffer) return E_INVALIDARG;
-  unsigned int got = MoveAll(count, [&](unsigned int from, unsigned int left) {
+  auto got = static_cast<unsigned int>(MoveAll(count, [&](size_t from, size_t left) {
     return m_file->read(static_cast<char*>(buffer) + from, left);
-  });
+  }));
   if (done) *done = got;
   return got < count ? ZT_E_END_OF_STREAM : S_OK;
 }
@@ -84,9 +73,9 @@ HRESULT CztFileStream::Write(const void* buffer, unsigned int count, unsigned in
   if (done) *done = 0;
   if (!m_canWrite) return ZT_E_ACCESS_DENIED;
   if (!m_file || !buffer) return E_INVALIDARG;
-  unsigned int put = MoveAll(count, [&](unsigned int from, unsigned int left) {
+  auto put = static_cast<unsigned int>(MoveAll(count, [&](size_t from, size_t left) {
     return m_file->write(static_cast<const char*>(buffer) + from, left);
-  });
+  }));
   if (done) *done = put;
   return put < count ? E_FAIL : S_OK;
 }

@@ -18,8 +18,6 @@
 #include "zt/fnd/osdep/DateTime.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
-#include "zt/fnd/osdep/Retry.h"
-#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 #include "zt/fnd/osdep/ThreadID.h"
 #include "zt/posix/Files.h"
@@ -27,6 +25,7 @@
 using zt::fnd::AnsiString;
 using zt::fnd::String;
 using namespace zt::fnd::osdep;
+using zt::posix::ScopedFd;
 
 constinit std::atomic<uint32_t> vlTracer::gs_traceMask{0};
 
@@ -103,12 +102,8 @@ void OpenLog(LogFile& log) {
   }
   // Others may write to the directory: a link or a pipe under the log's name, or a file with a second
   // name, is not what was meant.
-  const char* name = log.name.c_str();
-  ScopedFd file = zt::posix::OpenExisting(name, O_WRONLY | O_APPEND, zt::posix::Kind::File,
+  ScopedFd file = zt::posix::OpenOrCreate(log.name.c_str(), O_WRONLY | O_APPEND, kLogMode,
                                           zt::posix::LastLink::Refused);
-  if (!file && errno == ENOENT) {
-    file = zt::posix::CreateNew(name, O_WRONLY | O_APPEND, kLogMode);
-  }
   struct stat info;
   if (!file || fstat(file.get(), &info) != 0 || info.st_nlink > 1) return;
   log.identity.device = info.st_dev;
@@ -126,12 +121,7 @@ void CloseLog(LogFile& log) {
 void AppendLine(int fd, const char* line) {
   char text[kLongestLine + 2];
   snprintf(text, sizeof text, "%.*s\n", static_cast<int>(kLongestLine), line);
-  const size_t size = strlen(text);
-  for (size_t done = 0; done < size;) {
-    ssize_t n = RetryEintr([&] { return write(fd, text + done, size - done); });
-    if (n <= 0) return;
-    done += static_cast<size_t>(n);
-  }
+  zt::posix::WriteAll(fd, text, strlen(text));
 }
 
 // Writes the line to the file; on a disk that has become short, the message in the line's place, for
