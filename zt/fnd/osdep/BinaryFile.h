@@ -40,6 +40,7 @@ class BinaryFile {
   BinaryFile& operator=(const BinaryFile&) = delete;
 
   bool isOpen() const noexcept { return m_fd >= 0; }
+  int descriptor() const noexcept { return m_fd; }  // stays the object's; -1 for none
 
   // An object that is open stays as it is: EINVAL. open throws PosixError; openNoThrow returns 0 or
   // -1.

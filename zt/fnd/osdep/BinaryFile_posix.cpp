@@ -11,8 +11,12 @@
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/BinaryFile.h"
 #include "zt/fnd/osdep/OSException.h"
-#include "zt/fnd/osdep/Retry.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/Files.h"
+#include "zt/posix/Retry.h"
+#include "zt/posix/Transfer.h"
+
+using zt::posix::RetryEintr;
+using zt::posix::ScopedFd;
 
 namespace zt {
 namespace fnd {
@@ -42,22 +46,6 @@ int OpenFlags(BinaryFile::Mode mode) {
     }
   }
   return flags;
-}
-
-// Moves up to n bytes by a call that moves some of the rest; returns how many were moved.
-template <class Transfer>
-unsigned long MoveAll(unsigned long n, Transfer transfer) {
-  unsigned long done = 0;
-  while (done < n) {
-    errno = 0;
-    ssize_t moved = transfer(done, std::min<unsigned long>(n - done, SSIZE_MAX));
-    if (moved > 0) {
-      done += static_cast<unsigned long>(moved);
-    } else if (errno != EINTR) {
-      break;
-    }
-  }
-  return done;
 }
 
 // The result of a transfer that is complete.
@@ -159,7 +147,7 @@ int BinaryFile::readExactSize(AutoBuffer& buffer, unsigned int n) const {
 }
 
 int BinaryFile::ReadExactSize(int fd, void* bytes, unsigned long n) {
-  unsigned long got = MoveAll(n, [&](unsigned long done, unsigned long rest) {
+  size_t got = zt::posix::MoveAll(n, [&](size_t done, size_t rest) {
     return ::read(fd, static_cast<char*>(bytes) + done, rest);
   });
   if (got == n) return FullCount(n);
@@ -170,10 +158,7 @@ int BinaryFile::ReadExactSize(int fd, void* bytes, unsigned long n) {
 }
 
 int BinaryFile::WriteExactSize(int fd, const void* bytes, unsigned long n) {
-  unsigned long written = MoveAll(n, [&](unsigned long done, unsigned long rest) {
-    return ::write(fd, static_cast<const char*>(bytes) + done, rest);
-  });
-  return written == n ? FullCount(n) : -1;
+  return zt::posix::WriteAll(fd, bytes, n) ? FullCount(n) : -1;
 }
 
 std::int64_t BinaryFile::readByteVector(AutoBuffer& buffer, Endianness order) {

@@ -10,7 +10,9 @@
 
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/PosixMutexHold.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/ScopedFd.h"
+
+using zt::posix::ScopedFd;
 
 namespace zt {
 namespace fnd {

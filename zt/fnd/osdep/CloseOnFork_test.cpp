@@ -18,7 +18,10 @@
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/Files.h"
+
+using zt::posix::Flock;
+using zt::posix::ScopedFd;
 
 namespace zt::fnd::osdep {
 namespace {

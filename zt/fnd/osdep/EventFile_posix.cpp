@@ -10,10 +10,13 @@
 
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/OSException.h"
-#include "zt/fnd/osdep/Retry.h"
-#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/SharedObjectName.h"
 #include "zt/fnd/osdep/Sleep.h"
+#include "zt/posix/Files.h"
+#include "zt/posix/Retry.h"
+
+using zt::posix::Flock;
+using zt::posix::RetryEintr;
 
 namespace zt {
 namespace fnd {
@@ -95,9 +98,7 @@ bool EventFile::read(void* bytes, std::size_t n, std::uint64_t offset) const noe
 }
 
 bool EventFile::write(const void* bytes, std::size_t n, std::uint64_t offset) const noexcept {
-  ssize_t put =
-      RetryEintr([&] { return ::pwrite(m_fd.get(), bytes, n, static_cast<off_t>(offset)); });
-  return put >= 0 && static_cast<std::size_t>(put) == n;
+  return zt::posix::WriteAllAt(m_fd.get(), bytes, n, static_cast<off_t>(offset));
 }
 
 bool EventFile::share() noexcept {
@@ -119,7 +120,7 @@ bool EventFile::claim() noexcept {
 
 bool EventFile::unlink() const noexcept {
   if (!m_fd.identity().isNamedBy(*m_path)) return false;
-  return RetryEintr([&] { return ::unlink(m_path->c_str()); }) == 0;
+  return zt::posix::Unlink(m_path->c_str()) == 0;
 }
 
 void EventFile::close() noexcept {

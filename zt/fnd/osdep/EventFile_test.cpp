@@ -21,7 +21,10 @@
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/ThreadState.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/Files.h"
+
+using zt::posix::Flock;
+using zt::posix::ScopedFd;
 
 namespace zt::fnd::osdep {
 namespace {

@@ -4,7 +4,9 @@
 
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/FileTime.h"
-#include "zt/fnd/osdep/Retry.h"
+#include "zt/posix/Retry.h"
+
+using zt::posix::RetryEintr;
 
 namespace zt {
 namespace fnd {

@@ -7,8 +7,10 @@
 #include "zt/fnd/osdep/LeakedInstance.h"
 #include "zt/fnd/osdep/LoadModule.h"
 #include "zt/fnd/osdep/OSException.h"
-#include "zt/fnd/osdep/Retry.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Retry.h"
+
+using zt::posix::RetryEintr;
 
 namespace zt {
 namespace fnd {

@@ -19,7 +19,9 @@
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/Mutex.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/ScopedFd.h"
+
+using zt::posix::ScopedFd;
 
 namespace zt::fnd::osdep {
 namespace {

@@ -11,10 +11,12 @@
 #include "zt/fnd/osdep/MutexGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/ProcessMark.h"
-#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/SharedObjectName.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Files.h"
+
+using zt::posix::Flock;
 
 namespace zt {
 namespace fnd {

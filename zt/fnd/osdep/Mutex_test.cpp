@@ -28,7 +28,6 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/OSException.h"
-#include "zt/fnd/osdep/ScopedFd.h"
 
 namespace zt::fnd::osdep {
 namespace {

@@ -27,7 +27,10 @@
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/EventStateFile.h"
 #include "zt/fnd/osdep/NamedEvent.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/Files.h"
+
+using zt::posix::Flock;
+using zt::posix::ScopedFd;
 
 namespace zt::fnd::osdep {
 namespace {

@@ -9,8 +9,10 @@
 #include "zt/fnd/osdep/NamedEvent.h"
 #include "zt/fnd/osdep/NamedEventGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
-#include "zt/fnd/osdep/Retry.h"
 #include "zt/fnd/osdep/Sleep.h"
+#include "zt/posix/Retry.h"
+
+using zt::posix::RetryEintr;
 
 namespace zt {
 namespace fnd {

@@ -11,7 +11,9 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/NamedEventGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
-#include "zt/fnd/osdep/Retry.h"
+#include "zt/posix/Retry.h"
+
+using zt::posix::RetryEintr;
 
 namespace zt {
 namespace fnd {

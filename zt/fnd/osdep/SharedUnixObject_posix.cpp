@@ -9,12 +9,14 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/OSException.h"
-#include "zt/fnd/osdep/Retry.h"
-#include "zt/fnd/osdep/ScopedFd.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 #include "zt/fnd/osdep/Sleep.h"
 #include "zt/fnd/osdep/path.h"
 #include "zt/posix/Files.h"
+#include "zt/posix/Retry.h"
+
+using zt::posix::RetryEintr;
+using zt::posix::ScopedFd;
 
 namespace zt {
 namespace fnd {
@@ -47,17 +49,6 @@ void MakeDirectories(const String& path) {
   }
 }
 
-// Opens, or returns -1 with errno. Another process may make or remove the file between the attempts.
-ScopedFd OpenShared(const AnsiString& path) {
-  for (int race = 0;; ++race) {
-    ScopedFd fd = zt::posix::OpenExisting(path.c_str(), O_RDWR, zt::posix::Kind::File,
-                                          zt::posix::LastLink::Refused);
-    if (fd || errno != ENOENT) return fd;
-    fd = zt::posix::CreateNew(path.c_str(), O_RDWR, kFileMode);
-    if (fd || errno != EEXIST || race == kRounds) return fd;
-  }
-}
-
 // What may be in the place of a file: a link, a directory, a pipe or a device, a file with a second name.
 bool IsInTheWay(int error) {
   return error == ELOOP || error == EISDIR || error == ENXIO || error == EMLINK;
@@ -72,7 +63,8 @@ bool IsInTheWay(int error) {
 // Opens through the moments in which another user's file has not got its mode yet.
 ScopedFd OpenSharedPatiently(const AnsiString& path, InTheWay way) {
   for (int refused = 0, cleared = 0;;) {
-    ScopedFd fd = OpenShared(path);
+    ScopedFd fd =
+        zt::posix::OpenOrCreate(path.c_str(), O_RDWR, kFileMode, zt::posix::LastLink::Refused);
     struct stat info;
     if (fd && ::fstat(fd.get(), &info) != 0) ZT_RAISE(PosixError());
     if (fd && info.st_nlink <= 1) return fd;

@@ -18,7 +18,9 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/OSException.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+#include "zt/posix/ScopedFd.h"
+
+using zt::posix::ScopedFd;
 
 namespace zt::fnd::osdep {
 namespace {

@@ -1,11 +1,13 @@
 #include "zt/fnd/osdep/UuidSource.h"
+#include "zt/posix/Retry.h"
+#include "zt/posix/ScopedFd.h"
 
 #include <fcntl.h>
 #include <sys/random.h>
 #include <unistd.h>
 
-#include "zt/fnd/osdep/Retry.h"
-#include "zt/fnd/osdep/ScopedFd.h"
+using zt::posix::RetryEintr;
+using zt::posix::ScopedFd;
 
 namespace zt {
 namespace fnd {

@@ -14,9 +14,11 @@
 #include "zt/fnd/osdep/BinaryFile.h"
 #include "zt/fnd/osdep/FindFiles.h"
 #include "zt/fnd/osdep/OSException.h"
-#include "zt/fnd/osdep/Retry.h"
 #include "zt/fnd/osdep/path.h"
 #include "zt/posix/Files.h"
+#include "zt/posix/Retry.h"
+
+using zt::posix::RetryEintr;
 
 // Renaming, copying and the operations on trees, which need files and listings.
 namespace zt {
@@ -99,12 +101,13 @@ void CopyAndRemove(const String& from, const String& to) {
   BinaryFile copy;
   CopyInto(copy, from, to, false);
   try {
-    copy.sync();
+    // Not copy.sync(), which takes a file system without fsync for a failure.
+    if (!zt::posix::Sync(copy.descriptor())) ZT_RAISE(PosixError());
     SyncDirectoryOf(to);
     path::RemoveFile(from);
-  } catch (...) {  // The file must not stand in two places; the first failure is the one to tell.
+  } catch (...) {  // The file must not be in two places; the first failure is the one to report.
     AnsiString narrow(to);
-    RetryEintr([&] { return ::remove(narrow.c_str()); });
+    zt::posix::Unlink(narrow.c_str());
     throw;
   }
 }

@@ -193,6 +193,21 @@ TEST(PathTree, RenameBetweenFileSystemsKeepsTheSourceUntilTheCopyIsOnTheDisk) {
   EXPECT_FALSE(Exists(other.path() + "/to"));
 }
 
+TEST(PathTree, RenameToAFileSystemWithoutFsyncMovesTheFile) {
+  TempDir dir;
+  OtherFileSystem other(dir.path());
+  if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
+  WriteBytes(dir / "from", "bytes");
+  vlt::test::Child child([&] {
+    if (!vlt::test::FailSystemCall(SYS_fsync, EINVAL)) return 1;
+    path::RenameFile(Wide(dir / "from"), Wide(other.path() + "/to"));
+    return 0;
+  });
+  EXPECT_EQ(0, child.wait());
+  EXPECT_FALSE(Exists(dir / "from"));
+  EXPECT_EQ("bytes", ReadBytes(other.path() + "/to"));
+}
+
 TEST(PathTree, RenameOfALinkOntoItsTargetInAnotherFileSystemKeepsTheBytes) {
   TempDir dir;
   OtherFileSystem other(dir.path());

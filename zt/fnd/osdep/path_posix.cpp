@@ -11,9 +11,11 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/OSException.h"
-#include "zt/fnd/osdep/Retry.h"
 #include "zt/fnd/osdep/path.h"
 #include "zt/posix/Files.h"
+#include "zt/posix/Retry.h"
+
+using zt::posix::RetryEintr;
 
 // The operations on single entries of the file system.
 namespace zt {
@@ -59,8 +61,7 @@ int MakeOneDir(const char* path, bool useMode, mode_t mode) {
   if (RetryEintr([&] { return ::mkdirat(parent, entry.name, first); }) != 0) return errno;
   if (!useMode) return 0;
   // The umask may have cut the mode.
-  zt::posix::ScopedFd made(RetryEintr(
-      [&] { return ::openat(parent, entry.name, O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC); }));
+  zt::posix::ScopedFd made = zt::posix::LookUpEntry(parent, entry.name, O_DIRECTORY);
   if (made && zt::posix::ChangeMode(made.get(), mode) == 0) return 0;
   int failure = errno;
   RetryEintr([&] { return ::unlinkat(parent, entry.name, AT_REMOVEDIR); });
