@@ -7,7 +7,6 @@
 
 #include "ztcom/ztcore/ztcom.h"
 
-using Toolyard::CztHold;
 using zt::fnd::Vector;
 
 HRESULT CvltRegistrar::QueryInterface(const GUID& iid, void** out) {
@@ -42,8 +41,8 @@ HRESULT CvltRegistrar::RegisterComponent(_vltComponent2* component) {
 HRESULT CvltRegistrar::UnregisterComponent(GUID identifier) {
   HRESULT result = Scan();
   if (result < 0) return result;
-  CztHold hold(m_components.lock);
-  return removeEntry(identifier) == S_OK ? S_OK : result;
+  ComponentMap::Hold map(m_components);
+  return removeEntry(*map, identifier) == S_OK ? S_OK : result;
 }
 
 HRESULT CvltRegistrar::GetComponent(GUID identifier, _vltComponent2* component) {
@@ -61,10 +60,10 @@ HRESULT CvltRegistrar::EnumComponents(_vltComponentType type, IvltEnumComponent*
   return CreateEnumerator(type, enumerator);
 }
 
-Vector<GUID> CvltRegistrar::SnapshotIdentifiers() const {
+Vector<GUID> CvltRegistrar::SnapshotIdentifiers() {
   Vector<GUID> identifiers;
-  CztHold hold(m_components.lock);
-  for (const auto& [identifier, component] : m_components.map) identifiers.push_back(identifier);
+  ComponentMap::Hold map(m_components);
+  for (const auto& [identifier, component] : *map) identifiers.push_back(identifier);
   return identifiers;
 }
 
@@ -81,9 +80,9 @@ HRESULT CvltRegistrar::InternalGetComponent(GUID identifier, CvltComponent*& com
 }
 
 HRESULT CvltRegistrar::InternalGetComponentNoScan(GUID identifier, CvltComponent*& component) {
-  CztHold hold(m_components.lock);
-  auto found = m_components.map.find(identifier);
-  if (found == m_components.map.end()) return E_INVALIDARG;
+  ComponentMap::Hold map(m_components);
+  auto found = map->find(identifier);
+  if (found == map->end()) return E_INVALIDARG;
   component = found->second.get();
   return S_OK;
 }
@@ -91,35 +90,37 @@ HRESULT CvltRegistrar::InternalGetComponentNoScan(GUID identifier, CvltComponent
 template <class Record>
 HRESULT CvltRegistrar::CopyComponent(GUID identifier, std::optional<_vltComponentType> type,
                                      Record* record) {
-  CztHold hold(m_components.lock);
-  auto found = m_components.map.find(identifier);
-  if (found == m_components.map.end()) return E_INVALIDARG;
+  ComponentMap::Hold map(m_components);
+  auto found = map->find(identifier);
+  if (found == map->end()) return E_INVALIDARG;
   if (type && found->second->record().type != *type) return E_FAIL;
   return found->second->CopyTo(record);
 }
 
 HRESULT CvltRegistrar::AddComponent(CvltComponent* component) {
   std::unique_ptr<CvltComponent> owned(component);
-  CztHold hold(m_components.lock);
-  removeEntry(owned->record().identifier);
-  m_components.map.emplace(owned->record().identifier, std::move(owned));
+  ComponentMap::Hold map(m_components);
+  GUID identifier = owned->record().identifier;
+  removeEntry(*map, identifier);
+  map->emplace(identifier, std::move(owned));
   return S_OK;
 }
 
 HRESULT CvltRegistrar::RemoveComponent(CvltComponent* component) {
-  return removeEntry(component->record().identifier);
+  ComponentMap::Hold map(m_components);
+  return removeEntry(*map, component->record().identifier);
 }
 
-HRESULT CvltRegistrar::removeEntry(GUID identifier) {
-  auto found = m_components.map.find(identifier);
-  if (found == m_components.map.end()) return S_FALSE;
-  m_components.map.erase(found);
+HRESULT CvltRegistrar::removeEntry(ComponentMap::Map& map, GUID identifier) {
+  auto found = map.find(identifier);
+  if (found == map.end()) return S_FALSE;
+  map.erase(found);
   return S_OK;
 }
 
 HRESULT CvltRegistrar::DeleteComponents() {
-  CztHold hold(m_components.lock);
-  m_components.map.clear();
+  ComponentMap::Hold map(m_components);
+  map->clear();
   return S_OK;
 }
 

@@ -6,19 +6,47 @@
 #include <memory>
 #include <optional>
 
-#include "source/Common/ZtUtils/General/ztSync.h"
 #include "source/Common/vltInterfaces.h"
 #include "source/vlrHelpers.h"
 #include "source/xcomponent.h"
 #include "zt/fnd/Guid.h"
 #include "zt/fnd/Vector.h"
 #include "zt/fnd/osdep/AtomicInt.h"
+#include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/ThreadAnnotations.h"
 
-// An ordered map with the lock that guards it, also in a child that is forked during a change.
+// An ordered map with the lock that guards it, also in a child that is forked during a change. The map
+// can be reached through a hold only:
+//
+//   CvlrProtectedMap<GUID, int>::Hold map(protectedMap);
+//   map->erase(key);
 template <class Key, class Value>
-struct CvlrProtectedMap {
-  std::map<Key, Value> map;
-  mutable Toolyard::CztForkSafeCS lock{50};
+class CvlrProtectedMap {
+ public:
+  using Map = std::map<Key, Value>;
+
+  // Recursive: the holder of one may make another.
+  class SCOPED_CAPABILITY Hold {
+   public:
+    explicit Hold(CvlrProtectedMap& map) ACQUIRE(map.m_lock)
+        : m_map(map.m_map), m_lock(map.m_lock) {
+      m_lock.lock();
+    }
+    ~Hold() RELEASE() { m_lock.unlock(); }
+    Hold(const Hold&) = delete;
+    Hold& operator=(const Hold&) = delete;
+
+    Map& operator*() { return m_map; }
+    Map* operator->() { return &m_map; }
+
+   private:
+    Map& m_map;
+    zt::fnd::osdep::ForkSafeMutex& m_lock;
+  };
+
+ private:
+  Map m_map GUARDED_BY(m_lock);
+  zt::fnd::osdep::ForkSafeMutex m_lock{zt::fnd::osdep::AtFork::Wait, 50};
 };
 
 // Answers from a map of components in memory. Never created by itself: what Scan does, and all that
@@ -73,8 +101,7 @@ class CvltRegistrar : public IvltRegistrar2 {
 
   // Takes ownership; an earlier component of the same identifier is destroyed. 0.
   HRESULT AddComponent(CvltComponent* component);
-  // Destroys the stored component with the identifier of this one: 0, or 1 if there is none. Takes
-  // no lock.
+  // Destroys the stored component with the identifier of this one: 0, or 1 if there is none.
   HRESULT RemoveComponent(CvltComponent* component);
   HRESULT DeleteComponents();
 
@@ -85,13 +112,13 @@ class CvltRegistrar : public IvltRegistrar2 {
   using ComponentMap = CvlrProtectedMap<GUID, std::unique_ptr<CvltComponent>>;
 
   // All identifiers in map order.
-  zt::fnd::Vector<GUID> SnapshotIdentifiers() const;
+  zt::fnd::Vector<GUID> SnapshotIdentifiers();
   // New enumerator over a snapshot, with one reference. E_OUTOFMEMORY leaves *enumerator alone.
   HRESULT CreateEnumerator(_vltComponentType type, IvltEnumComponent** enumerator);
   ComponentMap& components() { return m_components; }
 
  private:
-  HRESULT removeEntry(GUID identifier);
+  static HRESULT removeEntry(ComponentMap::Map& map, GUID identifier);
 
   zt::fnd::osdep::AtomicInt m_refCount;
   ComponentMap m_components;

@@ -28,7 +28,7 @@ class TestRegistrar : public CvltRegistrar {
   }
   HRESULT GetSnapshotPath(wchar_t**) override { return E_NOTIMPL; }
   HRESULT SetSnapshotPath(const wchar_t*) override { return E_NOTIMPL; }
-  size_t count() { return components().map.size(); }
+  size_t count() { return ComponentMap::Hold(components())->size(); }
 
   std::atomic<int> scans{0};
   HRESULT scanResult = S_OK;

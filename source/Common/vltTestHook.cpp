@@ -8,6 +8,7 @@
 #include <set>
 
 #include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
 #include "zt/fnd/osdep/Sleep.h"
 
@@ -25,12 +26,12 @@ constinit std::atomic<const char*> currentHookName{""};
 // A copy that stays for good; one for each name, as a process may refresh as often as it likes.
 struct KeptNames {
   zt::fnd::osdep::ForkSafeMutex lock{zt::fnd::osdep::AtFork::Wait, 70};
-  std::set<std::string> names;
+  std::set<std::string> names GUARDED_BY(lock);
 };
 
 const char* Kept(const std::string& name) {
   KeptNames& kept = zt::fnd::osdep::LeakedInstance<KeptNames>();
-  zt::fnd::osdep::ForkSafeHold hold(kept.lock);
+  zt::fnd::osdep::Hold hold(kept.lock);
   return kept.names.insert(name).first->c_str();
 }
 

@@ -10,7 +10,6 @@
 
 using zt::fnd::osdep::path;
 using namespace registrar;
-using Toolyard::CztHold;
 using zt::fnd::String;
 using zt::fnd::Vector;
 
@@ -76,7 +75,7 @@ HRESULT CvltPharlapRegistrar::RegisterDataDictionary(_vltComponent2* record) {
   if (setResult < 0) return setResult;
   HRESULT result = SaveChanges();
 
-  CztHold holdMap(components().lock);
+  ComponentMap::Hold map(components());
   CvltComponent* component = nullptr;
   if (InternalGetComponentNoScan(record->identifier, component) < 0) return result;
   ReplaceText(&component->record().name, record->name);
@@ -136,8 +135,8 @@ HRESULT CvltPharlapRegistrar::ResetDDUpdatedFlags() {
   }
   if (!modified) return result;
   result = SaveChanges();
-  CztHold holdMap(components().lock);
-  for (auto& [identifier, component] : components().map) {
+  ComponentMap::Hold map(components());
+  for (auto& [identifier, component] : *map) {
     _vltComponent2& record = component->record();
     if (record.type == vltComponentDataDictionary) record.dictionary.fragmentRegistered = 0;
   }

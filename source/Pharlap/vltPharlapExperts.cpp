@@ -11,7 +11,6 @@
 
 using zt::fnd::osdep::path;
 using namespace registrar;
-using Toolyard::CztHold;
 using zt::fnd::String;
 
 namespace {
@@ -37,7 +36,7 @@ HRESULT CvltPharlapRegistrar::RegisterComponent(_vltComponent2* record) {
 
 HRESULT CvltPharlapRegistrar::GetComponent(GUID identifier, _vltComponent2* record) {
   if (!record) return E_POINTER;
-  CztHold hold(components().lock);
+  ComponentMap::Hold map(components());
   CvltComponent* component = nullptr;
   if (InternalGetComponentNoScan(identifier, component) < 0) return E_INVALIDARG;
   return Duplicate(record, &component->record());
@@ -87,7 +86,7 @@ HRESULT CvltPharlapRegistrar::WriteExpert(const _vltComponent2* record, GuidText
 
 HRESULT CvltPharlapRegistrar::SaveExpert(const _vltComponent2* record) {
   HRESULT result = SaveChanges();
-  CztHold hold(components().lock);
+  ComponentMap::Hold map(components());
   CvltComponent* component = nullptr;
   if (InternalGetComponentNoScan(record->identifier, component) < 0) return result;
   _vltComponent2& known = component->record();

@@ -66,7 +66,8 @@ CvltPharlapRegistrar::~CvltPharlapRegistrar() {
   if (m_registrationIni && m_durableCopy) finishDurableCopy();
   // Before the rest, so that the lock is free for the next process.
   m_registrationIni.reset();
-  for (auto& [identifier, component] : components().map) {
+  ComponentMap::Hold map(components());
+  for (auto& [identifier, component] : *map) {
     // The records' texts go whole here, whatever their names; a zeroed record leaves the object's
     // own destructor nothing to free.
     vltFreeComponent2(component->record());

@@ -9,12 +9,13 @@
 #include "vlloader/source/StorageModule.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
 #include "ztcom/ztcore/ztunknown.h"
 
 using zt::fnd::osdep::AtFork;
-using zt::fnd::osdep::ForkSafeHold;
 using zt::fnd::osdep::ForkSafeMutex;
+using zt::fnd::osdep::Hold;
 using zt::fnd::osdep::LeakedInstance;
 
 namespace {
@@ -42,48 +43,49 @@ struct Entries {
   Free free = nullptr;
 };
 
-struct Loader {
-  ForkSafeMutex lock{AtFork::Wait, 30};
-  bool pathInitialized = false;
-  bool loadTried = false;
-  int loads = 0;
-  bool inEffect = false;  // between KorInitialize and the last KorFinalize
-  int users = 0;
-  // Never reallocates, so that a text handed out before a clean-up stays readable memory.
-  std::string path = [] {
+// What is loaded, and its own lock: Hold hold(loader).
+//
+// A child that was forked while another thread was loading or unloading, for longer than a fork waits,
+// starts with nothing loaded. What is half changed is left as it is, out of reach.
+class CAPABILITY("loader") Loader {
+ public:
+  void lock() ACQUIRE() NO_THREAD_SAFETY_ANALYSIS {
+    m_lock.lock();
+    if (m_lock.takeInterrupted()) forget();
+  }
+  void unlock() RELEASE() NO_THREAD_SAFETY_ANALYSIS { m_lock.unlock(); }
+
+  bool pathInitialized GUARDED_BY(this) = false;
+  bool loadTried GUARDED_BY(this) = false;
+  int loads GUARDED_BY(this) = 0;
+  bool inEffect GUARDED_BY(this) = false;  // between KorInitialize and the last KorFinalize
+  int users GUARDED_BY(this) = 0;
+  // Never reallocates, so that a text returned before a clean-up stays readable memory.
+  std::string path GUARDED_BY(this) = [] {
     std::string empty;
     empty.reserve(kLongestPath);
     return empty;
   }();
-  std::unique_ptr<StorageModule> storage, utilities;
-  Entries entries;
+  std::unique_ptr<StorageModule> storage GUARDED_BY(this), utilities GUARDED_BY(this);
+  Entries entries GUARDED_BY(this);
+
+ private:
+  void forget() REQUIRES(this) {
+    pathInitialized = loadTried = inEffect = false;
+    loads = users = 0;
+    (void)storage.release();
+    (void)utilities.release();
+    entries = Entries();
+  }
+
+  ForkSafeMutex m_lock{AtFork::Wait, 30};
 };
 
 Loader& TheLoader() { return LeakedInstance<Loader>(); }
 
-// Holds the loader. A child that was forked while another thread was loading or unloading, for longer
-// than a fork waits, starts with nothing loaded. What is half changed is left as it is, out of reach.
-class Hold {
- public:
-  explicit Hold(Loader& loader) : m_hold(loader.lock) {
-    if (loader.lock.takeInterrupted()) Forget(loader);
-  }
-
- private:
-  static void Forget(Loader& l) {
-    l.pathInitialized = l.loadTried = l.inEffect = false;
-    l.loads = l.users = 0;
-    (void)l.storage.release();
-    (void)l.utilities.release();
-    l.entries = Entries();
-  }
-
-  ForkSafeHold m_hold;
-};
-
 const char* NullIfEmpty(const std::string& text) { return text.empty() ? nullptr : text.c_str(); }
 
-void PathInit(Loader& l) {
+void PathInit(Loader& l) REQUIRES(l) {
   if (l.pathInitialized) return;
   const std::string found = vlLookUpInstallDirectory();
   l.path.assign(found);  // by bytes: to move it would give the text's memory away
@@ -95,7 +97,7 @@ void Fetch(const StorageModule& module, const char* name, Function* out) {
   *out = reinterpret_cast<Function>(module.find(name));
 }
 
-void FetchEntries(Loader& l) {
+void FetchEntries(Loader& l) REQUIRES(l) {
   Fetch(*l.storage, "vltGetConfiguration", &l.entries.getConfiguration);
   Fetch(*l.storage, "vltGetConfigurationEx", &l.entries.getConfigurationEx);
   Fetch(*l.storage, "vltInitialize", &l.entries.initialize);
@@ -106,7 +108,7 @@ void FetchEntries(Loader& l) {
   Fetch(*l.utilities, "vltFree", &l.entries.free);
 }
 
-void Init(Loader& l) {
+void Init(Loader& l) REQUIRES(l) {
   if (l.inEffect) return;
   if (l.loadTried) {
     if (l.loads < INT_MAX) ++l.loads;

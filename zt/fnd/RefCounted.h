@@ -5,6 +5,7 @@
 #include "zt/fnd/DLLAlloc.h"
 #include "zt/fnd/osdep/AtomicInt.h"
 #include "zt/fnd/osdep/CriticalSection.h"
+#include "zt/fnd/osdep/Hold.h"
 
 namespace zt {
 namespace fnd {
@@ -52,12 +53,12 @@ class RefCountedCriticalSectionPolicy : public RefCountedThreadUnsafePolicy {
       : m_section(section) {}
 
   void addRef() const {
-    osdep::CriticalSectionGuard guard(*m_section);
+    osdep::Hold hold(*m_section);
     RefCountedThreadUnsafePolicy::addRef();
   }
   void release() const {
     const osdep::CriticalSection& section = *m_section;  // the object may go first
-    osdep::CriticalSectionGuard guard(section);
+    osdep::Hold hold(section);
     RefCountedThreadUnsafePolicy::release();
   }
 

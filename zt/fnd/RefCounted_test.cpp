@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "tests/support/ThreadState.h"
+#include "zt/fnd/osdep/Hold.h"
 
 namespace zt::fnd {
 namespace {
@@ -71,7 +72,7 @@ struct SectionThing : RefCountedCriticalSectionPolicy {
         enteredWhileGoing(w) {}
   ~SectionThing() override {
     probe = std::make_unique<WatchedThread>([&s = section, &e = entered] {
-      osdep::CriticalSectionGuard guard(s);
+      osdep::Hold hold(s);
       e = true;
     });
     EXPECT_TRUE(probe->blocksInLock());

@@ -36,15 +36,3 @@ class CZTMutex {
   struct State;
   State* m_state;
 };
-
-// Holds a CZTMutex for a scope.
-class CZTMutexHold {
- public:
-  explicit CZTMutexHold(CZTMutex& mutex) : m_mutex(mutex) { m_mutex.Lock(); }
-  ~CZTMutexHold() { m_mutex.Unlock(); }
-  CZTMutexHold(const CZTMutexHold&) = delete;
-  CZTMutexHold& operator=(const CZTMutexHold&) = delete;
-
- private:
-  CZTMutex& m_mutex;
-};

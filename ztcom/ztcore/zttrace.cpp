@@ -5,11 +5,12 @@
 #include <stdlib.h>
 
 #include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
 
 using zt::fnd::osdep::AtFork;
-using zt::fnd::osdep::ForkSafeHold;
 using zt::fnd::osdep::ForkSafeMutex;
+using zt::fnd::osdep::Hold;
 using zt::fnd::osdep::LeakedInstance;
 
 IZTDebugOutputStream* g_pZTDebugOutputStream = nullptr;
@@ -18,7 +19,7 @@ namespace {
 
 struct Trace {
   ForkSafeMutex lock{AtFork::Wait, 65};
-  bool inProgress = false;
+  bool inProgress GUARDED_BY(lock) = false;
 };
 
 class InTrace {
@@ -36,9 +37,9 @@ class InTrace {
 
 void ZTTrace(const char* format, ...) {
   Trace& trace = LeakedInstance<Trace>();
-  ForkSafeHold hold(trace.lock);
-  if (trace.lock.takeInterrupted())
-    trace.inProgress = false;     // of a thread that is not in this child
+  Hold hold(trace.lock);
+  // Of a thread that is not in this child.
+  if (trace.lock.takeInterrupted()) trace.inProgress = false;
   if (trace.inProgress) abort();  // a nested call of this thread
   InTrace inTrace(trace);
   if (!g_pZTDebugOutputStream) return;

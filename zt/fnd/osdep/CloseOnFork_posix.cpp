@@ -9,7 +9,8 @@
 #include <vector>
 
 #include "zt/fnd/String.h"
-#include "zt/fnd/osdep/PosixMutexHold.h"
+#include "zt/fnd/osdep/Hold.h"
+#include "zt/fnd/osdep/PosixMutex.h"
 #include "zt/posix/ScopedFd.h"
 
 using zt::posix::ScopedFd;
@@ -21,45 +22,45 @@ namespace {
 
 // Plain objects, ready before any initialiser and good after every destructor.
 pthread_once_t s_once = PTHREAD_ONCE_INIT;
-pthread_mutex_t s_lock = PTHREAD_MUTEX_INITIALIZER;  // guards what follows; innermost of all locks
+constinit PosixMutex s_lock;  // innermost of all locks
 struct Mark {
   std::uint64_t serial = 0;  // of the opening that the number belongs to; 0 for none
   FileIdentity file;         // which it leads to, unless the host has closed it
   bool closesInChild = false;
 };
-std::vector<Mark>* s_marks = nullptr;  // by descriptor number
-std::uint64_t s_serial = 0;
-unsigned s_forks = 0;
+std::vector<Mark>* s_marks GUARDED_BY(s_lock) = nullptr;  // by descriptor number
+std::uint64_t s_serial GUARDED_BY(s_lock) = 0;
+unsigned s_forks GUARDED_BY(s_lock) = 0;
 
-void BeforeFork() {
-  pthread_mutex_lock(&s_lock);
+void BeforeFork() ACQUIRE(s_lock) {
+  s_lock.lock();
   ++s_forks;
 }
 
-void InParent() { pthread_mutex_unlock(&s_lock); }
+void InParent() RELEASE(s_lock) { s_lock.unlock(); }
 
 // Makes system calls only, as other threads may have been anywhere at the fork.
-void InChild() {
+void InChild() RELEASE(s_lock) {
   for (std::size_t fd = 0; s_marks != nullptr && fd < s_marks->size(); ++fd) {
     Mark& mark = (*s_marks)[fd];
     if (!mark.closesInChild) continue;
     if (mark.file.isBehind(static_cast<int>(fd))) ::close(static_cast<int>(fd));
     mark = Mark();
   }
-  pthread_mutex_unlock(&s_lock);
+  s_lock.unlock();
 }
 
 void Register() { pthread_atfork(BeforeFork, InParent, InChild); }
 
 unsigned ForksSoFar() {
-  PosixMutexHold hold(s_lock);
+  Hold hold(s_lock);
   return s_forks;
 }
 
 // Marks the descriptor and returns its serial number; 0 if there was a fork since the count was
 // taken, which may have copied it.
 std::uint64_t MarkIfNoFork(int fd, const FileIdentity& file, unsigned forks) {
-  PosixMutexHold hold(s_lock);
+  Hold hold(s_lock);
   if (s_forks != forks) return 0;
   if (s_marks == nullptr) s_marks = new std::vector<Mark>;
   std::size_t index = static_cast<std::size_t>(fd);
@@ -68,8 +69,8 @@ std::uint64_t MarkIfNoFork(int fd, const FileIdentity& file, unsigned forks) {
   return s_serial;
 }
 
-// The mark of this opening, in the hands of whoever holds the lock; null if another has the number.
-Mark* FindMark(int fd, std::uint64_t serial) noexcept {
+// The mark of this opening; null if another has the number.
+Mark* FindMark(int fd, std::uint64_t serial) noexcept REQUIRES(s_lock) {
   std::size_t index = static_cast<std::size_t>(fd);
   if (s_marks == nullptr || index >= s_marks->size()) return nullptr;
   Mark& mark = (*s_marks)[index];
@@ -115,7 +116,7 @@ int CloseOnForkFd::get() const noexcept {
   if (!m_process.isCurrent()) {
     if (!m_kept) return -1;
   } else {
-    PosixMutexHold hold(s_lock);
+    Hold hold(s_lock);
     if (FindMark(m_fd, m_serial) == nullptr) return -1;
   }
   return m_file.isBehind(m_fd) ? m_fd : -1;
@@ -123,7 +124,7 @@ int CloseOnForkFd::get() const noexcept {
 
 void CloseOnForkFd::keepOnFork(bool keep) noexcept {
   if (!valid()) return;
-  PosixMutexHold hold(s_lock);
+  Hold hold(s_lock);
   if (Mark* mark = FindMark(m_fd, m_serial)) mark->closesInChild = !keep;
   m_kept = keep;
 }
@@ -132,7 +133,7 @@ void CloseOnForkFd::reset() noexcept {
   ScopedFd closes(get());
   if (valid() && m_process.isCurrent()) {
     // Before the descriptor is closed, as its number may serve another file then.
-    PosixMutexHold hold(s_lock);
+    Hold hold(s_lock);
     if (Mark* mark = FindMark(m_fd, m_serial)) *mark = Mark();
   }
   m_fd = -1;

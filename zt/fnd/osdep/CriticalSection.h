@@ -4,9 +4,11 @@
 
 // Recursive locks inside one process.
 //
-//   state            enter (owner)  enter (other)  tryEnter (other)  leave (owner)     leave
-//   (other) free             owned, 1       owned, 1       owned, 1          - ignored owned, n
-//   owned, n + 1   waits          false             n - 1; 0 is free  ignored
+// clang-format off
+//   state      enter (owner)  enter (other)  tryEnter (other)  leave (owner)     leave (other)
+//   free       owned, 1       owned, 1       owned, 1          -                 ignored
+//   owned, n   owned, n + 1   waits          false             n - 1; 0 is free  ignored
+// clang-format on
 //
 // Nothing here throws but the constructors (std::bad_alloc). A section has to be left as often as
 // it was entered before it goes; one that is still owned then is abandoned quietly.
@@ -26,6 +28,10 @@ class UnixCriticalSection {
   void leave() const;     // by a thread that is not the owner: does nothing
   bool inOwningThread() const;
 
+  // The names that Hold.h calls.
+  void lock() const { enter(); }
+  void unlock() const { leave(); }
+
  private:
   struct Block;
   Block* m_block;
@@ -41,24 +47,11 @@ class CAPABILITY("critical section") CriticalSection {
 
   void enter() const;
   void leave() const;
+  void lock() const { enter(); }
+  void unlock() const { leave(); }
 
  private:
   UnixCriticalSection* m_section;
-};
-
-// Owns a section from construction to destruction.
-class SCOPED_CAPABILITY CriticalSectionGuard {
- public:
-  explicit CriticalSectionGuard(const CriticalSection& section) ACQUIRE(section)
-      : m_section(section) {
-    m_section.enter();
-  }
-  ~CriticalSectionGuard() RELEASE() { m_section.leave(); }
-  CriticalSectionGuard(const CriticalSectionGuard&) = delete;
-  CriticalSectionGuard& operator=(const CriticalSectionGuard&) = delete;
-
- private:
-  const CriticalSection& m_section;
 };
 
 static_assert(sizeof(CriticalSection) == sizeof(void*));

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "tests/support/Child.h"
+#include "zt/fnd/osdep/Hold.h"
 
 namespace zt::fnd::osdep {
 namespace {
@@ -91,7 +92,7 @@ TEST(ThreadCriticalSection, GuardedCountIsExact) {
   for (int t = 0; t < 4; ++t) {
     threads.emplace_back([&] {
       for (int i = 0; i < 10000; ++i) {
-        CriticalSectionGuard guard(section);
+        Hold hold(section);
         ++count;
       }
     });

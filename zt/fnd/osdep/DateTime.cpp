@@ -6,6 +6,7 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
 
 namespace zt {
@@ -67,7 +68,7 @@ String Join(const String& first, const String& second) {
 String Format(const std::tm& fields, const String& format) {
   char text[k_textSize];
   const AnsiString narrow(format);
-  ForkSafeHold hold(LeakedInstance<SystemTimes>().lock);
+  Hold hold(LeakedInstance<SystemTimes>().lock);
   const std::size_t n = std::strftime(text, sizeof text, narrow.c_str(), &fields);
   return String(static_cast<const char*>(text), static_cast<String::size_type>(n));
 }
@@ -76,13 +77,13 @@ template <class BreakDown>
 std::tm ToFields(const AbsTime& time, bool round, BreakDown breakDown) {
   const std::time_t seconds = static_cast<std::time_t>(time.toTime_T(round));
   std::tm fields;
-  ForkSafeHold hold(LeakedInstance<SystemTimes>().lock);
+  Hold hold(LeakedInstance<SystemTimes>().lock);
   if (breakDown(&seconds, &fields) == nullptr) ZT_RAISE(exception::OutOfRange());
   return fields;
 }
 
 String SystemFormat(const wchar_t* format) {
-  ForkSafeHold hold(LeakedInstance<SystemTimes>().lock);
+  Hold hold(LeakedInstance<SystemTimes>().lock);
   std::setlocale(LC_TIME, "");
   return String(format);
 }

@@ -7,7 +7,8 @@
 #include <utility>
 
 #include "zt/fnd/Exception.h"
-#include "zt/fnd/osdep/PosixMutexHold.h"
+#include "zt/fnd/osdep/Hold.h"
+#include "zt/fnd/osdep/PosixMutex.h"
 
 namespace zt {
 namespace fnd {
@@ -33,20 +34,16 @@ timespec DeadlineIn(unsigned int ms) {
 
 struct Event::Block {
   pthread_cond_t condition;
-  pthread_mutex_t mutex;
+  PosixMutex mutex;
   const bool manualReset;
-  bool signaled;
+  bool signaled GUARDED_BY(mutex);
 
   Block(bool manual, bool initial) : manualReset(manual), signaled(initial) {
     pthread_cond_init(&condition, nullptr);
-    pthread_mutex_init(&mutex, nullptr);
   }
-  ~Block() {
-    pthread_mutex_destroy(&mutex);
-    pthread_cond_destroy(&condition);
-  }
+  ~Block() { pthread_cond_destroy(&condition); }
 
-  bool take() { return manualReset ? signaled : std::exchange(signaled, false); }
+  bool take() REQUIRES(mutex) { return manualReset ? signaled : std::exchange(signaled, false); }
 };
 
 Event::Event(bool manualReset, bool initialState) : m_block(new Block(manualReset, initialState)) {}
@@ -54,7 +51,7 @@ Event::Event(bool manualReset, bool initialState) : m_block(new Block(manualRese
 Event::~Event() { delete m_block; }
 
 void Event::set() const {
-  PosixMutexHold hold(m_block->mutex);
+  Hold hold(m_block->mutex);
   m_block->signaled = true;
   if (m_block->manualReset) {
     pthread_cond_broadcast(&m_block->condition);
@@ -64,7 +61,7 @@ void Event::set() const {
 }
 
 void Event::reset() const {
-  PosixMutexHold hold(m_block->mutex);
+  Hold hold(m_block->mutex);
   m_block->signaled = false;
 }
 
@@ -73,13 +70,13 @@ void Event::resetIfAuto() {
 }
 
 bool Event::check() const {
-  PosixMutexHold hold(m_block->mutex);
+  Hold hold(m_block->mutex);
   return m_block->take();
 }
 
 void Event::wait() const {
-  PosixMutexHold hold(m_block->mutex);
-  while (!m_block->signaled) pthread_cond_wait(&m_block->condition, &m_block->mutex);
+  Hold hold(m_block->mutex);
+  while (!m_block->signaled) pthread_cond_wait(&m_block->condition, m_block->mutex.native());
   m_block->take();
 }
 
@@ -90,9 +87,9 @@ bool Event::wait(unsigned int ms) const {
     return true;
   }
   timespec deadline = DeadlineIn(ms);
-  PosixMutexHold hold(m_block->mutex);
+  Hold hold(m_block->mutex);
   while (!m_block->signaled) {
-    if (pthread_cond_timedwait(&m_block->condition, &m_block->mutex, &deadline) != 0) break;
+    if (pthread_cond_timedwait(&m_block->condition, m_block->mutex.native(), &deadline) != 0) break;
   }
   return m_block->take();
 }

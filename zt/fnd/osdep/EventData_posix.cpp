@@ -6,6 +6,7 @@
 
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/EventData.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/NamedEventGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
 
@@ -97,7 +98,7 @@ class EventData::Undo {
 bool EventData::open(bool initialState) {
   EventFile file = EventFile::Open(m_name);
   {
-    MutexHold hold(m_statics->stateFileMutex);
+    Hold hold(m_statics->stateFileMutex);
     if (file.exclusive()) {
       openAlone(file, initialState);
     } else if (!join(file)) {
@@ -199,7 +200,7 @@ EventData::~EventData() {
 void EventData::close() {
   if (m_file.claim()) {
     try {
-      MutexHold hold(m_statics->stateFileMutex);
+      Hold hold(m_statics->stateFileMutex);
       m_set->giveBack(m_slot, m_file.key());
       m_file.unlink();
     } catch (const std::exception&) {  // Everything stays as a killed process leaves it.

@@ -5,6 +5,7 @@
 #include <atomic>
 #include <cstdint>
 
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/ThreadAnnotations.h"
 
 namespace zt {
@@ -71,17 +72,7 @@ class CAPABILITY("mutex") ForkSafeMutex {
   ForkSafeMutex* m_next = nullptr;  // in the order of the ranks
 };
 
-// Holds one for a scope.
-class SCOPED_CAPABILITY ForkSafeHold {
- public:
-  explicit ForkSafeHold(ForkSafeMutex& mutex) ACQUIRE(mutex) : m_mutex(mutex) { m_mutex.lock(); }
-  ~ForkSafeHold() RELEASE() { m_mutex.unlock(); }
-  ForkSafeHold(const ForkSafeHold&) = delete;
-  ForkSafeHold& operator=(const ForkSafeHold&) = delete;
-
- private:
-  ForkSafeMutex& m_mutex;
-};
+using ForkSafeHold = Hold<ForkSafeMutex>;
 
 }  // namespace osdep
 }  // namespace fnd

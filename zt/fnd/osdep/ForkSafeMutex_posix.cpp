@@ -5,9 +5,10 @@
 
 #include "zt/fnd/osdep/CloseOnFork.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/MutexGlobalStatics.h"
 #include "zt/fnd/osdep/NamedEventGlobalStatics.h"
-#include "zt/fnd/osdep/PosixMutexHold.h"
+#include "zt/fnd/osdep/PosixMutex.h"
 #include "zt/fnd/osdep/ProcessStatics.h"
 
 namespace zt {
@@ -41,7 +42,7 @@ class ForkSafeMutex::Registry {
  public:
   static void Add(ForkSafeMutex& mutex) {
     pthread_once(&s_once, Register);
-    PosixMutexHold hold(s_lock);
+    Hold hold(s_lock);
     ForkSafeMutex** place = &s_first;
     while (*place != nullptr && (*place)->m_rank <= mutex.m_rank) place = &(*place)->m_next;
     mutex.m_next = *place;
@@ -49,7 +50,7 @@ class ForkSafeMutex::Registry {
   }
 
   static void Remove(ForkSafeMutex& mutex) {
-    PosixMutexHold hold(s_lock);
+    Hold hold(s_lock);
     ForkSafeMutex** place = &s_first;
     while (*place != &mutex) place = &(*place)->m_next;
     *place = mutex.m_next;
@@ -65,8 +66,8 @@ class ForkSafeMutex::Registry {
     pthread_atfork(BeforeFork, InParent, InChild);
   }
 
-  static void BeforeFork() {
-    pthread_mutex_lock(&s_lock);
+  static void BeforeFork() ACQUIRE(s_lock) {
+    s_lock.lock();
     const std::int64_t end = Now() + kPatience;
     ForkSafeMutex* missed = TakeAll(nullptr, end);
     while (missed != nullptr && Now() < end) {
@@ -78,7 +79,7 @@ class ForkSafeMutex::Registry {
   // Takes `first`, where one is given, before the others, and waits for it to the end: its holder may
   // have been waiting for one that comes earlier in the order. The others have a short turn each.
   // Returns the first that was missed; once the end has come all that are free are taken.
-  static ForkSafeMutex* TakeAll(ForkSafeMutex* first, std::int64_t end) {
+  static ForkSafeMutex* TakeAll(ForkSafeMutex* first, std::int64_t end) REQUIRES(s_lock) {
     ForkSafeMutex* missed = nullptr;
     if (first != nullptr && !Take(*first, end)) missed = first;
     for (ForkSafeMutex* m = s_first; m != nullptr; m = m->m_next) {
@@ -94,25 +95,25 @@ class ForkSafeMutex::Registry {
     return mutex.m_takenByFork = TakeUntil(mutex.m_mutex, moment);
   }
 
-  static void GiveBack() {
+  static void GiveBack() REQUIRES(s_lock) {
     for (ForkSafeMutex* m = s_first; m != nullptr; m = m->m_next) {
       if (std::exchange(m->m_takenByFork, false)) pthread_mutex_unlock(&m->m_mutex);
     }
   }
 
-  static void InParent() {
+  static void InParent() RELEASE(s_lock) {
     GiveBack();
-    pthread_mutex_unlock(&s_lock);
+    s_lock.unlock();
   }
 
-  static void InChild() {
+  static void InChild() RELEASE(s_lock) {
     for (ForkSafeMutex* m = s_first; m != nullptr; m = m->m_next) m->renew();
-    pthread_mutex_unlock(&s_lock);
+    s_lock.unlock();
   }
 
   static inline pthread_once_t s_once = PTHREAD_ONCE_INIT;
-  static inline pthread_mutex_t s_lock = PTHREAD_MUTEX_INITIALIZER;
-  static inline ForkSafeMutex* s_first = nullptr;  // guarded by s_lock
+  static inline constinit PosixMutex s_lock;
+  static inline ForkSafeMutex* s_first GUARDED_BY(s_lock) = nullptr;
 };
 
 ForkSafeMutex::ForkSafeMutex(AtFork atFork, int rank) : m_atFork(atFork), m_rank(rank) {

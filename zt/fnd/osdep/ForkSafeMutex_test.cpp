@@ -11,6 +11,7 @@
 
 #include "tests/support/Child.h"
 #include "tests/support/Sanitizer.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
 
 namespace zt::fnd::osdep {
@@ -73,7 +74,7 @@ TEST(ForkSafeMutex, ThreadsExcludeEachOther) {
   for (int t = 0; t < 4; ++t) {
     threads.emplace_back([&] {
       for (int i = 0; i < 5000; ++i) {
-        ForkSafeHold hold(mutex);
+        Hold hold(mutex);
         ++count;
       }
     });
@@ -143,7 +144,7 @@ TEST(ForkSafeMutex, ChildNeverSeesAHalfChangeOfAWaitedOne) {
   std::atomic<bool> stop{false};
   std::thread changer([&] {
     while (!stop) {
-      ForkSafeHold hold(mutex);
+      Hold hold(mutex);
       first = first + 1;
       for (int i = 0; i < 1000; ++i) second = second + 0;
       second = first;
@@ -151,7 +152,7 @@ TEST(ForkSafeMutex, ChildNeverSeesAHalfChangeOfAWaitedOne) {
   });
   for (int i = 0; i < 100; ++i) {
     Child child([&] {
-      ForkSafeHold hold(mutex);
+      Hold hold(mutex);
       if (mutex.takeInterrupted()) return 1;
       return first == second ? 0 : 2;
     });
@@ -227,13 +228,13 @@ TEST(ForkSafeMutex, MayBeMadeAndDestroyedWhileOthersFork) {
   std::thread maker([&] {
     while (!stop) {
       auto mutex = std::make_unique<ForkSafeMutex>(AtFork::Wait, kRank);
-      ForkSafeHold hold(*mutex);
+      Hold hold(*mutex);
     }
   });
   for (int i = 0; i < 50; ++i) {
     Child child([] {
       ForkSafeMutex mutex(AtFork::Wait, kRank);
-      ForkSafeHold hold(mutex);
+      Hold hold(mutex);
       return 0;
     });
     EXPECT_EQ(0, child.wait(kSoonMs)) << i;

@@ -7,6 +7,7 @@
 
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
 
 namespace zt {
@@ -20,7 +21,7 @@ struct Opening {
 };
 
 iconv_t Open(const char* toCode, const char* fromCode) {
-  ForkSafeHold hold(LeakedInstance<Opening>().lock);
+  Hold hold(LeakedInstance<Opening>().lock);
   return iconv_open(toCode, fromCode);
 }
 
@@ -30,7 +31,7 @@ class ScopedIconv {
     if (m_cd == reinterpret_cast<iconv_t>(-1)) ZT_RAISE(exception::InvalidLocale());
   }
   ~ScopedIconv() {
-    ForkSafeHold hold(LeakedInstance<Opening>().lock);
+    Hold hold(LeakedInstance<Opening>().lock);
     iconv_close(m_cd);
   }
   ScopedIconv(const ScopedIconv&) = delete;

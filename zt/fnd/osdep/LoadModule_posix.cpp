@@ -4,6 +4,7 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
 #include "zt/fnd/osdep/LoadModule.h"
 #include "zt/fnd/osdep/OSException.h"
@@ -35,18 +36,18 @@ void* LoadModule(const String& name) {
       RetryEintr([&] { return ::stat(narrow.c_str(), &info); }) == 0 && !S_ISREG(info.st_mode)) {
     return nullptr;
   }
-  ForkSafeHold hold(LoadingLock());
+  Hold hold(LoadingLock());
   return ::dlopen(narrow.c_str(), RTLD_NOW | RTLD_GLOBAL);
 }
 
 void UnloadModule(void* module) {
   if (module == nullptr) return;
-  ForkSafeHold hold(LoadingLock());
+  Hold hold(LoadingLock());
   ::dlclose(module);
 }
 
 void* FindFunction(void* module, const AnsiString& name) {
-  ForkSafeHold hold(LoadingLock());
+  Hold hold(LoadingLock());
   return ::dlsym(module, name.c_str());
 }
 

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "zt/fnd/StringFwd.h"
+#include "zt/fnd/osdep/ThreadAnnotations.h"
 
 namespace zt {
 namespace fnd {
@@ -29,7 +30,7 @@ namespace osdep {
 // the parent holds. Neither it nor a program started by exec keeps the lock of a parent that died.
 //
 // Threads: one object may be shared. Lock order: the name's section, then the file.
-class Mutex {
+class CAPABILITY("named mutex") Mutex {
  public:
   // Makes the file; throws what CreateSharedUnixFile and SharedObjectPath throw.
   explicit Mutex(const String& name);

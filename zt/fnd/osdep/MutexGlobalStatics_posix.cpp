@@ -1,5 +1,6 @@
 #include "zt/fnd/osdep/MutexGlobalStatics.h"
 
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/ProcessStatics.h"
 
 namespace zt {
@@ -13,14 +14,14 @@ RefPtr<MutexGlobalStatics> MutexGlobalStatics::Get() {
 }
 
 MutexGlobalStatics::Map::iterator MutexGlobalStatics::attach(const String& name) {
-  CriticalSectionGuard guard(section);
+  Hold hold(section);
   Map::iterator data = m_data.try_emplace(name).first;
   ++data->second.objects;
   return data;
 }
 
 void MutexGlobalStatics::detach(Map::iterator data) {
-  CriticalSectionGuard guard(section);
+  Hold hold(section);
   if (--data->second.objects == 0) m_data.erase(data);
 }
 

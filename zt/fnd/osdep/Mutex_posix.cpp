@@ -7,6 +7,7 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/CloseOnFork.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/Mutex.h"
 #include "zt/fnd/osdep/MutexGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
@@ -35,20 +36,7 @@ CloseOnForkFd OpenLockFile(const AnsiString& file) {
   return CloseOnForkFd::OpenShared(file, InTheWay::MovedAside);
 }
 
-// Leaves a section again unless the lock was taken whole.
-class ScopedEntry {
- public:
-  explicit ScopedEntry(const UnixCriticalSection& section) : m_section(&section) {}
-  ~ScopedEntry() {
-    if (m_section != nullptr) m_section->leave();
-  }
-  ScopedEntry(const ScopedEntry&) = delete;
-  ScopedEntry& operator=(const ScopedEntry&) = delete;
-  void keep() { m_section = nullptr; }
-
- private:
-  const UnixCriticalSection* m_section;
-};
+using ScopedEntry = UnlockUnlessKept<const UnixCriticalSection>;
 
 }  // namespace
 
@@ -80,8 +68,8 @@ struct Mutex::Record {
   MutexGlobalStatics::Map::iterator data;
   // How often the file lock was taken through this object, and how often the section was entered
   // for it. They differ after an unlock by a thread that does not own the section.
-  int holds = 0;
-  int entries = 0;
+  int holds GUARDED_BY(statics->section) = 0;
+  int entries GUARDED_BY(statics->section) = 0;
   ProcessMark process;
 };
 
@@ -99,26 +87,29 @@ Mutex::Record::~Record() {
 void Mutex::Record::renewAfterFork() {
   if (ofThisProcess()) return;
   RefPtr<MutexGlobalStatics> fresh = MutexGlobalStatics::Get();
-  CriticalSectionGuard guard(fresh->renewal);
+  Hold hold(fresh->renewal);
   if (ofThisProcess()) return;
   CloseOnForkFd own = OpenLockFile(file);
   data = fresh->attach(name);
   statics.detach();
   statics = fresh;
   fd = std::move(own);
-  holds = entries = 0;
+  {
+    Hold counts(statics->section);
+    holds = entries = 0;
+  }
   process = fresh->process;  // last, as other threads ask for it first
 }
 
 void Mutex::Record::reopen() {
   CloseOnForkFd own = OpenLockFile(file);
-  CriticalSectionGuard guard(statics->section);
+  Hold hold(statics->section);
   fd = std::move(own);
 }
 
 // Counts a further lock of the thread that holds the file already.
 bool Mutex::Record::addHoldIfHeld() {
-  CriticalSectionGuard guard(statics->section);
+  Hold hold(statics->section);
   if (holds == 0) return false;
   ++holds;
   ++entries;
@@ -146,7 +137,7 @@ bool Mutex::Record::takeFile(int operation, int attempts) {
 }
 
 void Mutex::Record::finishLock(ScopedEntry& entry) {
-  CriticalSectionGuard guard(statics->section);
+  Hold hold(statics->section);
   ++holds;
   ++entries;
   entry.keep();
@@ -192,7 +183,7 @@ void Mutex::unlock() const {
   if (!record.ofThisProcess()) return;  // what the parent holds
   bool leave;
   {
-    CriticalSectionGuard guard(record.statics->section);
+    Hold hold(record.statics->section);
     // The file goes with the count, so that a lock between the two cannot lose it.
     if (record.holds > 0 && --record.holds == 0) Flock(record.fd.get(), LOCK_UN);
     leave = record.entries > 0 && record.section().inOwningThread();
@@ -204,7 +195,7 @@ void Mutex::unlock() const {
 bool Mutex::excludesOthers() const {
   const Record& record = *m_record;
   if (!record.ofThisProcess()) return false;
-  CriticalSectionGuard guard(record.statics->section);
+  Hold hold(record.statics->section);
   return record.holds > 0 && record.fd.get() >= 0 && record.fd.identity().isNamedBy(record.file);
 }
 
@@ -213,7 +204,7 @@ bool Mutex::retake() const {
   if (!record.ofThisProcess()) return false;
   try {
     CloseOnForkFd own = OpenLockFile(record.file);
-    CriticalSectionGuard guard(record.statics->section);
+    Hold hold(record.statics->section);
     if (record.holds == 0 || Flock(own.get(), LOCK_EX | LOCK_NB) != 0) return false;
     if (!own.identity().isNamedBy(record.file)) return false;
     record.fd = std::move(own);

@@ -15,18 +15,6 @@ namespace zt {
 namespace fnd {
 namespace osdep {
 
-// Holds a named mutex for a scope. Throws what Mutex::lock throws.
-class MutexHold {
- public:
-  explicit MutexHold(const Mutex& mutex) : m_mutex(mutex) { m_mutex.lock(); }
-  ~MutexHold() { m_mutex.unlock(); }
-  MutexHold(const MutexHold&) = delete;
-  MutexHold& operator=(const MutexHold&) = delete;
-
- private:
-  const Mutex& m_mutex;
-};
-
 // The named events of this process.
 //
 // A forked child starts with fresh ones: the inherited ones, which a thread may have been changing

@@ -6,6 +6,7 @@
 #include <cerrno>
 
 #include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/MonotonicClock.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/ProcessStatics.h"
@@ -30,7 +31,7 @@ RefPtr<NamedEventGlobalStatics> NamedEventGlobalStatics::Get() {
 }
 
 RefPtr<SemaphoreSet> NamedEventGlobalStatics::getOrCreateSemaphoreSet(unsigned number) {
-  CriticalSectionGuard guard(section);
+  Hold hold(section);
   auto found = m_sets.find(number);
   if (found != m_sets.end()) return RefPtr<SemaphoreSet>(found->second);
   RefPtr<SemaphoreSet> set(new SemaphoreSet(*this, number));
@@ -55,7 +56,7 @@ RefPtr<EventData> NamedEventGlobalStatics::getOrCreateNamedEvent(const String& n
 // Null if a joined event turned out to be closing.
 RefPtr<EventData> NamedEventGlobalStatics::openOrFind(const String& name, bool manualReset,
                                                       bool initialState) {
-  CriticalSectionGuard guard(section);
+  Hold hold(section);
   auto found = m_events.find(name);
   if (found != m_events.end()) {
     if (found->second->manualReset() != manualReset) ZT_RAISE(PosixError(EINVAL));
@@ -68,24 +69,24 @@ RefPtr<EventData> NamedEventGlobalStatics::openOrFind(const String& name, bool m
 }
 
 void NamedEventGlobalStatics::removeSemaphoreSet(const SemaphoreSet& set) {
-  CriticalSectionGuard guard(section);
+  Hold hold(section);
   auto found = m_sets.find(set.number());
   if (found != m_sets.end() && found->second == &set) m_sets.erase(found);
 }
 
 void NamedEventGlobalStatics::removeNamedEvent(const EventData& event) {
-  CriticalSectionGuard guard(section);
+  Hold hold(section);
   auto found = m_events.find(event.name());
   if (found != m_events.end() && found->second == &event) m_events.erase(found);
 }
 
 bool NamedEventGlobalStatics::hasSemaphoreSetOfId(int id) const {
-  CriticalSectionGuard guard(section);
+  Hold hold(section);
   return std::ranges::any_of(m_sets, [id](const auto& entry) { return entry.second->id() == id; });
 }
 
 void NamedEventGlobalStatics::ReleaseInherited(const EventData& event) {
-  PosixMutexHold hold(ProcessStatics<NamedEventGlobalStatics>::Lock());
+  Hold hold(ProcessStatics<NamedEventGlobalStatics>::Lock());
   event.RefCountedThreadUnsafePolicy::release();
 }
 

@@ -6,7 +6,8 @@
 #include <utility>
 
 #include "zt/fnd/RefCounted.h"
-#include "zt/fnd/osdep/PosixMutexHold.h"
+#include "zt/fnd/osdep/Hold.h"
+#include "zt/fnd/osdep/PosixMutex.h"
 
 namespace zt {
 namespace fnd {
@@ -25,7 +26,7 @@ class ProcessStatics {
   // Null if there are none yet.
   static RefPtr<Statics> Present() {
     RegisterForkHandlers();
-    PosixMutexHold hold(s_lock);
+    Hold hold(s_lock);
     DropInherited();
     return RefPtr<Statics>(s_statics);
   }
@@ -36,7 +37,7 @@ class ProcessStatics {
     RefPtr<Statics> present = Present();
     if (present) return present;
     RefPtr<Statics> fresh(new Statics);
-    PosixMutexHold hold(s_lock);
+    Hold hold(s_lock);
     DropInherited();
     if (s_statics == nullptr) s_statics = RefPtr<Statics>(fresh).detach();
     return RefPtr<Statics>(s_statics);
@@ -47,10 +48,10 @@ class ProcessStatics {
   static void RegisterForkHandlers() { pthread_once(&s_once, Register); }
 
   // The lock, which no fork comes in between: for counts that a child keeps on what it inherited.
-  static pthread_mutex_t& Lock() { return s_lock; }
+  static PosixMutex& Lock() RETURN_CAPABILITY(s_lock) { return s_lock; }
 
  private:
-  static void DropInherited() {
+  static void DropInherited() REQUIRES(s_lock) {
     if (s_statics == nullptr || s_statics->process.isCurrent()) return;
     s_statics->inherited = std::exchange(s_inherited, s_statics);
     s_statics = nullptr;
@@ -59,24 +60,24 @@ class ProcessStatics {
   static void AtExit() {
     Statics* last;
     {
-      PosixMutexHold hold(s_lock);
+      Hold hold(s_lock);
       DropInherited();
       last = std::exchange(s_statics, nullptr);
     }
     if (last != nullptr) last->release();
   }
 
-  static void LockForFork() { pthread_mutex_lock(&s_lock); }
-  static void UnlockAfterFork() { pthread_mutex_unlock(&s_lock); }
+  static void LockForFork() ACQUIRE(s_lock) { s_lock.lock(); }
+  static void UnlockAfterFork() RELEASE(s_lock) { s_lock.unlock(); }
   static void Register() {
     pthread_atfork(LockForFork, UnlockAfterFork, UnlockAfterFork);
     std::atexit(AtExit);
   }
 
   static inline pthread_once_t s_once = PTHREAD_ONCE_INIT;
-  static inline pthread_mutex_t s_lock = PTHREAD_MUTEX_INITIALIZER;
-  static inline Statics* s_statics = nullptr;    // one reference; guarded by s_lock
-  static inline Statics* s_inherited = nullptr;  // guarded by s_lock
+  static inline constinit PosixMutex s_lock;
+  static inline Statics* s_statics GUARDED_BY(s_lock) = nullptr;  // one reference
+  static inline Statics* s_inherited GUARDED_BY(s_lock) = nullptr;
 };
 
 }  // namespace osdep

@@ -9,6 +9,7 @@
 #include <utility>
 
 #include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/NamedEventGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/posix/Retry.h"
@@ -208,7 +209,7 @@ SemaphoreSet::~SemaphoreSet() {
 void SemaphoreSet::close() {
   if (!usable()) return;
   try {
-    MutexHold hold(m_statics->stateFileMutex);
+    Hold hold(m_statics->stateFileMutex);
     if (m_file.claim()) {
       const unsigned char notReady = 0;
       m_file.write(&notReady, 1, SetHeader::kReadyOffset);

@@ -10,6 +10,7 @@
 
 #include "tests/support/EventPlace.h"
 #include "tests/support/TempDir.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/NamedEventGlobalStatics.h"
 
 namespace zt::fnd::osdep {
@@ -25,7 +26,7 @@ typedef SemaphoreSet::Room Room;
 struct Set {
   EventPlace place;
   RefPtr<NamedEventGlobalStatics> statics = NamedEventGlobalStatics::Get();
-  CriticalSectionGuard guard{statics->section};
+  Hold<CriticalSection> hold{statics->section};
   RefPtr<SemaphoreSet> set = statics->getOrCreateSemaphoreSet(1);
   std::string path = place.file("sem_1");
 
@@ -164,7 +165,7 @@ TEST(NamedEventSet, OneObjectANumberInAProcess) {
 TEST(NamedEventSet, UnusableSetStaysInTheMapWhileItIsHeld) {
   EventPlace place;
   RefPtr<NamedEventGlobalStatics> statics = NamedEventGlobalStatics::Get();
-  CriticalSectionGuard guard(statics->section);
+  Hold hold(statics->section);
   statics->getOrCreateSemaphoreSet(1);  // makes the directory
   ASSERT_EQ(0, mkdir(place.file("sem_1").c_str(), 0777));
   int descriptors = OpenDescriptors();

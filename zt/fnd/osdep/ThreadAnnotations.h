@@ -3,7 +3,7 @@
 // Lock annotations that clang checks (-Wthread-safety); nothing elsewhere.
 //
 // The raw enter() and leave() of the primitives carry none, because ownership there crosses
-// functions and is recursive. Checked code takes its locks through scoped guards.
+// functions and is recursive. Checked code takes its locks through Hold (Hold.h).
 #if defined(__clang__)
 #define ZT_THREAD_ANNOTATION(x) __attribute__((x))
 #else
@@ -18,4 +18,5 @@
 #define EXCLUDES(...) ZT_THREAD_ANNOTATION(locks_excluded(__VA_ARGS__))
 #define ACQUIRE(...) ZT_THREAD_ANNOTATION(acquire_capability(__VA_ARGS__))
 #define RELEASE(...) ZT_THREAD_ANNOTATION(release_capability(__VA_ARGS__))
+#define RETURN_CAPABILITY(lock) ZT_THREAD_ANNOTATION(lock_returned(lock))
 #define NO_THREAD_SAFETY_ANALYSIS ZT_THREAD_ANNOTATION(no_thread_safety_analysis)

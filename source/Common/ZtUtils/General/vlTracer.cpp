@@ -17,6 +17,7 @@
 #include "source/Common/ZtUtils/General/ztSync.h"
 #include "zt/fnd/osdep/DateTime.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 #include "zt/fnd/osdep/ThreadID.h"
@@ -58,10 +59,10 @@ struct LogFile {
 LogFile& Log() { return LeakedInstance<LogFile>(); }
 
 struct Start {
-  ForkSafeMutex lock{AtFork::Wait, 60};  // gs_traceInitCS
+  ForkSafeMutex lock{AtFork::Wait, 60};
   // Output locks are never destroyed, since threads may be inside one while the log is closed. Held
   // here, they do not count as lost.
-  std::vector<Toolyard::CztMutex*> outputLocks;
+  std::vector<Toolyard::CztMutex*> outputLocks GUARDED_BY(lock);
 };
 
 Start& TheStart() { return LeakedInstance<Start>(); }
@@ -184,7 +185,8 @@ int64_t CalcFreeSpace(const char* path) {
 
 void vlTracer::Initialize(SeverityLevel mask, TraceTarget target, const wchar_t* directory,
                           long threshold) {
-  ForkSafeHold hold(TheStart().lock);
+  Start& start = TheStart();
+  Hold hold(start.lock);
   gs_traceMask = mask;
   gs_traceTarget = target;
   gs_traceLowDiskThreshold = threshold;
@@ -193,7 +195,7 @@ void vlTracer::Initialize(SeverityLevel mask, TraceTarget target, const wchar_t*
   std::string name = NewLogName();
   auto* sync = new Toolyard::CztMutex(String(name.c_str()).c_str(), false);
   if ((target & kTargetFile) && log.name.empty() && directory) PlaceLog(log, directory, name);
-  TheStart().outputLocks.push_back(sync);
+  start.outputLocks.push_back(sync);
   gs_traceSync = sync;  // Last: whoever sees it sees the rest.
 }
 
@@ -214,7 +216,7 @@ void vlTracer::Cleanup() {
 
 unsigned vlt_vlTracer::GetTraceMask() {
   if (!gs_traceSync && gs_traceInitCallback) {
-    ForkSafeHold hold(TheStart().lock);
+    Hold hold(TheStart().lock);
     if (!gs_traceSync) gs_traceInitCallback.load()();
   }
   return vlTracer::gs_traceMask;

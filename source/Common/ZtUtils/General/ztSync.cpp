@@ -19,16 +19,6 @@ bool CztCS::Unlock() {
   return true;
 }
 
-bool CztForkSafeCS::Lock(int) {
-  m_mutex.lock();
-  return true;
-}
-
-bool CztForkSafeCS::Unlock() {
-  m_mutex.unlock();
-  return true;
-}
-
 CztMutex::CztMutex(const wchar_t* name, bool initiallyOwned) : m_mutex(NameOrDefault(name)) {
   if (initiallyOwned) m_mutex.lock();
 }

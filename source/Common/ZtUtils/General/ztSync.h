@@ -5,7 +5,6 @@
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/CriticalSection.h"
 #include "zt/fnd/osdep/Event.h"
-#include "zt/fnd/osdep/ForkSafeMutex.h"
 #include "zt/fnd/osdep/Mutex.h"
 #include "zt/fnd/osdep/NamedEvent.h"
 #include "zt/fnd/osdep/ThreadAnnotations.h"
@@ -37,18 +36,6 @@ class CztCS : public CztSyncObject {
 
  private:
   zt::fnd::osdep::CriticalSection m_section;
-};
-
-// The same, and a forked child can always take it: a fork waits while another thread holds it
-// (ForkSafeMutex.h, which has the ranks). For holds that end soon.
-class CztForkSafeCS : public CztSyncObject {
- public:
-  explicit CztForkSafeCS(int rank) : m_mutex(zt::fnd::osdep::AtFork::Wait, rank) {}
-  bool Lock(int timeoutMs) override;
-  bool Unlock() override;
-
- private:
-  zt::fnd::osdep::ForkSafeMutex m_mutex;
 };
 
 // Lock known by name to the machine's processes; recursive per object. Lock waits without limit,
@@ -135,21 +122,6 @@ class CztStatefulMutex : public CztSyncObject {
  private:
   zt::fnd::osdep::Mutex m_mutex;
   zt::fnd::osdep::NamedEvent m_event;
-};
-
-// Holds a lock for a scope.
-class CztHold {
- public:
-  explicit CztHold(CztSyncObject& lock) : m_lock(lock), m_held(lock.Lock(-1)) {}
-  ~CztHold() {
-    if (m_held) m_lock.Unlock();
-  }
-  CztHold(const CztHold&) = delete;
-  CztHold& operator=(const CztHold&) = delete;
-
- private:
-  CztSyncObject& m_lock;
-  bool m_held;
 };
 
 }  // namespace Toolyard

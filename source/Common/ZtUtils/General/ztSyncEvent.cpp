@@ -3,6 +3,7 @@
 #include <limits>
 
 #include "source/Common/ZtUtils/General/ztSync.h"
+#include "zt/fnd/osdep/Hold.h"
 
 namespace Toolyard {
 namespace {
@@ -17,21 +18,6 @@ void WaitFor(const zt::fnd::osdep::PumpEvent& event, int timeoutMs, bool pumpMsg
     event.wait(static_cast<unsigned long>(static_cast<std::uint32_t>(timeoutMs)), pumpMsgs);
   }
 }
-
-// Gives a mutex back at the end, unless it is to be kept.
-class MutexRelease {
- public:
-  explicit MutexRelease(const zt::fnd::osdep::Mutex& mutex) : m_mutex(&mutex) {}
-  ~MutexRelease() {
-    if (m_mutex != nullptr) m_mutex->unlock();
-  }
-  MutexRelease(const MutexRelease&) = delete;
-  MutexRelease& operator=(const MutexRelease&) = delete;
-  void keep() { m_mutex = nullptr; }
-
- private:
-  const zt::fnd::osdep::Mutex* m_mutex;
-};
 
 }  // namespace
 
@@ -71,7 +57,7 @@ bool CztSemaphore::Lock(int timeoutMs) {
 }
 
 bool CztSemaphore::take() const {
-  zt::fnd::osdep::CriticalSectionGuard guard(m_section);
+  zt::fnd::osdep::Hold hold(m_section);
   if (m_count <= 0) return false;
   if (--m_count == 0) m_event.reset();
   return true;
@@ -83,7 +69,7 @@ bool CztSemaphore::Unlock() {
 }
 
 int CztSemaphore::Release(int n) {
-  zt::fnd::osdep::CriticalSectionGuard guard(m_section);
+  zt::fnd::osdep::Hold hold(m_section);
   const std::int32_t before = m_count;
   const std::int64_t sum = std::max<std::int64_t>(static_cast<std::int64_t>(before) + n,
                                                   std::numeric_limits<std::int32_t>::min());
@@ -112,14 +98,14 @@ bool CztStatefulMutex::LockAndSetState(bool setState, int wait) {
   } else if (!m_mutex.tryLock()) {
     return false;
   }
-  MutexRelease release(m_mutex);
+  zt::fnd::osdep::UnlockUnlessKept release(m_mutex);
   if (setState) m_event.set();
   release.keep();
   return true;
 }
 
 bool CztStatefulMutex::UnlockAndResetState(bool resetState) {
-  MutexRelease release(m_mutex);
+  zt::fnd::osdep::UnlockUnlessKept release(m_mutex);
   if (resetState) m_event.reset();
   return true;
 }

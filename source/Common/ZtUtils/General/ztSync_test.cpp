@@ -56,12 +56,12 @@ TEST(Sync, BaseKeepsThePumpFlagWhichBeginsFalse) {
   EXPECT_TRUE(object.pumps());
 }
 
-TEST(Sync, HoldLocksAndUnlocksThroughTheBase) {
+TEST(Sync, LocksAndUnlocksThroughTheBase) {
   Described object;
-  {
-    CztHold hold(object);
-    EXPECT_EQ(1, object.locks);
-  }
+  CztSyncObject& lock = object;
+  EXPECT_TRUE(lock.Lock(-1));
+  EXPECT_EQ(1, object.locks);
+  EXPECT_TRUE(lock.Unlock());
   EXPECT_EQ(0, object.locks);
 }
 
@@ -296,12 +296,13 @@ TEST(SyncSemaphore, UnitsAreNeitherLostNorMade) {
   for (int t = 0; t < 6; ++t) {
     threads.emplace_back([&] {
       for (int i = 0; i < 300; ++i) {
-        CztHold hold(semaphore);
+        semaphore.Lock(-1);
         int now = ++inside;
         for (int seen = most; now > seen && !most.compare_exchange_weak(seen, now);) {
         }
         std::this_thread::yield();
         --inside;
+        semaphore.Unlock();
       }
     });
   }
