@@ -48,13 +48,13 @@ TEST_F(IniLockLocale, NameOfAFileIsTheSameInEveryLocale) {
       {"/d/\xFF\x80z", "D%FF%80Z"},
   };
   for (const char* locale : {"C", "C.UTF-8", "tr_TR.UTF-8", "az_AZ.UTF-8", "de_DE.ISO-8859-1"}) {
-    EXPECT_EQ(0, InChild([&] {
-                ASSERT_TRUE(m_locales.use(locale));
-                for (const auto& [file, name] : names) {
-                  EXPECT_STREQ(name, zt::fnd::AnsiString(IniFileLock::NameForFile(file)).c_str());
-                }
-              }))
-        << locale;
+    SCOPED_TRACE(locale);
+    ExpectInChild([&] {
+      ASSERT_TRUE(m_locales.use(locale));
+      for (const auto& [file, name] : names) {
+        EXPECT_STREQ(name, zt::fnd::AnsiString(IniFileLock::NameForFile(file)).c_str());
+      }
+    });
   }
 }
 

@@ -101,28 +101,25 @@ TEST(IniLock, MayBeGivenUpByAnotherThreadAndTakenAgain) {
 }
 
 // The thread that began the hold must not take the lock for its own while another one ends the hold.
-TEST(IniLock, TheFirstOwnerWaitsForTheThreadThatGivesUp) {
-  EXPECT_EQ(InChild([] {
-              MutexPlace place;
-              zt::fnd::String name(L"name");
-              // ThreadSanitizer takes a section that ends with another thread for held for good, and
-              // counts 64 of them at most.
-              constexpr int kRounds = VLT_THREAD_SANITIZER ? 40 : 300;
-              for (int round = 0; round < kRounds; ++round) {
-                auto first = std::make_unique<IniFileLock>(name);
-                std::atomic<bool> ending{false};
-                std::thread other([&] {
-                  ending = true;
-                  first.reset();
-                });
-                while (!ending) {
-                }
-                { IniFileLock again(name); }
-                other.join();
-                ASSERT_TRUE(FileIsFree(place.file("name"))) << round;
-              }
-            }),
-            0);
+TEST_IN_CHILD(IniLock, TheFirstOwnerWaitsForTheThreadThatGivesUp) {
+  MutexPlace place;
+  zt::fnd::String name(L"name");
+  // ThreadSanitizer takes a section that ends with another thread for held for good, and
+  // counts 64 of them at most.
+  constexpr int kRounds = VLT_THREAD_SANITIZER ? 40 : 300;
+  for (int round = 0; round < kRounds; ++round) {
+    auto first = std::make_unique<IniFileLock>(name);
+    std::atomic<bool> ending{false};
+    std::thread other([&] {
+      ending = true;
+      first.reset();
+    });
+    while (!ending) {
+    }
+    { IniFileLock again(name); }
+    other.join();
+    ASSERT_TRUE(FileIsFree(place.file("name"))) << round;
+  }
 }
 
 TEST(IniLock, AForkedChildDoesNotFreeItsParentsLock) {

@@ -35,11 +35,10 @@ class IniManagerFork : public testing::Test {
 
   // In another process, which has the file as it is on the disk.
   void expectOnDisk(const char* item, const char* value) const {
-    EXPECT_EQ(InChild([&] {
-                auto fresh = opened();
-                EXPECT_EQ(Value(*fresh, "s", item), value) << item;
-              }),
-              0);
+    ExpectInChild([&] {
+      auto fresh = opened();
+      EXPECT_EQ(Value(*fresh, "s", item), value) << item;
+    });
   }
 
   std::string lockFile() const {
@@ -55,15 +54,14 @@ class IniManagerFork : public testing::Test {
 TEST_F(IniManagerFork, AChildOfALivingHolderIsRefusedAndReads) {
   ASSERT_EQ(Save(*ini, "parent", "1"), S_OK);
   std::string before = ReadBytes(file);
-  EXPECT_EQ(InChild([&] {
-              EXPECT_EQ(Save(*ini, "child", "1"), E_FAIL);
-              unsigned char* digest = nullptr;
-              ini->SetItem("s", "child", "2", true);
-              EXPECT_EQ(ini->WriteAndGetChecksum(&digest), E_FAIL);
-              EXPECT_EQ(digest, nullptr);
-              EXPECT_EQ(Value(*ini, "s", "parent"), "1");
-            }),
-            0);
+  ExpectInChild([&] {
+    EXPECT_EQ(Save(*ini, "child", "1"), E_FAIL);
+    unsigned char* digest = nullptr;
+    ini->SetItem("s", "child", "2", true);
+    EXPECT_EQ(ini->WriteAndGetChecksum(&digest), E_FAIL);
+    EXPECT_EQ(digest, nullptr);
+    EXPECT_EQ(Value(*ini, "s", "parent"), "1");
+  });
   EXPECT_EQ(ReadBytes(file), before);
   EXPECT_EQ(Save(*ini, "parent", "2"), S_OK);
   ini.reset();

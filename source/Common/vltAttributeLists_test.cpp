@@ -88,18 +88,15 @@ TEST(AttributeList, ManyElementsTakeTimeInProportion) {
   EXPECT_EQ(ListText(answers, S_OK).size(), 400001u);
 }
 
-TEST(AttributeList, ACountThatIsNotTrueIsOutOfMemory) {
+TEST_IN_CHILD(AttributeList, ACountThatIsNotTrueIsOutOfMemory) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer holds the address space";
-  int code = InChild([] {
-    LimitMemoryTo(64 << 20);
-    for (int type = 8; type <= 13; ++type) {
-      Answers answers = Filled(type);
-      answers.announced = 0xFFFFFFFF;
-      EXPECT_EQ(ListText(answers, E_OUTOFMEMORY), L"{") << type;
-      EXPECT_EQ(TextOf(answers, E_OUTOFMEMORY), L"(untouched)") << type;
-    }
-  });
-  EXPECT_EQ(code, 0);
+  LimitMemoryTo(64 << 20);
+  for (int type = 8; type <= 13; ++type) {
+    Answers answers = Filled(type);
+    answers.announced = 0xFFFFFFFF;
+    EXPECT_EQ(ListText(answers, E_OUTOFMEMORY), L"{") << type;
+    EXPECT_EQ(TextOf(answers, E_OUTOFMEMORY), L"(untouched)") << type;
+  }
 }
 
 TEST(AttributeList, HookPointsActAsAFailedAllocation) {
@@ -110,7 +107,8 @@ TEST(AttributeList, HookPointsActAsAFailedAllocation) {
                                                 {11, "TestHookNT\"./source/Common/vltcmn\"158"},
                                                 {12, "TestHookNT\"./source/Common/vltcmn\"174"}};
   for (const auto& [type, point] : points) {
-    int code = InArmedChild(point, kFailedAllocation, [type = type] {
+    SCOPED_TRACE(point);
+    ExpectInArmedChild(point, kFailedAllocation, [type = type] {
       for (int other = 8; other <= 13; ++other) {
         if (other == type) {
           EXPECT_EQ(ListText(Filled(other), E_OUTOFMEMORY), L"{");
@@ -122,12 +120,11 @@ TEST(AttributeList, HookPointsActAsAFailedAllocation) {
         EXPECT_EQ(ListText(Type(other), S_OK), L"{}");  // passed before an allocation only
       }
     });
-    EXPECT_EQ(code, 0) << point;
   }
 }
 
 TEST(AttributeList, AnExceptionGivesEverythingBack) {
-  int code = InArmedChild(hook::kStringFromClsid, kThrownBadAlloc, [] {
+  ExpectInArmedChild(hook::kStringFromClsid, kThrownBadAlloc, [] {
     for (int type : {5, 6, 12, 13}) {
       g_references = 0;
       Answers answers = Filled(type);
@@ -138,11 +135,10 @@ TEST(AttributeList, AnExceptionGivesEverythingBack) {
       EXPECT_EQ(g_references, 0);
     }
   });
-  EXPECT_EQ(code, 0);
 }
 
 TEST(AttributeList, ATextThatMemoryDoesNotSufficeForIsNullAndInAListEmpty) {
-  int code = InArmedChild(hook::kDuplicateString2, kFailedAllocation, [] {
+  ExpectInArmedChild(hook::kDuplicateString2, kFailedAllocation, [] {
     for (int type : {12, 13}) EXPECT_EQ(ListText(Filled(type), S_OK), L"{,}");
     for (int type : {5, 6}) EXPECT_EQ(TextOf(Filled(type), S_OK), L"(null)");
     Answers failing = Filled(5);
@@ -152,7 +148,6 @@ TEST(AttributeList, ATextThatMemoryDoesNotSufficeForIsNullAndInAListEmpty) {
     failing.result = kFailure;
     EXPECT_EQ(TextOf(failing, kFailure, kInner), L"(untouched)");
   });
-  EXPECT_EQ(code, 0);
 }
 
 }  // namespace

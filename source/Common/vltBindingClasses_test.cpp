@@ -109,10 +109,10 @@ TEST(BindingClasses, NoDictionaryManagesClasses) {
   EXPECT_EQ(Parse(B(1) + ":1:" + B(2)).GetDictionaryManagedClasses(components).size(), 0u);
 }
 
-TEST(BindingClasses, ALongTextTakesTimeInProportion) {
+TEST_IN_CHILD(BindingClasses, ALongTextTakesTimeInProportion) {
   std::string text = B(1) + ":100000";
   for (int n = 0; n < 100000; ++n) text += ":" + B(2);
-  EXPECT_EQ(InChild([&] { EXPECT_EQ(Classes(Parse(text), G(1)).size(), 100000u); }), 0);
+  EXPECT_EQ(Classes(Parse(text), G(1)).size(), 100000u);
 }
 
 // ---- The map
@@ -169,21 +169,18 @@ void LiftMemoryLimit() {
   setrlimit(RLIMIT_AS, &limit);
 }
 
-TEST(BindingClasses, OutOfMemoryGivesAnEmptyComponentVector) {
+TEST_IN_CHILD(BindingClasses, OutOfMemoryGivesAnEmptyComponentVector) {
   if (!kCanLimitMemory) GTEST_SKIP() << "a sanitizer has the address space";
-  EXPECT_EQ(InChild([] {
-              mallopt(M_MMAP_THRESHOLD, kLargeBlock);
-              std::string text;
-              for (unsigned n = 0; n < kMany; ++n) text += B(n) + ":0:";
-              CvltBindingClasses table = Parse(text);
-              EXPECT_EQ(table.GetComponentVector().size(), kMany);
-              LimitMemoryTo(kLargeBlock);
-              UseUpBlocksOf(kLargeBlock);
-              unsigned found = table.GetComponentVector().size();
-              LiftMemoryLimit();
-              EXPECT_EQ(found, 0u);
-            }),
-            0);
+  mallopt(M_MMAP_THRESHOLD, kLargeBlock);
+  std::string text;
+  for (unsigned n = 0; n < kMany; ++n) text += B(n) + ":0:";
+  CvltBindingClasses table = Parse(text);
+  EXPECT_EQ(table.GetComponentVector().size(), kMany);
+  LimitMemoryTo(kLargeBlock);
+  UseUpBlocksOf(kLargeBlock);
+  unsigned found = table.GetComponentVector().size();
+  LiftMemoryLimit();
+  EXPECT_EQ(found, 0u);
 }
 
 TEST(BindingClasses, AnswersInTheOrderOfEntry) {
@@ -215,23 +212,20 @@ TEST(BindingClasses, NobodyServesAnUnknownClassAndNothingIsTouched) {
   EXPECT_EQ(static_cast<uint32_t>(VLT_E_NO_COMPONENT), 0x80040301u);
 }
 
-TEST(BindingClasses, OutOfMemoryIsAResultOfTheQuery) {
+TEST_IN_CHILD(BindingClasses, OutOfMemoryIsAResultOfTheQuery) {
   if (!kCanLimitMemory) GTEST_SKIP() << "a sanitizer has the address space";
-  EXPECT_EQ(InChild([] {
-              mallopt(M_MMAP_THRESHOLD, kLargeBlock);
-              BindingClassesMap map;
-              for (unsigned n = 0; n < kMany; ++n) map.emplace(G(8), G(n));
-              unsigned count = 7;
-              GUID* components = nullptr;
-              LimitMemoryTo(kLargeBlock);
-              UseUpBlocksOf(kLargeBlock);
-              HRESULT result = vltGetComponentsForBindingClass(G(8), &count, &map, &components);
-              LiftMemoryLimit();
-              EXPECT_EQ(result, E_OUTOFMEMORY);
-              EXPECT_EQ(count, 7u);
-              EXPECT_EQ(components, nullptr);
-            }),
-            0);
+  mallopt(M_MMAP_THRESHOLD, kLargeBlock);
+  BindingClassesMap map;
+  for (unsigned n = 0; n < kMany; ++n) map.emplace(G(8), G(n));
+  unsigned count = 7;
+  GUID* components = nullptr;
+  LimitMemoryTo(kLargeBlock);
+  UseUpBlocksOf(kLargeBlock);
+  HRESULT result = vltGetComponentsForBindingClass(G(8), &count, &map, &components);
+  LiftMemoryLimit();
+  EXPECT_EQ(result, E_OUTOFMEMORY);
+  EXPECT_EQ(count, 7u);
+  EXPECT_EQ(components, nullptr);
 }
 
 }  // namespace

@@ -29,25 +29,23 @@ TEST(RegistrarDatabase, AShortSidecarSetsTheDatabaseAsideAndTheNextStartWorks) {
   ASSERT_EQ(StartOnce(i), 0);
   std::string contents = ReadBytes(i.database());
   WriteBytes(i.sidecar(), std::string(15, 'x'));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_TRUE(r->isOpen());
-              EXPECT_EQ(Find(*r, kVltdd), E_INVALIDARG);
-              EXPECT_TRUE(Names(*r, vltComponentDataDictionary).empty());
-              EXPECT_EQ(ReadBytes(i.database()), "");
-              EXPECT_FALSE(Exists(i.sidecar()));
-              unsigned version = 7;
-              EXPECT_EQ(r->GetSchemaVersion(&version), S_OK);
-              EXPECT_EQ(version, 0u);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_TRUE(r->isOpen());
+    EXPECT_EQ(Find(*r, kVltdd), E_INVALIDARG);
+    EXPECT_TRUE(Names(*r, vltComponentDataDictionary).empty());
+    EXPECT_EQ(ReadBytes(i.database()), "");
+    EXPECT_FALSE(Exists(i.sidecar()));
+    unsigned version = 7;
+    EXPECT_EQ(r->GetSchemaVersion(&version), S_OK);
+    EXPECT_EQ(version, 0u);
+  });
   EXPECT_EQ(ReadBytes(BadName(i)), contents);
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, kVltdd), S_OK);
-              EXPECT_EQ(Find(*r, G(1)), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(Find(*r, kVltdd), S_OK);
+    EXPECT_EQ(Find(*r, G(1)), S_OK);
+  });
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
 }
 
@@ -75,21 +73,18 @@ TEST(RegistrarDatabase, WithoutASidecarTheFileIsTakenAsItIs) {
 }
 
 // What stops the save between the mark and the digest shows the mark.
-TEST(RegistrarDatabase, TheFirstSaveWritesTheMarkBeforeTheFile) {
+TEST_IN_CHILD(RegistrarDatabase, TheFirstSaveWritesTheMarkBeforeTheFile) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              unlink(i.sidecar().c_str());
-              {
-                FileSizeLimit markOnly(16);
-                EXPECT_LT(r->SetStorageServerCacheSize(5), 0);
-              }
-              EXPECT_EQ(ReadBytes(i.sidecar()), "0000000000000000");
-              EXPECT_EQ(r->SaveChanges(), S_OK);
-              EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
-            }),
-            0);
+  LinuxStart r(i);
+  unlink(i.sidecar().c_str());
+  {
+    FileSizeLimit markOnly(16);
+    EXPECT_LT(r->SetStorageServerCacheSize(5), 0);
+  }
+  EXPECT_EQ(ReadBytes(i.sidecar()), "0000000000000000");
+  EXPECT_EQ(r->SaveChanges(), S_OK);
+  EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
 }
 
 TEST(RegistrarDatabase, TheMarkMatchesNothingAndCostsNothing) {
@@ -97,34 +92,30 @@ TEST(RegistrarDatabase, TheMarkMatchesNothingAndCostsNothing) {
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   ASSERT_EQ(StartOnce(i), 0);
   WriteBytes(i.sidecar(), "0000000000000000");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(1)), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(Find(*r, G(1)), S_OK);
+  });
   EXPECT_FALSE(Exists(BadName(i)));
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
 }
 
-TEST(RegistrarDatabase, AFailedSaveKeepsTheChangeInMemoryAndTheSidecarOld) {
+TEST_IN_CHILD(RegistrarDatabase, AFailedSaveKeepsTheChangeInMemoryAndTheSidecarOld) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              std::string file = ReadBytes(i.database()), digest = ReadBytes(i.sidecar());
-              {
-                FileSizeLimit full(16);
-                EXPECT_LT(r->SetStorageServerCacheSize(5), 0);
-              }
-              unsigned size = 0;
-              EXPECT_EQ(r->GetStorageServerCacheSize(&size), S_OK);
-              EXPECT_EQ(size, 5u);
-              EXPECT_EQ(ReadBytes(i.database()), file);
-              EXPECT_EQ(ReadBytes(i.sidecar()), digest);
-              EXPECT_EQ(r->SaveChanges(), S_OK);
-              EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "CacheSize"), "5");
-            }),
-            0);
+  LinuxStart r(i);
+  std::string file = ReadBytes(i.database()), digest = ReadBytes(i.sidecar());
+  {
+    FileSizeLimit full(16);
+    EXPECT_LT(r->SetStorageServerCacheSize(5), 0);
+  }
+  unsigned size = 0;
+  EXPECT_EQ(r->GetStorageServerCacheSize(&size), S_OK);
+  EXPECT_EQ(size, 5u);
+  EXPECT_EQ(ReadBytes(i.database()), file);
+  EXPECT_EQ(ReadBytes(i.sidecar()), digest);
+  EXPECT_EQ(r->SaveChanges(), S_OK);
+  EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "CacheSize"), "5");
 }
 
 TEST(RegistrarDatabase, ADifferingDigestKeepsTheContents) {
@@ -133,11 +124,10 @@ TEST(RegistrarDatabase, ADifferingDigestKeepsTheContents) {
   ASSERT_EQ(StartOnce(i), 0);
   WriteBytes(i.database(), ReadBytes(i.database()) + "[Mine]\nx = 1\n");
   SaveCounter saves(i.root(), "vlt.vlr");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(1)), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(Find(*r, G(1)), S_OK);
+  });
   EXPECT_EQ(saves.count(), 1);  // that of the built-in dictionary: nothing is merged anew
   EXPECT_FALSE(Exists(BadName(i)));
   EXPECT_EQ(DatabaseText(i.database()).raw("Mine", "x"), "1");
@@ -153,32 +143,28 @@ TEST(RegistrarDatabase, WhatCannotBeParsedIsSetAsideAndEverythingRegisteredAnew)
   std::string damaged(kUtf16, sizeof kUtf16 - 1);
   WriteBytes(i.database(), damaged);
   unlink(i.sidecar().c_str());
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, kVltdd), S_OK);
-              EXPECT_EQ(Find(*r, G(1)), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(Find(*r, kVltdd), S_OK);
+    EXPECT_EQ(Find(*r, G(1)), S_OK);
+  });
   EXPECT_EQ(ReadBytes(BadName(i)), damaged);
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
 }
 
 // The digest speaks first; the file is only found to be unreadable by the second opening, whose
 // failure is the caller's.
-TEST(RegistrarDatabase, DamageWithAStaleDigestIsRaisedOnceAndThenHealed) {
+TEST_IN_CHILD(RegistrarDatabase, DamageWithAStaleDigestIsRaisedOnceAndThenHealed) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   ASSERT_EQ(StartOnce(i), 0);
   std::string damaged(kUtf16, sizeof kUtf16 - 1);
   WriteBytes(i.database(), damaged);
-  EXPECT_EQ(InChild([&] {
-              EXPECT_THROW(LinuxStart r(i), int);
-              EXPECT_EQ(ReadBytes(BadName(i)), damaged);
-              EXPECT_FALSE(Exists(i.sidecar()));
-              LinuxStart again(i);
-              EXPECT_EQ(Find(*again, G(1)), S_OK);
-            }),
-            0);
+  EXPECT_THROW(LinuxStart r(i), int);
+  EXPECT_EQ(ReadBytes(BadName(i)), damaged);
+  EXPECT_FALSE(Exists(i.sidecar()));
+  LinuxStart again(i);
+  EXPECT_EQ(Find(*again, G(1)), S_OK);
 }
 
 TEST(RegistrarDatabase, IsOpenUntilTheRegistrarGoesAndFreeThen) {
@@ -210,45 +196,36 @@ TEST(RegistrarDatabase, IsOpenUntilTheRegistrarGoesAndFreeThen) {
   EXPECT_EQ(first.wait(), 0);
 }
 
-TEST(RegistrarDatabase, LeavesNoDescriptorOpen) {
+TEST_IN_CHILD(RegistrarDatabase, LeavesNoDescriptorOpen) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   i.addObjectExpert("E", "Exp", GText(2), "{" + GText(2) + "}:1:{" + GText(3) + "}");
-  EXPECT_EQ(InChild([&] {
-              int before = OpenDescriptors();
-              { LinuxStart r(i); }
-              EXPECT_EQ(OpenDescriptors(), before);
-            }),
-            0);
+  int before = OpenDescriptors();
+  { LinuxStart r(i); }
+  EXPECT_EQ(OpenDescriptors(), before);
 }
 
-TEST(RegistrarDatabase, TheParentRunsInitWhenTold) {
+TEST_IN_CHILD(RegistrarDatabase, TheParentRunsInitWhenTold) {
   Installation i;
   i.addObjectExpert("E", "Exp", GText(2), "{" + GText(2) + "}:1:{" + GText(3) + "}");
-  EXPECT_EQ(InChild([&] {
-              PharlapStart r(i);
-              EXPECT_EQ(Find(*r, G(2)), S_OK);
-              // Only the subclass fills the maps of binding classes.
-              Bound(*r, vltComponentObjectExpert, G(3), VLT_E_NO_COMPONENT);
-              Started<OpenPharlap> idle(S(i.root() + "/other.vlr"), S(i.root()), false);
-              EXPECT_EQ(Find(*idle, kVltdd), E_INVALIDARG);
-              EXPECT_EQ(idle->SaveChanges(), S_OK);
-              EXPECT_FALSE(Exists(i.root() + "/other.vlr"));
-            }),
-            0);
+  PharlapStart r(i);
+  EXPECT_EQ(Find(*r, G(2)), S_OK);
+  // Only the subclass fills the maps of binding classes.
+  Bound(*r, vltComponentObjectExpert, G(3), VLT_E_NO_COMPONENT);
+  Started<OpenPharlap> idle(S(i.root() + "/other.vlr"), S(i.root()), false);
+  EXPECT_EQ(Find(*idle, kVltdd), E_INVALIDARG);
+  EXPECT_EQ(idle->SaveChanges(), S_OK);
+  EXPECT_FALSE(Exists(i.root() + "/other.vlr"));
 }
 
 }  // namespace
 // Left by a killed scan, it would otherwise be taken up over what clients save later.
-TEST(RegistrarDatabase, ASecondNameThatAKilledScanLeftGoesWithTheNextStart) {
+TEST_IN_CHILD(RegistrarDatabase, ASecondNameThatAKilledScanLeftGoesWithTheNextStart) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
   WriteBytes(i.database() + ".durable", ReadBytes(i.database()));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_FALSE(Exists(i.database() + ".durable"));
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_FALSE(Exists(i.database() + ".durable"));
 }
 
 TEST(RegistrarDatabase, AScanLeavesNoSecondName) {

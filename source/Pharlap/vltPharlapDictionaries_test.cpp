@@ -21,16 +21,15 @@ namespace fs = std::filesystem;
 
 TEST(RegistrarDictionary, RegistrationWritesItsItemsInOrderAndSaves) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Offered d(vltComponentDataDictionary, L"New One", G(9), L"/x/New.framework", L"n\"1");
-              d.value.dictionary.schemaVersion = 4294967295u;
-              d.value.dictionary.fragmentRegistered = 1;
-              d.value.dictionary.lastInstalledSchemaVersion = 12;
-              EXPECT_EQ(r->RegisterComponent(&d.value), S_OK);
-              EXPECT_EQ(Find(*r, G(9)), E_INVALIDARG);  // known from the next start on
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    Offered d(vltComponentDataDictionary, L"New One", G(9), L"/x/New.framework", L"n\"1");
+    d.value.dictionary.schemaVersion = 4294967295u;
+    d.value.dictionary.fragmentRegistered = 1;
+    d.value.dictionary.lastInstalledSchemaVersion = 12;
+    EXPECT_EQ(r->RegisterComponent(&d.value), S_OK);
+    EXPECT_EQ(Find(*r, G(9)), E_INVALIDARG);  // known from the next start on
+  });
   DatabaseText db(i.database());
   EXPECT_EQ(db.quoted("KORComponents", "New One"), "New One");
   EXPECT_EQ(db.items("New One"), (DatabaseText::Items{{"Identifier", "\"" + GText(9) + "\""},
@@ -41,67 +40,59 @@ TEST(RegistrarDictionary, RegistrationWritesItsItemsInOrderAndSaves) {
                                                       {"Prefix", R"("n\"1")"}}));
   EXPECT_FALSE(db.raw("VLRContentsSection", "New One"));
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Received d;
-              ASSERT_EQ(r->GetComponent(G(9), &d.value), S_OK);
-              EXPECT_EQ(d.prefix(), L"n\"1");
-              EXPECT_EQ(d.value.dictionary.schemaVersion, 4294967295u);
-              EXPECT_EQ(d.value.dictionary.lastInstalledSchemaVersion, 12u);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    Received d;
+    ASSERT_EQ(r->GetComponent(G(9), &d.value), S_OK);
+    EXPECT_EQ(d.prefix(), L"n\"1");
+    EXPECT_EQ(d.value.dictionary.schemaVersion, 4294967295u);
+    EXPECT_EQ(d.value.dictionary.lastInstalledSchemaVersion, 12u);
+  });
 }
 
-TEST(RegistrarDictionary, RegistrationBringsTheCopyInMemoryUpToDate) {
+TEST_IN_CHILD(RegistrarDictionary, RegistrationBringsTheCopyInMemoryUpToDate) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "old");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Offered d(vltComponentDataDictionary, L"Renamed", G(1), L"/x/New", L"new");
-              d.value.dictionary.schemaVersion = 8;
-              d.value.dictionary.lastInstalledSchemaVersion = 7;
-              EXPECT_EQ(r->RegisterComponent(&d.value), S_OK);
-              Received known;
-              ASSERT_EQ(r->GetComponent(G(1), &known.value), S_OK);
-              EXPECT_EQ(known.name(), L"Renamed");
-              EXPECT_EQ(known.file(), L"/x/New");
-              EXPECT_EQ(known.prefix(), L"new");
-              EXPECT_EQ(known.value.dictionary.schemaVersion, 8u);
-              EXPECT_EQ(known.value.dictionary.fragmentRegistered, 0u);
-              EXPECT_EQ(known.value.dictionary.lastInstalledSchemaVersion, 7u);
-            }),
-            0);
+  LinuxStart r(i);
+  Offered d(vltComponentDataDictionary, L"Renamed", G(1), L"/x/New", L"new");
+  d.value.dictionary.schemaVersion = 8;
+  d.value.dictionary.lastInstalledSchemaVersion = 7;
+  EXPECT_EQ(r->RegisterComponent(&d.value), S_OK);
+  Received known;
+  ASSERT_EQ(r->GetComponent(G(1), &known.value), S_OK);
+  EXPECT_EQ(known.name(), L"Renamed");
+  EXPECT_EQ(known.file(), L"/x/New");
+  EXPECT_EQ(known.prefix(), L"new");
+  EXPECT_EQ(known.value.dictionary.schemaVersion, 8u);
+  EXPECT_EQ(known.value.dictionary.fragmentRegistered, 0u);
+  EXPECT_EQ(known.value.dictionary.lastInstalledSchemaVersion, 7u);
 }
 
 TEST(RegistrarDictionary, NullTextsAreEmpty) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Offered d(vltComponentDataDictionary, L"vltdd", kVltdd, L"", L"");
-              d.value.fileName = d.value.dictionary.prefix = nullptr;
-              EXPECT_EQ(r->RegisterComponent(&d.value), S_OK);
-              Received known;
-              ASSERT_EQ(r->GetComponent(kVltdd, &known.value), S_OK);
-              EXPECT_EQ(known.value.fileName, nullptr);
-              EXPECT_EQ(known.value.dictionary.prefix, nullptr);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    Offered d(vltComponentDataDictionary, L"vltdd", kVltdd, L"", L"");
+    d.value.fileName = d.value.dictionary.prefix = nullptr;
+    EXPECT_EQ(r->RegisterComponent(&d.value), S_OK);
+    Received known;
+    ASSERT_EQ(r->GetComponent(kVltdd, &known.value), S_OK);
+    EXPECT_EQ(known.value.fileName, nullptr);
+    EXPECT_EQ(known.value.dictionary.prefix, nullptr);
+  });
   EXPECT_EQ(DatabaseText(i.database()).raw("vltdd", "Prefix"), "\"\"");
 }
 
-TEST(RegistrarDictionary, AFailedSaveIsTheResultAndMemoryIsUpToDateAllTheSame) {
+TEST_IN_CHILD(RegistrarDictionary, AFailedSaveIsTheResultAndMemoryIsUpToDateAllTheSame) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "old");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              FileSizeLimit full(16);
-              Offered d(vltComponentDataDictionary, L"Dict", G(1), L"/x", L"new");
-              EXPECT_EQ(r->RegisterComponent(&d.value), E_FAIL);
-              Received known;
-              ASSERT_EQ(r->GetComponent(G(1), &known.value), S_OK);
-              EXPECT_EQ(known.prefix(), L"new");
-            }),
-            0);
+  LinuxStart r(i);
+  FileSizeLimit full(16);
+  Offered d(vltComponentDataDictionary, L"Dict", G(1), L"/x", L"new");
+  EXPECT_EQ(r->RegisterComponent(&d.value), E_FAIL);
+  Received known;
+  ASSERT_EQ(r->GetComponent(G(1), &known.value), S_OK);
+  EXPECT_EQ(known.prefix(), L"new");
 }
 
 // ---- The flag
@@ -113,16 +104,15 @@ TEST(RegistrarFlag, IsSetByEveryMergeAndReadByClients) {
     unsigned value = 99;
     Signal unused;
     TempDir out;
-    EXPECT_EQ(InChild([&] {
-                LinuxStart r(i);
-                Received d;
-                ASSERT_EQ(r->GetComponent(G(1), &d.value), S_OK);
-                WriteBytes(out / "flag", std::to_string(d.value.dictionary.fragmentRegistered));
-                if (reset) {
-                  EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
-                }
-              }),
-              0);
+    ExpectInChild([&] {
+      LinuxStart r(i);
+      Received d;
+      ASSERT_EQ(r->GetComponent(G(1), &d.value), S_OK);
+      WriteBytes(out / "flag", std::to_string(d.value.dictionary.fragmentRegistered));
+      if (reset) {
+        EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
+      }
+    });
     value = static_cast<unsigned>(std::stoul(ReadBytes(out / "flag")));
     return value;
   };
@@ -141,43 +131,39 @@ TEST(RegistrarFlag, ResetWritesOnceAndClearsMemory) {
   i.addDictionary("B", "DictB", GText(2), 3, "b");
   i.addObjectExpert("E", "Exp", GText(3));
   SaveCounter saves(i.root(), "vlt.vlr");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              int before = saves.count();
-              EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
-              EXPECT_EQ(saves.count(), before + 1);
-              for (unsigned n : {1u, 2u}) {
-                Received d;
-                ASSERT_EQ(r->GetComponent(G(n), &d.value), S_OK);
-                EXPECT_EQ(d.value.dictionary.fragmentRegistered, 0u);
-              }
-              std::string bytes = ReadBytes(i.database());
-              EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
-              EXPECT_EQ(saves.count(), before + 1);
-              EXPECT_EQ(ReadBytes(i.database()), bytes);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    int before = saves.count();
+    EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
+    EXPECT_EQ(saves.count(), before + 1);
+    for (unsigned n : {1u, 2u}) {
+      Received d;
+      ASSERT_EQ(r->GetComponent(G(n), &d.value), S_OK);
+      EXPECT_EQ(d.value.dictionary.fragmentRegistered, 0u);
+    }
+    std::string bytes = ReadBytes(i.database());
+    EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
+    EXPECT_EQ(saves.count(), before + 1);
+    EXPECT_EQ(ReadBytes(i.database()), bytes);
+  });
   EXPECT_EQ(DatabaseText(i.database()).raw("DictA", "FragmentRegistered"), "0");
   EXPECT_EQ(DatabaseText(i.database()).raw("DictB", "FragmentRegistered"), "0");
 }
 
 // The settings have a "SchemaVersion" too, and no flag: the failure shows when they come last.
-TEST(RegistrarFlag, ResetReportsTheLastSectionWithASchema) {
+TEST_IN_CHILD(RegistrarFlag, ResetReportsTheLastSectionWithASchema) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
-              EXPECT_EQ(r->database().SetItem("Last", "SchemaVersion", "1", true), S_OK);
-              EXPECT_EQ(r->ResetDDUpdatedFlags(), E_FAIL);
-              for (const char* value : {"", "0", "words"}) {
-                r->database().SetItem("Last", "FragmentRegistered", value, true);
-                EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK) << value;
-              }
-              std::string kept;
-              r->database().GetItem("Last", "FragmentRegistered", &kept);
-              EXPECT_EQ(kept, "words");
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
+  EXPECT_EQ(r->database().SetItem("Last", "SchemaVersion", "1", true), S_OK);
+  EXPECT_EQ(r->ResetDDUpdatedFlags(), E_FAIL);
+  for (const char* value : {"", "0", "words"}) {
+    r->database().SetItem("Last", "FragmentRegistered", value, true);
+    EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK) << value;
+  }
+  std::string kept;
+  r->database().GetItem("Last", "FragmentRegistered", &kept);
+  EXPECT_EQ(kept, "words");
 }
 
 // ---- What counts as changed
@@ -189,7 +175,7 @@ struct Comparison {
   HRESULT result;
 };
 
-TEST(RegistrarChanged, EveryDictionaryAndNothingElse) {
+TEST_IN_CHILD(RegistrarChanged, EveryDictionaryAndNothingElse) {
   const std::string id = "Identifier = \"" + GText(1) + "\"\n";
   const std::string other = "Identifier = \"" + GText(2) + "\"\n";
   const std::string same = id + "FileName = \"f\"\nSchemaVersion = 3\n";
@@ -207,45 +193,41 @@ TEST(RegistrarChanged, EveryDictionaryAndNothingElse) {
       {"Identifier = \"words\"\nSchemaVersion = 3\n", same, true, S_OK},
       {id + "SchemaVersion = \"\"\n", same, true, S_OK}};
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              for (const Comparison& row : rows) {
-                TempDir dir;
-                WriteBytes(dir / "f.vlr", std::string("[S]\n") + row.fragment);
-                WriteBytes(dir / "d.vlr", std::string("[S]\n") + row.database.value_or(""));
-                CvlIniMgr fragment = CvlIniMgr::OpenForUpdate(dir / "f.vlr");
-                r->database().EraseSection("S");
-                CvlIniMgr wanted = CvlIniMgr::OpenForUpdate(dir / "d.vlr");
-                for (int n = 1; row.database && n <= wanted.GetNumberOfItems("S"); ++n) {
-                  std::string name, value;
-                  wanted.GetNthItemName("S", n, &name);
-                  wanted.GetItem("S", name.c_str(), &value);
-                  r->database().SetItem("S", name.c_str(), value.c_str(), true);
-                }
-                bool changed = !row.changed;
-                EXPECT_EQ(r->HasDDChanged(fragment, L"S", changed), row.result) << row.fragment;
-                EXPECT_EQ(changed, row.changed) << row.fragment;
-              }
-            }),
-            0);
+  LinuxStart r(i);
+  for (const Comparison& row : rows) {
+    TempDir dir;
+    WriteBytes(dir / "f.vlr", std::string("[S]\n") + row.fragment);
+    WriteBytes(dir / "d.vlr", std::string("[S]\n") + row.database.value_or(""));
+    CvlIniMgr fragment = CvlIniMgr::OpenForUpdate(dir / "f.vlr");
+    r->database().EraseSection("S");
+    CvlIniMgr wanted = CvlIniMgr::OpenForUpdate(dir / "d.vlr");
+    for (int n = 1; row.database && n <= wanted.GetNumberOfItems("S"); ++n) {
+      std::string name, value;
+      wanted.GetNthItemName("S", n, &name);
+      wanted.GetItem("S", name.c_str(), &value);
+      r->database().SetItem("S", name.c_str(), value.c_str(), true);
+    }
+    bool changed = !row.changed;
+    EXPECT_EQ(r->HasDDChanged(fragment, L"S", changed), row.result) << row.fragment;
+    EXPECT_EQ(changed, row.changed) << row.fragment;
+  }
 }
 
 // What a child prints while `body` runs.
 std::string Printed(const Installation& i, const std::function<void(OpenLinux&)>& body) {
   TempDir out;
-  EXPECT_EQ(InChild([&] {
-              ASSERT_TRUE(freopen((out / "text").c_str(), "w", stdout));
-              LinuxStart r(i);
-              body(*r);
-              fflush(stdout);
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_TRUE(freopen((out / "text").c_str(), "w", stdout));
+    LinuxStart r(i);
+    body(*r);
+    fflush(stdout);
+  });
   return ReadBytes(out / "text");
 }
 
 void CompareEmptyDictionaries(OpenLinux& r, const std::string& place) {
   WriteBytes(place, "[S]\nSchemaVersion = 3\n");
-  CvlIniMgr fragment = CvlIniMgr::OpenForUpdate(place);
+  CvlIniMgr fragment(place.c_str(), false, nullptr, false, true);
   r.database().SetItem("S", "x", "1", true);
   bool changed = false;
   r.HasDDChanged(fragment, L"S", changed);
@@ -286,70 +268,60 @@ std::string LastFolder(const Installation& i) { return i.root() + "/Data Diction
 TEST(RegistrarPrevious, TheFolderIsMadeOpenToAll) {
   Installation i;
   ScopedUmask mask(077);
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              zt::fnd::Vector<zt::fnd::String> names;
-              EXPECT_EQ(r->GetPrevDictsLastFolder(names), S_FALSE);
-              EXPECT_EQ(names.size(), 0u);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    zt::fnd::Vector<zt::fnd::String> names;
+    EXPECT_EQ(r->GetPrevDictsLastFolder(names), S_FALSE);
+    EXPECT_EQ(names.size(), 0u);
+  });
   EXPECT_EQ(ModeOf(i.root() + "/Data Dictionaries/Last"), 0777);
 }
 
-TEST(RegistrarPrevious, FullPathsAreHandedOut) {
+TEST_IN_CHILD(RegistrarPrevious, FullPathsAreHandedOut) {
   Installation i;
   fs::create_directories(LastFolder(i) + "A.framework");
   fs::create_directories(LastFolder(i) + "other.vle");
   WriteBytes(LastFolder(i) + "B.framework", "");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              unsigned count = 0;
-              wchar_t** paths = nullptr;
-              EXPECT_EQ(r->GetPreviousDictionaries(nullptr, &count, &paths), S_OK);
-              std::vector<std::wstring> found;
-              for (unsigned n = 0; n < count; ++n) {
-                found.push_back(paths[n]);
-                vltFree(paths[n]);
-              }
-              vltFree(paths);
-              std::sort(found.begin(), found.end());
-              EXPECT_EQ(found, (std::vector<std::wstring>{Wide(LastFolder(i) + "A.framework"),
-                                                          Wide(LastFolder(i) + "B.framework")}));
-            }),
-            0);
+  LinuxStart r(i);
+  unsigned count = 0;
+  wchar_t** paths = nullptr;
+  EXPECT_EQ(r->GetPreviousDictionaries(nullptr, &count, &paths), S_OK);
+  std::vector<std::wstring> found;
+  for (unsigned n = 0; n < count; ++n) {
+    found.push_back(paths[n]);
+    vltFree(paths[n]);
+  }
+  vltFree(paths);
+  std::sort(found.begin(), found.end());
+  EXPECT_EQ(found, (std::vector<std::wstring>{Wide(LastFolder(i) + "A.framework"),
+                                              Wide(LastFolder(i) + "B.framework")}));
 }
 
-TEST(RegistrarPrevious, NullOutParametersDoNothing) {
+TEST_IN_CHILD(RegistrarPrevious, NullOutParametersDoNothing) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              unsigned count = 7;
-              wchar_t* mark = nullptr;
-              wchar_t** paths = &mark;
-              EXPECT_EQ(r->GetPreviousDictionaries(nullptr, &count, nullptr), S_OK);
-              EXPECT_EQ(r->GetPreviousDictionaries(nullptr, nullptr, &paths), S_OK);
-              EXPECT_EQ(count, 7u);
-              EXPECT_EQ(paths, &mark);
-              EXPECT_FALSE(Exists(i.root() + "/Data Dictionaries/Last"));
-              EXPECT_EQ(r->GetPreviousDictionaries(nullptr, &count, &paths), S_FALSE);
-              EXPECT_EQ(count, 0u);
-              EXPECT_EQ(paths, &mark);
-            }),
-            0);
+  LinuxStart r(i);
+  unsigned count = 7;
+  wchar_t* mark = nullptr;
+  wchar_t** paths = &mark;
+  EXPECT_EQ(r->GetPreviousDictionaries(nullptr, &count, nullptr), S_OK);
+  EXPECT_EQ(r->GetPreviousDictionaries(nullptr, nullptr, &paths), S_OK);
+  EXPECT_EQ(count, 7u);
+  EXPECT_EQ(paths, &mark);
+  EXPECT_FALSE(Exists(i.root() + "/Data Dictionaries/Last"));
+  EXPECT_EQ(r->GetPreviousDictionaries(nullptr, &count, &paths), S_FALSE);
+  EXPECT_EQ(count, 0u);
+  EXPECT_EQ(paths, &mark);
 }
 
-TEST(RegistrarPrevious, WithoutARootEverythingFails) {
+TEST_IN_CHILD(RegistrarPrevious, WithoutARootEverythingFails) {
   Installation i;
   Installation::setDir("");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              unsigned count = 7;
-              wchar_t** paths = nullptr;
-              EXPECT_EQ(r->GetPreviousDictionaries(nullptr, &count, &paths), E_FAIL);
-              EXPECT_EQ(count, 7u);
-              EXPECT_EQ(r->RemovePreviousDictionaries(nullptr), E_FAIL);
-            }),
-            0);
+  LinuxStart r(i);
+  unsigned count = 7;
+  wchar_t** paths = nullptr;
+  EXPECT_EQ(r->GetPreviousDictionaries(nullptr, &count, &paths), E_FAIL);
+  EXPECT_EQ(count, 7u);
+  EXPECT_EQ(r->RemovePreviousDictionaries(nullptr), E_FAIL);
 }
 
 TEST(RegistrarPrevious, MissingRightsAreAResult) {
@@ -359,13 +331,12 @@ TEST(RegistrarPrevious, MissingRightsAreAResult) {
   chmod(getenv("ZTFNDTMPSHAREDFILEDIR"), 0777);
   ASSERT_EQ(StartOnce(i), 0);
   chmod((i.root() + "/Data Dictionaries").c_str(), 0755);
-  EXPECT_EQ(InChild([&] {
-              ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
-              LinuxStart r(i);
-              zt::fnd::Vector<zt::fnd::String> names;
-              EXPECT_EQ(r->GetPrevDictsLastFolder(names), E_FAIL);
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+    LinuxStart r(i);
+    zt::fnd::Vector<zt::fnd::String> names;
+    EXPECT_EQ(r->GetPrevDictsLastFolder(names), E_FAIL);
+  });
 }
 
 TEST(RegistrarPrevious, RemovalTakesFilesAndThenTheirDatabase) {
@@ -374,11 +345,10 @@ TEST(RegistrarPrevious, RemovalTakesFilesAndThenTheirDatabase) {
   for (const char* name : {"A.framework", "B.framework", "vlt.vlr", "kept.txt"}) {
     WriteBytes(LastFolder(i) + name, "x");
   }
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->RemovePreviousDictionaries(nullptr), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(r->RemovePreviousDictionaries(nullptr), S_OK);
+  });
   EXPECT_FALSE(Exists(LastFolder(i) + "A.framework"));
   EXPECT_FALSE(Exists(LastFolder(i) + "B.framework"));
   EXPECT_FALSE(Exists(LastFolder(i) + "vlt.vlr"));
@@ -389,11 +359,10 @@ TEST(RegistrarPrevious, AnEmptyFolderKeepsItsDatabase) {
   Installation i;
   fs::create_directories(LastFolder(i));
   WriteBytes(LastFolder(i) + "vlt.vlr", "x");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->RemovePreviousDictionaries(nullptr), S_FALSE);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(r->RemovePreviousDictionaries(nullptr), S_FALSE);
+  });
   EXPECT_TRUE(Exists(LastFolder(i) + "vlt.vlr"));
 }
 
@@ -401,11 +370,10 @@ TEST(RegistrarPrevious, AMissingDatabaseIsAFailure) {
   Installation i;
   fs::create_directories(LastFolder(i));
   WriteBytes(LastFolder(i) + "A.framework", "x");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->RemovePreviousDictionaries(nullptr), E_FAIL);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(r->RemovePreviousDictionaries(nullptr), E_FAIL);
+  });
   EXPECT_FALSE(Exists(LastFolder(i) + "A.framework"));
 }
 
@@ -415,11 +383,10 @@ TEST(RegistrarPrevious, ABundleThatIsADirectoryStaysAndTheOthersGo) {
   for (const char* name : {"B.framework", "C.framework", "vlt.vlr"}) {
     WriteBytes(LastFolder(i) + name, "x");
   }
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->RemovePreviousDictionaries(nullptr), E_FAIL);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(r->RemovePreviousDictionaries(nullptr), E_FAIL);
+  });
   EXPECT_TRUE(Exists(LastFolder(i) + "A.framework"));
   EXPECT_FALSE(Exists(LastFolder(i) + "B.framework"));
   EXPECT_FALSE(Exists(LastFolder(i) + "C.framework"));
@@ -449,34 +416,28 @@ TEST(RegistrarPrevious, PortConfigurationOptionsAreRefusedWithAWord) {
   EXPECT_TRUE(Exists(LastFolder(i) + "A.framework"));
 }
 
-TEST(RegistrarPrevious, OtherOptionsDoNotStandInTheWay) {
+TEST_IN_CHILD(RegistrarPrevious, OtherOptionsDoNotStandInTheWay) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              const unsigned char without[8] = {0xFF, 0xFF, 0xFF, 0xFF, 0x7F, 0xFF, 0xFF, 0xFF};
-              auto* options = reinterpret_cast<const _vltStartupOptions*>(without);
-              EXPECT_EQ(r->RemovePreviousDictionaries(options), S_FALSE);
-            }),
-            0);
+  LinuxStart r(i);
+  const unsigned char without[8] = {0xFF, 0xFF, 0xFF, 0xFF, 0x7F, 0xFF, 0xFF, 0xFF};
+  auto* options = reinterpret_cast<const _vltStartupOptions*>(without);
+  EXPECT_EQ(r->RemovePreviousDictionaries(options), S_FALSE);
 }
 
 // ---- Loading test
 
-TEST(RegistrarDictionary, TheLoadingTestSucceedsWhateverLoads) {
+TEST_IN_CHILD(RegistrarDictionary, TheLoadingTestSucceedsWhateverLoads) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   i.addBundle(
       "Data Dictionaries", "N.framework",
       "[KORComponents]\nN = \"N\"\n[N]\nIdentifier = \"" + GText(2) + "\"\nSchemaVersion = 1\n");
   EXPECT_EQ(vltLoadDataDictionaries2(nullptr), E_POINTER);
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Received none;
-              ASSERT_EQ(r->GetComponent(G(2), &none.value), S_OK);
-              EXPECT_EQ(none.value.fileName, nullptr);
-              EXPECT_EQ(vltLoadDataDictionaries2(&*r), S_OK);
-            }),
-            0);
+  LinuxStart r(i);
+  Received none;
+  ASSERT_EQ(r->GetComponent(G(2), &none.value), S_OK);
+  EXPECT_EQ(none.value.fileName, nullptr);
+  EXPECT_EQ(vltLoadDataDictionaries2(&*r), S_OK);
 }
 
 }  // namespace

@@ -42,63 +42,54 @@ void AddThree(Installation& i) {
   }
 }
 
-TEST(RegistrarDurable, AChildThatIsForkedInAScanLeavesTheSecondName) {
+TEST_IN_CHILD(RegistrarDurable, AChildThatIsForkedInAScanLeavesTheSecondName) {
   Installation i;
   AddThree(i);
-  EXPECT_EQ(InChild([&] {
-              pid_t child = -1;
-              Started<Interrupted> r(i, [&] {
-                ASSERT_TRUE(Exists(SecondName(i)));
-                child = fork();
-                if (child == 0) return;
-                int status = -1;
-                EXPECT_EQ(waitpid(child, &status, 0), child);
-                EXPECT_EQ(status, 0);
-                EXPECT_TRUE(Exists(SecondName(i)));
-              });
-              if (child == 0) _exit(0);
-              EXPECT_FALSE(Exists(SecondName(i)));
-            }),
-            0);
+  pid_t child = -1;
+  Started<Interrupted> r(i, [&] {
+    ASSERT_TRUE(Exists(SecondName(i)));
+    child = fork();
+    if (child == 0) return;
+    int status = -1;
+    EXPECT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, 0);
+    EXPECT_TRUE(Exists(SecondName(i)));
+  });
+  if (child == 0) _exit(0);
+  EXPECT_FALSE(Exists(SecondName(i)));
 }
 
-TEST(RegistrarDurable, AScanThatHasLostItsLockLeavesTheSecondName) {
+TEST_IN_CHILD(RegistrarDurable, AScanThatHasLostItsLockLeavesTheSecondName) {
   Installation i;
   AddThree(i);
-  EXPECT_EQ(InChild([&] {
-              Signal held, end;
-              std::unique_ptr<Child> other;
-              {
-                Started<Interrupted> r(i, [&] {
-                  ASSERT_TRUE(Exists(SecondName(i)));
-                  std::filesystem::remove(LockFile(i));
-                  other = std::make_unique<Child>([&] {
-                    IniFileLock lock(IniFileLock::NameForFile(i.database().c_str()));
-                    held.notify();
-                    return end.await() ? 0 : 1;
-                  });
-                  ASSERT_TRUE(held.await());
-                });
-                EXPECT_TRUE(Exists(SecondName(i)));
-              }
-              EXPECT_TRUE(Exists(SecondName(i)));
-              end.notify();
-              EXPECT_EQ(other->wait(), 0);
-            }),
-            0);
+  Signal held, end;
+  std::unique_ptr<Child> other;
+  {
+    Started<Interrupted> r(i, [&] {
+      ASSERT_TRUE(Exists(SecondName(i)));
+      std::filesystem::remove(LockFile(i));
+      other = std::make_unique<Child>([&] {
+        IniFileLock lock(IniFileLock::NameForFile(i.database().c_str()));
+        held.notify();
+        return end.await() ? 0 : 1;
+      });
+      ASSERT_TRUE(held.await());
+    });
+    EXPECT_TRUE(Exists(SecondName(i)));
+  }
+  EXPECT_TRUE(Exists(SecondName(i)));
+  end.notify();
+  EXPECT_EQ(other->wait(), 0);
 }
 
 // While this process had lost the lock another one may have begun a scan, and been killed. A later opening
 // must not prefer what that one has left to what is saved here.
-TEST(RegistrarDurable, ASaveRemovesASecondNameThatAnotherProcessHasLeft) {
+TEST_IN_CHILD(RegistrarDurable, ASaveRemovesASecondNameThatAnotherProcessHasLeft) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              WriteBytes(SecondName(i), ReadBytes(i.database()));
-              EXPECT_EQ(r->SetSchemaVersion(9), S_OK);
-              EXPECT_FALSE(Exists(SecondName(i)));
-            }),
-            0);
+  LinuxStart r(i);
+  WriteBytes(SecondName(i), ReadBytes(i.database()));
+  EXPECT_EQ(r->SetSchemaVersion(9), S_OK);
+  EXPECT_FALSE(Exists(SecondName(i)));
 }
 
 TEST(RegistrarDurable, ADirectoryInItsPlaceRefusesNeitherStartsNorSaves) {
@@ -108,12 +99,11 @@ TEST(RegistrarDurable, ADirectoryInItsPlaceRefusesNeitherStartsNorSaves) {
     ASSERT_EQ(StartOnce(i), 0);
     if (!hasSidecar) unlink(i.sidecar().c_str());
     std::filesystem::create_directories(SecondName(i) + "/inside");
-    EXPECT_EQ(InChild([&] {
-                LinuxStart r(i);
-                EXPECT_EQ(Find(*r, G(1)), S_OK);
-                EXPECT_EQ(r->SetSchemaVersion(9), S_OK);
-              }),
-              0);
+    ExpectInChild([&] {
+      LinuxStart r(i);
+      EXPECT_EQ(Find(*r, G(1)), S_OK);
+      EXPECT_EQ(r->SetSchemaVersion(9), S_OK);
+    });
     EXPECT_TRUE(Exists(SecondName(i) + ".bad/inside"));
   }
 }

@@ -71,240 +71,210 @@ TEST(RegistrarGuidText, BracesAreCutFromTheWholeFormOnly) {
 
 // ---- Interfaces
 
-TEST(RegistrarInterfaces, EachAnswersAndForwardsItsReferences) {
+TEST_IN_CHILD(RegistrarInterfaces, EachAnswersAndForwardsItsReferences) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              void* out = nullptr;
-              for (const GUID& iid : {IID_IUnknown, IID_IvltRegistrar2, IID_IvltRegistrar}) {
-                EXPECT_EQ(r->QueryInterface(iid, &out), S_OK);
-                EXPECT_EQ(out, static_cast<IvltRegistrar2*>(&*r));
-                EXPECT_EQ(r->Release(), 1u);
-              }
-              for (const GUID& iid : {IID_IvltPharlapRegistrarEx, IID_IvltDynamicRegistrar,
-                                      IID_IvltDowngradeRegistrar}) {
-                ASSERT_EQ(r->QueryInterface(iid, &out), S_OK);
-                auto* side = static_cast<IUnknown*>(out);
-                EXPECT_EQ(side->AddRef(), 3u);
-                void* back = nullptr;
-                EXPECT_EQ(side->QueryInterface(IID_IUnknown, &back), S_OK);
-                EXPECT_EQ(back, static_cast<IvltRegistrar2*>(&*r));
-                EXPECT_EQ(r->Release(), 3u);
-                EXPECT_EQ(side->Release(), 2u);
-                EXPECT_EQ(side->Release(), 1u);
-              }
-              EXPECT_EQ(r->QueryInterface(IID_IvltEnumComponent, &out), E_NOINTERFACE);
-              EXPECT_EQ(out, nullptr);
-              EXPECT_EQ(r->QueryInterface(IID_IUnknown, nullptr), E_POINTER);
-            }),
-            0);
+  LinuxStart r(i);
+  void* out = nullptr;
+  for (const GUID& iid : {IID_IUnknown, IID_IvltRegistrar2, IID_IvltRegistrar}) {
+    EXPECT_EQ(r->QueryInterface(iid, &out), S_OK);
+    EXPECT_EQ(out, static_cast<IvltRegistrar2*>(&*r));
+    EXPECT_EQ(r->Release(), 1u);
+  }
+  for (const GUID& iid :
+       {IID_IvltPharlapRegistrarEx, IID_IvltDynamicRegistrar, IID_IvltDowngradeRegistrar}) {
+    ASSERT_EQ(r->QueryInterface(iid, &out), S_OK);
+    auto* side = static_cast<IUnknown*>(out);
+    EXPECT_EQ(side->AddRef(), 3u);
+    void* back = nullptr;
+    EXPECT_EQ(side->QueryInterface(IID_IUnknown, &back), S_OK);
+    EXPECT_EQ(back, static_cast<IvltRegistrar2*>(&*r));
+    EXPECT_EQ(r->Release(), 3u);
+    EXPECT_EQ(side->Release(), 2u);
+    EXPECT_EQ(side->Release(), 1u);
+  }
+  EXPECT_EQ(r->QueryInterface(IID_IvltEnumComponent, &out), E_NOINTERFACE);
+  EXPECT_EQ(out, nullptr);
+  EXPECT_EQ(r->QueryInterface(IID_IUnknown, nullptr), E_POINTER);
 }
 
 // The side interfaces are called through their own tables, which must lead to the registrar's operations.
-TEST(RegistrarInterfaces, SideInterfacesReachTheirOperations) {
+TEST_IN_CHILD(RegistrarInterfaces, SideInterfacesReachTheirOperations) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              void* out = nullptr;
-              ASSERT_EQ(r->QueryInterface(IID_IvltPharlapRegistrarEx, &out), S_OK);
-              EXPECT_EQ(static_cast<IvltPharlapRegistrarEx*>(out)->ResetDDUpdatedFlags(), S_OK);
-              static_cast<IvltPharlapRegistrarEx*>(out)->Release();
-              ASSERT_EQ(r->QueryInterface(IID_IvltDowngradeRegistrar, &out), S_OK);
-              auto* downgrade = static_cast<IvltDowngradeRegistrar*>(out);
-              unsigned count = 5;
-              wchar_t** paths = nullptr;
-              EXPECT_EQ(downgrade->GetPreviousDictionaries(nullptr, &count, &paths), S_FALSE);
-              EXPECT_EQ(count, 0u);
-              EXPECT_EQ(downgrade->RemovePreviousDictionaries(nullptr), S_FALSE);
-              downgrade->Release();
-              EXPECT_EQ(Bound(*r, vltComponentObjectExpert, G(9), VLT_E_NO_COMPONENT).size(), 0u);
-            }),
-            0);
+  LinuxStart r(i);
+  void* out = nullptr;
+  ASSERT_EQ(r->QueryInterface(IID_IvltPharlapRegistrarEx, &out), S_OK);
+  EXPECT_EQ(static_cast<IvltPharlapRegistrarEx*>(out)->ResetDDUpdatedFlags(), S_OK);
+  static_cast<IvltPharlapRegistrarEx*>(out)->Release();
+  ASSERT_EQ(r->QueryInterface(IID_IvltDowngradeRegistrar, &out), S_OK);
+  auto* downgrade = static_cast<IvltDowngradeRegistrar*>(out);
+  unsigned count = 5;
+  wchar_t** paths = nullptr;
+  EXPECT_EQ(downgrade->GetPreviousDictionaries(nullptr, &count, &paths), S_FALSE);
+  EXPECT_EQ(count, 0u);
+  EXPECT_EQ(downgrade->RemovePreviousDictionaries(nullptr), S_FALSE);
+  downgrade->Release();
+  EXPECT_EQ(Bound(*r, vltComponentObjectExpert, G(9), VLT_E_NO_COMPONENT).size(), 0u);
 }
 
-TEST(RegistrarInterfaces, WhatIsNotKeptHereFailsAndTouchesNothing) {
+TEST_IN_CHILD(RegistrarInterfaces, WhatIsNotKeptHereFailsAndTouchesNothing) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              wchar_t here[] = L"x";
-              wchar_t* text = here;
-              unsigned number = 7;
-              EXPECT_EQ(r->GetSDKPath(&text), E_FAIL);
-              EXPECT_EQ(r->GetSDKPath(nullptr), E_FAIL);
-              EXPECT_EQ(r->SetSDKPath(L"/x"), E_FAIL);
-              EXPECT_EQ(r->GetStorageClientCacheSize(&number), E_FAIL);
-              EXPECT_EQ(r->SetStorageClientCacheSize(1), E_FAIL);
-              EXPECT_EQ(r->GetSnapshotPath(&text), E_FAIL);
-              EXPECT_EQ(r->SetSnapshotPath(L"/x"), E_FAIL);
-              EXPECT_EQ(r->UnregisterComponent(kVltdd), E_FAIL);
-              EXPECT_EQ(text, here);
-              EXPECT_EQ(number, 7u);
-              EXPECT_EQ(Find(*r, kVltdd), S_OK);
-            }),
-            0);
+  LinuxStart r(i);
+  wchar_t here[] = L"x";
+  wchar_t* text = here;
+  unsigned number = 7;
+  EXPECT_EQ(r->GetSDKPath(&text), E_FAIL);
+  EXPECT_EQ(r->GetSDKPath(nullptr), E_FAIL);
+  EXPECT_EQ(r->SetSDKPath(L"/x"), E_FAIL);
+  EXPECT_EQ(r->GetStorageClientCacheSize(&number), E_FAIL);
+  EXPECT_EQ(r->SetStorageClientCacheSize(1), E_FAIL);
+  EXPECT_EQ(r->GetSnapshotPath(&text), E_FAIL);
+  EXPECT_EQ(r->SetSnapshotPath(L"/x"), E_FAIL);
+  EXPECT_EQ(r->UnregisterComponent(kVltdd), E_FAIL);
+  EXPECT_EQ(text, here);
+  EXPECT_EQ(number, 7u);
+  EXPECT_EQ(Find(*r, kVltdd), S_OK);
 }
 
 // ---- Settings
 
-TEST(RegistrarSettings, SchemaVersionIsWrittenWhenItDiffersOnly) {
+TEST_IN_CHILD(RegistrarSettings, SchemaVersionIsWrittenWhenItDiffersOnly) {
   Installation i;
   SaveCounter saves(i.root(), "vlt.vlr");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->database().EraseItem("KOR", "SchemaVersion"), S_OK);
-              EXPECT_EQ(r->SaveChanges(), S_OK);
-              EXPECT_FALSE(DatabaseText(i.database()).raw("KOR", "SchemaVersion"));
-              int before = saves.count();
-              EXPECT_EQ(r->SetSchemaVersion(0), S_OK);
-              EXPECT_EQ(saves.count(), before + 1);
-              EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "SchemaVersion"), "0");
-              EXPECT_EQ(r->SetSchemaVersion(0), S_OK);
-              EXPECT_EQ(saves.count(), before + 1);
-              EXPECT_EQ(r->SetSchemaVersion(0xFFFFFFFF), S_OK);
-              EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "SchemaVersion"), "4294967295");
-              unsigned version = 7;
-              EXPECT_EQ(r->GetSchemaVersion(&version), S_OK);
-              EXPECT_EQ(version, 0xFFFFFFFFu);
-              EXPECT_EQ(r->GetSchemaVersion(nullptr), E_POINTER);
-              // Equal as numbers is equal.
-              r->database().SetItem("KOR", "SchemaVersion", "0012", true);
-              before = saves.count();
-              EXPECT_EQ(r->SetSchemaVersion(12), S_OK);
-              EXPECT_EQ(saves.count(), before);
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(r->database().EraseItem("KOR", "SchemaVersion"), S_OK);
+  EXPECT_EQ(r->SaveChanges(), S_OK);
+  EXPECT_FALSE(DatabaseText(i.database()).raw("KOR", "SchemaVersion"));
+  int before = saves.count();
+  EXPECT_EQ(r->SetSchemaVersion(0), S_OK);
+  EXPECT_EQ(saves.count(), before + 1);
+  EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "SchemaVersion"), "0");
+  EXPECT_EQ(r->SetSchemaVersion(0), S_OK);
+  EXPECT_EQ(saves.count(), before + 1);
+  EXPECT_EQ(r->SetSchemaVersion(0xFFFFFFFF), S_OK);
+  EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "SchemaVersion"), "4294967295");
+  unsigned version = 7;
+  EXPECT_EQ(r->GetSchemaVersion(&version), S_OK);
+  EXPECT_EQ(version, 0xFFFFFFFFu);
+  EXPECT_EQ(r->GetSchemaVersion(nullptr), E_POINTER);
+  // Equal as numbers is equal.
+  r->database().SetItem("KOR", "SchemaVersion", "0012", true);
+  before = saves.count();
+  EXPECT_EQ(r->SetSchemaVersion(12), S_OK);
+  EXPECT_EQ(saves.count(), before);
 }
 
-TEST(RegistrarSettings, WhatCannotBeReadIsTheDefault) {
+TEST_IN_CHILD(RegistrarSettings, WhatCannotBeReadIsTheDefault) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              unsigned number = 7;
-              EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
-              EXPECT_EQ(number, 33554432u);
-              EXPECT_EQ(r->GetStorageServerCacheSize(nullptr), E_POINTER);
-              r->database().SetItem("KOR", "CacheSize", "", true);
-              number = 7;
-              EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
-              EXPECT_EQ(number, 33554432u);
-              r->database().SetItem("KOR", "CacheSize", "words", true);
-              EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
-              EXPECT_EQ(number, 0u);
-              r->database().SetItem("KOR", "SchemaVersion", "", true);
-              number = 7;
-              EXPECT_EQ(r->GetSchemaVersion(&number), S_OK);
-              EXPECT_EQ(number, 0u);
-            }),
-            0);
+  LinuxStart r(i);
+  unsigned number = 7;
+  EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
+  EXPECT_EQ(number, 33554432u);
+  EXPECT_EQ(r->GetStorageServerCacheSize(nullptr), E_POINTER);
+  r->database().SetItem("KOR", "CacheSize", "", true);
+  number = 7;
+  EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
+  EXPECT_EQ(number, 33554432u);
+  r->database().SetItem("KOR", "CacheSize", "words", true);
+  EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
+  EXPECT_EQ(number, 0u);
+  r->database().SetItem("KOR", "SchemaVersion", "", true);
+  number = 7;
+  EXPECT_EQ(r->GetSchemaVersion(&number), S_OK);
+  EXPECT_EQ(number, 0u);
 }
 
 TEST(RegistrarSettings, CacheSizeIsWrittenEachTimeAndOutlivesTheProcess) {
   Installation i;
   SaveCounter saves(i.root(), "vlt.vlr");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              int before = saves.count();
-              EXPECT_EQ(r->SetStorageServerCacheSize(4096), S_OK);
-              EXPECT_EQ(r->SetStorageServerCacheSize(4096), S_OK);
-              EXPECT_EQ(saves.count(), before + 2);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    int before = saves.count();
+    EXPECT_EQ(r->SetStorageServerCacheSize(4096), S_OK);
+    EXPECT_EQ(r->SetStorageServerCacheSize(4096), S_OK);
+    EXPECT_EQ(saves.count(), before + 2);
+  });
   EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "CacheSize"), "4096");
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              unsigned number = 0;
-              EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
-              EXPECT_EQ(number, 4096u);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    unsigned number = 0;
+    EXPECT_EQ(r->GetStorageServerCacheSize(&number), S_OK);
+    EXPECT_EQ(number, 4096u);
+  });
 }
 
 TEST(RegistrarSettings, SchemaVersionIsZeroAgainAtEachStart) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->SetSchemaVersion(9), S_OK);
-            }),
-            0);
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              unsigned version = 7;
-              EXPECT_EQ(r->GetSchemaVersion(&version), S_OK);
-              EXPECT_EQ(version, 0u);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(r->SetSchemaVersion(9), S_OK);
+  });
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    unsigned version = 7;
+    EXPECT_EQ(r->GetSchemaVersion(&version), S_OK);
+    EXPECT_EQ(version, 0u);
+  });
 }
 
-TEST(RegistrarSettings, ConfigurationPathForms) {
+TEST_IN_CHILD(RegistrarSettings, ConfigurationPathForms) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              std::wstring data = Wide(i.root()) + L"/Data/";
-              auto get = [&] {
-                wchar_t* path = nullptr;
-                HRESULT result = r->GetConfigurationPath(&path);
-                return Path(result, path);
-              };
-              EXPECT_EQ(get(), data + L"config3.vlt");
-              EXPECT_EQ(r->GetConfigurationPath(nullptr), E_POINTER);
-              EXPECT_EQ(r->SetConfigurationPath(nullptr), E_POINTER);
-              r->database().SetItem("KOR", "ConfigFile", "CONFIG3.VLT", true);
-              EXPECT_EQ(get(), data + L"CONFIG3.VLT");
-              r->database().SetItem("KOR", "ConfigFile", "other.vlt", true);
-              EXPECT_EQ(get(), L"other.vlt");
-              r->database().SetItem("KOR", "ConfigFile", "", true);
-              EXPECT_EQ(get(), L"/Library/Application Support/Zentrex/KOR/Data/config3.vlt");
-              r->database().EraseItem("KOR", "ConfigFile");
-              EXPECT_EQ(get(), L"/Library/Application Support/Zentrex/KOR/Data/config3.vlt");
-              EXPECT_EQ(r->SetConfigurationPath(L"Config3.VLT"), S_OK);
-              EXPECT_EQ(get(), data + L"Config3.VLT");
-            }),
-            0);
+  LinuxStart r(i);
+  std::wstring data = Wide(i.root()) + L"/Data/";
+  auto get = [&] {
+    wchar_t* path = nullptr;
+    HRESULT result = r->GetConfigurationPath(&path);
+    return Path(result, path);
+  };
+  EXPECT_EQ(get(), data + L"config3.vlt");
+  EXPECT_EQ(r->GetConfigurationPath(nullptr), E_POINTER);
+  EXPECT_EQ(r->SetConfigurationPath(nullptr), E_POINTER);
+  r->database().SetItem("KOR", "ConfigFile", "CONFIG3.VLT", true);
+  EXPECT_EQ(get(), data + L"CONFIG3.VLT");
+  r->database().SetItem("KOR", "ConfigFile", "other.vlt", true);
+  EXPECT_EQ(get(), L"other.vlt");
+  r->database().SetItem("KOR", "ConfigFile", "", true);
+  EXPECT_EQ(get(), L"/Library/Application Support/Zentrex/KOR/Data/config3.vlt");
+  r->database().EraseItem("KOR", "ConfigFile");
+  EXPECT_EQ(get(), L"/Library/Application Support/Zentrex/KOR/Data/config3.vlt");
+  EXPECT_EQ(r->SetConfigurationPath(L"Config3.VLT"), S_OK);
+  EXPECT_EQ(get(), data + L"Config3.VLT");
 }
 
-TEST(RegistrarSettings, ConfigurationPathIsWrittenWhenItDiffersBeyondCase) {
+TEST_IN_CHILD(RegistrarSettings, ConfigurationPathIsWrittenWhenItDiffersBeyondCase) {
   Installation i;
   SaveCounter saves(i.root(), "vlt.vlr");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->SetConfigurationPath(L"/A/\"b\"\\c.vlt"), S_OK);
-              int before = saves.count();
-              EXPECT_EQ(r->SetConfigurationPath(L"/a/\"B\"\\C.VLT"), S_OK);
-              EXPECT_EQ(saves.count(), before);
-              EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "ConfigFile"),
-                        R"("/A/\"b\"\\c.vlt")");
-              EXPECT_EQ(r->SetConfigurationPath(L"relative"), S_OK);
-              EXPECT_EQ(saves.count(), before + 1);
-              EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "ConfigFile"), "\"relative\"");
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(r->SetConfigurationPath(L"/A/\"b\"\\c.vlt"), S_OK);
+  int before = saves.count();
+  EXPECT_EQ(r->SetConfigurationPath(L"/a/\"B\"\\C.VLT"), S_OK);
+  EXPECT_EQ(saves.count(), before);
+  EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "ConfigFile"), R"("/A/\"b\"\\c.vlt")");
+  EXPECT_EQ(r->SetConfigurationPath(L"relative"), S_OK);
+  EXPECT_EQ(saves.count(), before + 1);
+  EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "ConfigFile"), "\"relative\"");
 }
 
 // The next start puts its own path back, as the stored one differs from it.
 TEST(RegistrarSettings, ConfigurationPathIsThatOfTheRootAtEachStart) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->SetConfigurationPath(L"/elsewhere"), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(r->SetConfigurationPath(L"/elsewhere"), S_OK);
+  });
   EXPECT_EQ(StartOnce(i), 0);
   EXPECT_EQ(DatabaseText(i.database()).quoted("KOR", "ConfigFile"), i.root() + "/Data/config3.vlt");
 }
 
-TEST(RegistrarSettings, ALongConfigurationPathIsKeptWhole) {
+TEST_IN_CHILD(RegistrarSettings, ALongConfigurationPathIsKeptWhole) {
   Installation i;
   std::wstring path = L"/" + std::wstring(70000, L'p');
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->SetConfigurationPath(path.c_str()), S_OK);
-              wchar_t* got = nullptr;
-              HRESULT result = r->GetConfigurationPath(&got);
-              EXPECT_EQ(Path(result, got), path);
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(r->SetConfigurationPath(path.c_str()), S_OK);
+  wchar_t* got = nullptr;
+  HRESULT result = r->GetConfigurationPath(&got);
+  EXPECT_EQ(Path(result, got), path);
 }
 
 // A bare name in a process that has no right to make the missing data directory.
@@ -314,15 +284,14 @@ TEST(RegistrarSettings, ABareNameIsHandedOutEvenWithAFailure) {
   OpenUp(i);
   ASSERT_EQ(StartOnce(i), 0);
   ASSERT_TRUE(std::filesystem::remove(i.root() + "/Data"));
-  EXPECT_EQ(InChild([&] {
-              ASSERT_EQ(setresuid(kNobody, kNobody, kNobody), 0);
-              LinuxStart r(i);
-              r->database().SetItem("KOR", "ConfigFile", "config3.vlt", true);
-              wchar_t* path = nullptr;
-              HRESULT result = r->GetConfigurationPath(&path);
-              EXPECT_EQ(Path(result, path, E_FAIL), Wide(i.root()) + L"/Data/config3.vlt");
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_EQ(setresuid(kNobody, kNobody, kNobody), 0);
+    LinuxStart r(i);
+    r->database().SetItem("KOR", "ConfigFile", "config3.vlt", true);
+    wchar_t* path = nullptr;
+    HRESULT result = r->GetConfigurationPath(&path);
+    EXPECT_EQ(Path(result, path, E_FAIL), Wide(i.root()) + L"/Data/config3.vlt");
+  });
 }
 
 // ---- Start
@@ -350,7 +319,7 @@ TEST(RegistrarStart, LeavesTheModesOfDirectoriesThatAreThere) {
   }
 }
 
-TEST(RegistrarStart, WritesTheBuiltInDictionary) {
+TEST_IN_CHILD(RegistrarStart, WritesTheBuiltInDictionary) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
   DatabaseText db(i.database());
@@ -363,36 +332,32 @@ TEST(RegistrarStart, WritesTheBuiltInDictionary) {
                                  {"FragmentRegistered", "0"},
                                  {"LastInstalledSchemaVersion", "0"},
                                  {"Prefix", "\"vl\""}}));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Received d;
-              ASSERT_EQ(r->GetComponent(kVltdd, &d.value), S_OK);
-              EXPECT_EQ(d.value.type, vltComponentDataDictionary);
-              EXPECT_EQ(d.value.version, 2u);
-              EXPECT_EQ(d.name(), L"vltdd");
-              EXPECT_EQ(d.file(), Wide(file));
-              EXPECT_EQ(d.prefix(), L"vl");
-              EXPECT_EQ(d.value.dictionary.schemaVersion, 0u);
-              EXPECT_EQ(d.value.dictionary.lastInstalledSchemaVersion, 0u);
-            }),
-            0);
+  LinuxStart r(i);
+  Received d;
+  ASSERT_EQ(r->GetComponent(kVltdd, &d.value), S_OK);
+  EXPECT_EQ(d.value.type, vltComponentDataDictionary);
+  EXPECT_EQ(d.value.version, 2u);
+  EXPECT_EQ(d.name(), L"vltdd");
+  EXPECT_EQ(d.file(), Wide(file));
+  EXPECT_EQ(d.prefix(), L"vl");
+  EXPECT_EQ(d.value.dictionary.schemaVersion, 0u);
+  EXPECT_EQ(d.value.dictionary.lastInstalledSchemaVersion, 0u);
 }
 
 TEST(RegistrarStart, WithoutADirectoryTheNamesStayBare) {
   Installation i;
   Installation::setDir("");
-  EXPECT_EQ(InChild([&] {
-              EXPECT_EQ(GetCurrentVltPath(), nullptr);
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, kVltdd), S_OK);
-              wchar_t* path = nullptr;
-              HRESULT result = r->GetConfigurationPath(&path);
-              EXPECT_EQ(Path(result, path, E_FAIL), L"config3.vlt");
-              CvltPharlapRegistrar::RegistrationFiles files;
-              EXPECT_EQ(r->FindRegistrationFiles(files), E_FAIL);
-              EXPECT_EQ(files.size(), 0u);
-            }),
-            0);
+  ExpectInChild([&] {
+    EXPECT_EQ(GetCurrentVltPath(), nullptr);
+    LinuxStart r(i);
+    EXPECT_EQ(Find(*r, kVltdd), S_OK);
+    wchar_t* path = nullptr;
+    HRESULT result = r->GetConfigurationPath(&path);
+    EXPECT_EQ(Path(result, path, E_FAIL), L"config3.vlt");
+    CvltPharlapRegistrar::RegistrationFiles files;
+    EXPECT_EQ(r->FindRegistrationFiles(files), E_FAIL);
+    EXPECT_EQ(files.size(), 0u);
+  });
   DatabaseText db(i.database());
   EXPECT_EQ(db.quoted("KOR", "ConfigFile"), "config3.vlt");
   EXPECT_EQ(db.quoted("vltdd", "FileName"), "vltdd.framework");
@@ -406,43 +371,36 @@ TEST(RegistrarStart, MissingRightsToMakeDirectoriesAreSwallowed) {
   chmod(i.root().c_str(), 0555);
   TempDir place;
   chmod(place.path().c_str(), 0777);
-  EXPECT_EQ(InChild([&] {
-              ASSERT_EQ(setresuid(kNobody, kNobody, kNobody), 0);
-              Started<OpenLinux> r(S(place / "vlt.vlr"), S(i.root()));
-              EXPECT_EQ(Find(*r, kVltdd), S_OK);
-              CvltPharlapRegistrar::RegistrationFiles files;
-              EXPECT_EQ(r->FindRegistrationFiles(files), E_FAIL);
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_EQ(setresuid(kNobody, kNobody, kNobody), 0);
+    Started<OpenLinux> r(S(place / "vlt.vlr"), S(i.root()));
+    EXPECT_EQ(Find(*r, kVltdd), S_OK);
+    CvltPharlapRegistrar::RegistrationFiles files;
+    EXPECT_EQ(r->FindRegistrationFiles(files), E_FAIL);
+  });
   EXPECT_TRUE(Entries(i.root()).empty());
   EXPECT_EQ(ModeOf(place / "vlt.vlr"), 0777);
 }
 
-TEST(RegistrarStart, AFileInADirectorysPlaceIsRaisedAndFreesTheLock) {
+TEST_IN_CHILD(RegistrarStart, AFileInADirectorysPlaceIsRaisedAndFreesTheLock) {
   Installation i;
   WriteBytes(i.root() + "/Data", "in the way");
-  EXPECT_EQ(InChild([&] {
-              EXPECT_THROW(LinuxStart r(i), zt::fnd::exception::ObjectAlreadyExists);
-              EXPECT_EQ(unlink((i.root() + "/Data").c_str()), 0);
-              LinuxStart again(i);
-              EXPECT_EQ(Find(*again, kVltdd), S_OK);
-            }),
-            0);
+  EXPECT_THROW(LinuxStart r(i), zt::fnd::exception::ObjectAlreadyExists);
+  EXPECT_EQ(unlink((i.root() + "/Data").c_str()), 0);
+  LinuxStart again(i);
+  EXPECT_EQ(Find(*again, kVltdd), S_OK);
 }
 
 // ---- Freeing
 
 // Whether texts are freed shows to the leak check of InChild, and to AddressSanitizer if twice.
-TEST(RegistrarStart, ItsEndFreesTheTextsOfComponentsThatKeepTheirsElsewhere) {
+TEST_IN_CHILD(RegistrarStart, ItsEndFreesTheTextsOfComponentsThatKeepTheirsElsewhere) {
   Installation i;
   i.addResourceExpert("M", "Motion Expert Driver", GText(4), "PNP\\4");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Received found;
-              ASSERT_EQ(r->GetComponent(G(4), &found.value), S_OK);
-              EXPECT_EQ(found.name(), L"Motion Expert Driver");
-            }),
-            0);
+  LinuxStart r(i);
+  Received found;
+  ASSERT_EQ(r->GetComponent(G(4), &found.value), S_OK);
+  EXPECT_EQ(found.name(), L"Motion Expert Driver");
 }
 
 }  // namespace

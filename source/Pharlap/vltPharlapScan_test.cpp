@@ -30,29 +30,26 @@ DatabaseText AfterStart(const Installation& i) {
 
 // ---- Finding
 
-TEST(RegistrarFind, DictionariesComeFirstWithTheirTimesInWholeSeconds) {
+TEST_IN_CHILD(RegistrarFind, DictionariesComeFirstWithTheirTimesInWholeSeconds) {
   Installation i;
   std::string expert = i.addObjectExpert("E", "Exp", GText(2));
   std::string dictionary = i.addDictionary("D", "Dict", GText(1), 3, "d");
   Installation::touch(dictionary, Installation::kInstalled + 5);
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              CvltPharlapRegistrar::RegistrationFiles files;
-              EXPECT_EQ(r->FindRegistrationFiles(files), S_OK);
-              ASSERT_EQ(files.size(), 2u);
-              EXPECT_EQ(files[0].first.exactCompare(S(dictionary)), 0);
-              EXPECT_EQ(files[1].first.exactCompare(S(expert)), 0);
-              auto seconds = [&](int n) {
-                return static_cast<time_t>(files[n].second.toLKTIME(true) / 10000000 - 11644473600);
-              };
-              EXPECT_EQ(seconds(0), Installation::kInstalled + 5);
-              EXPECT_EQ(seconds(1), Installation::kInstalled);
-              EXPECT_EQ(files[1].second.toLKTIME(true) % 10000000, 0);
-            }),
-            0);
+  LinuxStart r(i);
+  CvltPharlapRegistrar::RegistrationFiles files;
+  EXPECT_EQ(r->FindRegistrationFiles(files), S_OK);
+  ASSERT_EQ(files.size(), 2u);
+  EXPECT_EQ(files[0].first.exactCompare(S(dictionary)), 0);
+  EXPECT_EQ(files[1].first.exactCompare(S(expert)), 0);
+  auto seconds = [&](int n) {
+    return static_cast<time_t>(files[n].second.toLKTIME(true) / 10000000 - 11644473600);
+  };
+  EXPECT_EQ(seconds(0), Installation::kInstalled + 5);
+  EXPECT_EQ(seconds(1), Installation::kInstalled);
+  EXPECT_EQ(files[1].second.toLKTIME(true) % 10000000, 0);
 }
 
-TEST(RegistrarFind, BundlesAreListedInTheOrderOfTheDirectory) {
+TEST_IN_CHILD(RegistrarFind, BundlesAreListedInTheOrderOfTheDirectory) {
   Installation i;
   for (int n = 0; n < 20; ++n) {
     i.addObjectExpert("E" + std::to_string(n), "Exp" + std::to_string(n), GText(n));
@@ -61,20 +58,17 @@ TEST(RegistrarFind, BundlesAreListedInTheOrderOfTheDirectory) {
   for (const auto& entry : fs::directory_iterator(i.root() + "/Experts")) {
     order.push_back(entry.path().string() + "/Resources/Info.vlr");
   }
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              CvltPharlapRegistrar::RegistrationFiles files;
-              EXPECT_EQ(r->FindRegistrationFiles(files), S_OK);
-              ASSERT_EQ(files.size(), order.size());
-              for (unsigned n = 0; n < files.size(); ++n) {
-                EXPECT_EQ(files[n].first.exactCompare(S(order[n])), 0);
-              }
-            }),
-            0);
+  LinuxStart r(i);
+  CvltPharlapRegistrar::RegistrationFiles files;
+  EXPECT_EQ(r->FindRegistrationFiles(files), S_OK);
+  ASSERT_EQ(files.size(), order.size());
+  for (unsigned n = 0; n < files.size(); ++n) {
+    EXPECT_EQ(files[n].first.exactCompare(S(order[n])), 0);
+  }
 }
 
 // Masks fold case, the path inside the bundle does not.
-TEST(RegistrarFind, WhatIsNoBundleIsSkipped) {
+TEST_IN_CHILD(RegistrarFind, WhatIsNoBundleIsSkipped) {
   Installation i;
   fs::create_directories(i.root() + "/Experts/empty.vle/Resources");
   fs::create_directories(i.root() + "/Experts/bare.vle");
@@ -87,17 +81,14 @@ TEST(RegistrarFind, WhatIsNoBundleIsSkipped) {
   WriteBytes(i.root() + "/Experts/file.vle", "a plain file");
   WriteBytes(i.root() + "/Experts/half.vle.bak", "");
   std::string found = i.addBundle("Experts", "UPPER.VLE", "[KORComponents]\ne = \"e\"\n");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              CvltPharlapRegistrar::RegistrationFiles files;
-              EXPECT_EQ(r->FindRegistrationFiles(files), S_OK);
-              ASSERT_EQ(files.size(), 1u);
-              EXPECT_EQ(files[0].first.exactCompare(S(found)), 0);
-            }),
-            0);
+  LinuxStart r(i);
+  CvltPharlapRegistrar::RegistrationFiles files;
+  EXPECT_EQ(r->FindRegistrationFiles(files), S_OK);
+  ASSERT_EQ(files.size(), 1u);
+  EXPECT_EQ(files[0].first.exactCompare(S(found)), 0);
 }
 
-TEST(RegistrarFind, BundlesMayBeReachedThroughLinks) {
+TEST_IN_CHILD(RegistrarFind, BundlesMayBeReachedThroughLinks) {
   Installation i;
   TempDir elsewhere;
   fs::create_directories(elsewhere / "real/Resources");
@@ -107,24 +98,18 @@ TEST(RegistrarFind, BundlesMayBeReachedThroughLinks) {
   fs::create_directories(i.root() + "/Experts");
   fs::create_directory_symlink(elsewhere / "real", i.root() + "/Experts/linked.vle");
   fs::create_symlink("missing", i.root() + "/Experts/dangling.vle");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(1)), S_OK);
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(Find(*r, G(1)), S_OK);
 }
 
-TEST(RegistrarFind, LinksThatGoInCirclesAreSkipped) {
+TEST_IN_CHILD(RegistrarFind, LinksThatGoInCirclesAreSkipped) {
   Installation i;
   i.addObjectExpert("E", "Exp", GText(2));
   fs::create_symlink("loop.vle", i.root() + "/Experts/loop.vle");
   fs::create_directories(i.root() + "/Experts/inner.vle/Resources");
   fs::create_symlink("Info.vlr", InfoOf(i, "Experts/inner.vle"));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(2)), S_OK);
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(Find(*r, G(2)), S_OK);
 }
 
 // ---- Merging
@@ -217,7 +202,7 @@ TEST(RegistrarMerge, ADictionaryIsMarkedAsChangedBehindItsItems) {
 }
 
 // The value of the list's item names the component for the contents, its name for the start.
-TEST(RegistrarMerge, ValueAndNameOfTheListServeDifferentEnds) {
+TEST_IN_CHILD(RegistrarMerge, ValueAndNameOfTheListServeDifferentEnds) {
   Installation i;
   i.addBundle("Experts", "E.vle",
               "[korcomponents]\nName = \"Value\"\n[Name]\nIdentifier = \"" + GText(1) +
@@ -226,12 +211,9 @@ TEST(RegistrarMerge, ValueAndNameOfTheListServeDifferentEnds) {
   EXPECT_EQ(db.quoted("KORComponents", "Name"), "Value");
   EXPECT_EQ(db.quoted(kContents, "Value"), InfoOf(i, "Experts/E.vle"));
   EXPECT_FALSE(db.raw(kContents, "Name"));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(1)), S_OK);
-              EXPECT_EQ(Find(*r, G(2)), E_INVALIDARG);
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(Find(*r, G(1)), S_OK);
+  EXPECT_EQ(Find(*r, G(2)), E_INVALIDARG);
 }
 
 TEST(RegistrarMerge, OfTwoFilesWithOneSectionTheLaterWinsKeyByKey) {
@@ -246,16 +228,13 @@ TEST(RegistrarMerge, OfTwoFilesWithOneSectionTheLaterWinsKeyByKey) {
   EXPECT_EQ(db.quoted(kContents, "X"), InfoOf(i, "Experts/E.vle"));
 }
 
-TEST(RegistrarMerge, AFileWithoutSectionsCounts) {
+TEST_IN_CHILD(RegistrarMerge, AFileWithoutSectionsCounts) {
   Installation i;
   std::string file = i.addBundle("Experts", "E.vle", "");
   DatabaseText db = AfterStart(i);
   EXPECT_EQ(db.quoted("Registration", file), Installation::stamp(Installation::kInstalled));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->MergeRegistrationFile(S(i.root() + "/"), file.c_str()), S_OK);
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(r->MergeRegistrationFile(S(i.root() + "/"), file.c_str()), S_OK);
 }
 
 TEST(RegistrarMerge, OpensTheFileUpButNotThroughALink) {

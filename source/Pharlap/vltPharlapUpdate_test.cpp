@@ -45,11 +45,10 @@ TEST(RegistrarUpdate, AnyOtherTimeStampMergesAgain) {
   for (time_t shift : {1, -1, 86400 * 365, -86400 * 365 * 40}) {
     Installation i;
     std::string file = i.addDictionary("D", "Dict", GText(1), 3, "d");
-    EXPECT_EQ(InChild([&] {
-                LinuxStart r(i);
-                EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
-              }),
-              0);
+    ExpectInChild([&] {
+      LinuxStart r(i);
+      EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
+    });
     EXPECT_EQ(DatabaseText(i.database()).raw("Dict", "FragmentRegistered"), "0");
     Installation::touch(file, Installation::kInstalled + shift);
     DatabaseText db = AfterStart(i);
@@ -104,18 +103,17 @@ TEST(RegistrarUpdate, AStampThatCannotBeReadMergesAgain) {
 TEST(RegistrarUpdate, OfAnItemInPiecesOnlyTheLastPieceGoes) {
   Installation i;
   std::string file = i.addObjectExpert("E", "Exp", GText(2));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              CvlIniMgr& db = r->database();
-              std::string head = file.substr(0, 10), tail = file.substr(10);
-              db.EraseItem(kContents, "Exp");
-              db.SetItem(kContents, "Expert Line0002", head.c_str(), true);
-              db.SetItem(kContents, "Expert Line0003", tail.c_str(), true);
-              db.SetItem("Expert", "x", "1", true);
-              Installation::touch(file, Installation::kInstalled + 1);
-              EXPECT_EQ(r->UpdateRegistrationFile(), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    CvlIniMgr& db = r->database();
+    std::string head = file.substr(0, 10), tail = file.substr(10);
+    db.EraseItem(kContents, "Exp");
+    db.SetItem(kContents, "Expert Line0002", head.c_str(), true);
+    db.SetItem(kContents, "Expert Line0003", tail.c_str(), true);
+    db.SetItem("Expert", "x", "1", true);
+    Installation::touch(file, Installation::kInstalled + 1);
+    EXPECT_EQ(r->UpdateRegistrationFile(), S_OK);
+  });
   DatabaseText db(i.database());
   EXPECT_TRUE(db.raw(kContents, "Expert Line0002"));
   EXPECT_FALSE(db.raw(kContents, "Expert Line0003"));
@@ -164,16 +162,15 @@ TEST(RegistrarRemove, AVanishedFileTakesItsComponentsInMemoryAndTheDiskFollowsWi
   std::string gone = i.addObjectExpert("F", "Gone", GText(3));
   ASSERT_EQ(StartOnce(i), 0);
   i.removeBundle("Experts", "F.vle");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(3)), E_INVALIDARG);
-              EXPECT_EQ(Find(*r, G(2)), S_OK);
-              DatabaseText disk(i.database());
-              EXPECT_TRUE(disk.has("Gone"));
-              EXPECT_TRUE(disk.raw("Registration", gone));
-              EXPECT_EQ(r->SaveChanges(), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(Find(*r, G(3)), E_INVALIDARG);
+    EXPECT_EQ(Find(*r, G(2)), S_OK);
+    DatabaseText disk(i.database());
+    EXPECT_TRUE(disk.has("Gone"));
+    EXPECT_TRUE(disk.raw("Registration", gone));
+    EXPECT_EQ(r->SaveChanges(), S_OK);
+  });
   DatabaseText db(i.database());
   EXPECT_FALSE(db.has("Gone"));
   EXPECT_FALSE(db.raw("KORComponents", "Gone"));
@@ -195,17 +192,14 @@ TEST(RegistrarRemove, AStartWithNothingElseChangedLeavesItOnTheDiskForGood) {
   EXPECT_EQ(ReadBytes(i.database()), before);
 }
 
-TEST(RegistrarRemove, ABundleWithoutItsFileHasGone) {
+TEST_IN_CHILD(RegistrarRemove, ABundleWithoutItsFileHasGone) {
   Installation i;
   std::string file = i.addDictionary("a", "Dict", GText(1), 3, "d");
   ASSERT_EQ(StartOnce(i), 0);
   unlink(file.c_str());
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(1)), E_INVALIDARG);
-              EXPECT_EQ(Find(*r, kVltdd), S_OK);
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(Find(*r, G(1)), E_INVALIDARG);
+  EXPECT_EQ(Find(*r, kVltdd), S_OK);
 }
 
 TEST(RegistrarRemove, AFileOrALoopInTheBundlesPlaceCountsAsGone) {
@@ -220,13 +214,12 @@ TEST(RegistrarRemove, AFileOrALoopInTheBundlesPlaceCountsAsGone) {
     } else {
       WriteBytes(bundle, "a plain file");
     }
-    EXPECT_EQ(InChild([&] {
-                LinuxStart r(i);
-                EXPECT_EQ(Find(*r, G(1)), E_INVALIDARG);
-                EXPECT_EQ(Find(*r, kVltdd), S_OK);
-              }),
-              0)
-        << loop;
+    SCOPED_TRACE(loop);
+    ExpectInChild([&] {
+      LinuxStart r(i);
+      EXPECT_EQ(Find(*r, G(1)), E_INVALIDARG);
+      EXPECT_EQ(Find(*r, kVltdd), S_OK);
+    });
   }
 }
 
@@ -237,59 +230,52 @@ TEST(RegistrarRemove, TheRegistrationFileDecidesNotTheComponents) {
               "[KORComponents]\nE = \"E\"\n[E]\nIdentifier = \"" + GText(1) +
                   "\"\nFileName = \"/nowhere/E.vle\"\n");
   for (int start = 0; start < 2; ++start) {
-    EXPECT_EQ(InChild([&] {
-                LinuxStart r(i);
-                EXPECT_EQ(Find(*r, G(1)), S_OK);
-              }),
-              0);
+    ExpectInChild([&] {
+      LinuxStart r(i);
+      EXPECT_EQ(Find(*r, G(1)), S_OK);
+    });
   }
 }
 
-TEST(RegistrarRemove, ErasesBothNamesOfTheFileAndListsEachPiece) {
+TEST_IN_CHILD(RegistrarRemove, ErasesBothNamesOfTheFileAndListsEachPiece) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              CvlIniMgr& db = r->database();
-              db.SetItem("C", "x", "1", true);
-              db.SetItem("KORComponents", "C", "C", true);
-              db.SetItem("Registration", "Info.vlr", "1 2", true);
-              db.SetItem("Registration", "/gone/Info.vlr", "1 2", true);
-              db.SetItem("Registration", "back.vlr", "1 2", true);
-              db.SetItem(kContents, "first Line0002", "/gone/", true);
-              db.SetItem(kContents, "first Line0003", "x", true);
-              zt::fnd::Vector<zt::fnd::String> list;
-              char section[] = "C", file[] = "/gone/Info.vlr", back[] = "/gone/a\\back.vlr";
-              r->RemoveComponentsIfFileDoesNotExist(section, file, list, 0, 1);
-              ASSERT_EQ(list.size(), 2u);
-              EXPECT_EQ(list[0].exactCompare(L"first Line0002"), 0);
-              EXPECT_EQ(list[1].exactCompare(L"first Line0003"), 0);
-              EXPECT_LT(db.SectionExists("C"), 0);
-              EXPECT_LT(db.ItemExists("KORComponents", "C"), 0);
-              EXPECT_LT(db.ItemExists("Registration", "Info.vlr"), 0);
-              EXPECT_LT(db.ItemExists("Registration", "/gone/Info.vlr"), 0);
-              // Behind the last backslash, if there is one.
-              EXPECT_GE(db.ItemExists("Registration", "back.vlr"), 0);
-              r->RemoveComponentsIfFileDoesNotExist(section, back, list, 0, 0);
-              EXPECT_LT(db.ItemExists("Registration", "back.vlr"), 0);
-              EXPECT_EQ(r->RemoveDeletedComponents(), S_OK);
-              EXPECT_EQ(db.GetNumberOfItems(kContents), 0);
-            }),
-            0);
+  LinuxStart r(i);
+  CvlIniMgr& db = r->database();
+  db.SetItem("C", "x", "1", true);
+  db.SetItem("KORComponents", "C", "C", true);
+  db.SetItem("Registration", "Info.vlr", "1 2", true);
+  db.SetItem("Registration", "/gone/Info.vlr", "1 2", true);
+  db.SetItem("Registration", "back.vlr", "1 2", true);
+  db.SetItem(kContents, "first Line0002", "/gone/", true);
+  db.SetItem(kContents, "first Line0003", "x", true);
+  zt::fnd::Vector<zt::fnd::String> list;
+  char section[] = "C", file[] = "/gone/Info.vlr", back[] = "/gone/a\\back.vlr";
+  r->RemoveComponentsIfFileDoesNotExist(section, file, list, 0, 1);
+  ASSERT_EQ(list.size(), 2u);
+  EXPECT_EQ(list[0].exactCompare(L"first Line0002"), 0);
+  EXPECT_EQ(list[1].exactCompare(L"first Line0003"), 0);
+  EXPECT_LT(db.SectionExists("C"), 0);
+  EXPECT_LT(db.ItemExists("KORComponents", "C"), 0);
+  EXPECT_LT(db.ItemExists("Registration", "Info.vlr"), 0);
+  EXPECT_LT(db.ItemExists("Registration", "/gone/Info.vlr"), 0);
+  // Behind the last backslash, if there is one.
+  EXPECT_GE(db.ItemExists("Registration", "back.vlr"), 0);
+  r->RemoveComponentsIfFileDoesNotExist(section, back, list, 0, 0);
+  EXPECT_LT(db.ItemExists("Registration", "back.vlr"), 0);
+  EXPECT_EQ(r->RemoveDeletedComponents(), S_OK);
+  EXPECT_EQ(db.GetNumberOfItems(kContents), 0);
 }
 
-TEST(RegistrarRemove, AnExistingFileLeavesEverything) {
+TEST_IN_CHILD(RegistrarRemove, AnExistingFileLeavesEverything) {
   Installation i;
   std::string file = i.addObjectExpert("E", "Exp", GText(2));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              zt::fnd::Vector<zt::fnd::String> list;
-              char section[] = "Exp";
-              r->RemoveComponentsIfFileDoesNotExist(section, std::string(file).data(), list, 0, 0);
-              EXPECT_EQ(list.size(), 0u);
-              EXPECT_GE(r->database().SectionExists("Exp"), 0);
-              EXPECT_EQ(r->RemoveDeletedComponents(), S_OK);
-            }),
-            0);
+  LinuxStart r(i);
+  zt::fnd::Vector<zt::fnd::String> list;
+  char section[] = "Exp";
+  r->RemoveComponentsIfFileDoesNotExist(section, std::string(file).data(), list, 0, 0);
+  EXPECT_EQ(list.size(), 0u);
+  EXPECT_GE(r->database().SectionExists("Exp"), 0);
+  EXPECT_EQ(r->RemoveDeletedComponents(), S_OK);
 }
 
 // ---- Files that cannot be used
@@ -300,12 +286,11 @@ TEST(RegistrarUnreadable, AFileThatCannotBeParsedIsSetAsideWithItsComponents) {
   ASSERT_EQ(StartOnce(i), 0);
   WriteBytes(file, std::string("\xFF\xFE[\0", 4));
   Installation::touch(file, Installation::kInstalled + 1);
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(2)), E_INVALIDARG);
-              EXPECT_EQ(Find(*r, kVltdd), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(Find(*r, G(2)), E_INVALIDARG);
+    EXPECT_EQ(Find(*r, kVltdd), S_OK);
+  });
   EXPECT_FALSE(Exists(file));
   int beside = 0;
   for (const auto& entry : fs::directory_iterator(fs::path(file).parent_path())) {
@@ -326,22 +311,20 @@ TEST(RegistrarUnreadable, WhatCannotBeOpenedJustNowStaysAndIsTriedAgain) {
   std::string file = i.addObjectExpert("E", "Exp", GText(2));
   i.addObjectExpert("F", "Other", GText(3));
   chmod(file.c_str(), 0);
-  EXPECT_EQ(InChild([&] {
-              ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(2)), E_INVALIDARG);
-              EXPECT_EQ(Find(*r, G(3)), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+    LinuxStart r(i);
+    EXPECT_EQ(Find(*r, G(2)), E_INVALIDARG);
+    EXPECT_EQ(Find(*r, G(3)), S_OK);
+  });
   EXPECT_EQ(ModeOf(file), 0);
   EXPECT_FALSE(DatabaseText(i.database()).raw("Registration", file));
   chmod(file.c_str(), 0644);
-  EXPECT_EQ(InChild([&] {
-              ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(2)), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+    LinuxStart r(i);
+    EXPECT_EQ(Find(*r, G(2)), S_OK);
+  });
 }
 
 }  // namespace

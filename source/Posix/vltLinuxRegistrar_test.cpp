@@ -29,85 +29,68 @@ std::string TwoExperts(const std::string& first, const std::string& second) {
 
 // ---- Filling the maps
 
-TEST(RegistrarBinding, ClassesOfBothTypesAnswerByType) {
+TEST_IN_CHILD(RegistrarBinding, ClassesOfBothTypesAnswerByType) {
   Installation i;
   i.addObjectExpert("O", "Obj", GText(1), B(1) + ":2:" + B(8) + ":" + B(9));
   i.addResourceExpert("R", "Res", GText(2), "PNP", B(2) + ":1:" + B(8));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(8)), {G(1)}));
-              EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(9)), {G(1)}));
-              EXPECT_TRUE(Same(Bound(*r, vltComponentResourceExpert, G(8)), {G(2)}));
-              Bound(*r, vltComponentResourceExpert, G(9), VLT_E_NO_COMPONENT);
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(8)), {G(1)}));
+  EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(9)), {G(1)}));
+  EXPECT_TRUE(Same(Bound(*r, vltComponentResourceExpert, G(8)), {G(2)}));
+  Bound(*r, vltComponentResourceExpert, G(9), VLT_E_NO_COMPONENT);
 }
 
-TEST(RegistrarBinding, AClassOfTwoExpertsAnswersWithBoth) {
+TEST_IN_CHILD(RegistrarBinding, AClassOfTwoExpertsAnswersWithBoth) {
   Installation i;
   i.addObjectExpert("O", "Obj", GText(1), B(1) + ":1:" + B(8));
   i.addObjectExpert("P", "Obj2", GText(2), B(2) + ":1:" + B(8));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              std::vector<GUID> found = Bound(*r, vltComponentObjectExpert, G(8));
-              std::sort(found.begin(), found.end());
-              EXPECT_TRUE(Same(found, {G(1), G(2)}));
-            }),
-            0);
+  LinuxStart r(i);
+  std::vector<GUID> found = Bound(*r, vltComponentObjectExpert, G(8));
+  std::sort(found.begin(), found.end());
+  EXPECT_TRUE(Same(found, {G(1), G(2)}));
 }
 
-TEST(RegistrarBinding, OtherTypesAndNullsAreToldApart) {
+TEST_IN_CHILD(RegistrarBinding, OtherTypesAndNullsAreToldApart) {
   Installation i;
-  EXPECT_EQ(
-      InChild([&] {
-        LinuxStart r(i);
-        for (int type : {0, 2, 6, 7, 99}) {
-          unsigned count = 7;
-          GUID* components = reinterpret_cast<GUID*>(&count);
-          EXPECT_EQ(r->GetComponentsForBindingClass(static_cast<_vltComponentType>(type), G(8),
-                                                    &count, &components),
-                    static_cast<HRESULT>(0x80040306));
-          EXPECT_EQ(count, 0u);
-          EXPECT_EQ(components, nullptr);
-        }
-        unsigned count = 7;
-        GUID* components = nullptr;
-        EXPECT_EQ(
-            r->GetComponentsForBindingClass(vltComponentObjectExpert, G(8), nullptr, &components),
+  LinuxStart r(i);
+  for (int type : {0, 2, 6, 7, 99}) {
+    unsigned count = 7;
+    GUID* components = reinterpret_cast<GUID*>(&count);
+    EXPECT_EQ(r->GetComponentsForBindingClass(static_cast<_vltComponentType>(type), G(8), &count,
+                                              &components),
+              static_cast<HRESULT>(0x80040306));
+    EXPECT_EQ(count, 0u);
+    EXPECT_EQ(components, nullptr);
+  }
+  unsigned count = 7;
+  GUID* components = nullptr;
+  EXPECT_EQ(r->GetComponentsForBindingClass(vltComponentObjectExpert, G(8), nullptr, &components),
             E_POINTER);
-        EXPECT_EQ(r->GetComponentsForBindingClass(vltComponentObjectExpert, G(8), &count, nullptr),
-                  E_POINTER);
-        EXPECT_EQ(count, 7u);
-      }),
-      0);
+  EXPECT_EQ(r->GetComponentsForBindingClass(vltComponentObjectExpert, G(8), &count, nullptr),
+            E_POINTER);
+  EXPECT_EQ(count, 7u);
 }
 
-TEST(RegistrarBinding, TwoExpertsOfOneFileShareOneTable) {
+TEST_IN_CHILD(RegistrarBinding, TwoExpertsOfOneFileShareOneTable) {
   Installation i;
   i.addBundle("Experts", "One.vle", TwoExperts(B(1) + ":1:" + B(8), B(2) + ":1:" + B(9)));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->m_bindingClassesByFile.size(), 1u);
-              EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(8)), {G(1)}));
-              EXPECT_TRUE(Same(Bound(*r, vltComponentResourceExpert, G(9)), {G(2)}));
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(r->m_bindingClassesByFile.size(), 1u);
+  EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(8)), {G(1)}));
+  EXPECT_TRUE(Same(Bound(*r, vltComponentResourceExpert, G(9)), {G(2)}));
 }
 
-TEST(RegistrarBinding, TheTextOfOneComponentMaySpeakForAnother) {
+TEST_IN_CHILD(RegistrarBinding, TheTextOfOneComponentMaySpeakForAnother) {
   Installation i;
   i.addBundle("Experts", "One.vle",
               TwoExperts("", B(2) + ":1:" + B(9) + ":" + B(1) + ":1:" + B(8)));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(8)), {G(1)}));
-              EXPECT_TRUE(Same(Bound(*r, vltComponentResourceExpert, G(9)), {G(2)}));
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(8)), {G(1)}));
+  EXPECT_TRUE(Same(Bound(*r, vltComponentResourceExpert, G(9)), {G(2)}));
 }
 
 // By base name, over all components: another directory makes another table of the same text.
-TEST(RegistrarBinding, TextsAreFoundByBaseName) {
+TEST_IN_CHILD(RegistrarBinding, TextsAreFoundByBaseName) {
   Installation i;
   i.addBundle("Experts", "a.vle",
               "[KORComponents]\nA = \"A\"\n[A]\nIdentifier = \"" + GText(1) +
@@ -116,77 +99,64 @@ TEST(RegistrarBinding, TextsAreFoundByBaseName) {
               "[KORComponents]\nB = \"B\"\n[B]\nIdentifier = \"" + GText(2) +
                   "\"\nFileName = \"/two/x.VLE\"\nBINDING_CLASSES = \"" + B(1) + ":1:" + B(8) +
                   "\"\n");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(r->m_bindingClassesByFile.size(), 2u);
-              EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(8)), {G(1)}));
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(r->m_bindingClassesByFile.size(), 2u);
+  EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(8)), {G(1)}));
 }
 
-TEST(RegistrarBinding, AComponentOutsideItsFilesTableEntersNothing) {
+TEST_IN_CHILD(RegistrarBinding, AComponentOutsideItsFilesTableEntersNothing) {
   Installation i;
   i.addObjectExpert("O", "Obj", GText(1), B(5) + ":1:" + B(8));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(1)), S_OK);
-              EXPECT_EQ(r->m_bindingClassesByFile.size(), 1u);
-              Bound(*r, vltComponentObjectExpert, G(8), VLT_E_NO_COMPONENT);
-              Offered o(vltComponentObjectExpert, L"Obj", G(1), Wide(i.root()) + L"/Experts/O.vle");
-              EXPECT_EQ(r->PopulateBindingClasses(&o.value), S_OK);
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(Find(*r, G(1)), S_OK);
+  EXPECT_EQ(r->m_bindingClassesByFile.size(), 1u);
+  Bound(*r, vltComponentObjectExpert, G(8), VLT_E_NO_COMPONENT);
+  Offered o(vltComponentObjectExpert, L"Obj", G(1), Wide(i.root()) + L"/Experts/O.vle");
+  EXPECT_EQ(r->PopulateBindingClasses(&o.value), S_OK);
 }
 
-TEST(RegistrarBinding, WithoutATextAnExpertIsAnExpert) {
+TEST_IN_CHILD(RegistrarBinding, WithoutATextAnExpertIsAnExpert) {
   Installation i;
   i.addBundle("Experts", "O.vle",
               "[KORComponents]\nObj = \"Obj\"\n[Obj]\nIdentifier = \"" + GText(1) +
                   "\"\nFileName = \"O\"\nBINDING_CLASSES = \"\"\n");
   i.addObjectExpert("P", "Plain", GText(2));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(1)), S_OK);
-              EXPECT_EQ(Find(*r, G(2)), S_OK);
-              EXPECT_TRUE(r->m_bindingClassesByFile.empty());
-              Offered o(vltComponentObjectExpert, L"Obj", G(1), Wide(i.root()) + L"/Experts/O.vle");
-              EXPECT_EQ(r->PopulateBindingClasses(&o.value), E_FAIL);
-              o.value.fileName = nullptr;
-              EXPECT_EQ(r->PopulateBindingClasses(&o.value), E_FAIL);
-            }),
-            0);
+  LinuxStart r(i);
+  EXPECT_EQ(Find(*r, G(1)), S_OK);
+  EXPECT_EQ(Find(*r, G(2)), S_OK);
+  EXPECT_TRUE(r->m_bindingClassesByFile.empty());
+  Offered o(vltComponentObjectExpert, L"Obj", G(1), Wide(i.root()) + L"/Experts/O.vle");
+  EXPECT_EQ(r->PopulateBindingClasses(&o.value), E_FAIL);
+  o.value.fileName = nullptr;
+  EXPECT_EQ(r->PopulateBindingClasses(&o.value), E_FAIL);
 }
 
 // The text is cut at 1023 bytes, in the middle of a GUID: what is whole counts.
-TEST(RegistrarBinding, ATextBeyondItsLimitIsCut) {
+TEST_IN_CHILD(RegistrarBinding, ATextBeyondItsLimitIsCut) {
   Installation i;
   std::string text = B(1) + ":60";
   for (uint32_t n = 100; n < 160; ++n) text += ":" + B(n);
   i.addObjectExpert("O", "Obj", GText(1), text);
   size_t whole = (1023 - (B(1) + ":60").size()) / (B(1).size() + 1);
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              for (uint32_t n = 100; n < 160; ++n) {
-                bool kept = n - 100 < whole;
-                Bound(*r, vltComponentObjectExpert, G(n), kept ? S_OK : VLT_E_NO_COMPONENT);
-              }
-              EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, GUID_NULL), {G(1)}));
-            }),
-            0);
+  LinuxStart r(i);
+  for (uint32_t n = 100; n < 160; ++n) {
+    bool kept = n - 100 < whole;
+    Bound(*r, vltComponentObjectExpert, G(n), kept ? S_OK : VLT_E_NO_COMPONENT);
+  }
+  EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, GUID_NULL), {G(1)}));
 }
 
 // ---- Registration
 
 TEST(RegistrarBinding, RegistrationKeepsTheBracesAndWritesNoClassesOfAnUnknownFile) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Offered o(vltComponentObjectExpert, L"Obj", G(1), L"/x/O.vle");
-              Offered p(vltComponentResourceExpert, L"Res", G(2), L"/x/R.vle", L"pnp");
-              EXPECT_EQ(r->RegisterComponent(&o.value), S_OK);
-              EXPECT_EQ(r->RegisterComponent(&p.value), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    Offered o(vltComponentObjectExpert, L"Obj", G(1), L"/x/O.vle");
+    Offered p(vltComponentResourceExpert, L"Res", G(2), L"/x/R.vle", L"pnp");
+    EXPECT_EQ(r->RegisterComponent(&o.value), S_OK);
+    EXPECT_EQ(r->RegisterComponent(&p.value), S_OK);
+  });
   DatabaseText db(i.database());
   EXPECT_EQ(db.items("Obj"),
             (DatabaseText::Items{{"Identifier", "\"" + B(1) + "\""}, {"FileName", "\"O.vle\""}}));
@@ -200,13 +170,12 @@ TEST(RegistrarBinding, RegistrationRepeatsTheClassAtTheComponentsPosition) {
   // The second component of the table, in GUID order: position 1 of its three classes.
   std::string table = B(1) + ":1:" + B(7) + ":" + B(2) + ":3:" + B(10) + ":" + B(11) + ":" + B(12);
   i.addResourceExpert("One", "Res", GText(2), "p", table);
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Offered o(vltComponentResourceExpert, L"Again", G(2),
-                        Wide(i.root()) + L"/Experts/One.vle", L"pnp");
-              EXPECT_EQ(r->RegisterComponent(&o.value), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    Offered o(vltComponentResourceExpert, L"Again", G(2), Wide(i.root()) + L"/Experts/One.vle",
+              L"pnp");
+    EXPECT_EQ(r->RegisterComponent(&o.value), S_OK);
+  });
   EXPECT_EQ(DatabaseText(i.database()).items("Again"),
             (DatabaseText::Items{{"Identifier", "\"" + B(2) + "\""},
                                  {"FileName", "\"One.vle\""},
@@ -218,18 +187,16 @@ TEST(RegistrarBinding, RegistrationRepeatsTheClassAtTheComponentsPosition) {
 TEST(RegistrarBinding, APositionBeyondTheClassesIsRaisedAndTheDatabaseStaysUsable) {
   Installation i;
   i.addObjectExpert("One", "Obj", GText(2), B(1) + ":0:" + B(2) + ":1:" + B(7));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Offered o(vltComponentObjectExpert, L"Obj", G(2),
-                        Wide(i.root()) + L"/Experts/One.vle");
-              EXPECT_THROW(r->RegisterComponent(&o.value), zt::fnd::exception::OutOfRange);
-              EXPECT_EQ(DatabaseText(i.database()).quoted("Obj", "Identifier"), GText(2));
-              Received known;
-              ASSERT_EQ(r->GetComponent(G(2), &known.value), S_OK);
-              EXPECT_EQ(known.file(), Wide(i.root()) + L"/Experts/One.vle");
-              EXPECT_EQ(r->SetStorageServerCacheSize(5), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    Offered o(vltComponentObjectExpert, L"Obj", G(2), Wide(i.root()) + L"/Experts/One.vle");
+    EXPECT_THROW(r->RegisterComponent(&o.value), zt::fnd::exception::OutOfRange);
+    EXPECT_EQ(DatabaseText(i.database()).quoted("Obj", "Identifier"), GText(2));
+    Received known;
+    ASSERT_EQ(r->GetComponent(G(2), &known.value), S_OK);
+    EXPECT_EQ(known.file(), Wide(i.root()) + L"/Experts/One.vle");
+    EXPECT_EQ(r->SetStorageServerCacheSize(5), S_OK);
+  });
   // The items before the classes were set, and went out with the next save.
   DatabaseText db(i.database());
   EXPECT_EQ(db.raw("KOR", "CacheSize"), "5");
@@ -239,23 +206,20 @@ TEST(RegistrarBinding, APositionBeyondTheClassesIsRaisedAndTheDatabaseStaysUsabl
                            {"FileName", "\"One.vle\""},
                            {"BINDING_CLASSES", "\"" + B(1) + ":0:" + B(2) + ":1:" + B(7) + "\""}}));
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_EQ(Find(*r, G(2)), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_EQ(Find(*r, G(2)), S_OK);
+  });
 }
 
 TEST(RegistrarBinding, AComponentWithoutClassesIsWrittenWithItsCount) {
   Installation i;
   i.addObjectExpert("One", "Obj", GText(2), B(1) + ":0:" + B(2) + ":0");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Offered o(vltComponentObjectExpert, L"Obj", G(2),
-                        Wide(i.root()) + L"/Experts/One.vle");
-              EXPECT_EQ(r->RegisterComponent(&o.value), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    Offered o(vltComponentObjectExpert, L"Obj", G(2), Wide(i.root()) + L"/Experts/One.vle");
+    EXPECT_EQ(r->RegisterComponent(&o.value), S_OK);
+  });
   EXPECT_EQ(DatabaseText(i.database()).quoted("Obj", "BINDING_CLASSES"), B(2) + ":0");
 }
 
@@ -263,16 +227,14 @@ TEST(RegistrarBinding, AComponentWithoutClassesIsWrittenWithItsCount) {
 TEST(RegistrarBinding, RegistrationLooksTheFileUpAsItIsGiven) {
   Installation i;
   i.addObjectExpert("One", "Obj", GText(2), B(2) + ":1:" + B(7));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              for (const std::wstring& file :
-                   {std::wstring(L"One.vle"), Wide(i.root()) + L"/Experts/ONE.vle",
-                    Wide(i.root()) + L"/Experts//One.vle"}) {
-                Offered o(vltComponentObjectExpert, L"New", G(2), file);
-                EXPECT_EQ(r->RegisterComponent(&o.value), S_OK);
-              }
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    for (const std::wstring& file : {std::wstring(L"One.vle"), Wide(i.root()) + L"/Experts/ONE.vle",
+                                     Wide(i.root()) + L"/Experts//One.vle"}) {
+      Offered o(vltComponentObjectExpert, L"New", G(2), file);
+      EXPECT_EQ(r->RegisterComponent(&o.value), S_OK);
+    }
+  });
   EXPECT_FALSE(DatabaseText(i.database()).raw("New", "BINDING_CLASSES"));
 }
 
@@ -280,19 +242,16 @@ TEST(RegistrarBinding, RegistrationLooksTheFileUpAsItIsGiven) {
 TEST(RegistrarBinding, TheStartAfterARegistrationFindsTheClassesAgain) {
   Installation i;
   i.addObjectExpert("One", "Obj", GText(2), B(2) + ":1:" + B(7));
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              Offered o(vltComponentObjectExpert, L"Obj", G(2),
-                        Wide(i.root()) + L"/Experts/One.vle");
-              EXPECT_EQ(r->RegisterComponent(&o.value), S_OK);
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    Offered o(vltComponentObjectExpert, L"Obj", G(2), Wide(i.root()) + L"/Experts/One.vle");
+    EXPECT_EQ(r->RegisterComponent(&o.value), S_OK);
+  });
   EXPECT_EQ(DatabaseText(i.database()).quoted("Obj", "FileName"), "One.vle");
-  EXPECT_EQ(InChild([&] {
-              LinuxStart r(i);
-              EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(7)), {G(2)}));
-            }),
-            0);
+  ExpectInChild([&] {
+    LinuxStart r(i);
+    EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(7)), {G(2)}));
+  });
 }
 
 }  // namespace

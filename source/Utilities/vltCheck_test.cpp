@@ -13,7 +13,7 @@
 #include "source/Common/vltcmn.h"
 #include "source/Utilities/vltutils.h"
 #include "source/vltRegistrar.h"
-#include "tests/support/Child.h"
+#include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
 
 namespace {
@@ -197,9 +197,7 @@ Messages Drain(IEnumString* list) {
   return texts;
 }
 
-int InChild(const std::function<int()>& body) { return Child(body).wait(); }
-
-TEST(CheckExport, AllComponentsOfARealTree) {
+TEST_IN_CHILD(CheckExport, AllComponentsOfARealTree) {
   Installation installation;
   std::string good = installation.root() + "/good.so";
   MakeLibrary(good, "vltCreateObjectExpert");
@@ -210,60 +208,49 @@ TEST(CheckExport, AllComponentsOfARealTree) {
   installation.addObjectExpert("b", "Bundle", "00000002-0000-0000-0000-000000000000");
   installation.addResourceExpert("c", "Ports", "00000003-0000-0000-0000-000000000000", "PNP");
   std::string root = installation.root();
-  EXPECT_EQ(InChild([&] {
-              IEnumString* list = nullptr;
-              if (vltCheckComponent(GUID_NULL, &list) != E_FAIL || !list) return 1;
-              Messages texts = Drain(list);
-              list->Release();
-              auto is = [](const std::string& word, const std::string& file) {
-                return "the " + word + " \"" + file + "\" is registered but does not exist";
-              };
-              Messages expected = {is("dictionary", root + "/Data Dictionaries/vltdd.framework"),
-                                   is("dictionary", "vl"),
-                                   is("object expert", root + "/Experts/b.vle"),
-                                   is("resource expert", root + "/Experts/c.vle")};
-              if (texts != expected) {
-                for (const auto& text : texts) fprintf(stderr, "%s\n", text.c_str());
-                return 2;
-              }
-              GUID one = {1, 0, 0, {}};
-              if (vltCheckComponent(one, &list) != S_OK) return 3;
-              bool empty = Drain(list).empty();
-              list->Release();
-              return empty ? 0 : 4;
-            }),
-            0);
+  IEnumString* list = nullptr;
+  ASSERT_EQ(vltCheckComponent(GUID_NULL, &list), E_FAIL);
+  ASSERT_TRUE(list);
+  Messages texts = Drain(list);
+  list->Release();
+  auto is = [](const std::string& word, const std::string& file) {
+    return "the " + word + " \"" + file + "\" is registered but does not exist";
+  };
+  Messages expected = {is("dictionary", root + "/Data Dictionaries/vltdd.framework"),
+                       is("dictionary", "vl"), is("object expert", root + "/Experts/b.vle"),
+                       is("resource expert", root + "/Experts/c.vle")};
+  EXPECT_EQ(texts, expected);
+  GUID one = {1, 0, 0, {}};
+  ASSERT_EQ(vltCheckComponent(one, &list), S_OK);
+  EXPECT_TRUE(Drain(list).empty());
+  list->Release();
 }
 
-TEST(CheckExport, AnUnknownIdFailsWithAnEmptyList) {
+TEST_IN_CHILD(CheckExport, AnUnknownIdFailsWithAnEmptyList) {
   Installation installation;
-  EXPECT_EQ(InChild([] {
-              IEnumString* list = nullptr;
-              GUID unknown = {77, 0, 0, {}};
-              if (vltCheckComponent(unknown, &list) != E_INVALIDARG || !list) return 1;
-              wchar_t* text = nullptr;
-              unsigned fetched = 9;
-              bool empty = list->Next(1, &text, &fetched) == S_FALSE && fetched == 0;
-              list->Release();
-              return empty ? 0 : 2;
-            }),
-            0);
+  IEnumString* list = nullptr;
+  GUID unknown = {77, 0, 0, {}};
+  ASSERT_EQ(vltCheckComponent(unknown, &list), E_INVALIDARG);
+  ASSERT_TRUE(list);
+  wchar_t* text = nullptr;
+  unsigned fetched = 9;
+  EXPECT_EQ(list->Next(1, &text, &fetched), S_FALSE);
+  EXPECT_EQ(fetched, 0u);
+  list->Release();
   EXPECT_EQ(vltCheckComponent(GUID_NULL, nullptr), E_POINTER);
 }
 
-TEST(CheckExport, ARegistrarWithoutComponentsHasNothingToTell) {
+TEST_IN_CHILD(CheckExport, ARegistrarWithoutComponentsHasNothingToTell) {
   Installation installation;
   WriteBytes(installation.sidecar(), "short");  // The database is given up: an empty registrar.
-  EXPECT_EQ(InChild([] {
-              IEnumString* list = nullptr;
-              if (vltCheckComponent(GUID_NULL, &list) != S_OK || !list) return 1;
-              wchar_t* text = nullptr;
-              unsigned fetched = 9;
-              bool empty = list->Next(1, &text, &fetched) == S_FALSE && fetched == 0;
-              list->Release();
-              return empty ? 0 : 2;
-            }),
-            0);
+  IEnumString* list = nullptr;
+  ASSERT_EQ(vltCheckComponent(GUID_NULL, &list), S_OK);
+  ASSERT_TRUE(list);
+  wchar_t* text = nullptr;
+  unsigned fetched = 9;
+  EXPECT_EQ(list->Next(1, &text, &fetched), S_FALSE);
+  EXPECT_EQ(fetched, 0u);
+  list->Release();
 }
 
 // ---- All components of a type

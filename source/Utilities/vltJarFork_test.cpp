@@ -19,11 +19,10 @@ TEST(JarFork, AJarIsNotSavedByAChildOfItsHolder) {
   ASSERT_EQ(VltjarSaveChanges(name.c_str(), jar.get()), S_OK);
   std::string sidecar = CvlIniMgr::SidecarName(file);
   std::string before = ReadBytes(file), digestBefore = ReadBytes(sidecar);
-  EXPECT_EQ(InChild([&] {
-              jar->SetItem("s", "child", "1", true);
-              EXPECT_LT(VltjarSaveChanges(name.c_str(), jar.get()), 0);
-            }),
-            0);
+  ExpectInChild([&] {
+    jar->SetItem("s", "child", "1", true);
+    EXPECT_LT(VltjarSaveChanges(name.c_str(), jar.get()), 0);
+  });
   EXPECT_EQ(ReadBytes(file), before);
   EXPECT_EQ(ReadBytes(sidecar), digestBefore);
 }

@@ -26,18 +26,17 @@ const std::string kNoDataPath = "  Could not get the VLT data path in vltGetRegi
 // What the body traces under the mask, in a process that has the registrar already.
 std::string Traced(unsigned mask, const std::function<void(IvltRegistrar&)>& body) {
   TempDir dir;
-  EXPECT_EQ(InChild([&] {
-              Registrar r;
-              ASSERT_EQ(vltGetRegistrar(r.out()), S_OK);
-              int log = open((dir / "log").c_str(), O_CREAT | O_WRONLY | O_CLOEXEC, 0600);
-              int before = dup(2);
-              ASSERT_EQ(dup2(log, 2), 2);
-              vlTracer::Initialize(static_cast<vlTracer::SeverityLevel>(mask),
-                                   vlTracer::kTargetError, nullptr, 0);
-              body(*r.get());
-              ASSERT_EQ(dup2(before, 2), 2);
-            }),
-            0);
+  ExpectInChild([&] {
+    Registrar r;
+    ASSERT_EQ(vltGetRegistrar(r.out()), S_OK);
+    int log = open((dir / "log").c_str(), O_CREAT | O_WRONLY | O_CLOEXEC, 0600);
+    int before = dup(2);
+    ASSERT_EQ(dup2(log, 2), 2);
+    vlTracer::Initialize(static_cast<vlTracer::SeverityLevel>(mask), vlTracer::kTargetError,
+                         nullptr, 0);
+    body(*r.get());
+    ASSERT_EQ(dup2(before, 2), 2);
+  });
   return ReadBytes(dir / "log");
 }
 

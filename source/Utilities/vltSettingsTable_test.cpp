@@ -41,16 +41,13 @@ class SettingsTable : public SettingsPlace {
 
 TEST_F(SettingsTable, EveryChoiceOfItemsAndOutputsOfAClient) {
   for (unsigned index : {3u, kOther, 0u, UINT_MAX}) {
-    EXPECT_EQ(InChild([&] {
-                allChoices<kClientTexts>(kRemoteRows, index, [&](Texts<kClientTexts>& t) {
-                  return AskClient(index, 1, t);
-                });
-                allChoices<kClientTexts>(kLocalRows, index, [&](Texts<kClientTexts>& t) {
-                  return AskClient(index, 0, t);
-                });
-              }),
-              0)
-        << index;
+    SCOPED_TRACE(index);
+    ExpectInChild([&] {
+      allChoices<kClientTexts>(kRemoteRows, index,
+                               [&](Texts<kClientTexts>& t) { return AskClient(index, 1, t); });
+      allChoices<kClientTexts>(kLocalRows, index,
+                               [&](Texts<kClientTexts>& t) { return AskClient(index, 0, t); });
+    });
   }
 }
 
@@ -59,15 +56,13 @@ constexpr int kManyOpeningsMs = 110000;
 
 TEST_F(SettingsTable, EveryChoiceOfItemsAndOutputsOfAServer) {
   for (unsigned index : {3u, kOther}) {
-    EXPECT_EQ(InChild(
-                  [&] {
-                    allChoices<kServerTexts>(kServerRows, index, [&](Texts<kServerTexts>& t) {
-                      return AskServer(index, t);
-                    });
-                  },
-                  kManyOpeningsMs),
-              0)
-        << index;
+    SCOPED_TRACE(index);
+    ExpectInChild(
+        [&] {
+          allChoices<kServerTexts>(kServerRows, index,
+                                   [&](Texts<kServerTexts>& t) { return AskServer(index, t); });
+        },
+        kManyOpeningsMs);
   }
 }
 
@@ -94,79 +89,73 @@ TEST_F(SettingsTable, TextsAreWhatTheFileSays) {
       {"BootstrapEndpoint2=" + most, most},
       {"BootstrapEndpoint2=" + more, more},
   };
-  EXPECT_EQ(InChild([&] {
-              for (const Row& row : rows) {
-                write(row.line + "\n");
-                Texts<kServerTexts> server(1u << kServerBootstrap);
-                EXPECT_EQ(AskServer(kOther, server), row.text ? S_OK : E_FAIL) << row.line;
-                EXPECT_EQ(server.found(kServerBootstrap), row.text) << row.line;
-                Texts<kClientTexts> client(1u << kBootstrap);
-                EXPECT_EQ(AskClient(kOther, 1, client), row.text ? S_OK : E_FAIL) << row.line;
-                EXPECT_EQ(client.found(kBootstrap), row.text) << row.line;
-              }
-            }),
-            0);
+  ExpectInChild([&] {
+    for (const Row& row : rows) {
+      write(row.line + "\n");
+      Texts<kServerTexts> server(1u << kServerBootstrap);
+      EXPECT_EQ(AskServer(kOther, server), row.text ? S_OK : E_FAIL) << row.line;
+      EXPECT_EQ(server.found(kServerBootstrap), row.text) << row.line;
+      Texts<kClientTexts> client(1u << kBootstrap);
+      EXPECT_EQ(AskClient(kOther, 1, client), row.text ? S_OK : E_FAIL) << row.line;
+      EXPECT_EQ(client.found(kBootstrap), row.text) << row.line;
+    }
+  });
 }
 
 // ---- Numbers
 
 TEST_F(SettingsTable, EveryNumberOfAServerInEveryForm) {
   for (unsigned index : {3u, kOther}) {
-    EXPECT_EQ(InChild([&] {
-                for (size_t n = 0; n < kNumbers; ++n) {
-                  for (const NumberText& row : kNumberTexts) {
-                    write(ServerKey(n, index) + "=" + row.text + "\n");
-                    for (unsigned wanted : {63u, 1u << n, 63u & ~(1u << n)}) {
-                      EXPECT_EQ(AskNumbers(index, wanted, S_OK), Expected(wanted, n, &row))
-                          << ServerKey(n, index) << " " << row.text << " " << wanted;
-                    }
-                  }
-                }
-              }),
-              0);
+    ExpectInChild([&] {
+      for (size_t n = 0; n < kNumbers; ++n) {
+        for (const NumberText& row : kNumberTexts) {
+          write(ServerKey(n, index) + "=" + row.text + "\n");
+          for (unsigned wanted : {63u, 1u << n, 63u & ~(1u << n)}) {
+            EXPECT_EQ(AskNumbers(index, wanted, S_OK), Expected(wanted, n, &row))
+                << ServerKey(n, index) << " " << row.text << " " << wanted;
+          }
+        }
+      }
+    });
   }
 }
 
 TEST_F(SettingsTable, EveryChoiceOfAServersNumbersHasItsDefaults) {
   for (bool withDirectory : {true, false}) {
     if (!withDirectory) std::filesystem::remove_all(data());
-    EXPECT_EQ(InChild([&] {
-                for (unsigned index : {3u, kOther}) {
-                  for (unsigned wanted = 0; wanted < 64; ++wanted) {
-                    EXPECT_EQ(AskNumbers(index, wanted, S_OK), Expected(wanted, 0, nullptr))
-                        << wanted;
-                  }
-                }
-              }),
-              0);
+    ExpectInChild([&] {
+      for (unsigned index : {3u, kOther}) {
+        for (unsigned wanted = 0; wanted < 64; ++wanted) {
+          EXPECT_EQ(AskNumbers(index, wanted, S_OK), Expected(wanted, 0, nullptr)) << wanted;
+        }
+      }
+    });
   }
   EXPECT_FALSE(Exists(data()));  // Nobody wanted the cookie.
 }
 
 TEST_F(SettingsTable, EveryCacheNumberInEveryForm) {
-  EXPECT_EQ(InChild([&] {
-              for (size_t n = 0; n < kNumbers; ++n) {
-                for (const NumberText& row : kNumberTexts) {
-                  write(std::string(kCacheRows[n].key) + "=" + row.text + "\n");
-                  for (unsigned wanted : {63u, 1u << n, 63u & ~(1u << n)}) {
-                    EXPECT_EQ(AskCache(wanted, S_OK), ExpectedCache(wanted, n, &row))
-                        << kCacheRows[n].key << " " << row.text << " " << wanted;
-                  }
-                }
-              }
-            }),
-            0);
+  ExpectInChild([&] {
+    for (size_t n = 0; n < kNumbers; ++n) {
+      for (const NumberText& row : kNumberTexts) {
+        write(std::string(kCacheRows[n].key) + "=" + row.text + "\n");
+        for (unsigned wanted : {63u, 1u << n, 63u & ~(1u << n)}) {
+          EXPECT_EQ(AskCache(wanted, S_OK), ExpectedCache(wanted, n, &row))
+              << kCacheRows[n].key << " " << row.text << " " << wanted;
+        }
+      }
+    }
+  });
 }
 
 TEST_F(SettingsTable, EveryChoiceOfCacheNumbersHasItsDefaults) {
   for (bool withDirectory : {true, false}) {
     if (!withDirectory) std::filesystem::remove_all(data());
-    EXPECT_EQ(InChild([&] {
-                for (unsigned wanted = 0; wanted < 64; ++wanted) {
-                  EXPECT_EQ(AskCache(wanted, S_OK), ExpectedCache(wanted, 0, nullptr)) << wanted;
-                }
-              }),
-              0);
+    ExpectInChild([&] {
+      for (unsigned wanted = 0; wanted < 64; ++wanted) {
+        EXPECT_EQ(AskCache(wanted, S_OK), ExpectedCache(wanted, 0, nullptr)) << wanted;
+      }
+    });
   }
 }
 

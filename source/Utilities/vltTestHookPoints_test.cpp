@@ -47,7 +47,8 @@ class Site {
     m_installation.addResourceExpert("resource", "resource", GText(3), "PNP0A03");
     std::filesystem::create_directory(m_installation.root() + "/Data");
     restoreJar();
-    EXPECT_EQ(InChild([this] { expectKept(5); }), 0) << "at the first start";
+    SCOPED_TRACE("at the first start");
+    ExpectInChild([this] { expectKept(5); });
   }
 
   // The end of a process that refreshes its hooks and does something.
@@ -64,7 +65,7 @@ class Site {
 
   // A client that starts afterwards finds everything. Back to what was there before, then.
   void expectWhole(const Row& row) const {
-    EXPECT_EQ(InChild([&] { expectKept(row.action == SaveJar ? 6 : 5); }), 0);
+    ExpectInChild([&] { expectKept(row.action == SaveJar ? 6 : 5); });
     for (const auto& entry : std::filesystem::recursive_directory_iterator(m_installation.root())) {
       EXPECT_NE(entry.path().extension(), ".bad") << entry.path();
     }
@@ -276,14 +277,13 @@ TEST_F(HookPoints, AFailedCreationLeavesTheRegistrarToTheNextCall) {
   std::string file = installation.root() + "/VLTHooks.ini";
   WriteBytes(file, std::string("[Hook]\nName = ") + hook::kGetRegistrar2 +
                        "\nSimulateMemoryAllocationFailure = true\n");
-  EXPECT_EQ(InChild([&] {
-              vltRefreshHook();
-              EXPECT_EQ(Registrar(), OutOfMemory);
-              WriteBytes(file, "[Hook]\nName = elsewhere\n");
-              vltRefreshHook();
-              EXPECT_EQ(Registrar(), Success);
-            }),
-            0);
+  ExpectInChild([&] {
+    vltRefreshHook();
+    EXPECT_EQ(Registrar(), OutOfMemory);
+    WriteBytes(file, "[Hook]\nName = elsewhere\n");
+    vltRefreshHook();
+    EXPECT_EQ(Registrar(), Success);
+  });
 }
 
 }  // namespace

@@ -329,15 +329,14 @@ TEST_F(GuardedFile, ADirectoryInTheSidecarsPlaceCostsTheFileOnce) {
 TEST_F(GuardedFile, WithADirectoryThatCannotBeMovedTheFileStays) {
   WriteBytes(file, "[s]\na=1\n");
   WriteBytes(dir.makeDir("x.vl5") + "/inside", "kept");
-  EXPECT_EQ(InChild([&] {
-              ASSERT_TRUE(FailSystemCall(SYS_renameat2, EACCES));
-              for (int opening = 0; opening < 2; ++opening) {
-                EXPECT_EQ(open(), E_FAIL);
-                EXPECT_EQ(value("s", "a"), "1");
-                ini.reset();
-              }
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_TRUE(FailSystemCall(SYS_renameat2, EACCES));
+    for (int opening = 0; opening < 2; ++opening) {
+      EXPECT_EQ(open(), E_FAIL);
+      EXPECT_EQ(value("s", "a"), "1");
+      ini.reset();
+    }
+  });
   EXPECT_FALSE(Exists(BadName(file)));
 }
 

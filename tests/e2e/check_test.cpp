@@ -185,20 +185,17 @@ TEST(CheckTree, AFileThatMayNotBeRead) {
 }
 
 // The same by the tool, which runs as somebody else from the start.
-TEST(CheckTree, TheToolToldOfAFileThatMayNotBeRead) {
+TEST_IN_CHILD(CheckTree, TheToolToldOfAFileThatMayNotBeRead) {
   Experts e;
   std::string file = e.add(1, "secret");
   Build(file, kGoodEntry);
   OpenAllBut(e, file, 0);
-  EXPECT_EQ(InChild([&] {
-              if (geteuid() == 0) {
-                ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
-              }
-              Found found = Check(1);
-              EXPECT_EQ(found.exitCode, kDataUnusable);
-              EXPECT_EQ(found.messages, Messages{IsNot("is not readable", file)});
-            }),
-            0);
+  if (geteuid() == 0) {
+    ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+  }
+  Found found = Check(1);
+  EXPECT_EQ(found.exitCode, kDataUnusable);
+  EXPECT_EQ(found.messages, Messages{IsNot("is not readable", file)});
 }
 
 // ---- Paths that the system does not even let the check look at
@@ -241,11 +238,10 @@ TEST(CheckTree, ADirectoryThatMayNotBeEntered) {
   std::string file = e.add(GText(1), "locked", e.file("locked/expert"));
   Build(file, kGoodEntry);
   OpenAllBut(e, e.root() + "/locked", 0700);
-  EXPECT_EQ(InChild([&] {
-              ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
-              ExpectTold(1, {IsNot("is not readable", file)}, {});
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+    ExpectTold(1, {IsNot("is not readable", file)}, {});
+  });
 }
 
 // ---- Libraries that do harm while they are loaded. Only the tool survives them.

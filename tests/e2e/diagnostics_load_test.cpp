@@ -99,7 +99,7 @@ TEST_F(Loading, WhatASectionLacksComesFromAllComponents) {
 TEST_F(Loading, ADiskThatIsShortGetsNoLog) {
   options("[vlt]\nSeverity = 32\nTarget = 5\nLowDiskThreshold = 1000000\n");
   fs::create_directories(kLogs);
-  int code = InChild([] {
+  ExpectInChild([] {
     if (unshare(CLONE_NEWNS) != 0 ||
         mount("tmpfs", kLogs.c_str(), "tmpfs", 0, "size=64k,mode=777") != 0) {
       GTEST_SKIP() << "NOT TESTED: no right to mount";
@@ -109,7 +109,6 @@ TEST_F(Loading, ADiskThatIsShortGetsNoLog) {
     EXPECT_EQ(result.err, "  vltutils: Process attach\n");
     EXPECT_EQ(NamesIn(kLogs), std::vector<std::string>());
   });
-  EXPECT_EQ(code, 0);
 }
 
 // The log is asked for in each of the following, so that it is tried to be opened.
@@ -118,15 +117,14 @@ TEST_F(Loading, AnUnwritableHomeIsNothingToSpeakOf) {
   options("[vlt]\nSeverity = 34\nTarget = 1\n");
   TempDir home;
   chmod(home.path().c_str(), 0755);
-  EXPECT_EQ(InChild([&] {
-              ASSERT_TRUE(BecomeNobody());
-              ExpectSilentLoad({"HOME=" + home.path()});
-              ExpectSilentLoad({"HOME=/no/such/home"});
-              ExpectSilentLoad({"HOME=relative"});
-              ExpectSilentLoad({"HOME="});
-              ExpectSilentLoad({"HOME=" + kHost});  // no directory at all
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_TRUE(BecomeNobody());
+    ExpectSilentLoad({"HOME=" + home.path()});
+    ExpectSilentLoad({"HOME=/no/such/home"});
+    ExpectSilentLoad({"HOME=relative"});
+    ExpectSilentLoad({"HOME="});
+    ExpectSilentLoad({"HOME=" + kHost});  // no directory at all
+  });
   EXPECT_EQ(NamesIn(home.path()), std::vector<std::string>());
 }
 
@@ -136,11 +134,10 @@ TEST_F(Loading, AHomeOfAnyLengthHasTheLog) {
   std::string home = dir.makeDir(std::string(200, 'h') + "/" + std::string(200, 'i'));
   chmod(dir.path().c_str(), 0755);
   chmod(home.c_str(), 0777);
-  EXPECT_EQ(InChild([&] {
-              ASSERT_TRUE(BecomeNobody());
-              ExpectSilentLoad({"HOME=" + home});
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_TRUE(BecomeNobody());
+    ExpectSilentLoad({"HOME=" + home});
+  });
   EXPECT_EQ(NamesIn(home + "/Library/Logs/KOR").size(), 1u);
 }
 
@@ -168,7 +165,7 @@ TEST_F(Loading, WithoutAHomeTheLogIsInTheTemporaryPlace) {
 // Neither the log nor the lock of its lines can be made.
 TEST_F(Loading, AReadOnlySystemIsNothingToSpeakOf) {
   options("[vlt]\nSeverity = 34\nTarget = 1\n");
-  int code = InChild([] {
+  ExpectInChild([] {
     if (unshare(CLONE_NEWNS) != 0 ||
         mount("/Library", "/Library", nullptr, MS_BIND, nullptr) != 0 ||
         mount(nullptr, "/Library", nullptr, MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr) != 0) {
@@ -177,7 +174,6 @@ TEST_F(Loading, AReadOnlySystemIsNothingToSpeakOf) {
     EXPECT_NE(mkdir("/Library/Logs", 0777), 0);
     ExpectSilentLoad({"ZTFNDTMPSHAREDFILEDIR=/Library/shared"});
   });
-  EXPECT_EQ(code, 0);
   EXPECT_FALSE(Exists(kLogs));
 }
 

@@ -179,28 +179,27 @@ TEST_F(Diagnostics, ClearingLeavesNothingArmedAndMakesNoFile) {
 }
 
 TEST_F(Diagnostics, AProcessObeysWhatWasArmedOnceItRefreshes) {
-  EXPECT_EQ(InChild([] {
-              const char* point = "TestHookNT\"./source/Common/vltTypeToString2\"77";
-              auto text = [] {
-                wchar_t* given = vltGuidToString(GUID{});
-                bool there = given && *given;
-                vltFree(given);
-                return there;
-              };
-              EXPECT_EQ(Vltctl({"hook", "arm", point, "fail"}).exitCode, 0);
-              EXPECT_TRUE(text());
-              vltRefreshHook();
-              EXPECT_FALSE(text());
-              EXPECT_EQ(vltTestHook(point), 1u);
-              EXPECT_EQ(vltTestHook("testHookNT\"./source/Common/vltTypeToString2\"77"), 0u);
-              EXPECT_EQ(Vltctl({"hook", "arm", "vltjarValidChecksumSet", "fail"}).exitCode, 0);
-              vltRefreshHook();
-              EXPECT_TRUE(text());
-              EXPECT_EQ(Vltctl({"hook", "clear"}).exitCode, 0);
-              vltRefreshHook();
-              EXPECT_EQ(vltTestHook("vltjarValidChecksumSet"), 1u);  // until the process ends
-            }),
-            0);
+  ExpectInChild([] {
+    const char* point = "TestHookNT\"./source/Common/vltTypeToString2\"77";
+    auto text = [] {
+      wchar_t* given = vltGuidToString(GUID{});
+      bool there = given && *given;
+      vltFree(given);
+      return there;
+    };
+    EXPECT_EQ(Vltctl({"hook", "arm", point, "fail"}).exitCode, 0);
+    EXPECT_TRUE(text());
+    vltRefreshHook();
+    EXPECT_FALSE(text());
+    EXPECT_EQ(vltTestHook(point), 1u);
+    EXPECT_EQ(vltTestHook("testHookNT\"./source/Common/vltTypeToString2\"77"), 0u);
+    EXPECT_EQ(Vltctl({"hook", "arm", "vltjarValidChecksumSet", "fail"}).exitCode, 0);
+    vltRefreshHook();
+    EXPECT_TRUE(text());
+    EXPECT_EQ(Vltctl({"hook", "clear"}).exitCode, 0);
+    vltRefreshHook();
+    EXPECT_EQ(vltTestHook("vltjarValidChecksumSet"), 1u);  // until the process ends
+  });
 }
 
 // ---- The log

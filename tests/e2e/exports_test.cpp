@@ -142,38 +142,32 @@ TEST(Exports, TheLibraryNeedsTheCppRuntimeAndTheSystemOnly) {
   EXPECT_GT(needed, 1);
 }
 
-TEST(Exports, ExceptionsAreCaughtByClass) {
+TEST_IN_CHILD(Exports, ExceptionsAreCaughtByClass) {
   Installation i;
   Installation::setDir("");
-  EXPECT_EQ(InChild([] {
-              IvltRegistrar* registrar = nullptr;
-              bool caught = false;
-              try {
-                vltGetRegistrar(&registrar);
-              } catch (const zt::fnd::exception::OutOfRange&) {
-                ADD_FAILURE() << "another class";
-              } catch (const zt::fnd::exception::InvalidArgument& error) {
-                caught = true;
-                EXPECT_STREQ(error.what(), "Invalid argument(s)");
-                EXPECT_NE(error.getErrorCode(), 0u);
-                EXPECT_NE(dynamic_cast<const zt::fnd::exception::Exception*>(&error), nullptr);
-              }
-              EXPECT_TRUE(caught);
-              EXPECT_EQ(registrar, nullptr);
-            }),
-            0);
+  IvltRegistrar* registrar = nullptr;
+  bool caught = false;
+  try {
+    vltGetRegistrar(&registrar);
+  } catch (const zt::fnd::exception::OutOfRange&) {
+    ADD_FAILURE() << "another class";
+  } catch (const zt::fnd::exception::InvalidArgument& error) {
+    caught = true;
+    EXPECT_STREQ(error.what(), "Invalid argument(s)");
+    EXPECT_NE(error.getErrorCode(), 0u);
+    EXPECT_NE(dynamic_cast<const zt::fnd::exception::Exception*>(&error), nullptr);
+  }
+  EXPECT_TRUE(caught);
+  EXPECT_EQ(registrar, nullptr);
 }
 
-TEST(Exports, ExceptionsAreCaughtByTheirBases) {
+TEST_IN_CHILD(Exports, ExceptionsAreCaughtByTheirBases) {
   Installation i;
   WriteBytes(i.root() + "/Data", "in the way");
-  EXPECT_EQ(InChild([] {
-              IvltRegistrar* registrar = nullptr;
-              EXPECT_THROW(vltGetRegistrar(&registrar), zt::fnd::exception::ObjectAlreadyExists);
-              EXPECT_THROW(vltGetRegistrar(&registrar), zt::fnd::exception::Exception);
-              EXPECT_THROW(vltGetRegistrar(&registrar), std::exception);
-            }),
-            0);
+  IvltRegistrar* registrar = nullptr;
+  EXPECT_THROW(vltGetRegistrar(&registrar), zt::fnd::exception::ObjectAlreadyExists);
+  EXPECT_THROW(vltGetRegistrar(&registrar), zt::fnd::exception::Exception);
+  EXPECT_THROW(vltGetRegistrar(&registrar), std::exception);
 }
 
 TEST(Exports, FailuresOfTheSystemCarryItsNumber) {

@@ -33,16 +33,16 @@ class ForkThreads : public testing::Test {
   // Has threads and forked children make the call, in a process of its own that `prepare` begins.
   void storm(
       const std::function<bool()>& call, const std::function<void()>& prepare = [] {}) {
-    EXPECT_EQ(0, InChild(
-                     [&] {
-                       prepare();
-                       ForkStorm result = RunForkStorm([&] { call(); }, call);
-                       std::cout << result << std::endl;
-                       EXPECT_GT(result.children, 3);
-                       EXPECT_EQ(0, result.hung);
-                       EXPECT_EQ(0, result.failed);
-                     },
-                     600000));
+    ExpectInChild(
+        [&] {
+          prepare();
+          ForkStorm result = RunForkStorm([&] { call(); }, call);
+          std::cout << result << std::endl;
+          EXPECT_GT(result.children, 3);
+          EXPECT_EQ(0, result.hung);
+          EXPECT_EQ(0, result.failed);
+        },
+        600000);
   }
 
   static IvltRegistrar* TheRegistrar() {
@@ -76,13 +76,13 @@ TEST_F(ForkThreads, ChildOfAProcessThatIsMakingItsRegistrarMakesItsOwn) {
   std::filesystem::create_directories(locks);
   int database = open((locks + "/" + name).c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666);
   ASSERT_EQ(0, flock(database, LOCK_EX));
-  EXPECT_EQ(0, InChild([&] {
-              // Both end with this process.
-              auto* maker = new WatchedThread([] { TheRegistrar(); });
-              ASSERT_TRUE(maker->blocksIn(SYS_flock));
-              Child child([] { return TheRegistrar() ? 0 : 1; });
-              EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }, 5000));
-            }));
+  ExpectInChild([&] {
+    // Both end with this process.
+    auto* maker = new WatchedThread([] { TheRegistrar(); });
+    ASSERT_TRUE(maker->blocksIn(SYS_flock));
+    Child child([] { return TheRegistrar() ? 0 : 1; });
+    EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }, 5000));
+  });
   close(database);
 }
 

@@ -178,7 +178,8 @@ TEST(Hostile, InvalidTextInNamesUnderAnUtf8Locale) {
   b.plant(Component("caf\xC3\xA9", 1), "caf\xC3\xA9.vle");
   b.plant(Component("bad\xFF\xFE", 2), "bad\xFF\xFE.vle");
   for (const char* locale : {"C.UTF-8", "C"}) {
-    int code = InChild([&] {
+    SCOPED_TRACE(locale);
+    ExpectInChild([&] {
       ASSERT_NE(setlocale(LC_ALL, locale), nullptr);
       IvltRegistrar* r = nullptr;
       ASSERT_EQ(GetRegistrar(&r), "ok");
@@ -188,7 +189,6 @@ TEST(Hostile, InvalidTextInNamesUnderAnUtf8Locale) {
       }
       r->Release();
     });
-    EXPECT_EQ(code, 0) << locale;
   }
 }
 
@@ -205,7 +205,8 @@ TEST(Hostile, AFullDescriptorTableLosesNothing) {
   int worked = 0;
   for (rlim_t spare = 0; spare < 12; ++spare) {
     Installation::touch(good, ++time);
-    int code = InChild([&] {
+    SCOPED_TRACE(spare);
+    ExpectInChild([&] {
       int next = dup(0);
       rlimit limit = {static_cast<rlim_t>(next) + spare, static_cast<rlim_t>(next) + spare};
       close(next);
@@ -215,7 +216,6 @@ TEST(Hostile, AFullDescriptorTableLosesNothing) {
         r->Release();
       }
     });
-    EXPECT_EQ(code, 0) << spare;
     EXPECT_TRUE(Exists(good)) << spare;
     EXPECT_TRUE(DatabaseText(b.database()).has("Other")) << spare;
     ExpectStart("ok", [&](IvltRegistrar& r) {
@@ -234,7 +234,7 @@ TEST(Hostile, AWriteThatFailsLosesNothing) {
   ExpectStart("ok");
   std::string before = ReadBytes(b.database());
   Installation::touch(b.root() + "/Data Dictionaries/Good.framework/Resources/Info.vlr", 1);
-  int code = InChild([&] {
+  ExpectInChild([&] {
     signal(SIGXFSZ, SIG_IGN);
     rlimit limit = {100, 100};
     ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &limit), 0);
@@ -243,7 +243,6 @@ TEST(Hostile, AWriteThatFailsLosesNothing) {
     EXPECT_EQ(r->SetSchemaVersion(7), E_FAIL);
     r->Release();
   });
-  EXPECT_EQ(code, 0);
   EXPECT_EQ(ReadBytes(b.database()), before);
   b.expectGood();
 }

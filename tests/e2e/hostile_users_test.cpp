@@ -28,7 +28,7 @@ class HostileUsers : public testing::Test {
 
   static void ExpectStartAsNobody(const std::string& expected,
                                   const std::function<void(IvltRegistrar&)>& body = {}) {
-    int code = InChild([&] {
+    ExpectInChild([&] {
       ASSERT_EQ(setresgid(kNobody, kNobody, kNobody), 0);
       ASSERT_EQ(setresuid(kNobody, kNobody, kNobody), 0);
       IvltRegistrar* r = nullptr;
@@ -36,7 +36,6 @@ class HostileUsers : public testing::Test {
       if (r && body) body(*r);
       if (r) r->Release();
     });
-    EXPECT_EQ(code, 0);
   }
 
   Besieged b;

@@ -458,7 +458,8 @@ class HostileBundle : public Planted {
       EXPECT_EQ(lchown(entry.path().c_str(), kVictim, kVictim), 0);
     }
     chmod((b.root() + "/Experts/" + closed).c_str(), mode);
-    int code = InChild([&] {
+    SCOPED_TRACE(closed);
+    ExpectInChild([&] {
       ASSERT_EQ(setresgid(kAttacker, kAttacker, kAttacker), 0);
       ASSERT_EQ(setresuid(kAttacker, kAttacker, kAttacker), 0);
       for (int start = 0; start < 2; ++start) {
@@ -469,7 +470,6 @@ class HostileBundle : public Planted {
         EXPECT_EQ(Find(*r, G(0xC105ED)), S_OK) << "what was registered from it is gone";
       }
     });
-    EXPECT_EQ(code, 0) << closed;
     ExpectStart([](IvltRegistrar& r) { EXPECT_EQ(Find(r, G(0xC105ED)), S_OK); });
   }
 };
@@ -495,7 +495,7 @@ TEST_F(HostileBundle, MadeUnderAPrivateUmask) {
     ScopedUmask umask(077);
     b.plant(Component("Closed", 0xC105ED), "x.vle");
   }
-  int code = InChild([&] {
+  ExpectInChild([&] {
     ASSERT_EQ(setresgid(kAttacker, kAttacker, kAttacker), 0);
     ASSERT_EQ(setresuid(kAttacker, kAttacker, kAttacker), 0);
     IvltRegistrar* r = nullptr;
@@ -503,7 +503,6 @@ TEST_F(HostileBundle, MadeUnderAPrivateUmask) {
     if (!r) return;
     EXPECT_EQ(Find(*r, G(kGood)), S_OK);
   });
-  EXPECT_EQ(code, 0);
   ExpectStart([](IvltRegistrar& r) { EXPECT_EQ(Find(r, G(0xC105ED)), S_OK); });
 }
 

@@ -124,15 +124,14 @@ bool FileIsLocked() {
 int Missing(const SharedAnswers& answers) {
   int missing = -1;
   SharedAnswers found;
-  EXPECT_EQ(InChild([&] {
-              IvltRegistrar* r = nullptr;
-              ASSERT_EQ(GetRegistrar(&r), "ok");
-              for (int w = 0; w <= kWorkers; ++w) {
-                for (int n = 0; n < kEach; ++n) found->stored[w][n] = Find(*r, IdOf(w, n)) == S_OK;
-              }
-              found->other = 1;
-            }),
-            0);
+  ExpectInChild([&] {
+    IvltRegistrar* r = nullptr;
+    ASSERT_EQ(GetRegistrar(&r), "ok");
+    for (int w = 0; w <= kWorkers; ++w) {
+      for (int n = 0; n < kEach; ++n) found->stored[w][n] = Find(*r, IdOf(w, n)) == S_OK;
+    }
+    found->other = 1;
+  });
   if (!found->other) return missing;
   missing = 0;
   for (int w = 0; w <= kWorkers; ++w) {
@@ -326,15 +325,14 @@ TEST_F(PreFork, ADaemonHasItsLockAgainAtItsNextCall) {
 }
 
 TEST_F(PreFork, AHostThatClosesAllDescriptorsHasItsLockAgainAtItsNextCall) {
-  EXPECT_EQ(InChild([] {
-              IvltRegistrar* r = nullptr;
-              ASSERT_EQ(GetRegistrar(&r), "ok");
-              ASSERT_EQ(syscall(SYS_close_range, 3u, ~0u, 0u), 0);
-              ASSERT_FALSE(FileIsLocked());
-              EXPECT_EQ(Register(*r, G(50)), S_OK);
-              EXPECT_TRUE(FileIsLocked());
-            }),
-            0);
+  ExpectInChild([] {
+    IvltRegistrar* r = nullptr;
+    ASSERT_EQ(GetRegistrar(&r), "ok");
+    ASSERT_EQ(syscall(SYS_close_range, 3u, ~0u, 0u), 0);
+    ASSERT_FALSE(FileIsLocked());
+    EXPECT_EQ(Register(*r, G(50)), S_OK);
+    EXPECT_TRUE(FileIsLocked());
+  });
   ExpectStart([](IvltRegistrar& r) { EXPECT_EQ(Find(r, G(50)), S_OK); });
   ExpectWhole(i);
 }

@@ -8,13 +8,16 @@
 namespace vlt::test {
 
 // Runs expectations in a child process in which that point is armed with those faults.
-// Returns what InChild does.
-inline int InArmedChild(const char* point, const hook::Faults& faults,
-                        const std::function<void()>& body) {
-  return InChild([&] {
-    hook::Arm(point, faults);
-    body();
-  });
+// The calling test fails where ExpectInChild's does.
+inline void ExpectInArmedChild(const char* point, const hook::Faults& faults,
+                               const std::function<void()>& body,
+                               const char* file = __builtin_FILE(), int line = __builtin_LINE()) {
+  ExpectInChild(
+      [&] {
+        hook::Arm(point, faults);
+        body();
+      },
+      kDeadlineMs, file, line);
 }
 
 inline constexpr hook::Faults kFailedAllocation{.simulateMemoryAllocationFailure = true};

@@ -82,13 +82,14 @@ void Drain(int out, int err, ProgramResult* result, Clock::time_point end) {
 
 }  // namespace
 
-Child::Child(const std::function<int()>& body) {
+Child::Child(const std::function<int()>& body) : m_failures(std::make_unique<FailurePipe>()) {
   pid_t parent = getpid();
   fflush(nullptr);
   m_pid = fork();
   if (m_pid < 0) Fail("fork");
   if (m_pid > 0) return;
   DieWithParent(parent);
+  m_failures->send();
   int code = 99;
   try {
     code = body();
@@ -103,7 +104,9 @@ Child::Child(const std::function<int()>& body) {
 }
 
 Child::~Child() {
-  if (m_pid > 0) KillAndReap(m_pid);
+  if (m_pid <= 0) return;
+  KillAndReap(m_pid);
+  m_failures->receive();
 }
 
 void Child::kill(int signal) const {
@@ -113,14 +116,14 @@ void Child::kill(int signal) const {
 int Child::wait(int deadlineMs) {
   if (m_pid <= 0) return -1;
   int status = 0;
-  if (!ReapUntil(m_pid, Clock::now() + std::chrono::milliseconds(deadlineMs), &status)) {
+  bool ended = ReapUntil(m_pid, Clock::now() + std::chrono::milliseconds(deadlineMs), &status);
+  if (!ended) {
     ADD_FAILURE() << "child " << m_pid << " still runs after " << deadlineMs << " ms";
     KillAndReap(m_pid);
-    m_pid = -1;
-    return -1;
   }
+  m_failures->receive();
   m_pid = -1;
-  return ExitCode(status);
+  return ended ? ExitCode(status) : -1;
 }
 
 bool Child::running() const {

@@ -3,9 +3,12 @@
 #include <sys/types.h>
 
 #include <functional>
+#include <memory>
 #include <string>
 #include <utility>
 #include <vector>
+
+#include "tests/support/FailurePipe.h"
 
 namespace vlt::test {
 
@@ -15,12 +18,14 @@ inline constexpr int kDeadlineMs = 30000;
 //
 // The child ends with the function's result as exit code, without running destructors of statics;
 // an exception that leaves the function ends it with 99. A child that still runs when its object
-// goes is killed by its id and reaped; it also dies with its parent.
+// goes is killed by its id and reaped; it also dies with its parent. Its failed expectations become
+// failures of the parent's test when it is waited for or killed.
 class Child {
  public:
   explicit Child(const std::function<int()>& body);
   ~Child();
-  Child(Child&& other) noexcept : m_pid(std::exchange(other.m_pid, -1)) {}
+  Child(Child&& other) noexcept
+      : m_failures(std::move(other.m_failures)), m_pid(std::exchange(other.m_pid, -1)) {}
   Child(const Child&) = delete;
   Child& operator=(const Child&) = delete;
 
@@ -37,6 +42,7 @@ class Child {
   bool running() const;
 
  private:
+  std::unique_ptr<FailurePipe> m_failures;
   pid_t m_pid;
 };
 

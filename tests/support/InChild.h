@@ -28,10 +28,8 @@ inline bool Leaks() {
 }
 
 // Runs expectations in a forked process, for what a process does only once: look up its
-// installation, make its registrar. Returns 0 if all of them held and nothing leaked, 1 if not, 98
-// for a leak, and Child's codes otherwise.
-//
-//   EXPECT_EQ(InChild([&] { EXPECT_TRUE(...); }), 0);
+// installation, make its registrar. Failures become those of the calling test. Returns 0 if all of
+// them held and nothing leaked, 1 if not, 98 for a leak, and Child's codes otherwise.
 inline int InChild(const std::function<void()>& body, int deadlineMs = kDeadlineMs) {
   Child child([&] {
     int before = FailedExpectations();
@@ -42,4 +40,19 @@ inline int InChild(const std::function<void()>& body, int deadlineMs = kDeadline
   return child.wait(deadlineMs);
 }
 
+// The same; the calling test fails if the result is not 0.
+inline void ExpectInChild(const std::function<void()>& body, int deadlineMs = kDeadlineMs,
+                          const char* file = __builtin_FILE(), int line = __builtin_LINE()) {
+  int code = InChild(body, deadlineMs);
+  if (code != 0) ADD_FAILURE_AT(file, line) << "the child ended with " << code;
+}
+
 }  // namespace vlt::test
+
+// A test that runs whole in a child process of its own.
+//
+//   TEST_IN_CHILD(vltGetRegistrar, MakesTheDatabase) { EXPECT_EQ(...); }
+#define TEST_IN_CHILD(suite, name)                                          \
+  static void suite##_##name##_InChild();                                   \
+  TEST(suite, name) { vlt::test::ExpectInChild(suite##_##name##_InChild); } \
+  static void suite##_##name##_InChild()

@@ -40,11 +40,10 @@ class Places {
 std::string Read() { return vlReadPreference("d", "Dir").value_or("(none)"); }
 
 void In(const std::function<void(const Places&)>& body) {
-  EXPECT_EQ(InChild([&] {
-              Places places;
-              body(places);
-            }),
-            0);
+  ExpectInChild([&] {
+    Places places;
+    body(places);
+  });
 }
 
 TEST(LoaderPreference, NoFileIsNoValueAndNothingIsMade) {

@@ -78,75 +78,61 @@ class Storage : public Installation {
   TempDir m_notes;
 };
 
-TEST(Loader, ThePathIsTheDefaultWithoutAPreference) {
+TEST_IN_CHILD(Loader, ThePathIsTheDefaultWithoutAPreference) {
   TempDir empty;
-  EXPECT_EQ(InChild([&] {
-              setenv("XDG_CONFIG_HOME", empty.path().c_str(), 1);
-              EXPECT_STREQ(GetCurrentVltPath(), "/Library/Application Support/Zentrex/KOR");
-              EXPECT_STREQ(GetCurrentKorPath(), "/Library/Application Support/Zentrex/KOR");
-            }),
-            0);
+  setenv("XDG_CONFIG_HOME", empty.path().c_str(), 1);
+  EXPECT_STREQ(GetCurrentVltPath(), "/Library/Application Support/Zentrex/KOR");
+  EXPECT_STREQ(GetCurrentKorPath(), "/Library/Application Support/Zentrex/KOR");
 }
 
-TEST(Loader, ThePathIsLookedUpOnce) {
+TEST_IN_CHILD(Loader, ThePathIsLookedUpOnce) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              EXPECT_EQ(GetCurrentVltPath(), i.root());
-              Installation::setDir("/elsewhere");
-              EXPECT_EQ(GetCurrentVltPath(), i.root());
-              EXPECT_EQ(vlLookUpInstallDirectory(), "/elsewhere");
-            }),
-            0);
+  EXPECT_EQ(GetCurrentVltPath(), i.root());
+  Installation::setDir("/elsewhere");
+  EXPECT_EQ(GetCurrentVltPath(), i.root());
+  EXPECT_EQ(vlLookUpInstallDirectory(), "/elsewhere");
 }
 
-TEST(Loader, AnEmptyPathIsNull) {
+TEST_IN_CHILD(Loader, AnEmptyPathIsNull) {
   Installation i;
   Installation::setDir("");
-  EXPECT_EQ(InChild([] {
-              EXPECT_EQ(GetCurrentVltPath(), nullptr);
-              EXPECT_EQ(GetCurrentKorPath(), nullptr);
-            }),
-            0);
+  EXPECT_EQ(GetCurrentVltPath(), nullptr);
+  EXPECT_EQ(GetCurrentKorPath(), nullptr);
 }
 
-TEST(Loader, NothingElseIsKnown) {
+TEST_IN_CHILD(Loader, NothingElseIsKnown) {
   Installation i;
-  EXPECT_EQ(InChild([] {
-              EXPECT_EQ(GetInstalledVltPath(), nullptr);
-              EXPECT_EQ(GetInstalledVltVersion(), nullptr);
-              EXPECT_EQ(GetCurrentVltVersion(), nullptr);
-              EXPECT_EQ(GetInstalledKorPath(), nullptr);
-              EXPECT_EQ(GetInstalledKorVersion(), nullptr);
-              EXPECT_EQ(GetInstalledKorCommand(), nullptr);
-              EXPECT_EQ(GetCurrentKorCommand(), nullptr);
-              EXPECT_STREQ(GetCurrentKorVersion(), "");
-            }),
-            0);
+  EXPECT_EQ(GetInstalledVltPath(), nullptr);
+  EXPECT_EQ(GetInstalledVltVersion(), nullptr);
+  EXPECT_EQ(GetCurrentVltVersion(), nullptr);
+  EXPECT_EQ(GetInstalledKorPath(), nullptr);
+  EXPECT_EQ(GetInstalledKorVersion(), nullptr);
+  EXPECT_EQ(GetInstalledKorCommand(), nullptr);
+  EXPECT_EQ(GetCurrentKorCommand(), nullptr);
+  EXPECT_STREQ(GetCurrentKorVersion(), "");
 }
 
 TEST(Loader, WithoutAPathTheLoadingIsGivenUpWithAWord) {
   Installation i;
   Installation::setDir("");
   TempDir out;
-  EXPECT_EQ(InChild([&] {
-              ASSERT_TRUE(freopen((out / "text").c_str(), "w", stdout));
-              EXPECT_FALSE(IsKorStoragePresent());
-              fflush(stdout);
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_TRUE(freopen((out / "text").c_str(), "w", stdout));
+    EXPECT_FALSE(IsKorStoragePresent());
+    fflush(stdout);
+  });
   EXPECT_EQ(ReadBytes(out / "text"), "Failed to get kor install path.\n");
 }
 
 TEST(Loader, BothModulesMakeTheStoragePresent) {
   for (bool bundles : {true, false}) {
     Storage s(bundles);
-    EXPECT_EQ(InChild([&] {
-                EXPECT_TRUE(IsKorStoragePresent());
-                EXPECT_TRUE(IsMapped(s.fileOf("vlt", bundles)));
-                EXPECT_TRUE(IsMapped(s.fileOf("vltutils", bundles)));
-                EXPECT_EQ(s.notes(), "");
-              }),
-              0);
+    ExpectInChild([&] {
+      EXPECT_TRUE(IsKorStoragePresent());
+      EXPECT_TRUE(IsMapped(s.fileOf("vlt", bundles)));
+      EXPECT_TRUE(IsMapped(s.fileOf("vltutils", bundles)));
+      EXPECT_EQ(s.notes(), "");
+    });
   }
 }
 
@@ -154,244 +140,195 @@ TEST(Loader, AMissingModuleStaysMissingForTheProcess) {
   for (const char* missing : {"vlt", "vltutils"}) {
     Storage s;
     TempDir aside;
-    EXPECT_EQ(InChild([&] {
-                std::string bundle = s.root() + "/" + missing + ".framework";
-                std::filesystem::rename(bundle, aside / "bundle");
-                EXPECT_FALSE(IsKorStoragePresent());
-                std::filesystem::rename(aside / "bundle", bundle);
-                EXPECT_FALSE(IsKorStoragePresent());
-                int status = 7;
-                EXPECT_EQ(GetKorConfiguration2(1, nullptr, &status), nullptr);
-                EXPECT_EQ(status, E_FAIL);
-              }),
-              0)
-        << missing;
+    SCOPED_TRACE(missing);
+    ExpectInChild([&] {
+      std::string bundle = s.root() + "/" + missing + ".framework";
+      std::filesystem::rename(bundle, aside / "bundle");
+      EXPECT_FALSE(IsKorStoragePresent());
+      std::filesystem::rename(aside / "bundle", bundle);
+      EXPECT_FALSE(IsKorStoragePresent());
+      int status = 7;
+      EXPECT_EQ(GetKorConfiguration2(1, nullptr, &status), nullptr);
+      EXPECT_EQ(status, E_FAIL);
+    });
   }
 }
 
-TEST(Loader, ABundleWithoutItsLibraryIsMissing) {
+TEST_IN_CHILD(Loader, ABundleWithoutItsLibraryIsMissing) {
   Storage s;
   std::filesystem::remove(s.fileOf("vlt"));
   WriteBytes(s.root() + "/libvlt.so", "not asked for where there is a bundle");
-  EXPECT_EQ(InChild([&] { EXPECT_FALSE(IsKorStoragePresent()); }), 0);
+  EXPECT_FALSE(IsKorStoragePresent());
 }
 
-TEST(Loader, FinalizeWithoutInitializeFails) {
+TEST_IN_CHILD(Loader, FinalizeWithoutInitializeFails) {
   Storage s;
-  EXPECT_EQ(InChild([&] {
-              EXPECT_EQ(KorFinalize(), E_FAIL);
-              EXPECT_TRUE(IsKorStoragePresent());
-              EXPECT_EQ(KorFinalize(), E_FAIL);
-              EXPECT_EQ(s.notes(), "");
-            }),
-            0);
+  EXPECT_EQ(KorFinalize(), E_FAIL);
+  EXPECT_TRUE(IsKorStoragePresent());
+  EXPECT_EQ(KorFinalize(), E_FAIL);
+  EXPECT_EQ(s.notes(), "");
 }
 
-TEST(Loader, TheLastFinalizeCleansUp) {
+TEST_IN_CHILD(Loader, TheLastFinalizeCleansUp) {
   Storage s;
-  EXPECT_EQ(InChild([&] {
-              EXPECT_EQ(KorInitialize(), 1);  // the storage's own answer
-              EXPECT_EQ(KorInitialize(), S_OK);
-              EXPECT_EQ(s.notes(), "initialize\n");
-              EXPECT_TRUE(IsKorStoragePresent());
-              EXPECT_EQ(KorFinalize(), S_OK);
-              EXPECT_EQ(s.notes(), "initialize\n");
-              EXPECT_TRUE(IsMapped(s.fileOf("vlt")));
-              EXPECT_EQ(KorFinalize(), 2);
-              EXPECT_EQ(s.notes(), "initialize\nfinalize\n");
-              EXPECT_FALSE(IsMapped(s.fileOf("vlt")));
-              EXPECT_FALSE(IsMapped(s.fileOf("vltutils")));
-              EXPECT_EQ(KorFinalize(), E_FAIL);
-            }),
-            0);
+  EXPECT_EQ(KorInitialize(), 1);  // the storage's own answer
+  EXPECT_EQ(KorInitialize(), S_OK);
+  EXPECT_EQ(s.notes(), "initialize\n");
+  EXPECT_TRUE(IsKorStoragePresent());
+  EXPECT_EQ(KorFinalize(), S_OK);
+  EXPECT_EQ(s.notes(), "initialize\n");
+  EXPECT_TRUE(IsMapped(s.fileOf("vlt")));
+  EXPECT_EQ(KorFinalize(), 2);
+  EXPECT_EQ(s.notes(), "initialize\nfinalize\n");
+  EXPECT_FALSE(IsMapped(s.fileOf("vlt")));
+  EXPECT_FALSE(IsMapped(s.fileOf("vltutils")));
+  EXPECT_EQ(KorFinalize(), E_FAIL);
 }
 
-TEST(Loader, AfterACleanUpThePreferenceIsReadAnew) {
+TEST_IN_CHILD(Loader, AfterACleanUpThePreferenceIsReadAnew) {
   Storage s;
-  EXPECT_EQ(InChild([&] {
-              KorInitialize();
-              EXPECT_EQ(GetCurrentVltPath(), s.root());
-              Installation::setDir("/elsewhere");
-              KorFinalize();
-              EXPECT_STREQ(GetCurrentVltPath(), "/elsewhere");
-            }),
-            0);
+  KorInitialize();
+  EXPECT_EQ(GetCurrentVltPath(), s.root());
+  Installation::setDir("/elsewhere");
+  KorFinalize();
+  EXPECT_STREQ(GetCurrentVltPath(), "/elsewhere");
 }
 
 // A caller may still be copying the text while another one cleans up.
-TEST(Loader, ThePathOutlivesACleanUp) {
+TEST_IN_CHILD(Loader, ThePathOutlivesACleanUp) {
   Storage s;
-  EXPECT_EQ(InChild([&] {
-              KorInitialize();
-              const char* text = GetCurrentVltPath();
-              EXPECT_GT(s.root().size(), 16u);  // no text that lies in its object
-              std::string other = "/elsewhere" + s.root();
-              Installation::setDir(other);
-              KorFinalize();
-              EXPECT_STREQ(text, "");
-              EXPECT_EQ(GetCurrentVltPath(), other);
-              EXPECT_EQ(text, other);
-            }),
-            0);
+  KorInitialize();
+  const char* text = GetCurrentVltPath();
+  EXPECT_GT(s.root().size(), 16u);  // no text that lies in its object
+  std::string other = "/elsewhere" + s.root();
+  Installation::setDir(other);
+  KorFinalize();
+  EXPECT_STREQ(text, "");
+  EXPECT_EQ(GetCurrentVltPath(), other);
+  EXPECT_EQ(text, other);
 }
 
 // Each forwarded call before KorInitialize counts a load that nothing takes back.
-TEST(Loader, LoadsBeforeInitializeKeepTheModules) {
+TEST_IN_CHILD(Loader, LoadsBeforeInitializeKeepTheModules) {
   Storage s;
-  EXPECT_EQ(InChild([&] {
-              EXPECT_TRUE(IsKorStoragePresent());
-              KorInitialize();
-              EXPECT_EQ(KorFinalize(), 2);
-              EXPECT_TRUE(IsMapped(s.fileOf("vlt")));
-            }),
-            0);
+  EXPECT_TRUE(IsKorStoragePresent());
+  KorInitialize();
+  EXPECT_EQ(KorFinalize(), 2);
+  EXPECT_TRUE(IsMapped(s.fileOf("vlt")));
 }
 
-TEST(Loader, LoadsWhileInitializedAreNotCounted) {
+TEST_IN_CHILD(Loader, LoadsWhileInitializedAreNotCounted) {
   Storage s;
-  EXPECT_EQ(InChild([&] {
-              KorInitialize();
-              for (int n = 0; n < 5; ++n) IsKorStoragePresent();
-              KorFinalize();
-              EXPECT_FALSE(IsMapped(s.fileOf("vlt")));
-            }),
-            0);
+  KorInitialize();
+  for (int n = 0; n < 5; ++n) IsKorStoragePresent();
+  KorFinalize();
+  EXPECT_FALSE(IsMapped(s.fileOf("vlt")));
 }
 
-TEST(Loader, InitializeWithoutAStorageSucceedsAndIsInEffect) {
+TEST_IN_CHILD(Loader, InitializeWithoutAStorageSucceedsAndIsInEffect) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              EXPECT_EQ(KorInitialize(), S_OK);
-              EXPECT_FALSE(IsKorStoragePresent());
-              EXPECT_EQ(KorFinalize(), S_OK);
-              EXPECT_EQ(KorFinalize(), E_FAIL);
-            }),
-            0);
+  EXPECT_EQ(KorInitialize(), S_OK);
+  EXPECT_FALSE(IsKorStoragePresent());
+  EXPECT_EQ(KorFinalize(), S_OK);
+  EXPECT_EQ(KorFinalize(), E_FAIL);
 }
 
-TEST(Loader, ASaturatedCountNeverFalls) {
+TEST_IN_CHILD(Loader, ASaturatedCountNeverFalls) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              for (int n = 0; n < 1000005; ++n) KorInitialize();
-              for (int n = 0; n < 1000010; ++n) ASSERT_EQ(KorFinalize(), S_OK);
-            }),
-            0);
+  for (int n = 0; n < 1000005; ++n) KorInitialize();
+  for (int n = 0; n < 1000010; ++n) ASSERT_EQ(KorFinalize(), S_OK);
 }
 
-TEST(Loader, ACountBelowSaturationFalls) {
+TEST_IN_CHILD(Loader, ACountBelowSaturationFalls) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              for (int n = 0; n < 999998; ++n) KorInitialize();
-              for (int n = 0; n < 999998; ++n) ASSERT_EQ(KorFinalize(), S_OK);
-              EXPECT_EQ(KorFinalize(), E_FAIL);
-            }),
-            0);
+  for (int n = 0; n < 999998; ++n) KorInitialize();
+  for (int n = 0; n < 999998; ++n) ASSERT_EQ(KorFinalize(), S_OK);
+  EXPECT_EQ(KorFinalize(), E_FAIL);
 }
 
-TEST(Loader, ConfigurationsComeWithTheStoragesResult) {
+TEST_IN_CHILD(Loader, ConfigurationsComeWithTheStoragesResult) {
   Storage s;
-  EXPECT_EQ(InChild([&] {
-              int status = 7;
-              EXPECT_NE(GetKorConfiguration2(1, nullptr, &status), nullptr);
-              EXPECT_EQ(status, S_OK);
-              wchar_t five[] = L"5";
-              EXPECT_NE(GetKorConfiguration2(1, five, &status), nullptr);
-              EXPECT_EQ(status, 5);
-              EXPECT_EQ(GetKorConfiguration2(3, nullptr, &status), nullptr);
-              EXPECT_EQ(status, E_NOTIMPL);
-              EXPECT_NE(GetKorConfiguration2(1, nullptr, nullptr), nullptr);
-              EXPECT_NE(GetKorConfiguration(1, nullptr), nullptr);
-              EXPECT_EQ(GetKorConfiguration(0, nullptr), nullptr);
-              EXPECT_EQ(s.notes(),
-                        "configuration\nconfiguration\nconfiguration\nconfiguration\n"
-                        "configuration\nconfiguration\n");
-            }),
-            0);
+  int status = 7;
+  EXPECT_NE(GetKorConfiguration2(1, nullptr, &status), nullptr);
+  EXPECT_EQ(status, S_OK);
+  wchar_t five[] = L"5";
+  EXPECT_NE(GetKorConfiguration2(1, five, &status), nullptr);
+  EXPECT_EQ(status, 5);
+  EXPECT_EQ(GetKorConfiguration2(3, nullptr, &status), nullptr);
+  EXPECT_EQ(status, E_NOTIMPL);
+  EXPECT_NE(GetKorConfiguration2(1, nullptr, nullptr), nullptr);
+  EXPECT_NE(GetKorConfiguration(1, nullptr), nullptr);
+  EXPECT_EQ(GetKorConfiguration(0, nullptr), nullptr);
+  EXPECT_EQ(s.notes(),
+            "configuration\nconfiguration\nconfiguration\nconfiguration\n"
+            "configuration\nconfiguration\n");
 }
 
-TEST(Loader, SuccessWithoutAConfigurationIsAFailure) {
+TEST_IN_CHILD(Loader, SuccessWithoutAConfigurationIsAFailure) {
   Storage s;
-  EXPECT_EQ(InChild([&] {
-              int status = 7;
-              EXPECT_EQ(GetKorConfiguration2(0, nullptr, &status), nullptr);
-              EXPECT_EQ(status, E_FAIL);
-            }),
-            0);
+  int status = 7;
+  EXPECT_EQ(GetKorConfiguration2(0, nullptr, &status), nullptr);
+  EXPECT_EQ(status, E_FAIL);
 }
 
-TEST(Loader, NullOptionsLoadNothing) {
+TEST_IN_CHILD(Loader, NullOptionsLoadNothing) {
   Storage s;
-  EXPECT_EQ(InChild([&] {
-              int status = 7;
-              EXPECT_EQ(GetKorConfigurationEx(nullptr, &status), nullptr);
-              EXPECT_EQ(status, E_POINTER);
-              EXPECT_EQ(GetKorConfigurationEx(nullptr, nullptr), nullptr);
-              EXPECT_FALSE(IsMapped(s.fileOf("vlt")));
-              int options = 0;
-              auto* some = reinterpret_cast<_vltStartupOptions*>(&options);
-              EXPECT_EQ(GetKorConfigurationEx(some, &status), some);
-              EXPECT_EQ(status, S_OK);
-            }),
-            0);
+  int status = 7;
+  EXPECT_EQ(GetKorConfigurationEx(nullptr, &status), nullptr);
+  EXPECT_EQ(status, E_POINTER);
+  EXPECT_EQ(GetKorConfigurationEx(nullptr, nullptr), nullptr);
+  EXPECT_FALSE(IsMapped(s.fileOf("vlt")));
+  int options = 0;
+  auto* some = reinterpret_cast<_vltStartupOptions*>(&options);
+  EXPECT_EQ(GetKorConfigurationEx(some, &status), some);
+  EXPECT_EQ(status, S_OK);
 }
 
-TEST(Loader, ConversionsAreForwarded) {
+TEST_IN_CHILD(Loader, ConversionsAreForwarded) {
   Storage s;
-  EXPECT_EQ(InChild([&] {
-              TaskMem<wchar_t> seven(KorU32ToString(7)), nine(KorGuidToString({9, 0, 0, {}}));
-              EXPECT_STREQ(seven.get(), L"seven");
-              EXPECT_STREQ(nine.get(), L"nine");
-              EXPECT_EQ(KorGuidFromString("twelve chars").Data1, 12u);
-              EXPECT_EQ(KorGuidFromString(nullptr).Data1, 0u);
-              EXPECT_EQ(KorFree(malloc(1)), nullptr);
-            }),
-            0);
+  TaskMem<wchar_t> seven(KorU32ToString(7)), nine(KorGuidToString({9, 0, 0, {}}));
+  EXPECT_STREQ(seven.get(), L"seven");
+  EXPECT_STREQ(nine.get(), L"nine");
+  EXPECT_EQ(KorGuidFromString("twelve chars").Data1, 12u);
+  EXPECT_EQ(KorGuidFromString(nullptr).Data1, 0u);
+  EXPECT_EQ(KorFree(malloc(1)), nullptr);
 }
 
-TEST(Loader, WithoutAStorageConversionsAnswerNothing) {
+TEST_IN_CHILD(Loader, WithoutAStorageConversionsAnswerNothing) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              EXPECT_EQ(KorU32ToString(7), nullptr);
-              EXPECT_EQ(KorGuidToString({9, 0, 0, {}}), nullptr);
-              EXPECT_TRUE(KorGuidFromString("x") == GUID_NULL);
-              int here = 0;
-              EXPECT_EQ(KorFree(&here), nullptr);
-            }),
-            0);
+  EXPECT_EQ(KorU32ToString(7), nullptr);
+  EXPECT_EQ(KorGuidToString({9, 0, 0, {}}), nullptr);
+  EXPECT_TRUE(KorGuidFromString("x") == GUID_NULL);
+  int here = 0;
+  EXPECT_EQ(KorFree(&here), nullptr);
 }
 
-TEST(Loader, ANameThatIsNotFoundIsLeftOut) {
+TEST_IN_CHILD(Loader, ANameThatIsNotFoundIsLeftOut) {
   Storage s;
   BuildModule(s.fileOf("vlt"), "extern \"C\" int vltSomething() { return 0; }");
-  EXPECT_EQ(InChild([&] {
-              EXPECT_TRUE(IsKorStoragePresent());
-              int status = 7;
-              EXPECT_EQ(GetKorConfiguration2(1, nullptr, &status), nullptr);
-              EXPECT_EQ(status, E_FAIL);
-              EXPECT_EQ(KorInitialize(), S_OK);
-              EXPECT_EQ(KorFinalize(), S_OK);
-            }),
-            0);
+  EXPECT_TRUE(IsKorStoragePresent());
+  int status = 7;
+  EXPECT_EQ(GetKorConfiguration2(1, nullptr, &status), nullptr);
+  EXPECT_EQ(status, E_FAIL);
+  EXPECT_EQ(KorInitialize(), S_OK);
+  EXPECT_EQ(KorFinalize(), S_OK);
 }
 
-TEST(Loader, ThreadsMayAskAtOnce) {
+TEST_IN_CHILD(Loader, ThreadsMayAskAtOnce) {
   Storage s;
-  EXPECT_EQ(InChild([&] {
-              std::vector<std::thread> threads;
-              for (int n = 0; n < 4; ++n) {
-                threads.emplace_back([] {
-                  for (int k = 0; k < 50; ++k) {
-                    KorInitialize();
-                    EXPECT_TRUE(IsKorStoragePresent());
-                    EXPECT_NE(GetCurrentVltPath(), nullptr);
-                    KorFinalize();
-                  }
-                });
-              }
-              for (auto& thread : threads) thread.join();
-              EXPECT_EQ(KorFinalize(), E_FAIL);
-            }),
-            0);
+  std::vector<std::thread> threads;
+  for (int n = 0; n < 4; ++n) {
+    threads.emplace_back([] {
+      for (int k = 0; k < 50; ++k) {
+        KorInitialize();
+        EXPECT_TRUE(IsKorStoragePresent());
+        EXPECT_NE(GetCurrentVltPath(), nullptr);
+        KorFinalize();
+      }
+    });
+  }
+  for (auto& thread : threads) thread.join();
+  EXPECT_EQ(KorFinalize(), E_FAIL);
 }
 
 }  // namespace

@@ -34,13 +34,12 @@ struct Answer {
 Answer Ask(const char* separator, const wchar_t* file, const wchar_t* key = L"Key",
            unsigned maxLength = 1024) {
   TempDir dir;
-  EXPECT_EQ(InChild([&] {
-              TaskMem<char> out;
-              HRESULT result = vltGetStringResource(separator, file, key, out.out(), maxLength);
-              WriteBytes(dir / "result", std::to_string(result));
-              WriteBytes(dir / "text", out ? out.get() : "(untouched)");
-            }),
-            0);
+  ExpectInChild([&] {
+    TaskMem<char> out;
+    HRESULT result = vltGetStringResource(separator, file, key, out.out(), maxLength);
+    WriteBytes(dir / "result", std::to_string(result));
+    WriteBytes(dir / "text", out ? out.get() : "(untouched)");
+  });
   return {static_cast<HRESULT>(std::stol(ReadBytes(dir / "result"))), ReadBytes(dir / "text")};
 }
 
@@ -134,15 +133,12 @@ TEST(StringResource, WhatIsMissingIsPassedOver) {
   Expect(Ask(";", L"/a.vle"), S_OK, "a");
 }
 
-TEST(StringResource, WithoutADatabaseOrItsListThereIsNothing) {
+TEST_IN_CHILD(StringResource, WithoutADatabaseOrItsListThereIsNothing) {
   Installation i;
   Expect(Ask(nullptr, L"/a.vle"), E_FAIL, "(untouched)");
   WriteBytes(i.database(), "[A]\nFileName = \"/a.vle\"\nKey = \"a\"\n");
   Expect(Ask(nullptr, L"/a.vle"), E_FAIL, "(untouched)");
-  EXPECT_EQ(InChild([] {
-              EXPECT_EQ(vltGetStringResource(nullptr, L"/a", L"k", nullptr, 10), E_POINTER);
-            }),
-            0);
+  EXPECT_EQ(vltGetStringResource(nullptr, L"/a", L"k", nullptr, 10), E_POINTER);
 }
 
 TEST(StringResource, PreviousDictionariesHaveADatabaseBesideThem) {
@@ -174,43 +170,37 @@ TEST(StringResource, StoredNamesCountUpToTheirLimit) {
   Expect(Ask(nullptr, L"/1234567890"), E_FAIL, "(untouched)");
 }
 
-TEST(StringResource, ManyQuestionsReadTheDatabaseOnce) {
+TEST_IN_CHILD(StringResource, ManyQuestionsReadTheDatabaseOnce) {
   Database d;
-  EXPECT_EQ(InChild([&] {
-              vltStringResources resources;
-              auto ask = [&] {
-                TaskMem<char> out;
-                EXPECT_EQ(resources.get(nullptr, L"/two.vle", L"Key", out.out(), 100), S_OK);
-                return std::string(out.get());
-              };
-              EXPECT_EQ(ask(), "third");
-              WriteBytes(d.database(),
-                         "[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/two.vle\"\nKey = \"n\"\n");
-              EXPECT_EQ(ask(), "third");
-              resources.forget();
-              EXPECT_EQ(ask(), "n");
-            }),
-            0);
+  vltStringResources resources;
+  auto ask = [&] {
+    TaskMem<char> out;
+    EXPECT_EQ(resources.get(nullptr, L"/two.vle", L"Key", out.out(), 100), S_OK);
+    return std::string(out.get());
+  };
+  EXPECT_EQ(ask(), "third");
+  WriteBytes(d.database(),
+             "[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/two.vle\"\nKey = \"n\"\n");
+  EXPECT_EQ(ask(), "third");
+  resources.forget();
+  EXPECT_EQ(ask(), "n");
 }
 
-TEST(StringResource, AWantOfMemoryIsNotRemembered) {
+TEST_IN_CHILD(StringResource, AWantOfMemoryIsNotRemembered) {
   if (!kCanLimitMemory) GTEST_SKIP() << "NOT TESTED: the sanitizer owns the address space";
   Database d;
-  EXPECT_EQ(InChild([&] {
-              constexpr unsigned kMuch = 128u << 20;
-              vltStringResources resources;
-              auto ask = [&] {
-                TaskMem<char> out;
-                return resources.get(nullptr, L"/two.vle", L"Key", out.out(), kMuch);
-              };
-              rlimit before;
-              getrlimit(RLIMIT_AS, &before);
-              LimitMemoryTo(kMuch / 2);
-              EXPECT_EQ(ask(), E_FAIL);
-              setrlimit(RLIMIT_AS, &before);
-              EXPECT_EQ(ask(), S_OK);
-            }),
-            0);
+  constexpr unsigned kMuch = 128u << 20;
+  vltStringResources resources;
+  auto ask = [&] {
+    TaskMem<char> out;
+    return resources.get(nullptr, L"/two.vle", L"Key", out.out(), kMuch);
+  };
+  rlimit before;
+  getrlimit(RLIMIT_AS, &before);
+  LimitMemoryTo(kMuch / 2);
+  EXPECT_EQ(ask(), E_FAIL);
+  setrlimit(RLIMIT_AS, &before);
+  EXPECT_EQ(ask(), S_OK);
 }
 
 TEST(StringResource, BinaryOnesDoNotExist) { EXPECT_EQ(vltGetBinaryResource(), 0); }
@@ -220,30 +210,28 @@ TEST(StringResource, BinaryOnesDoNotExist) { EXPECT_EQ(vltGetBinaryResource(), 0
 // What a child prints in an installation with these trace flags.
 std::string Printed(const std::string& flags, const std::function<void()>& body) {
   TempDir out;
-  EXPECT_EQ(InChild([&] {
-              WriteBytes(vlLookUpInstallDirectory() + "/vlttrace.txt", flags);
-              ASSERT_TRUE(freopen((out / "text").c_str(), "w", stdout));
-              body();
-              fflush(stdout);
-            }),
-            0);
+  ExpectInChild([&] {
+    WriteBytes(vlLookUpInstallDirectory() + "/vlttrace.txt", flags);
+    ASSERT_TRUE(freopen((out / "text").c_str(), "w", stdout));
+    body();
+    fflush(stdout);
+  });
   return ReadBytes(out / "text");
 }
 
 TEST(EarlyTrace, LinesHaveTheirForm) {
   TempDir out;
   std::string expected;
-  EXPECT_EQ(InChild([&] {
-              ASSERT_TRUE(freopen((out / "text").c_str(), "w", stdout));
-              vltEarlyTrace("source", 7, "text %s %d", "x", 5);
-              vltEarlyTrace("source", 8, "%s", std::string(5000, 'l').c_str());
-              fflush(stdout);
-              char line[200];
-              snprintf(line, sizeof line, "source(7) : trace %d %ld: text x 5\n",
-                       static_cast<int>(getpid()), static_cast<long>(pthread_self()));
-              EXPECT_EQ(ReadBytes(out / "text").substr(0, strlen(line)), line);
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_TRUE(freopen((out / "text").c_str(), "w", stdout));
+    vltEarlyTrace("source", 7, "text %s %d", "x", 5);
+    vltEarlyTrace("source", 8, "%s", std::string(5000, 'l').c_str());
+    fflush(stdout);
+    char line[200];
+    snprintf(line, sizeof line, "source(7) : trace %d %ld: text x 5\n", static_cast<int>(getpid()),
+             static_cast<long>(pthread_self()));
+    EXPECT_EQ(ReadBytes(out / "text").substr(0, strlen(line)), line);
+  });
   EXPECT_NE(ReadBytes(out / "text").find("source(8) : trace"), std::string::npos);
 }
 
@@ -306,12 +294,11 @@ TEST(EarlyTrace, AnswersDoNotDependOnTheFlags) {
   for (const char* flags : {"0 0", "3 0"}) {
     Database d;
     WriteBytes(d.root() + "/vlttrace.txt", flags);
-    EXPECT_EQ(InChild([] {
-                Expect(Ask(";", L"/one.vle"), S_OK, "first;second");
-                Expect(Ask(nullptr, L"/one.vle", L"OnlyB"), E_FAIL, "(untouched)");
-                Expect(Ask(";", L"/one.vle", L"OnlyB"), S_OK, "b");
-              }),
-              0);
+    ExpectInChild([] {
+      Expect(Ask(";", L"/one.vle"), S_OK, "first;second");
+      Expect(Ask(nullptr, L"/one.vle", L"OnlyB"), E_FAIL, "(untouched)");
+      Expect(Ask(";", L"/one.vle", L"OnlyB"), S_OK, "b");
+    });
   }
 }
 
@@ -321,7 +308,7 @@ unsigned Flags(const std::string& bytes) {
   Installation i;
   WriteBytes(i.root() + "/vlttrace.txt", bytes);
   TempDir out;
-  EXPECT_EQ(InChild([&] { WriteBytes(out / "flags", std::to_string(vltGetTraceFlags())); }), 0);
+  ExpectInChild([&] { WriteBytes(out / "flags", std::to_string(vltGetTraceFlags())); });
   return static_cast<unsigned>(std::stoul(ReadBytes(out / "flags")));
 }
 
@@ -335,20 +322,17 @@ TEST(EarlyTrace, FlagsAreTwoNumbers) {
   EXPECT_EQ(Flags("16 1"), 16u);
 }
 
-TEST(EarlyTrace, FlagsAreReadOnce) {
+TEST_IN_CHILD(EarlyTrace, FlagsAreReadOnce) {
   Installation i;
-  EXPECT_EQ(InChild([&] {
-              EXPECT_EQ(vltGetTraceFlags(), 0u);
-              WriteBytes(i.root() + "/vlttrace.txt", "1 2");
-              EXPECT_EQ(vltGetTraceFlags(), 0u);
-            }),
-            0);
+  EXPECT_EQ(vltGetTraceFlags(), 0u);
+  WriteBytes(i.root() + "/vlttrace.txt", "1 2");
+  EXPECT_EQ(vltGetTraceFlags(), 0u);
 }
 
 TEST(EarlyTrace, APipeInTheFlagsPlaceDoesNotHoldUp) {
   Installation i;
   ASSERT_EQ(mkfifo((i.root() + "/vlttrace.txt").c_str(), 0666), 0);
-  EXPECT_EQ(InChild([&] { EXPECT_EQ(vltGetTraceFlags(), 0u); }, 5000), 0);
+  ExpectInChild([&] { EXPECT_EQ(vltGetTraceFlags(), 0u); }, 5000);
 }
 
 // ---- The log directory
@@ -357,40 +341,37 @@ TEST(LogDirectory, ForOthersThanTheSuperuser) {
   if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
   TempDir home;
   chmod(home.path().c_str(), 0777);
-  EXPECT_EQ(InChild([&] {
-              ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
-              setenv("HOME", home.path().c_str(), 1);
-              ScopedUmask mask(077);
-              zt::fnd::AnsiString ini;
-              zt::fnd::String directory = vlCreateLogDirIfNeeded(ini);
-              std::string expected = home / "Library/Logs/KOR/";
-              EXPECT_EQ(std::string(zt::fnd::AnsiString(directory).c_str()), expected);
-              EXPECT_STREQ(ini.c_str(), "/Library/Application Support/Zentrex/KOR/Data/vldiag.ini");
-              EXPECT_EQ(ModeOf(home / "Library/Logs/KOR"), 0777);
-              EXPECT_EQ(ModeOf(home / "Library"), 0777);
-              // A home that gives no directory is no failure.
-              setenv("HOME", "", 1);
-              vlCreateLogDirIfNeeded(ini);
-              setenv("HOME", "/proc/nowhere", 1);
-              EXPECT_STREQ(zt::fnd::AnsiString(vlCreateLogDirIfNeeded(ini)).c_str(),
-                           "/proc/nowhere/Library/Logs/KOR/");
-            }),
-            0);
+  ExpectInChild([&] {
+    ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+    setenv("HOME", home.path().c_str(), 1);
+    ScopedUmask mask(077);
+    zt::fnd::AnsiString ini;
+    zt::fnd::String directory = vlCreateLogDirIfNeeded(ini);
+    std::string expected = home / "Library/Logs/KOR/";
+    EXPECT_EQ(std::string(zt::fnd::AnsiString(directory).c_str()), expected);
+    EXPECT_STREQ(ini.c_str(), "/Library/Application Support/Zentrex/KOR/Data/vldiag.ini");
+    EXPECT_EQ(ModeOf(home / "Library/Logs/KOR"), 0777);
+    EXPECT_EQ(ModeOf(home / "Library"), 0777);
+    // A home that gives no directory is no failure.
+    setenv("HOME", "", 1);
+    vlCreateLogDirIfNeeded(ini);
+    setenv("HOME", "/proc/nowhere", 1);
+    EXPECT_STREQ(zt::fnd::AnsiString(vlCreateLogDirIfNeeded(ini)).c_str(),
+                 "/proc/nowhere/Library/Logs/KOR/");
+  });
 }
 
 TEST(LogDirectory, WithoutAHomeItIsTheTemporaryOne) {
   if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
-  EXPECT_EQ(InChild([&] {
-              // The place is fixed; a user without the right to make it shows the text alone.
-              ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
-              unsetenv("HOME");
-              zt::fnd::AnsiString ini;
-              bool there = Exists("/tmp/zentrex");
-              EXPECT_STREQ(zt::fnd::AnsiString(vlCreateLogDirIfNeeded(ini)).c_str(),
-                           "/tmp/zentrex/KOR/");
-              if (!there) std::filesystem::remove_all("/tmp/zentrex");
-            }),
-            0);
+  ExpectInChild([&] {
+    // The place is fixed; a user without the right to make it shows the text alone.
+    ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
+    unsetenv("HOME");
+    zt::fnd::AnsiString ini;
+    bool there = Exists("/tmp/zentrex");
+    EXPECT_STREQ(zt::fnd::AnsiString(vlCreateLogDirIfNeeded(ini)).c_str(), "/tmp/zentrex/KOR/");
+    if (!there) std::filesystem::remove_all("/tmp/zentrex");
+  });
 }
 
 TEST(TracerOptions, ComeFromTheSectionThenFromAllComponentsThenFromDefaults) {

@@ -86,21 +86,19 @@ TEST(ForkClose, UnmarkedAndRemarkedDescriptors) {
 }
 
 // In a process of its own, where no other object's number is free after a fork.
-TEST(ForkClose, GrandchildDoesNotCloseTheNumberAgain) {
+TEST_IN_CHILD(ForkClose, GrandchildDoesNotCloseTheNumberAgain) {
   TempDir dir;
-  EXPECT_EQ(0, vlt::test::InChild([&] {
-              CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
-              const int number = fd.get();
-              Child child([&] {
-                ScopedFd reused(fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, number));
-                if (reused.get() != number) return 1;
-                Child grandchild([&] { return IsOpen(reused.get()) ? 0 : 2; });
-                int code = grandchild.wait();
-                fd.reset();  // nor does the object
-                return code == 0 && !IsOpen(reused.get()) ? 3 : code;
-              });
-              EXPECT_EQ(0, child.wait());
-            }));
+  CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
+  const int number = fd.get();
+  Child child([&] {
+    ScopedFd reused(fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, number));
+    if (reused.get() != number) return 1;
+    Child grandchild([&] { return IsOpen(reused.get()) ? 0 : 2; });
+    int code = grandchild.wait();
+    fd.reset();  // nor does the object
+    return code == 0 && !IsOpen(reused.get()) ? 3 : code;
+  });
+  EXPECT_EQ(0, child.wait());
 }
 
 // Daemons close all descriptors they find, and open others.

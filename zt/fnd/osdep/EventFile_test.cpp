@@ -219,23 +219,21 @@ TEST(EventFile, FailuresLeaveNoDescriptor) {
 }
 
 // In a process of its own, where no other object's descriptor is closed by a fork.
-TEST(EventFile, ChildOfAnOpeningHasNoCopyAndOneOfASettledFileUnlocksNothing) {
+TEST_IN_CHILD(EventFile, ChildOfAnOpeningHasNoCopyAndOneOfASettledFileUnlocksNothing) {
   EventPlace place;
-  EXPECT_EQ(0, vlt::test::InChild([&] {
-              EventFile file = EventFile::Open(L"name");
-              int before = OpenDescriptors();
-              Child early([&] { return OpenDescriptors() == before - 1 ? 0 : 1; });
-              EXPECT_EQ(0, early.wait());
-              ASSERT_TRUE(file.share());
-              file.settle();
-              Child late([&] {
-                if (OpenDescriptors() != before) return 1;
-                file.close();
-                return OpenDescriptors() == before - 1 ? 0 : 2;
-              });
-              EXPECT_EQ(0, late.wait());
-              EXPECT_NE(0, Flock(OpenRaw(place.file("name")).get(), LOCK_EX | LOCK_NB));
-            }));
+  auto openInAChild = [] { return Child(OpenDescriptors).wait(); };
+  int without = openInAChild();
+  EventFile file = EventFile::Open(L"name");
+  EXPECT_EQ(openInAChild(), without);
+  ASSERT_TRUE(file.share());
+  file.settle();
+  EXPECT_EQ(openInAChild(), without + 1);
+  EXPECT_EQ(Child([&] {
+              file.close();
+              return OpenDescriptors();
+            }).wait(),
+            without);
+  EXPECT_NE(0, Flock(OpenRaw(place.file("name")).get(), LOCK_EX | LOCK_NB));
 }
 
 TEST(EventFile, FileOfAnOpeningThatFailsIsGone) {

@@ -21,7 +21,7 @@ namespace {
 
 using vlt::test::CompiledLocales;
 using vlt::test::ForkStorm;
-using vlt::test::InChild;
+using vlt::test::ExpectInChild;
 using vlt::test::MutexPlace;
 
 class ForkThreads : public testing::Test {
@@ -34,16 +34,16 @@ class ForkThreads : public testing::Test {
 
   void storm(
       const std::function<bool()>& call, const std::function<void()>& prepare = [] {}) {
-    EXPECT_EQ(0, InChild(
-                     [&] {
-                       prepare();
-                       ForkStorm result = vlt::test::RunForkStorm([&] { call(); }, call);
-                       std::cout << result << std::endl;
-                       EXPECT_GT(result.children, 3);
-                       EXPECT_EQ(0, result.hung);
-                       EXPECT_EQ(0, result.failed);
-                     },
-                     600000));
+    ExpectInChild(
+        [&] {
+          prepare();
+          ForkStorm result = vlt::test::RunForkStorm([&] { call(); }, call);
+          std::cout << result << std::endl;
+          EXPECT_GT(result.children, 3);
+          EXPECT_EQ(0, result.hung);
+          EXPECT_EQ(0, result.failed);
+        },
+        600000);
   }
 };
 

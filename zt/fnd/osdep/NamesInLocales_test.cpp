@@ -19,7 +19,7 @@ namespace {
 using vlt::test::Child;
 using vlt::test::CompiledLocales;
 using vlt::test::EventPlace;
-using vlt::test::InChild;
+using vlt::test::ExpectInChild;
 using vlt::test::MutexPlace;
 using vlt::test::Signal;
 
@@ -59,24 +59,24 @@ TEST_F(NamesInLocales, MutexBeyondAsciiExcludesProcessesOfOtherLocales) {
 
 TEST_F(NamesInLocales, TwoNamesBeyondAsciiAreTwoMutexesInTheCLocale) {
   MutexPlace place;
-  EXPECT_EQ(0, InChild([&] {
-              ASSERT_TRUE(m_locales.use("C"));
-              Mutex first(L"m\xE9"), second(L"m\xE8");
-              first.lock();
-              EXPECT_TRUE(second.tryLock());
-            }));
+  ExpectInChild([&] {
+    ASSERT_TRUE(m_locales.use("C"));
+    Mutex first(L"m\xE9"), second(L"m\xE8");
+    first.lock();
+    EXPECT_TRUE(second.tryLock());
+  });
 }
 
 TEST_F(NamesInLocales, CaseIsFoldedAlikeWhereTheLocaleFoldsIOtherwise) {
   MutexPlace place;
-  EXPECT_EQ(0, InChild([&] {
-              ASSERT_TRUE(m_locales.use("tr_TR.UTF-8"));
-              Mutex lower(L"title"), upper(L"TITLE");
-              lower.lock();
-              // One section for both: another thread cannot enter it.
-              EXPECT_FALSE(std::async(std::launch::async, [&] { return upper.tryLock(); }).get());
-              lower.unlock();
-            }));
+  ExpectInChild([&] {
+    ASSERT_TRUE(m_locales.use("tr_TR.UTF-8"));
+    Mutex lower(L"title"), upper(L"TITLE");
+    lower.lock();
+    // One section for both: another thread cannot enter it.
+    EXPECT_FALSE(std::async(std::launch::async, [&] { return upper.tryLock(); }).get());
+    lower.unlock();
+  });
 }
 
 TEST_F(NamesInLocales, EventBeyondAsciiIsSeenByProcessesOfOtherLocales) {

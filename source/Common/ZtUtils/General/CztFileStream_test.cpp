@@ -153,14 +153,13 @@ TEST_F(FileStream, SetSizeKeepsTheCursorInside) {
   EXPECT_EQ(ReadBytes(path), "abc");
   EXPECT_EQ(stream->SetSize(uint64_t{INT64_MAX} + 1), E_INVALIDARG);
   // A limit of the process: some file systems take any size.
-  EXPECT_EQ(InChild([&] {
-              rlimit limit = {80, 80};
-              signal(SIGXFSZ, SIG_IGN);
-              ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &limit), 0);
-              EXPECT_EQ(stream->SetSize(81), E_FAIL);
-              EXPECT_EQ(Position(stream.get()), 3);
-            }),
-            0);
+  ExpectInChild([&] {
+    rlimit limit = {80, 80};
+    signal(SIGXFSZ, SIG_IGN);
+    ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &limit), 0);
+    EXPECT_EQ(stream->SetSize(81), E_FAIL);
+    EXPECT_EQ(Position(stream.get()), 3);
+  });
   EXPECT_EQ(ReadBytes(path), "abc");
 }
 
@@ -204,7 +203,7 @@ TEST_F(FileStream, SetSizeZeroOfAWriteOnlyStreamTellsDamagedSubStreams) {
 }
 
 TEST_F(FileStream, AFullDiskIsTold) {
-  int result = InChild([this] {
+  ExpectInChild([this] {
     FilePtr stream = Open(path, Access::Both);
     rlimit limit = {6, 6};
     signal(SIGXFSZ, SIG_IGN);
@@ -216,7 +215,6 @@ TEST_F(FileStream, AFullDiskIsTold) {
     EXPECT_EQ(Position(stream.get()), 6);
     EXPECT_EQ(Contents(stream.get()), "abcdef");
   });
-  EXPECT_EQ(result, 0);
 }
 
 // ---- Sub-streams in files
@@ -322,7 +320,7 @@ TEST_F(FileStream, AnAreaThatDoesNotFitIsTakenBack) {
   for (Access access : {Access::Both, Access::Write}) {
     for (std::string data : {"data", ""}) {
       std::filesystem::remove(path);
-      int result = InChild([&] {
+      ExpectInChild([&] {
         {
           FilePtr stream = Open(path, access);
           Put(stream.get(), data);
@@ -335,7 +333,6 @@ TEST_F(FileStream, AnAreaThatDoesNotFitIsTakenBack) {
         }
         EXPECT_EQ(ReadBytes(path), data);
       });
-      EXPECT_EQ(result, 0);
     }
   }
 }

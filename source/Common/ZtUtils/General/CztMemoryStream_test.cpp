@@ -209,21 +209,18 @@ TEST(MemoryStream, SizesBeyond32BitsAreInvalid) {
   EXPECT_EQ(Contents(stream.get()), "abc");
 }
 
-TEST(MemoryStream, WithoutMemoryNothingChanges) {
+TEST_IN_CHILD(MemoryStream, WithoutMemoryNothingChanges) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer holds the address space";
-  int result = InChild([] {
-    LimitMemoryTo(32 << 20);
-    MemoryPtr stream = MemoryOf("abc");
-    EXPECT_EQ(stream->SetSize(0x7FFFFFF0), E_FAIL);
-    unsigned done = 99;
-    EXPECT_EQ(stream->Write("x", 0x40000000, &done), E_FAIL);
-    EXPECT_EQ(done, 0u);
-    EXPECT_EQ(Contents(stream.get()), "abc");
-    MemoryPtr fresh = NewMemory();
-    EXPECT_EQ(fresh->Write("x", 0x40000000, &done), E_FAIL);
-    EXPECT_EQ(fresh->GetBuffer(), nullptr);
-  });
-  EXPECT_EQ(result, 0);
+  LimitMemoryTo(32 << 20);
+  MemoryPtr stream = MemoryOf("abc");
+  EXPECT_EQ(stream->SetSize(0x7FFFFFF0), E_FAIL);
+  unsigned done = 99;
+  EXPECT_EQ(stream->Write("x", 0x40000000, &done), E_FAIL);
+  EXPECT_EQ(done, 0u);
+  EXPECT_EQ(Contents(stream.get()), "abc");
+  MemoryPtr fresh = NewMemory();
+  EXPECT_EQ(fresh->Write("x", 0x40000000, &done), E_FAIL);
+  EXPECT_EQ(fresh->GetBuffer(), nullptr);
 }
 
 // ---- Blocks that come and go

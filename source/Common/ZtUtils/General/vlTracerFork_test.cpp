@@ -44,21 +44,21 @@ std::string LogIn(const std::string& directory) {
 TEST(TracerFork, ChildrenOfTracingThreadsTrace) {
   if (!kCanForkWhileThreadsAllocate) GTEST_SKIP() << "the sanitizer's allocator is not fork-safe";
   TempDir dir;
-  EXPECT_EQ(0, InChild(
-                   [&] {
-                     Start(dir.makeDir("logs"));
-                     auto say = [] { vlt_vlTracer::TraceOutput('>', "busy", true); };
-                     ForkStorm result = RunForkStorm(say, [&] {
-                       say();
-                       return true;
-                     });
-                     std::cout << result << std::endl;
-                     EXPECT_GT(result.children, 3);
-                     EXPECT_EQ(0, result.hung);
-                     EXPECT_EQ(0, result.failed);
-                     say();  // the parent's log has not come to a halt
-                   },
-                   600000));
+  ExpectInChild(
+      [&] {
+        Start(dir.makeDir("logs"));
+        auto say = [] { vlt_vlTracer::TraceOutput('>', "busy", true); };
+        ForkStorm result = RunForkStorm(say, [&] {
+          say();
+          return true;
+        });
+        std::cout << result << std::endl;
+        EXPECT_GT(result.children, 3);
+        EXPECT_EQ(0, result.hung);
+        EXPECT_EQ(0, result.failed);
+        say();  // the parent's log has not come to a halt
+      },
+      600000);
   // Pairs of lines, all of them whole.
   std::ifstream log(LogIn(dir / "logs"));
   std::string first, second;
@@ -70,78 +70,70 @@ TEST(TracerFork, ChildrenOfTracingThreadsTrace) {
 }
 
 // The thread is inside a write, with the log's mutex.
-TEST(TracerFork, ChildOfAForkDuringAWriteKeepsNoLock) {
+TEST_IN_CHILD(TracerFork, ChildOfAForkDuringAWriteKeepsNoLock) {
   TempDir dir;
-  EXPECT_EQ(0, InChild([&] {
-              int ends[2];
-              ASSERT_EQ(0, pipe(ends));
-              dup2(ends[1], 2);
-              fcntl(ends[1], F_SETFL, O_NONBLOCK);
-              while (write(ends[1], "x", 1) == 1) {
-              }
-              fcntl(ends[1], F_SETFL, 0);
-              Start(dir.makeDir("logs"), vlTracer::kTargetError);
-              WatchedThread writer([] { Say("stuck"); });
-              ASSERT_TRUE(writer.blocksIn(SYS_write));
-              // Not Child, which flushes the stream that the thread is inside.
-              pid_t idle = fork();
-              if (idle == 0) {
-                prctl(PR_SET_PDEATHSIG, SIGKILL);
-                for (;;) pause();
-              }
-              fcntl(ends[0], F_SETFL, O_NONBLOCK);
-              std::string text(4096, '\0');
-              EXPECT_TRUE(Eventually([&] {
-                while (read(ends[0], text.data(), text.size()) > 0) {
-                }
-                return writer.done();
-              }));
-              // The child lives, and the lock is free again.
-              WatchedThread next([] { Say("next"); });
-              EXPECT_TRUE(Eventually([&] { return next.done(); }, 5000));
-              kill(idle, SIGKILL);
-              waitpid(idle, nullptr, 0);
-            }));
+  int ends[2];
+  ASSERT_EQ(0, pipe(ends));
+  dup2(ends[1], 2);
+  fcntl(ends[1], F_SETFL, O_NONBLOCK);
+  while (write(ends[1], "x", 1) == 1) {
+  }
+  fcntl(ends[1], F_SETFL, 0);
+  Start(dir.makeDir("logs"), vlTracer::kTargetError);
+  WatchedThread writer([] { Say("stuck"); });
+  ASSERT_TRUE(writer.blocksIn(SYS_write));
+  // Not Child, which flushes the stream that the thread is inside.
+  pid_t idle = fork();
+  if (idle == 0) {
+    prctl(PR_SET_PDEATHSIG, SIGKILL);
+    for (;;) pause();
+  }
+  fcntl(ends[0], F_SETFL, O_NONBLOCK);
+  std::string text(4096, '\0');
+  EXPECT_TRUE(Eventually([&] {
+    while (read(ends[0], text.data(), text.size()) > 0) {
+    }
+    return writer.done();
+  }));
+  // The child lives, and the lock is free again.
+  WatchedThread next([] { Say("next"); });
+  EXPECT_TRUE(Eventually([&] { return next.done(); }, 5000));
+  kill(idle, SIGKILL);
+  waitpid(idle, nullptr, 0);
 }
 
-TEST(TracerDescriptor, HostsFileUnderItsNumberIsLeftAloneAndTheLogGoesOn) {
+TEST_IN_CHILD(TracerDescriptor, HostsFileUnderItsNumberIsLeftAloneAndTheLogGoesOn) {
   TempDir dir;
-  EXPECT_EQ(0, InChild([&] {
-              Start(dir.makeDir("logs"));
-              Say("one");
-              std::string log = LogIn(dir / "logs");
-              HostsFile hosts(dir / "hosts", DescriptorOf(log));
-              Say("two");
-              EXPECT_TRUE(hosts.unchanged());
-              EXPECT_EQ("  one\n  two\n", ReadBytes(log));
-              vlTracer::Cleanup();
-              EXPECT_TRUE(hosts.isOpen());
-              EXPECT_TRUE(hosts.unchanged());
-            }));
+  Start(dir.makeDir("logs"));
+  Say("one");
+  std::string log = LogIn(dir / "logs");
+  HostsFile hosts(dir / "hosts", DescriptorOf(log));
+  Say("two");
+  EXPECT_TRUE(hosts.unchanged());
+  EXPECT_EQ("  one\n  two\n", ReadBytes(log));
+  vlTracer::Cleanup();
+  EXPECT_TRUE(hosts.isOpen());
+  EXPECT_TRUE(hosts.unchanged());
 }
 
-TEST(TracerDescriptor, HostsFileUnderItsNumberOutlivesTheEnd) {
+TEST_IN_CHILD(TracerDescriptor, HostsFileUnderItsNumberOutlivesTheEnd) {
   TempDir dir;
-  EXPECT_EQ(0, InChild([&] {
-              Start(dir.makeDir("logs"));
-              Say("one");
-              HostsFile hosts(dir / "hosts", DescriptorOf(LogIn(dir / "logs")));
-              vlTracer::Cleanup();
-              EXPECT_TRUE(hosts.isOpen());
-              EXPECT_TRUE(hosts.unchanged());
-            }));
+  Start(dir.makeDir("logs"));
+  Say("one");
+  HostsFile hosts(dir / "hosts", DescriptorOf(LogIn(dir / "logs")));
+  vlTracer::Cleanup();
+  EXPECT_TRUE(hosts.isOpen());
+  EXPECT_TRUE(hosts.unchanged());
 }
 
-TEST(TracerDescriptor, ClosedOneIsOpenedAgain) {
+TEST_IN_CHILD(TracerDescriptor, ClosedOneIsOpenedAgain) {
   TempDir dir;
-  EXPECT_EQ(0, InChild([&] {
-              Start(dir.makeDir("logs"));
-              Say("one");
-              std::string log = LogIn(dir / "logs");
-              close(DescriptorOf(log));
-              Say("two");
-              EXPECT_EQ("  one\n  two\n", ReadBytes(log));
-            }));
+  Start(dir.makeDir("logs"));
+  Say("one");
+  std::string log = LogIn(dir / "logs");
+  close(DescriptorOf(log));
+  Say("two");
+  EXPECT_EQ("  one\n  two\n", ReadBytes(log));
 }
 
 // What such a host prints later goes to what it opens as its output, or nowhere.
