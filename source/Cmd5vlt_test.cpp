@@ -30,7 +30,7 @@ std::string Digest(const std::string& text) {
   return Hex(digest);
 }
 
-TEST(Md5, TestSuiteOfTheRfc) {
+TEST(Cmd5vlt, TestSuiteOfTheRfc) {
   EXPECT_EQ(Digest(""), "d41d8cd98f00b204e9800998ecf8427e");
   EXPECT_EQ(Digest("a"), "0cc175b9c0f1b6a831c399e269772661");
   EXPECT_EQ(Digest("abc"), "900150983cd24fb0d6963f7d28e17f72");
@@ -43,7 +43,7 @@ TEST(Md5, TestSuiteOfTheRfc) {
             "57edf4a22be3c955ac49da2e2107b67a");
 }
 
-TEST(Md5, AnySplitGivesTheDigestOfTheWhole) {
+TEST(Cmd5vlt, AnySplitGivesTheDigestOfTheWhole) {
   std::string text;
   for (int i = 0; i < 300; ++i) text += static_cast<char>(i * 7);
   std::string whole = Digest(text);
@@ -57,14 +57,14 @@ TEST(Md5, AnySplitGivesTheDigestOfTheWhole) {
   }
 }
 
-TEST(Md5, PaddingAtEveryLengthAroundABlock) {
+TEST(Cmd5vlt, PaddingAtEveryLengthAroundABlock) {
   // By the system's md5sum: printf '%*s' N '' | md5sum.
   EXPECT_EQ(Digest(std::string(55, ' ')), "1c1cca16031c531b8a74731f086e2e8e");
   EXPECT_EQ(Digest(std::string(56, ' ')), "a33142537854fee2afd6cff4c5a1dd39");
   EXPECT_EQ(Digest(std::string(64, ' ')), "4763107ec64e92a517d228fb2743cb96");
 }
 
-TEST(Md5, AfterTheDigestTheObjectIsZeroed) {
+TEST(Cmd5vlt, AfterTheDigestTheObjectIsZeroed) {
   Cmd5vlt md5;
   unsigned char digest[16];
   md5.getDigest(digest);

@@ -29,9 +29,9 @@ constexpr Pair kPairs[] = {
     {"tr_TR.UTF-8", "de_DE.ISO-8859-1", "i\xC4\xB1\xC4\xB0.ini"},
 };
 
-class IniLockLocale : public testing::Test {
+class IniFileLockLocale : public testing::Test {
  protected:
-  IniLockLocale() {
+  IniFileLockLocale() {
     m_locales.make("tr_TR", "UTF-8");
     m_locales.make("az_AZ", "UTF-8");
     m_locales.make("de_DE", "ISO-8859-1");
@@ -40,7 +40,7 @@ class IniLockLocale : public testing::Test {
   CompiledLocales m_locales;
 };
 
-TEST_F(IniLockLocale, NameOfAFileIsTheSameInEveryLocale) {
+TEST_F(IniFileLockLocale, NameOfAFileIsTheSameInEveryLocale) {
   const std::pair<const char*, const char*> names[] = {
       {"/d/vltjar.ini", "DVLTJARINI"},
       {"/d/iI", "DII"},
@@ -58,7 +58,7 @@ TEST_F(IniLockLocale, NameOfAFileIsTheSameInEveryLocale) {
   }
 }
 
-TEST_F(IniLockLocale, ProcessesOfTwoLocalesExcludeEachOther) {
+TEST_F(IniFileLockLocale, ProcessesOfTwoLocalesExcludeEachOther) {
   for (const Pair& pair : kPairs) {
     TempDir dir;
     std::string file = dir / pair.file;
@@ -85,7 +85,7 @@ TEST_F(IniLockLocale, ProcessesOfTwoLocalesExcludeEachOther) {
   }
 }
 
-TEST_F(IniLockLocale, WritersOfTwoLocalesLoseNothing) {
+TEST_F(IniFileLockLocale, WritersOfTwoLocalesLoseNothing) {
   constexpr int kEach = 300;
   for (const Pair& pair : {kPairs[0], kPairs[2]}) {
     TempDir dir;

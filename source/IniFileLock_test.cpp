@@ -23,7 +23,7 @@ namespace {
 
 using namespace vlt::test;
 
-TEST(IniLock, NameHasNoSeparatorAndIsInCapitals) {
+TEST(IniFileLock, NameHasNoSeparatorAndIsInCapitals) {
   auto name = [](const char* file) {
     return std::string(zt::fnd::AnsiString(IniFileLock::NameForFile(file)).c_str());
   };
@@ -35,7 +35,7 @@ TEST(IniLock, NameHasNoSeparatorAndIsInCapitals) {
   EXPECT_EQ(name(("/" + std::string(255, 'a')).c_str()), std::string(255, 'A'));
 }
 
-TEST(IniLock, IsRecursiveInAThread) {
+TEST(IniFileLock, IsRecursiveInAThread) {
   TempDir dir;
   std::string file = dir / "x.ini";
   CvlIniMgr outer = CvlIniMgr::LockOnly(file);
@@ -47,7 +47,7 @@ TEST(IniLock, IsRecursiveInAThread) {
   EXPECT_EQ(Value(again, "s", "a"), "1");
 }
 
-TEST(IniLock, AnotherThreadWaits) {
+TEST(IniFileLock, AnotherThreadWaits) {
   TempDir dir;
   std::string file = dir / "x.ini";
   std::unique_ptr<CvlIniMgr> outer(new CvlIniMgr(CvlIniMgr::LockOnly(file)));
@@ -64,7 +64,7 @@ TEST(IniLock, AnotherThreadWaits) {
   other.join();
 }
 
-TEST(IniLock, AnotherProcessWaitsAndGoesOnWhenTheHolderIsKilled) {
+TEST(IniFileLock, AnotherProcessWaitsAndGoesOnWhenTheHolderIsKilled) {
   TempDir dir;
   std::string file = dir / "x.ini";
   Signal held, never, entered;
@@ -87,7 +87,7 @@ TEST(IniLock, AnotherProcessWaitsAndGoesOnWhenTheHolderIsKilled) {
   EXPECT_EQ(waiter.wait(), 0);
 }
 
-TEST(IniLock, MayBeGivenUpByAnotherThreadAndTakenAgain) {
+TEST(IniFileLock, MayBeGivenUpByAnotherThreadAndTakenAgain) {
   TempDir dir;
   std::string file = dir / "x.ini";
   std::unique_ptr<CvlIniMgr> mine(new CvlIniMgr(CvlIniMgr::LockOnly(file)));
@@ -101,7 +101,7 @@ TEST(IniLock, MayBeGivenUpByAnotherThreadAndTakenAgain) {
 }
 
 // The thread that began the hold must not take the lock for its own while another one ends the hold.
-TEST_IN_CHILD(IniLock, TheFirstOwnerWaitsForTheThreadThatGivesUp) {
+TEST_IN_CHILD(IniFileLock, TheFirstOwnerWaitsForTheThreadThatGivesUp) {
   MutexPlace place;
   zt::fnd::String name(L"name");
   // ThreadSanitizer takes a section that ends with another thread for held for good, and
@@ -122,7 +122,7 @@ TEST_IN_CHILD(IniLock, TheFirstOwnerWaitsForTheThreadThatGivesUp) {
   }
 }
 
-TEST(IniLock, AForkedChildDoesNotFreeItsParentsLock) {
+TEST(IniFileLock, AForkedChildDoesNotFreeItsParentsLock) {
   TempDir dir;
   std::string file = dir / "x.ini";
   std::unique_ptr<CvlIniMgr> mine(new CvlIniMgr(CvlIniMgr::LockOnly(file)));
@@ -144,7 +144,7 @@ TEST(IniLock, AForkedChildDoesNotFreeItsParentsLock) {
   EXPECT_EQ(waiter.wait(), 0);
 }
 
-TEST(IniLock, IsFreeAfterAConstructorThatThrows) {
+TEST(IniFileLock, IsFreeAfterAConstructorThatThrows) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[a]\n");

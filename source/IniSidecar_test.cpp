@@ -25,7 +25,7 @@ IniSidecar::Digest Sixteen(const std::string& text) {
   return digest;
 }
 
-TEST(Sidecar, ReadsSixteenBytesAndReportsWhatItFinds) {
+TEST(IniSidecar, ReadsSixteenBytesAndReportsWhatItFinds) {
   TempDir dir;
   std::string name = dir / "x.vl5";
   const IniSidecar::Digest before = Sixteen("untouched bytes.");
@@ -42,7 +42,7 @@ TEST(Sidecar, ReadsSixteenBytesAndReportsWhatItFinds) {
   EXPECT_EQ(IniSidecar::Read(name, &digest), IniSidecar::State::Short);
 }
 
-TEST(Sidecar, IsWrittenWholeWithItsModeAndNothingBesideIt) {
+TEST(IniSidecar, IsWrittenWholeWithItsModeAndNothingBesideIt) {
   TempDir dir;
   std::string name = dir / "x.vl5";
   ScopedUmask strict(077);
@@ -59,7 +59,7 @@ TEST(Sidecar, IsWrittenWholeWithItsModeAndNothingBesideIt) {
   EXPECT_FALSE(Exists(name + ".TMP"));
 }
 
-TEST(Sidecar, IsNotWrittenThroughALinkNorOverALeftover) {
+TEST(IniSidecar, IsNotWrittenThroughALinkNorOverALeftover) {
   TempDir dir;
   WriteBytes(dir / "victim", "precious");
   ASSERT_EQ(symlink((dir / "victim").c_str(), (dir / "x.vl5").c_str()), 0);
@@ -71,7 +71,7 @@ TEST(Sidecar, IsNotWrittenThroughALinkNorOverALeftover) {
   EXPECT_EQ(ReadBytes(dir / "y.vl5"), "0000000000000000");
 }
 
-TEST(Sidecar, AFileWithASecondNameIsReplacedAndNotOverwritten) {
+TEST(IniSidecar, AFileWithASecondNameIsReplacedAndNotOverwritten) {
   TempDir dir;
   WriteBytes(dir / "victim", "precious bytes!!");
   ASSERT_EQ(link((dir / "victim").c_str(), (dir / "x.vl5").c_str()), 0);

@@ -18,9 +18,9 @@ namespace {
 
 using namespace vlt::test;
 
-class IniManagerFork : public testing::Test {
+class vlIniMgrFork : public testing::Test {
  protected:
-  IniManagerFork() : file(dir / "x.ini") { ini = opened(); }
+  vlIniMgrFork() : file(dir / "x.ini") { ini = opened(); }
 
   std::unique_ptr<CvlIniMgr> opened() const {
     return std::unique_ptr<CvlIniMgr>(new CvlIniMgr(CvlIniMgr::OpenForUpdate(file)));
@@ -51,7 +51,7 @@ class IniManagerFork : public testing::Test {
   std::unique_ptr<CvlIniMgr> ini;
 };
 
-TEST_F(IniManagerFork, AChildOfALivingHolderIsRefusedAndReads) {
+TEST_F(vlIniMgrFork, AChildOfALivingHolderIsRefusedAndReads) {
   ASSERT_EQ(Save(*ini, "parent", "1"), S_OK);
   std::string before = ReadBytes(file);
   ExpectInChild([&] {
@@ -69,7 +69,7 @@ TEST_F(IniManagerFork, AChildOfALivingHolderIsRefusedAndReads) {
   expectOnDisk("child", "(none)");
 }
 
-TEST_F(IniManagerFork, AChildThatOutlivesTheHolderKeepsWhatTheHolderSavedLast) {
+TEST_F(vlIniMgrFork, AChildThatOutlivesTheHolderKeepsWhatTheHolderSavedLast) {
   ASSERT_EQ(Save(*ini, "parent", "1"), S_OK);
   Signal gone, saved, end;
   Child child([&] {
@@ -92,7 +92,7 @@ TEST_F(IniManagerFork, AChildThatOutlivesTheHolderKeepsWhatTheHolderSavedLast) {
   expectOnDisk("child", "1");
 }
 
-TEST_F(IniManagerFork, WhatAnotherProcessSavedWhileTheLockWasLostStays) {
+TEST_F(vlIniMgrFork, WhatAnotherProcessSavedWhileTheLockWasLostStays) {
   ASSERT_EQ(Save(*ini, "first", "1"), S_OK);
   std::filesystem::remove(lockFile());
   Signal saved, end;
@@ -116,7 +116,7 @@ TEST_F(IniManagerFork, WhatAnotherProcessSavedWhileTheLockWasLostStays) {
 }
 
 // A thread may have any number of objects of one file, in a child as in its parent.
-TEST_F(IniManagerFork, TheObjectsOfAThreadShareTheLockThatAChildTakes) {
+TEST_F(vlIniMgrFork, TheObjectsOfAThreadShareTheLockThatAChildTakes) {
   auto second = opened();
   Signal gone;
   Child child([&] {
@@ -134,7 +134,7 @@ TEST_F(IniManagerFork, TheObjectsOfAThreadShareTheLockThatAChildTakes) {
 }
 
 // An object without a document must not pass for one that holds what the file holds.
-TEST_F(IniManagerFork, AnAbandonedDocumentIsReadAsSoonAsItsFileCanBe) {
+TEST_F(vlIniMgrFork, AnAbandonedDocumentIsReadAsSoonAsItsFileCanBe) {
   ASSERT_EQ(Save(*ini, "a", "1"), S_OK);
   std::string hidden = dir / "hidden";
   std::filesystem::rename(file, hidden);

@@ -55,7 +55,7 @@ const Loss kLosses[] = {
     {"a removed lock file", [](const GuardedPlace& p) { unlink(p.lockFile().c_str()); }},
 };
 
-TEST(IniManagerLock, ALostLockIsTakenAgain) {
+TEST(vlIniMgrLock, ALostLockIsTakenAgain) {
   for (const Loss& loss : kLosses) {
     GuardedPlace place;
     Child child([&] {
@@ -69,7 +69,7 @@ TEST(IniManagerLock, ALostLockIsTakenAgain) {
   }
 }
 
-TEST(IniManagerLock, WhatAnotherProcessHasWrittenMeanwhileStays) {
+TEST(vlIniMgrLock, WhatAnotherProcessHasWrittenMeanwhileStays) {
   for (const Loss& loss : kLosses) {
     GuardedPlace place;
     Child child([&] {
@@ -84,7 +84,7 @@ TEST(IniManagerLock, WhatAnotherProcessHasWrittenMeanwhileStays) {
   }
 }
 
-TEST(IniManagerLock, NothingIsWrittenWhileAnotherProcessHasTheLock) {
+TEST(vlIniMgrLock, NothingIsWrittenWhileAnotherProcessHasTheLock) {
   for (const Loss& loss : kLosses) {
     GuardedPlace place;
     Child child([&] {
@@ -111,7 +111,7 @@ TEST(IniManagerLock, NothingIsWrittenWhileAnotherProcessHasTheLock) {
   }
 }
 
-TEST(IniManagerLock, AForkedChildHoldsNothingUntilItsParentHasGone) {
+TEST(vlIniMgrLock, AForkedChildHoldsNothingUntilItsParentHasGone) {
   GuardedPlace place;
   Signal tried, gone;
   Child parent([&]() -> int {
@@ -135,7 +135,7 @@ TEST(IniManagerLock, AForkedChildHoldsNothingUntilItsParentHasGone) {
   EXPECT_EQ(ReadBytes(place.file), "[s]\na = 3\n");
 }
 
-TEST(IniManagerLock, AChildReadsWhatItsParentWroteAfterTheFork) {
+TEST(vlIniMgrLock, AChildReadsWhatItsParentWroteAfterTheFork) {
   GuardedPlace place;
   Signal written;
   auto ini = Open(place.file);
@@ -150,7 +150,7 @@ TEST(IniManagerLock, AChildReadsWhatItsParentWroteAfterTheFork) {
   EXPECT_EQ(ReadBytes(place.file), "[s]\na = 2\nb = child's\n");
 }
 
-TEST(IniManagerLock, AChangeThatWasNotWrittenIsDroppedWithTheLock) {
+TEST(vlIniMgrLock, AChangeThatWasNotWrittenIsDroppedWithTheLock) {
   GuardedPlace place;
   Child child([&] {
     auto ini = Open(place.file);

@@ -37,7 +37,7 @@ std::string Unhex(const std::string& hex) {
   return bytes;
 }
 
-TEST(IniManager, NewFileIsMadeWithItsDirectoryAndModes) {
+TEST(vlIniMgr, NewFileIsMadeWithItsDirectoryAndModes) {
   TempDir dir;
   std::string file = dir / "a/b/x.ini";
   ScopedUmask strict(077);
@@ -52,7 +52,7 @@ TEST(IniManager, NewFileIsMadeWithItsDirectoryAndModes) {
   EXPECT_EQ(ModeOf(file), 0777);
 }
 
-TEST(IniManager, AnEmptyFileIsCleanAndNotWritten) {
+TEST(vlIniMgr, AnEmptyFileIsCleanAndNotWritten) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "");
@@ -67,13 +67,13 @@ TEST(IniManager, AnEmptyFileIsCleanAndNotWritten) {
   EXPECT_EQ(ModeOf(file), 0777);
 }
 
-TEST(IniManager, AnEmptyFileMatchesTheDigestOfNothing) {
+TEST(vlIniMgr, AnEmptyFileMatchesTheDigestOfNothing) {
   TempDir dir;
   WriteBytes(dir / "x.ini", "");
   EXPECT_EQ(Open(dir / "x.ini", Unhex("d41d8cd98f00b204e9800998ecf8427e")), 0);
 }
 
-TEST(IniManager, ADifferingDigestThrowsAndSetsNothingAside) {
+TEST(vlIniMgr, ADifferingDigestThrowsAndSetsNothingAside) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[a]\nb = 1\n");
@@ -85,7 +85,7 @@ TEST(IniManager, ADifferingDigestThrowsAndSetsNothingAside) {
   EXPECT_EQ(Open(file), 0);  // The lock is free again.
 }
 
-TEST(IniManager, AnUnparsableFileIsSetAsideWithItsSidecar) {
+TEST(vlIniMgr, AnUnparsableFileIsSetAsideWithItsSidecar) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, std::string("\xFF\xFE[\0a\0]\0", 8));
@@ -100,7 +100,7 @@ TEST(IniManager, AnUnparsableFileIsSetAsideWithItsSidecar) {
   EXPECT_EQ(Open(file), 0);
 }
 
-TEST(IniManager, APipeOrADeviceInTheFilesPlaceIsLeftAlone) {
+TEST(vlIniMgr, APipeOrADeviceInTheFilesPlaceIsLeftAlone) {
   TempDir dir;
   std::string file = dir / "x.ini";
   ASSERT_EQ(mkfifo(file.c_str(), 0640), 0);
@@ -108,14 +108,14 @@ TEST(IniManager, APipeOrADeviceInTheFilesPlaceIsLeftAlone) {
   EXPECT_EQ(ModeOf(file), 0640);
 }
 
-TEST(IniManager, ADirectoryInTheFilesPlaceThrows) {
+TEST(vlIniMgr, ADirectoryInTheFilesPlaceThrows) {
   TempDir dir;
   dir.makeDir("x.ini");
   EXPECT_EQ(Open(dir / "x.ini"), 1);
   EXPECT_TRUE(Exists(dir / "x.ini"));
 }
 
-TEST(IniManager, AFileThatCannotBeOpenedStays) {
+TEST(vlIniMgr, AFileThatCannotBeOpenedStays) {
   if (geteuid() == 0) {
     // The superuser opens everything; a path through a file fails for everybody.
     TempDir dir;
@@ -132,7 +132,7 @@ TEST(IniManager, AFileThatCannotBeOpenedStays) {
   EXPECT_FALSE(Exists(BadName(file)));
 }
 
-TEST(IniManager, RunningOutOfDescriptorsLosesNothing) {
+TEST(vlIniMgr, RunningOutOfDescriptorsLosesNothing) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[a]\nb = 1\n");
@@ -156,7 +156,7 @@ TEST(IniManager, RunningOutOfDescriptorsLosesNothing) {
   EXPECT_FALSE(Exists(BadName(file)));
 }
 
-TEST(IniManager, SymbolicLinksAreReadButNotOpenedUp) {
+TEST(vlIniMgr, SymbolicLinksAreReadButNotOpenedUp) {
   TempDir dir;
   WriteBytes(dir / "secret", "[a]\nb = 1\n");
   ASSERT_EQ(chmod((dir / "secret").c_str(), 0600), 0);
@@ -168,14 +168,14 @@ TEST(IniManager, SymbolicLinksAreReadButNotOpenedUp) {
   EXPECT_EQ(ModeOf(dir / "secret"), 0600);
 }
 
-TEST(IniManager, LockOnlyTouchesNothing) {
+TEST(vlIniMgr, LockOnlyTouchesNothing) {
   TempDir dir;
   std::string file = dir / "d/x.ini";
   { CvlIniMgr ini(file.c_str(), true, nullptr, true, false); }
   EXPECT_FALSE(Exists(dir / "d"));
 }
 
-TEST(IniManager, LockOnlyLeavesWhatIsThere) {
+TEST(vlIniMgr, LockOnlyLeavesWhatIsThere) {
   TempDir dir;
   std::string file = dir / "x.ini", bytes = "\xFF\xFE[";  // which does not parse
   WriteBytes(file, bytes);
@@ -196,7 +196,7 @@ TEST(IniManager, LockOnlyLeavesWhatIsThere) {
   EXPECT_EQ(std::distance(entries, end), 2);
 }
 
-TEST(IniManager, WritesTheDialectAndReadsItBack) {
+TEST(vlIniMgr, WritesTheDialectAndReadsItBack) {
   TempDir dir;
   std::string file = dir / "x.ini";
   {
@@ -212,7 +212,7 @@ TEST(IniManager, WritesTheDialectAndReadsItBack) {
   EXPECT_EQ(Value(ini, "s", "escaped"), "a\nb");
 }
 
-TEST(IniManager, WithoutEscapesALineFeedBreaksTheLine) {
+TEST(vlIniMgr, WithoutEscapesALineFeedBreaksTheLine) {
   TempDir dir;
   std::string file = dir / "x.ini";
   {
@@ -224,7 +224,7 @@ TEST(IniManager, WithoutEscapesALineFeedBreaksTheLine) {
   EXPECT_EQ(Value(ini, "s", "b"), "c");
 }
 
-TEST(IniManager, ItemOperationsAnswerByTheirCodes) {
+TEST(vlIniMgr, ItemOperationsAnswerByTheirCodes) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na = 1\nb = 2\n[t]\nc = 3\n");
@@ -266,7 +266,7 @@ TEST(IniManager, ItemOperationsAnswerByTheirCodes) {
   EXPECT_EQ(ini.EraseSection(nullptr), E_POINTER);
 }
 
-TEST(IniManager, ErasingWhatIsAbsentLeavesTheObjectClean) {
+TEST(vlIniMgr, ErasingWhatIsAbsentLeavesTheObjectClean) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na=1\n");
@@ -281,7 +281,7 @@ TEST(IniManager, ErasingWhatIsAbsentLeavesTheObjectClean) {
   EXPECT_EQ(ReadBytes(file), "");
 }
 
-TEST(IniManager, ChecksumIsThatOfTheFile) {
+TEST(vlIniMgr, ChecksumIsThatOfTheFile) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na=1\n");
@@ -299,7 +299,7 @@ TEST(IniManager, ChecksumIsThatOfTheFile) {
   EXPECT_EQ(ini.WriteAndGetChecksum(nullptr), E_POINTER);
 }
 
-TEST(IniManager, AVanishedFileFailsTheDigestAndIsSavedAgain) {
+TEST(vlIniMgr, AVanishedFileFailsTheDigestAndIsSavedAgain) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na=1\n");
@@ -315,7 +315,7 @@ TEST(IniManager, AVanishedFileFailsTheDigestAndIsSavedAgain) {
   EXPECT_EQ(ReadBytes(file), "[s]\na = 1\nb = 2\n");
 }
 
-TEST(IniManager, AFileThatSpoiledMeanwhileLeavesTheObjectAsItWas) {
+TEST(vlIniMgr, AFileThatSpoiledMeanwhileLeavesTheObjectAsItWas) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na=1\n");
@@ -326,7 +326,7 @@ TEST(IniManager, AFileThatSpoiledMeanwhileLeavesTheObjectAsItWas) {
   EXPECT_EQ(Value(ini, "s", "a"), "1");
 }
 
-TEST(IniManager, AFailedWriteLeavesFileAndDocument) {
+TEST(vlIniMgr, AFailedWriteLeavesFileAndDocument) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "[s]\na=1\n");
@@ -339,14 +339,14 @@ TEST(IniManager, AFailedWriteLeavesFileAndDocument) {
   EXPECT_EQ(Value(ini, "s", "a"), "2");
 }
 
-TEST(IniManager, SidecarNameCutsAtTheLastPointOfTheWholePath) {
+TEST(vlIniMgr, SidecarNameCutsAtTheLastPointOfTheWholePath) {
   EXPECT_EQ(CvlIniMgr::SidecarName("/d/vltjar.ini"), "/d/vltjar.vl5");
   EXPECT_EQ(CvlIniMgr::SidecarName("/d.x/file"), "/d.vl5");
   EXPECT_EQ(CvlIniMgr::SidecarName("/d/file"), "/d/file.vl5");
 }
 
 // Any user can make the file as large as the file system allows.
-TEST_IN_CHILD(IniManager, AFileThatIsTooLargeIsNotReadForItsDigest) {
+TEST_IN_CHILD(vlIniMgr, AFileThatIsTooLargeIsNotReadForItsDigest) {
   TempDir dir;
   std::string file = dir / "x.ini";
   WriteBytes(file, "");

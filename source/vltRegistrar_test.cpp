@@ -51,15 +51,15 @@ HRESULT Register(CvltRegistrar& registrar, uint32_t n, _vltComponentType type,
   return registrar.RegisterComponent(&r);
 }
 
-class RegistrarBase : public testing::Test {
+class vltRegistrar : public testing::Test {
  protected:
-  RegistrarBase() : registrar(new TestRegistrar) { registrar->AddRef(); }
-  ~RegistrarBase() override { registrar->Release(); }
+  vltRegistrar() : registrar(new TestRegistrar) { registrar->AddRef(); }
+  ~vltRegistrar() override { registrar->Release(); }
 
   TestRegistrar* registrar;
 };
 
-TEST_F(RegistrarBase, WhatASubclassDidNotReplaceIsNotImplemented) {
+TEST_F(vltRegistrar, WhatASubclassDidNotReplaceIsNotImplemented) {
   wchar_t* text = nullptr;
   unsigned number = 7;
   EXPECT_EQ(registrar->GetConfigurationPath(&text), E_NOTIMPL);
@@ -75,7 +75,7 @@ TEST_F(RegistrarBase, WhatASubclassDidNotReplaceIsNotImplemented) {
   EXPECT_EQ(number, 7u);
 }
 
-TEST_F(RegistrarBase, AnswersToItsInterfaces) {
+TEST_F(vltRegistrar, AnswersToItsInterfaces) {
   void* out = nullptr;
   for (const GUID& iid : {IID_IUnknown, IID_IvltRegistrar, IID_IvltRegistrar2}) {
     EXPECT_EQ(registrar->QueryInterface(iid, &out), S_OK);
@@ -87,7 +87,7 @@ TEST_F(RegistrarBase, AnswersToItsInterfaces) {
   EXPECT_EQ(registrar->QueryInterface(IID_IUnknown, nullptr), E_POINTER);
 }
 
-TEST_F(RegistrarBase, RegisterChecksItsRecord) {
+TEST_F(vltRegistrar, RegisterChecksItsRecord) {
   _vltComponent2 r;
   memset(&r, 0, sizeof r);
   wchar_t text[] = L"x";
@@ -105,7 +105,7 @@ TEST_F(RegistrarBase, RegisterChecksItsRecord) {
   EXPECT_EQ(registrar->scans, 0);
 }
 
-TEST_F(RegistrarBase, ASecondComponentOfOneIdentifierReplacesTheFirst) {
+TEST_F(vltRegistrar, ASecondComponentOfOneIdentifierReplacesTheFirst) {
   EXPECT_EQ(Register(*registrar, 1, vltComponentObjectExpert, L"first"), S_OK);
   EXPECT_EQ(Register(*registrar, 1, vltComponentUIProvider, L"second"), S_OK);
   EXPECT_EQ(registrar->count(), 1u);
@@ -115,7 +115,7 @@ TEST_F(RegistrarBase, ASecondComponentOfOneIdentifierReplacesTheFirst) {
   vltutilsFreeComponent2(r);
 }
 
-TEST_F(RegistrarBase, GetComponentHandsOutCopies) {
+TEST_F(vltRegistrar, GetComponentHandsOutCopies) {
   Register(*registrar, 1, vltComponentObjectExpert);
   _vltComponent2 a, b;
   EXPECT_EQ(registrar->GetComponent(Id(1), nullptr), E_POINTER);
@@ -127,7 +127,7 @@ TEST_F(RegistrarBase, GetComponentHandsOutCopies) {
   vltutilsFreeComponent2(b);
 }
 
-TEST_F(RegistrarBase, UnregisterRemovesAndToleratesTheUnknown) {
+TEST_F(vltRegistrar, UnregisterRemovesAndToleratesTheUnknown) {
   Register(*registrar, 1, vltComponentObjectExpert);
   EXPECT_EQ(registrar->UnregisterComponent(Id(2)), S_OK);
   EXPECT_EQ(registrar->UnregisterComponent(Id(1)), S_OK);
@@ -138,7 +138,7 @@ TEST_F(RegistrarBase, UnregisterRemovesAndToleratesTheUnknown) {
   EXPECT_EQ(registrar->RemoveComponent(&unknown), S_FALSE);
 }
 
-TEST_F(RegistrarBase, AFailedScanIsTheResult) {
+TEST_F(vltRegistrar, AFailedScanIsTheResult) {
   Register(*registrar, 1, vltComponentObjectExpert);
   registrar->scanResult = E_OUTOFMEMORY;
   _vltComponent2 r;
@@ -167,7 +167,7 @@ std::vector<std::wstring> Names(IvltEnumComponent* enumerator) {
   }
 }
 
-TEST_F(RegistrarBase, EnumeratorWalksOneTypeInIdentifierOrder) {
+TEST_F(vltRegistrar, EnumeratorWalksOneTypeInIdentifierOrder) {
   Register(*registrar, 0x200, vltComponentObjectExpert, L"b");
   Register(*registrar, 0x1FF, vltComponentObjectExpert, L"a");  // sorts first as a number only
   Register(*registrar, 3, vltComponentUIProvider, L"other");
@@ -178,7 +178,7 @@ TEST_F(RegistrarBase, EnumeratorWalksOneTypeInIdentifierOrder) {
   EXPECT_EQ(Names(e.get()).size(), 2u);
 }
 
-TEST_F(RegistrarBase, NextAddsToWhatWasFetched) {
+TEST_F(vltRegistrar, NextAddsToWhatWasFetched) {
   Register(*registrar, 1, vltComponentObjectExpert);
   CztComPtr<IvltEnumComponent> e;
   ASSERT_EQ(registrar->EnumComponents(vltComponentObjectExpert, e.out()), S_OK);
@@ -195,7 +195,7 @@ TEST_F(RegistrarBase, NextAddsToWhatWasFetched) {
   EXPECT_EQ(e->Clone(nullptr), E_NOTIMPL);
 }
 
-TEST_F(RegistrarBase, NoTypeMeansNoComponent) {
+TEST_F(vltRegistrar, NoTypeMeansNoComponent) {
   Register(*registrar, 1, vltComponentDataDictionary);
   for (auto type : {vltComponentNone, vltComponentObjectExpert}) {
     CztComPtr<IvltEnumComponent> e;
@@ -208,7 +208,7 @@ TEST_F(RegistrarBase, NoTypeMeansNoComponent) {
   EXPECT_EQ(registrar->EnumComponents(vltComponentObjectExpert, nullptr), E_POINTER);
 }
 
-TEST_F(RegistrarBase, EnumeratorSeesItsSnapshotLessWhatIsGone) {
+TEST_F(vltRegistrar, EnumeratorSeesItsSnapshotLessWhatIsGone) {
   for (uint32_t n = 1; n <= 3; ++n) Register(*registrar, n, vltComponentObjectExpert);
   CztComPtr<IvltEnumComponent> e;
   ASSERT_EQ(registrar->EnumComponents(vltComponentObjectExpert, e.out()), S_OK);
@@ -217,7 +217,7 @@ TEST_F(RegistrarBase, EnumeratorSeesItsSnapshotLessWhatIsGone) {
   EXPECT_EQ(Names(e.get()).size(), 2u);
 }
 
-TEST_F(RegistrarBase, EnumeratorKeepsTheRegistrarAndAnswersToItsInterfaces) {
+TEST_F(vltRegistrar, EnumeratorKeepsTheRegistrarAndAnswersToItsInterfaces) {
   IvltEnumComponent* e = nullptr;
   ASSERT_EQ(registrar->EnumComponents(vltComponentObjectExpert, &e), S_OK);
   EXPECT_EQ(registrar->AddRef(), 3u);
@@ -234,7 +234,7 @@ TEST_F(RegistrarBase, EnumeratorKeepsTheRegistrarAndAnswersToItsInterfaces) {
   registrar->Release();
 }
 
-TEST_F(RegistrarBase, OlderRecordsCanBeEnumeratedToo) {
+TEST_F(vltRegistrar, OlderRecordsCanBeEnumeratedToo) {
   Register(*registrar, 1, vltComponentObjectExpert, L"old");
   IvltEnumComponent* raw = nullptr;
   ASSERT_EQ(registrar->EnumComponents(vltComponentObjectExpert, &raw), S_OK);
@@ -252,7 +252,7 @@ TEST_F(RegistrarBase, OlderRecordsCanBeEnumeratedToo) {
 
 // The next component stands in for the one that could not be copied; a record that could not be filled
 // holds no text.
-TEST_F(RegistrarBase, NextGoesOnBehindACopyThatFails) {
+TEST_F(vltRegistrar, NextGoesOnBehindACopyThatFails) {
   if (!vlt::test::kCanLimitMemory) {
     printf("NOT TESTED: the sanitizer has a malloc of its own\n");
     GTEST_SKIP();
@@ -287,7 +287,7 @@ TEST_F(RegistrarBase, NextGoesOnBehindACopyThatFails) {
   }
 }
 
-TEST_F(RegistrarBase, ACopyThatFailsIsGetComponentsResult) {
+TEST_F(vltRegistrar, ACopyThatFailsIsGetComponentsResult) {
   if (!vlt::test::kCanLimitMemory) {
     printf("NOT TESTED: the sanitizer has a malloc of its own\n");
     GTEST_SKIP();
@@ -306,7 +306,7 @@ TEST_F(RegistrarBase, ACopyThatFailsIsGetComponentsResult) {
 }
 
 // What cannot be looked up is passed over; only Reset leads back to it.
-TEST_F(RegistrarBase, NextPassesOverWhatAFailedScanHides) {
+TEST_F(vltRegistrar, NextPassesOverWhatAFailedScanHides) {
   Register(*registrar, 1, vltComponentObjectExpert, L"first");
   Register(*registrar, 2, vltComponentObjectExpert, L"second");
   CztComPtr<IvltEnumComponent> e;
@@ -324,7 +324,7 @@ TEST_F(RegistrarBase, NextPassesOverWhatAFailedScanHides) {
   EXPECT_EQ(Names(e.get()), (std::vector<std::wstring>{L"first", L"second"}));
 }
 
-TEST_F(RegistrarBase, ManyThreadsRegisterAndRead) {
+TEST_F(vltRegistrar, ManyThreadsRegisterAndRead) {
   std::vector<std::thread> threads;
   for (uint32_t t = 0; t < 4; ++t) {
     threads.emplace_back([this, t] {
@@ -339,7 +339,7 @@ TEST_F(RegistrarBase, ManyThreadsRegisterAndRead) {
   EXPECT_EQ(registrar->count(), 800u);
 }
 
-TEST(RegistrarKeys, AreExact) {
+TEST(vltRegistrarKeys, AreExact) {
   EXPECT_EQ(CvltRegistrar::MapStringToType(L"Data Dictionaries"), vltComponentDataDictionary);
   EXPECT_EQ(CvltRegistrar::MapStringToType(L"Object Experts"), vltComponentObjectExpert);
   EXPECT_EQ(CvltRegistrar::MapStringToType(L"Resource Experts"), vltComponentResourceExpert);
@@ -349,7 +349,7 @@ TEST(RegistrarKeys, AreExact) {
   EXPECT_EQ(CvltRegistrar::MapStringToType(nullptr), vltComponentNone);
 }
 
-TEST(RegistrarHelpers, GuidTexts) {
+TEST(vltRegistrarHelpers, GuidTexts) {
   GUID g = {1, 2, 3, {4, 5, 6, 7, 8, 9, 10, 11}};
   zt::fnd::String text = vlrGuidToString(g);
   EXPECT_STREQ(text.c_str(), L"{00000001-0002-0003-0405-060708090A0B}");
@@ -358,7 +358,7 @@ TEST(RegistrarHelpers, GuidTexts) {
   EXPECT_TRUE(vlrGuidFromString(zt::fnd::String(L"bad")) == GUID_NULL);
 }
 
-TEST(RegistrarHelpers, DuplicateStringLeavesTheTargetOnFailure) {
+TEST(vltRegistrarHelpers, DuplicateStringLeavesTheTargetOnFailure) {
   wchar_t text[] = L"t";
   wchar_t* out = text;
   EXPECT_EQ(vlrDuplicateString(nullptr, &out), E_POINTER);
@@ -370,7 +370,7 @@ TEST(RegistrarHelpers, DuplicateStringLeavesTheTargetOnFailure) {
   vltFree(out);
 }
 
-TEST(RegistrarHelpers, ComponentNamesFromADirectory) {
+TEST(vltRegistrarHelpers, ComponentNamesFromADirectory) {
   vlt::test::TempDir dir;
   dir.makeDir("a.framework");
   dir.makeDir("b.vle");

@@ -66,7 +66,7 @@ std::vector<heap::Call> Calls() {
   return calls;
 }
 
-TEST(ComponentStreamMemory, ReadingAndWritingSurviveEveryFailedAllocation) {
+TEST(xcomponentStreamMemory, ReadingAndWritingSurviveEveryFailedAllocation) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer has a malloc of its own";
   for (bool forEver : {false, true}) {
     long total = 0;
@@ -87,7 +87,7 @@ TEST(ComponentStreamMemory, ReadingAndWritingSurviveEveryFailedAllocation) {
   }
 }
 
-TEST(ComponentStreamMemory, EveryTruncationLeavesNothing) {
+TEST(xcomponentStreamMemory, EveryTruncationLeavesNothing) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer counts its own blocks, and tells of leaks";
   for (Order order : {Order::Little, Order::Big}) {
     for (int32_t type : {2, 5}) {

@@ -105,7 +105,7 @@ constexpr int32_t kTypes[] = {0, 1, 2, 3, 4, 5, 6, 7, 8, 99, -1};
 
 // ---- Writing
 
-TEST(ComponentStream, BytesOfADictionary) {
+TEST(xcomponentStream, BytesOfADictionary) {
   CvltComponent component;
   Fill(component, vltComponentDataDictionary);
   EXPECT_EQ(Hexed(Written(component)),
@@ -119,7 +119,7 @@ TEST(ComponentStream, BytesOfADictionary) {
                             "00 00 00 00 FF FF FF FF "));
 }
 
-TEST(ComponentStream, EveryTypeHasItsVariant) {
+TEST(xcomponentStream, EveryTypeHasItsVariant) {
   for (int32_t type : kTypes) {
     CvltComponent component;
     Fill(component, type);
@@ -127,7 +127,7 @@ TEST(ComponentStream, EveryTypeHasItsVariant) {
   }
 }
 
-TEST(ComponentStream, NullTextsAreFourZeroBytes) {
+TEST(xcomponentStream, NullTextsAreFourZeroBytes) {
   for (int32_t type : {2, 5}) {
     CvltComponent component;
     Fill(component, type, false);
@@ -136,7 +136,7 @@ TEST(ComponentStream, NullTextsAreFourZeroBytes) {
   }
 }
 
-TEST(ComponentStream, TextsGoOutInTheLocalesEncoding) {
+TEST(xcomponentStream, TextsGoOutInTheLocalesEncoding) {
   CvltComponent component;
   component.record().name = Text(L"\u00E9");
   EXPECT_EQ(Hexed(Written(component).substr(12, 5)), "01 00 00 00 3F ");
@@ -144,7 +144,7 @@ TEST(ComponentStream, TextsGoOutInTheLocalesEncoding) {
   EXPECT_EQ(Hexed(Written(component).substr(12, 6)), "02 00 00 00 C3 A9 ");
 }
 
-TEST(ComponentStream, OneWriteAField) {
+TEST(xcomponentStream, OneWriteAField) {
   CvltComponent component;
   Fill(component, vltComponentResourceExpert);
   ForeignStream stream;
@@ -157,7 +157,7 @@ TEST(ComponentStream, OneWriteAField) {
 }
 
 // The calls of a dictionary's record, behind the header's four, whose results do not matter.
-TEST(ComponentStream, AFailedNumberThrowsAndAFailedTextDoesNot) {
+TEST(xcomponentStream, AFailedNumberThrowsAndAFailedTextDoesNot) {
   CvltComponent component;
   Fill(component, vltComponentDataDictionary);
   ForeignStream whole;
@@ -217,7 +217,7 @@ Thrown Read(const std::string& record, CvltComponent& component, Order order = O
   return thrown;
 }
 
-TEST(ComponentStream, EveryTypeReadsBackInBothByteOrders) {
+TEST(xcomponentStream, EveryTypeReadsBackInBothByteOrders) {
   for (Order order : {Order::Little, Order::Big}) {
     for (int32_t type : kTypes) {
       std::string record = Record(type, Width::Reader, order);
@@ -230,7 +230,7 @@ TEST(ComponentStream, EveryTypeReadsBackInBothByteOrders) {
   }
 }
 
-TEST(ComponentStream, DataOneKeepsTheLowHalfOfALong) {
+TEST(xcomponentStream, DataOneKeepsTheLowHalfOfALong) {
   if (!kLongIs8) GTEST_SKIP() << "a long has no upper half";
   for (Order order : {Order::Little, Order::Big}) {
     std::string record = Record(4, Width::Reader, order);
@@ -242,7 +242,7 @@ TEST(ComponentStream, DataOneKeepsTheLowHalfOfALong) {
   }
 }
 
-TEST(ComponentStream, OwnRecordsReadBackWhereLongIsFourBytes) {
+TEST(xcomponentStream, OwnRecordsReadBackWhereLongIsFourBytes) {
   for (int32_t type : kTypes) {
     CvltComponent written, read;
     Fill(written, type);
@@ -256,7 +256,7 @@ TEST(ComponentStream, OwnRecordsReadBackWhereLongIsFourBytes) {
   }
 }
 
-TEST(ComponentStream, AnotherRecordSizeIsAnotherVersion) {
+TEST(xcomponentStream, AnotherRecordSizeIsAnotherVersion) {
   for (uint32_t size : {kRecordSize == 112 ? 72u : 112u, 120u, 76u, 0u, 0x70000000u}) {
     CvltComponent component;
     size_t consumed = 0;
@@ -269,7 +269,7 @@ TEST(ComponentStream, AnotherRecordSizeIsAnotherVersion) {
   }
 }
 
-TEST(ComponentStream, OldTextsAreNotFreed) {
+TEST(xcomponentStream, OldTextsAreNotFreed) {
   CvltComponent component;
   Fill(component, 5);
   wchar_t *name = component.record().name, *file = component.record().fileName,
@@ -281,7 +281,7 @@ TEST(ComponentStream, OldTextsAreNotFreed) {
   for (wchar_t* text : {name, file, pnp}) ZtTaskMemFree(text);
 }
 
-TEST(ComponentStream, TextsEndAtTheirFirstZero) {
+TEST(xcomponentStream, TextsEndAtTheirFirstZero) {
   RecordBytes record(Width::Reader);
   record.number(kRecordSize).number(3).number(0).text(std::string("ab\0cd", 5)).wide(1);
   record.number(2, 2).number(3, 2).raw(std::string(8, 'g')).text("file").raw("12345678").number(9);
@@ -292,7 +292,7 @@ TEST(ComponentStream, TextsEndAtTheirFirstZero) {
   EXPECT_EQ(component.record().opaqueWord, 9);
 }
 
-TEST(ComponentStream, LongTextsReadWhole) {
+TEST(xcomponentStream, LongTextsReadWhole) {
   std::string name(200000, 'n');
   RecordBytes record(Width::Reader);
   record.number(kRecordSize).number(3).number(0).text(name).wide(1).number(2, 2).number(3, 2);
@@ -304,7 +304,7 @@ TEST(ComponentStream, LongTextsReadWhole) {
 
 // ---- Failures
 
-TEST(ComponentStream, EveryTruncationPoint) {
+TEST(xcomponentStream, EveryTruncationPoint) {
   for (Order order : {Order::Little, Order::Big}) {
     for (int32_t type : kTypes) {
       std::string whole = Record(type, Width::Reader, order);
@@ -324,7 +324,7 @@ TEST(ComponentStream, EveryTruncationPoint) {
   }
 }
 
-TEST(ComponentStream, WhatWasReadStays) {
+TEST(xcomponentStream, WhatWasReadStays) {
   std::string whole = Record(2, Width::Reader);
   CvltComponent component;
   // Without fragmentRegistered and what follows it.
@@ -336,7 +336,7 @@ TEST(ComponentStream, WhatWasReadStays) {
   EXPECT_EQ(component.record().dictionary.auxString2, nullptr);
 }
 
-TEST(ComponentStream, FailedReadsByTheirPlace) {
+TEST(xcomponentStream, FailedReadsByTheirPlace) {
   ForeignStream whole;
   whole.input = Header() + Record(2, Width::Reader);
   {
@@ -363,7 +363,7 @@ TEST(ComponentStream, FailedReadsByTheirPlace) {
   }
 }
 
-TEST(ComponentStream, LengthsBeyond32BitsAreOutOfRange) {
+TEST(xcomponentStream, LengthsBeyond32BitsAreOutOfRange) {
   if (!kLongIs8) GTEST_SKIP() << "a length has 32 bits";
   for (uint64_t length : {uint64_t{0x100000000}, ~uint64_t{0}}) {
     CvltComponent component;
@@ -373,7 +373,7 @@ TEST(ComponentStream, LengthsBeyond32BitsAreOutOfRange) {
   }
 }
 
-TEST_IN_CHILD(ComponentStream, UntrueLengthsTakeNoMemory) {
+TEST_IN_CHILD(xcomponentStream, UntrueLengthsTakeNoMemory) {
   if (kCanLimitMemory) LimitMemoryTo(32 << 20);
   CvltComponent component;
   std::string record =
@@ -382,7 +382,7 @@ TEST_IN_CHILD(ComponentStream, UntrueLengthsTakeNoMemory) {
   EXPECT_EQ(W(component.record().name), L"abc");  // the missing bytes are zeros
 }
 
-TEST(ComponentStream, AnotherTypesVariantIsNeverTakenForTexts) {
+TEST(xcomponentStream, AnotherTypesVariantIsNeverTakenForTexts) {
   std::string whole = Record(2, Width::Reader);
   for (size_t size = 12; size < whole.size(); ++size) {
     CvltComponent component;
@@ -396,7 +396,7 @@ TEST(ComponentStream, AnotherTypesVariantIsNeverTakenForTexts) {
   EXPECT_EQ(Read(whole.substr(0, 12), cleared), Thrown::EndOfStream);
 }
 
-TEST(ComponentStream, WithoutMemoryTheComponentStaysSafe) {
+TEST(xcomponentStream, WithoutMemoryTheComponentStaysSafe) {
   RecordBytes record(Width::Reader);
   std::string text(100, 't');
   record.number(kRecordSize).number(3).number(5).text(text).wide(1).number(2, 2).number(3, 2);

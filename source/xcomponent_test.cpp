@@ -39,7 +39,7 @@ _vltComponent2 FullRecord(_vltComponentType type) {
   return r;
 }
 
-TEST(Component, DefaultBuiltHasStampsAndNothingElse) {
+TEST(xcomponent, DefaultBuiltHasStampsAndNothingElse) {
   CvltComponent c;
   EXPECT_EQ(c.record().size, sizeof(_vltComponent2));
   EXPECT_EQ(c.record().version, 0xFFFFFFFFu);
@@ -50,7 +50,7 @@ TEST(Component, DefaultBuiltHasStampsAndNothingElse) {
   EXPECT_EQ(c.record().dictionary.lastInstalledSchemaVersion, 0u);
 }
 
-TEST(Component, DeepCopyOfADictionaryOwnsEveryText) {
+TEST(xcomponent, DeepCopyOfADictionaryOwnsEveryText) {
   _vltComponent2 source = FullRecord(vltComponentDataDictionary);
   _vltComponent2 copy;
   memset(&copy, 0xAA, sizeof copy);
@@ -73,7 +73,7 @@ TEST(Component, DeepCopyOfADictionaryOwnsEveryText) {
   vltutilsFreeComponent2(source);
 }
 
-TEST(Component, NullTextsStayNullInACopy) {
+TEST(xcomponent, NullTextsStayNullInACopy) {
   _vltComponent2 source = FullRecord(vltComponentDataDictionary);
   vltFree(source.dictionary.auxString1);
   source.dictionary.auxString1 = nullptr;
@@ -85,7 +85,7 @@ TEST(Component, NullTextsStayNullInACopy) {
   vltutilsFreeComponent2(source);
 }
 
-TEST(Component, ExpertsCopyTheirWordsAndTypeSevenDoesNot) {
+TEST(xcomponent, ExpertsCopyTheirWordsAndTypeSevenDoesNot) {
   for (auto type : {vltComponentObjectExpert, vltComponentUIProvider, vltComponentType7}) {
     _vltComponent2 source = FullRecord(type);
     _vltComponent2 copy;
@@ -101,7 +101,7 @@ TEST(Component, ExpertsCopyTheirWordsAndTypeSevenDoesNot) {
   }
 }
 
-TEST(Component, WideningStampsSizeAndVersion) {
+TEST(xcomponent, WideningStampsSizeAndVersion) {
   _vltComponent2 from = FullRecord(vltComponentResourceExpert);
   _vltComponent first = {from.type,       from.name, from.identifier, from.fileName, {},
                          from.opaqueWord, {}};
@@ -120,9 +120,9 @@ TEST(Component, WideningStampsSizeAndVersion) {
 }
 
 template <class Narrow>
-class ComponentNarrowing : public testing::Test {};
+class xcomponentNarrowing : public testing::Test {};
 using Narrows = testing::Types<_vltComponent2point1, _vltComponent2point2>;
-TYPED_TEST_SUITE(ComponentNarrowing, Narrows);
+TYPED_TEST_SUITE(xcomponentNarrowing, Narrows);
 
 // Ends the texts of a record of either generation.
 template <class Narrow>
@@ -160,7 +160,7 @@ void ExpectNarrowVariant(const Narrow& copy, const _vltComponent2& source) {
   }
 }
 
-TYPED_TEST(ComponentNarrowing, KeepsWhatTheOlderGenerationHas) {
+TYPED_TEST(xcomponentNarrowing, KeepsWhatTheOlderGenerationHas) {
   for (auto type : {vltComponentDataDictionary, vltComponentObjectExpert,
                     vltComponentResourceExpert, vltComponentUIProvider, vltComponentType7}) {
     SCOPED_TRACE(type);
@@ -180,7 +180,7 @@ TYPED_TEST(ComponentNarrowing, KeepsWhatTheOlderGenerationHas) {
   }
 }
 
-TEST(Component, AttachTakesThePointersAndKeepsTheVersion) {
+TEST(xcomponent, AttachTakesThePointersAndKeepsTheVersion) {
   _vltComponent2 from = FullRecord(vltComponentUIProvider);
   _vltComponent first = {from.type, from.name, from.identifier, from.fileName, {}, 0, {}};
   first.expert = from.expert;
@@ -244,7 +244,7 @@ constexpr _vltComponentType kTypes[] = {vltComponentDataDictionary, vltComponent
                                         vltComponentResourceExpert, vltComponentUIProvider,
                                         vltComponentType7};
 
-TEST(Component, SwapExchangesEveryFieldOfEveryType) {
+TEST(xcomponent, SwapExchangesEveryFieldOfEveryType) {
   for (auto type : kTypes) {
     SCOPED_TRACE(type);
     _vltComponent2 a = FullRecord(type), b = OtherRecord(type);
@@ -256,7 +256,7 @@ TEST(Component, SwapExchangesEveryFieldOfEveryType) {
 }
 
 // Without a variant the words stay where they are.
-TEST(Component, SwapOfOtherTypesExchangesTheCommonFields) {
+TEST(xcomponent, SwapOfOtherTypesExchangesTheCommonFields) {
   _vltComponent2 a = FullRecord(vltComponentNone), b = OtherRecord(vltComponentNone);
   CvltComponent ca(&a, true), cb(&b, true);
   ca.record().expert = a.expert;
@@ -267,7 +267,7 @@ TEST(Component, SwapOfOtherTypesExchangesTheCommonFields) {
   ExpectSame(cb.record(), a);
 }
 
-TEST(Component, SwapOfDifferentTypesChangesNothing) {
+TEST(xcomponent, SwapOfDifferentTypesChangesNothing) {
   for (auto first : kTypes) {
     for (auto second : kTypes) {
       if (first == second) continue;
@@ -281,7 +281,7 @@ TEST(Component, SwapOfDifferentTypesChangesNothing) {
   }
 }
 
-TEST(Component, SwapLeavesTheLibrary) {
+TEST(xcomponent, SwapLeavesTheLibrary) {
   auto* library = reinterpret_cast<zt::fnd::osdep::SharedLibrary*>(uintptr_t{8});
   _vltComponent2 a = FullRecord(vltComponentObjectExpert),
                  b = OtherRecord(vltComponentObjectExpert);
@@ -291,7 +291,7 @@ TEST(Component, SwapLeavesTheLibrary) {
   EXPECT_EQ(cb.library(), nullptr);
 }
 
-TEST(Component, ClearZeroesTheCommonFieldsAndKeepsStampsAndVariant) {
+TEST(xcomponent, ClearZeroesTheCommonFieldsAndKeepsStampsAndVariant) {
   for (auto type : kTypes) {
     SCOPED_TRACE(type);
     _vltComponent2 r = FullRecord(type), cleared = r;
@@ -308,7 +308,7 @@ TEST(Component, ClearZeroesTheCommonFieldsAndKeepsStampsAndVariant) {
   }
 }
 
-TEST(Component, MotionExpertsKeepNameAndPnp) {
+TEST(xcomponent, MotionExpertsKeepNameAndPnp) {
   _vltComponent2 r = FullRecord(vltComponentResourceExpert);
   vltFree(r.name);
   r.name = Dup(L"Motion Expert Driver");
@@ -330,7 +330,7 @@ long LeftBehindBy(const wchar_t* name, _vltComponentType type) {
   return heap::LiveBlocks() - before;
 }
 
-TEST(Component, AnyOtherNameIsFreedWhole) {
+TEST(xcomponent, AnyOtherNameIsFreedWhole) {
   heap::LiveBlocks();
   for (const wchar_t* name :
        {L"Motion Driver", L"Expert", L"motion expert", L"Motion expert", L""}) {
@@ -380,7 +380,7 @@ long FailedAllocations(const Source& source) {
   return n;
 }
 
-TEST(ComponentMemory, ACopyThatFailsLeavesNothing) {
+TEST(xcomponentMemory, ACopyThatFailsLeavesNothing) {
   if (!kCanLimitMemory) {
     printf("NOT TESTED: the sanitizer has a malloc of its own\n");
     GTEST_SKIP();
@@ -402,7 +402,7 @@ TEST(ComponentMemory, ACopyThatFailsLeavesNothing) {
 }
 
 // A component that was to be a copy is one without texts, and ends like any other.
-TEST(ComponentMemory, AComponentWhoseCopyFailedHoldsNoTexts) {
+TEST(xcomponentMemory, AComponentWhoseCopyFailedHoldsNoTexts) {
   if (!kCanLimitMemory) {
     printf("NOT TESTED: the sanitizer has a malloc of its own\n");
     GTEST_SKIP();
@@ -422,7 +422,7 @@ TEST(ComponentMemory, AComponentWhoseCopyFailedHoldsNoTexts) {
   vltutilsFreeComponent2(source);
 }
 
-TEST(Component, DynamicComponentRemembersItsLibrary) {
+TEST(xcomponent, DynamicComponentRemembersItsLibrary) {
   auto* library = reinterpret_cast<zt::fnd::osdep::SharedLibrary*>(uintptr_t{8});
   _vltComponent2 r = FullRecord(vltComponentObjectExpert);
   CvltDynComponent copied(&r, library, false);

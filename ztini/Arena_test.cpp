@@ -13,7 +13,7 @@ namespace {
 
 using ztini::Arena;
 
-TEST(IniArena, RecordsAreAlignedAndTextsAreWhole) {
+TEST(Arena, RecordsAreAlignedAndTextsAreWhole) {
   Arena arena;
   std::vector<char*> records, texts;
   for (int i = 0; i < 5000; ++i) {
@@ -31,7 +31,7 @@ TEST(IniArena, RecordsAreAlignedAndTextsAreWhole) {
   }
 }
 
-TEST(IniArena, OnePieceMayBeOfAnySize) {
+TEST(Arena, OnePieceMayBeOfAnySize) {
   Arena arena;
   for (size_t size = 1; size < (size_t(4) << 20); size = size * 3 + 1) {
     const std::string text(size, 't');
@@ -48,7 +48,7 @@ TEST(IniArena, OnePieceMayBeOfAnySize) {
   EXPECT_EQ(arena.record(SIZE_MAX - 64), nullptr);
 }
 
-TEST(IniArena, WithoutMemoryItGivesNullAndStaysUsable) {
+TEST(Arena, WithoutMemoryItGivesNullAndStaysUsable) {
   Arena arena;
   {
     ztini::test::FailFromAllocation fail(1);

@@ -13,7 +13,7 @@ constexpr char kRead[] =
 
 constexpr char kWritten[] = "[Jar]\nPort = 7\nTxt = \" a\\n\"\n[B]\n\n[New]\nK = \"a\\tb\"\n\n";
 
-TEST(IniDialect, WorkedExample) {
+TEST(Dialect, WorkedExample) {
   vlt::test::TempDir dir;
   const std::string path = dir / "a.ini";
   ASSERT_EQ(sizeof kRead - 1, 64u);

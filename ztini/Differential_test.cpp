@@ -267,9 +267,9 @@ void Play::run() {
   }
 }
 
-class IniDifferential : public testing::TestWithParam<int> {};
+class Differential : public testing::TestWithParam<int> {};
 
-TEST_P(IniDifferential, ResultsAreThoseRecorded) {
+TEST_P(Differential, ResultsAreThoseRecorded) {
   constexpr std::array<uint64_t, 8> kRecorded = {
       0x60f321e633732cdau, 0xcdfea5f240a6f93bu, 0x43063fe6e9f4b9c8u, 0x15bedbb673684a82u,
       0xd2190c068c6d0a9fu, 0x94b4159c9c95dbc5u, 0x96c0cf85688f830eu, 0xc351b6678b592bau,
@@ -282,6 +282,6 @@ TEST_P(IniDifferential, ResultsAreThoseRecorded) {
   EXPECT_EQ(digest.value(), kRecorded[group]) << "0x" << std::hex << digest.value() << "u";
 }
 
-INSTANTIATE_TEST_SUITE_P(Groups, IniDifferential, testing::Range(0, 8));
+INSTANTIATE_TEST_SUITE_P(Groups, Differential, testing::Range(0, 8));
 
 }  // namespace

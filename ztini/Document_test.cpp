@@ -15,7 +15,7 @@ using ztini::test::Document;
 using ztini::test::FailFromAllocation;
 using ztini::test::NewDocument;
 
-TEST(IniDocument, NewOneHasTheSettledDefaults) {
+TEST(Document, NewOneHasTheSettledDefaults) {
   Document doc = NewDocument();
   ASSERT_NE(doc, nullptr);
   EXPECT_EQ(doc->sections.count(), 0);
@@ -34,21 +34,21 @@ TEST(IniDocument, NewOneHasTheSettledDefaults) {
   EXPECT_EQ(doc->fileTimestamp, 0);
 }
 
-TEST(IniDocument, ReservedMustBeZero) {
+TEST(Document, ReservedMustBeZero) {
   EXPECT_EQ(IniNew(1), nullptr);
   EXPECT_EQ(IniNew(-1), nullptr);
 }
 
-TEST(IniDocument, NewFailsWithNullAtEveryAllocation) {
+TEST(Document, NewFailsWithNullAtEveryAllocation) {
   for (int number = 1; number <= 3; ++number) {
     FailFromAllocation fail(number);
     EXPECT_EQ(IniNew(0), nullptr) << number;
   }
 }
 
-TEST(IniDocument, DisposeTakesNull) { IniDispose(nullptr); }
+TEST(Document, DisposeTakesNull) { IniDispose(nullptr); }
 
-TEST(IniDocument, SettersReplaceAndTellWhatWas) {
+TEST(Document, SettersReplaceAndTellWhatWas) {
   Document doc = NewDocument();
   EXPECT_EQ(IniSetDuplicateChecking(doc.get(), 0), 1);
   EXPECT_EQ(IniSetDuplicateChecking(doc.get(), 7), 0);
@@ -63,14 +63,14 @@ TEST(IniDocument, SettersReplaceAndTellWhatWas) {
   EXPECT_EQ(IniSetDurability(doc.get(), IniDurability::None), IniDurability::Synced);
 }
 
-TEST(IniDocument, SettersTakeNull) {
+TEST(Document, SettersTakeNull) {
   EXPECT_EQ(IniSetDuplicateChecking(nullptr, 1), 0);
   EXPECT_EQ(IniSetReadOptions(nullptr, 1), 0);
   EXPECT_EQ(IniSetWriteOptions(nullptr, 1, 2, 3), 0);
   EXPECT_EQ(IniSetDurability(nullptr, IniDurability::Synced), IniDurability::None);
 }
 
-TEST(IniDocument, RecordsAreTrimmedAndCarryTheDocumentsFlags) {
+TEST(Document, RecordsAreTrimmedAndCarryTheDocumentsFlags) {
   Document doc = NewDocument();
   doc->sectionFlags = 77;
   IniSection* section = IniNewSection(doc.get(), "  a b\t");
@@ -86,7 +86,7 @@ TEST(IniDocument, RecordsAreTrimmedAndCarryTheDocumentsFlags) {
   IniDisposeEntry(entry);
 }
 
-TEST(IniDocument, QuotesAreRemovedAsTheOptionsSay) {
+TEST(Document, QuotesAreRemovedAsTheOptionsSay) {
   const struct {
     int32_t options;
     const char *value, *expected;
@@ -119,7 +119,7 @@ TEST(IniDocument, QuotesAreRemovedAsTheOptionsSay) {
   }
 }
 
-TEST(IniDocument, RecordsFailWithNullAtEveryAllocation) {
+TEST(Document, RecordsFailWithNullAtEveryAllocation) {
   Document doc = NewDocument();
   for (int number = 1; number <= 2; ++number) {
     FailFromAllocation fail(number);
@@ -131,7 +131,7 @@ TEST(IniDocument, RecordsFailWithNullAtEveryAllocation) {
   }
 }
 
-TEST(IniDocument, DocumentsOfDifferentThreadsShareNothing) {
+TEST(Document, DocumentsOfDifferentThreadsShareNothing) {
   const auto work = [] {
     std::string text = "[s]\n";
     for (int i = 0; i < 200; ++i) text += "n" + std::to_string(i) + "=v\n";

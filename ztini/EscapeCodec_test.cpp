@@ -24,7 +24,7 @@ std::string Decoded(const std::string& text) {
   return decoded.substr(0, length);
 }
 
-TEST(IniEscapes, Encoding) {
+TEST(EscapeCodec, Encoding) {
   const struct {
     const char *text, *expected;
   } rows[] = {{"", ""},
@@ -45,7 +45,7 @@ TEST(IniEscapes, Encoding) {
   for (const auto& row : rows) EXPECT_EQ(Encoded(row.text), row.expected);
 }
 
-TEST(IniEscapes, Decoding) {
+TEST(EscapeCodec, Decoding) {
   const struct {
     const char* text;
     std::string expected;
@@ -77,20 +77,20 @@ TEST(IniEscapes, Decoding) {
   for (const auto& row : rows) EXPECT_EQ(Decoded(row.text), row.expected) << row.text;
 }
 
-TEST(IniEscapes, EveryByteSurvivesBothWays) {
+TEST(EscapeCodec, EveryByteSurvivesBothWays) {
   for (int c = 1; c < 256; ++c) {
     const std::string text = "<" + std::string(1, static_cast<char>(c)) + ">";
     EXPECT_EQ(Decoded(Encoded(text)), text) << c;
   }
 }
 
-TEST(IniEscapes, ALongValueOfControlsGrowsFourfold) {
+TEST(EscapeCodec, ALongValueOfControlsGrowsFourfold) {
   const std::string text(65536, '\x02');
   EXPECT_EQ(Encoded(text).size(), 4u * 65536u);
   EXPECT_EQ(Decoded(Encoded(text)), text);
 }
 
-TEST(IniEscapes, EncodingWithoutMemoryIsNull) {
+TEST(EscapeCodec, EncodingWithoutMemoryIsNull) {
   ztini::test::FailFromAllocation fail(1);
   EXPECT_EQ(ztini::EncodeEscapes("a"), nullptr);
 }

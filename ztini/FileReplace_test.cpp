@@ -24,7 +24,7 @@ using vlt::test::WriteBytes;
 using ztini::FileReplacement;
 using ztini::OwnedText;
 
-TEST(IniFileReplace, SiblingNames) {
+TEST(FileReplace, SiblingNames) {
   const struct {
     const char *target, *expected;
   } rows[] = {
@@ -39,7 +39,7 @@ TEST(IniFileReplace, SiblingNames) {
   }
 }
 
-TEST(IniFileReplace, UniqueTemplates) {
+TEST(FileReplace, UniqueTemplates) {
   const struct {
     const char *target, *expected;
   } rows[] = {{"/d/a.ini", "/d/ini$$.TMPXXXXXX"},
@@ -52,7 +52,7 @@ TEST(IniFileReplace, UniqueTemplates) {
   }
 }
 
-TEST(IniFileReplace, WithoutACommitTheTargetIsAsBeforeAndNothingElseRemains) {
+TEST(FileReplace, WithoutACommitTheTargetIsAsBeforeAndNothingElseRemains) {
   for (int32_t options : {2, 6}) {
     TempDir dir;
     const std::string path = dir / "a.ini";
@@ -83,7 +83,7 @@ int DescriptorFlagsBelow(const TempDir& dir) {
   return -1;
 }
 
-TEST(IniFileReplace, TheFileIsCloseOnExec) {
+TEST(FileReplace, TheFileIsCloseOnExec) {
   for (int32_t options : {0, 2, 6}) {
     TempDir dir;
     const std::string path = dir / "a.ini";
@@ -93,7 +93,7 @@ TEST(IniFileReplace, TheFileIsCloseOnExec) {
   }
 }
 
-TEST(IniFileReplace, TheNewFileHasModeAndOwnerBeforeItIsInPlace) {
+TEST(FileReplace, TheNewFileHasModeAndOwnerBeforeItIsInPlace) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   WriteBytes(path, "old");
@@ -116,7 +116,7 @@ TEST(IniFileReplace, TheNewFileHasModeAndOwnerBeforeItIsInPlace) {
   }
 }
 
-TEST(IniFileReplace, AFailedRenameRemovesTheTemporary) {
+TEST(FileReplace, AFailedRenameRemovesTheTemporary) {
   TempDir dir;
   const std::string path = dir / "a.ini", temporary = dir / "a.TMP";
   FileReplacement file(path.c_str(), 2);
@@ -127,7 +127,7 @@ TEST(IniFileReplace, AFailedRenameRemovesTheTemporary) {
   EXPECT_FALSE(Exists(temporary));
 }
 
-TEST(IniFileReplace, AStaleSiblingIsReplacedAndAPlantedLinkNotFollowed) {
+TEST(FileReplace, AStaleSiblingIsReplacedAndAPlantedLinkNotFollowed) {
   TempDir dir;
   const std::string path = dir / "a.ini", temporary = dir / "a.TMP", victim = dir / "victim";
   WriteBytes(temporary, "left by a writer that was killed");
@@ -147,7 +147,7 @@ TEST(IniFileReplace, AStaleSiblingIsReplacedAndAPlantedLinkNotFollowed) {
   EXPECT_EQ(ReadBytes(path), "new");
 }
 
-TEST(IniFileReplace, ADirectoryInTheSiblingsPlaceIsMovedAside) {
+TEST(FileReplace, ADirectoryInTheSiblingsPlaceIsMovedAside) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   dir.makeDir("a.TMP/inside");
@@ -160,7 +160,7 @@ TEST(IniFileReplace, ADirectoryInTheSiblingsPlaceIsMovedAside) {
   EXPECT_TRUE(Exists(path));
 }
 
-TEST(IniFileReplace, AFileOfAnotherUserLosesItsSetUserIdBit) {
+TEST(FileReplace, AFileOfAnotherUserLosesItsSetUserIdBit) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   WriteBytes(path, "old");
@@ -171,7 +171,7 @@ TEST(IniFileReplace, AFileOfAnotherUserLosesItsSetUserIdBit) {
   EXPECT_EQ(ModeOf(path), 0755);
 }
 
-TEST(IniFileReplace, AFailedSyncIsAFailedSave) {
+TEST(FileReplace, AFailedSyncIsAFailedSave) {
   for (IniDurability durability : {IniDurability::ContentOnly, IniDurability::Synced}) {
     TempDir dir;
     const std::string path = dir / "a.ini";
@@ -189,7 +189,7 @@ TEST(IniFileReplace, AFailedSyncIsAFailedSave) {
   }
 }
 
-TEST(IniFileReplace, OpenWithoutMemoryLeavesNothing) {
+TEST(FileReplace, OpenWithoutMemoryLeavesNothing) {
   for (int32_t options : {2, 6}) {
     TempDir dir;
     const std::string path = dir / "a.ini";

@@ -38,7 +38,7 @@ bool IsOnlyFile(const TempDir& dir, const std::string& path) {
   return unlink(path.c_str()) == 0 && rmdir(dir.path().c_str()) == 0;
 }
 
-TEST(IniFileWriter, NewFilesAndTheirModes) {
+TEST(FileWriter, NewFilesAndTheirModes) {
   const struct {
     int32_t options;
     int mode;
@@ -55,7 +55,7 @@ TEST(IniFileWriter, NewFilesAndTheirModes) {
   }
 }
 
-TEST(IniFileWriter, ExistingFilesKeepTheirMode) {
+TEST(FileWriter, ExistingFilesKeepTheirMode) {
   for (int32_t options : {8, 10, 14, 26}) {
     TempDir dir;
     const std::string path = dir / "a.ini";
@@ -68,7 +68,7 @@ TEST(IniFileWriter, ExistingFilesKeepTheirMode) {
   }
 }
 
-TEST(IniFileWriter, SuccessRemembersPathAndTime) {
+TEST(FileWriter, SuccessRemembersPathAndTime) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   Document doc = Sample(14);
@@ -80,7 +80,7 @@ TEST(IniFileWriter, SuccessRemembersPathAndTime) {
   EXPECT_EQ(IniIsFileNewer(doc.get()), 0);
 }
 
-TEST(IniFileWriter, BadPaths) {
+TEST(FileWriter, BadPaths) {
   Document doc = Sample(14);
   EXPECT_EQ(IniWriteToFile(doc.get(), ""), kIniBadPath);
   EXPECT_EQ(IniWriteToFile(doc.get(), nullptr), kIniBadPath);
@@ -88,7 +88,7 @@ TEST(IniFileWriter, BadPaths) {
   EXPECT_EQ(doc->fileName, nullptr);
 }
 
-TEST(IniFileWriter, ADirectoryThatIsMissingOrATargetThatIsADirectory) {
+TEST(FileWriter, ADirectoryThatIsMissingOrATargetThatIsADirectory) {
   TempDir dir;
   const std::string missing = dir / "none/a.ini";
   for (int32_t options : {10, 14}) {
@@ -106,7 +106,7 @@ int WriteWithoutPrivilege(const std::string& path, int32_t options) {
   return -IniWriteToFile(Sample(options).get(), path.c_str());
 }
 
-TEST(IniFileWriter, ATargetThatCannotBeWrittenFailsTheProbeUntouched) {
+TEST(FileWriter, ATargetThatCannotBeWrittenFailsTheProbeUntouched) {
   TempDir dir;
   chmod(dir.path().c_str(), 0777);
   const std::string path = dir / "a.ini";
@@ -121,7 +121,7 @@ TEST(IniFileWriter, ATargetThatCannotBeWrittenFailsTheProbeUntouched) {
   EXPECT_TRUE(IsOnlyFile(dir, path));
 }
 
-TEST(IniFileWriter, NoRoomForATemporaryLeavesTheTarget) {
+TEST(FileWriter, NoRoomForATemporaryLeavesTheTarget) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   WriteBytes(path, "old");
@@ -136,7 +136,7 @@ TEST(IniFileWriter, NoRoomForATemporaryLeavesTheTarget) {
   EXPECT_TRUE(IsOnlyFile(dir, path));
 }
 
-TEST(IniFileWriter, ANameWithoutRoomRemovesTheTemporary) {
+TEST(FileWriter, ANameWithoutRoomRemovesTheTemporary) {
   for (int32_t options : {10, 14}) {
     TempDir dir;
     const std::string path = dir / "a.ini";
@@ -151,7 +151,7 @@ TEST(IniFileWriter, ANameWithoutRoomRemovesTheTemporary) {
   }
 }
 
-TEST(IniFileWriter, AFailedDirectWriteDeletesTheTarget) {
+TEST(FileWriter, AFailedDirectWriteDeletesTheTarget) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   WriteBytes(path, "old");
@@ -172,7 +172,7 @@ int WriteBeyondTheLimit(const std::string& path, int32_t options) {
   return -IniWriteToFile(doc.get(), path.c_str());
 }
 
-TEST(IniFileWriter, AFullDiskLeavesTheTargetAndNoTemporary) {
+TEST(FileWriter, AFullDiskLeavesTheTargetAndNoTemporary) {
   for (int32_t options : {10, 14, 26}) {
     TempDir dir;
     const std::string path = dir / "a.ini";
@@ -184,7 +184,7 @@ TEST(IniFileWriter, AFullDiskLeavesTheTargetAndNoTemporary) {
   }
 }
 
-TEST(IniFileWriter, NamedPipesAndDevicesAreRefusedWithoutWaiting) {
+TEST(FileWriter, NamedPipesAndDevicesAreRefusedWithoutWaiting) {
   TempDir dir;
   const std::string pipe = dir / "a.ini";
   ASSERT_EQ(mkfifo(pipe.c_str(), 0666), 0);
@@ -197,7 +197,7 @@ TEST(IniFileWriter, NamedPipesAndDevicesAreRefusedWithoutWaiting) {
   EXPECT_TRUE(IsOnlyFile(dir, pipe));
 }
 
-TEST(IniFileWriter, LinksAreReplacedByTheFile) {
+TEST(FileWriter, LinksAreReplacedByTheFile) {
   TempDir dir;
   const std::string path = dir / "a.ini", real = dir / "real.ini";
   WriteBytes(real, "old");
@@ -209,7 +209,7 @@ TEST(IniFileWriter, LinksAreReplacedByTheFile) {
   EXPECT_EQ(ReadBytes(real), "old");
 }
 
-TEST(IniFileWriter, ADanglingLinkCountsAsAbsent) {
+TEST(FileWriter, ADanglingLinkCountsAsAbsent) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   ASSERT_EQ(symlink((dir / "nowhere").c_str(), path.c_str()), 0);
@@ -218,7 +218,7 @@ TEST(IniFileWriter, ADanglingLinkCountsAsAbsent) {
   EXPECT_EQ(ModeOf(path) & 0700, 0600);
 }
 
-TEST(IniFileWriter, RelativePathsUseTheWorkingDirectory) {
+TEST(FileWriter, RelativePathsUseTheWorkingDirectory) {
   TempDir dir;
   ASSERT_EQ(chdir(dir.path().c_str()), 0);
   for (int32_t options : {8, 10, 14}) {
@@ -232,7 +232,7 @@ TEST(IniFileWriter, RelativePathsUseTheWorkingDirectory) {
   EXPECT_TRUE(IsOnlyFile(dir, dir / "a.ini"));
 }
 
-TEST(IniFileWriter, LongPathsWork) {
+TEST(FileWriter, LongPathsWork) {
   TempDir dir;
   std::string deep;
   for (int i = 0; i < 8; ++i) deep += std::string(i ? "/" : "") + std::string(60, 'd');
@@ -245,7 +245,7 @@ TEST(IniFileWriter, LongPathsWork) {
 
 // Items without a section come first. What begins one of their names must not be taken for a mark of
 // the whole file, which then would be refused, or lose these bytes.
-TEST(IniFileWriter, ANameLikeAByteOrderMarkDoesNotBeginTheFile) {
+TEST(FileWriter, ANameLikeAByteOrderMarkDoesNotBeginTheFile) {
   for (const std::string name : {"\xFE\xFFname", "\xFF\xFEname", "\xEF\xBB\xBFname"}) {
     TempDir dir;
     WriteBytes(dir / "x.ini", "\n" + name + " = 1\n[s]\na = 2\n");
@@ -269,7 +269,7 @@ TEST(IniFileWriter, ANameLikeAByteOrderMarkDoesNotBeginTheFile) {
   }
 }
 
-TEST(IniFileWriter, TheMarkOfAReadFileIsWrittenBackOnlyWhenAskedFor) {
+TEST(FileWriter, TheMarkOfAReadFileIsWrittenBackOnlyWhenAskedFor) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   WriteBytes(path, "\xEF\xBB\xBF[a]\nx=1\n");
@@ -283,7 +283,7 @@ TEST(IniFileWriter, TheMarkOfAReadFileIsWrittenBackOnlyWhenAskedFor) {
   EXPECT_EQ(ReadBytes(path), "\xEF\xBB\xBF[a]\nx = 1\n");
 }
 
-TEST(IniFileWriter, WhatIsWrittenReadsBackThroughAnotherDocument) {
+TEST(FileWriter, WhatIsWrittenReadsBackThroughAnotherDocument) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   Document doc = NewDocument();
@@ -302,7 +302,7 @@ TEST(IniFileWriter, WhatIsWrittenReadsBackThroughAnotherDocument) {
   EXPECT_EQ(number, 2.5);
 }
 
-TEST(IniFileWriter, EveryFailedAllocationLeavesTheTarget) {
+TEST(FileWriter, EveryFailedAllocationLeavesTheTarget) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   const int descriptors = OpenDescriptors();
@@ -337,7 +337,7 @@ int SaveForEver(const std::string& path, const vlt::test::Signal& started, int32
   }
 }
 
-TEST(IniFileWriter, AWriterKilledAtAnyMomentLeavesTheOldOrTheNewFile) {
+TEST(FileWriter, AWriterKilledAtAnyMomentLeavesTheOldOrTheNewFile) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   for (int round = 0; round < 40; ++round) {
@@ -356,7 +356,7 @@ TEST(IniFileWriter, AWriterKilledAtAnyMomentLeavesTheOldOrTheNewFile) {
   }
 }
 
-TEST(IniFileWriter, SyncTellsOfFilesThatAreNotThere) {
+TEST(FileWriter, SyncTellsOfFilesThatAreNotThere) {
   TempDir dir;
   EXPECT_EQ(ztini_SyncFile((dir / "none").c_str()), kIniBadPath);
   EXPECT_EQ(ztini_SyncFile(nullptr), kIniBadPath);
@@ -364,7 +364,7 @@ TEST(IniFileWriter, SyncTellsOfFilesThatAreNotThere) {
   EXPECT_EQ(ztini_SyncFile((dir / "a.ini").c_str()), 0);
 }
 
-TEST(IniFileWriter, RemoveFileIfExists) {
+TEST(FileWriter, RemoveFileIfExists) {
   TempDir dir;
   WriteBytes(dir / "a", "x");
   ztini_RemoveFileIfExists((dir / "a").c_str());

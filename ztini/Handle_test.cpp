@@ -15,7 +15,7 @@ std::string Bytes(ztini_Handle handle) {
   return std::string(static_cast<char*>(handle->data), handle->size);
 }
 
-TEST(IniHandle, NewBlockIsZeroFilled) {
+TEST(Handle, NewBlockIsZeroFilled) {
   ztini_Handle handle = ztini_PI_NewHandle(300);
   ASSERT_NE(handle, nullptr);
   EXPECT_EQ(ztini_PI_GetHandleSize(handle), 300u);
@@ -23,7 +23,7 @@ TEST(IniHandle, NewBlockIsZeroFilled) {
   ztini_PI_DisposeHandle(handle);
 }
 
-TEST(IniHandle, GrowthKeepsContentsAndZeroFillsTheRest) {
+TEST(Handle, GrowthKeepsContentsAndZeroFillsTheRest) {
   ztini_Handle handle = ztini_PI_NewHandle(3);
   memcpy(handle->data, "abc", 3);
   EXPECT_EQ(ztini_PI_SetHandleSize(handle, 1000), 1);
@@ -35,7 +35,7 @@ TEST(IniHandle, GrowthKeepsContentsAndZeroFillsTheRest) {
   ztini_PI_DisposeHandle(handle);
 }
 
-TEST(IniHandle, SizeZeroIsAUsableHandle) {
+TEST(Handle, SizeZeroIsAUsableHandle) {
   ztini_Handle handle = ztini_PI_NewHandle(0);
   ASSERT_NE(handle, nullptr);
   EXPECT_EQ(ztini_PI_GetHandleSize(handle), 0u);
@@ -44,7 +44,7 @@ TEST(IniHandle, SizeZeroIsAUsableHandle) {
   ztini_PI_DisposeHandle(handle);
 }
 
-TEST(IniHandle, FailedResizeLeavesTheBlockIntact) {
+TEST(Handle, FailedResizeLeavesTheBlockIntact) {
   ztini_Handle handle = ztini_PI_NewHandle(3);
   memcpy(handle->data, "abc", 3);
   {
@@ -55,14 +55,14 @@ TEST(IniHandle, FailedResizeLeavesTheBlockIntact) {
   ztini_PI_DisposeHandle(handle);
 }
 
-TEST(IniHandle, NewFailsWithNullAtEveryAllocation) {
+TEST(Handle, NewFailsWithNullAtEveryAllocation) {
   for (int number = 1; number <= 2; ++number) {
     FailFromAllocation fail(number);
     EXPECT_EQ(ztini_PI_NewHandle(10), nullptr) << number;
   }
 }
 
-TEST(IniHandle, NullIsAllowed) {
+TEST(Handle, NullIsAllowed) {
   ztini_PI_DisposeHandle(nullptr);
   EXPECT_EQ(ztini_PI_GetHandleSize(nullptr), 0u);
   EXPECT_EQ(ztini_PI_SetHandleSize(nullptr, 5), 0);

@@ -28,7 +28,7 @@ class Deadline {
   std::chrono::steady_clock::time_point m_begin = std::chrono::steady_clock::now();
 };
 
-TEST(IniHostile, AMillionSectionsAreReadFoundWrittenAndDisposed) {
+TEST(Hostile, AMillionSectionsAreReadFoundWrittenAndDisposed) {
   Deadline deadline;
   constexpr int kSections = 1000000;
   std::string text;
@@ -48,7 +48,7 @@ TEST(IniHostile, AMillionSectionsAreReadFoundWrittenAndDisposed) {
   EXPECT_TRUE(vlt::test::ReadBytes(path) == text);
 }
 
-TEST(IniHostile, AMillionItemsOfOneSection) {
+TEST(Hostile, AMillionItemsOfOneSection) {
   Deadline deadline;
   constexpr int kItems = 1000000;
   std::string text = "[s]\n";
@@ -58,7 +58,7 @@ TEST(IniHostile, AMillionItemsOfOneSection) {
   EXPECT_EQ(RawValue(doc, "s", "I999999"), "v");
 }
 
-TEST(IniHostile, AMillionRepeatsOfOneNameWithoutDuplicateChecking) {
+TEST(Hostile, AMillionRepeatsOfOneNameWithoutDuplicateChecking) {
   Deadline deadline;
   constexpr int kRepeats = 300000;
   std::string text;
@@ -94,7 +94,7 @@ std::string Repeat(int records, std::string (*record)(int)) {
   return text;
 }
 
-TEST(IniHostile, RecordsOfAFileTakeFewBytesAndFewBlocks) {
+TEST(Hostile, RecordsOfAFileTakeFewBytesAndFewBlocks) {
   constexpr int kRecords = 100000;
   const struct {
     const char* what;
@@ -120,7 +120,7 @@ TEST(IniHostile, RecordsOfAFileTakeFewBytesAndFewBlocks) {
   }
 }
 
-TEST(IniHostile, ManyPutsAndRemovalsFromEitherEnd) {
+TEST(Hostile, ManyPutsAndRemovalsFromEitherEnd) {
   Deadline deadline;
   constexpr int kCount = 200000;
   Document doc = NewDocument();
@@ -138,7 +138,7 @@ TEST(IniHostile, ManyPutsAndRemovalsFromEitherEnd) {
   EXPECT_EQ(IniNumberOfSections(doc.get()), kCount / 2 + 1);
 }
 
-TEST(IniHostile, NamesOfHighBytesSpreadLikeAnyOther) {
+TEST(Hostile, NamesOfHighBytesSpreadLikeAnyOther) {
   Deadline deadline;
   std::string text;
   constexpr int kSections = 300000;
@@ -150,7 +150,7 @@ TEST(IniHostile, NamesOfHighBytesSpreadLikeAnyOther) {
   EXPECT_EQ(IniNumberOfSections(Parse(text).get()), kSections);
 }
 
-TEST(IniHostile, ValuesAndNamesOf65536Bytes) {
+TEST(Hostile, ValuesAndNamesOf65536Bytes) {
   const std::string big(65536, 'b');
   Document doc = Parse("[" + big + "]\n" + big + "=\"" + big + "\"\n");
   EXPECT_EQ(RawValue(doc, big.c_str(), big.c_str()), big);
@@ -161,7 +161,7 @@ TEST(IniHostile, ValuesAndNamesOf65536Bytes) {
   EXPECT_EQ(WrittenText(doc), "[" + big + "]\n" + big + " = \"" + big + "\"\n");
 }
 
-TEST(IniHostile, ALineOfMegabytesWithoutAnEnd) {
+TEST(Hostile, ALineOfMegabytesWithoutAnEnd) {
   Deadline deadline;
   const std::string huge(20000000, 'h');
   EXPECT_EQ(RawValue(Parse("[s]\nx=" + huge), "s", "x").size(), huge.size());
@@ -169,11 +169,11 @@ TEST(IniHostile, ALineOfMegabytesWithoutAnEnd) {
   EXPECT_EQ(IniNumberOfSections(Parse(std::string(5000000, '\0')).get()), 0);
 }
 
-TEST(IniHostile, NulsEndLinesWhereverTheyStand) {
+TEST(Hostile, NulsEndLinesWhereverTheyStand) {
   EXPECT_EQ(ztini::test::Show(Parse("[s]\nx=a\0b=c\n\0\0y=2\n"s)), "[s@1] x=a@2 b=c@3 y=2@5");
 }
 
-TEST(IniHostile, LineFeedsInNamesAndValuesBreakLinesAndNothingElse) {
+TEST(Hostile, LineFeedsInNamesAndValuesBreakLinesAndNothingElse) {
   Document doc = NewDocument();
   IniPut(doc.get(), "a\nb", "x\ny", "1\n[c]\nz=2", 0);
   EXPECT_EQ(RawValue(doc, "A\nB", "X\nY"), "1\n[c]\nz=2");
@@ -181,7 +181,7 @@ TEST(IniHostile, LineFeedsInNamesAndValuesBreakLinesAndNothingElse) {
   EXPECT_EQ(ztini::test::Show(Parse(WrittenText(doc))), "[c@5] z=2@6");
 }
 
-TEST(IniHostile, BracketsAndSeparatorsInPutNames) {
+TEST(Hostile, BracketsAndSeparatorsInPutNames) {
   Document doc = NewDocument();
   IniPut(doc.get(), "a]b", "x=y", "1", 0);
   IniPut(doc.get(), "a]b", ";c", "1", 0);
@@ -189,7 +189,7 @@ TEST(IniHostile, BracketsAndSeparatorsInPutNames) {
 }
 
 // Every file of up to four bytes over the characters that mean something.
-TEST(IniHostile, EveryShortFileIsReadUnderEveryOption) {
+TEST(Hostile, EveryShortFileIsReadUnderEveryOption) {
   const std::string alphabet = "\n\r\0;[]=:\"' x1\xFF\xFE"s;
   std::string bytes;
   for (size_t i = 0; i < alphabet.size() * alphabet.size() * alphabet.size(); ++i) {
@@ -207,7 +207,7 @@ TEST(IniHostile, EveryShortFileIsReadUnderEveryOption) {
 }
 
 // Random bytes from the same characters: what was read, written and read again holds still.
-TEST(IniHostile, WrittenDocumentsReadBackAsThemselves) {
+TEST(Hostile, WrittenDocumentsReadBackAsThemselves) {
   const std::string alphabet = "\n\n\n[]]==;:\"'\\ xyzab Line1"s;
   uint32_t random = 20260101;
   for (int round = 0; round < 3000; ++round) {

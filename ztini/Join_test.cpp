@@ -15,7 +15,7 @@ using ztini::test::Parse;
 using ztini::test::RawValue;
 using ztini::test::Show;
 
-TEST(IniJoin, NamesOfPieces) {
+TEST(Join, NamesOfPieces) {
   const struct {
     std::string name;
     int32_t result;
@@ -54,7 +54,7 @@ TEST(IniJoin, NamesOfPieces) {
   EXPECT_EQ(AnalyzeItemName(nullptr, nullptr, nullptr), 0);
 }
 
-TEST(IniJoin, RunsMergeIntoTheirFirstPiece) {
+TEST(Join, RunsMergeIntoTheirFirstPiece) {
   const struct {
     const char *items, *expected;
   } rows[] = {
@@ -88,17 +88,17 @@ TEST(IniJoin, RunsMergeIntoTheirFirstPiece) {
   }
 }
 
-TEST(IniJoin, RunsEndWithTheirSection) {
+TEST(Join, RunsEndWithTheirSection) {
   Document doc = Parse("[a]\nA Line1=1\n[b]\nA Line2=2\n");
   EXPECT_EQ(Show(doc), "[a@1] A=1@2 [b@3] A Line2=2@4");
 }
 
-TEST(IniJoin, ReopenedSectionsJoinAcrossTheirParts) {
+TEST(Join, ReopenedSectionsJoinAcrossTheirParts) {
   Document doc = Parse("[a]\nA Line1=1\n[b]\n[a]\nA Line2=2\n");
   EXPECT_EQ(Show(doc), "[a@4] A=12@2 [b@3]");
 }
 
-TEST(IniJoin, LookUpKnowsTheNewNames) {
+TEST(Join, LookUpKnowsTheNewNames) {
   std::string text = "[s]\n";
   for (int i = 0; i < 50; ++i) text += "n" + std::to_string(i) + " Line1=v\n";
   Document doc = Parse(text);
@@ -106,13 +106,13 @@ TEST(IniJoin, LookUpKnowsTheNewNames) {
   EXPECT_EQ(RawValue(doc, "s", "n49 Line1"), "<absent>");
 }
 
-TEST(IniJoin, ALongBaseIsAnOrdinaryItem) {
+TEST(Join, ALongBaseIsAnOrdinaryItem) {
   const std::string base(256, 'n');
   Document doc = Parse("[s]\n" + base + " Line1=v\n");
   EXPECT_EQ(RawValue(doc, "s", (base + " Line1").c_str()), "v");
 }
 
-TEST(IniJoin, AHundredThousandPiecesJoinInBoundedTime) {
+TEST(Join, AHundredThousandPiecesJoinInBoundedTime) {
   std::string text = "[s]\n", expected;
   for (int i = 1; i <= 100000; ++i) {
     text += "A Line" + std::to_string(i) + "=ab\n";
@@ -123,7 +123,7 @@ TEST(IniJoin, AHundredThousandPiecesJoinInBoundedTime) {
   EXPECT_EQ(RawValue(doc, "s", "A"), expected);
 }
 
-TEST(IniJoin, WithoutMemoryTheRemainingRunsStayInPieces) {
+TEST(Join, WithoutMemoryTheRemainingRunsStayInPieces) {
   Document doc = Parse("[s]\na=1\nb=2\nc=3\nd=4\n");
   const char* const names[] = {"A Line1", "A Line2", "B Line1", "B Line2"};
   for (int i = 0; i < 4; ++i) {

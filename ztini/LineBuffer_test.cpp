@@ -35,7 +35,7 @@ struct Script {
   }
 };
 
-TEST(IniLineBuffer, AsksForItsCapacityLessOneAndThenForEachNewHalf) {
+TEST(LineBuffer, AsksForItsCapacityLessOneAndThenForEachNewHalf) {
   Script script{{{std::string(255, 'a'), 0, 0, 0, 0},
                  {std::string(256, 'b'), 0, 0, 0, 0},
                  {"c", 0, 1, 9, 0},
@@ -52,7 +52,7 @@ TEST(IniLineBuffer, AsksForItsCapacityLessOneAndThenForEachNewHalf) {
   EXPECT_EQ(script.asked, (std::vector<int32_t>{255, 256, 512, 1023}));  // never shrinks
 }
 
-TEST(IniLineBuffer, GoesOnWhereAShortAnswerStopped) {
+TEST(LineBuffer, GoesOnWhereAShortAnswerStopped) {
   Script script{{{"ab", 0, 0, 0, 0}, {"cd", 0, 1, 1, 0}}, {}};
   LineBuffer line;
   ASSERT_TRUE(line.open());
@@ -60,7 +60,7 @@ TEST(IniLineBuffer, GoesOnWhereAShortAnswerStopped) {
   EXPECT_STREQ(line.text(), "abcd");
 }
 
-TEST(IniLineBuffer, BothFlagsGiveALastLine) {
+TEST(LineBuffer, BothFlagsGiveALastLine) {
   Script script{{{"last", 1, 1, 4, 0}}, {}};
   LineBuffer line;
   ASSERT_TRUE(line.open());
@@ -69,7 +69,7 @@ TEST(IniLineBuffer, BothFlagsGiveALastLine) {
   EXPECT_TRUE(line.atEnd());
 }
 
-TEST(IniLineBuffer, EndOfFileAloneIsNoLine) {
+TEST(LineBuffer, EndOfFileAloneIsNoLine) {
   Script script{{{"lost", 0, 0, 0, 0}, {"", 1, 0, 0, 0}}, {}};
   LineBuffer line;
   ASSERT_TRUE(line.open());
@@ -78,14 +78,14 @@ TEST(IniLineBuffer, EndOfFileAloneIsNoLine) {
   EXPECT_TRUE(line.atEnd());
 }
 
-TEST(IniLineBuffer, ANegativeStatusIsPassedOn) {
+TEST(LineBuffer, ANegativeStatusIsPassedOn) {
   Script script{{{"x", 0, 1, 0, -5002}}, {}};
   LineBuffer line;
   ASSERT_TRUE(line.open());
   EXPECT_EQ(line.next(Script::give, &script), -5002);
 }
 
-TEST(IniLineBuffer, AFunctionThatDoesNothingTwiceRunningIsStopped) {
+TEST(LineBuffer, AFunctionThatDoesNothingTwiceRunningIsStopped) {
   Script idle{std::vector<Script::Answer>(50, {"", 0, 0, 0, 0}), {}};
   LineBuffer line;
   ASSERT_TRUE(line.open());
@@ -98,7 +98,7 @@ TEST(IniLineBuffer, AFunctionThatDoesNothingTwiceRunningIsStopped) {
   EXPECT_STREQ(other.text(), "ab");
 }
 
-TEST(IniLineBuffer, WithoutMemoryToGrowTheResultIsOutOfMemory) {
+TEST(LineBuffer, WithoutMemoryToGrowTheResultIsOutOfMemory) {
   Script script{{{std::string(255, 'a'), 0, 0, 0, 0}}, {}};
   LineBuffer line;
   ASSERT_TRUE(line.open());

@@ -30,7 +30,7 @@ std::string Calls(const std::string& bytes, int32_t maximum, size_t chunk = 2084
   return shown + "endless";
 }
 
-TEST(IniLineReader, CutsLinesAtEveryTerminator) {
+TEST(LineReader, CutsLinesAtEveryTerminator) {
   const struct {
     const char* what;
     std::string bytes;
@@ -62,7 +62,7 @@ TEST(IniLineReader, CutsLinesAtEveryTerminator) {
   }
 }
 
-TEST(IniLineReader, StopsAtTheMaximumAndLeavesTheTerminator) {
+TEST(LineReader, StopsAtTheMaximumAndLeavesTheTerminator) {
   EXPECT_EQ(Calls("a\nabcd\n", 3), "a/1 abc+d/2 ~");
   // The LF is the first byte of the next call and repeats the last terminator: it ends the line.
   EXPECT_EQ(Calls("a\nabc\nd\n", 3), "a/1 abc+/2 d/3 ~");
@@ -72,7 +72,7 @@ TEST(IniLineReader, StopsAtTheMaximumAndLeavesTheTerminator) {
   EXPECT_EQ(Calls("abc\n", 3), "abc+~");
 }
 
-TEST(IniLineReader, KeepsCountOfBytesAndHalves) {
+TEST(LineReader, KeepsCountOfBytesAndHalves) {
   MemoryLines lines("ab\r\ncd\r\n", 3);
   char buffer[10];
   int32_t endOfFile = 0, endOfLine = 0, line = 0;
@@ -86,7 +86,7 @@ TEST(IniLineReader, KeepsCountOfBytesAndHalves) {
   EXPECT_EQ(lines.state()->lastTerminator, '\r');
 }
 
-TEST(IniLineReader, ANegativeFillStopsTheCallAndPassesNoLineNumber) {
+TEST(LineReader, ANegativeFillStopsTheCallAndPassesNoLineNumber) {
   MemoryLines lines("");
   lines.state()->fill = [](LineFile*) -> int32_t { return -77; };
   char buffer[10] = "###";
@@ -98,7 +98,7 @@ TEST(IniLineReader, ANegativeFillStopsTheCallAndPassesNoLineNumber) {
   EXPECT_EQ(line, -7);
 }
 
-TEST(IniLineReader, AStreamErrorIsAReadFailure) {
+TEST(LineReader, AStreamErrorIsAReadFailure) {
   cookie_io_functions_t broken = {};
   broken.read = [](void*, char*, size_t) -> ssize_t { return -1; };
   FILE* file = fopencookie(nullptr, "r", broken);
@@ -109,7 +109,7 @@ TEST(IniLineReader, AStreamErrorIsAReadFailure) {
   fclose(file);
 }
 
-TEST(IniLineReader, NewWithoutMemoryIsNull) {
+TEST(LineReader, NewWithoutMemoryIsNull) {
   ztini::test::FailFromAllocation fail(1);
   EXPECT_EQ(LineFileNew(nullptr), nullptr);
   LineFileDispose(nullptr);

@@ -32,14 +32,14 @@ std::vector<int32_t> Items(const Owned& list) {
 
 using Ints = std::vector<int32_t>;
 
-TEST(IniList, NewListIsEmptyWithoutCapacity) {
+TEST(List, NewListIsEmptyWithoutCapacity) {
   Owned list(ztini_ListNew(8));
   EXPECT_EQ(ztini_ListNumItems(list.get()), 0);
   EXPECT_EQ(list->capacity, 0u);
   EXPECT_EQ(list->itemSize, 8u);
 }
 
-TEST(IniList, GetKnowsZeroAsLastAndMinusOneAsFirst) {
+TEST(List, GetKnowsZeroAsLastAndMinusOneAsFirst) {
   Owned list = ListOf({10, 20, 30});
   const struct {
     int32_t position, expected;
@@ -51,7 +51,7 @@ TEST(IniList, GetKnowsZeroAsLastAndMinusOneAsFirst) {
   }
 }
 
-TEST(IniList, InsertPlacesBeforeAtTheEndAndAtTheFront) {
+TEST(List, InsertPlacesBeforeAtTheEndAndAtTheFront) {
   const struct {
     int32_t position, result;
     Ints expected;
@@ -68,7 +68,7 @@ TEST(IniList, InsertPlacesBeforeAtTheEndAndAtTheFront) {
   }
 }
 
-TEST(IniList, SeveralItemsAreInsertedAtOnceAndANullSourceGivesZeros) {
+TEST(List, SeveralItemsAreInsertedAtOnceAndANullSourceGivesZeros) {
   Owned list = ListOf({1, 2});
   const int32_t two[] = {8, 9};
   EXPECT_EQ(ztini_ListInsertItems(list.get(), two, 2, 2), 1);
@@ -76,7 +76,7 @@ TEST(IniList, SeveralItemsAreInsertedAtOnceAndANullSourceGivesZeros) {
   EXPECT_EQ(Items(list), (Ints{0, 0, 1, 8, 9, 2}));
 }
 
-TEST(IniList, RemoveTakesTheItemOut) {
+TEST(List, RemoveTakesTheItemOut) {
   const struct {
     int32_t position, out;
     Ints expected;
@@ -94,7 +94,7 @@ TEST(IniList, RemoveTakesTheItemOut) {
   }
 }
 
-TEST(IniList, FindStartsAtTheGivenPosition) {
+TEST(List, FindStartsAtTheGivenPosition) {
   Owned list = ListOf({5, 6, 5, 7});
   const struct {
     int32_t item, start, expected;
@@ -106,7 +106,7 @@ TEST(IniList, FindStartsAtTheGivenPosition) {
   }
 }
 
-TEST(IniList, FindUsesTheCompareFunction) {
+TEST(List, FindUsesTheCompareFunction) {
   Owned list = ListOf({15, 26, 37});
   const int32_t six = 6;
   const auto sameUnits = [](const void* left, const void* right) {
@@ -115,7 +115,7 @@ TEST(IniList, FindUsesTheCompareFunction) {
   EXPECT_EQ(ztini_ListFindItem(list.get(), &six, 1, sameUnits), 2);
 }
 
-TEST(IniList, NullArgumentsAndEmptyListsDoNothing) {
+TEST(List, NullArgumentsAndEmptyListsDoNothing) {
   int32_t item = 3;
   EXPECT_EQ(ztini_ListInsertItem(nullptr, &item, 1), 0);
   EXPECT_EQ(ztini_ListFindItem(nullptr, &item, 1, nullptr), 0);
@@ -134,7 +134,7 @@ TEST(IniList, NullArgumentsAndEmptyListsDoNothing) {
   EXPECT_EQ(ztini_ListNew(0), nullptr);
 }
 
-TEST(IniList, FailedInsertLeavesTheListAsItWas) {
+TEST(List, FailedInsertLeavesTheListAsItWas) {
   Owned list = ListOf({1, 2, 3, 4});
   const int32_t nine = 9;
   {
@@ -145,7 +145,7 @@ TEST(IniList, FailedInsertLeavesTheListAsItWas) {
   EXPECT_EQ(Items(list), (Ints{1, 2, 3, 4}));
 }
 
-TEST(IniList, ReservedRoomMakesInsertIndependentOfMemory) {
+TEST(List, ReservedRoomMakesInsertIndependentOfMemory) {
   Owned list = ListOf({1});
   EXPECT_EQ(ztini_ListReserve(list.get(), 1000), 1);
   FailFromAllocation fail(1);
@@ -154,7 +154,7 @@ TEST(IniList, ReservedRoomMakesInsertIndependentOfMemory) {
   }
 }
 
-TEST(IniList, OneItemOfAPointersSizeNeedsNoBlock) {
+TEST(List, OneItemOfAPointersSizeNeedsNoBlock) {
   Owned list(ztini_ListNew(sizeof(void*))), wide(ztini_ListNew(sizeof(void*) + 1));
   const char* texts[] = {"a", "b", "c"};
   {
@@ -179,13 +179,13 @@ TEST(IniList, OneItemOfAPointersSizeNeedsNoBlock) {
   }
 }
 
-TEST(IniList, ImpossibleSizesAreRefused) {
+TEST(List, ImpossibleSizesAreRefused) {
   Owned list(ztini_ListNew(UINT32_MAX));
   EXPECT_EQ(ztini_ListReserve(list.get(), UINT32_MAX), 0);
   EXPECT_EQ(ztini_ListInsertItems(list.get(), nullptr, 0, UINT32_MAX), 0);
 }
 
-TEST(IniList, MixedUseAgreesWithAVector) {
+TEST(List, MixedUseAgreesWithAVector) {
   Owned list = ListOf({});
   Ints model;
   uint32_t random = 1;

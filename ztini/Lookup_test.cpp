@@ -20,7 +20,7 @@ using ztini::test::Show;
 
 Document Sample() { return Parse("[a]\nx=1\ny=2\n[b]\nz=\"3\"\n"); }
 
-TEST(IniLookup, NamesIgnoreCaseAndSurroundingWhiteSpace) {
+TEST(Lookup, NamesIgnoreCaseAndSurroundingWhiteSpace) {
   Document doc = Sample();
   EXPECT_EQ(IniSectionExists(doc.get(), " A\t"), 1);
   EXPECT_EQ(IniSectionExists(doc.get(), "c"), 0);
@@ -29,14 +29,14 @@ TEST(IniLookup, NamesIgnoreCaseAndSurroundingWhiteSpace) {
   EXPECT_EQ(IniItemExists(doc.get(), "c", "x"), 0);
 }
 
-TEST(IniLookup, WhiteSpaceInsideANameCounts) {
+TEST(Lookup, WhiteSpaceInsideANameCounts) {
   Document doc = Parse("[a b]\nx  y=1\n");
   EXPECT_EQ(IniSectionExists(doc.get(), "ab"), 0);
   EXPECT_EQ(IniItemExists(doc.get(), "a b", "x y"), 0);
   EXPECT_EQ(IniItemExists(doc.get(), "A B", "X  Y"), 1);
 }
 
-TEST(IniLookup, HandlesAndPositions) {
+TEST(Lookup, HandlesAndPositions) {
   Document doc = Sample();
   IniSection* b = IniFindSection(doc.get(), "B");
   EXPECT_STREQ(IniSectionName(b), "b");
@@ -50,7 +50,7 @@ TEST(IniLookup, HandlesAndPositions) {
   EXPECT_EQ(IniFindEntryIndex(a, 1, "Y"), 0);
 }
 
-TEST(IniLookup, LinesAndOrigin) {
+TEST(Lookup, LinesAndOrigin) {
   Document doc = Sample();
   IniPut(doc.get(), "new", "x", "1", 0);
   EXPECT_EQ(IniLineOfSection(doc.get(), "a"), 1);
@@ -62,7 +62,7 @@ TEST(IniLookup, LinesAndOrigin) {
   EXPECT_EQ(IniSectionWasReadFromFile(nullptr), 0);
 }
 
-TEST(IniLookup, GetGivesTheValueAndRemembersTheLine) {
+TEST(Lookup, GetGivesTheValueAndRemembersTheLine) {
   Document doc = Sample();
   const char* value = "before";
   EXPECT_EQ(IniGet(doc.get(), "a", "y", &value), 1);
@@ -75,7 +75,7 @@ TEST(IniLookup, GetGivesTheValueAndRemembersTheLine) {
   EXPECT_EQ(doc->lastItemLine, 5);
 }
 
-TEST(IniLookup, EnumerationIsOneBasedWithZeroAsLastAndMinusOneAsFirst) {
+TEST(Lookup, EnumerationIsOneBasedWithZeroAsLastAndMinusOneAsFirst) {
   Document doc = Sample();
   EXPECT_EQ(IniNumberOfSections(doc.get()), 2);
   EXPECT_EQ(IniNumberOfItems(doc.get(), "A"), 2);
@@ -101,7 +101,7 @@ TEST(IniLookup, EnumerationIsOneBasedWithZeroAsLastAndMinusOneAsFirst) {
   EXPECT_EQ(IniNthItemName(doc.get(), "none", 1, nullptr), 0);
 }
 
-TEST(IniLookup, EqualNamesFindTheFirstUnlessAnotherOneWasAskedForByNumber) {
+TEST(Lookup, EqualNamesFindTheFirstUnlessAnotherOneWasAskedForByNumber) {
   Document doc = Parse("[s]\nx=first\n[s]\nx=second\n[t]\ny=1\n", 2, 0);
   EXPECT_EQ(RawValue(doc, "s", "x"), "first");
   const char* name = nullptr;
@@ -111,7 +111,7 @@ TEST(IniLookup, EqualNamesFindTheFirstUnlessAnotherOneWasAskedForByNumber) {
   EXPECT_EQ(RawValue(doc, "s", "x"), "first");
 }
 
-TEST(IniLookup, ValuePointersOutliveOtherChanges) {
+TEST(Lookup, ValuePointersOutliveOtherChanges) {
   Document doc = Sample();
   const char *value = nullptr, *name = nullptr;
   IniGet(doc.get(), "a", "x", &value);
@@ -123,7 +123,7 @@ TEST(IniLookup, ValuePointersOutliveOtherChanges) {
   EXPECT_STREQ(name, "x");
 }
 
-TEST(IniLookup, RenameTrimsAndKeepsItems) {
+TEST(Lookup, RenameTrimsAndKeepsItems) {
   Document doc = Sample();
   EXPECT_EQ(IniRenameSection(doc.get(), "A", "  Z z "), 1);
   EXPECT_EQ(Show(doc), "[Z z@1] x=1@2 y=2@3 [b@4] z=\"3\"@5");
@@ -132,7 +132,7 @@ TEST(IniLookup, RenameTrimsAndKeepsItems) {
   EXPECT_EQ(IniSectionExists(doc.get(), "a"), 0);
 }
 
-TEST(IniLookup, RenameToAKnownNameMakesTwo) {
+TEST(Lookup, RenameToAKnownNameMakesTwo) {
   Document doc = Sample();
   EXPECT_EQ(IniRenameSection(doc.get(), "b", "A"), 1);
   const char* name = nullptr;
@@ -141,7 +141,7 @@ TEST(IniLookup, RenameToAKnownNameMakesTwo) {
   EXPECT_EQ(IniNumberOfSections(doc.get()), 2);
 }
 
-TEST(IniLookup, RenameWithoutMemoryChangesNothing) {
+TEST(Lookup, RenameWithoutMemoryChangesNothing) {
   Document doc = Sample();
   {
     FailFromAllocation fail(1);
@@ -151,7 +151,7 @@ TEST(IniLookup, RenameWithoutMemoryChangesNothing) {
   EXPECT_EQ(IniSectionExists(doc.get(), "c"), 0);
 }
 
-TEST(IniLookup, RemoveItem) {
+TEST(Lookup, RemoveItem) {
   Document doc = Sample();
   EXPECT_EQ(IniRemoveItem(doc.get(), "a", " X"), 1);
   EXPECT_EQ(IniRemoveItem(doc.get(), "a", "x"), 0);
@@ -159,7 +159,7 @@ TEST(IniLookup, RemoveItem) {
   EXPECT_EQ(Show(doc), "[a@1] y=2@3 [b@4] z=\"3\"@5");
 }
 
-TEST(IniLookup, RemoveSectionClearsTheCacheOfThatSectionOnly) {
+TEST(Lookup, RemoveSectionClearsTheCacheOfThatSectionOnly) {
   Document doc = Sample();
   IniSection* b = IniFindSection(doc.get(), "b");
   EXPECT_EQ(doc->currentSection, b);
@@ -169,7 +169,7 @@ TEST(IniLookup, RemoveSectionClearsTheCacheOfThatSectionOnly) {
   EXPECT_EQ(Show(doc), "[a@1] x=1@2 y=2@3");
 }
 
-TEST(IniLookup, RemovingOneOfEqualNamesUncoversTheNext) {
+TEST(Lookup, RemovingOneOfEqualNamesUncoversTheNext) {
   Document doc = Parse("[s]\nx=1\nx=2\nx=3\n", 2, 0);
   EXPECT_EQ(RawValue(doc, "s", "x"), "1");
   EXPECT_EQ(IniRemoveItem(doc.get(), "s", "x"), 1);
@@ -178,7 +178,7 @@ TEST(IniLookup, RemovingOneOfEqualNamesUncoversTheNext) {
   EXPECT_EQ(RawValue(doc, "s", "x"), "3");
 }
 
-TEST(IniLookup, NullSectionIsTheLiteralNameOnly) {
+TEST(Lookup, NullSectionIsTheLiteralNameOnly) {
   Document doc = NewDocument();
   IniPut(doc.get(), "(null)", "x", "1", 0);
   IniPut(doc.get(), "b", "x", "1", 0);
@@ -189,7 +189,7 @@ TEST(IniLookup, NullSectionIsTheLiteralNameOnly) {
   EXPECT_EQ(IniSectionIsNull(IniFindSection(doc.get(), "(null)")), 0);
 }
 
-TEST(IniLookup, NullArgumentsAreNotFound) {
+TEST(Lookup, NullArgumentsAreNotFound) {
   Document doc = Sample();
   const char* text = "before";
   EXPECT_EQ(IniFindSection(nullptr, "a"), nullptr);
@@ -214,7 +214,7 @@ TEST(IniLookup, NullArgumentsAreNotFound) {
 }
 
 // The same answers from long lists, which are indexed, as from short ones.
-TEST(IniLookup, LongListsAnswerLikeShortOnes) {
+TEST(Lookup, LongListsAnswerLikeShortOnes) {
   std::string text;
   for (int s = 0; s < 300; ++s) {
     text += "[Sec " + std::to_string(s) + "]\n";
@@ -245,7 +245,7 @@ bool SetLatin1(const vlt::test::TempDir& dir) {
   return setlocale(LC_CTYPE, name.c_str()) != nullptr;
 }
 
-TEST(IniLookup, ALocaleChangeBetweenCallsIsFollowed) {
+TEST(Lookup, ALocaleChangeBetweenCallsIsFollowed) {
   vlt::test::TempDir dir;
   Document doc = NewDocument();
   for (int i = 0; i < 100; ++i) {

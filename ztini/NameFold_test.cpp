@@ -13,7 +13,7 @@ namespace {
 
 using ztini::NameFold;
 
-TEST(IniNameFold, TablesAreThoseOfTheCLibrary) {
+TEST(NameFold, TablesAreThoseOfTheCLibrary) {
   NameFold fold;
   for (int c = 0; c < 256; ++c) {
     const char byte = static_cast<char>(c);
@@ -25,7 +25,7 @@ TEST(IniNameFold, TablesAreThoseOfTheCLibrary) {
   EXPECT_FALSE(fold.isSpace('\0'));
 }
 
-TEST(IniNameFold, RefreshInAnUnchangedLocaleKeepsTheGeneration) {
+TEST(NameFold, RefreshInAnUnchangedLocaleKeepsTheGeneration) {
   NameFold fold;
   const uint32_t before = fold.generation();
   fold.refresh();
@@ -33,7 +33,7 @@ TEST(IniNameFold, RefreshInAnUnchangedLocaleKeepsTheGeneration) {
   EXPECT_EQ(fold.generation(), before);
 }
 
-TEST(IniNameFold, AnEqualLocaleUnderAnotherNameKeepsTheGeneration) {
+TEST(NameFold, AnEqualLocaleUnderAnotherNameKeepsTheGeneration) {
   NameFold fold;
   const uint32_t before = fold.generation();
   const char* other = setlocale(LC_CTYPE, "C.UTF-8");
@@ -45,7 +45,7 @@ TEST(IniNameFold, AnEqualLocaleUnderAnotherNameKeepsTheGeneration) {
   EXPECT_EQ(fold.generation(), before);
 }
 
-TEST(IniNameFold, AThreadLocaleIsNoticed) {
+TEST(NameFold, AThreadLocaleIsNoticed) {
   NameFold fold;
   locale_t own = newlocale(LC_CTYPE_MASK, "C", nullptr);
   ASSERT_NE(own, locale_t(0));

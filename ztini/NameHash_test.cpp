@@ -11,7 +11,7 @@ using ztini::HashName;
 using ztini::NameFold;
 using ztini::SameFoldedName;
 
-TEST(IniNameHash, EqualNamesHashEqually) {
+TEST(NameHash, EqualNamesHashEqually) {
   NameFold fold;
   const struct {
     const char *left, *right;
@@ -27,7 +27,7 @@ TEST(IniNameHash, EqualNamesHashEqually) {
   }
 }
 
-TEST(IniNameHash, DifferentNamesAreToldApart) {
+TEST(NameHash, DifferentNamesAreToldApart) {
   NameFold fold;
   EXPECT_FALSE(SameFoldedName(fold, "a", "b"));
   EXPECT_FALSE(SameFoldedName(fold, "a b", "ab"));
@@ -35,7 +35,7 @@ TEST(IniNameHash, DifferentNamesAreToldApart) {
   EXPECT_FALSE(SameFoldedName(fold, "\xc3\xa4", "\xc3\xb6"));
 }
 
-TEST(IniNameHash, ManyNamesSpread) {
+TEST(NameHash, ManyNamesSpread) {
   NameFold fold;
   std::set<uint32_t> low;
   for (int i = 0; i < 10000; ++i) {

@@ -45,7 +45,7 @@ std::vector<NameNode*> Chain(const NameIndex& index, const NameFold& fold, Nodes
 
 using Expected = std::vector<NameNode*>;
 
-TEST(IniNameIndex, FindsNamesThroughGrowth) {
+TEST(NameIndex, FindsNamesThroughGrowth) {
   NameFold fold;
   Nodes nodes;
   NameIndex index;
@@ -63,7 +63,7 @@ TEST(IniNameIndex, FindsNamesThroughGrowth) {
   EXPECT_EQ(index.chain(fold, nodes.order(), "Name1000"), nullptr);
 }
 
-TEST(IniNameIndex, EqualNamesChainInSequenceOrderHoweverTheyCome) {
+TEST(NameIndex, EqualNamesChainInSequenceOrderHoweverTheyCome) {
   NameFold fold;
   Nodes nodes;
   NameNode *a = nodes.add("x"), *b = nodes.add("X"), *c = nodes.add("x"), *d = nodes.add("X");
@@ -84,7 +84,7 @@ TEST(IniNameIndex, EqualNamesChainInSequenceOrderHoweverTheyCome) {
   EXPECT_EQ(Chain(index, fold, nodes.order(), "x"), Expected{});
 }
 
-TEST(IniNameIndex, RemovalKeepsTheOthersReachable) {
+TEST(NameIndex, RemovalKeepsTheOthersReachable) {
   NameFold fold;
   Nodes nodes;
   NameIndex index;
@@ -101,7 +101,7 @@ TEST(IniNameIndex, RemovalKeepsTheOthersReachable) {
   }
 }
 
-TEST(IniNameIndex, WithoutMemoryItReportsAndEmptiesItself) {
+TEST(NameIndex, WithoutMemoryItReportsAndEmptiesItself) {
   NameFold fold;
   Nodes nodes;
   NameIndex index;
@@ -120,7 +120,7 @@ TEST(IniNameIndex, WithoutMemoryItReportsAndEmptiesItself) {
   EXPECT_FALSE(index.built());
 }
 
-TEST(IniNameIndex, EqualNamesWithoutMemoryForTheirChainEmptyTheIndex) {
+TEST(NameIndex, EqualNamesWithoutMemoryForTheirChainEmptyTheIndex) {
   NameFold fold;
   Nodes nodes;
   NameNode *a = nodes.add("x"), *b = nodes.add("X");
@@ -137,7 +137,7 @@ TEST(IniNameIndex, EqualNamesWithoutMemoryForTheirChainEmptyTheIndex) {
   EXPECT_EQ(Chain(index, fold, nodes.order(), "x"), (Expected{a, b}));
 }
 
-TEST(IniNameIndex, ChainsAreReusedWhenTheirNodesGo) {
+TEST(NameIndex, ChainsAreReusedWhenTheirNodesGo) {
   NameFold fold;
   Nodes nodes;
   NameIndex index;
@@ -154,7 +154,7 @@ TEST(IniNameIndex, ChainsAreReusedWhenTheirNodesGo) {
   }
 }
 
-TEST(IniNameIndex, PlacesFollowGapsInTheNumbers) {
+TEST(NameIndex, PlacesFollowGapsInTheNumbers) {
   Nodes nodes;
   for (int i = 0; i < 10; ++i) nodes.add("x");
   for (size_t place : {0, 3, 3, 6}) nodes.erase(place);  // 1 2 3 6 7 8

@@ -16,9 +16,9 @@ using ztini::NameList;
 using ztini::NameMatch;
 using ztini::NameNode;
 
-class IniNameList : public testing::Test {
+class NameListTest : public testing::Test {
  protected:
-  ~IniNameList() override {
+  ~NameListTest() override {
     for (NameNode& node : m_nodes) std::free(node.name);
   }
   NameNode* add(const std::string& name) {
@@ -36,7 +36,7 @@ class IniNameList : public testing::Test {
   std::deque<NameNode> m_nodes;
 };
 
-TEST_F(IniNameList, FindsTheFirstOfEqualNamesWhenShortAndWhenLong) {
+TEST_F(NameListTest, FindsTheFirstOfEqualNamesWhenShortAndWhenLong) {
   NameNode* first = add("x");
   NameNode* second = add("X");
   EXPECT_EQ(find(" x "), first);
@@ -49,7 +49,7 @@ TEST_F(IniNameList, FindsTheFirstOfEqualNamesWhenShortAndWhenLong) {
   EXPECT_EQ(find("x"), third);
 }
 
-TEST_F(IniNameList, ExactMatchIsCaseSensitiveAndLooksAtWhiteSpace) {
+TEST_F(NameListTest, ExactMatchIsCaseSensitiveAndLooksAtWhiteSpace) {
   NameNode* upper = add("ABC");
   NameNode* lower = add("abc");
   for (int rounds = 0; rounds < 2; ++rounds) {
@@ -61,7 +61,7 @@ TEST_F(IniNameList, ExactMatchIsCaseSensitiveAndLooksAtWhiteSpace) {
   }
 }
 
-TEST_F(IniNameList, PositionsFollowRemovals) {
+TEST_F(NameListTest, PositionsFollowRemovals) {
   std::vector<NameNode*> all;
   for (int i = 0; i < 40; ++i) all.push_back(add(std::to_string(i)));
   list.remove(all[0]);
@@ -76,7 +76,7 @@ TEST_F(IniNameList, PositionsFollowRemovals) {
   EXPECT_EQ(list.at(39), nullptr);
 }
 
-TEST_F(IniNameList, RenameMovesTheNodeToItsNewChain) {
+TEST_F(NameListTest, RenameMovesTheNodeToItsNewChain) {
   std::vector<NameNode*> all;
   for (int i = 0; i < 40; ++i) all.push_back(add("n" + std::to_string(i)));
   EXPECT_EQ(find("n5"), all[5]);
@@ -88,12 +88,12 @@ TEST_F(IniNameList, RenameMovesTheNodeToItsNewChain) {
   EXPECT_EQ(find("OTHER"), all[3]);
 }
 
-TEST_F(IniNameList, NullNameIsNotFound) {
+TEST_F(NameListTest, NullNameIsNotFound) {
   add("x");
   EXPECT_EQ(find(nullptr), nullptr);
 }
 
-TEST_F(IniNameList, WithoutMemoryForTheIndexItScans) {
+TEST_F(NameListTest, WithoutMemoryForTheIndexItScans) {
   std::vector<NameNode*> all;
   for (int i = 0; i < 60; ++i) all.push_back(add("n" + std::to_string(i)));
   char* name = ztini_StrDup("n7");
@@ -108,7 +108,7 @@ TEST_F(IniNameList, WithoutMemoryForTheIndexItScans) {
   EXPECT_EQ(find("n7"), all[8]);
 }
 
-TEST_F(IniNameList, AnIndexThatCannotGrowIsReplacedByAScan) {
+TEST_F(NameListTest, AnIndexThatCannotGrowIsReplacedByAScan) {
   std::vector<NameNode> extra(200);
   for (int i = 0; i < 30; ++i) add("n" + std::to_string(i));
   EXPECT_NE(find("n1"), nullptr);  // builds the index
@@ -126,7 +126,7 @@ TEST_F(IniNameList, AnIndexThatCannotGrowIsReplacedByAScan) {
   for (NameNode& node : extra) std::free(node.name);
 }
 
-TEST_F(IniNameList, CompactionForgetsTheIndex) {
+TEST_F(NameListTest, CompactionForgetsTheIndex) {
   std::vector<NameNode*> all;
   for (int i = 0; i < 40; ++i) all.push_back(add("n" + std::to_string(i)));
   EXPECT_EQ(find("n30"), all[30]);
@@ -139,7 +139,7 @@ TEST_F(IniNameList, CompactionForgetsTheIndex) {
   EXPECT_EQ(list.positionOf(all[39]), 2);
 }
 
-TEST_F(IniNameList, SeekReportsTheMissingIndexOfALongListOnly) {
+TEST_F(NameListTest, SeekReportsTheMissingIndexOfALongListOnly) {
   std::vector<NameNode*> all;
   for (int i = 0; i < 15; ++i) all.push_back(add("n" + std::to_string(i)));
   NameNode* found = nullptr;
@@ -161,7 +161,7 @@ TEST_F(IniNameList, SeekReportsTheMissingIndexOfALongListOnly) {
   EXPECT_TRUE(list.seek(nullptr, NameMatch::IgnoreCase, &found));
 }
 
-TEST_F(IniNameList, RecordsAreNumberedAgainWhenTheNumbersRunOut) {
+TEST_F(NameListTest, RecordsAreNumberedAgainWhenTheNumbersRunOut) {
   std::vector<NameNode*> all;
   for (int i = 0; i < 40; ++i) all.push_back(add(i % 10 == 3 ? "same" : "n" + std::to_string(i)));
   all.back()->sequence = ztini::NameIndex::kNoSequence - 2;

@@ -31,7 +31,7 @@ void Check(const Row& row, int32_t duplicateChecking = 1) {
   EXPECT_EQ(doc->firstBadLine, row.firstBadLine) << row.text;
 }
 
-TEST(IniParser, Headers) {
+TEST(Parser, Headers) {
   const Row rows[] = {
       {"[a]", 2, "[a@1]", -1},
       {"[ name ]tail", 2, "[name@1]", -1},
@@ -51,7 +51,7 @@ TEST(IniParser, Headers) {
   for (const Row& row : rows) Check(row);
 }
 
-TEST(IniParser, Items) {
+TEST(Parser, Items) {
   const Row rows[] = {
       {"[s]\nkey=value\n", 2, "[s@1] key=value@2", -1},
       {"[s]\n  my key \t=\t my value \v\n", 2, "[s@1] my key=my value@2", -1},
@@ -79,19 +79,19 @@ TEST(IniParser, Items) {
   for (const Row& row : rows) Check(row);
 }
 
-TEST(IniParser, ALoneQuoteStaysAOneCharacterValue) {
+TEST(Parser, ALoneQuoteStaysAOneCharacterValue) {
   Document doc = Parse("[s]\nkey=\"\n");
   EXPECT_EQ(doc->section(1)->item(1)->quote, 0);
   EXPECT_EQ(RawValue(doc, "s", "key"), "\"");
 }
 
-TEST(IniParser, AQuoteInsideAValueLeavesItWhole) {
+TEST(Parser, AQuoteInsideAValueLeavesItWhole) {
   Document doc = Parse("[s]\nkey = \"a\" b\n");
   EXPECT_EQ(doc->section(1)->item(1)->quote, 0);
   EXPECT_EQ(RawValue(doc, "s", "key"), "\"a\" b");
 }
 
-TEST(IniParser, CommentsBeginALineWithASemicolonAndNothingElseDoes) {
+TEST(Parser, CommentsBeginALineWithASemicolonAndNothingElseDoes) {
   const Row rows[] = {
       {";c\n[s]\n ; x=1\nx=1 ; y\n", 2, "[s@2] x=1 ; y@4", -1},
       {"[s]\n#x=1\n", 2, "[s@1] #x=1@2", -1},
@@ -101,7 +101,7 @@ TEST(IniParser, CommentsBeginALineWithASemicolonAndNothingElseDoes) {
   for (const Row& row : rows) Check(row);
 }
 
-TEST(IniParser, ColonsSeparateUnderTheirOptionOnly) {
+TEST(Parser, ColonsSeparateUnderTheirOptionOnly) {
   const Row rows[] = {
       {"[s]\na:b\n", 10, "[s@1] a=b@2", -1},
       {"[s]\na:=b\n", 10, "[s@1] a=b@2", -1},
@@ -118,7 +118,7 @@ TEST(IniParser, ColonsSeparateUnderTheirOptionOnly) {
   for (const Row& row : rows) Check(row);
 }
 
-TEST(IniParser, ItemsBeforeTheFirstHeader) {
+TEST(Parser, ItemsBeforeTheFirstHeader) {
   const Row rows[] = {
       {"x=1\n[a]\ny=2\n", 2, "[a@2] y=2@3", -1},
       {"x=1\n[a]\ny=2\n", 10, "[(null)@-1] x=1@1 [a@2] y=2@3", -1},
@@ -128,7 +128,7 @@ TEST(IniParser, ItemsBeforeTheFirstHeader) {
   for (const Row& row : rows) Check(row);
 }
 
-TEST(IniParser, RepeatsUpdateTheFirstOne) {
+TEST(Parser, RepeatsUpdateTheFirstOne) {
   const Row rows[] = {
       {"[a]\nx=1\n[b]\n[A]\nx=2\n", 2, "[a@4] x=2@5 [b@3]", -1},
       {"[a]\nx=1\ny=2\n X =\"3\"\n", 2, "[a@1] x=\"3\"@4 y=2@3", -1},
@@ -139,7 +139,7 @@ TEST(IniParser, RepeatsUpdateTheFirstOne) {
   for (const Row& row : rows) Check(row);
 }
 
-TEST(IniParser, RepeatsStaySeparateWithoutDuplicateChecking) {
+TEST(Parser, RepeatsStaySeparateWithoutDuplicateChecking) {
   const Row rows[] = {
       {"[a]\nx=1\nX=2\n[A]\nx=3\n", 2, "[a@1] x=1@2 X=2@3 [A@4] x=3@5", -1},
       {"x=1\n[(null)]\ny=2\n", 10, "[(null)@-1] x=1@1 [(null)@2] y=2@3", -1},
@@ -147,11 +147,11 @@ TEST(IniParser, RepeatsStaySeparateWithoutDuplicateChecking) {
   for (const Row& row : rows) Check(row, 0);
 }
 
-TEST(IniParser, OptionSixteenDoesNothing) {
+TEST(Parser, OptionSixteenDoesNothing) {
   Check({"[s]\na:b\nkey=\nx='1'\n", 16, "[s@1] x='1'@4", 2});
 }
 
-TEST(IniParser, EveryLineEndReadsAlike) {
+TEST(Parser, EveryLineEndReadsAlike) {
   for (const std::string& end : {"\n"s, "\r"s, "\r\n"s, "\n\r"s, "\0"s}) {
     Document doc = Parse("[a]" + end + "x=1" + end + "[b]" + end + "y=2" + end);
     EXPECT_EQ(Show(doc), "[a@1] x=1@2 [b@3] y=2@4");
@@ -160,12 +160,12 @@ TEST(IniParser, EveryLineEndReadsAlike) {
   EXPECT_EQ(Show(mixed), "[a@1] x=1@2 [b@3] y=2@4");
 }
 
-TEST(IniParser, ALastLineWithoutATerminatorIsRead) {
+TEST(Parser, ALastLineWithoutATerminatorIsRead) {
   EXPECT_EQ(Show(Parse("[a]\nx=1")), "[a@1] x=1@2");
   EXPECT_EQ(Show(Parse("[a]")), "[a@1]");
 }
 
-TEST(IniParser, AnUnterminatedLastLineOfExactlyTheCapacityLessOneIsLost) {
+TEST(Parser, AnUnterminatedLastLineOfExactlyTheCapacityLessOneIsLost) {
   const struct {
     size_t length;
     bool lost;
@@ -178,13 +178,13 @@ TEST(IniParser, AnUnterminatedLastLineOfExactlyTheCapacityLessOneIsLost) {
   }
 }
 
-TEST(IniParser, TheLossyLengthFollowsTheCapacityReached) {
+TEST(Parser, TheLossyLengthFollowsTheCapacityReached) {
   const std::string grow = "[a]\ny=" + std::string(298, 'y') + "\n";
   EXPECT_EQ(RawValue(Parse(grow + "x=" + std::string(253, 'v')), "a", "x"), std::string(253, 'v'));
   EXPECT_EQ(RawValue(Parse(grow + "x=" + std::string(509, 'v')), "a", "x"), "<absent>");
 }
 
-TEST(IniParser, AFirstLineOf255CharactersMergesWithTheNext) {
+TEST(Parser, AFirstLineOf255CharactersMergesWithTheNext) {
   const std::string header = "[" + std::string(253, 'n') + "]";
   ASSERT_EQ(header.size(), 255u);
   Document doc = Parse(header + "\nx=1\ny=2\n");
@@ -195,7 +195,7 @@ TEST(IniParser, AFirstLineOf255CharactersMergesWithTheNext) {
   EXPECT_EQ(Show(Parse(header + "\n")), "");  // its end goes as half a pair, then the file ends
 }
 
-TEST(IniParser, LaterLinesOfTheBoundaryLengthsReadCorrectly) {
+TEST(Parser, LaterLinesOfTheBoundaryLengthsReadCorrectly) {
   for (size_t length : {254u, 255u, 256u, 257u, 510u, 511u, 512u, 513u}) {
     for (const std::string& end : {"\n"s, "\r\n"s, "\r"s}) {
       const std::string value(length - 2, 'v');
@@ -206,7 +206,7 @@ TEST(IniParser, LaterLinesOfTheBoundaryLengthsReadCorrectly) {
   }
 }
 
-TEST(IniParser, EachReadEmptiesTheDocumentFirst) {
+TEST(Parser, EachReadEmptiesTheDocumentFirst) {
   Document doc = Parse("bad\n[a]\nx=1\n");
   IniFindSection(doc.get(), "a");
   EXPECT_EQ(doc->firstBadLine, 1);
@@ -218,7 +218,7 @@ TEST(IniParser, EachReadEmptiesTheDocumentFirst) {
   EXPECT_EQ(Show(doc), "");
 }
 
-TEST(IniParser, NullDocumentAndNullFunction) {
+TEST(Parser, NullDocumentAndNullFunction) {
   MemoryLines lines("[a]\n");
   EXPECT_EQ(IniRead(nullptr, IniLineFileInputFunction, lines.state()), 0);
   Document doc = Parse("[a]\nx=1\n");
@@ -226,7 +226,7 @@ TEST(IniParser, NullDocumentAndNullFunction) {
   EXPECT_EQ(IniNumberOfSections(doc.get()), 0);
 }
 
-TEST(IniParser, ANegativeStatusEndsTheReadAtOnceWithoutJoining) {
+TEST(Parser, ANegativeStatusEndsTheReadAtOnceWithoutJoining) {
   const auto input = [](void* context, char* buffer, int32_t, int32_t* endOfFile,
                         int32_t* endOfLine, int32_t* line) -> int32_t {
     static const char* const lines[] = {"[a]", "x Line0001=1", "x Line0002=2"};
@@ -245,7 +245,7 @@ TEST(IniParser, ANegativeStatusEndsTheReadAtOnceWithoutJoining) {
 }
 
 // Each allocation in turn fails: the status says so, the document stays usable, nothing leaks.
-TEST(IniParser, EveryFailedAllocationIsOutOfMemoryWithAUsableDocument) {
+TEST(Parser, EveryFailedAllocationIsOutOfMemoryWithAUsableDocument) {
   std::string text =
       "[a]\nx=1\nx=2\np Line0001=a\np Line0002=b\n[b]\ny=" + std::string(400, 'v') + "\n";
   for (int i = 0; i < 20; ++i) text += "i" + std::to_string(i) + "=1\n";
@@ -279,7 +279,7 @@ std::string ManyNames(int number) {
 }
 
 // An index that could not grow may be built again as long as memory is there: then nothing is lost.
-TEST(IniParser, ASingleFailedAllocationIsReportedOrMadeUpFor) {
+TEST(Parser, ASingleFailedAllocationIsReportedOrMadeUpFor) {
   constexpr int kNames = 300;
   const std::string text = ManyNames(kNames);
   int reported = 0;
@@ -329,7 +329,7 @@ class FailIndexTables {
 };
 
 // Reading on without an index would look at all names for each line.
-TEST(IniParser, WithoutMemoryForAnIndexTheReadingEnds) {
+TEST(Parser, WithoutMemoryForAnIndexTheReadingEnds) {
   const std::string text = ManyNames(20000);
   Document doc = NewDocument();
   {

@@ -15,7 +15,7 @@ using ztini::test::Parse;
 using ztini::test::RawValue;
 using ztini::test::Show;
 
-TEST(IniPut, NewSectionsAndItemsGoToTheEnd) {
+TEST(Put, NewSectionsAndItemsGoToTheEnd) {
   Document doc = Parse("[a]\nx=1\n");
   EXPECT_EQ(IniPut(doc.get(), " b ", " y ", " 2 ", 0), 1);
   EXPECT_STREQ(doc->currentSection->name, "b");
@@ -23,7 +23,7 @@ TEST(IniPut, NewSectionsAndItemsGoToTheEnd) {
   EXPECT_EQ(Show(doc), "[a@1] x=1@2 z=\"3\"@-1 [b@-1] y=2@-1");
 }
 
-TEST(IniPut, KnownItemsKeepNamePlaceAndLine) {
+TEST(Put, KnownItemsKeepNamePlaceAndLine) {
   Document doc = Parse("[a]\nx=\"1\"\ny=2\n");
   EXPECT_EQ(IniPut(doc.get(), "A", "X", "\t9 ", '\''), 1);
   EXPECT_EQ(Show(doc), "[a@1] x='9'@2 y=2@3");
@@ -31,7 +31,7 @@ TEST(IniPut, KnownItemsKeepNamePlaceAndLine) {
   EXPECT_EQ(Show(doc), "[a@1] x=8@2 y=2@3");
 }
 
-TEST(IniPut, WhiteSpaceGoesAndEnclosingQuotesStayText) {
+TEST(Put, WhiteSpaceGoesAndEnclosingQuotesStayText) {
   Document doc = NewDocument();
   IniPut(doc.get(), "a", "x", "  \"v\" \n", '"');
   EXPECT_EQ(RawValue(doc, "a", "x"), "\"v\"");
@@ -40,7 +40,7 @@ TEST(IniPut, WhiteSpaceGoesAndEnclosingQuotesStayText) {
   EXPECT_EQ(RawValue(doc, "a", "x"), "");
 }
 
-TEST(IniPut, BlankNamesAreRefusedAndChangeNothing) {
+TEST(Put, BlankNamesAreRefusedAndChangeNothing) {
   Document doc = Parse("[a]\nx=1\n");
   for (const char* blank : {"", "  \t", static_cast<const char*>(nullptr)}) {
     EXPECT_EQ(IniPut(doc.get(), blank, "x", "2", 0), kIniEmptyName);
@@ -51,7 +51,7 @@ TEST(IniPut, BlankNamesAreRefusedAndChangeNothing) {
   EXPECT_EQ(IniPut(nullptr, "a", "x", "2", 0), 0);
 }
 
-TEST(IniPut, WithoutDuplicateCheckingEveryPutAppends) {
+TEST(Put, WithoutDuplicateCheckingEveryPutAppends) {
   Document doc = Parse("[a]\nx=1\n", 2, 0);
   EXPECT_EQ(IniPut(doc.get(), "a", "x", "2", 0), 1);
   EXPECT_EQ(IniPut(doc.get(), "a", "x", "3", 0), 1);
@@ -59,7 +59,7 @@ TEST(IniPut, WithoutDuplicateCheckingEveryPutAppends) {
   EXPECT_EQ(RawValue(doc, "a", "x"), "1");
 }
 
-TEST(IniPut, TheNewValueMayLieInTheOldOne) {
+TEST(Put, TheNewValueMayLieInTheOldOne) {
   Document doc = NewDocument();
   IniPut(doc.get(), "a", "x", "abcdef", 0);
   const char* value = nullptr;
@@ -68,7 +68,7 @@ TEST(IniPut, TheNewValueMayLieInTheOldOne) {
   EXPECT_EQ(RawValue(doc, "a", "x"), "cdef");
 }
 
-TEST(IniPut, WithoutMemoryNothingChangesAndTheCacheIsCleared) {
+TEST(Put, WithoutMemoryNothingChangesAndTheCacheIsCleared) {
   for (int number = 1; number < 100; ++number) {
     Document doc = Parse("[a]\nx=1\n[b]\n");
     IniFindSection(doc.get(), "b");
@@ -86,7 +86,7 @@ TEST(IniPut, WithoutMemoryNothingChangesAndTheCacheIsCleared) {
   FAIL() << "never succeeded";
 }
 
-TEST(IniPut, ReplacingWithoutMemoryKeepsTheOldValue) {
+TEST(Put, ReplacingWithoutMemoryKeepsTheOldValue) {
   Document doc = Parse("[a]\nx=\"1\"\n");
   FailFromAllocation fail(1);
   EXPECT_EQ(IniPut(doc.get(), "a", "x", "2", 0), kIniOutOfMemory);
@@ -95,7 +95,7 @@ TEST(IniPut, ReplacingWithoutMemoryKeepsTheOldValue) {
   EXPECT_EQ(Show(doc), "[a@1] x=\"1\"@2");
 }
 
-TEST(IniPut, WithoutMemoryForTheIndexOfManyNamesNothingChanges) {
+TEST(Put, WithoutMemoryForTheIndexOfManyNamesNothingChanges) {
   std::string sections, items = "[s]\n";
   for (int i = 0; i < 20; ++i) {
     sections += "[s" + std::to_string(i) + "]\n";
@@ -117,7 +117,7 @@ TEST(IniPut, WithoutMemoryForTheIndexOfManyNamesNothingChanges) {
   }
 }
 
-TEST(IniPut, StringsQuoteAndEscapeAsAsked) {
+TEST(Put, StringsQuoteAndEscapeAsAsked) {
   const struct {
     const char* value;
     int32_t quote, escape;
@@ -135,7 +135,7 @@ TEST(IniPut, StringsQuoteAndEscapeAsAsked) {
   }
 }
 
-TEST(IniPut, EscapedBytesComeBackBlanksAtTheEndsExcepted) {
+TEST(Put, EscapedBytesComeBackBlanksAtTheEndsExcepted) {
   Document doc = NewDocument();
   IniPutStringWithOptions(doc.get(), "s", "x", "\t \"C:\\dir\"\r\n\x01\xff", 1, 1);
   EXPECT_EQ(RawValue(doc, "s", "x"), "\\t \\\"C:\\\\dir\\\"\\x0d\\n\\x01\xff");
@@ -147,14 +147,14 @@ TEST(IniPut, EscapedBytesComeBackBlanksAtTheEndsExcepted) {
   EXPECT_STREQ(value, "blanks");
 }
 
-TEST(IniPut, RawStringsAreQuotedAndNotEscaped) {
+TEST(Put, RawStringsAreQuotedAndNotEscaped) {
   Document doc = NewDocument();
   EXPECT_EQ(IniPutRawString(doc.get(), "s", "x", "a\\n\"b"), 1);
   EXPECT_EQ(RawValue(doc, "s", "x"), "a\\n\"b");
   EXPECT_EQ(doc->section(1)->item(1)->quote, '"');
 }
 
-TEST(IniPut, Doubles) {
+TEST(Put, Doubles) {
   const struct {
     double value;
     const char* expected;

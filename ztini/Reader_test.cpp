@@ -28,7 +28,7 @@ void SetTime(const std::string& path, int64_t seconds) {
   ASSERT_EQ(utimensat(AT_FDCWD, path.c_str(), times, 0), 0);
 }
 
-TEST(IniReader, ByteOrderMarks) {
+TEST(Reader, ByteOrderMarks) {
   const struct {
     std::string bytes;
     int32_t status;
@@ -67,7 +67,7 @@ TEST(IniReader, ByteOrderMarks) {
   }
 }
 
-TEST(IniReader, AOneByteFileIsParsedFromItsStart) {
+TEST(Reader, AOneByteFileIsParsedFromItsStart) {
   TempDir dir;
   WriteBytes(dir / "a.ini", "x");
   Document doc = NewDocument();
@@ -75,7 +75,7 @@ TEST(IniReader, AOneByteFileIsParsedFromItsStart) {
   EXPECT_EQ(doc->firstBadLine, 1);  // the byte was seen as a line
 }
 
-TEST(IniReader, SuccessRemembersPathAndTime) {
+TEST(Reader, SuccessRemembersPathAndTime) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   WriteBytes(path, "[a]\n");
@@ -94,7 +94,7 @@ TEST(IniReader, SuccessRemembersPathAndTime) {
   EXPECT_EQ(IniIsFileNewer(doc.get()), kIniBadPath);
 }
 
-TEST(IniReader, AFailedReadKeepsThePathAndTheOldSections) {
+TEST(Reader, AFailedReadKeepsThePathAndTheOldSections) {
   TempDir dir;
   const std::string good = dir / "good.ini", bad = dir / "bad.ini";
   WriteBytes(good, "[a]\nx=1\n");
@@ -110,13 +110,13 @@ TEST(IniReader, AFailedReadKeepsThePathAndTheOldSections) {
   EXPECT_EQ(IniReadFromFile(nullptr, good.c_str()), 0);
 }
 
-TEST(IniReader, ADirectoryOpensAndFailsToRead) {
+TEST(Reader, ADirectoryOpensAndFailsToRead) {
   TempDir dir;
   Document doc = NewDocument();
   EXPECT_EQ(IniReadFromFile(doc.get(), dir.path().c_str()), kIniReadFailed);
 }
 
-TEST(IniReader, ANamedPipeIsRefusedWithoutWaiting) {
+TEST(Reader, ANamedPipeIsRefusedWithoutWaiting) {
   TempDir dir;
   const std::string path = dir / "pipe";
   ASSERT_EQ(mkfifo(path.c_str(), 0666), 0);
@@ -125,7 +125,7 @@ TEST(IniReader, ANamedPipeIsRefusedWithoutWaiting) {
   EXPECT_EQ(IniReadFromFile(doc.get(), "/dev/zero"), kIniCannotOpen);
 }
 
-TEST(IniReader, AnUnseekableStreamGivesItsNegativeResult) {
+TEST(Reader, AnUnseekableStreamGivesItsNegativeResult) {
   int fds[2];
   ASSERT_EQ(pipe(fds), 0);
   FILE* file = fdopen(fds[0], "rb");
@@ -136,7 +136,7 @@ TEST(IniReader, AnUnseekableStreamGivesItsNegativeResult) {
   close(fds[1]);
 }
 
-TEST(IniReader, HelperReadsFromTheStartOfTheStream) {
+TEST(Reader, HelperReadsFromTheStartOfTheStream) {
   TempDir dir;
   WriteBytes(dir / "a.ini", "[a]\nx=1\n");
   FILE* file = fopen((dir / "a.ini").c_str(), "rb");
@@ -148,7 +148,7 @@ TEST(IniReader, HelperReadsFromTheStartOfTheStream) {
   fclose(file);
 }
 
-TEST(IniReader, AReadErrorLeavesWhatWasReadBefore) {
+TEST(Reader, AReadErrorLeavesWhatWasReadBefore) {
   struct Source {
     size_t at = 0;
     std::string text;
@@ -175,7 +175,7 @@ TEST(IniReader, AReadErrorLeavesWhatWasReadBefore) {
   fclose(file);
 }
 
-TEST(IniReader, EveryFailedAllocationIsOutOfMemory) {
+TEST(Reader, EveryFailedAllocationIsOutOfMemory) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   WriteBytes(path, "[a]\nx=1\nx=2\ny=3\n[b]\nx=1\nx=2\ny=3\n");
@@ -196,7 +196,7 @@ TEST(IniReader, EveryFailedAllocationIsOutOfMemory) {
   FAIL() << "never succeeded";
 }
 
-TEST(IniReader, Timestamps) {
+TEST(Reader, Timestamps) {
   TempDir dir;
   const std::string path = dir / "a.ini";
   WriteBytes(path, "");
@@ -212,7 +212,7 @@ TEST(IniReader, Timestamps) {
   EXPECT_EQ(IniIsFileNewer(nullptr), kIniEmptyPath);
 }
 
-TEST(IniReader, PathsOfAnyLengthAreKept) {
+TEST(Reader, PathsOfAnyLengthAreKept) {
   TempDir dir;
   std::string deep;
   for (int i = 0; i < 8; ++i) deep += std::string(i ? "/" : "") + std::string(60, 'd');

@@ -10,14 +10,14 @@ namespace {
 
 using ztini::OwnedText;
 
-TEST(IniText, DupCopiesAndPassesNull) {
+TEST(StringTools, DupCopiesAndPassesNull) {
   OwnedText copy(ztini_StrDup(" a b "));
   EXPECT_STREQ(copy.get(), " a b ");
   EXPECT_EQ(ztini_StrDup(nullptr), nullptr);
   EXPECT_EQ(ztini_StrDupWithoutSurrWhiteSpace(nullptr), nullptr);
 }
 
-TEST(IniText, DupWithoutSurroundingWhiteSpace) {
+TEST(StringTools, DupWithoutSurroundingWhiteSpace) {
   const struct {
     const char *text, *expected;
   } rows[] = {
@@ -29,13 +29,13 @@ TEST(IniText, DupWithoutSurroundingWhiteSpace) {
   }
 }
 
-TEST(IniText, DupsReturnNullWithoutMemory) {
+TEST(StringTools, DupsReturnNullWithoutMemory) {
   ztini::test::FailFromAllocation fail(1);
   EXPECT_EQ(ztini_StrDup("a"), nullptr);
   EXPECT_EQ(ztini_StrDupWithoutSurrWhiteSpace("a"), nullptr);
 }
 
-TEST(IniText, SkipAndHasNonWhiteSpace) {
+TEST(StringTools, SkipAndHasNonWhiteSpace) {
   EXPECT_STREQ(ztini_SkipWhiteSpace(" \t x "), "x ");
   EXPECT_STREQ(ztini_SkipWhiteSpace("  "), "");
   EXPECT_EQ(ztini_SkipWhiteSpace(nullptr), nullptr);
@@ -46,7 +46,7 @@ TEST(IniText, SkipAndHasNonWhiteSpace) {
   EXPECT_EQ(ztini_HasNonWhiteSpace("\xff"), 1);
 }
 
-TEST(IniText, CompareIgnoresCaseAndSurroundingWhiteSpace) {
+TEST(StringTools, CompareIgnoresCaseAndSurroundingWhiteSpace) {
   const struct {
     const char *left, *right;
     int32_t expected;
@@ -63,7 +63,7 @@ TEST(IniText, CompareIgnoresCaseAndSurroundingWhiteSpace) {
   }
 }
 
-TEST(IniText, CopyMaxNeverPassesItsSize) {
+TEST(StringTools, CopyMaxNeverPassesItsSize) {
   const struct {
     const char* source;
     size_t size;
@@ -81,7 +81,7 @@ TEST(IniText, CopyMaxNeverPassesItsSize) {
   EXPECT_EQ(untouched, '#');
 }
 
-TEST(IniText, UnsignedIntegers) {
+TEST(StringTools, UnsignedIntegers) {
   const struct {
     const char* text;
     int32_t result;

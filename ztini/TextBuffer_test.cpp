@@ -10,7 +10,7 @@ namespace {
 
 using ztini::TextBuffer;
 
-TEST(IniTextBuffer, AppendsTextCharactersAndNumbers) {
+TEST(TextBuffer, AppendsTextCharactersAndNumbers) {
   TextBuffer buffer;
   EXPECT_STREQ(buffer.text(), "");
   buffer.append("ab").append('c').append("").appendNumber(7).append(' ').appendNumber(12345);
@@ -21,7 +21,7 @@ TEST(IniTextBuffer, AppendsTextCharactersAndNumbers) {
   EXPECT_TRUE(buffer.ok());
 }
 
-TEST(IniTextBuffer, GrowsAsFarAsNeeded) {
+TEST(TextBuffer, GrowsAsFarAsNeeded) {
   TextBuffer buffer;
   std::string expected;
   for (int i = 0; i < 5000; ++i) {
@@ -31,7 +31,7 @@ TEST(IniTextBuffer, GrowsAsFarAsNeeded) {
   EXPECT_EQ(buffer.text(), expected);
 }
 
-TEST(IniTextBuffer, RemembersThatMemoryRanOut) {
+TEST(TextBuffer, RemembersThatMemoryRanOut) {
   TextBuffer buffer;
   {
     ztini::test::FailFromAllocation fail(1);

@@ -22,7 +22,7 @@ Document WithValue(const std::string& value) {
   return doc;
 }
 
-TEST(IniValues, RawPointer) {
+TEST(Values, RawPointer) {
   Document doc = WithValue(" a\\n ");
   const char* value = nullptr;
   EXPECT_EQ(IniGetPointerToRawString(doc.get(), "s", "x", &value), 1);
@@ -31,7 +31,7 @@ TEST(IniValues, RawPointer) {
   EXPECT_EQ(value, nullptr);
 }
 
-TEST(IniValues, RawBufferIsCutAndEmptiedFirst) {
+TEST(Values, RawBufferIsCutAndEmptiedFirst) {
   Document doc = WithValue("abcdef");
   const struct {
     uint32_t size;
@@ -48,7 +48,7 @@ TEST(IniValues, RawBufferIsCutAndEmptiedFirst) {
   EXPECT_STREQ(buffer, "");
 }
 
-TEST(IniValues, BuffersOfSizeZeroAreNotTouched) {
+TEST(Values, BuffersOfSizeZeroAreNotTouched) {
   Document doc = WithValue("abc");
   char byte = '#';
   EXPECT_EQ(IniGetRawStringIntoBuffer(doc.get(), "s", "x", &byte, 0), 1);
@@ -57,7 +57,7 @@ TEST(IniValues, BuffersOfSizeZeroAreNotTouched) {
   EXPECT_EQ(IniGetStringIntoBuffer(doc.get(), "s", "x", nullptr, 10), 1);
 }
 
-TEST(IniValues, RawCopyIsTheCallers) {
+TEST(Values, RawCopyIsTheCallers) {
   Document doc = WithValue("a\\t");
   char* copy = nullptr;
   EXPECT_EQ(IniGetRawStringCopy(doc.get(), "s", "x", &copy), 1);
@@ -70,7 +70,7 @@ TEST(IniValues, RawCopyIsTheCallers) {
   EXPECT_EQ(copy, nullptr);
 }
 
-TEST(IniValues, DecodedPointerHoldsUntilTheNextDecoding) {
+TEST(Values, DecodedPointerHoldsUntilTheNextDecoding) {
   Document doc = Parse("[s]\nx=a\\tb\ny=c\\nd\n");
   const char *x = nullptr, *y = nullptr;
   EXPECT_EQ(IniGetPointerToString(doc.get(), "s", "x", &x), 1);
@@ -82,14 +82,14 @@ TEST(IniValues, DecodedPointerHoldsUntilTheNextDecoding) {
   EXPECT_EQ(y, nullptr);
 }
 
-TEST(IniValues, ADecodedNulEndsTheText) {
+TEST(Values, ADecodedNulEndsTheText) {
   Document doc = WithValue("a\\x00b");
   const char* value = nullptr;
   EXPECT_EQ(IniGetPointerToString(doc.get(), "s", "x", &value), 1);
   EXPECT_STREQ(value, "a");
 }
 
-TEST(IniValues, DecodedBufferAndCopy) {
+TEST(Values, DecodedBufferAndCopy) {
   Document doc = WithValue("a\\\"b\\\\c");
   char buffer[4];
   EXPECT_EQ(IniGetStringIntoBuffer(doc.get(), "s", "x", buffer, sizeof buffer), 1);
@@ -102,7 +102,7 @@ TEST(IniValues, DecodedBufferAndCopy) {
   EXPECT_EQ(copy, nullptr);
 }
 
-TEST(IniValues, TheScratchBlockGrowsAndShrinksBack) {
+TEST(Values, TheScratchBlockGrowsAndShrinksBack) {
   Document doc = NewDocument();
   const auto decode = [&](size_t length) {
     IniPut(doc.get(), "s", "x", std::string(length, 'v').c_str(), 0);
@@ -121,7 +121,7 @@ TEST(IniValues, TheScratchBlockGrowsAndShrinksBack) {
   EXPECT_EQ(decode(0), 256u);
 }
 
-TEST(IniValues, DecodingWithoutMemoryKeepsTheScratchBlock) {
+TEST(Values, DecodingWithoutMemoryKeepsTheScratchBlock) {
   Document doc = WithValue(std::string(1000, 'v'));
   const char* value = "before";
   {
@@ -139,7 +139,7 @@ TEST(IniValues, DecodingWithoutMemoryKeepsTheScratchBlock) {
   EXPECT_EQ(IniGetPointerToString(doc.get(), "s", "x", &value), 1);
 }
 
-TEST(IniValues, Booleans) {
+TEST(Values, Booleans) {
   const struct {
     const char* value;
     int32_t result, expected;
@@ -154,7 +154,7 @@ TEST(IniValues, Booleans) {
   }
 }
 
-TEST(IniValues, UnsignedIntegers) {
+TEST(Values, UnsignedIntegers) {
   const struct {
     const char* value;
     int32_t result;
@@ -176,7 +176,7 @@ TEST(IniValues, UnsignedIntegers) {
   }
 }
 
-TEST(IniValues, Doubles) {
+TEST(Values, Doubles) {
   const struct {
     const char* value;
     int32_t result;
@@ -212,7 +212,7 @@ TEST(IniValues, Doubles) {
   EXPECT_TRUE(std::isnan(value));
 }
 
-TEST(IniValues, AbsentItemsLeaveNumbersAlone) {
+TEST(Values, AbsentItemsLeaveNumbersAlone) {
   Document doc = WithValue("1");
   int32_t boolean = 77;
   uint32_t number = 77;

@@ -39,21 +39,21 @@ Lines ItemLines(const Document& doc) {
   return Lines(lines.begin() + 1, lines.end() - 1);
 }
 
-TEST(IniWriter, DefaultsPutABlankLineAfterEverySection) {
+TEST(Writer, DefaultsPutABlankLineAfterEverySection) {
   Document doc = NewDocument();
   IniPut(doc.get(), "a", "x", "1", 0);
   IniPut(doc.get(), "b", "y", "2", '"');
   EXPECT_EQ(WrittenText(doc), "[a]\nx = 1\n\n[b]\ny = \"2\"\n\n");
 }
 
-TEST(IniWriter, SeparatorFollowsItsOption) {
+TEST(Writer, SeparatorFollowsItsOption) {
   Document doc = NewDocument();
   IniPut(doc.get(), "a", "x", "1", 0);
   IniSetWriteOptions(doc.get(), 80, 0, 0);
   EXPECT_EQ(WrittenText(doc), "[a]\nx=1\n\n");
 }
 
-TEST(IniWriter, EmptyDocumentAndEmptySections) {
+TEST(Writer, EmptyDocumentAndEmptySections) {
   Document doc = NewDocument();
   int32_t status = 7;
   EXPECT_EQ(WrittenLines(doc, &status), Lines{});
@@ -61,13 +61,13 @@ TEST(IniWriter, EmptyDocumentAndEmptySections) {
   EXPECT_EQ(WrittenText(Parse("[a]\n[b]\n")), "[a]\n\n[b]\n\n");
 }
 
-TEST(IniWriter, NullArgumentsWriteNothing) {
+TEST(Writer, NullArgumentsWriteNothing) {
   EXPECT_EQ(IniWrite(nullptr, IniFileOutputFunc, nullptr), 0);
   EXPECT_EQ(IniWrite(NewDocument().get(), nullptr, nullptr), 0);
   EXPECT_EQ(ztini_IniWriteToFileHelper(nullptr, nullptr), 0);
 }
 
-TEST(IniWriter, TightOptionSetsOnlyNewSectionsApart) {
+TEST(Writer, TightOptionSetsOnlyNewSectionsApart) {
   Document doc = Parse("[a]\nx=1\n\n\n[b]\ny=2\n");
   IniSetWriteOptions(doc.get(), -1, 32, 26);
   EXPECT_EQ(WrittenText(doc), "[a]\nx = 1\n[b]\ny = 2\n");
@@ -80,7 +80,7 @@ TEST(IniWriter, TightOptionSetsOnlyNewSectionsApart) {
   EXPECT_EQ(WrittenText(doc), "[a]\nx = 1\n[b]\ny = 2\n[new]\nz = 3\n[newer]\nz = 4\n");
 }
 
-TEST(IniWriter, TightOptionInAWhollyNewDocument) {
+TEST(Writer, TightOptionInAWhollyNewDocument) {
   Document doc = NewDocument();
   IniPut(doc.get(), "a", "x", "1", 0);
   IniPut(doc.get(), "b", "x", "1", 0);
@@ -88,7 +88,7 @@ TEST(IniWriter, TightOptionInAWhollyNewDocument) {
   EXPECT_EQ(WrittenText(doc), "[a]\nx = 1\n\n[b]\nx = 1\n\n");
 }
 
-TEST(IniWriter, TheNullSectionHasNoHeader) {
+TEST(Writer, TheNullSectionHasNoHeader) {
   Document doc = Parse("x=1\n[a]\ny=2\n", 10);
   EXPECT_EQ(WrittenText(doc), "x = 1\n\n[a]\ny = 2\n\n");
   IniSetWriteOptions(doc.get(), -1, 0, 24);
@@ -102,7 +102,7 @@ TEST(IniWriter, TheNullSectionHasNoHeader) {
   EXPECT_EQ(WrittenText(put), "[a]\ny = 2\n\nx = 1\n");
 }
 
-TEST(IniWriter, EmptyValues) {
+TEST(Writer, EmptyValues) {
   Document doc = NewDocument();
   IniPut(doc.get(), "s", "key", "", 0);
   IniPut(doc.get(), "s", "quoted", "", '"');
@@ -112,7 +112,7 @@ TEST(IniWriter, EmptyValues) {
   EXPECT_EQ(RawValue(back, "s", "quoted"), "");
 }
 
-TEST(IniWriter, OneLineUpToTheLimit) {
+TEST(Writer, OneLineUpToTheLimit) {
   // Name 4, separator 3, quotes 2.
   EXPECT_EQ(ItemLines(WithItem("Name", std::string(71, 'v'), '"', 80)).size(), 1u);
   EXPECT_EQ(ItemLines(WithItem("Name", std::string(72, 'v'), '"', 80)).size(), 2u);
@@ -123,7 +123,7 @@ TEST(IniWriter, OneLineUpToTheLimit) {
   EXPECT_EQ(ItemLines(WithItem("Name", std::string(70000, 'v'), '"', -1)).size(), 1u);
 }
 
-TEST(IniWriter, QuotedPiecesHoldRoomBytesAndReadBack) {
+TEST(Writer, QuotedPiecesHoldRoomBytesAndReadBack) {
   std::string value;
   for (int i = 0; value.size() < 200; ++i) value += " part " + std::to_string(i);
   Document doc = WithItem("Name", value, '"', 80);
@@ -137,7 +137,7 @@ TEST(IniWriter, QuotedPiecesHoldRoomBytesAndReadBack) {
   EXPECT_EQ(RawValue(Parse(WrittenText(doc)), "s", "Name"), value);
 }
 
-TEST(IniWriter, UnquotedPiecesSubtractTheSameTwelve) {
+TEST(Writer, UnquotedPiecesSubtractTheSameTwelve) {
   const std::string value(30, 'v');
   EXPECT_EQ(ItemLines(WithItem("Name", value, 0, 30)),
             (Lines{"Name Line0001 = " + std::string(14, 'v'),
@@ -147,7 +147,7 @@ TEST(IniWriter, UnquotedPiecesSubtractTheSameTwelve) {
                    "Name Line0003=vv"}));
 }
 
-TEST(IniWriter, PiecesEndAfterTheLastBreakCharacter) {
+TEST(Writer, PiecesEndAfterTheLastBreakCharacter) {
   const struct {
     const char* value;
     Lines pieces;
@@ -173,12 +173,12 @@ TEST(IniWriter, PiecesEndAfterTheLastBreakCharacter) {
   }
 }
 
-TEST(IniWriter, UnquotedPiecesLoseWhiteSpaceAtTheBreak) {
+TEST(Writer, UnquotedPiecesLoseWhiteSpaceAtTheBreak) {
   Document doc = WithItem("N", "aa bb cc dd ee ff", 0, 20, ' ');
   EXPECT_EQ(RawValue(Parse(WrittenText(doc)), "s", "N"), "aa bbcc ddee ff");
 }
 
-TEST(IniWriter, NoRoomBesideTheNameIsAnError) {
+TEST(Writer, NoRoomBesideTheNameIsAnError) {
   int32_t status = 0;
   const Lines lines =
       WrittenLines(WithItem(std::string(68, 'n').c_str(), "vvvvvvvvvv", 0, 80), &status);
@@ -194,7 +194,7 @@ TEST(IniWriter, NoRoomBesideTheNameIsAnError) {
   }
 }
 
-TEST(IniWriter, PieceNumbersGrowBeyondFourDigits) {
+TEST(Writer, PieceNumbersGrowBeyondFourDigits) {
   const Lines lines = ItemLines(WithItem("N", std::string(10001, 'v'), 0, 14));
   ASSERT_EQ(lines.size(), 10001u);
   EXPECT_EQ(lines[9998], "N Line9999 = v");
@@ -202,7 +202,7 @@ TEST(IniWriter, PieceNumbersGrowBeyondFourDigits) {
   EXPECT_EQ(lines[10000], "N Line10001 = v");
 }
 
-TEST(IniWriter, AnOutputFailureStopsTheWriting) {
+TEST(Writer, AnOutputFailureStopsTheWriting) {
   const auto output = [](void* left, const char*) -> int32_t {
     return --*static_cast<int*>(left) < 0 ? -99 : 0;
   };
@@ -216,7 +216,7 @@ TEST(IniWriter, AnOutputFailureStopsTheWriting) {
   EXPECT_EQ(IniWrite(doc.get(), output, &left), 0);
 }
 
-TEST(IniWriter, WithoutMemoryForALineTheResultIsOutOfMemory) {
+TEST(Writer, WithoutMemoryForALineTheResultIsOutOfMemory) {
   Document doc = Parse("[a]\nx=1\n");
   FailFromAllocation fail(1);
   int32_t status = 0;
@@ -224,7 +224,7 @@ TEST(IniWriter, WithoutMemoryForALineTheResultIsOutOfMemory) {
   EXPECT_EQ(status, kIniOutOfMemory);
 }
 
-TEST(IniWriter, FileOutputKeepsLineFeedsAndAddsOne) {
+TEST(Writer, FileOutputKeepsLineFeedsAndAddsOne) {
   vlt::test::TempDir dir;
   const std::string path = dir / "out";
   FILE* file = fopen(path.c_str(), "wb");
@@ -235,7 +235,7 @@ TEST(IniWriter, FileOutputKeepsLineFeedsAndAddsOne) {
   EXPECT_EQ(vlt::test::ReadBytes(path), "a\nb\n\nc\n\nd");
 }
 
-TEST(IniWriter, HelperWritesTheMarkOnlyUnderItsOption) {
+TEST(Writer, HelperWritesTheMarkOnlyUnderItsOption) {
   vlt::test::TempDir dir;
   const std::string path = dir / "out";
   Document doc = Parse("[a]\nx=1\n");
@@ -248,7 +248,7 @@ TEST(IniWriter, HelperWritesTheMarkOnlyUnderItsOption) {
   }
 }
 
-TEST(IniWriter, AFullDeviceIsAWriteFailure) {
+TEST(Writer, AFullDeviceIsAWriteFailure) {
   FILE* full = fopen("/dev/full", "wb");
   ASSERT_NE(full, nullptr);
   Document doc = Parse("[a]\nx=1\n");
@@ -260,7 +260,7 @@ TEST(IniWriter, AFullDeviceIsAWriteFailure) {
   fclose(full);
 }
 
-TEST(IniWriter, WritingLeavesTheDocumentAlone) {
+TEST(Writer, WritingLeavesTheDocumentAlone) {
   Document doc = Parse("[a]\nx=1\n");
   IniPut(doc.get(), "new", "y", "2", 34);
   const std::string before = ztini::test::Show(doc);

@@ -30,13 +30,13 @@ std::wstring ListText(const Answers& answers, HRESULT expected) {
   return text.c_str();
 }
 
-TEST(AttributeList, TypesThatAreNoneGiveAnEmptyOne) {
+TEST(vltAttributeLists, TypesThatAreNoneGiveAnEmptyOne) {
   for (int type : {0, 1, 2, 3, 4, 5, 6, 7, 14, 15, -1}) {
     EXPECT_EQ(ListText(Filled(type), E_FAIL), L"{}") << type;
   }
 }
 
-TEST(AttributeList, AsksForTheSizeAndThenForTheElements) {
+TEST(vltAttributeLists, AsksForTheSizeAndThenForTheElements) {
   for (int type = 8; type <= 13; ++type) {
     String text;
     std::vector<uint32_t> capacities;
@@ -51,7 +51,7 @@ TEST(AttributeList, AsksForTheSizeAndThenForTheElements) {
   }
 }
 
-TEST(AttributeList, FewerElementsThanAnnounced) {
+TEST(vltAttributeLists, FewerElementsThanAnnounced) {
   for (int type = 8; type <= 13; ++type) {
     Answers answers = Filled(type);
     answers.announced = 5;
@@ -63,7 +63,7 @@ TEST(AttributeList, FewerElementsThanAnnounced) {
   }
 }
 
-TEST(AttributeList, MoreElementsThanThereIsRoomFor) {
+TEST(vltAttributeLists, MoreElementsThanThereIsRoomFor) {
   for (int type = 8; type <= 13; ++type) {
     Answers answers = Filled(type);
     answers.given = 0xFFFFFFFF;
@@ -71,7 +71,7 @@ TEST(AttributeList, MoreElementsThanThereIsRoomFor) {
   }
 }
 
-TEST(AttributeList, ElementsThatDoNotComeAreZeros) {
+TEST(vltAttributeLists, ElementsThatDoNotComeAreZeros) {
   const std::pair<int, const wchar_t*> rows[] = {
       {8, L"{0,0}"}, {9, L"{0,0}"}, {10, L"{0,0}"}, {11, L"{,}"}, {12, L"{NULL,NULL}"}};
   for (const auto& [type, text] : rows) {
@@ -82,13 +82,13 @@ TEST(AttributeList, ElementsThatDoNotComeAreZeros) {
   }
 }
 
-TEST(AttributeList, ManyElementsTakeTimeInProportion) {
+TEST(vltAttributeLists, ManyElementsTakeTimeInProportion) {
   Answers answers = Type(vltU32ArrayType);
   answers.u32.assign(200000, 7);
   EXPECT_EQ(ListText(answers, S_OK).size(), 400001u);
 }
 
-TEST_IN_CHILD(AttributeList, ACountThatIsNotTrueIsOutOfMemory) {
+TEST_IN_CHILD(vltAttributeLists, ACountThatIsNotTrueIsOutOfMemory) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer holds the address space";
   LimitMemoryTo(64 << 20);
   for (int type = 8; type <= 13; ++type) {
@@ -99,7 +99,7 @@ TEST_IN_CHILD(AttributeList, ACountThatIsNotTrueIsOutOfMemory) {
   }
 }
 
-TEST(AttributeList, HookPointsActAsAFailedAllocation) {
+TEST(vltAttributeLists, HookPointsActAsAFailedAllocation) {
   const std::pair<int, const char*> points[] = {{8, "TestHookNT\"./source/Common/vltcmn\"96"},
                                                 {9, "TestHookNT\"./source/Common/vltcmn\"111"},
                                                 {10, "TestHookNT\"./source/Common/vltcmn\"126"},
@@ -123,7 +123,7 @@ TEST(AttributeList, HookPointsActAsAFailedAllocation) {
   }
 }
 
-TEST(AttributeList, AnExceptionGivesEverythingBack) {
+TEST(vltAttributeLists, AnExceptionGivesEverythingBack) {
   ExpectInArmedChild(hook::kStringFromClsid, kThrownBadAlloc, [] {
     for (int type : {5, 6, 12, 13}) {
       g_references = 0;
@@ -137,7 +137,7 @@ TEST(AttributeList, AnExceptionGivesEverythingBack) {
   });
 }
 
-TEST(AttributeList, ATextThatMemoryDoesNotSufficeForIsNullAndInAListEmpty) {
+TEST(vltAttributeLists, ATextThatMemoryDoesNotSufficeForIsNullAndInAListEmpty) {
   ExpectInArmedChild(hook::kDuplicateString2, kFailedAllocation, [] {
     for (int type : {12, 13}) EXPECT_EQ(ListText(Filled(type), S_OK), L"{,}");
     for (int type : {5, 6}) EXPECT_EQ(TextOf(Filled(type), S_OK), L"(null)");

@@ -93,7 +93,7 @@ const std::vector<Case>& Lists() {
   return cases;
 }
 
-TEST(AttributeValue, TextsOfEveryType) {
+TEST(vltAttributeValues, TextsOfEveryType) {
   for (const auto* cases : {&Singles(), &Lists()}) {
     for (const Case& c : *cases) {
       EXPECT_EQ(TextOf(For(c), S_OK), c.text) << c.type;
@@ -102,7 +102,7 @@ TEST(AttributeValue, TextsOfEveryType) {
   }
 }
 
-TEST(AttributeValue, OtherSuccessesPassThrough) {
+TEST(vltAttributeValues, OtherSuccessesPassThrough) {
   for (const Case& c : Singles()) {
     Answers answers = For(c);
     answers.result = S_FALSE;
@@ -115,7 +115,7 @@ TEST(AttributeValue, OtherSuccessesPassThrough) {
   }
 }
 
-TEST(AttributeValue, BlobsFastReferencesAndUnknownTypesHaveNone) {
+TEST(vltAttributeValues, BlobsFastReferencesAndUnknownTypesHaveNone) {
   for (int type : kNotReadable) {
     for (Getter getter : {Getter{&vltGetAttributeValueAsString}, kInner}) {
       EXPECT_EQ(TextOf(Filled(type), E_FAIL, getter), L"(untouched)") << type;
@@ -123,7 +123,7 @@ TEST(AttributeValue, BlobsFastReferencesAndUnknownTypesHaveNone) {
   }
 }
 
-TEST(AttributeValue, EachFailingStepOfTheTypeIsReturned) {
+TEST(vltAttributeValues, EachFailingStepOfTheTypeIsReturned) {
   for (int type : kReadable) {
     for (HRESULT Answers::*step :
          {&Answers::classResult, &Answers::metaResult, &Answers::typeResult}) {
@@ -136,7 +136,7 @@ TEST(AttributeValue, EachFailingStepOfTheTypeIsReturned) {
   }
 }
 
-TEST(AttributeValue, AFailedReadLeavesTheTextAlone) {
+TEST(vltAttributeValues, AFailedReadLeavesTheTextAlone) {
   for (int type : kReadable) {
     Answers answers = Filled(type);
     answers.result = kFailure;
@@ -146,7 +146,7 @@ TEST(AttributeValue, AFailedReadLeavesTheTextAlone) {
   }
 }
 
-TEST(AttributeValue, TheInnerGetterWritesFailedReferencesAndArrays) {
+TEST(vltAttributeValues, TheInnerGetterWritesFailedReferencesAndArrays) {
   Answers answers = Filled(vltReferenceType);
   answers.result = kFailure;
   EXPECT_EQ(TextOf(answers, kFailure, kInner), kZeroText);
@@ -164,7 +164,7 @@ TEST(AttributeValue, TheInnerGetterWritesFailedReferencesAndArrays) {
   }
 }
 
-TEST(AttributeValue, AnIdentityThatFailsReadsAsZeros) {
+TEST(vltAttributeValues, AnIdentityThatFailsReadsAsZeros) {
   Answers answers = Filled(vltReferenceType);
   answers.identityResult = kFailure;
   EXPECT_EQ(TextOf(answers, S_OK), kZeroText);
@@ -172,7 +172,7 @@ TEST(AttributeValue, AnIdentityThatFailsReadsAsZeros) {
   EXPECT_EQ(TextOf(answers, S_OK), L"{" + kZeroText + L"," + kZeroText + L"}");
 }
 
-TEST(AttributeValue, NullPointersAreRefused) {
+TEST(vltAttributeValues, NullPointersAreRefused) {
   Answers answers = Filled(1);
   Object object(answers);
   wchar_t* text = nullptr;
@@ -190,7 +190,7 @@ TEST(AttributeValue, NullPointersAreRefused) {
 
 // ---- The type
 
-TEST(AttributeType, IsThatOfTheMetaAttribute) {
+TEST(vltAttributeValuesType, IsThatOfTheMetaAttribute) {
   g_references = 0;
   for (int wanted : {0, 7, 14, 99}) {
     Answers answers = Type(wanted);
@@ -203,7 +203,7 @@ TEST(AttributeType, IsThatOfTheMetaAttribute) {
   }
 }
 
-TEST(AttributeType, ASuccessWithoutAnObjectAborts) {
+TEST(vltAttributeValuesType, ASuccessWithoutAnObjectAborts) {
   for (bool Answers::*null : {&Answers::nullClass, &Answers::nullMeta}) {
     int code = InChild([null] {
       Answers answers = Filled(1);
@@ -216,7 +216,7 @@ TEST(AttributeType, ASuccessWithoutAnObjectAborts) {
 
 // ---- Setting
 
-TEST(AttributeSet, TextsBecomeValues) {
+TEST(vltAttributeValuesSet, TextsBecomeValues) {
   struct Row {
     int type;
     const wchar_t* text;
@@ -242,7 +242,7 @@ TEST(AttributeSet, TextsBecomeValues) {
   }
 }
 
-TEST(AttributeSet, OtherTypesAreRefusedAndNothingIsCalled) {
+TEST(vltAttributeValuesSet, OtherTypesAreRefusedAndNothingIsCalled) {
   for (int type : {0, 5, 7, 8, 9, 10, 11, 12, 13, 14, 15, 99, -1}) {
     g_references = 0;
     Answers answers = Filled(type);
@@ -254,7 +254,7 @@ TEST(AttributeSet, OtherTypesAreRefusedAndNothingIsCalled) {
   }
 }
 
-TEST(AttributeSet, EachFailingStepOfTheTypeIsReturned) {
+TEST(vltAttributeValuesSet, EachFailingStepOfTheTypeIsReturned) {
   for (HRESULT Answers::*step :
        {&Answers::classResult, &Answers::metaResult, &Answers::typeResult}) {
     g_references = 0;

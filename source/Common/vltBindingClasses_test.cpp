@@ -52,7 +52,7 @@ void ExpectTable(const Row& row) {
   EXPECT_TRUE(Components(table) == components) << row.text;
 }
 
-TEST(BindingClasses, TextsAndTheirTables) {
+TEST(vltBindingClasses, TextsAndTheirTables) {
   const std::string p = B(1), q = B(2), r = B(3), s = B(4);
   const Row rows[] = {{"", {}},
                       {p, {}},
@@ -87,7 +87,7 @@ TEST(BindingClasses, TextsAndTheirTables) {
   for (const Row& row : rows) ExpectTable(row);
 }
 
-TEST(BindingClasses, ComponentsComeInTheOrderOfTheirNumbers) {
+TEST(vltBindingClasses, ComponentsComeInTheOrderOfTheirNumbers) {
   // By the fields as numbers: byte order would put the second one first.
   GUID low = {0x00000001, 0, 0, {}}, high = {0x00000100, 0, 0, {}};
   GUID byData4 = {0x00000001, 0, 0, {0x80}};
@@ -97,19 +97,19 @@ TEST(BindingClasses, ComponentsComeInTheOrderOfTheirNumbers) {
   EXPECT_TRUE((found == std::vector<GUID>{low, byData4, high}));
 }
 
-TEST(BindingClasses, AnUnknownComponentLeavesTheVector) {
+TEST(vltBindingClasses, AnUnknownComponentLeavesTheVector) {
   std::vector<GUID> classes = Classes(Parse(B(1) + ":1:" + B(2)), G(3));
   ASSERT_EQ(classes.size(), 1u);
   EXPECT_TRUE(classes[0] == G(999));
 }
 
-TEST(BindingClasses, NoDictionaryManagesClasses) {
+TEST(vltBindingClasses, NoDictionaryManagesClasses) {
   Vector<GUID> components;
   components.push_back(G(1));
   EXPECT_EQ(Parse(B(1) + ":1:" + B(2)).GetDictionaryManagedClasses(components).size(), 0u);
 }
 
-TEST_IN_CHILD(BindingClasses, ALongTextTakesTimeInProportion) {
+TEST_IN_CHILD(vltBindingClasses, ALongTextTakesTimeInProportion) {
   std::string text = B(1) + ":100000";
   for (int n = 0; n < 100000; ++n) text += ":" + B(2);
   EXPECT_EQ(Classes(Parse(text), G(1)).size(), 100000u);
@@ -121,7 +121,7 @@ std::vector<std::pair<GUID, GUID>> Pairs(const BindingClassesMap& map) {
   return std::vector<std::pair<GUID, GUID>>(map.begin(), map.end());
 }
 
-TEST(BindingClasses, EntersEveryClassOfTheRecordsComponent) {
+TEST(vltBindingClasses, EntersEveryClassOfTheRecordsComponent) {
   CvltBindingClasses table = Parse(B(1) + ":2:" + B(8) + ":" + B(7) + ":" + B(2) + ":1:" + B(8));
   BindingClassesMap map;
   Offered one(vltComponentObjectExpert, L"1", G(1), L"/f");
@@ -133,7 +133,7 @@ TEST(BindingClasses, EntersEveryClassOfTheRecordsComponent) {
   EXPECT_TRUE(map.find(G(8))->second == G(1));
 }
 
-TEST(BindingClasses, OutOfMemoryEntersNothing) {
+TEST(vltBindingClasses, OutOfMemoryEntersNothing) {
   CvltBindingClasses table = Parse(B(1) + ":3:" + B(7) + ":" + B(8) + ":" + B(9));
   Offered one(vltComponentObjectExpert, L"1", G(1), L"/f");
   int failures = 0;
@@ -169,7 +169,7 @@ void LiftMemoryLimit() {
   setrlimit(RLIMIT_AS, &limit);
 }
 
-TEST_IN_CHILD(BindingClasses, OutOfMemoryGivesAnEmptyComponentVector) {
+TEST_IN_CHILD(vltBindingClasses, OutOfMemoryGivesAnEmptyComponentVector) {
   if (!kCanLimitMemory) GTEST_SKIP() << "a sanitizer has the address space";
   mallopt(M_MMAP_THRESHOLD, kLargeBlock);
   std::string text;
@@ -183,7 +183,7 @@ TEST_IN_CHILD(BindingClasses, OutOfMemoryGivesAnEmptyComponentVector) {
   EXPECT_EQ(found, 0u);
 }
 
-TEST(BindingClasses, AnswersInTheOrderOfEntry) {
+TEST(vltBindingClasses, AnswersInTheOrderOfEntry) {
   BindingClassesMap map;
   for (uint32_t n : {5u, 3u, 4u}) map.emplace(G(8), G(n));
   map.emplace(G(9), G(1));
@@ -195,7 +195,7 @@ TEST(BindingClasses, AnswersInTheOrderOfEntry) {
   EXPECT_TRUE(components[0] == G(5) && components[1] == G(3) && components[2] == G(4));
 }
 
-TEST(BindingClasses, NobodyServesAnUnknownClassAndNothingIsTouched) {
+TEST(vltBindingClasses, NobodyServesAnUnknownClassAndNothingIsTouched) {
   BindingClassesMap map;
   map.emplace(G(8), G(1));
   unsigned count = 7;
@@ -212,7 +212,7 @@ TEST(BindingClasses, NobodyServesAnUnknownClassAndNothingIsTouched) {
   EXPECT_EQ(static_cast<uint32_t>(VLT_E_NO_COMPONENT), 0x80040301u);
 }
 
-TEST_IN_CHILD(BindingClasses, OutOfMemoryIsAResultOfTheQuery) {
+TEST_IN_CHILD(vltBindingClasses, OutOfMemoryIsAResultOfTheQuery) {
   if (!kCanLimitMemory) GTEST_SKIP() << "a sanitizer has the address space";
   mallopt(M_MMAP_THRESHOLD, kLargeBlock);
   BindingClassesMap map;

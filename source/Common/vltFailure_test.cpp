@@ -20,7 +20,7 @@ using zt::fnd::osdep::NamedEvent;
 
 const wchar_t* const kLockdown = L"LockdownVLTEvent";
 
-TEST(FailureReport, SignalsWhoeverHoldsTheEventInAnotherProcess) {
+TEST(vltFailure, SignalsWhoeverHoldsTheEventInAnotherProcess) {
   Signal open;
   Child watcher([&] {
     NamedEvent event(zt::fnd::String(kLockdown), true, false);
@@ -33,13 +33,13 @@ TEST(FailureReport, SignalsWhoeverHoldsTheEventInAnotherProcess) {
   EXPECT_EQ(watcher.wait(), 0);
 }
 
-TEST(FailureReport, LeavesNoEventWithoutAHolder) {
+TEST(vltFailure, LeavesNoEventWithoutAHolder) {
   vltReportOutOfMemory("void f()");
   NamedEvent event(zt::fnd::String(kLockdown), true, false);
   EXPECT_FALSE(event.check());
 }
 
-TEST(FailureReport, WhereNoEventCanBeHadTheResultIsTheSame) {
+TEST(vltFailure, WhereNoEventCanBeHadTheResultIsTheSame) {
   TempDir dir;
   WriteBytes(dir / "file", "");
   EXPECT_EQ(Child([&] {
@@ -72,7 +72,7 @@ void Start(unsigned mask) {
                        0);
 }
 
-TEST(FailureReport, TracesUnderTheErrorBitOnly) {
+TEST(vltFailure, TracesUnderTheErrorBitOnly) {
   for (unsigned mask : {0u, 1u, 0xFFFFFFFDu}) {
     EXPECT_EQ(Errors([&] {
                 Start(mask);
@@ -88,7 +88,7 @@ TEST(FailureReport, TracesUnderTheErrorBitOnly) {
             "  Memory allocation failure in void f(int)\n  text 7\n");
 }
 
-TEST(FailureReport, APendingCallbackStartsTheLog) {
+TEST(vltFailure, APendingCallbackStartsTheLog) {
   EXPECT_EQ(Errors([] {
               vlTracer::Initialize([] { Start(2); });
               vltTraceError("first");
@@ -96,7 +96,7 @@ TEST(FailureReport, APendingCallbackStartsTheLog) {
             "  first\n");
 }
 
-TEST(FailureReport, LongMessagesAreCut) {
+TEST(vltFailure, LongMessagesAreCut) {
   std::string text = Errors([] {
     Start(2);
     vltTraceError("%s", std::string(10000, 'x').c_str());

@@ -18,7 +18,7 @@ namespace {
 
 using namespace vlt::test;
 
-TEST(FileSecurity, ChangesTheModeOfFilesAndDirectories) {
+TEST(vltFileSecurity, ChangesTheModeOfFilesAndDirectories) {
   TempDir dir;
   WriteBytes(dir / "f", "");
   EXPECT_EQ(vlrSetFileSecurity(zt::fnd::String((dir / "f").c_str()), 0640), S_OK);
@@ -26,7 +26,7 @@ TEST(FileSecurity, ChangesTheModeOfFilesAndDirectories) {
   EXPECT_EQ(vlrSetFileSecurity(zt::fnd::String((dir / "none").c_str()), 0640), E_FAIL);
 }
 
-TEST(FileSecurity, RecursesWithoutFollowingLinks) {
+TEST(vltFileSecurity, RecursesWithoutFollowingLinks) {
   TempDir dir;
   dir.makeDir("d/e");
   WriteBytes(dir / "d/e/f", "");
@@ -43,7 +43,7 @@ TEST(FileSecurity, RecursesWithoutFollowingLinks) {
   EXPECT_EQ(ModeOf(dir / "outside"), 0600);
 }
 
-TEST(FileSecurity, StopsAtTheFirstEntryThatCannotBeChanged) {
+TEST(vltFileSecurity, StopsAtTheFirstEntryThatCannotBeChanged) {
   if (geteuid() != 0) GTEST_SKIP() << "needs root, to make files of two users";
   TempDir dir;
   ASSERT_EQ(chmod(dir.path().c_str(), 0777), 0);
@@ -62,7 +62,7 @@ TEST(FileSecurity, StopsAtTheFirstEntryThatCannotBeChanged) {
   EXPECT_NE(ModeOf(tree + "/2"), 0777);
 }
 
-TEST(FileSecurity, DateStampIsTodaysLocalDate) {
+TEST(vltFileSecurity, DateStampIsTodaysLocalDate) {
   auto stamp = [] {
     char text[32];
     time_t now = time(nullptr);
@@ -75,7 +75,7 @@ TEST(FileSecurity, DateStampIsTodaysLocalDate) {
   EXPECT_TRUE(found == before || found == stamp()) << found;  // the day may end in between
 }
 
-TEST(FileSecurity, SharedDirectoryIsMadeOrRaises) {
+TEST(vltFileSecurity, SharedDirectoryIsMadeOrRaises) {
   TempDir dir;
   ScopedUmask strict(077);
   EXPECT_EQ(vltMakeSharedDirectory(zt::fnd::String((dir / "a/b/").c_str())), S_OK);

@@ -98,7 +98,7 @@ const heap::Call kCalls[] = {{"vltMarshalQueryFromStream",
                               }},
                              {"vltConvertQueryToString", Print}};
 
-TEST(QueryMemory, EveryCallSurvivesEveryFailedAllocation) {
+TEST(vltQueryMemory, EveryCallSurvivesEveryFailedAllocation) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer has a malloc of its own";
   for (bool forEver : {false, true}) {
     long total = 0;

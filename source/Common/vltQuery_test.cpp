@@ -173,7 +173,7 @@ _vltQuery Query(std::vector<_vltQueryTerm>& terms, int32_t tFlag = 1, int32_t or
   return {kGuid, tFlag, orFlag, static_cast<uint32_t>(terms.size()), terms.data()};
 }
 
-TEST(Query, FieldsStandInOrder) {
+TEST(vltQuery, FieldsStandInOrder) {
   EXPECT_EQ(offsetof(_vltQuery, tFlag), 16u);
   EXPECT_EQ(offsetof(_vltQuery, termCount), 24u);
   EXPECT_EQ(offsetof(_vltQueryTerm, attributeType), 8u);
@@ -182,7 +182,7 @@ TEST(Query, FieldsStandInOrder) {
 
 // ---- Writing
 
-TEST(Query, WritesFrameAndTermsInOrder) {
+TEST(vltQuery, WritesFrameAndTermsInOrder) {
   std::vector<_vltQueryTerm> terms = AllTerms();
   _vltQuery query = Query(terms, 5, 7);
   Writer writer;
@@ -198,7 +198,7 @@ TEST(Query, WritesFrameAndTermsInOrder) {
   EXPECT_EQ(writer.references, 1);
 }
 
-TEST(Query, TypesWithoutAValueAreIdAndType) {
+TEST(vltQuery, TypesWithoutAValueAreIdAndType) {
   for (int type : {0, 5, 7, 8, 13, 14, 99, -1}) {
     std::vector<_vltQueryTerm> terms = {Term(3, type)};
     _vltQuery query = Query(terms);
@@ -210,7 +210,7 @@ TEST(Query, TypesWithoutAValueAreIdAndType) {
   }
 }
 
-TEST(Query, TheLastResultIsReturned) {
+TEST(vltQuery, TheLastResultIsReturned) {
   std::vector<_vltQueryTerm> none;
   _vltQuery query = Query(none);
   Writer writer;
@@ -219,7 +219,7 @@ TEST(Query, TheLastResultIsReturned) {
   EXPECT_EQ(writer.items.size(), 5u);
 }
 
-TEST(Query, EachFailingWriteEndsTheWork) {
+TEST(vltQuery, EachFailingWriteEndsTheWork) {
   std::vector<_vltQueryTerm> terms = AllTerms();
   _vltQuery query = Query(terms);
   Writer whole;
@@ -241,7 +241,7 @@ std::deque<Item> Recorded(const _vltQuery& query) {
   return writer.items;
 }
 
-TEST(Query, ComesBackAsItWasWritten) {
+TEST(vltQuery, ComesBackAsItWasWritten) {
   std::vector<_vltQueryTerm> terms = AllTerms();
   _vltQuery query = Query(terms), read = {};
   Reader reader;
@@ -263,7 +263,7 @@ TEST(Query, ComesBackAsItWasWritten) {
   EXPECT_EQ(vltFreeQuery(&read), 0);
 }
 
-TEST(Query, OnlySomeFlagsAreNormalised) {
+TEST(vltQuery, OnlySomeFlagsAreNormalised) {
   std::vector<_vltQueryTerm> terms = {TextTerm(1, 7, L"x"), TextTerm(2, 0, L"y")};
   for (auto [tFlag, orFlag] : {std::pair(5, 5), std::pair(-1, -1), std::pair(0, 0)}) {
     _vltQuery query = Query(terms, tFlag, orFlag), read = {};
@@ -278,7 +278,7 @@ TEST(Query, OnlySomeFlagsAreNormalised) {
   }
 }
 
-TEST(Query, AnotherVersionIsASuccessThatReadsNothing) {
+TEST(vltQuery, AnotherVersionIsASuccessThatReadsNothing) {
   for (int version : {2, 0, -1}) {
     Reader reader;
     reader.items = {I32(version), GuidItem()};
@@ -296,7 +296,7 @@ TEST(Query, AnotherVersionIsASuccessThatReadsNothing) {
   EXPECT_EQ(vltMarshalQueryFromStream(&reader, &query), S_FALSE);
 }
 
-TEST(Query, NoTermsAreABlockOfTheirOwn) {
+TEST(vltQuery, NoTermsAreABlockOfTheirOwn) {
   std::vector<_vltQueryTerm> none;
   _vltQuery query = Query(none), read = {};
   Reader reader;
@@ -309,7 +309,7 @@ TEST(Query, NoTermsAreABlockOfTheirOwn) {
   EXPECT_EQ(read.terms, terms);  // not cleared
 }
 
-TEST(Query, EachFailingReadIsReturnedAndTheQueryCanBeFreed) {
+TEST(vltQuery, EachFailingReadIsReturnedAndTheQueryCanBeFreed) {
   std::vector<_vltQueryTerm> terms = AllTerms();
   terms.push_back(TextTerm(12, 0, L"last"));
   _vltQuery query = Query(terms);
@@ -326,7 +326,7 @@ TEST(Query, EachFailingReadIsReturnedAndTheQueryCanBeFreed) {
   }
 }
 
-TEST(Query, CountsThatCannotBeAreOutOfMemory) {
+TEST(vltQuery, CountsThatCannotBeAreOutOfMemory) {
   for (uint32_t count : {0xFFFFFFFFu, 0x80000000u, 0x66666667u, 0x05000000u}) {
     Reader reader;
     reader.items = {I32(1), GuidItem(), I32(1), I32(1), U32(count)};
@@ -342,7 +342,7 @@ TEST(Query, CountsThatCannotBeAreOutOfMemory) {
   }
 }
 
-TEST(Query, NullPointersAreRefused) {
+TEST(vltQuery, NullPointersAreRefused) {
   std::vector<_vltQueryTerm> none;
   _vltQuery query = Query(none);
   Writer writer;
@@ -369,14 +369,14 @@ std::wstring LineOf(const _vltQuery& query) {
 
 std::wstring LineOf(std::vector<_vltQueryTerm> terms) { return LineOf(Query(terms)); }
 
-TEST(Query, PrintsAsOneLine) {
+TEST(vltQuery, PrintsAsOneLine) {
   EXPECT_EQ(LineOf({I32Term(5, 42), TextTerm(9, 1, L"abc")}), kGuidText + L",t,a,5=42,9=~abc");
   std::vector<_vltQueryTerm> none;
   EXPECT_EQ(LineOf(Query(none, 0, 0)), kGuidText + L",f,a");
   EXPECT_EQ(LineOf(Query(none, 5, -1)), kGuidText + L",t,o");
 }
 
-TEST(Query, PrintsTheValueOfEachType) {
+TEST(vltQuery, PrintsTheValueOfEachType) {
   EXPECT_EQ(LineOf(AllTerms()),
             kGuidText + L",t,a,5=42,6=4294967295,7=1.5,9=~abc,10=" + kGuidText + L",11=");
   for (int type : {0, 5, 7, 8, 14, 99, -1}) {
@@ -386,14 +386,14 @@ TEST(Query, PrintsTheValueOfEachType) {
             kGuidText + L",t,a,1=x,2=~,3=");
 }
 
-TEST(Query, PrintsIdsAndNumbersByTheirPattern) {
+TEST(vltQuery, PrintsIdsAndNumbersByTheirPattern) {
   bool wide = sizeof(long) == 8;
   EXPECT_EQ(LineOf({I32Term(0x5AC00001, -1), I32Term(0xE2C0C005, 0)}),
             kGuidText + (wide ? L",t,a,1522532353=4294967295,3804282885=0"
                               : L",t,a,1522532353=-1,-490684411=0"));
 }
 
-TEST(Query, LongTextsGrowTheLine) {
+TEST(vltQuery, LongTextsGrowTheLine) {
   // The first block has room for 40 characters and 72 a term.
   for (size_t length :
        {60u, 61u, 62u, 63u, 64u, 65u, 66u, 67u, 68u, 69u, 70u, 71u, 72u, 430u, 431u, 432u, 5000u}) {
@@ -403,7 +403,7 @@ TEST(Query, LongTextsGrowTheLine) {
   }
 }
 
-TEST(Query, ManyLongTextsTakeTimeInProportion) {
+TEST(vltQuery, ManyLongTextsTakeTimeInProportion) {
   std::wstring text(500, L'x');
   std::vector<_vltQueryTerm> terms(40000, TextTerm(1, 0, text.c_str()));
   EXPECT_EQ(LineOf(terms).size(), 42u + 40000u * 503u);
@@ -411,7 +411,7 @@ TEST(Query, ManyLongTextsTakeTimeInProportion) {
 
 // ---- Hook points
 
-TEST(Query, AnArmedReadIsOutOfMemory) {
+TEST(vltQuery, AnArmedReadIsOutOfMemory) {
   ExpectInArmedChild("TestHookNT\"./source/Common/vltcmn\"1257", kFailedAllocation, [] {
     std::vector<_vltQueryTerm> terms = AllTerms();
     _vltQuery query = Query(terms), read = {};
@@ -426,7 +426,7 @@ TEST(Query, AnArmedReadIsOutOfMemory) {
   });
 }
 
-TEST(Query, AnArmedPrintIsOutOfMemory) {
+TEST(vltQuery, AnArmedPrintIsOutOfMemory) {
   ExpectInArmedChild("TestHookNT\"./source/Common/vltcmn\"1132", kFailedAllocation, [] {
     std::vector<_vltQueryTerm> terms = AllTerms();
     _vltQuery query = Query(terms);
@@ -436,7 +436,7 @@ TEST(Query, AnArmedPrintIsOutOfMemory) {
   });
 }
 
-TEST(Query, WhatCannotBeAppendedIsLeftOut) {
+TEST(vltQuery, WhatCannotBeAppendedIsLeftOut) {
   ExpectInArmedChild(hook::kAppendString2, kFailedAllocation, [] {
     std::wstring text(1000, L'x');
     EXPECT_EQ(LineOf({TextTerm(1, 1, text.c_str()), TextTerm(2, 0, text.c_str()), I32Term(3, 4)}),

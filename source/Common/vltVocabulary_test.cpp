@@ -50,7 +50,7 @@ const Names kNames[] = {
      L"kLumBlobType", L"kLumBlobDataType"},
 };
 
-TEST(Vocabulary, EveryTypeHasItsNameInEveryDialect) {
+TEST(vltVocabulary, EveryTypeHasItsNameInEveryDialect) {
   for (const Names& row : kNames) {
     _vltAttributeType t = Type(row.type);
     EXPECT_STREQ(vltAttributeTypeToString(t), row.user) << row.type;
@@ -62,7 +62,7 @@ TEST(Vocabulary, EveryTypeHasItsNameInEveryDialect) {
   }
 }
 
-TEST(Vocabulary, TypeTextsAreReadInAnyCase) {
+TEST(vltVocabulary, TypeTextsAreReadInAnyCase) {
   const std::pair<const wchar_t*, int> rows[] = {{L"i32", 1},
                                                  {L"U32", 2},
                                                  {L"f64", 3},
@@ -98,17 +98,17 @@ TEST(Vocabulary, TypeTextsAreReadInAnyCase) {
   }
 }
 
-TEST(Vocabulary, EveryUserTextReadsBackAsItsTypeButUnspecified) {
+TEST(vltVocabulary, EveryUserTextReadsBackAsItsTypeButUnspecified) {
   for (int type = 1; type <= 14; ++type) {
     EXPECT_EQ(vltAttributeTypeFromString(vltAttributeTypeToString(Type(type))), Type(type));
   }
 }
 
-TEST(Vocabulary, AliasesDoNotComeBack) {
+TEST(vltVocabulary, AliasesDoNotComeBack) {
   EXPECT_STREQ(vltAttributeTypeToString(vltAttributeTypeFromString(L"ref")), L"reference");
 }
 
-TEST(Vocabulary, StorageAndClientWords) {
+TEST(vltVocabulary, StorageAndClientWords) {
   EXPECT_EQ(static_cast<int>(vltAttributeStorageFromString(L"STATIC")), 1);
   EXPECT_EQ(static_cast<int>(vltAttributeStorageFromString(L"dynamic")), 0);
   EXPECT_EQ(static_cast<int>(vltAttributeStorageFromString(L"unknown word")), 0);
@@ -127,7 +127,7 @@ TEST(Vocabulary, StorageAndClientWords) {
   EXPECT_STREQ(vltClientToString(static_cast<_vltClient>(3)), L"Unknown");
 }
 
-TEST(Vocabulary, TagsAndArrayBits) {
+TEST(vltVocabulary, TagsAndArrayBits) {
   struct Row {
     int type;
     unsigned internalTag, externalTag, internalBits, externalBits;
@@ -151,14 +151,14 @@ TEST(Vocabulary, TagsAndArrayBits) {
   EXPECT_EQ(vltMakeInternalAttributeID(7, Type(12)), 0xC007u);
 }
 
-TEST(Vocabulary, TypedTagsMaskTheirHalves) {
+TEST(vltVocabulary, TypedTagsMaskTheirHalves) {
   EXPECT_EQ(vltLumMakeTypedTag(0x12345AC0, 0xFFFF0001), 0x5AC00001u);
   EXPECT_EQ(vltIsLumBlob(0xE2C0), 1);
   EXPECT_EQ(vltIsLumBlob(0x1234B8C0), 1);
   EXPECT_EQ(vltIsLumBlob(0xEEC0), 0);
 }
 
-TEST(Vocabulary, OnlyReferenceArrayIdsDifferInsideAndOutside) {
+TEST(vltVocabulary, OnlyReferenceArrayIdsDifferInsideAndOutside) {
   EXPECT_EQ(vltAttributeIDInternalToExternal(0xE2C0C005), 0xEEC00005u);
   EXPECT_EQ(vltAttributeIDExternalToInternal(0xEEC00005), 0xE2C0C005u);
   EXPECT_EQ(vltAttributeIDInternalToExternal(0xE2C0A005), 0xE2C0A005u);

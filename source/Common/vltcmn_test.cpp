@@ -26,7 +26,7 @@ constexpr const wchar_t* kGuidText = L"{00112233-4455-6677-8899-AABBCCDDEEFF}";
 
 bool Same(const GUID& a, const GUID& b) { return memcmp(&a, &b, sizeof a) == 0; }
 
-TEST(Exports, AllocRefusesFromTwoGibibytesUp) {
+TEST(vltcmnExports, AllocRefusesFromTwoGibibytesUp) {
   EXPECT_EQ(vltAlloc(0x80000000u), nullptr);
   EXPECT_EQ(vltAlloc(static_cast<size_t>(-1)), nullptr);
   void* p = vltAlloc(0x7FFFFFFF);  // The heap is asked; on a small machine it may refuse.
@@ -37,7 +37,7 @@ TEST(Exports, AllocRefusesFromTwoGibibytesUp) {
   vltFree(nullptr);
 }
 
-TEST(Exports, FixedAnswers) {
+TEST(vltcmnExports, FixedAnswers) {
   EXPECT_EQ(vltUseZTRPC(), 1);
   EXPECT_EQ(vltStandAlone(), 1);
   EXPECT_EQ(vltGetBinaryResource(), 0);
@@ -47,7 +47,7 @@ TEST(Exports, FixedAnswers) {
   EXPECT_EQ(vltGetOldRegistrar(nullptr), E_POINTER);
 }
 
-TEST(Exports, FreeComponentEndsTheTextsOfItsType) {
+TEST(vltcmnExports, FreeComponentEndsTheTextsOfItsType) {
   _vltComponent2 r;
   memset(&r, 0, sizeof r);
   r.type = vltComponentResourceExpert;
@@ -61,7 +61,7 @@ TEST(Exports, FreeComponentEndsTheTextsOfItsType) {
   EXPECT_EQ(vltutilsFreeComponent2(r), 0);
 }
 
-TEST(NumberText, Unsigned) {
+TEST(vltcmnNumberText, Unsigned) {
   EXPECT_EQ(Take(vltU32ToString(0)), L"0");
   EXPECT_EQ(Take(vltU32ToString(4294967295u)), L"4294967295");
   EXPECT_EQ(vltU32FromString(L"12abc"), 12u);
@@ -74,7 +74,7 @@ TEST(NumberText, Unsigned) {
   EXPECT_EQ(vltU32FromString(L"4294967298"), sizeof(long) == 8 ? 2u : 0xFFFFFFFFu);
 }
 
-TEST(NumberText, SignedPrintsItsPatternWhereLongHas64Bits) {
+TEST(vltcmnNumberText, SignedPrintsItsPatternWhereLongHas64Bits) {
   EXPECT_EQ(Take(vltI32ToString(17)), L"17");
   EXPECT_EQ(Take(vltI32ToString(-1)), sizeof(long) == 8 ? L"4294967295" : L"-1");
   EXPECT_EQ(vltI32FromString(L"-17"), -17);
@@ -82,7 +82,7 @@ TEST(NumberText, SignedPrintsItsPatternWhereLongHas64Bits) {
   EXPECT_EQ(vltI32FromString(nullptr), 0);
 }
 
-TEST(NumberText, Doubles) {
+TEST(vltcmnNumberText, Doubles) {
   EXPECT_EQ(Take(vltF64ToString(0.1)), L"0.1");
   EXPECT_EQ(Take(vltF64ToString(1e300)), L"1e+300");
   EXPECT_EQ(Take(vltF64ToString(-2.5)), L"-2.5");
@@ -93,7 +93,7 @@ TEST(NumberText, Doubles) {
   EXPECT_EQ(vltF64FromString(nullptr), 0.0);
 }
 
-TEST(NumberText, Booleans) {
+TEST(vltcmnNumberText, Booleans) {
   EXPECT_STREQ(vltBoolToString(0), L"False");
   EXPECT_STREQ(vltBoolToString(1), L"True");
   EXPECT_STREQ(vltBoolToString(-5), L"True");
@@ -106,20 +106,22 @@ TEST(NumberText, Booleans) {
   EXPECT_EQ(vltBoolFromString(nullptr), 0);
 }
 
-TEST(GuidText, PrintsInCapitalsWithBraces) { EXPECT_EQ(Take(vltGuidToString(kGuid)), kGuidText); }
+TEST(vltcmnGuidText, PrintsInCapitalsWithBraces) {
+  EXPECT_EQ(Take(vltGuidToString(kGuid)), kGuidText);
+}
 
-TEST(GuidText, StructTextIsAnInitialiser) {
+TEST(vltcmnGuidText, StructTextIsAnInitialiser) {
   EXPECT_EQ(Take(vltGuidToStructString(kGuid)),
             L"{0x112233,0x4455,0x6677,{0x88,0x99,0xaa,0xbb,0xcc,0xdd,0xee,0xff}}");
   EXPECT_EQ(Take(vltGuidToStructString(GUID{})), L"{0,0,0,{0,0,0,0,0,0,0,0}}");
 }
 
-TEST(GuidText, ReadsWithAndWithoutBraces) {
+TEST(vltcmnGuidText, ReadsWithAndWithoutBraces) {
   EXPECT_TRUE(Same(vltGuidFromString(kGuidText), kGuid));
   EXPECT_TRUE(Same(vltGuidFromString(L"00112233-4455-6677-8899-aabbccddeeff"), kGuid));
 }
 
-TEST(GuidText, BadTextReadsAsTheNullGuid) {
+TEST(vltcmnGuidText, BadTextReadsAsTheNullGuid) {
   const wchar_t* bad[] = {L"",
                           L"{",
                           L"00112233-4455-6677-8899-AABBCCDDEEFF0",
@@ -136,7 +138,7 @@ TEST(GuidText, BadTextReadsAsTheNullGuid) {
   EXPECT_TRUE(Same(out, kGuid));
 }
 
-TEST(GuidText, StringFromClsidNeedsItsPointers) {
+TEST(vltcmnGuidText, StringFromClsidNeedsItsPointers) {
   wchar_t* text = nullptr;
   EXPECT_EQ(vltStringFromCLSID(nullptr, &text), E_POINTER);
   EXPECT_EQ(vltStringFromCLSID(&kGuid, nullptr), E_POINTER);
@@ -144,7 +146,7 @@ TEST(GuidText, StringFromClsidNeedsItsPointers) {
   EXPECT_EQ(Take(text), kGuidText);
 }
 
-TEST(GuidOrder, ComparesFieldsAsNumbers) {
+TEST(vltcmnGuidOrder, ComparesFieldsAsNumbers) {
   struct Row {
     GUID a, b;
     int order;
@@ -164,7 +166,7 @@ TEST(GuidOrder, ComparesFieldsAsNumbers) {
   }
 }
 
-TEST(CreateGuid, WithoutItsLibraryFailsEachTimeAndLeavesTheOutput) {
+TEST(vltcmnCreateGuid, WithoutItsLibraryFailsEachTimeAndLeavesTheOutput) {
   GUID out = kGuid;
   EXPECT_EQ(vltCreateGuid(&out), VLT_E_UUID_LIBRARY);
   EXPECT_EQ(vltCreateGuid(&out), VLT_E_UUID_LIBRARY);
@@ -192,16 +194,16 @@ int CreateWith(const std::string& source) {
       .wait();
 }
 
-TEST(CreateGuid, ComesFromTheLibrarysEntry) {
+TEST(vltcmnCreateGuid, ComesFromTheLibrarysEntry) {
   EXPECT_EQ(CreateWith("extern \"C\" int UuidCreate(unsigned* p) { p[0] = 7; return 0; }"), 0);
 }
 
-TEST(CreateGuid, ReportsARefusalAndAMissingEntry) {
+TEST(vltcmnCreateGuid, ReportsARefusalAndAMissingEntry) {
   EXPECT_EQ(CreateWith("extern \"C\" int UuidCreate(unsigned*) { return 5; }"), 1);
   EXPECT_EQ(CreateWith("extern \"C\" int Other(unsigned*) { return 0; }"), 2);
 }
 
-TEST(TextCopy, DuplicatesAndNeedsItsPointers) {
+TEST(vltcmnTextCopy, DuplicatesAndNeedsItsPointers) {
   for (auto duplicate : {vltDuplicateString, vltDuplicateString2}) {
     wchar_t* out = nullptr;
     EXPECT_EQ(duplicate(nullptr, &out), E_POINTER);
@@ -221,7 +223,7 @@ wchar_t* Buffer(const wchar_t* text, size_t capacity) {
   return buffer;
 }
 
-TEST(TextAppend, GrowsBySteps) {
+TEST(vltcmnTextAppend, GrowsBySteps) {
   struct Row {
     size_t capacity;
     const wchar_t *text, *tail;
@@ -242,14 +244,14 @@ TEST(TextAppend, GrowsBySteps) {
   }
 }
 
-TEST(TextAppend, TakesItsOwnTextAsTail) {
+TEST(vltcmnTextAppend, TakesItsOwnTextAsTail) {
   size_t capacity = 4;
   wchar_t* buffer = Buffer(L"abc", capacity);
   EXPECT_EQ(vltAppendString2(&buffer, buffer, &capacity), S_OK);
   EXPECT_EQ(Take(buffer), L"abcabc");
 }
 
-TEST(TextAppend, NeedsItsPointers) {
+TEST(vltcmnTextAppend, NeedsItsPointers) {
   size_t capacity = 4;
   wchar_t* null = nullptr;
   wchar_t* buffer = Buffer(L"a", capacity);
@@ -260,7 +262,7 @@ TEST(TextAppend, NeedsItsPointers) {
   EXPECT_EQ(Take(buffer), L"a");
 }
 
-TEST(TextCase, UpperCasesInPlace) {
+TEST(vltcmnTextCase, UpperCasesInPlace) {
   char narrow[] = "aB1z";
   EXPECT_EQ(vltStrupr(narrow), 0);
   EXPECT_STREQ(narrow, "AB1Z");

@@ -32,23 +32,23 @@ void ExpectWalk(const std::vector<std::pair<const char*, const char*>>& items,
   }
 }
 
-TEST(RegistrarContents, AnEmptyOrMissingSectionHasNoItems) { ExpectWalk({}, {}); }
+TEST(contentsWalk, AnEmptyOrMissingSectionHasNoItems) { ExpectWalk({}, {}); }
 
-TEST(RegistrarContents, OrdinaryItemsStandForThemselves) {
+TEST(contentsWalk, OrdinaryItemsStandForThemselves) {
   ExpectWalk({{"a", "/1"}, {"a longer component name", "/2"}, {"b", ""}},
              {{"a", "/1", 0, 0}, {"a longer component name", "/2", 1, 1}, {"b", "", 2, 2}});
 }
 
-TEST(RegistrarContents, NamesBelowElevenCharactersAreNeverPieces) {
+TEST(contentsWalk, NamesBelowElevenCharactersAreNeverPieces) {
   ExpectWalk({{"x Line0001", "/1"}, {"x Line0002", "/2"}},
              {{"x Line0001", "/1", 0, 0}, {"x Line0002", "/2", 1, 1}});
 }
 
-TEST(RegistrarContents, ElevenCharactersAreEnough) {
+TEST(contentsWalk, ElevenCharactersAreEnough) {
   ExpectWalk({{"xx Line0001", "/1"}, {"xx Line0002", "/2"}}, {{"xx", "/1/2", 0, 1}});
 }
 
-TEST(RegistrarContents, PiecesOfOneNameAreJoinedUntilAnotherItemComes) {
+TEST(contentsWalk, PiecesOfOneNameAreJoinedUntilAnotherItemComes) {
   ExpectWalk({{"before", "/b"},
               {"name Line0001", "/n"},
               {"name Line0002", "1"},
@@ -63,20 +63,20 @@ TEST(RegistrarContents, PiecesOfOneNameAreJoinedUntilAnotherItemComes) {
               {"name", "/late", 6, 6}});
 }
 
-TEST(RegistrarContents, TheNameOfARunIsExactInCase) {
+TEST(contentsWalk, TheNameOfARunIsExactInCase) {
   ExpectWalk({{"name Line0001", "/1"}, {"Name Line0002", "/2"}},
              {{"name", "/1", 0, 0}, {"Name", "/2", 1, 1}});
 }
 
 // Only the four letters count: neither the blank before them nor the digits behind.
-TEST(RegistrarContents, AnyFourCharactersMayFollowTheMark) {
+TEST(contentsWalk, AnyFourCharactersMayFollowTheMark) {
   ExpectWalk({{"name_LineABCD", "/1"}, {"name line0002", "/2"}, {"name Line00001", "/3"}},
              {{"name", "/1", 0, 0}, {"name line0002", "/2", 1, 1}, {"name Line00001", "/3", 2, 2}});
 }
 
 // ---- The files that the items hold
 
-class RegistrarContentsFiles : public testing::Test {
+class contentsWalkFiles : public testing::Test {
  protected:
   void set(const char* item, const char* file) {
     ini.SetItem("VLRContentsSection", item, file, true);
@@ -89,13 +89,13 @@ class RegistrarContentsFiles : public testing::Test {
   ContentsFiles files;
 };
 
-TEST_F(RegistrarContentsFiles, BeforeAWalkAnyFileMayBeThere) {
+TEST_F(contentsWalkFiles, BeforeAWalkAnyFileMayBeThere) {
   EXPECT_TRUE(files.mayHave("/1"));
   set("a", "/1");
   EXPECT_TRUE(files.mayHave("/2"));
 }
 
-TEST_F(RegistrarContentsFiles, AWalkKnowsThemInAnyCase) {
+TEST_F(contentsWalkFiles, AWalkKnowsThemInAnyCase) {
   ini.SetItem("VLRContentsSection", "a", "/One", true);
   learn();
   EXPECT_TRUE(files.mayHave("/oNE"));
@@ -103,7 +103,7 @@ TEST_F(RegistrarContentsFiles, AWalkKnowsThemInAnyCase) {
   EXPECT_FALSE(files.mayHave("/two"));
 }
 
-TEST_F(RegistrarContentsFiles, WhatIsSetBehindTheWalkIsKnownAsItIsKept) {
+TEST_F(contentsWalkFiles, WhatIsSetBehindTheWalkIsKnownAsItIsKept) {
   learn();
   set("  a ", "/o\\n\te");
   EXPECT_TRUE(files.mayHave("/O\\n\tE"));
@@ -112,14 +112,14 @@ TEST_F(RegistrarContentsFiles, WhatIsSetBehindTheWalkIsKnownAsItIsKept) {
   EXPECT_TRUE(files.mayHave("/two"));
 }
 
-TEST_F(RegistrarContentsFiles, AfterOtherChangesAnyFileMayBeThere) {
+TEST_F(contentsWalkFiles, AfterOtherChangesAnyFileMayBeThere) {
   learn();
   files.forget();
   EXPECT_TRUE(files.mayHave("/1"));
 }
 
 // A change may join pieces to a file that no item has.
-TEST_F(RegistrarContentsFiles, WithPiecesAnyFileMayBeThere) {
+TEST_F(contentsWalkFiles, WithPiecesAnyFileMayBeThere) {
   ini.SetItem("VLRContentsSection", "name Line0002", "/1", true);
   learn();
   EXPECT_TRUE(files.mayHave("/2"));
@@ -127,7 +127,7 @@ TEST_F(RegistrarContentsFiles, WithPiecesAnyFileMayBeThere) {
   EXPECT_TRUE(files.mayHave("/2"));
 }
 
-TEST_F(RegistrarContentsFiles, APieceThatComesMakesAnyFilePossible) {
+TEST_F(contentsWalkFiles, APieceThatComesMakesAnyFilePossible) {
   learn();
   set("name Line0002 ", "/1");
   EXPECT_TRUE(files.mayHave("/2"));

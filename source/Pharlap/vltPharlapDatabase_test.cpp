@@ -23,7 +23,7 @@ std::string BadName(const Installation& i) {
   return i.database() + std::string(zt::fnd::AnsiString(vlrGetCurrentLocalTime()).c_str()) + ".bad";
 }
 
-TEST(RegistrarDatabase, AShortSidecarSetsTheDatabaseAsideAndTheNextStartWorks) {
+TEST(vltPharlapDatabase, AShortSidecarSetsTheDatabaseAsideAndTheNextStartWorks) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   ASSERT_EQ(StartOnce(i), 0);
@@ -49,7 +49,7 @@ TEST(RegistrarDatabase, AShortSidecarSetsTheDatabaseAsideAndTheNextStartWorks) {
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
 }
 
-TEST(RegistrarDatabase, ACopySetAsideEarlierThatDayStays) {
+TEST(vltPharlapDatabase, ACopySetAsideEarlierThatDayStays) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
   std::string contents = ReadBytes(i.database());
@@ -61,7 +61,7 @@ TEST(RegistrarDatabase, ACopySetAsideEarlierThatDayStays) {
   EXPECT_EQ(ReadBytes(next.insert(next.size() - 4, ".1")), contents);
 }
 
-TEST(RegistrarDatabase, WithoutASidecarTheFileIsTakenAsItIs) {
+TEST(vltPharlapDatabase, WithoutASidecarTheFileIsTakenAsItIs) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
   WriteBytes(i.database(), ReadBytes(i.database()) + "[Mine]\nx = 1\n");
@@ -73,7 +73,7 @@ TEST(RegistrarDatabase, WithoutASidecarTheFileIsTakenAsItIs) {
 }
 
 // What stops the save between the mark and the digest shows the mark.
-TEST_IN_CHILD(RegistrarDatabase, TheFirstSaveWritesTheMarkBeforeTheFile) {
+TEST_IN_CHILD(vltPharlapDatabase, TheFirstSaveWritesTheMarkBeforeTheFile) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
   LinuxStart r(i);
@@ -87,7 +87,7 @@ TEST_IN_CHILD(RegistrarDatabase, TheFirstSaveWritesTheMarkBeforeTheFile) {
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
 }
 
-TEST(RegistrarDatabase, TheMarkMatchesNothingAndCostsNothing) {
+TEST(vltPharlapDatabase, TheMarkMatchesNothingAndCostsNothing) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   ASSERT_EQ(StartOnce(i), 0);
@@ -100,7 +100,7 @@ TEST(RegistrarDatabase, TheMarkMatchesNothingAndCostsNothing) {
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
 }
 
-TEST_IN_CHILD(RegistrarDatabase, AFailedSaveKeepsTheChangeInMemoryAndTheSidecarOld) {
+TEST_IN_CHILD(vltPharlapDatabase, AFailedSaveKeepsTheChangeInMemoryAndTheSidecarOld) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
   LinuxStart r(i);
@@ -118,7 +118,7 @@ TEST_IN_CHILD(RegistrarDatabase, AFailedSaveKeepsTheChangeInMemoryAndTheSidecarO
   EXPECT_EQ(DatabaseText(i.database()).raw("KOR", "CacheSize"), "5");
 }
 
-TEST(RegistrarDatabase, ADifferingDigestKeepsTheContents) {
+TEST(vltPharlapDatabase, ADifferingDigestKeepsTheContents) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   ASSERT_EQ(StartOnce(i), 0);
@@ -136,7 +136,7 @@ TEST(RegistrarDatabase, ADifferingDigestKeepsTheContents) {
 
 constexpr char kUtf16[] = "\xFF\xFE[\0K\0]\0";
 
-TEST(RegistrarDatabase, WhatCannotBeParsedIsSetAsideAndEverythingRegisteredAnew) {
+TEST(vltPharlapDatabase, WhatCannotBeParsedIsSetAsideAndEverythingRegisteredAnew) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   ASSERT_EQ(StartOnce(i), 0);
@@ -154,7 +154,7 @@ TEST(RegistrarDatabase, WhatCannotBeParsedIsSetAsideAndEverythingRegisteredAnew)
 
 // The digest speaks first; the file is only found to be unreadable by the second opening, whose
 // failure is the caller's.
-TEST_IN_CHILD(RegistrarDatabase, DamageWithAStaleDigestIsRaisedOnceAndThenHealed) {
+TEST_IN_CHILD(vltPharlapDatabase, DamageWithAStaleDigestIsRaisedOnceAndThenHealed) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   ASSERT_EQ(StartOnce(i), 0);
@@ -167,7 +167,7 @@ TEST_IN_CHILD(RegistrarDatabase, DamageWithAStaleDigestIsRaisedOnceAndThenHealed
   EXPECT_EQ(Find(*again, G(1)), S_OK);
 }
 
-TEST(RegistrarDatabase, IsOpenUntilTheRegistrarGoesAndFreeThen) {
+TEST(vltPharlapDatabase, IsOpenUntilTheRegistrarGoesAndFreeThen) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
   Signal open, close, closed, end;
@@ -196,7 +196,7 @@ TEST(RegistrarDatabase, IsOpenUntilTheRegistrarGoesAndFreeThen) {
   EXPECT_EQ(first.wait(), 0);
 }
 
-TEST_IN_CHILD(RegistrarDatabase, LeavesNoDescriptorOpen) {
+TEST_IN_CHILD(vltPharlapDatabase, LeavesNoDescriptorOpen) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   i.addObjectExpert("E", "Exp", GText(2), "{" + GText(2) + "}:1:{" + GText(3) + "}");
@@ -205,7 +205,7 @@ TEST_IN_CHILD(RegistrarDatabase, LeavesNoDescriptorOpen) {
   EXPECT_EQ(OpenDescriptors(), before);
 }
 
-TEST_IN_CHILD(RegistrarDatabase, TheParentRunsInitWhenTold) {
+TEST_IN_CHILD(vltPharlapDatabase, TheParentRunsInitWhenTold) {
   Installation i;
   i.addObjectExpert("E", "Exp", GText(2), "{" + GText(2) + "}:1:{" + GText(3) + "}");
   PharlapStart r(i);
@@ -220,7 +220,7 @@ TEST_IN_CHILD(RegistrarDatabase, TheParentRunsInitWhenTold) {
 
 }  // namespace
 // Left by a killed scan, it would otherwise be taken up over what clients save later.
-TEST_IN_CHILD(RegistrarDatabase, ASecondNameThatAKilledScanLeftGoesWithTheNextStart) {
+TEST_IN_CHILD(vltPharlapDatabase, ASecondNameThatAKilledScanLeftGoesWithTheNextStart) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
   WriteBytes(i.database() + ".durable", ReadBytes(i.database()));
@@ -228,7 +228,7 @@ TEST_IN_CHILD(RegistrarDatabase, ASecondNameThatAKilledScanLeftGoesWithTheNextSt
   EXPECT_FALSE(Exists(i.database() + ".durable"));
 }
 
-TEST(RegistrarDatabase, AScanLeavesNoSecondName) {
+TEST(vltPharlapDatabase, AScanLeavesNoSecondName) {
   Installation i;
   for (int n = 1; n < 5; ++n) {
     i.addDictionary(("D" + std::to_string(n)).c_str(), ("Dict" + std::to_string(n)).c_str(),

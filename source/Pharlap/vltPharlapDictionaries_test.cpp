@@ -19,7 +19,7 @@ namespace fs = std::filesystem;
 
 // ---- Registration
 
-TEST(RegistrarDictionary, RegistrationWritesItsItemsInOrderAndSaves) {
+TEST(vltPharlapDictionaries, RegistrationWritesItsItemsInOrderAndSaves) {
   Installation i;
   ExpectInChild([&] {
     LinuxStart r(i);
@@ -50,7 +50,7 @@ TEST(RegistrarDictionary, RegistrationWritesItsItemsInOrderAndSaves) {
   });
 }
 
-TEST_IN_CHILD(RegistrarDictionary, RegistrationBringsTheCopyInMemoryUpToDate) {
+TEST_IN_CHILD(vltPharlapDictionaries, RegistrationBringsTheCopyInMemoryUpToDate) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "old");
   LinuxStart r(i);
@@ -68,7 +68,7 @@ TEST_IN_CHILD(RegistrarDictionary, RegistrationBringsTheCopyInMemoryUpToDate) {
   EXPECT_EQ(known.value.dictionary.lastInstalledSchemaVersion, 7u);
 }
 
-TEST(RegistrarDictionary, NullTextsAreEmpty) {
+TEST(vltPharlapDictionaries, NullTextsAreEmpty) {
   Installation i;
   ExpectInChild([&] {
     LinuxStart r(i);
@@ -83,7 +83,7 @@ TEST(RegistrarDictionary, NullTextsAreEmpty) {
   EXPECT_EQ(DatabaseText(i.database()).raw("vltdd", "Prefix"), "\"\"");
 }
 
-TEST_IN_CHILD(RegistrarDictionary, AFailedSaveIsTheResultAndMemoryIsUpToDateAllTheSame) {
+TEST_IN_CHILD(vltPharlapDictionaries, AFailedSaveIsTheResultAndMemoryIsUpToDateAllTheSame) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "old");
   LinuxStart r(i);
@@ -97,7 +97,7 @@ TEST_IN_CHILD(RegistrarDictionary, AFailedSaveIsTheResultAndMemoryIsUpToDateAllT
 
 // ---- The flag
 
-TEST(RegistrarFlag, IsSetByEveryMergeAndReadByClients) {
+TEST(vltPharlapDictionariesFlag, IsSetByEveryMergeAndReadByClients) {
   Installation i;
   std::string file = i.addDictionary("D", "Dict", GText(1), 3, "d");
   auto flag = [&](bool reset) {
@@ -125,7 +125,7 @@ TEST(RegistrarFlag, IsSetByEveryMergeAndReadByClients) {
   EXPECT_EQ(flag(false), 0u);
 }
 
-TEST(RegistrarFlag, ResetWritesOnceAndClearsMemory) {
+TEST(vltPharlapDictionariesFlag, ResetWritesOnceAndClearsMemory) {
   Installation i;
   i.addDictionary("A", "DictA", GText(1), 3, "a");
   i.addDictionary("B", "DictB", GText(2), 3, "b");
@@ -151,7 +151,7 @@ TEST(RegistrarFlag, ResetWritesOnceAndClearsMemory) {
 }
 
 // The settings have a "SchemaVersion" too, and no flag: the failure shows when they come last.
-TEST_IN_CHILD(RegistrarFlag, ResetReportsTheLastSectionWithASchema) {
+TEST_IN_CHILD(vltPharlapDictionariesFlag, ResetReportsTheLastSectionWithASchema) {
   Installation i;
   LinuxStart r(i);
   EXPECT_EQ(r->ResetDDUpdatedFlags(), S_OK);
@@ -175,7 +175,7 @@ struct Comparison {
   HRESULT result;
 };
 
-TEST_IN_CHILD(RegistrarChanged, EveryDictionaryAndNothingElse) {
+TEST_IN_CHILD(vltPharlapDictionariesChanged, EveryDictionaryAndNothingElse) {
   const std::string id = "Identifier = \"" + GText(1) + "\"\n";
   const std::string other = "Identifier = \"" + GText(2) + "\"\n";
   const std::string same = id + "FileName = \"f\"\nSchemaVersion = 3\n";
@@ -233,7 +233,7 @@ void CompareEmptyDictionaries(OpenLinux& r, const std::string& place) {
   r.HasDDChanged(fragment, L"S", changed);
 }
 
-TEST(RegistrarChanged, WarnsOfWhatIsMissingWhenAskedTo) {
+TEST(vltPharlapDictionariesChanged, WarnsOfWhatIsMissingWhenAskedTo) {
   TempDir place;
   for (const char* flags : {"0 0", "1 0", "2 0", "3 0"}) {
     Installation i;
@@ -265,7 +265,7 @@ TEST(RegistrarChanged, WarnsOfWhatIsMissingWhenAskedTo) {
 
 std::string LastFolder(const Installation& i) { return i.root() + "/Data Dictionaries/Last/"; }
 
-TEST(RegistrarPrevious, TheFolderIsMadeOpenToAll) {
+TEST(vltPharlapDictionariesPrevious, TheFolderIsMadeOpenToAll) {
   Installation i;
   ScopedUmask mask(077);
   ExpectInChild([&] {
@@ -277,7 +277,7 @@ TEST(RegistrarPrevious, TheFolderIsMadeOpenToAll) {
   EXPECT_EQ(ModeOf(i.root() + "/Data Dictionaries/Last"), 0777);
 }
 
-TEST_IN_CHILD(RegistrarPrevious, FullPathsAreHandedOut) {
+TEST_IN_CHILD(vltPharlapDictionariesPrevious, FullPathsAreHandedOut) {
   Installation i;
   fs::create_directories(LastFolder(i) + "A.framework");
   fs::create_directories(LastFolder(i) + "other.vle");
@@ -297,7 +297,7 @@ TEST_IN_CHILD(RegistrarPrevious, FullPathsAreHandedOut) {
                                               Wide(LastFolder(i) + "B.framework")}));
 }
 
-TEST_IN_CHILD(RegistrarPrevious, NullOutParametersDoNothing) {
+TEST_IN_CHILD(vltPharlapDictionariesPrevious, NullOutParametersDoNothing) {
   Installation i;
   LinuxStart r(i);
   unsigned count = 7;
@@ -313,7 +313,7 @@ TEST_IN_CHILD(RegistrarPrevious, NullOutParametersDoNothing) {
   EXPECT_EQ(paths, &mark);
 }
 
-TEST_IN_CHILD(RegistrarPrevious, WithoutARootEverythingFails) {
+TEST_IN_CHILD(vltPharlapDictionariesPrevious, WithoutARootEverythingFails) {
   Installation i;
   Installation::setDir("");
   LinuxStart r(i);
@@ -324,7 +324,7 @@ TEST_IN_CHILD(RegistrarPrevious, WithoutARootEverythingFails) {
   EXPECT_EQ(r->RemovePreviousDictionaries(nullptr), E_FAIL);
 }
 
-TEST(RegistrarPrevious, MissingRightsAreAResult) {
+TEST(vltPharlapDictionariesPrevious, MissingRightsAreAResult) {
   if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
   Installation i;
   chmod(fs::path(i.root()).parent_path().c_str(), 0755);
@@ -339,7 +339,7 @@ TEST(RegistrarPrevious, MissingRightsAreAResult) {
   });
 }
 
-TEST(RegistrarPrevious, RemovalTakesFilesAndThenTheirDatabase) {
+TEST(vltPharlapDictionariesPrevious, RemovalTakesFilesAndThenTheirDatabase) {
   Installation i;
   fs::create_directories(LastFolder(i));
   for (const char* name : {"A.framework", "B.framework", "vlt.vlr", "kept.txt"}) {
@@ -355,7 +355,7 @@ TEST(RegistrarPrevious, RemovalTakesFilesAndThenTheirDatabase) {
   EXPECT_TRUE(Exists(LastFolder(i) + "kept.txt"));
 }
 
-TEST(RegistrarPrevious, AnEmptyFolderKeepsItsDatabase) {
+TEST(vltPharlapDictionariesPrevious, AnEmptyFolderKeepsItsDatabase) {
   Installation i;
   fs::create_directories(LastFolder(i));
   WriteBytes(LastFolder(i) + "vlt.vlr", "x");
@@ -366,7 +366,7 @@ TEST(RegistrarPrevious, AnEmptyFolderKeepsItsDatabase) {
   EXPECT_TRUE(Exists(LastFolder(i) + "vlt.vlr"));
 }
 
-TEST(RegistrarPrevious, AMissingDatabaseIsAFailure) {
+TEST(vltPharlapDictionariesPrevious, AMissingDatabaseIsAFailure) {
   Installation i;
   fs::create_directories(LastFolder(i));
   WriteBytes(LastFolder(i) + "A.framework", "x");
@@ -377,7 +377,7 @@ TEST(RegistrarPrevious, AMissingDatabaseIsAFailure) {
   EXPECT_FALSE(Exists(LastFolder(i) + "A.framework"));
 }
 
-TEST(RegistrarPrevious, ABundleThatIsADirectoryStaysAndTheOthersGo) {
+TEST(vltPharlapDictionariesPrevious, ABundleThatIsADirectoryStaysAndTheOthersGo) {
   Installation i;
   fs::create_directories(LastFolder(i) + "A.framework");
   for (const char* name : {"B.framework", "C.framework", "vlt.vlr"}) {
@@ -393,7 +393,7 @@ TEST(RegistrarPrevious, ABundleThatIsADirectoryStaysAndTheOthersGo) {
   EXPECT_TRUE(Exists(LastFolder(i) + "vlt.vlr"));
 }
 
-TEST(RegistrarPrevious, PortConfigurationOptionsAreRefusedWithAWord) {
+TEST(vltPharlapDictionariesPrevious, PortConfigurationOptionsAreRefusedWithAWord) {
   Installation i;
   fs::create_directories(LastFolder(i));
   WriteBytes(LastFolder(i) + "A.framework", "x");
@@ -416,7 +416,7 @@ TEST(RegistrarPrevious, PortConfigurationOptionsAreRefusedWithAWord) {
   EXPECT_TRUE(Exists(LastFolder(i) + "A.framework"));
 }
 
-TEST_IN_CHILD(RegistrarPrevious, OtherOptionsDoNotStandInTheWay) {
+TEST_IN_CHILD(vltPharlapDictionariesPrevious, OtherOptionsDoNotStandInTheWay) {
   Installation i;
   LinuxStart r(i);
   const unsigned char without[8] = {0xFF, 0xFF, 0xFF, 0xFF, 0x7F, 0xFF, 0xFF, 0xFF};
@@ -426,7 +426,7 @@ TEST_IN_CHILD(RegistrarPrevious, OtherOptionsDoNotStandInTheWay) {
 
 // ---- Loading test
 
-TEST_IN_CHILD(RegistrarDictionary, TheLoadingTestSucceedsWhateverLoads) {
+TEST_IN_CHILD(vltPharlapDictionaries, TheLoadingTestSucceedsWhateverLoads) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   i.addBundle(

@@ -42,7 +42,7 @@ void AddThree(Installation& i) {
   }
 }
 
-TEST_IN_CHILD(RegistrarDurable, AChildThatIsForkedInAScanLeavesTheSecondName) {
+TEST_IN_CHILD(vltPharlapDurable, AChildThatIsForkedInAScanLeavesTheSecondName) {
   Installation i;
   AddThree(i);
   pid_t child = -1;
@@ -59,7 +59,7 @@ TEST_IN_CHILD(RegistrarDurable, AChildThatIsForkedInAScanLeavesTheSecondName) {
   EXPECT_FALSE(Exists(SecondName(i)));
 }
 
-TEST_IN_CHILD(RegistrarDurable, AScanThatHasLostItsLockLeavesTheSecondName) {
+TEST_IN_CHILD(vltPharlapDurable, AScanThatHasLostItsLockLeavesTheSecondName) {
   Installation i;
   AddThree(i);
   Signal held, end;
@@ -84,7 +84,7 @@ TEST_IN_CHILD(RegistrarDurable, AScanThatHasLostItsLockLeavesTheSecondName) {
 
 // While this process had lost the lock another one may have begun a scan, and been killed. A later opening
 // must not prefer what that one has left to what is saved here.
-TEST_IN_CHILD(RegistrarDurable, ASaveRemovesASecondNameThatAnotherProcessHasLeft) {
+TEST_IN_CHILD(vltPharlapDurable, ASaveRemovesASecondNameThatAnotherProcessHasLeft) {
   Installation i;
   LinuxStart r(i);
   WriteBytes(SecondName(i), ReadBytes(i.database()));
@@ -92,7 +92,7 @@ TEST_IN_CHILD(RegistrarDurable, ASaveRemovesASecondNameThatAnotherProcessHasLeft
   EXPECT_FALSE(Exists(SecondName(i)));
 }
 
-TEST(RegistrarDurable, ADirectoryInItsPlaceRefusesNeitherStartsNorSaves) {
+TEST(vltPharlapDurable, ADirectoryInItsPlaceRefusesNeitherStartsNorSaves) {
   for (bool hasSidecar : {true, false}) {
     Installation i;
     AddThree(i);

@@ -19,9 +19,9 @@ constexpr uint32_t kObjectSize = sizeof(void*) == 8 ? 120 : 76;
 
 // Runs on both classes: what is said of one holds for the other unless a test tells.
 template <class Start>
-class RegistrarReading : public testing::Test {};
+class vltPharlapExpertsReading : public testing::Test {};
 using BothClasses = testing::Types<PharlapStart, LinuxStart>;
-TYPED_TEST_SUITE(RegistrarReading, BothClasses);
+TYPED_TEST_SUITE(vltPharlapExpertsReading, BothClasses);
 
 std::string OneExpert(const std::string& items) {
   return "[KORComponents]\nE = \"E\"\n[E]\nIdentifier = \"" + GText(1) + "\"\n" + items;
@@ -29,7 +29,7 @@ std::string OneExpert(const std::string& items) {
 
 // ---- Registration
 
-TEST_IN_CHILD(RegistrarExpert, OtherTypesAreRefusedAndWriteNothing) {
+TEST_IN_CHILD(vltPharlapExperts, OtherTypesAreRefusedAndWriteNothing) {
   Installation i;
   LinuxStart r(i);
   EXPECT_EQ(r->SaveChanges(), S_OK);
@@ -42,7 +42,7 @@ TEST_IN_CHILD(RegistrarExpert, OtherTypesAreRefusedAndWriteNothing) {
   EXPECT_EQ(ReadBytes(i.database()), before);
 }
 
-TEST(RegistrarExpert, TheParentStoresTheBareNameAndIdentifier) {
+TEST(vltPharlapExperts, TheParentStoresTheBareNameAndIdentifier) {
   Installation i;
   ExpectInChild([&] {
     PharlapStart r(i);
@@ -61,7 +61,7 @@ TEST(RegistrarExpert, TheParentStoresTheBareNameAndIdentifier) {
   EXPECT_EQ(db.quoted("KORComponents", "Obj"), "Obj");
 }
 
-TEST(RegistrarExpert, TheNextStartPutsABareNameWhereExpertsAre) {
+TEST(vltPharlapExperts, TheNextStartPutsABareNameWhereExpertsAre) {
   Installation i;
   ExpectInChild([&] {
     LinuxStart r(i);
@@ -82,7 +82,7 @@ TEST(RegistrarExpert, TheNextStartPutsABareNameWhereExpertsAre) {
   EXPECT_EQ(saves.count(), 1);  // the built-in dictionary alone
 }
 
-TEST_IN_CHILD(RegistrarExpert, TheCopyInMemoryGetsTheBareName) {
+TEST_IN_CHILD(vltPharlapExperts, TheCopyInMemoryGetsTheBareName) {
   Installation i;
   i.addResourceExpert("E", "Res", GText(1), "old");
   LinuxStart r(i);
@@ -95,7 +95,7 @@ TEST_IN_CHILD(RegistrarExpert, TheCopyInMemoryGetsTheBareName) {
   EXPECT_EQ(c.pnp(), L"new");
 }
 
-TEST_IN_CHILD(RegistrarExpert, AFailedSaveIsTheResultAndMemoryIsUpToDateAllTheSame) {
+TEST_IN_CHILD(vltPharlapExperts, AFailedSaveIsTheResultAndMemoryIsUpToDateAllTheSame) {
   Installation i;
   i.addObjectExpert("E", "Obj", GText(1));
   LinuxStart r(i);
@@ -108,7 +108,7 @@ TEST_IN_CHILD(RegistrarExpert, AFailedSaveIsTheResultAndMemoryIsUpToDateAllTheSa
 }
 
 // The record in memory is of another type: nothing of the other variant may be touched.
-TEST_IN_CHILD(RegistrarExpert, ARecordOfAnotherTypeUnderTheSameIdentifierDoesNoHarm) {
+TEST_IN_CHILD(vltPharlapExperts, ARecordOfAnotherTypeUnderTheSameIdentifierDoesNoHarm) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "prefix");
   i.addResourceExpert("E", "Res", GText(2), "pnp");
@@ -130,7 +130,7 @@ TEST_IN_CHILD(RegistrarExpert, ARecordOfAnotherTypeUnderTheSameIdentifierDoesNoH
 
 // ---- Reading
 
-TYPED_TEST(RegistrarReading, TheStampIsThatOfTheObject) {
+TYPED_TEST(vltPharlapExpertsReading, TheStampIsThatOfTheObject) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   i.addObjectExpert("E", "Obj", GText(2));
@@ -157,7 +157,7 @@ TYPED_TEST(RegistrarReading, TheStampIsThatOfTheObject) {
   });
 }
 
-TYPED_TEST(RegistrarReading, MissingAndEmptyNumbersHaveTheirDefaults) {
+TYPED_TEST(vltPharlapExpertsReading, MissingAndEmptyNumbersHaveTheirDefaults) {
   Installation i;
   i.addBundle("Data Dictionaries", "A.framework",
               "[KORComponents]\nA = \"A\"\n[A]\nIdentifier = \"" + GText(1) +
@@ -182,7 +182,7 @@ TYPED_TEST(RegistrarReading, MissingAndEmptyNumbersHaveTheirDefaults) {
   });
 }
 
-TYPED_TEST(RegistrarReading, KeysDecideTheType) {
+TYPED_TEST(vltPharlapExpertsReading, KeysDecideTheType) {
   const std::pair<const char*, _vltComponentType> rows[] = {
       {"SchemaVersion = 1\nPnP = \"p\"\n", vltComponentDataDictionary},
       {"schemaversion = 1\n", vltComponentDataDictionary},
@@ -205,7 +205,7 @@ TYPED_TEST(RegistrarReading, KeysDecideTheType) {
   }
 }
 
-TYPED_TEST(RegistrarReading, BadIdentifiersStandUnderTheNullOne) {
+TYPED_TEST(vltPharlapExpertsReading, BadIdentifiersStandUnderTheNullOne) {
   for (const char* identifier : {"words", "", "{790F6A90-E0D8-11D3-AA15-005004D131E}"}) {
     Installation i;
     i.addBundle("Experts", "E.vle",
@@ -220,7 +220,7 @@ TYPED_TEST(RegistrarReading, BadIdentifiersStandUnderTheNullOne) {
   }
 }
 
-TYPED_TEST(RegistrarReading, AListedNameWithoutASectionIsAnObjectExpertWithoutFile) {
+TYPED_TEST(vltPharlapExpertsReading, AListedNameWithoutASectionIsAnObjectExpertWithoutFile) {
   Installation i;
   i.addBundle("Experts", "E.vle", "[KORComponents]\nNowhere = \"Nowhere\"\n");
   ExpectInChild([&] {
@@ -233,7 +233,7 @@ TYPED_TEST(RegistrarReading, AListedNameWithoutASectionIsAnObjectExpertWithoutFi
   });
 }
 
-TYPED_TEST(RegistrarReading, OfTwoSectionsWithOneIdentifierTheLaterIsKept) {
+TYPED_TEST(vltPharlapExpertsReading, OfTwoSectionsWithOneIdentifierTheLaterIsKept) {
   Installation i;
   i.addBundle("Experts", "E.vle",
               "[KORComponents]\nA = \"A\"\nB = \"B\"\n[B]\nIdentifier = \"" + GText(1) +
@@ -248,7 +248,7 @@ TYPED_TEST(RegistrarReading, OfTwoSectionsWithOneIdentifierTheLaterIsKept) {
   });
 }
 
-TYPED_TEST(RegistrarReading, FileNamesWithAnySeparatorStayAsTheyAre) {
+TYPED_TEST(vltPharlapExpertsReading, FileNamesWithAnySeparatorStayAsTheyAre) {
   Installation i;
   i.addBundle("Experts", "E.vle", OneExpert("FileName = \"dir/E.x\"\n"));
   i.addBundle("Experts", "F.vle",
@@ -278,7 +278,7 @@ std::wstring FileOfEmpty(const Installation& i, GUID id) {
   return Wide(ReadBytes(out / "file"));
 }
 
-TEST(RegistrarExpert, AnEmptyFileNameDependsOnTypeAndClass) {
+TEST(vltPharlapExperts, AnEmptyFileNameDependsOnTypeAndClass) {
   Installation i;
   ExpectInChild([&] {
     LinuxStart r(i);
@@ -302,7 +302,7 @@ TEST(RegistrarExpert, AnEmptyFileNameDependsOnTypeAndClass) {
 
 // ---- What clients get
 
-TEST_IN_CHILD(RegistrarClients, GetComponentAnswersByItsCodes) {
+TEST_IN_CHILD(vltPharlapExpertsClients, GetComponentAnswersByItsCodes) {
   Installation i;
   i.addResourceExpert("R", "Res", GText(3), "PNP");
   LinuxStart r(i);
@@ -315,7 +315,7 @@ TEST_IN_CHILD(RegistrarClients, GetComponentAnswersByItsCodes) {
   EXPECT_EQ(a.pnp(), L"PNP");
 }
 
-TEST_IN_CHILD(RegistrarClients, DuplicateCopiesTheTextsOfTheType) {
+TEST_IN_CHILD(vltPharlapExpertsClients, DuplicateCopiesTheTextsOfTheType) {
   Installation i;
   LinuxStart r(i);
   wchar_t one[] = L"one", two[] = L"two";
@@ -340,7 +340,7 @@ TEST_IN_CHILD(RegistrarClients, DuplicateCopiesTheTextsOfTheType) {
   EXPECT_EQ(expert.value.expert.expertWord1, 6);
 }
 
-TEST_IN_CHILD(RegistrarClients, EnumComponentsWantsAPlaceAndLeavesItOnFailure) {
+TEST_IN_CHILD(vltPharlapExpertsClients, EnumComponentsWantsAPlaceAndLeavesItOnFailure) {
   Installation i;
   LinuxStart r(i);
   EXPECT_EQ(r->EnumComponents(vltComponentDataDictionary, nullptr), E_POINTER);
@@ -366,7 +366,7 @@ TEST_IN_CHILD(RegistrarClients, EnumComponentsWantsAPlaceAndLeavesItOnFailure) {
 }
 
 // A bundle that comes while the process runs is known to the next one only.
-TEST(RegistrarClients, ScanLooksAtNothing) {
+TEST(vltPharlapExpertsClients, ScanLooksAtNothing) {
   Installation i;
   ExpectInChild([&] {
     LinuxStart r(i);

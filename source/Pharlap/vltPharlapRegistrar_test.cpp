@@ -47,7 +47,7 @@ void ExpectStripped(const std::basic_string<Char>& text, HRESULT result,
   EXPECT_EQ(std::basic_string<Char>(buffer.c_str()), left);
 }
 
-TEST(RegistrarGuidText, BracesAreCutFromTheWholeFormOnly) {
+TEST(vltPharlapRegistrarGuidText, BracesAreCutFromTheWholeFormOnly) {
   std::string bare = GText(7);
   struct Row {
     std::string text;
@@ -71,7 +71,7 @@ TEST(RegistrarGuidText, BracesAreCutFromTheWholeFormOnly) {
 
 // ---- Interfaces
 
-TEST_IN_CHILD(RegistrarInterfaces, EachAnswersAndForwardsItsReferences) {
+TEST_IN_CHILD(vltPharlapRegistrarInterfaces, EachAnswersAndForwardsItsReferences) {
   Installation i;
   LinuxStart r(i);
   void* out = nullptr;
@@ -98,7 +98,7 @@ TEST_IN_CHILD(RegistrarInterfaces, EachAnswersAndForwardsItsReferences) {
 }
 
 // The side interfaces are called through their own tables, which must lead to the registrar's operations.
-TEST_IN_CHILD(RegistrarInterfaces, SideInterfacesReachTheirOperations) {
+TEST_IN_CHILD(vltPharlapRegistrarInterfaces, SideInterfacesReachTheirOperations) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   LinuxStart r(i);
@@ -117,7 +117,7 @@ TEST_IN_CHILD(RegistrarInterfaces, SideInterfacesReachTheirOperations) {
   EXPECT_EQ(Bound(*r, vltComponentObjectExpert, G(9), VLT_E_NO_COMPONENT).size(), 0u);
 }
 
-TEST_IN_CHILD(RegistrarInterfaces, WhatIsNotKeptHereFailsAndTouchesNothing) {
+TEST_IN_CHILD(vltPharlapRegistrarInterfaces, WhatIsNotKeptHereFailsAndTouchesNothing) {
   Installation i;
   LinuxStart r(i);
   wchar_t here[] = L"x";
@@ -138,7 +138,7 @@ TEST_IN_CHILD(RegistrarInterfaces, WhatIsNotKeptHereFailsAndTouchesNothing) {
 
 // ---- Settings
 
-TEST_IN_CHILD(RegistrarSettings, SchemaVersionIsWrittenWhenItDiffersOnly) {
+TEST_IN_CHILD(vltPharlapRegistrarSettings, SchemaVersionIsWrittenWhenItDiffersOnly) {
   Installation i;
   SaveCounter saves(i.root(), "vlt.vlr");
   LinuxStart r(i);
@@ -164,7 +164,7 @@ TEST_IN_CHILD(RegistrarSettings, SchemaVersionIsWrittenWhenItDiffersOnly) {
   EXPECT_EQ(saves.count(), before);
 }
 
-TEST_IN_CHILD(RegistrarSettings, WhatCannotBeReadIsTheDefault) {
+TEST_IN_CHILD(vltPharlapRegistrarSettings, WhatCannotBeReadIsTheDefault) {
   Installation i;
   LinuxStart r(i);
   unsigned number = 7;
@@ -184,7 +184,7 @@ TEST_IN_CHILD(RegistrarSettings, WhatCannotBeReadIsTheDefault) {
   EXPECT_EQ(number, 0u);
 }
 
-TEST(RegistrarSettings, CacheSizeIsWrittenEachTimeAndOutlivesTheProcess) {
+TEST(vltPharlapRegistrarSettings, CacheSizeIsWrittenEachTimeAndOutlivesTheProcess) {
   Installation i;
   SaveCounter saves(i.root(), "vlt.vlr");
   ExpectInChild([&] {
@@ -204,7 +204,7 @@ TEST(RegistrarSettings, CacheSizeIsWrittenEachTimeAndOutlivesTheProcess) {
   });
 }
 
-TEST(RegistrarSettings, SchemaVersionIsZeroAgainAtEachStart) {
+TEST(vltPharlapRegistrarSettings, SchemaVersionIsZeroAgainAtEachStart) {
   Installation i;
   ExpectInChild([&] {
     LinuxStart r(i);
@@ -218,7 +218,7 @@ TEST(RegistrarSettings, SchemaVersionIsZeroAgainAtEachStart) {
   });
 }
 
-TEST_IN_CHILD(RegistrarSettings, ConfigurationPathForms) {
+TEST_IN_CHILD(vltPharlapRegistrarSettings, ConfigurationPathForms) {
   Installation i;
   LinuxStart r(i);
   std::wstring data = Wide(i.root()) + L"/Data/";
@@ -242,7 +242,7 @@ TEST_IN_CHILD(RegistrarSettings, ConfigurationPathForms) {
   EXPECT_EQ(get(), data + L"Config3.VLT");
 }
 
-TEST_IN_CHILD(RegistrarSettings, ConfigurationPathIsWrittenWhenItDiffersBeyondCase) {
+TEST_IN_CHILD(vltPharlapRegistrarSettings, ConfigurationPathIsWrittenWhenItDiffersBeyondCase) {
   Installation i;
   SaveCounter saves(i.root(), "vlt.vlr");
   LinuxStart r(i);
@@ -257,7 +257,7 @@ TEST_IN_CHILD(RegistrarSettings, ConfigurationPathIsWrittenWhenItDiffersBeyondCa
 }
 
 // The next start puts its own path back, as the stored one differs from it.
-TEST(RegistrarSettings, ConfigurationPathIsThatOfTheRootAtEachStart) {
+TEST(vltPharlapRegistrarSettings, ConfigurationPathIsThatOfTheRootAtEachStart) {
   Installation i;
   ExpectInChild([&] {
     LinuxStart r(i);
@@ -267,7 +267,7 @@ TEST(RegistrarSettings, ConfigurationPathIsThatOfTheRootAtEachStart) {
   EXPECT_EQ(DatabaseText(i.database()).quoted("KOR", "ConfigFile"), i.root() + "/Data/config3.vlt");
 }
 
-TEST_IN_CHILD(RegistrarSettings, ALongConfigurationPathIsKeptWhole) {
+TEST_IN_CHILD(vltPharlapRegistrarSettings, ALongConfigurationPathIsKeptWhole) {
   Installation i;
   std::wstring path = L"/" + std::wstring(70000, L'p');
   LinuxStart r(i);
@@ -278,7 +278,7 @@ TEST_IN_CHILD(RegistrarSettings, ALongConfigurationPathIsKeptWhole) {
 }
 
 // A bare name in a process that has no right to make the missing data directory.
-TEST(RegistrarSettings, ABareNameIsHandedOutEvenWithAFailure) {
+TEST(vltPharlapRegistrarSettings, ABareNameIsHandedOutEvenWithAFailure) {
   if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
   Installation i;
   OpenUp(i);
@@ -296,7 +296,7 @@ TEST(RegistrarSettings, ABareNameIsHandedOutEvenWithAFailure) {
 
 // ---- Start
 
-TEST(RegistrarStart, MakesDirectoriesAndFilesOpenToAllWhateverTheUmask) {
+TEST(vltPharlapRegistrarStart, MakesDirectoriesAndFilesOpenToAllWhateverTheUmask) {
   Installation i;
   ScopedUmask mask(077);
   ASSERT_EQ(StartOnce(i), 0);
@@ -308,7 +308,7 @@ TEST(RegistrarStart, MakesDirectoriesAndFilesOpenToAllWhateverTheUmask) {
   EXPECT_EQ(Entries(i.root() + "/Data").size(), 0u);
 }
 
-TEST(RegistrarStart, LeavesTheModesOfDirectoriesThatAreThere) {
+TEST(vltPharlapRegistrarStart, LeavesTheModesOfDirectoriesThatAreThere) {
   Installation i;
   for (const char* name : {"/Data", "/Data Dictionaries", "/Experts"}) {
     ASSERT_EQ(mkdir((i.root() + name).c_str(), 0750), 0);
@@ -319,7 +319,7 @@ TEST(RegistrarStart, LeavesTheModesOfDirectoriesThatAreThere) {
   }
 }
 
-TEST_IN_CHILD(RegistrarStart, WritesTheBuiltInDictionary) {
+TEST_IN_CHILD(vltPharlapRegistrarStart, WritesTheBuiltInDictionary) {
   Installation i;
   ASSERT_EQ(StartOnce(i), 0);
   DatabaseText db(i.database());
@@ -344,7 +344,7 @@ TEST_IN_CHILD(RegistrarStart, WritesTheBuiltInDictionary) {
   EXPECT_EQ(d.value.dictionary.lastInstalledSchemaVersion, 0u);
 }
 
-TEST(RegistrarStart, WithoutADirectoryTheNamesStayBare) {
+TEST(vltPharlapRegistrarStart, WithoutADirectoryTheNamesStayBare) {
   Installation i;
   Installation::setDir("");
   ExpectInChild([&] {
@@ -364,7 +364,7 @@ TEST(RegistrarStart, WithoutADirectoryTheNamesStayBare) {
   EXPECT_EQ(Entries(i.root()), (std::vector<std::string>{"vlt.vl5", "vlt.vlr"}));
 }
 
-TEST(RegistrarStart, MissingRightsToMakeDirectoriesAreSwallowed) {
+TEST(vltPharlapRegistrarStart, MissingRightsToMakeDirectoriesAreSwallowed) {
   if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
   Installation i;
   OpenUp(i);
@@ -382,7 +382,7 @@ TEST(RegistrarStart, MissingRightsToMakeDirectoriesAreSwallowed) {
   EXPECT_EQ(ModeOf(place / "vlt.vlr"), 0777);
 }
 
-TEST_IN_CHILD(RegistrarStart, AFileInADirectorysPlaceIsRaisedAndFreesTheLock) {
+TEST_IN_CHILD(vltPharlapRegistrarStart, AFileInADirectorysPlaceIsRaisedAndFreesTheLock) {
   Installation i;
   WriteBytes(i.root() + "/Data", "in the way");
   EXPECT_THROW(LinuxStart r(i), zt::fnd::exception::ObjectAlreadyExists);
@@ -394,7 +394,7 @@ TEST_IN_CHILD(RegistrarStart, AFileInADirectorysPlaceIsRaisedAndFreesTheLock) {
 // ---- Freeing
 
 // Whether texts are freed shows to the leak check of InChild, and to AddressSanitizer if twice.
-TEST_IN_CHILD(RegistrarStart, ItsEndFreesTheTextsOfComponentsThatKeepTheirsElsewhere) {
+TEST_IN_CHILD(vltPharlapRegistrarStart, ItsEndFreesTheTextsOfComponentsThatKeepTheirsElsewhere) {
   Installation i;
   i.addResourceExpert("M", "Motion Expert Driver", GText(4), "PNP\\4");
   LinuxStart r(i);

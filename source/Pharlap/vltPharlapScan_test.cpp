@@ -30,7 +30,7 @@ DatabaseText AfterStart(const Installation& i) {
 
 // ---- Finding
 
-TEST_IN_CHILD(RegistrarFind, DictionariesComeFirstWithTheirTimesInWholeSeconds) {
+TEST_IN_CHILD(vltPharlapScanFind, DictionariesComeFirstWithTheirTimesInWholeSeconds) {
   Installation i;
   std::string expert = i.addObjectExpert("E", "Exp", GText(2));
   std::string dictionary = i.addDictionary("D", "Dict", GText(1), 3, "d");
@@ -49,7 +49,7 @@ TEST_IN_CHILD(RegistrarFind, DictionariesComeFirstWithTheirTimesInWholeSeconds) 
   EXPECT_EQ(files[1].second.toLKTIME(true) % 10000000, 0);
 }
 
-TEST_IN_CHILD(RegistrarFind, BundlesAreListedInTheOrderOfTheDirectory) {
+TEST_IN_CHILD(vltPharlapScanFind, BundlesAreListedInTheOrderOfTheDirectory) {
   Installation i;
   for (int n = 0; n < 20; ++n) {
     i.addObjectExpert("E" + std::to_string(n), "Exp" + std::to_string(n), GText(n));
@@ -68,7 +68,7 @@ TEST_IN_CHILD(RegistrarFind, BundlesAreListedInTheOrderOfTheDirectory) {
 }
 
 // Masks fold case, the path inside the bundle does not.
-TEST_IN_CHILD(RegistrarFind, WhatIsNoBundleIsSkipped) {
+TEST_IN_CHILD(vltPharlapScanFind, WhatIsNoBundleIsSkipped) {
   Installation i;
   fs::create_directories(i.root() + "/Experts/empty.vle/Resources");
   fs::create_directories(i.root() + "/Experts/bare.vle");
@@ -88,7 +88,7 @@ TEST_IN_CHILD(RegistrarFind, WhatIsNoBundleIsSkipped) {
   EXPECT_EQ(files[0].first.exactCompare(S(found)), 0);
 }
 
-TEST_IN_CHILD(RegistrarFind, BundlesMayBeReachedThroughLinks) {
+TEST_IN_CHILD(vltPharlapScanFind, BundlesMayBeReachedThroughLinks) {
   Installation i;
   TempDir elsewhere;
   fs::create_directories(elsewhere / "real/Resources");
@@ -102,7 +102,7 @@ TEST_IN_CHILD(RegistrarFind, BundlesMayBeReachedThroughLinks) {
   EXPECT_EQ(Find(*r, G(1)), S_OK);
 }
 
-TEST_IN_CHILD(RegistrarFind, LinksThatGoInCirclesAreSkipped) {
+TEST_IN_CHILD(vltPharlapScanFind, LinksThatGoInCirclesAreSkipped) {
   Installation i;
   i.addObjectExpert("E", "Exp", GText(2));
   fs::create_symlink("loop.vle", i.root() + "/Experts/loop.vle");
@@ -114,7 +114,7 @@ TEST_IN_CHILD(RegistrarFind, LinksThatGoInCirclesAreSkipped) {
 
 // ---- Merging
 
-TEST(RegistrarMerge, FileNamesBecomePathsBelowTheInstallDirectory) {
+TEST(vltPharlapScanMerge, FileNamesBecomePathsBelowTheInstallDirectory) {
   struct Row {
     bool dictionary;
     std::string given, stored;
@@ -157,7 +157,7 @@ TEST(RegistrarMerge, FileNamesBecomePathsBelowTheInstallDirectory) {
   }
 }
 
-TEST(RegistrarMerge, IdentifiersLoseTheirBracesOnly) {
+TEST(vltPharlapScanMerge, IdentifiersLoseTheirBracesOnly) {
   std::string bare = GText(5);
   const std::pair<std::string, std::string> rows[] = {{bare, bare},
                                                       {"{" + bare + "}", bare},
@@ -173,7 +173,7 @@ TEST(RegistrarMerge, IdentifiersLoseTheirBracesOnly) {
   }
 }
 
-TEST(RegistrarMerge, CopiesEverySectionQuotedAndKeepsWhatItDoesNotKnow) {
+TEST(vltPharlapScanMerge, CopiesEverySectionQuotedAndKeepsWhatItDoesNotKnow) {
   Installation i;
   i.addBundle("Experts", "E.vle",
               "[Extra]\nnumber = 5\ntext = \"a\\tb \\q\\x41\"\n[KORComponents]\nE = \"E\"\n"
@@ -187,7 +187,7 @@ TEST(RegistrarMerge, CopiesEverySectionQuotedAndKeepsWhatItDoesNotKnow) {
   EXPECT_EQ(db.quoted(kContents, "E"), InfoOf(i, "Experts/E.vle"));
 }
 
-TEST(RegistrarMerge, ADictionaryIsMarkedAsChangedBehindItsItems) {
+TEST(vltPharlapScanMerge, ADictionaryIsMarkedAsChangedBehindItsItems) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   i.addObjectExpert("E", "Exp", GText(2));
@@ -202,7 +202,7 @@ TEST(RegistrarMerge, ADictionaryIsMarkedAsChangedBehindItsItems) {
 }
 
 // The value of the list's item names the component for the contents, its name for the start.
-TEST_IN_CHILD(RegistrarMerge, ValueAndNameOfTheListServeDifferentEnds) {
+TEST_IN_CHILD(vltPharlapScanMerge, ValueAndNameOfTheListServeDifferentEnds) {
   Installation i;
   i.addBundle("Experts", "E.vle",
               "[korcomponents]\nName = \"Value\"\n[Name]\nIdentifier = \"" + GText(1) +
@@ -216,7 +216,7 @@ TEST_IN_CHILD(RegistrarMerge, ValueAndNameOfTheListServeDifferentEnds) {
   EXPECT_EQ(Find(*r, G(2)), E_INVALIDARG);
 }
 
-TEST(RegistrarMerge, OfTwoFilesWithOneSectionTheLaterWinsKeyByKey) {
+TEST(vltPharlapScanMerge, OfTwoFilesWithOneSectionTheLaterWinsKeyByKey) {
   Installation i;
   i.addBundle(kDictionaries, "D.framework",
               "[KORComponents]\nX = \"X\"\n[X]\nOnlyFirst = 1\nBoth = 1\n");
@@ -228,7 +228,7 @@ TEST(RegistrarMerge, OfTwoFilesWithOneSectionTheLaterWinsKeyByKey) {
   EXPECT_EQ(db.quoted(kContents, "X"), InfoOf(i, "Experts/E.vle"));
 }
 
-TEST_IN_CHILD(RegistrarMerge, AFileWithoutSectionsCounts) {
+TEST_IN_CHILD(vltPharlapScanMerge, AFileWithoutSectionsCounts) {
   Installation i;
   std::string file = i.addBundle("Experts", "E.vle", "");
   DatabaseText db = AfterStart(i);
@@ -237,7 +237,7 @@ TEST_IN_CHILD(RegistrarMerge, AFileWithoutSectionsCounts) {
   EXPECT_EQ(r->MergeRegistrationFile(S(i.root() + "/"), file.c_str()), S_OK);
 }
 
-TEST(RegistrarMerge, OpensTheFileUpButNotThroughALink) {
+TEST(vltPharlapScanMerge, OpensTheFileUpButNotThroughALink) {
   Installation i;
   std::string file = i.addObjectExpert("E", "Exp", GText(2));
   chmod(file.c_str(), 0600);

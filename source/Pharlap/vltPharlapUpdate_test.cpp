@@ -26,7 +26,7 @@ DatabaseText AfterStart(const Installation& i) {
 
 // ---- Bringing up to date
 
-TEST(RegistrarUpdate, SavesOncePerChangedFile) {
+TEST(vltPharlapUpdate, SavesOncePerChangedFile) {
   Installation i;
   SaveCounter saves(i.root(), "vlt.vlr");
   std::string a = i.addDictionary("D", "Dict", GText(1), 3, "d");
@@ -41,7 +41,7 @@ TEST(RegistrarUpdate, SavesOncePerChangedFile) {
   EXPECT_EQ(saves.count(), 8);
 }
 
-TEST(RegistrarUpdate, AnyOtherTimeStampMergesAgain) {
+TEST(vltPharlapUpdate, AnyOtherTimeStampMergesAgain) {
   for (time_t shift : {1, -1, 86400 * 365, -86400 * 365 * 40}) {
     Installation i;
     std::string file = i.addDictionary("D", "Dict", GText(1), 3, "d");
@@ -58,7 +58,7 @@ TEST(RegistrarUpdate, AnyOtherTimeStampMergesAgain) {
   }
 }
 
-TEST(RegistrarUpdate, AnUnchangedFileIsNotReadAgain) {
+TEST(vltPharlapUpdate, AnUnchangedFileIsNotReadAgain) {
   Installation i;
   std::string file = i.addDictionary("D", "Dict", GText(1), 3, "d");
   ASSERT_EQ(StartOnce(i), 0);
@@ -69,7 +69,7 @@ TEST(RegistrarUpdate, AnUnchangedFileIsNotReadAgain) {
   EXPECT_FALSE(db.has("Other"));
 }
 
-TEST(RegistrarUpdate, WhatAChangedFileNoLongerBringsIsGone) {
+TEST(vltPharlapUpdate, WhatAChangedFileNoLongerBringsIsGone) {
   Installation i;
   std::string file = i.addBundle("Experts", "E.vle",
                                  "[KORComponents]\nA = \"A\"\nB = \"B\"\n[A]\nKey = 1\nOld = 1\n"
@@ -84,7 +84,7 @@ TEST(RegistrarUpdate, WhatAChangedFileNoLongerBringsIsGone) {
   EXPECT_FALSE(db.raw(kContents, "B"));
 }
 
-TEST(RegistrarUpdate, AStampThatCannotBeReadMergesAgain) {
+TEST(vltPharlapUpdate, AStampThatCannotBeReadMergesAgain) {
   for (const char* stamp : {"\"\"", "\"words\"", "\"682648576\"", "\"4977615872 31291819\""}) {
     Installation i;
     std::string file = i.addDictionary("D", "Dict", GText(1), 3, "d");
@@ -100,7 +100,7 @@ TEST(RegistrarUpdate, AStampThatCannotBeReadMergesAgain) {
 }
 
 // A run of pieces that was left unjoined loses its last piece only.
-TEST(RegistrarUpdate, OfAnItemInPiecesOnlyTheLastPieceGoes) {
+TEST(vltPharlapUpdate, OfAnItemInPiecesOnlyTheLastPieceGoes) {
   Installation i;
   std::string file = i.addObjectExpert("E", "Exp", GText(2));
   ExpectInChild([&] {
@@ -122,7 +122,7 @@ TEST(RegistrarUpdate, OfAnItemInPiecesOnlyTheLastPieceGoes) {
 
 // Items that an earlier file of the same start has brought count for the new files behind it. Dictionaries
 // come before experts.
-TEST(RegistrarUpdate, ANewFileErasesWhatWasEnteredUnderItsNameJustBefore) {
+TEST(vltPharlapUpdate, ANewFileErasesWhatWasEnteredUnderItsNameJustBefore) {
   for (const char* pieces :
        {"Planted = \"%s%s\"\n", "Planted Line0002 = \"%s\"\nPlanted Line0003 = \"%s\"\n"}) {
     Installation i;
@@ -142,7 +142,7 @@ TEST(RegistrarUpdate, ANewFileErasesWhatWasEnteredUnderItsNameJustBefore) {
 }
 
 // Paths that differ in case only are one file to the database.
-TEST(RegistrarUpdate, OfTwoNewFilesWithOneNameTheLaterStays) {
+TEST(vltPharlapUpdate, OfTwoNewFilesWithOneNameTheLaterStays) {
   Installation i;
   std::string one = i.addObjectExpert("Twin", "A", GText(1));
   std::string two = i.addObjectExpert("TWIN", "B", GText(2));
@@ -156,7 +156,8 @@ TEST(RegistrarUpdate, OfTwoNewFilesWithOneNameTheLaterStays) {
 
 // ---- Removing
 
-TEST(RegistrarRemove, AVanishedFileTakesItsComponentsInMemoryAndTheDiskFollowsWithTheNextSave) {
+TEST(vltPharlapUpdateRemove,
+     AVanishedFileTakesItsComponentsInMemoryAndTheDiskFollowsWithTheNextSave) {
   Installation i;
   i.addObjectExpert("E", "Exp", GText(2));
   std::string gone = i.addObjectExpert("F", "Gone", GText(3));
@@ -180,7 +181,7 @@ TEST(RegistrarRemove, AVanishedFileTakesItsComponentsInMemoryAndTheDiskFollowsWi
 }
 
 // The start itself saves before the removal, never behind it.
-TEST(RegistrarRemove, AStartWithNothingElseChangedLeavesItOnTheDiskForGood) {
+TEST(vltPharlapUpdateRemove, AStartWithNothingElseChangedLeavesItOnTheDiskForGood) {
   Installation i;
   i.addObjectExpert("F", "Gone", GText(3));
   ASSERT_EQ(StartOnce(i), 0);
@@ -192,7 +193,7 @@ TEST(RegistrarRemove, AStartWithNothingElseChangedLeavesItOnTheDiskForGood) {
   EXPECT_EQ(ReadBytes(i.database()), before);
 }
 
-TEST_IN_CHILD(RegistrarRemove, ABundleWithoutItsFileHasGone) {
+TEST_IN_CHILD(vltPharlapUpdateRemove, ABundleWithoutItsFileHasGone) {
   Installation i;
   std::string file = i.addDictionary("a", "Dict", GText(1), 3, "d");
   ASSERT_EQ(StartOnce(i), 0);
@@ -202,7 +203,7 @@ TEST_IN_CHILD(RegistrarRemove, ABundleWithoutItsFileHasGone) {
   EXPECT_EQ(Find(*r, kVltdd), S_OK);
 }
 
-TEST(RegistrarRemove, AFileOrALoopInTheBundlesPlaceCountsAsGone) {
+TEST(vltPharlapUpdateRemove, AFileOrALoopInTheBundlesPlaceCountsAsGone) {
   for (bool loop : {false, true}) {
     Installation i;
     i.addDictionary("a", "Dict", GText(1), 3, "d");
@@ -224,7 +225,7 @@ TEST(RegistrarRemove, AFileOrALoopInTheBundlesPlaceCountsAsGone) {
 }
 
 // Whatever became of its code.
-TEST(RegistrarRemove, TheRegistrationFileDecidesNotTheComponents) {
+TEST(vltPharlapUpdateRemove, TheRegistrationFileDecidesNotTheComponents) {
   Installation i;
   i.addBundle("Experts", "E.vle",
               "[KORComponents]\nE = \"E\"\n[E]\nIdentifier = \"" + GText(1) +
@@ -237,7 +238,7 @@ TEST(RegistrarRemove, TheRegistrationFileDecidesNotTheComponents) {
   }
 }
 
-TEST_IN_CHILD(RegistrarRemove, ErasesBothNamesOfTheFileAndListsEachPiece) {
+TEST_IN_CHILD(vltPharlapUpdateRemove, ErasesBothNamesOfTheFileAndListsEachPiece) {
   Installation i;
   LinuxStart r(i);
   CvlIniMgr& db = r->database();
@@ -266,7 +267,7 @@ TEST_IN_CHILD(RegistrarRemove, ErasesBothNamesOfTheFileAndListsEachPiece) {
   EXPECT_EQ(db.GetNumberOfItems(kContents), 0);
 }
 
-TEST_IN_CHILD(RegistrarRemove, AnExistingFileLeavesEverything) {
+TEST_IN_CHILD(vltPharlapUpdateRemove, AnExistingFileLeavesEverything) {
   Installation i;
   std::string file = i.addObjectExpert("E", "Exp", GText(2));
   LinuxStart r(i);
@@ -280,7 +281,7 @@ TEST_IN_CHILD(RegistrarRemove, AnExistingFileLeavesEverything) {
 
 // ---- Files that cannot be used
 
-TEST(RegistrarUnreadable, AFileThatCannotBeParsedIsSetAsideWithItsComponents) {
+TEST(vltPharlapUpdateUnreadable, AFileThatCannotBeParsedIsSetAsideWithItsComponents) {
   Installation i;
   std::string file = i.addObjectExpert("E", "Exp", GText(2));
   ASSERT_EQ(StartOnce(i), 0);
@@ -302,7 +303,7 @@ TEST(RegistrarUnreadable, AFileThatCannotBeParsedIsSetAsideWithItsComponents) {
   ASSERT_EQ(StartOnce(i), 0);
 }
 
-TEST(RegistrarUnreadable, WhatCannotBeOpenedJustNowStaysAndIsTriedAgain) {
+TEST(vltPharlapUpdateUnreadable, WhatCannotBeOpenedJustNowStaysAndIsTriedAgain) {
   if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
   Installation i;
   chmod(fs::path(i.root()).parent_path().c_str(), 0755);

@@ -29,7 +29,7 @@ std::string TwoExperts(const std::string& first, const std::string& second) {
 
 // ---- Filling the maps
 
-TEST_IN_CHILD(RegistrarBinding, ClassesOfBothTypesAnswerByType) {
+TEST_IN_CHILD(vltLinuxRegistrar, ClassesOfBothTypesAnswerByType) {
   Installation i;
   i.addObjectExpert("O", "Obj", GText(1), B(1) + ":2:" + B(8) + ":" + B(9));
   i.addResourceExpert("R", "Res", GText(2), "PNP", B(2) + ":1:" + B(8));
@@ -40,7 +40,7 @@ TEST_IN_CHILD(RegistrarBinding, ClassesOfBothTypesAnswerByType) {
   Bound(*r, vltComponentResourceExpert, G(9), VLT_E_NO_COMPONENT);
 }
 
-TEST_IN_CHILD(RegistrarBinding, AClassOfTwoExpertsAnswersWithBoth) {
+TEST_IN_CHILD(vltLinuxRegistrar, AClassOfTwoExpertsAnswersWithBoth) {
   Installation i;
   i.addObjectExpert("O", "Obj", GText(1), B(1) + ":1:" + B(8));
   i.addObjectExpert("P", "Obj2", GText(2), B(2) + ":1:" + B(8));
@@ -50,7 +50,7 @@ TEST_IN_CHILD(RegistrarBinding, AClassOfTwoExpertsAnswersWithBoth) {
   EXPECT_TRUE(Same(found, {G(1), G(2)}));
 }
 
-TEST_IN_CHILD(RegistrarBinding, OtherTypesAndNullsAreToldApart) {
+TEST_IN_CHILD(vltLinuxRegistrar, OtherTypesAndNullsAreToldApart) {
   Installation i;
   LinuxStart r(i);
   for (int type : {0, 2, 6, 7, 99}) {
@@ -71,7 +71,7 @@ TEST_IN_CHILD(RegistrarBinding, OtherTypesAndNullsAreToldApart) {
   EXPECT_EQ(count, 7u);
 }
 
-TEST_IN_CHILD(RegistrarBinding, TwoExpertsOfOneFileShareOneTable) {
+TEST_IN_CHILD(vltLinuxRegistrar, TwoExpertsOfOneFileShareOneTable) {
   Installation i;
   i.addBundle("Experts", "One.vle", TwoExperts(B(1) + ":1:" + B(8), B(2) + ":1:" + B(9)));
   LinuxStart r(i);
@@ -80,7 +80,7 @@ TEST_IN_CHILD(RegistrarBinding, TwoExpertsOfOneFileShareOneTable) {
   EXPECT_TRUE(Same(Bound(*r, vltComponentResourceExpert, G(9)), {G(2)}));
 }
 
-TEST_IN_CHILD(RegistrarBinding, TheTextOfOneComponentMaySpeakForAnother) {
+TEST_IN_CHILD(vltLinuxRegistrar, TheTextOfOneComponentMaySpeakForAnother) {
   Installation i;
   i.addBundle("Experts", "One.vle",
               TwoExperts("", B(2) + ":1:" + B(9) + ":" + B(1) + ":1:" + B(8)));
@@ -90,7 +90,7 @@ TEST_IN_CHILD(RegistrarBinding, TheTextOfOneComponentMaySpeakForAnother) {
 }
 
 // By base name, over all components: another directory makes another table of the same text.
-TEST_IN_CHILD(RegistrarBinding, TextsAreFoundByBaseName) {
+TEST_IN_CHILD(vltLinuxRegistrar, TextsAreFoundByBaseName) {
   Installation i;
   i.addBundle("Experts", "a.vle",
               "[KORComponents]\nA = \"A\"\n[A]\nIdentifier = \"" + GText(1) +
@@ -104,7 +104,7 @@ TEST_IN_CHILD(RegistrarBinding, TextsAreFoundByBaseName) {
   EXPECT_TRUE(Same(Bound(*r, vltComponentObjectExpert, G(8)), {G(1)}));
 }
 
-TEST_IN_CHILD(RegistrarBinding, AComponentOutsideItsFilesTableEntersNothing) {
+TEST_IN_CHILD(vltLinuxRegistrar, AComponentOutsideItsFilesTableEntersNothing) {
   Installation i;
   i.addObjectExpert("O", "Obj", GText(1), B(5) + ":1:" + B(8));
   LinuxStart r(i);
@@ -115,7 +115,7 @@ TEST_IN_CHILD(RegistrarBinding, AComponentOutsideItsFilesTableEntersNothing) {
   EXPECT_EQ(r->PopulateBindingClasses(&o.value), S_OK);
 }
 
-TEST_IN_CHILD(RegistrarBinding, WithoutATextAnExpertIsAnExpert) {
+TEST_IN_CHILD(vltLinuxRegistrar, WithoutATextAnExpertIsAnExpert) {
   Installation i;
   i.addBundle("Experts", "O.vle",
               "[KORComponents]\nObj = \"Obj\"\n[Obj]\nIdentifier = \"" + GText(1) +
@@ -132,7 +132,7 @@ TEST_IN_CHILD(RegistrarBinding, WithoutATextAnExpertIsAnExpert) {
 }
 
 // The text is cut at 1023 bytes, in the middle of a GUID: what is whole counts.
-TEST_IN_CHILD(RegistrarBinding, ATextBeyondItsLimitIsCut) {
+TEST_IN_CHILD(vltLinuxRegistrar, ATextBeyondItsLimitIsCut) {
   Installation i;
   std::string text = B(1) + ":60";
   for (uint32_t n = 100; n < 160; ++n) text += ":" + B(n);
@@ -148,7 +148,7 @@ TEST_IN_CHILD(RegistrarBinding, ATextBeyondItsLimitIsCut) {
 
 // ---- Registration
 
-TEST(RegistrarBinding, RegistrationKeepsTheBracesAndWritesNoClassesOfAnUnknownFile) {
+TEST(vltLinuxRegistrar, RegistrationKeepsTheBracesAndWritesNoClassesOfAnUnknownFile) {
   Installation i;
   ExpectInChild([&] {
     LinuxStart r(i);
@@ -165,7 +165,7 @@ TEST(RegistrarBinding, RegistrationKeepsTheBracesAndWritesNoClassesOfAnUnknownFi
                                                   {"PnP", "\"pnp\""}}));
 }
 
-TEST(RegistrarBinding, RegistrationRepeatsTheClassAtTheComponentsPosition) {
+TEST(vltLinuxRegistrar, RegistrationRepeatsTheClassAtTheComponentsPosition) {
   Installation i;
   // The second component of the table, in GUID order: position 1 of its three classes.
   std::string table = B(1) + ":1:" + B(7) + ":" + B(2) + ":3:" + B(10) + ":" + B(11) + ":" + B(12);
@@ -184,7 +184,7 @@ TEST(RegistrarBinding, RegistrationRepeatsTheClassAtTheComponentsPosition) {
                                                          ":" + B(11) + "\""}}));
 }
 
-TEST(RegistrarBinding, APositionBeyondTheClassesIsRaisedAndTheDatabaseStaysUsable) {
+TEST(vltLinuxRegistrar, APositionBeyondTheClassesIsRaisedAndTheDatabaseStaysUsable) {
   Installation i;
   i.addObjectExpert("One", "Obj", GText(2), B(1) + ":0:" + B(2) + ":1:" + B(7));
   ExpectInChild([&] {
@@ -212,7 +212,7 @@ TEST(RegistrarBinding, APositionBeyondTheClassesIsRaisedAndTheDatabaseStaysUsabl
   });
 }
 
-TEST(RegistrarBinding, AComponentWithoutClassesIsWrittenWithItsCount) {
+TEST(vltLinuxRegistrar, AComponentWithoutClassesIsWrittenWithItsCount) {
   Installation i;
   i.addObjectExpert("One", "Obj", GText(2), B(1) + ":0:" + B(2) + ":0");
   ExpectInChild([&] {
@@ -224,7 +224,7 @@ TEST(RegistrarBinding, AComponentWithoutClassesIsWrittenWithItsCount) {
 }
 
 // The table is looked up by the whole path, in the spelling it was read with.
-TEST(RegistrarBinding, RegistrationLooksTheFileUpAsItIsGiven) {
+TEST(vltLinuxRegistrar, RegistrationLooksTheFileUpAsItIsGiven) {
   Installation i;
   i.addObjectExpert("One", "Obj", GText(2), B(2) + ":1:" + B(7));
   ExpectInChild([&] {
@@ -239,7 +239,7 @@ TEST(RegistrarBinding, RegistrationLooksTheFileUpAsItIsGiven) {
 }
 
 // Its bare name is still on the disk when the next start asks for the text.
-TEST(RegistrarBinding, TheStartAfterARegistrationFindsTheClassesAgain) {
+TEST(vltLinuxRegistrar, TheStartAfterARegistrationFindsTheClassesAgain) {
   Installation i;
   i.addObjectExpert("One", "Obj", GText(2), B(2) + ":1:" + B(7));
   ExpectInChild([&] {

@@ -42,7 +42,7 @@ void MakeLibrary(const std::string& file, const std::string& entry, bool otherWo
   ASSERT_EQ(built.exitCode, 0) << built.err;
 }
 
-class Check : public testing::Test {
+class vltCheck : public testing::Test {
  protected:
   HRESULT check(_vltComponentType type, const std::string& file, const wchar_t* prefix = nullptr,
                 const std::string& aux = "") {
@@ -63,7 +63,7 @@ class Check : public testing::Test {
   vltErrors errors;
 };
 
-TEST_F(Check, ADictionarysLastFileDecides) {
+TEST_F(vltCheck, ADictionarysLastFileDecides) {
   WriteBytes(dir / "prefix", "");
   WriteBytes(dir / "aux", "");
   std::string missing = dir / "missing";
@@ -74,12 +74,12 @@ TEST_F(Check, ADictionarysLastFileDecides) {
   EXPECT_EQ(check(vltComponentDataDictionary, dir / "aux", nullptr, missing), E_FAIL);
 }
 
-TEST_F(Check, APrefixThatIsNoPathDoesNotExist) {
+TEST_F(vltCheck, APrefixThatIsNoPathDoesNotExist) {
   EXPECT_EQ(check(vltComponentDataDictionary, "", L"vl"), E_FAIL);
   EXPECT_EQ(Texts(errors), Messages{"the dictionary \"vl\" is registered but does not exist"});
 }
 
-TEST_F(Check, FilesBelowAFileAndDirectoriesDoNotExist) {
+TEST_F(vltCheck, FilesBelowAFileAndDirectoriesDoNotExist) {
   WriteBytes(dir / "file", "");
   EXPECT_EQ(check(vltComponentDataDictionary, dir / "file/x"), E_FAIL);
   EXPECT_EQ(check(vltComponentDataDictionary, dir.path()), E_FAIL);
@@ -87,7 +87,7 @@ TEST_F(Check, FilesBelowAFileAndDirectoriesDoNotExist) {
   EXPECT_NE(Texts(errors)[0].find("does not exist"), std::string::npos);
 }
 
-TEST_F(Check, AnUnreadableFileIsTold) {
+TEST_F(vltCheck, AnUnreadableFileIsTold) {
   if (geteuid() != 0) GTEST_SKIP() << "needs root, to have files of two users";
   WriteBytes(dir / "file", "");
   ASSERT_EQ(chmod((dir / "file").c_str(), 0600), 0);
@@ -107,7 +107,7 @@ std::string NotReadable(const std::string& word, const std::string& file) {
   return "the " + word + " \"" + file + "\" is registered but is not readable";
 }
 
-TEST_F(Check, APathThatCannotBeLookedAtIsNotReadable) {
+TEST_F(vltCheck, APathThatCannotBeLookedAtIsNotReadable) {
   std::string circle = dir / "circle", tooLong = dir / std::string(300, 'x');
   std::filesystem::create_symlink(circle, circle);
   for (const std::string& file : {circle, tooLong}) {
@@ -119,7 +119,7 @@ TEST_F(Check, APathThatCannotBeLookedAtIsNotReadable) {
   }
 }
 
-TEST_F(Check, ADirectoryThatMayNotBeEnteredIsNotReadable) {
+TEST_F(vltCheck, ADirectoryThatMayNotBeEnteredIsNotReadable) {
   if (geteuid() != 0) {
     printf("NOT TESTED: needs root, to have a directory of another user\n");
     GTEST_SKIP();
@@ -136,7 +136,7 @@ TEST_F(Check, ADirectoryThatMayNotBeEnteredIsNotReadable) {
             0);
 }
 
-TEST_F(Check, EntryPointsByType) {
+TEST_F(vltCheck, EntryPointsByType) {
   struct Row {
     _vltComponentType type;
     const char *word, *entry;
@@ -159,7 +159,7 @@ TEST_F(Check, EntryPointsByType) {
   }
 }
 
-TEST_F(Check, WhatIsNoLibraryDoesNotLoad) {
+TEST_F(vltCheck, WhatIsNoLibraryDoesNotLoad) {
   std::string text = dir / "text.so", foreign = dir / "foreign.so", needy = dir / "needy.so";
   WriteBytes(text, "no library");
   MakeLibrary(needy, "f(); int g() { return f(); } extern \"C\" int h");
@@ -173,13 +173,13 @@ TEST_F(Check, WhatIsNoLibraryDoesNotLoad) {
   EXPECT_EQ(errors.size(), 2u);
 }
 
-TEST_F(Check, OtherTypesHaveNothingToCheck) {
+TEST_F(vltCheck, OtherTypesHaveNothingToCheck) {
   EXPECT_EQ(check(vltComponentType7, dir / "missing"), S_OK);
   EXPECT_EQ(check(vltComponentNone, dir / "missing"), S_OK);
   EXPECT_EQ(errors.size(), 0u);
 }
 
-TEST_F(Check, AnExpertWithoutAFileIsTold) {
+TEST_F(vltCheck, AnExpertWithoutAFileIsTold) {
   EXPECT_EQ(check(vltComponentObjectExpert, ""), E_FAIL);
   EXPECT_EQ(Texts(errors), Messages{"the object expert \"\" is registered but does not exist"});
 }
@@ -197,7 +197,7 @@ Messages Drain(IEnumString* list) {
   return texts;
 }
 
-TEST_IN_CHILD(CheckExport, AllComponentsOfARealTree) {
+TEST_IN_CHILD(vltCheckExport, AllComponentsOfARealTree) {
   Installation installation;
   std::string good = installation.root() + "/good.so";
   MakeLibrary(good, "vltCreateObjectExpert");
@@ -226,7 +226,7 @@ TEST_IN_CHILD(CheckExport, AllComponentsOfARealTree) {
   list->Release();
 }
 
-TEST_IN_CHILD(CheckExport, AnUnknownIdFailsWithAnEmptyList) {
+TEST_IN_CHILD(vltCheckExport, AnUnknownIdFailsWithAnEmptyList) {
   Installation installation;
   IEnumString* list = nullptr;
   GUID unknown = {77, 0, 0, {}};
@@ -240,7 +240,7 @@ TEST_IN_CHILD(CheckExport, AnUnknownIdFailsWithAnEmptyList) {
   EXPECT_EQ(vltCheckComponent(GUID_NULL, nullptr), E_POINTER);
 }
 
-TEST_IN_CHILD(CheckExport, ARegistrarWithoutComponentsHasNothingToTell) {
+TEST_IN_CHILD(vltCheckExport, ARegistrarWithoutComponentsHasNothingToTell) {
   Installation installation;
   WriteBytes(installation.sidecar(), "short");  // The database is given up: an empty registrar.
   IEnumString* list = nullptr;
@@ -279,10 +279,10 @@ class FakeRegistrar : public CvltRegistrar {
   bool enumerates = true;
 };
 
-class CheckType : public testing::Test {
+class vltCheckType : public testing::Test {
  protected:
-  CheckType() : registrar(new FakeRegistrar) { registrar->AddRef(); }
-  ~CheckType() override { registrar->Release(); }
+  vltCheckType() : registrar(new FakeRegistrar) { registrar->AddRef(); }
+  ~vltCheckType() override { registrar->Release(); }
   HRESULT check() { return CheckComponents(registrar, vltComponentDataDictionary, errors); }
 
   TempDir dir;
@@ -290,7 +290,7 @@ class CheckType : public testing::Test {
   FakeRegistrar* registrar;
 };
 
-TEST_F(CheckType, AFailureIsKeptAndTheOthersAreCheckedAllTheSame) {
+TEST_F(vltCheckType, AFailureIsKeptAndTheOthersAreCheckedAllTheSame) {
   WriteBytes(dir / "good", "");
   registrar->add(1, dir / "good");
   registrar->add(2, dir / "gone");
@@ -303,7 +303,7 @@ TEST_F(CheckType, AFailureIsKeptAndTheOthersAreCheckedAllTheSame) {
   EXPECT_EQ(Texts(errors), (Messages{missing("gone"), missing("gone too")}));
 }
 
-TEST_F(CheckType, SoundComponentsAreASuccess) {
+TEST_F(vltCheckType, SoundComponentsAreASuccess) {
   EXPECT_EQ(check(), S_OK);
   WriteBytes(dir / "good", "");
   registrar->add(1, dir / "good");
@@ -311,13 +311,13 @@ TEST_F(CheckType, SoundComponentsAreASuccess) {
   EXPECT_EQ(errors.size(), 0u);
 }
 
-TEST_F(CheckType, ARegistrarThatCannotEnumerateIsTheResult) {
+TEST_F(vltCheckType, ARegistrarThatCannotEnumerateIsTheResult) {
   registrar->scanResult = E_OUTOFMEMORY;
   EXPECT_EQ(check(), E_OUTOFMEMORY);
   EXPECT_EQ(errors.size(), 0u);
 }
 
-TEST_F(CheckType, ASuccessWithoutAnEnumeratorEndsTheProcess) {
+TEST_F(vltCheckType, ASuccessWithoutAnEnumeratorEndsTheProcess) {
   registrar->enumerates = false;
   EXPECT_EQ(Child([&] {
               rlimit none = {};
@@ -330,19 +330,19 @@ TEST_F(CheckType, ASuccessWithoutAnEnumeratorEndsTheProcess) {
 
 // ---- The enumerator
 
-class ErrorList : public testing::Test {
+class vltCheckErrorList : public testing::Test {
  protected:
-  ErrorList() {
+  vltCheckErrorList() {
     vltErrors errors;
     for (const wchar_t* text : {L"a", L"b", L"c"}) errors.push_back(zt::fnd::String(text));
     list = new CEnumErrorString(errors);
     list->AddRef();
   }
-  ~ErrorList() override { list->Release(); }
+  ~vltCheckErrorList() override { list->Release(); }
   CEnumErrorString* list;
 };
 
-TEST_F(ErrorList, NextHandsOutWhatThereIs) {
+TEST_F(vltCheckErrorList, NextHandsOutWhatThereIs) {
   wchar_t* texts[3] = {};
   unsigned fetched = 0;
   EXPECT_EQ(list->Next(2, texts, &fetched), S_OK);
@@ -359,7 +359,7 @@ TEST_F(ErrorList, NextHandsOutWhatThereIs) {
   EXPECT_EQ(Drain(list), (Messages{"a", "b", "c"}));
 }
 
-TEST_F(ErrorList, SkipMayGoPastTheEnd) {
+TEST_F(vltCheckErrorList, SkipMayGoPastTheEnd) {
   EXPECT_EQ(list->Skip(1), S_OK);
   EXPECT_EQ(Drain(list), (Messages{"b", "c"}));
   list->Reset();
@@ -368,7 +368,7 @@ TEST_F(ErrorList, SkipMayGoPastTheEnd) {
   EXPECT_TRUE(Drain(list).empty());
 }
 
-TEST_F(ErrorList, TheOtherOperations) {
+TEST_F(vltCheckErrorList, TheOtherOperations) {
   EXPECT_EQ(list->RemoteNext(1, nullptr, nullptr), E_NOTIMPL);
   IEnumString* clone = list;
   EXPECT_EQ(list->Clone(&clone), S_OK);

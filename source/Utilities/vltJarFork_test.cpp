@@ -9,7 +9,7 @@ namespace {
 
 using namespace vlt::test;
 
-TEST(JarFork, AJarIsNotSavedByAChildOfItsHolder) {
+TEST(vltJarFork, AJarIsNotSavedByAChildOfItsHolder) {
   TempDir dir;
   std::string file = dir / "x.ini";
   zt::fnd::String name(file.c_str());

@@ -19,7 +19,7 @@ namespace {
 
 using Registrar = CztComPtr<IvltRegistrar>;
 
-TEST_IN_CHILD(RegistrarEntry, TheFirstCallMakesTheOneOfTheProcess) {
+TEST_IN_CHILD(vltRegistrarEntry, TheFirstCallMakesTheOneOfTheProcess) {
   Installation i;
   Registrar a, b, c;
   EXPECT_EQ(vltGetRegistrar(nullptr), E_POINTER);
@@ -35,7 +35,7 @@ TEST_IN_CHILD(RegistrarEntry, TheFirstCallMakesTheOneOfTheProcess) {
   EXPECT_EQ(vltGetRegistrar2(L"/x", L"/y", nullptr), E_POINTER);
 }
 
-TEST_IN_CHILD(RegistrarEntry, LaterPathsAreIgnored) {
+TEST_IN_CHILD(vltRegistrarEntry, LaterPathsAreIgnored) {
   Installation i;
   TempDir other;
   Registrar a, b;
@@ -46,7 +46,7 @@ TEST_IN_CHILD(RegistrarEntry, LaterPathsAreIgnored) {
   EXPECT_FALSE(Exists(other / "vlt.vlr"));
 }
 
-TEST(RegistrarEntry, ANullFileStandsForThePreferenceWhateverTheDirectory) {
+TEST(vltRegistrarEntry, ANullFileStandsForThePreferenceWhateverTheDirectory) {
   Installation i;
   i.addObjectExpert("E", "Exp", GText(1));
   for (const wchar_t* directory : {static_cast<const wchar_t*>(nullptr), L"/nowhere", L""}) {
@@ -60,7 +60,7 @@ TEST(RegistrarEntry, ANullFileStandsForThePreferenceWhateverTheDirectory) {
   }
 }
 
-TEST(RegistrarEntry, FileAndDirectoryMayBeNamed) {
+TEST(vltRegistrarEntry, FileAndDirectoryMayBeNamed) {
   Installation i;
   i.addObjectExpert("E", "Exp", GText(1));
   TempDir other;
@@ -79,7 +79,7 @@ TEST(RegistrarEntry, FileAndDirectoryMayBeNamed) {
 }
 
 // What the constructor raises frees the guard and the database, so that the next call can do it.
-TEST_IN_CHILD(RegistrarEntry, AnExceptionLeavesNothingHeld) {
+TEST_IN_CHILD(vltRegistrarEntry, AnExceptionLeavesNothingHeld) {
   Installation i;
   WriteBytes(i.root() + "/Data", "in the way");
   Registrar a;
@@ -90,7 +90,7 @@ TEST_IN_CHILD(RegistrarEntry, AnExceptionLeavesNothingHeld) {
   EXPECT_TRUE(a);
 }
 
-TEST_IN_CHILD(RegistrarEntry, AnEmptyPreferenceOrDirectoryIsRaised) {
+TEST_IN_CHILD(vltRegistrarEntry, AnEmptyPreferenceOrDirectoryIsRaised) {
   Installation i;
   Installation::setDir("");
   Registrar a;
@@ -103,7 +103,7 @@ TEST_IN_CHILD(RegistrarEntry, AnEmptyPreferenceOrDirectoryIsRaised) {
   EXPECT_THROW(vltGetRegistrar(a.out()), zt::fnd::exception::InvalidArgument);
 }
 
-TEST_IN_CHILD(RegistrarEntry, ThreadsThatComeAtOnceGetTheSame) {
+TEST_IN_CHILD(vltRegistrarEntry, ThreadsThatComeAtOnceGetTheSame) {
   Installation i;
   for (int n = 0; n < 20; ++n) i.addObjectExpert("E" + std::to_string(n), "X", GText(n + 1));
   std::wstring file = Wide(i.database()), directory = Wide(i.root());
@@ -121,7 +121,7 @@ TEST_IN_CHILD(RegistrarEntry, ThreadsThatComeAtOnceGetTheSame) {
 }
 
 // Answers while other threads ask, register and set; ThreadSanitizer has the last word.
-TEST(RegistrarEntry, ThreadsMayUseTheRegistrarTogether) {
+TEST(vltRegistrarEntry, ThreadsMayUseTheRegistrarTogether) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   i.addObjectExpert("E", "Exp", GText(2), "{" + GText(2) + "}:1:{" + GText(9) + "}");
@@ -148,7 +148,7 @@ TEST(RegistrarEntry, ThreadsMayUseTheRegistrarTogether) {
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
 }
 
-TEST_IN_CHILD(RegistrarEntry, DictionariesAreLoadedThroughIt) {
+TEST_IN_CHILD(vltRegistrarEntry, DictionariesAreLoadedThroughIt) {
   Installation i;
   i.addDictionary("D", "Dict", GText(1), 3, "d");
   EXPECT_EQ(vltLoadDataDictionaries(), S_OK);
@@ -156,7 +156,7 @@ TEST_IN_CHILD(RegistrarEntry, DictionariesAreLoadedThroughIt) {
 
 // ---- By name
 
-TEST_IN_CHILD(RegistrarEntry, ByNameItNeedsTheLibraryAndTheEntry) {
+TEST_IN_CHILD(vltRegistrarEntry, ByNameItNeedsTheLibraryAndTheEntry) {
   TempDir dir;
   setenv("LD_LIBRARY_PATH", dir.path().c_str(), 1);
   ASSERT_EQ(chdir(dir.path().c_str()), 0);

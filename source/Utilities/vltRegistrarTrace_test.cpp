@@ -42,9 +42,9 @@ std::string Traced(unsigned mask, const std::function<void(IvltRegistrar&)>& bod
 
 // ---- The loading test
 
-class LoadingTest : public testing::Test {
+class vltRegistrarTraceLoading : public testing::Test {
  protected:
-  LoadingTest() {
+  vltRegistrarTraceLoading() {
     installation.addDictionary("D", "Gone", GText(1), 3, "d");
     installation.addBundle(
         "Data Dictionaries", "N.framework",
@@ -63,7 +63,7 @@ class LoadingTest : public testing::Test {
   std::string module = installation.root() + "/module.so";
 };
 
-TEST_F(LoadingTest, EachDictionaryThatDoesNotLoadHasItsLine) {
+TEST_F(vltRegistrarTraceLoading, EachDictionaryThatDoesNotLoadHasItsLine) {
   EXPECT_EQ(
       Traced(kTraceErrors,
              [&](IvltRegistrar& r) {
@@ -73,7 +73,7 @@ TEST_F(LoadingTest, EachDictionaryThatDoesNotLoadHasItsLine) {
       failed("D") + "  invalid dictionary registration, missing file path\n" + failed("vltdd"));
 }
 
-TEST_F(LoadingTest, WithoutTheErrorBitThereIsNone) {
+TEST_F(vltRegistrarTraceLoading, WithoutTheErrorBitThereIsNone) {
   for (unsigned mask : {0u, ~kTraceErrors}) {
     EXPECT_EQ(Traced(mask, [](IvltRegistrar& r) { EXPECT_EQ(vltLoadDataDictionaries2(&r), S_OK); }),
               "");
@@ -82,7 +82,7 @@ TEST_F(LoadingTest, WithoutTheErrorBitThereIsNone) {
 
 // ---- The way to the registrar, where memory is out
 
-TEST(RegistrarTrace, TheFailedLookUpIsNamed) {
+TEST(vltRegistrarTrace, TheFailedLookUpIsNamed) {
   Installation i;
   std::string text = Traced(kTraceErrors, [](IvltRegistrar&) {
     for (int n = 1;; ++n) {
@@ -113,7 +113,7 @@ TEST(RegistrarTrace, TheFailedLookUpIsNamed) {
   EXPECT_EQ(text, expected);
 }
 
-TEST(RegistrarTrace, TheLoadingTestWithoutARegistrarSaysSo) {
+TEST(vltRegistrarTrace, TheLoadingTestWithoutARegistrarSaysSo) {
   Installation i;
   EXPECT_EQ(Traced(kTraceErrors,
                    [](IvltRegistrar&) {

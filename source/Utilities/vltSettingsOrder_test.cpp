@@ -8,11 +8,11 @@ namespace {
 using namespace vlt::test;
 using namespace vlt::test::settings;
 
-class SettingsOrder : public SettingsPlace {};
+class vltSettingsOrder : public SettingsPlace {};
 
 // ---- Which file
 
-TEST_F(SettingsOrder, TheNameCountsOnlyWithItsFlag) {
+TEST_F(vltSettingsOrder, TheNameCountsOnlyWithItsFlag) {
   write("ClientObjectCacheLimit=1\nBootstrapEndpoint3=plain\nNumCheckpoints=1\n");
   write("ClientObjectCacheLimit=2\nBootstrapEndpoint3=named\nNumCheckpoints=2\n", "other");
   ExpectInChild([&] {
@@ -42,7 +42,7 @@ TEST_F(SettingsOrder, TheNameCountsOnlyWithItsFlag) {
 
 // ---- The order: where two outputs are the same place, the later one stays.
 
-TEST_F(SettingsOrder, TextsAreReadInTheirOrder) {
+TEST_F(vltSettingsOrder, TextsAreReadInTheirOrder) {
   std::string items;
   for (const TextRow& row : kServerRows) items += std::string(row.key) + "3=" + row.key + "\n";
   write(items);
@@ -71,7 +71,7 @@ TEST_F(SettingsOrder, TextsAreReadInTheirOrder) {
             0);
 }
 
-TEST_F(SettingsOrder, NumbersAreReadInTheirOrder) {
+TEST_F(vltSettingsOrder, NumbersAreReadInTheirOrder) {
   std::string items = "RemoteServerEnabled3=1\n";
   for (size_t n = 0; n < kNumbers; ++n) {
     items += std::string(kCacheRows[n].key) + "=" + std::to_string(n) + "\n";
@@ -112,7 +112,7 @@ TEST_F(SettingsOrder, NumbersAreReadInTheirOrder) {
 }
 
 // A jar that cannot be opened ends the call between the numbers and the texts.
-TEST_F(SettingsOrder, TheCookieComesBetweenTheNumbersAndTheTexts) {
+TEST_F(vltSettingsOrder, TheCookieComesBetweenTheNumbersAndTheTexts) {
   write("");
   std::filesystem::create_directory(data() + "/vltjar.ini");
   ExpectInChild([&] {
@@ -140,7 +140,7 @@ TEST_F(SettingsOrder, TheCookieComesBetweenTheNumbersAndTheTexts) {
 
 // ---- The result
 
-TEST_F(SettingsOrder, AShortSidecarStaysTheResultButForTheJarsAnswer) {
+TEST_F(vltSettingsOrder, AShortSidecarStaysTheResultButForTheJarsAnswer) {
   struct Row {
     unsigned index, remote, offline;
     HRESULT result;
@@ -176,7 +176,7 @@ TEST_F(SettingsOrder, AShortSidecarStaysTheResultButForTheJarsAnswer) {
 }
 
 // Without an output for it the jar is not asked, and what was missing before stays the result.
-TEST_F(SettingsOrder, TheJarsAnswerCountsOnlyIfAnEndpointIsWanted) {
+TEST_F(vltSettingsOrder, TheJarsAnswerCountsOnlyIfAnEndpointIsWanted) {
   write("");
   ExpectInChild([&] {
     Texts<kClientTexts> t;
@@ -187,7 +187,7 @@ TEST_F(SettingsOrder, TheJarsAnswerCountsOnlyIfAnEndpointIsWanted) {
   EXPECT_FALSE(Exists(data() + "/vltjar.ini"));
 }
 
-TEST_F(SettingsOrder, AFileThatCannotBeOpenedTouchesNoOutput) {
+TEST_F(vltSettingsOrder, AFileThatCannotBeOpenedTouchesNoOutput) {
   std::filesystem::create_directory(data() + "/kor.ini");
   ExpectInChild([&] {
     Texts<kClientTexts> client;
@@ -204,7 +204,7 @@ TEST_F(SettingsOrder, AFileThatCannotBeOpenedTouchesNoOutput) {
   });
 }
 
-TEST_F(SettingsOrder, WithoutADataDirectoryOnlyTheDefaultsAreThere) {
+TEST_F(vltSettingsOrder, WithoutADataDirectoryOnlyTheDefaultsAreThere) {
   std::filesystem::remove_all(data());
   ExpectInChild([&] {
     for (unsigned index : {3u, kOther}) {

@@ -9,7 +9,7 @@ namespace {
 using namespace vlt::test;
 using namespace vlt::test::settings;
 
-class SettingsTable : public SettingsPlace {
+class vltSettingsTable : public SettingsPlace {
  protected:
   // Every choice of items that are there, and of outputs that are wanted.
   template <size_t N>
@@ -39,7 +39,7 @@ class SettingsTable : public SettingsPlace {
   }
 };
 
-TEST_F(SettingsTable, EveryChoiceOfItemsAndOutputsOfAClient) {
+TEST_F(vltSettingsTable, EveryChoiceOfItemsAndOutputsOfAClient) {
   for (unsigned index : {3u, kOther, 0u, UINT_MAX}) {
     SCOPED_TRACE(index);
     ExpectInChild([&] {
@@ -54,7 +54,7 @@ TEST_F(SettingsTable, EveryChoiceOfItemsAndOutputsOfAClient) {
 // Thousands of openings, which a sanitizer makes slow.
 constexpr int kManyOpeningsMs = 110000;
 
-TEST_F(SettingsTable, EveryChoiceOfItemsAndOutputsOfAServer) {
+TEST_F(vltSettingsTable, EveryChoiceOfItemsAndOutputsOfAServer) {
   for (unsigned index : {3u, kOther}) {
     SCOPED_TRACE(index);
     ExpectInChild(
@@ -66,7 +66,7 @@ TEST_F(SettingsTable, EveryChoiceOfItemsAndOutputsOfAServer) {
   }
 }
 
-TEST_F(SettingsTable, TextsAreWhatTheFileSays) {
+TEST_F(vltSettingsTable, TextsAreWhatTheFileSays) {
   struct Row {
     std::string line;
     Text text;  // none: as if the item were absent
@@ -104,7 +104,7 @@ TEST_F(SettingsTable, TextsAreWhatTheFileSays) {
 
 // ---- Numbers
 
-TEST_F(SettingsTable, EveryNumberOfAServerInEveryForm) {
+TEST_F(vltSettingsTable, EveryNumberOfAServerInEveryForm) {
   for (unsigned index : {3u, kOther}) {
     ExpectInChild([&] {
       for (size_t n = 0; n < kNumbers; ++n) {
@@ -120,7 +120,7 @@ TEST_F(SettingsTable, EveryNumberOfAServerInEveryForm) {
   }
 }
 
-TEST_F(SettingsTable, EveryChoiceOfAServersNumbersHasItsDefaults) {
+TEST_F(vltSettingsTable, EveryChoiceOfAServersNumbersHasItsDefaults) {
   for (bool withDirectory : {true, false}) {
     if (!withDirectory) std::filesystem::remove_all(data());
     ExpectInChild([&] {
@@ -134,7 +134,7 @@ TEST_F(SettingsTable, EveryChoiceOfAServersNumbersHasItsDefaults) {
   EXPECT_FALSE(Exists(data()));  // Nobody wanted the cookie.
 }
 
-TEST_F(SettingsTable, EveryCacheNumberInEveryForm) {
+TEST_F(vltSettingsTable, EveryCacheNumberInEveryForm) {
   ExpectInChild([&] {
     for (size_t n = 0; n < kNumbers; ++n) {
       for (const NumberText& row : kNumberTexts) {
@@ -148,7 +148,7 @@ TEST_F(SettingsTable, EveryCacheNumberInEveryForm) {
   });
 }
 
-TEST_F(SettingsTable, EveryChoiceOfCacheNumbersHasItsDefaults) {
+TEST_F(vltSettingsTable, EveryChoiceOfCacheNumbersHasItsDefaults) {
   for (bool withDirectory : {true, false}) {
     if (!withDirectory) std::filesystem::remove_all(data());
     ExpectInChild([&] {

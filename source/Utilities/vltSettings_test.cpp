@@ -82,7 +82,7 @@ constexpr const char* kFail = "2147500037";  // E_FAIL
 
 // The install directory is looked up once a process: each question is a child of its own, which
 // compares what it gets.
-class SettingsFile : public testing::Test {
+class vltSettingsFile : public testing::Test {
  protected:
   void write(const std::string& items, const std::string& name = "kor") {
     std::filesystem::create_directories(data());
@@ -102,7 +102,7 @@ class SettingsFile : public testing::Test {
   Installation installation;
 };
 
-TEST_F(SettingsFile, IndexThreeHasDefaultsForAClient) {
+TEST_F(vltSettingsFile, IndexThreeHasDefaultsForAClient) {
   for (bool withFile : {false, true}) {
     if (withFile) write("");
     EXPECT_EQ(ask([] { return ClientSettings(3, 1, 0, nullptr); }),
@@ -112,7 +112,7 @@ TEST_F(SettingsFile, IndexThreeHasDefaultsForAClient) {
   }
 }
 
-TEST_F(SettingsFile, OtherIndexesFailAndKeepTheOutputs) {
+TEST_F(vltSettingsFile, OtherIndexesFailAndKeepTheOutputs) {
   for (bool withFile : {false, true}) {
     if (withFile) write("");
     EXPECT_EQ(ask([] { return ClientSettings(2, 1, 0, nullptr); }),
@@ -123,7 +123,7 @@ TEST_F(SettingsFile, OtherIndexesFailAndKeepTheOutputs) {
             std::string(kFail) + "|(untouched)|(untouched)|77|(untouched)|-x");
 }
 
-TEST_F(SettingsFile, ValuesOfTheFileWin) {
+TEST_F(vltSettingsFile, ValuesOfTheFileWin) {
   write(
       "BootstrapEndpoint7=b\nRemoteServerProtocol7=rp\nRemoteServerEndpoint7=re\n"
       "RemoteEventPort7=ep\nLocalServerProtocol7=lp\nLocalServerEndpoint7=le\n"
@@ -133,13 +133,13 @@ TEST_F(SettingsFile, ValuesOfTheFileWin) {
   EXPECT_EQ(ask([] { return ServerSettings(7); }), "0|1|b|rp|re|ep|lp|le|app|0|86400|1|1|100|1");
 }
 
-TEST_F(SettingsFile, ServerDefaultsAtIndexThree) {
+TEST_F(vltSettingsFile, ServerDefaultsAtIndexThree) {
   write("");
   EXPECT_EQ(ask([] { return ServerSettings(3); }),
             "0|0|62602|ncacn_ip_tcp|51700|57616|ncalrpc|61900||0|86400|1|1|100|1");
 }
 
-TEST_F(SettingsFile, AtOtherIndexesTheUnnumberedOnesAreStillSet) {
+TEST_F(vltSettingsFile, AtOtherIndexesTheUnnumberedOnesAreStillSet) {
   write("");
   std::string untouched =
       "|(untouched)|(untouched)|(untouched)|(untouched)|(untouched)|(untouched)";
@@ -147,7 +147,7 @@ TEST_F(SettingsFile, AtOtherIndexesTheUnnumberedOnesAreStillSet) {
             std::string(kFail) + "|0" + untouched + "||0|86400|1|1|100|1");
 }
 
-TEST_F(SettingsFile, NumbersReadAsTheirConversionsMakeThem) {
+TEST_F(vltSettingsFile, NumbersReadAsTheirConversionsMakeThem) {
   struct Row {
     const char *items, *tail;
   };
@@ -163,7 +163,7 @@ TEST_F(SettingsFile, NumbersReadAsTheirConversionsMakeThem) {
   }
 }
 
-TEST_F(SettingsFile, RemoteEnabledIsATruthValue) {
+TEST_F(vltSettingsFile, RemoteEnabledIsATruthValue) {
   const std::pair<const char*, const char*> rows[] = {
       {"7", "0|1|"}, {"abc", "0|0|"}, {"0", "0|0|"}, {"1", "0|1|"}};
   for (const auto& [value, head] : rows) {
@@ -172,7 +172,7 @@ TEST_F(SettingsFile, RemoteEnabledIsATruthValue) {
   }
 }
 
-TEST_F(SettingsFile, NullOutputsAreNotRead) {
+TEST_F(vltSettingsFile, NullOutputsAreNotRead) {
   write("LocalServerEndpoint3=1\n");
   EXPECT_EQ(Child([] {
               HRESULT client = vltGetClientSettings(2, 1, 0, nullptr, nullptr, nullptr, nullptr,
@@ -188,7 +188,7 @@ TEST_F(SettingsFile, NullOutputsAreNotRead) {
   EXPECT_FALSE(Exists(data() + "/vltjar.ini"));  // No cookie was wanted.
 }
 
-TEST_F(SettingsFile, NamesChooseTheFileOnlyWhereTheyAreAskedFor) {
+TEST_F(vltSettingsFile, NamesChooseTheFileOnlyWhereTheyAreAskedFor) {
   write("LocalServerEndpoint3=plain\n");
   write("LocalServerEndpoint3=named\nRemoteServerEnabled3=1\n", "other");
   EXPECT_EQ(ask([] { return ClientSettings(3, 0, 0, L"other"); }),
@@ -198,7 +198,7 @@ TEST_F(SettingsFile, NamesChooseTheFileOnlyWhereTheyAreAskedFor) {
   EXPECT_EQ(ask([] { return ServerSettings(3, 1, nullptr); }).substr(0, 4), "0|0|");
 }
 
-TEST_F(SettingsFile, AnOfflineClientGetsItsEndpointFromTheJar) {
+TEST_F(vltSettingsFile, AnOfflineClientGetsItsEndpointFromTheJar) {
   write("", "mine");
   EXPECT_EQ(ask([] { return ClientSettings(3, 0, 1, L"mine"); }),
             "0|62602|ncalrpc|61901|(untouched)|");
@@ -210,38 +210,38 @@ TEST_F(SettingsFile, AnOfflineClientGetsItsEndpointFromTheJar) {
             "0|62602|ncalrpc|61903|(untouched)|");
 }
 
-TEST_F(SettingsFile, RemoteGoesBeforeOffline) {
+TEST_F(vltSettingsFile, RemoteGoesBeforeOffline) {
   write("", "mine");
   EXPECT_EQ(ask([] { return ClientSettings(3, 1, 1, L"mine"); }),
             "0|62602|ncacn_ip_tcp|51700|57616|");
   EXPECT_FALSE(Exists(data() + "/vltjar.ini"));
 }
 
-TEST_F(SettingsFile, OfflineWithoutADataDirectoryFails) {
+TEST_F(vltSettingsFile, OfflineWithoutADataDirectoryFails) {
   EXPECT_EQ(ask([] { return ClientSettings(3, 0, 1, L"mine"); }),
             std::string(kFail) + "|62602|ncalrpc|(untouched)|(untouched)|");
 }
 
-TEST_F(SettingsFile, TheCookieComesFromTheJarWhateverItsResult) {
+TEST_F(vltSettingsFile, TheCookieComesFromTheJarWhateverItsResult) {
   write("");
   WriteBytes(data() + "/vltjar.ini", "[CookieSection]\nLastServerCookie=42\n");
   EXPECT_NE(ask([] { return ServerSettings(3); }).find("||42|86400|"), std::string::npos);
 }
 
-TEST_F(SettingsFile, WithoutADataDirectoryTheCookieMakesIt) {
+TEST_F(vltSettingsFile, WithoutADataDirectoryTheCookieMakesIt) {
   EXPECT_EQ(ask([] { return ServerSettings(3); }),
             "0|0|62602|ncacn_ip_tcp|51700|57616|ncalrpc|61900||0|86400|1|1|100|1");
   EXPECT_TRUE(Exists(data() + "/vltjar.ini"));
 }
 
-TEST_F(SettingsFile, AnUnusableSidecarShowsInTheResult) {
+TEST_F(vltSettingsFile, AnUnusableSidecarShowsInTheResult) {
   write("LocalServerEndpoint3=9\n");
   WriteBytes(data() + "/kor.vl5", "short");
   EXPECT_EQ(ask([] { return ClientSettings(3, 0, 0, nullptr); }),
             std::string(kFail) + "|62602|ncalrpc|61900|(untouched)|");
 }
 
-TEST_F(SettingsFile, CacheLimitsHaveDefaults) {
+TEST_F(vltSettingsFile, CacheLimitsHaveDefaults) {
   const char* keys[] = {"ClientObjectCacheLimit",           "ClientObjectCacheFlushPercentage",
                         "ClientBufferCacheLimit",           "ClientBufferCacheMinimumLimit",
                         "ClientBufferCacheFlushPercentage", "GarbageCollectorInterval"};
@@ -269,7 +269,7 @@ TEST_F(SettingsFile, CacheLimitsHaveDefaults) {
 
 // ---- The local URL and the kinds of storage
 
-TEST(LocalUrl, NullIsAFailureAndNotAPointerError) {
+TEST(vltSettingsLocalUrl, NullIsAFailureAndNotAPointerError) {
   EXPECT_EQ(vltGetLocalConfigurationURL(nullptr), E_FAIL);
 }
 
@@ -279,7 +279,7 @@ std::string Url(HRESULT expected) {
   return Show(Take(url));
 }
 
-TEST(LocalUrl, ComesFromTheWorkingDirectoryOnce) {
+TEST(vltSettingsLocalUrl, ComesFromTheWorkingDirectoryOnce) {
   TempDir dir;
   WriteBytes(dir / "kor.ini", "[STORAGE]\nLocalServerEndpoint3=555\n");
   EXPECT_EQ(Child([&] {
@@ -291,7 +291,7 @@ TEST(LocalUrl, ComesFromTheWorkingDirectoryOnce) {
             0);
 }
 
-TEST(LocalUrl, WithoutAFileHasTheDefaultPortAndLeavesAnEmptyFile) {
+TEST(vltSettingsLocalUrl, WithoutAFileHasTheDefaultPortAndLeavesAnEmptyFile) {
   TempDir dir;
   EXPECT_EQ(Child([&] {
               if (chdir(dir.path().c_str()) != 0) return 1;
@@ -302,7 +302,7 @@ TEST(LocalUrl, WithoutAFileHasTheDefaultPortAndLeavesAnEmptyFile) {
   EXPECT_FALSE(Exists(dir / "kor.vl5"));
 }
 
-TEST(LocalUrl, AnUnwritableDirectoryCostsThePortForGood) {
+TEST(vltSettingsLocalUrl, AnUnwritableDirectoryCostsThePortForGood) {
   EXPECT_EQ(Child([] {
               if (chdir("/proc/self") != 0) return 1;
               if (Url(E_FAIL) != "127.0.0.1:") return 2;
@@ -311,7 +311,7 @@ TEST(LocalUrl, AnUnwritableDirectoryCostsThePortForGood) {
             0);
 }
 
-TEST(StorageKind, DefaultStorages) {
+TEST(vltSettingsStorageKind, DefaultStorages) {
   EXPECT_EQ(vltIsDefaultStorage(nullptr), 1);
   EXPECT_EQ(vltIsDefaultStorage(L"config.vlt"), 1);
   EXPECT_EQ(vltIsDefaultStorage(L"/a/b/CONFIG3.VLT"), 1);
@@ -320,7 +320,7 @@ TEST(StorageKind, DefaultStorages) {
   EXPECT_EQ(vltIsDefaultStorage(L""), 0);
 }
 
-TEST(StorageKind, OfflineAddresses) {
+TEST(vltSettingsStorageKind, OfflineAddresses) {
   struct Row {
     const wchar_t* url;
     unsigned offline;
@@ -341,7 +341,7 @@ TEST(StorageKind, OfflineAddresses) {
   }
 }
 
-TEST(StorageKind, NamedRegistrarsAreTheDefaultOne) {
+TEST(vltSettingsStorageKind, NamedRegistrarsAreTheDefaultOne) {
   Installation installation;
   EXPECT_EQ(vltGetNamedRegistrar(nullptr, nullptr), E_POINTER);
   IvltRegistrar* out = nullptr;

@@ -16,7 +16,7 @@ void ExpectSlotsFrom(size_t first, Members... members) {
   for (size_t slot : {SlotOf(members)...}) EXPECT_EQ(slot, expected++);
 }
 
-TEST(RegistrarSlots, OfTheInterfaces) {
+TEST(vltSlots, OfTheInterfaces) {
   using R = IvltRegistrar;
   using R2 = IvltRegistrar2;
   ExpectSlotsFrom(0, &R::QueryInterface, &R::AddRef, &R::Release, &R::GetConfigurationPath,
@@ -31,14 +31,14 @@ TEST(RegistrarSlots, OfTheInterfaces) {
   EXPECT_EQ(SlotOf(&R2::SetSnapshotPath), 18u);
 }
 
-TEST(RegistrarSlots, OfTheSideInterfaces) {
+TEST(vltSlots, OfTheSideInterfaces) {
   ExpectSlotsFrom(3, &IvltPharlapRegistrarEx::ResetDDUpdatedFlags);
   ExpectSlotsFrom(3, &IvltDynamicRegistrar::GetComponentsForBindingClass);
   ExpectSlotsFrom(3, &IvltDowngradeRegistrar::GetPreviousDictionaries,
                   &IvltDowngradeRegistrar::RemovePreviousDictionaries);
 }
 
-TEST(RegistrarSlots, OfTheEnumerators) {
+TEST(vltSlots, OfTheEnumerators) {
   using E = IvltEnumComponent;
   ExpectSlotsFrom(0, &E::QueryInterface, &E::AddRef, &E::Release, &E::Next, &E::Skip, &E::Reset,
                   &E::Clone);
@@ -67,7 +67,7 @@ void ExpectSlotsBehindTheInterfaces() {
   EXPECT_EQ(SlotOf(&P::PopulateBindingClasses), 38u);
 }
 
-TEST(RegistrarSlots, OfTheClassesBehindTheInterfaces) {
+TEST(vltSlots, OfTheClassesBehindTheInterfaces) {
   EXPECT_EQ(SlotOf(&CvltRegistrar::Scan), 21u);
   ExpectSlotsBehindTheInterfaces<CvltPharlapRegistrar>();
   ExpectSlotsBehindTheInterfaces<CvltLinuxRegistrar>();

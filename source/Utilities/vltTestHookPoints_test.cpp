@@ -136,7 +136,7 @@ Outcome Lose() {
   return Success;
 }
 
-class HookPoints : public testing::Test {
+class vltTestHookPoints : public testing::Test {
  protected:
   // One armed process a row, and one that looks what it has left.
   template <class Body>
@@ -152,7 +152,7 @@ class HookPoints : public testing::Test {
   Site m_site;
 };
 
-TEST_F(HookPoints, EachPointHasARow) {
+TEST_F(vltTestHookPoints, EachPointHasARow) {
   std::set<std::string> points, rows;
   for (const auto& point : hook::kPoints) points.insert(point.name);
   for (const Row& row : kRows) rows.insert(row.point);
@@ -160,11 +160,11 @@ TEST_F(HookPoints, EachPointHasARow) {
   EXPECT_EQ(points.size(), std::size(hook::kPoints));
 }
 
-TEST_F(HookPoints, ALeakWouldShow) {
+TEST_F(vltTestHookPoints, ALeakWouldShow) {
   EXPECT_EQ(m_site.run("elsewhere", "", [] { return PerformOften(Lose); }), kLeaks);
 }
 
-TEST_F(HookPoints, UnarmedActionsSucceed) {
+TEST_F(vltTestHookPoints, UnarmedActionsSucceed) {
   for (const Row& row : kRows) {
     SCOPED_TRACE(row.point);
     EXPECT_EQ(m_site.run("elsewhere", "", [&] { return PerformOften(row.action); }),
@@ -173,7 +173,7 @@ TEST_F(HookPoints, UnarmedActionsSucceed) {
   }
 }
 
-TEST_F(HookPoints, ASimulatedFailureIsReportedWithItsFunction) {
+TEST_F(vltTestHookPoints, ASimulatedFailureIsReportedWithItsFunction) {
   NamedEvent lockdown(L"LockdownVLTEvent", true, false);
   forEachRow("SimulateMemoryAllocationFailure = true\n", [&](const Row& row, auto run) {
     TempDir logs;
@@ -196,7 +196,7 @@ TEST_F(HookPoints, ASimulatedFailureIsReportedWithItsFunction) {
   });
 }
 
-TEST_F(HookPoints, WithAMaskOfNothingAFailureLeavesNoLog) {
+TEST_F(vltTestHookPoints, WithAMaskOfNothingAFailureLeavesNoLog) {
   TempDir logs;
   EXPECT_EQ(m_site.run(hook::kStringFromClsid, "SimulateMemoryAllocationFailure = true\n",
                        [&] {
@@ -218,7 +218,7 @@ long PeakKb() {
   return -1;
 }
 
-TEST_F(HookPoints, ASimulatedFailureAllocatesNothing) {
+TEST_F(vltTestHookPoints, ASimulatedFailureAllocatesNothing) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer maps memory of its own";
   auto run = [&](const char* point) {
     return m_site.run(point, "SimulateMemoryAllocationFailure = true\n", [] {
@@ -236,13 +236,13 @@ TEST_F(HookPoints, ASimulatedFailureAllocatesNothing) {
   EXPECT_EQ(run(hook::kDuplicateString2), 20);
 }
 
-TEST_F(HookPoints, AThrownFailureHasItsResult) {
+TEST_F(vltTestHookPoints, AThrownFailureHasItsResult) {
   forEachRow("SimulateMemoryAllocationFailureAndThrow = true\n", [](const Row& row, auto run) {
     EXPECT_EQ(run([&] { return PerformOften(row.action); }), kEnd + row.thrown);
   });
 }
 
-TEST_F(HookPoints, AHangAnswersAfterItsTime) {
+TEST_F(vltTestHookPoints, AHangAnswersAfterItsTime) {
   std::string flags = "Hang = true\nHangTime = " + std::to_string(kHangMs) + "\n";
   forEachRow(flags, [](const Row& row, auto run) {
     EXPECT_EQ(run([&] {
@@ -255,13 +255,13 @@ TEST_F(HookPoints, AHangAnswersAfterItsTime) {
   });
 }
 
-TEST_F(HookPoints, ACrashIsANormalEnd) {
+TEST_F(vltTestHookPoints, ACrashIsANormalEnd) {
   forEachRow("Crash = true\n", [](const Row& row, auto run) {
     EXPECT_EQ(run([&] { return kEnd + Perform(row.action); }), 0);
   });
 }
 
-TEST_F(HookPoints, ExhaustedMemoryIsSurvived) {
+TEST_F(vltTestHookPoints, ExhaustedMemoryIsSurvived) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer holds the address space";
   forEachRow("MemoryAllocationFailure = true\n", [](const Row& row, auto run) {
     int end = run([&] {
@@ -272,7 +272,7 @@ TEST_F(HookPoints, ExhaustedMemoryIsSurvived) {
   });
 }
 
-TEST_F(HookPoints, AFailedCreationLeavesTheRegistrarToTheNextCall) {
+TEST_F(vltTestHookPoints, AFailedCreationLeavesTheRegistrarToTheNextCall) {
   Installation installation;
   std::string file = installation.root() + "/VLTHooks.ini";
   WriteBytes(file, std::string("[Hook]\nName = ") + hook::kGetRegistrar2 +

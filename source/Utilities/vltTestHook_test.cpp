@@ -41,7 +41,7 @@ std::string Hook(const std::string& name, const std::string& flags) {
 constexpr const char* kSimulate = "SimulateMemoryAllocationFailure = TRUE\n";
 constexpr const char* kThrow = "SimulateMemoryAllocationFailureAndThrow = True\n";
 
-TEST(Hook, WithoutAFileNothingIsArmedAndNoFileAppears) {
+TEST(vltTestHook, WithoutAFileNothingIsArmedAndNoFileAppears) {
   Installation installation;
   EXPECT_EQ(Child([&] {
               vltRefreshHook();
@@ -52,7 +52,7 @@ TEST(Hook, WithoutAFileNothingIsArmedAndNoFileAppears) {
   EXPECT_FALSE(Exists(installation.root() + "/VLTHooks.ini"));
 }
 
-TEST(Hook, NameIsComparedExactly) {
+TEST(vltTestHook, NameIsComparedExactly) {
   EXPECT_EQ(Armed(Hook("Point", kSimulate),
                   [] {
                     return vltTestHook("Point") == 1 && vltTestHook("point") == 0 &&
@@ -63,7 +63,7 @@ TEST(Hook, NameIsComparedExactly) {
             0);
 }
 
-TEST(Hook, WithoutANameNoFlagIsRead) {
+TEST(vltTestHook, WithoutANameNoFlagIsRead) {
   Installation installation;
   std::string file = installation.root() + "/VLTHooks.ini";
   WriteBytes(file, "[Hook]\nCrash = true\n");
@@ -76,7 +76,7 @@ TEST(Hook, WithoutANameNoFlagIsRead) {
             7);
 }
 
-TEST(Hook, FlagsStayWhileTheNameIsReplaced) {
+TEST(vltTestHook, FlagsStayWhileTheNameIsReplaced) {
   Installation installation;
   std::string file = installation.root() + "/VLTHooks.ini";
   WriteBytes(file, Hook("a", kThrow));
@@ -95,7 +95,7 @@ TEST(Hook, FlagsStayWhileTheNameIsReplaced) {
             0);
 }
 
-TEST(Hook, RefreshesWithOneNameKeepOneCopy) {
+TEST(vltTestHook, RefreshesWithOneNameKeepOneCopy) {
   EXPECT_EQ(Armed(Hook(std::string(10000, 'n'), ""),
                   [] {
                     for (int i = 0; i < 20; ++i) vltRefreshHook();
@@ -106,7 +106,7 @@ TEST(Hook, RefreshesWithOneNameKeepOneCopy) {
             0);
 }
 
-TEST(Hook, CrashEndsTheProcessNormally) {
+TEST(vltTestHook, CrashEndsTheProcessNormally) {
   EXPECT_EQ(Armed(Hook("p", "Crash = true\n"),
                   [] {
                     vltTestHook("p");
@@ -115,7 +115,7 @@ TEST(Hook, CrashEndsTheProcessNormally) {
             0);
 }
 
-TEST(Hook, HangGoesBeforeCrashAndAnswersOne) {
+TEST(vltTestHook, HangGoesBeforeCrashAndAnswersOne) {
   EXPECT_EQ(Armed(Hook("p", "Crash = true\nHang = true\nHangTime = 60\n"),
                   [] {
                     auto start = std::chrono::steady_clock::now();
@@ -126,7 +126,7 @@ TEST(Hook, HangGoesBeforeCrashAndAnswersOne) {
             6);
 }
 
-TEST(Hook, HangWithoutATimeLastsForAsLongAsASleepCan) {
+TEST(vltTestHook, HangWithoutATimeLastsForAsLongAsASleepCan) {
   EXPECT_EQ(Armed(Hook("p", "Hang = true\n"),
                   [] {
                     if (!CatchSleeps()) return 1;
@@ -136,7 +136,7 @@ TEST(Hook, HangWithoutATimeLastsForAsLongAsASleepCan) {
             0);
 }
 
-TEST(Hook, AHangTimeThatIsGoneByTheNextRefreshIsForgotten) {
+TEST(vltTestHook, AHangTimeThatIsGoneByTheNextRefreshIsForgotten) {
   Installation installation;
   std::string file = installation.root() + "/VLTHooks.ini";
   WriteBytes(file, Hook("p", "Hang = true\nHangTime = 5\n"));
@@ -156,7 +156,7 @@ TEST(Hook, AHangTimeThatIsGoneByTheNextRefreshIsForgotten) {
 }
 
 // All five, and then each time without the one that came out.
-TEST(Hook, PrecedenceIsHangCrashSimulateThrowExhaust) {
+TEST(vltTestHook, PrecedenceIsHangCrashSimulateThrowExhaust) {
   const std::string kExhaust = "MemoryAllocationFailure = true\n";
   const std::string kCrash = "Crash = true\n", kHang = "Hang = true\nHangTime = 1\n";
   auto body = [] {
@@ -182,7 +182,7 @@ TEST(Hook, PrecedenceIsHangCrashSimulateThrowExhaust) {
   EXPECT_EQ(Armed(Hook("p", flags), body), 40);
 }
 
-TEST(Hook, TextsOfFlagsOtherThanTrueSetNothing) {
+TEST(vltTestHook, TextsOfFlagsOtherThanTrueSetNothing) {
   for (const char* text : {"1", "yes", "truely", "tru", "false", "\"\""}) {
     std::string flags;
     for (const char* flag :
@@ -194,11 +194,11 @@ TEST(Hook, TextsOfFlagsOtherThanTrueSetNothing) {
   }
 }
 
-TEST(Hook, ABadHookFileArmsNothing) {
+TEST(vltTestHook, ABadHookFileArmsNothing) {
   EXPECT_EQ(Armed(std::string("\xFF\xFE[\0", 4), [] { return vltTestHook("p") == 0 ? 0 : 1; }), 0);
 }
 
-TEST(Hook, ExhaustMemoryTakesWhatThereIs) {
+TEST(vltTestHook, ExhaustMemoryTakesWhatThereIs) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer holds the address space";
   EXPECT_EQ(Armed(Hook("p", "MemoryAllocationFailure = true\n"),
                   [] {
@@ -222,7 +222,7 @@ size_t MappedBytes() {
 
 // The first one has doubled its blocks to 128 MiB. From 4 KiB on, and without doubling, the second one
 // would take next to nothing.
-TEST(Hook, ASecondExhaustionGoesOnWithBlocksOfTheSameSize) {
+TEST(vltTestHook, ASecondExhaustionGoesOnWithBlocksOfTheSameSize) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer holds the address space";
   EXPECT_EQ(Armed(Hook("p", "MemoryAllocationFailure = true\n"),
                   [] {

@@ -35,7 +35,7 @@ std::string BadName(const std::string& file) {
 
 // An installation with (at first) an empty data directory. The install directory is looked up once a
 // process, so whatever asks for it runs in a child; its exit code is the body's result.
-class Jar : public testing::Test {
+class vltjar : public testing::Test {
  protected:
   std::string data() const { return installation.root() + "/Data"; }
   std::string jar() const { return data() + "/vltjar.ini"; }
@@ -48,7 +48,7 @@ class Jar : public testing::Test {
   Installation installation;
 };
 
-TEST_F(Jar, PathNeedsTheDataDirectoryAndMakesNone) {
+TEST_F(vltjar, PathNeedsTheDataDirectoryAndMakesNone) {
   EXPECT_EQ(run([] { return GetJarFilePath() == nullptr ? 0 : 1; }), 0);
   EXPECT_FALSE(Exists(data()));
   makeData();
@@ -60,7 +60,7 @@ TEST_F(Jar, PathNeedsTheDataDirectoryAndMakesNone) {
   EXPECT_FALSE(Exists(jar()));
 }
 
-TEST_F(Jar, WithoutAnInstallDirectoryNothingWorks) {
+TEST_F(vltjar, WithoutAnInstallDirectoryNothingWorks) {
   Installation::setDir("");
   EXPECT_EQ(run([] {
               GUID guid;
@@ -75,7 +75,7 @@ TEST_F(Jar, WithoutAnInstallDirectoryNothingWorks) {
             0);
 }
 
-TEST_F(Jar, CookieIsKeptWithItsSidecarAndModes) {
+TEST_F(vltjar, CookieIsKeptWithItsSidecarAndModes) {
   makeData();
   ScopedUmask strict(077);
   EXPECT_EQ(run([] { return vltSetServerCookie(-17); }), 0);
@@ -91,12 +91,12 @@ TEST_F(Jar, CookieIsKeptWithItsSidecarAndModes) {
             0);
 }
 
-TEST_F(Jar, CookieWithoutADataDirectoryFailsAndMakesNone) {
+TEST_F(vltjar, CookieWithoutADataDirectoryFailsAndMakesNone) {
   EXPECT_EQ(run([] { return vltSetServerCookie(1) == E_FAIL ? 0 : 1; }), 0);
   EXPECT_FALSE(Exists(data()));
 }
 
-TEST_F(Jar, AMissingCookieIsZeroAndWritten) {
+TEST_F(vltjar, AMissingCookieIsZeroAndWritten) {
   EXPECT_EQ(run([] {
               int cookie = 5;
               String dataDir;
@@ -108,7 +108,7 @@ TEST_F(Jar, AMissingCookieIsZeroAndWritten) {
   expectSealed();
 }
 
-TEST_F(Jar, ProcessIdMakesTheDataDirectory) {
+TEST_F(vltjar, ProcessIdMakesTheDataDirectory) {
   ScopedUmask strict(077);
   EXPECT_EQ(run([] { return vltAddSvrProcessIDToJar(L"Server A", 4711); }), 0);
   EXPECT_EQ(ModeOf(data()), 0777);
@@ -121,7 +121,7 @@ TEST_F(Jar, ProcessIdMakesTheDataDirectory) {
 }
 
 // No section has an empty name, so nothing is kept, and what was kept before stays.
-TEST_F(Jar, AProcessIdThatCannotBeSetFails) {
+TEST_F(vltjar, AProcessIdThatCannotBeSetFails) {
   EXPECT_EQ(run([] {
               return vltAddSvrProcessIDToJar(L"", 1) == E_FAIL &&
                              vltAddSvrProcessIDToJar(nullptr, 1) == E_FAIL
@@ -136,7 +136,7 @@ TEST_F(Jar, AProcessIdThatCannotBeSetFails) {
   expectSealed();
 }
 
-TEST_F(Jar, IdentityNeedsItsLibraryAndLeavesNoKey) {
+TEST_F(vltjar, IdentityNeedsItsLibraryAndLeavesNoKey) {
   makeData();
   EXPECT_EQ(run([] {
               GUID guid;
@@ -150,7 +150,7 @@ TEST_F(Jar, IdentityNeedsItsLibraryAndLeavesNoKey) {
   EXPECT_EQ(vltGetServerIdentity(nullptr), E_POINTER);
 }
 
-TEST_F(Jar, IdentityIsReadByEveryLaterCaller) {
+TEST_F(vltjar, IdentityIsReadByEveryLaterCaller) {
   makeData();
   WriteBytes(jar(), "[ServerSection]\nServerIdentity={00000001-0002-0003-0405-060708090A0B}\n");
   auto first = [] {
@@ -179,7 +179,7 @@ class Identities {
   TempDir m_dir;
 };
 
-TEST_F(Jar, IdentityIsMadeOnce) {
+TEST_F(vltjar, IdentityIsMadeOnce) {
   Identities identities;
   makeData();
   auto ask = [&] {
@@ -193,7 +193,7 @@ TEST_F(Jar, IdentityIsMadeOnce) {
   expectSealed();
 }
 
-TEST_F(Jar, AnIdentityWithoutATextIsNotTold) {
+TEST_F(vltjar, AnIdentityWithoutATextIsNotTold) {
   Identities identities;
   makeData();
   WriteBytes(installation.root() + "/VLTHooks.ini",
@@ -218,7 +218,7 @@ std::string Endpoint(const wchar_t* storage) {
   return narrow;
 }
 
-TEST_F(Jar, EndpointsRunInACircle) {
+TEST_F(vltjar, EndpointsRunInACircle) {
   makeData();
   EXPECT_EQ(run([] { return Endpoint(L"a") == "61901" && Endpoint(L"a") == "61902" ? 0 : 1; }), 0);
   EXPECT_EQ(ReadBytes(jar()), "[OfflineStorageSection]\nNextEndpt = 61903\n");
@@ -228,7 +228,7 @@ TEST_F(Jar, EndpointsRunInACircle) {
   expectSealed();
 }
 
-TEST_F(Jar, AStoragesEntryIsItsEndpoint) {
+TEST_F(vltjar, AStoragesEntryIsItsEndpoint) {
   makeData();
   WriteBytes(jar(), "[OfflineStorageSection]\nmine=7000\nNextEndpt=61950\n61950=mine\n");
   EXPECT_EQ(run([] {
@@ -239,7 +239,7 @@ TEST_F(Jar, AStoragesEntryIsItsEndpoint) {
             0);
 }
 
-TEST_F(Jar, AHostileCounterOverflowsNothing) {
+TEST_F(vltjar, AHostileCounterOverflowsNothing) {
   makeData();
   for (const char* value : {"2147483647", "99999999999999999999", "-5", "abc"}) {
     WriteBytes(jar(), std::string("[OfflineStorageSection]\nNextEndpt=") + value + "\n");
@@ -247,7 +247,7 @@ TEST_F(Jar, AHostileCounterOverflowsNothing) {
   }
 }
 
-TEST_F(Jar, NoEndpointIsHandedOutTwice) {
+TEST_F(vltjar, NoEndpointIsHandedOutTwice) {
   makeData();
   constexpr int kProcesses = 4, kThreads = 4, kEach = 25;
   std::vector<Child> children;
@@ -273,9 +273,9 @@ TEST_F(Jar, NoEndpointIsHandedOutTwice) {
 
 // ---- Guarded files
 
-class GuardedFile : public testing::Test {
+class vltjarGuardedFile : public testing::Test {
  protected:
-  GuardedFile() : file(dir / "x.ini"), wide(Wide(file)) {}
+  vltjarGuardedFile() : file(dir / "x.ini"), wide(Wide(file)) {}
 
   HRESULT open() { return VltjarOpen(wide.c_str(), &ini); }
   std::string value(const char* section, const char* item) const {
@@ -289,7 +289,7 @@ class GuardedFile : public testing::Test {
   std::unique_ptr<CvlIniMgr> ini;
 };
 
-TEST_F(GuardedFile, WithoutASidecarOpensAsItIsAndTheSaveMakesOne) {
+TEST_F(vltjarGuardedFile, WithoutASidecarOpensAsItIsAndTheSaveMakesOne) {
   WriteBytes(file, "[s]\na=1\n");
   EXPECT_EQ(open(), S_OK);
   EXPECT_EQ(value("s", "a"), "1");
@@ -300,7 +300,7 @@ TEST_F(GuardedFile, WithoutASidecarOpensAsItIsAndTheSaveMakesOne) {
   EXPECT_EQ(Hex(ReadBytes(dir / "x.vl5")), Md5Sum(file));
 }
 
-TEST_F(GuardedFile, AShortSidecarGivesUpTheFile) {
+TEST_F(vltjarGuardedFile, AShortSidecarGivesUpTheFile) {
   WriteBytes(file, "[s]\na=1\n");
   WriteBytes(dir / "x.vl5", std::string(15, 'x'));
   EXPECT_EQ(open(), E_FAIL);
@@ -312,7 +312,7 @@ TEST_F(GuardedFile, AShortSidecarGivesUpTheFile) {
 }
 
 // Every opening would set the file aside, the second one the empty file over the copy of the first.
-TEST_F(GuardedFile, ADirectoryInTheSidecarsPlaceCostsTheFileOnce) {
+TEST_F(vltjarGuardedFile, ADirectoryInTheSidecarsPlaceCostsTheFileOnce) {
   WriteBytes(file, "[s]\na=1\n");
   WriteBytes(dir.makeDir("x.vl5") + "/inside", "kept");
   EXPECT_EQ(open(), E_FAIL);
@@ -326,7 +326,7 @@ TEST_F(GuardedFile, ADirectoryInTheSidecarsPlaceCostsTheFileOnce) {
   EXPECT_EQ(ReadBytes(BadName(file)), "[s]\na=1\n");
 }
 
-TEST_F(GuardedFile, WithADirectoryThatCannotBeMovedTheFileStays) {
+TEST_F(vltjarGuardedFile, WithADirectoryThatCannotBeMovedTheFileStays) {
   WriteBytes(file, "[s]\na=1\n");
   WriteBytes(dir.makeDir("x.vl5") + "/inside", "kept");
   ExpectInChild([&] {
@@ -341,7 +341,7 @@ TEST_F(GuardedFile, WithADirectoryThatCannotBeMovedTheFileStays) {
 }
 
 // Two that find the sidecar short: the second must see what the first has made of it.
-TEST_F(GuardedFile, AShortSidecarIsJudgedUnderTheLock) {
+TEST_F(vltjarGuardedFile, AShortSidecarIsJudgedUnderTheLock) {
   WriteBytes(file, "[s]\na=1\n");
   WriteBytes(dir / "x.vl5", std::string(15, 'x'));
   std::unique_ptr<CvlIniMgr> lock(new CvlIniMgr(CvlIniMgr::LockOnly(file)));
@@ -357,7 +357,7 @@ TEST_F(GuardedFile, AShortSidecarIsJudgedUnderTheLock) {
   EXPECT_EQ(Hex(ReadBytes(dir / "x.vl5")), Md5Sum(file));
 }
 
-TEST_F(GuardedFile, AWrongDigestCostsNothingAndIsRepaired) {
+TEST_F(vltjarGuardedFile, AWrongDigestCostsNothingAndIsRepaired) {
   WriteBytes(file, "[s]\na=1\n");
   for (char fill : {'q', '0'}) {
     WriteBytes(dir / "x.vl5", std::string(16, fill));
@@ -370,7 +370,7 @@ TEST_F(GuardedFile, AWrongDigestCostsNothingAndIsRepaired) {
   }
 }
 
-TEST_F(GuardedFile, AnUnparsableFileIsSetAside) {
+TEST_F(vltjarGuardedFile, AnUnparsableFileIsSetAside) {
   WriteBytes(file, "\xFE\xFF garbage");
   EXPECT_EQ(open(), S_OK);
   ASSERT_TRUE(ini);
@@ -378,13 +378,13 @@ TEST_F(GuardedFile, AnUnparsableFileIsSetAside) {
   EXPECT_EQ(ini->GetNumberOfSections(), 0);
 }
 
-TEST_F(GuardedFile, AFailedRetryLeavesAsItsInteger) {
+TEST_F(vltjarGuardedFile, AFailedRetryLeavesAsItsInteger) {
   dir.makeDir("x.ini");
   EXPECT_THROW(open(), int);
   EXPECT_FALSE(ini);
 }
 
-TEST_F(GuardedFile, DeleteRenamesAndRemoves) {
+TEST_F(vltjarGuardedFile, DeleteRenamesAndRemoves) {
   EXPECT_EQ(VltjarDeleteIniFile(wide.c_str()), S_OK);
   WriteBytes(file, "x");
   WriteBytes(dir / "x.vl5", "y");
@@ -396,7 +396,7 @@ TEST_F(GuardedFile, DeleteRenamesAndRemoves) {
   EXPECT_EQ(VltjarDeleteIniFile(Wide(dir / "plain/x.ini").c_str()), E_FAIL);  // ENOTDIR
 }
 
-TEST_F(GuardedFile, DigestsAreReadAndWritten) {
+TEST_F(vltjarGuardedFile, DigestsAreReadAndWritten) {
   unsigned char* digest = nullptr;
   EXPECT_EQ(VltjarGetChecksumForCacheFile(wide.c_str(), &digest), S_FALSE);
   auto* sixteen = reinterpret_cast<const unsigned char*>("0123456789abcdef");
@@ -407,13 +407,13 @@ TEST_F(GuardedFile, DigestsAreReadAndWritten) {
   EXPECT_EQ(VltjarSetChecksumForCacheFile(Wide(dir / "none/x.ini").c_str(), sixteen), E_FAIL);
 }
 
-TEST_F(GuardedFile, SidecarOfAPathCutsAtTheLastPoint) {
+TEST_F(vltjarGuardedFile, SidecarOfAPathCutsAtTheLastPoint) {
   auto* sixteen = reinterpret_cast<const unsigned char*>("0123456789abcdef");
   EXPECT_EQ(VltjarSetChecksumForCacheFile(Wide(dir / "nodot").c_str(), sixteen), S_OK);
   EXPECT_TRUE(Exists(CvlIniMgr::SidecarName(dir / "nodot")));
 }
 
-TEST(OfflineStorage, TheFamilyIsNotThere) {
+TEST(vltjarOfflineStorage, TheFamilyIsNotThere) {
   int inUse = 1;
   EXPECT_EQ(ValidateOfflineStorage(String(L"s"), &inUse, nullptr), E_FAIL);
   EXPECT_EQ(UpdateOfflineStorageInfo(String(L"s"), nullptr), E_FAIL);

@@ -35,7 +35,7 @@ __attribute__((constructor)) void start() {
 }
 )";
 
-class CheckByRoot : public testing::Test {
+class CheckRoot : public testing::Test {
  protected:
   void SetUp() override {
     if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs root, whose check it is";
@@ -71,7 +71,7 @@ class CheckByRoot : public testing::Test {
   TempDir m_out;
 };
 
-TEST_F(CheckByRoot, RootsOwnLibraryIsLoadedAsRoot) {
+TEST_F(CheckRoot, RootsOwnLibraryIsLoadedAsRoot) {
   build();
   Found found = Check(1);
   EXPECT_TRUE(found.sound);
@@ -79,7 +79,7 @@ TEST_F(CheckByRoot, RootsOwnLibraryIsLoadedAsRoot) {
   EXPECT_EQ(witnessed().substr(0, 8), "0 0 0 0 ");
 }
 
-TEST_F(CheckByRoot, AnotherUsersLibraryIsLoadedAsThatUser) {
+TEST_F(CheckRoot, AnotherUsersLibraryIsLoadedAsThatUser) {
   ASSERT_EQ(chown(build().c_str(), kNobody, 0), 0);
   Found found = Check(1);
   EXPECT_EQ(found.exitCode, kGood);
@@ -89,7 +89,7 @@ TEST_F(CheckByRoot, AnotherUsersLibraryIsLoadedAsThatUser) {
   EXPECT_EQ(witnessed(), "65534 65534 65534 65534 0 back -1 open 0 tty 0");
 }
 
-TEST_F(CheckByRoot, ALibraryInAnotherUsersDirectoryIsLoadedAsThatUser) {
+TEST_F(CheckRoot, ALibraryInAnotherUsersDirectoryIsLoadedAsThatUser) {
   build();
   ASSERT_EQ(chown(m_experts.root().c_str(), kNobody, kNobody), 0);
   EXPECT_TRUE(Check(1).sound);
@@ -97,7 +97,7 @@ TEST_F(CheckByRoot, ALibraryInAnotherUsersDirectoryIsLoadedAsThatUser) {
 }
 
 // Problems of such a library are reported as those of any other.
-TEST_F(CheckByRoot, AnotherUsersLibraryThatDoesHarm) {
+TEST_F(CheckRoot, AnotherUsersLibraryThatDoesHarm) {
   std::string file = m_experts.add(1, "harm");
   Build(file, AtLoad("abort();"));
   ASSERT_EQ(chown(file.c_str(), kNobody, 0), 0);
@@ -108,7 +108,7 @@ TEST_F(CheckByRoot, AnotherUsersLibraryThatDoesHarm) {
                                         file + "\""});
 }
 
-TEST_F(CheckByRoot, ALibraryThatManyCanChangeIsRefused) {
+TEST_F(CheckRoot, ALibraryThatManyCanChangeIsRefused) {
   std::string file = build();
   chmod(file.c_str(), 0777);
   expectRefused("\"" + file + "\": every user can change it; check it as an ordinary user");
@@ -121,7 +121,7 @@ TEST_F(CheckByRoot, ALibraryThatManyCanChangeIsRefused) {
   expectRefused("users 65533, 65534 can each change it or a directory on its path");
 }
 
-TEST_F(CheckByRoot, WithoutTheRightToBecomeTheUserItIsRefused) {
+TEST_F(CheckRoot, WithoutTheRightToBecomeTheUserItIsRefused) {
   ASSERT_EQ(chown(build().c_str(), kNobody, 0), 0);
   ExpectInChild([&] {
     ASSERT_EQ(prctl(PR_CAPBSET_DROP, CAP_SETUID, 0, 0, 0), 0);
@@ -130,7 +130,7 @@ TEST_F(CheckByRoot, WithoutTheRightToBecomeTheUserItIsRefused) {
 }
 
 // The library's check takes a relative path for missing; the loader must not look for it after all.
-TEST_F(CheckByRoot, ARelativePathIsNotLoadedFromThePresentDirectory) {
+TEST_F(CheckRoot, ARelativePathIsNotLoadedFromThePresentDirectory) {
   std::string file = build();
   ASSERT_EQ(chown(file.c_str(), kNobody, 0), 0);
   m_experts.add(GText(2), "relative", "./expert.so");
@@ -141,7 +141,7 @@ TEST_F(CheckByRoot, ARelativePathIsNotLoadedFromThePresentDirectory) {
 }
 
 // Its damage may be in the way that it talks back.
-TEST_F(CheckByRoot, ALibraryThatFloodsThePipeIsStopped) {
+TEST_F(CheckRoot, ALibraryThatFloodsThePipeIsStopped) {
   std::string file = m_experts.add(1, "flood");
   Build(file, AtLoad("char text[4096] = {}; for (int fd = 3; fd < 64; ++fd) "
                      "while (write(fd, text, sizeof text) > 0) {}"));

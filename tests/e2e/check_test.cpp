@@ -78,7 +78,7 @@ void ExpectTold(uint32_t n, const Messages& messages, const Messages& notes) {
 
 // ---- Libraries that are not what they should be
 
-TEST(CheckTree, ASoundLibraryHasNothingToTell) {
+TEST(Check, ASoundLibraryHasNothingToTell) {
   Experts e;
   Build(e.add(1, "good"), kGoodEntry);
   ExpectTold(1, {}, {});
@@ -87,7 +87,7 @@ TEST(CheckTree, ASoundLibraryHasNothingToTell) {
   EXPECT_EQ(text.out, "object expert good: sound\n");
 }
 
-TEST(CheckTree, AMissingEntryPoint) {
+TEST(Check, AMissingEntryPoint) {
   Experts e;
   std::string file = e.add(1, "bare");
   Build(file, "extern \"C\" int vltCreateObjectExpertToo() { return 0; }\n");
@@ -96,7 +96,7 @@ TEST(CheckTree, AMissingEntryPoint) {
   EXPECT_EQ(text.out, "object expert bare: NOT SOUND\n  " + HasNoEntry(file) + "\n");
 }
 
-TEST(CheckTree, AMissingDependency) {
+TEST(Check, AMissingDependency) {
   Experts e;
   std::string file = e.add(1, "needy");
   TempDir dir;
@@ -108,7 +108,7 @@ TEST(CheckTree, AMissingDependency) {
              {"libvlt_gone.so: cannot open shared object file: No such file or directory"});
 }
 
-TEST(CheckTree, AMissingSymbol) {
+TEST(Check, AMissingSymbol) {
   Experts e;
   std::string file = e.add(1, "unresolved");
   Build(file,
@@ -116,7 +116,7 @@ TEST(CheckTree, AMissingSymbol) {
   ExpectTold(1, {DoesNotLoad(file)}, {file + ": undefined symbol: vltGone"});
 }
 
-TEST(CheckTree, ATextFileAndAnEmptyOne) {
+TEST(Check, ATextFileAndAnEmptyOne) {
   Experts e;
   std::string text = e.add(1, "text"), empty = e.add(2, "empty");
   WriteBytes(text, std::string(200, 't'));
@@ -125,7 +125,7 @@ TEST(CheckTree, ATextFileAndAnEmptyOne) {
   ExpectTold(2, {DoesNotLoad(empty)}, {empty + ": file too short"});
 }
 
-TEST(CheckTree, ALibraryThatIsCutAtAnyPlaceTakesNothingDown) {
+TEST(Check, ALibraryThatIsCutAtAnyPlaceTakesNothingDown) {
   Experts e;
   std::string file = e.add(1, "cut");
   Build(file, kGoodEntry);
@@ -139,7 +139,7 @@ TEST(CheckTree, ALibraryThatIsCutAtAnyPlaceTakesNothingDown) {
   }
 }
 
-TEST(CheckTree, ALibraryForTheOtherWordSize) {
+TEST(Check, ALibraryForTheOtherWordSize) {
   Experts e;
   std::string file = e.add(1, "foreign");
   BuildForTheOtherWordSize(file);
@@ -150,7 +150,7 @@ TEST(CheckTree, ALibraryForTheOtherWordSize) {
                    : "the library is built for 64 bits, this program for 32"});
 }
 
-TEST(CheckTree, AMissingFileAndADirectoryDoNotExist) {
+TEST(Check, AMissingFileAndADirectoryDoNotExist) {
   Experts e;
   std::string missing = e.add(1, "missing"), directory = e.add(2, "directory");
   std::filesystem::create_directory(directory);
@@ -170,7 +170,7 @@ void OpenAllBut(const Experts& e, const std::string& place, mode_t mode) {
   ASSERT_EQ(chmod(place.c_str(), mode), 0);
 }
 
-TEST(CheckTree, AFileThatMayNotBeRead) {
+TEST(Check, AFileThatMayNotBeRead) {
   Experts e;
   std::string file = e.add(1, "secret");
   Build(file, kGoodEntry);
@@ -185,7 +185,7 @@ TEST(CheckTree, AFileThatMayNotBeRead) {
 }
 
 // The same by the tool, which runs as somebody else from the start.
-TEST_IN_CHILD(CheckTree, TheToolToldOfAFileThatMayNotBeRead) {
+TEST_IN_CHILD(Check, TheToolToldOfAFileThatMayNotBeRead) {
   Experts e;
   std::string file = e.add(1, "secret");
   Build(file, kGoodEntry);
@@ -200,14 +200,14 @@ TEST_IN_CHILD(CheckTree, TheToolToldOfAFileThatMayNotBeRead) {
 
 // ---- Paths that the system does not even let the check look at
 
-TEST(CheckTree, ANameThatIsTooLong) {
+TEST(Check, ANameThatIsTooLong) {
   Experts e;
   std::string file = e.add(GText(1), "long", e.file(std::string(300, 'x')));
   ExpectTold(1, {IsNot("is not readable", file)}, {});
 }
 
 // The list has the problems of all, those after such a path too.
-TEST(CheckTree, APathThatCannotBeLookedAtHidesNoOther) {
+TEST(Check, APathThatCannotBeLookedAtHidesNoOther) {
   Experts e;
   std::string circle = e.add(1, "circle"), missing = e.add(2, "missing");
   std::filesystem::create_symlink(circle, circle);
@@ -221,14 +221,14 @@ TEST(CheckTree, APathThatCannotBeLookedAtHidesNoOther) {
   });
 }
 
-TEST(CheckTree, LinksThatGoInCircles) {
+TEST(Check, LinksThatGoInCircles) {
   Experts e;
   std::string file = e.add(1, "circle");
   std::filesystem::create_symlink(file, file);
   ExpectTold(1, {IsNot("is not readable", file)}, {});
 }
 
-TEST(CheckTree, ADirectoryThatMayNotBeEntered) {
+TEST(Check, ADirectoryThatMayNotBeEntered) {
   if (geteuid() != 0) {
     printf("NOT TESTED: needs root, to have a directory of another user\n");
     GTEST_SKIP();
@@ -256,14 +256,14 @@ void ExpectNote(const std::string& statement, const std::string& note) {
   EXPECT_EQ(found.notes, Messages{note}) << statement;
 }
 
-TEST(CheckTree, ACrashAtLoad) {
+TEST(Check, ACrashAtLoad) {
   ExpectNote("abort();", "the process that loaded the library died: Aborted");
   ExpectNote("signal(SIGSEGV, SIG_DFL); raise(SIGSEGV);",
              "the process that loaded the library died: Segmentation fault");
 }
 
 // Whatever the code, none of them means that the component is sound.
-TEST(CheckTree, AnExitAtLoadIsNeverSound) {
+TEST(Check, AnExitAtLoadIsNeverSound) {
   for (int code : {0, 1, 7}) {
     std::string text = std::to_string(code);
     ExpectNote("exit(" + text + ");", "the library ended its process with " + text);
@@ -271,7 +271,7 @@ TEST(CheckTree, AnExitAtLoadIsNeverSound) {
   }
 }
 
-TEST(CheckTree, AHangAtLoadEndsAtTheTimeLimit) {
+TEST(Check, AHangAtLoadEndsAtTheTimeLimit) {
   auto begin = std::chrono::steady_clock::now();
   ExpectNote("for (;;) pause();", "the library did not load within 10 s; its process was killed");
   std::chrono::duration<double> taken = std::chrono::steady_clock::now() - begin;
@@ -281,7 +281,7 @@ TEST(CheckTree, AHangAtLoadEndsAtTheTimeLimit) {
 }
 
 // What a library starts neither holds the check up nor outlives it.
-TEST(CheckTree, AProcessStartedAtLoad) {
+TEST(Check, AProcessStartedAtLoad) {
   Experts e;
   TempDir dir;
   std::string pidFile = dir / "pid";
@@ -306,7 +306,7 @@ TEST(CheckTree, AProcessStartedAtLoad) {
   })) << pid;
 }
 
-TEST(CheckTree, WhatALibraryPrintsAtLoadIsNotShown) {
+TEST(Check, WhatALibraryPrintsAtLoadIsNotShown) {
   Experts e;
   Build(e.add(1, "noisy"),
         AtLoad("(void)!write(1, \"MMMnoise\\n\", 9); (void)!write(2, \"E\\n\", 2);"));
@@ -318,7 +318,7 @@ TEST(CheckTree, WhatALibraryPrintsAtLoadIsNotShown) {
 
 // ---- The whole tree
 
-TEST(CheckTree, OneBadLibraryHidesNoOther) {
+TEST(Check, OneBadLibraryHidesNoOther) {
   Experts e;
   Build(e.add(1, "good"), kGoodEntry);
   Build(e.add(2, "crash"), AtLoad("abort();"));
@@ -338,7 +338,7 @@ TEST(CheckTree, OneBadLibraryHidesNoOther) {
 
 // The null identifier is the library's word for all components: what the others do, and that one of them
 // ends the process, is not this one's.
-TEST(CheckTree, AComponentWithoutAnIdentifierIsNotTakenForAll) {
+TEST(Check, AComponentWithoutAnIdentifierIsNotTakenForAll) {
   Experts e;
   Build(e.add(1, "crash"), AtLoad("abort();"));
   Build(e.add("unreadable", "nameless", e.file("nameless")), kGoodEntry);
@@ -357,7 +357,7 @@ TEST(CheckTree, AComponentWithoutAnIdentifierIsNotTakenForAll) {
   EXPECT_EQ(none.out, "");
 }
 
-TEST(CheckTree, AnUnknownComponentIsNotFound) {
+TEST(Check, AnUnknownComponentIsNotFound) {
   Experts e;
   ProgramResult result = Vltctl({"check", GText(77)});
   EXPECT_EQ(result.exitCode, kNotFound);

@@ -51,7 +51,7 @@ std::vector<std::string> NamesIn(const std::string& directory) {
 bool BecomeNobody() { return setgid(kNobody) == 0 && setuid(kNobody) == 0; }
 
 // "/Library" is the test's own: only then may anything be made there.
-class Loading : public testing::Test {
+class DiagnosticsLoad : public testing::Test {
  protected:
   void SetUp() override {
     const char* root = getenv("VLT_PRIVATE_ROOT");
@@ -68,13 +68,13 @@ class Loading : public testing::Test {
   }
 };
 
-TEST_F(Loading, WithoutOptionsThereIsADirectoryAndNoLog) {
+TEST_F(DiagnosticsLoad, WithoutOptionsThereIsADirectoryAndNoLog) {
   ExpectSilentLoad();
   EXPECT_EQ(NamesIn(kLogs), std::vector<std::string>());
   EXPECT_EQ(ModeOf(kLogs), 0777);
 }
 
-TEST_F(Loading, TheFirstLineTellsOfTheLoad) {
+TEST_F(DiagnosticsLoad, TheFirstLineTellsOfTheLoad) {
   options("[vlt]\nSeverity = 32\nTarget = 1\n");
   ExpectSilentLoad();
   std::vector<std::string> names = NamesIn(kLogs);
@@ -83,7 +83,7 @@ TEST_F(Loading, TheFirstLineTellsOfTheLoad) {
   EXPECT_EQ(ReadBytes(kLogs + "/" + names[0]), "  vltutils: Process attach\n");
 }
 
-TEST_F(Loading, WhatASectionLacksComesFromAllComponents) {
+TEST_F(DiagnosticsLoad, WhatASectionLacksComesFromAllComponents) {
   const std::string line = "  vltutils: Process attach\n";
   options("[vlt]\nTarget = 4\n[AllComponents]\nSeverity = 32\nTarget = 2\n");
   EXPECT_EQ(Load().err, line);
@@ -96,7 +96,7 @@ TEST_F(Loading, WhatASectionLacksComesFromAllComponents) {
   EXPECT_EQ(NamesIn(kLogs), std::vector<std::string>());
 }
 
-TEST_F(Loading, ADiskThatIsShortGetsNoLog) {
+TEST_F(DiagnosticsLoad, ADiskThatIsShortGetsNoLog) {
   options("[vlt]\nSeverity = 32\nTarget = 5\nLowDiskThreshold = 1000000\n");
   fs::create_directories(kLogs);
   ExpectInChild([] {
@@ -113,7 +113,7 @@ TEST_F(Loading, ADiskThatIsShortGetsNoLog) {
 
 // The log is asked for in each of the following, so that it is tried to be opened.
 
-TEST_F(Loading, AnUnwritableHomeIsNothingToSpeakOf) {
+TEST_F(DiagnosticsLoad, AnUnwritableHomeIsNothingToSpeakOf) {
   options("[vlt]\nSeverity = 34\nTarget = 1\n");
   TempDir home;
   chmod(home.path().c_str(), 0755);
@@ -128,7 +128,7 @@ TEST_F(Loading, AnUnwritableHomeIsNothingToSpeakOf) {
   EXPECT_EQ(NamesIn(home.path()), std::vector<std::string>());
 }
 
-TEST_F(Loading, AHomeOfAnyLengthHasTheLog) {
+TEST_F(DiagnosticsLoad, AHomeOfAnyLengthHasTheLog) {
   options("[vlt]\nSeverity = 32\nTarget = 1\n");
   TempDir dir;
   std::string home = dir.makeDir(std::string(200, 'h') + "/" + std::string(200, 'i'));
@@ -141,7 +141,7 @@ TEST_F(Loading, AHomeOfAnyLengthHasTheLog) {
   EXPECT_EQ(NamesIn(home + "/Library/Logs/KOR").size(), 1u);
 }
 
-TEST_F(Loading, WithoutAHomeTheLogIsInTheTemporaryPlace) {
+TEST_F(DiagnosticsLoad, WithoutAHomeTheLogIsInTheTemporaryPlace) {
   options("[vlt]\nSeverity = 32\nTarget = 1\n");
   for (const char* mode : {"mode=1777", "mode=755", "ro"}) {
     int code = -1;
@@ -163,7 +163,7 @@ TEST_F(Loading, WithoutAHomeTheLogIsInTheTemporaryPlace) {
 }
 
 // Neither the log nor the lock of its lines can be made.
-TEST_F(Loading, AReadOnlySystemIsNothingToSpeakOf) {
+TEST_F(DiagnosticsLoad, AReadOnlySystemIsNothingToSpeakOf) {
   options("[vlt]\nSeverity = 34\nTarget = 1\n");
   ExpectInChild([] {
     if (unshare(CLONE_NEWNS) != 0 ||
@@ -177,7 +177,7 @@ TEST_F(Loading, AReadOnlySystemIsNothingToSpeakOf) {
   EXPECT_FALSE(Exists(kLogs));
 }
 
-TEST_F(Loading, OptionsThatCannotBeReadAreNone) {
+TEST_F(DiagnosticsLoad, OptionsThatCannotBeReadAreNone) {
   for (const std::string& text :
        {std::string("\xFF\xFE[\0", 4), std::string("[vlt"), std::string(100000, '['),
         std::string("[vlt]\nSeverity = -1x\nTarget = 99999999999999999999\n")}) {

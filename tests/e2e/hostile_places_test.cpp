@@ -21,7 +21,7 @@ namespace fs = std::filesystem;
 
 void MakePipe(const std::string& path) { ASSERT_EQ(mkfifo(path.c_str(), 0666), 0) << path; }
 
-TEST(Hostile, PipesPlainFilesAndLinksInBundles) {
+TEST(HostilePlaces, PipesPlainFilesAndLinksInBundles) {
   Besieged b;
   std::string experts = b.root() + "/Experts/", dictionaries = b.root() + "/Data Dictionaries/";
   fs::create_directories(experts + "pipe-inside.vle/Resources");
@@ -47,14 +47,14 @@ TEST(Hostile, PipesPlainFilesAndLinksInBundles) {
   b.expectGood();
 }
 
-TEST(Hostile, ALinkToTheDatabaseAsRegistrationFile) {
+TEST(HostilePlaces, ALinkToTheDatabaseAsRegistrationFile) {
   Besieged b;
   fs::create_directories(b.root() + "/Experts/self.vle/Resources");
   fs::create_symlink(b.database(), b.root() + "/Experts/self.vle/Resources/Info.vlr");
   b.expectGood();
 }
 
-TEST(Hostile, APipeInTheDatabasesPlaceIsRefusedAndStays) {
+TEST(HostilePlaces, APipeInTheDatabasesPlaceIsRefusedAndStays) {
   Besieged b;
   MakePipe(b.database());
   ExpectStart("int 1");
@@ -63,7 +63,7 @@ TEST(Hostile, APipeInTheDatabasesPlaceIsRefusedAndStays) {
   b.expectGood();
 }
 
-TEST(Hostile, ADirectoryInTheDatabasesPlaceIsRefusedAndStays) {
+TEST(HostilePlaces, ADirectoryInTheDatabasesPlaceIsRefusedAndStays) {
   Besieged b;
   fs::create_directories(b.database() + "/kept");
   ExpectStart("int 1");
@@ -75,7 +75,7 @@ TEST(Hostile, ADirectoryInTheDatabasesPlaceIsRefusedAndStays) {
 // ---- The sidecar's place
 
 // It says nothing about the database, which is taken as it is.
-TEST(Hostile, APipeInTheSidecarsPlaceLosesNothing) {
+TEST(HostilePlaces, APipeInTheSidecarsPlaceLosesNothing) {
   Besieged b;
   ExpectStart("ok");
   unlink(b.sidecar().c_str());
@@ -87,7 +87,7 @@ TEST(Hostile, APipeInTheSidecarsPlaceLosesNothing) {
 }
 
 // A sidecar that opens but is short: one process without components, and the next starts are whole.
-TEST(Hostile, ADirectoryInTheSidecarsPlaceCostsOneStart) {
+TEST(HostilePlaces, ADirectoryInTheSidecarsPlaceCostsOneStart) {
   Besieged b;
   ExpectStart("ok");
   std::string contents = ReadBytes(b.database());
@@ -108,7 +108,7 @@ TEST(Hostile, ADirectoryInTheSidecarsPlaceCostsOneStart) {
   EXPECT_EQ(copies, 1);
 }
 
-TEST(Hostile, ALinkInTheSidecarsPlaceIsNotWrittenThrough) {
+TEST(HostilePlaces, ALinkInTheSidecarsPlaceIsNotWrittenThrough) {
   Besieged b;
   ExpectStart("ok");
   TempDir elsewhere;
@@ -121,7 +121,7 @@ TEST(Hostile, ALinkInTheSidecarsPlaceIsNotWrittenThrough) {
 
 // ---- Paths
 
-TEST(Hostile, BundleNamesThatAnIniFileCannotHold) {
+TEST(HostilePlaces, BundleNamesThatAnIniFileCannotHold) {
   Besieged b;
   uint32_t n = 1;
   for (const char* name : {"a=b", ";x", "[x]", "\"q\"", "tab\there", "back\\slash", "x Line0001",
@@ -139,7 +139,7 @@ TEST(Hostile, BundleNamesThatAnIniFileCannotHold) {
   EXPECT_FALSE(db.has("feed.vle/Resources/Info.vlr"));
 }
 
-TEST(Hostile, RootsThatAnIniFileCannotHold) {
+TEST(HostilePlaces, RootsThatAnIniFileCannotHold) {
   for (const char* name : {"a=b", "[x]", ";x", "x Line0001", " x "}) {
     Besieged b;
     TempDir place;
@@ -158,7 +158,7 @@ TEST(Hostile, RootsThatAnIniFileCannotHold) {
 }
 
 // The lock of a file is named after its path: too long for an entry of a directory.
-TEST(Hostile, AVeryLongRootHasItsLockAndItsComponents) {
+TEST(HostilePlaces, AVeryLongRootHasItsLockAndItsComponents) {
   Besieged b;
   TempDir place;
   std::string root = place.path();
@@ -173,7 +173,7 @@ TEST(Hostile, AVeryLongRootHasItsLockAndItsComponents) {
   EXPECT_EQ(Hex(ReadBytes(root + "/vlt.vl5")), Md5Sum(root + "/vlt.vlr"));
 }
 
-TEST(Hostile, InvalidTextInNamesUnderAnUtf8Locale) {
+TEST(HostilePlaces, InvalidTextInNamesUnderAnUtf8Locale) {
   Besieged b;
   b.plant(Component("caf\xC3\xA9", 1), "caf\xC3\xA9.vle");
   b.plant(Component("bad\xFF\xFE", 2), "bad\xFF\xFE.vle");
@@ -195,7 +195,7 @@ TEST(Hostile, InvalidTextInNamesUnderAnUtf8Locale) {
 // ---- Scarce resources
 
 // A full table of descriptors, at each degree: a refusal by result or exception, never a loss.
-TEST(Hostile, AFullDescriptorTableLosesNothing) {
+TEST(HostilePlaces, AFullDescriptorTableLosesNothing) {
   if (!kCanLimitMemory) GTEST_SKIP() << "a sanitizer opens descriptors for its own checks";
   Besieged b;
   b.plant(Component("Other", 1, "FileName = \"Other\"\n"));
@@ -229,7 +229,7 @@ TEST(Hostile, AFullDescriptorTableLosesNothing) {
 }
 
 // A medium that is full: the file size limit stops every write.
-TEST(Hostile, AWriteThatFailsLosesNothing) {
+TEST(HostilePlaces, AWriteThatFailsLosesNothing) {
   Besieged b;
   ExpectStart("ok");
   std::string before = ReadBytes(b.database());

@@ -444,7 +444,7 @@ TEST_F(Planted, WhatIsNoLockFileInPlaceOfOne) {
 
 // ---- What must go on working
 
-class HostileBundle : public Planted {
+class PlantedBundle : public Planted {
  protected:
   // A bundle of another user's, registered while it was open, and closed after that.
   void expectStartOfNobody(const std::string& closed, mode_t mode) {
@@ -474,18 +474,18 @@ class HostileBundle : public Planted {
   }
 };
 
-TEST_F(HostileBundle, OfAnotherUserWithMode700) { expectStartOfNobody("x.vle", 0700); }
+TEST_F(PlantedBundle, OfAnotherUserWithMode700) { expectStartOfNobody("x.vle", 0700); }
 
-TEST_F(HostileBundle, OfAnotherUserWithPrivateResources) {
+TEST_F(PlantedBundle, OfAnotherUserWithPrivateResources) {
   expectStartOfNobody("x.vle/Resources", 0700);
 }
 
-TEST_F(HostileBundle, OfAnotherUserWithAPrivateRegistrationFile) {
+TEST_F(PlantedBundle, OfAnotherUserWithAPrivateRegistrationFile) {
   expectStartOfNobody("x.vle/Resources/Info.vlr", 0600);
 }
 
 // Never registered before: the other components are there all the same.
-TEST_F(HostileBundle, MadeUnderAPrivateUmask) {
+TEST_F(PlantedBundle, MadeUnderAPrivateUmask) {
   Besieged b;
   chmod(b.root().c_str(), 0777);
   chmod(fs::path(b.root()).parent_path().c_str(), 0755);
@@ -506,7 +506,7 @@ TEST_F(HostileBundle, MadeUnderAPrivateUmask) {
   ExpectStart([](IvltRegistrar& r) { EXPECT_EQ(Find(r, G(0xC105ED)), S_OK); });
 }
 
-TEST_F(HostileBundle, ARelativePathInTheDatabaseIsDropped) {
+TEST_F(PlantedBundle, ARelativePathInTheDatabaseIsDropped) {
   Besieged b;
   ExpectStart("ok");
   std::string bytes = ReadBytes(b.database());

@@ -191,9 +191,9 @@ int WithOrphans(const std::function<int()>& body) {
   return host.wait(kLongestMs + kDeadlineMs);
 }
 
-class PreFork : public testing::Test {
+class Prefork : public testing::Test {
  protected:
-  PreFork() { i.addDictionary("Core", "Core", GText(1), 7, "co"); }
+  Prefork() { i.addDictionary("Core", "Core", GText(1), 7, "co"); }
 
   void run(Parent parent, int times) {
     int stored = 0, refused = 0, missing = 0;
@@ -252,12 +252,12 @@ class PreFork : public testing::Test {
 };
 
 // The parent has the lock as long as it lives: what a worker cannot save it is told.
-TEST_F(PreFork, WhatWorkersOfALivingParentAreAnsweredIsOnDisk) {
+TEST_F(Prefork, WhatWorkersOfALivingParentAreAnsweredIsOnDisk) {
   run(Parent::Stays, FullSize() ? 12 : 2);
 }
 
 // One of the workers has the lock from its first save on.
-TEST_F(PreFork, WhatWorkersOfAnEndedParentAreAnsweredIsOnDisk) {
+TEST_F(Prefork, WhatWorkersOfAnEndedParentAreAnsweredIsOnDisk) {
   run(Parent::Ends, FullSize() ? 12 : 2);
 }
 
@@ -271,7 +271,7 @@ __attribute__((constructor)) void ActAsParent() {
   _exit(ForkWorkers(Parent::Stays, SharedAnswers(std::string(answers))));
 }
 
-TEST_F(PreFork, SlowWritesTearNothing) {
+TEST_F(Prefork, SlowWritesTearNothing) {
   std::string missing = Tracing::Missing();
   if (!missing.empty()) {
     printf("NOT TESTED: workers with slow writes; %s\n", missing.c_str());
@@ -301,7 +301,7 @@ TEST_F(PreFork, SlowWritesTearNothing) {
 
 // ---- One process that has lost its lock
 
-TEST_F(PreFork, ADaemonHasItsLockAgainAtItsNextCall) {
+TEST_F(Prefork, ADaemonHasItsLockAgainAtItsNextCall) {
   EXPECT_EQ(WithOrphans([] {
               IvltRegistrar* r = nullptr;
               if (GetRegistrar(&r) != "ok") return 1;
@@ -324,7 +324,7 @@ TEST_F(PreFork, ADaemonHasItsLockAgainAtItsNextCall) {
   ExpectWhole(i);
 }
 
-TEST_F(PreFork, AHostThatClosesAllDescriptorsHasItsLockAgainAtItsNextCall) {
+TEST_F(Prefork, AHostThatClosesAllDescriptorsHasItsLockAgainAtItsNextCall) {
   ExpectInChild([] {
     IvltRegistrar* r = nullptr;
     ASSERT_EQ(GetRegistrar(&r), "ok");
@@ -338,7 +338,7 @@ TEST_F(PreFork, AHostThatClosesAllDescriptorsHasItsLockAgainAtItsNextCall) {
 }
 
 // Loses the lock of a process, has another one register a component, and lets both go on.
-class LostLock : public PreFork {
+class PreforkLostLock : public Prefork {
  protected:
   void expectNothingLost(const std::function<void()>& lose) {
     Signal ready, otherIsThere, tried, otherIsGone;
@@ -381,11 +381,11 @@ class LostLock : public PreFork {
   }
 };
 
-TEST_F(LostLock, ToACleanerOfTheLockDirectory) {
+TEST_F(PreforkLostLock, ToACleanerOfTheLockDirectory) {
   expectNothingLost([] { unlink(LockFile().c_str()); });
 }
 
-TEST_F(LostLock, ToACleanerOfTheWholeSharedDirectory) {
+TEST_F(PreforkLostLock, ToACleanerOfTheWholeSharedDirectory) {
   expectNothingLost([] { fs::remove_all(fs::path(LockFile()).parent_path()); });
 }
 
@@ -403,7 +403,7 @@ std::vector<int> LockDescriptors() {
   return numbers;
 }
 
-TEST_F(LostLock, ToAHostThatReplacedTheDescriptor) {
+TEST_F(PreforkLostLock, ToAHostThatReplacedTheDescriptor) {
   expectNothingLost([] {
     int null = open("/dev/null", O_RDWR | O_CLOEXEC);
     for (int number : LockDescriptors()) dup2(null, number);
@@ -411,7 +411,7 @@ TEST_F(LostLock, ToAHostThatReplacedTheDescriptor) {
   });
 }
 
-TEST_F(LostLock, ToAHostThatClosedTheDescriptor) {
+TEST_F(PreforkLostLock, ToAHostThatClosedTheDescriptor) {
   expectNothingLost([] {
     for (int number : LockDescriptors()) close(number);
   });

@@ -45,12 +45,12 @@ void MakeHuge(const std::string& file, const std::string& end = "") {
   fclose(out);
 }
 
-class HostileFiles : public testing::Test {
+class VltctlHostile : public testing::Test {
  protected:
-  HostileFiles() { fs::create_directories(m_data); }
+  VltctlHostile() { fs::create_directories(m_data); }
   std::string log(const std::string& name) const { return m_logs + name; }
   void makeLogs() { fs::create_directories(m_logs); }
-  ~HostileFiles() override { fs::remove_all(m_logs); }
+  ~VltctlHostile() override { fs::remove_all(m_logs); }
 
   Experts m_installation;
   const std::string m_data = m_installation.root() + "/Data";
@@ -63,7 +63,7 @@ class HostileFiles : public testing::Test {
 constexpr const char* kEvil = "evil\x1B[31m\x7F\x07\xC2\x9B";
 constexpr const char* kShown = "evil\\x1B[31m\\x7F\\x07\\u{9B}";
 
-TEST_F(HostileFiles, NamesOfComponentsAreShownEscaped) {
+TEST_F(VltctlHostile, NamesOfComponentsAreShownEscaped) {
   std::string name = kEvil, file = m_installation.file(kEvil);
   m_installation.addBundle("Experts", "x.vle",
                            "[KORComponents]\n" + name + " = \"" + name + "\"\n[" + name +
@@ -78,7 +78,7 @@ TEST_F(HostileFiles, NamesOfComponentsAreShownEscaped) {
   }
 }
 
-TEST_F(HostileFiles, WhatTheLoaderSaysIsShownEscaped) {
+TEST_F(VltctlHostile, WhatTheLoaderSaysIsShownEscaped) {
   std::string file = m_installation.add(1, "loader");
   TempDir dir;
   std::string needed = std::string("-Wl,-soname,") + kEvil;
@@ -91,7 +91,7 @@ TEST_F(HostileFiles, WhatTheLoaderSaysIsShownEscaped) {
       << result.out;
 }
 
-TEST_F(HostileFiles, LinesOfTheLogAreShownEscaped) {
+TEST_F(VltctlHostile, LinesOfTheLogAreShownEscaped) {
   makeLogs();
   WriteBytes(log("20260101_000000-vlTracer-00000001.log"), std::string("  ") + kEvil + "\n  b\n");
   ProgramResult result = Look({"trace"});
@@ -99,7 +99,7 @@ TEST_F(HostileFiles, LinesOfTheLogAreShownEscaped) {
   EXPECT_NE(result.out.find(std::string("|   ") + kShown + "\n|   b\n"), std::string::npos);
 }
 
-TEST_F(HostileFiles, ArgumentsAndFileNamesAreShownEscaped) {
+TEST_F(VltctlHostile, ArgumentsAndFileNamesAreShownEscaped) {
   ProgramResult verify = Look({"verify", m_data + "/" + kEvil});
   ExpectNothingToObey(verify.out + verify.err);
   EXPECT_NE(verify.out.find(kShown), std::string::npos);
@@ -112,7 +112,7 @@ TEST_F(HostileFiles, ArgumentsAndFileNamesAreShownEscaped) {
   }
 }
 
-TEST_F(HostileFiles, ValuesOfFilesAreShownEscaped) {
+TEST_F(VltctlHostile, ValuesOfFilesAreShownEscaped) {
   std::string evil = kEvil;
   WriteBytes(m_data + "/vltjar.ini", "[" + evil + "]\n" + evil + " = " + evil + "\n");
   ProgramResult jar = Look({"jar"});
@@ -127,7 +127,7 @@ TEST_F(HostileFiles, ValuesOfFilesAreShownEscaped) {
 
 // ---- Files
 
-TEST_F(HostileFiles, TheLogIsTheNewestRegularFile) {
+TEST_F(VltctlHostile, TheLogIsTheNewestRegularFile) {
   makeLogs();
   WriteBytes(log("20260101_000000-vlTracer-00000001.log"), "  the log\n");
   ASSERT_EQ(mkfifo(log("20990101_000000-vlTracer-00000001.log").c_str(), 0666), 0);
@@ -139,7 +139,7 @@ TEST_F(HostileFiles, TheLogIsTheNewestRegularFile) {
   EXPECT_NE(result.out.find("|   the log\n"), std::string::npos) << result.out;
 }
 
-TEST_F(HostileFiles, OfALogThatHasGrownTheEndIsRead) {
+TEST_F(VltctlHostile, OfALogThatHasGrownTheEndIsRead) {
   makeLogs();
   MakeHuge(log("20260101_000000-vlTracer-00000001.log"), "\n  one\n  two\n");
   ProgramResult result = Look({"trace"});
@@ -147,7 +147,7 @@ TEST_F(HostileFiles, OfALogThatHasGrownTheEndIsRead) {
   EXPECT_NE(result.out.find("|   one\n|   two\n"), std::string::npos);
 }
 
-TEST_F(HostileFiles, TheLastTenLinesOfALongLogAreWhole) {
+TEST_F(VltctlHostile, TheLastTenLinesOfALongLogAreWhole) {
   makeLogs();
   std::string text, last;
   for (int n = 0; n < 2000; ++n) text += std::to_string(n) + std::string(2000, 'x') + "\n";
@@ -158,7 +158,7 @@ TEST_F(HostileFiles, TheLastTenLinesOfALongLogAreWhole) {
   EXPECT_EQ(result.out.substr(result.out.find("\n| ") + 1), last);
 }
 
-TEST_F(HostileFiles, AHugeFileIsNotRead) {
+TEST_F(VltctlHostile, AHugeFileIsNotRead) {
   struct Case {
     std::vector<std::string> command;
     std::string file;
@@ -179,7 +179,7 @@ TEST_F(HostileFiles, AHugeFileIsNotRead) {
   }
 }
 
-TEST_F(HostileFiles, OfAHugeSidecarTheDigestIsRead) {
+TEST_F(VltctlHostile, OfAHugeSidecarTheDigestIsRead) {
   WriteBytes(m_data + "/x.ini", "[a]\nb = 1\n");
   MakeHuge(m_data + "/x.vl5");
   ProgramResult result = Look({"verify", m_data + "/x.ini"});
@@ -187,7 +187,7 @@ TEST_F(HostileFiles, OfAHugeSidecarTheDigestIsRead) {
   EXPECT_NE(result.out.find("the digest differs"), std::string::npos) << result.out;
 }
 
-TEST_F(HostileFiles, PipesAndDevicesAreNotOpened) {
+TEST_F(VltctlHostile, PipesAndDevicesAreNotOpened) {
   const std::string pipe = m_data + "/pipe", device = m_data + "/device";
   ASSERT_EQ(mkfifo(pipe.c_str(), 0666), 0);
   fs::create_symlink("/dev/zero", device);

@@ -98,7 +98,7 @@ std::vector<std::string> ExportedFunctions() {
   return names;
 }
 
-TEST(OutOfMemoryCalls, EveryExportedFunctionIsAmongThem) {
+TEST(OomCalls, EveryExportedFunctionIsAmongThem) {
   std::vector<std::string> exported = ExportedFunctions();
   EXPECT_GE(exported.size(), 60u);
   for (const std::string& name : exported) {
@@ -109,7 +109,7 @@ TEST(OutOfMemoryCalls, EveryExportedFunctionIsAmongThem) {
   }
 }
 
-class OutOfMemory : public testing::TestWithParam<bool> {
+class Oom : public testing::TestWithParam<bool> {
  protected:
   void SetUp() override {
     if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer has a malloc of its own";
@@ -117,7 +117,7 @@ class OutOfMemory : public testing::TestWithParam<bool> {
   }
 };
 
-TEST_P(OutOfMemory, EveryCallSurvivesEveryFailedAllocation) {
+TEST_P(Oom, EveryCallSurvivesEveryFailedAllocation) {
   long total = 0, calls = 0, without = 0;
   for (const Call& call : AllCalls()) {
     Installation installation;
@@ -150,7 +150,7 @@ TEST_P(OutOfMemory, EveryCallSurvivesEveryFailedAllocation) {
 
 // Calls that do more the first time in a process: a process for each allocation. Whatever failed, the
 // same process and a later one have it then.
-TEST_P(OutOfMemory, FirstCallsSurviveEveryFailedAllocation) {
+TEST_P(Oom, FirstCallsSurviveEveryFailedAllocation) {
   const Call firsts[] = {
       {"vltGetTraceFlags", [] { return vltGetTraceFlags() == 0x21 ? S_OK : E_FAIL; }},
       {"vltGetServerIdentity",
@@ -183,7 +183,7 @@ TEST_P(OutOfMemory, FirstCallsSurviveEveryFailedAllocation) {
 }
 
 // Whatever fails in the first start, the next one finds everything.
-TEST_P(OutOfMemory, AFailedFirstStartLosesNothing) {
+TEST_P(Oom, AFailedFirstStartLosesNothing) {
   Installation installation;
   MakeInstallation(installation);
   long tried = 0;
@@ -209,7 +209,7 @@ TEST_P(OutOfMemory, AFailedFirstStartLosesNothing) {
 }
 
 // A start that fails over a database that is there sets nothing aside: what was saved is found.
-TEST_P(OutOfMemory, AFailedLaterStartLosesNothing) {
+TEST_P(Oom, AFailedLaterStartLosesNothing) {
   Installation installation;
   MakeInstallation(installation);
   auto remember = [] {
@@ -239,7 +239,7 @@ TEST_P(OutOfMemory, AFailedLaterStartLosesNothing) {
   EXPECT_GT(tried, 10);
 }
 
-INSTANTIATE_TEST_SUITE_P(Failures, OutOfMemory, testing::Bool(),
+INSTANTIATE_TEST_SUITE_P(Failures, Oom, testing::Bool(),
                          [](const auto& info) { return info.param ? "ForEver" : "Once"; });
 
 }  // namespace

@@ -16,7 +16,7 @@ namespace vlt::test::power {
 namespace {
 
 // What is below the directory in each state: "name=bytes name=bytes".
-class Simulator : public testing::Test {
+class States : public testing::Test {
  protected:
   void SetUp() override {
     if (!TracedChild::Missing().empty()) GTEST_SKIP() << TracedChild::Missing();
@@ -65,7 +65,7 @@ class Simulator : public testing::Test {
   const std::string zeros = std::string(5, '\0');
 };
 
-TEST_F(Simulator, ARenameOverAnUnsyncedFileMayLeaveItEmptyOrZeros) {
+TEST_F(States, ARenameOverAnUnsyncedFileMayLeaveItEmptyOrZeros) {
   auto found = states(Model::OrderedMetadata, [&] {
     write("new", "fresh", false);
     rename("new", "file");
@@ -75,7 +75,7 @@ TEST_F(Simulator, ARenameOverAnUnsyncedFileMayLeaveItEmptyOrZeros) {
                                           "file=" + zeros}));
 }
 
-TEST_F(Simulator, ARenameOverASyncedFileLeavesTheOldOrTheNew) {
+TEST_F(States, ARenameOverASyncedFileLeavesTheOldOrTheNew) {
   auto found = states(Model::StrictPosix, [&] {
     write("new", "fresh", true);
     rename("new", "file");
@@ -86,7 +86,7 @@ TEST_F(Simulator, ARenameOverASyncedFileLeavesTheOldOrTheNew) {
   EXPECT_TRUE(found.count("file=fresh"));
 }
 
-TEST_F(Simulator, ANewDirectoryIsThereOnceItsParentIsSynced) {
+TEST_F(States, ANewDirectoryIsThereOnceItsParentIsSynced) {
   auto calls = [&](bool withParent) {
     mkdir((root + "/Data").c_str(), 0777);
     write("Data/x", "1", true);
@@ -102,7 +102,7 @@ TEST_F(Simulator, ANewDirectoryIsThereOnceItsParentIsSynced) {
   EXPECT_FALSE(lost(states(Model::OrderedMetadata, [&] { calls(false); })));
 }
 
-TEST_F(Simulator, TwoNamesAreOneFile) {
+TEST_F(States, TwoNamesAreOneFile) {
   auto found = states(Model::OrderedMetadata, [&] {
     EXPECT_EQ(link((root + "/file").c_str(), (root + "/new").c_str()), 0);
     syncDirectory();
@@ -113,7 +113,7 @@ TEST_F(Simulator, TwoNamesAreOneFile) {
   EXPECT_EQ(found, (std::set<std::string>{"file=old", "file=old new=old", "file=NEW new=NEW"}));
 }
 
-TEST_F(Simulator, ARenameOverOneOfTwoNamesLeavesTheOther) {
+TEST_F(States, ARenameOverOneOfTwoNamesLeavesTheOther) {
   auto found = states(Model::OrderedMetadata, [&] {
     EXPECT_EQ(link((root + "/file").c_str(), (root + "/new").c_str()), 0);
     syncDirectory();

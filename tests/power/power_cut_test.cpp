@@ -200,11 +200,11 @@ TEST_F(PowerCut, AfterAStartThatWasKilled) {
   checkStates("start after a killed one");
 }
 
-class JarPowerCut : public PowerCut {
+class PowerCutJar : public PowerCut {
   ChangingIdentities m_identities;
 };
 
-TEST_F(JarPowerCut, InSaves) {
+TEST_F(PowerCutJar, InSaves) {
   setUpClient(true);
   record([](PromisedClient& client) {
     return client.setCookie(100) && client.askIdentity() && client.setCookie(101);
@@ -212,7 +212,7 @@ TEST_F(JarPowerCut, InSaves) {
   checkStates("jar");
 }
 
-TEST_F(JarPowerCut, InAFreshJarInAFreshDirectory) {
+TEST_F(PowerCutJar, InAFreshJarInAFreshDirectory) {
   setUpClient();
   fs::remove_all(i.root() + "/Data");
   record([](PromisedClient& client) {
@@ -221,7 +221,7 @@ TEST_F(JarPowerCut, InAFreshJarInAFreshDirectory) {
   checkStates("fresh jar");
 }
 
-TEST_F(JarPowerCut, InAFreshJarAndTheFirstStartAfterIt) {
+TEST_F(PowerCutJar, InAFreshJarAndTheFirstStartAfterIt) {
   record([](PromisedClient& client) {
     return client.askIdentity() && client.setCookie(100) && client.start() == "ok" &&
            Save(client, 100, 80);

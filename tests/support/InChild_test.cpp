@@ -38,7 +38,7 @@ struct Arrived {
   int code;
 };
 
-TEST(Child, FailuresArriveOnceWithPlaceAndTextWhateverTheResult) {
+TEST(InChildFailures, FailuresArriveOnceWithPlaceAndTextWhateverTheResult) {
   int line = __LINE__ + 1;
   Arrived a([] { EXPECT_TRUE(false) << "this text"; });
   EXPECT_EQ(a.code, 0);
@@ -49,7 +49,7 @@ TEST(Child, FailuresArriveOnceWithPlaceAndTextWhateverTheResult) {
   EXPECT_EQ(a.at(0).line_number(), line);
 }
 
-TEST(Child, FailuresOfAChildsChildArriveOnce) {
+TEST(InChildFailures, FailuresOfAChildsChildArriveOnce) {
   Arrived a([] { Arrived([] { EXPECT_TRUE(false); }); });
   EXPECT_EQ(a.parts.size(), 0);  // caught one process below
   Arrived b([] { InChild([] { EXPECT_TRUE(false) << "from below"; }); });
@@ -57,14 +57,14 @@ TEST(Child, FailuresOfAChildsChildArriveOnce) {
   EXPECT_TRUE(Contains(b.at(0).message(), "from below"));
 }
 
-TEST(Child, ASkipArrivesAsASkip) {
+TEST(InChildFailures, ASkipArrivesAsASkip) {
   Arrived a([] { GTEST_SKIP() << "this reason"; });
   ASSERT_EQ(a.parts.size(), 1);
   EXPECT_TRUE(a.at(0).skipped());
   EXPECT_TRUE(Contains(a.at(0).message(), "this reason"));
 }
 
-TEST(Child, MoreFailuresThanThePipeHoldsDoNotBlockTheChild) {
+TEST(InChildFailures, MoreFailuresThanThePipeHoldsDoNotBlockTheChild) {
   Arrived a([] {
     ASSERT_TRUE(freopen("/dev/null", "w", stderr));
     for (int n = 0; n < 1000; ++n) ADD_FAILURE() << std::string(1000, 'x');
@@ -73,7 +73,7 @@ TEST(Child, MoreFailuresThanThePipeHoldsDoNotBlockTheChild) {
   EXPECT_GT(a.parts.size(), 10);
 }
 
-TEST(Child, FailuresOfAKilledChildArrive) {
+TEST(InChildFailures, FailuresOfAKilledChildArrive) {
   testing::TestPartResultArray parts;
   Signal failed;
   {

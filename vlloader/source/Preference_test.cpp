@@ -46,14 +46,14 @@ void In(const std::function<void(const Places&)>& body) {
   });
 }
 
-TEST(LoaderPreference, NoFileIsNoValueAndNothingIsMade) {
+TEST(Preference, NoFileIsNoValueAndNothingIsMade) {
   In([](const Places& p) {
     EXPECT_EQ(Read(), "(none)");
     EXPECT_FALSE(Exists(p.home()));
   });
 }
 
-TEST(LoaderPreference, TheOwnFileComesFirstThenTheSharedOnesInOrder) {
+TEST(Preference, TheOwnFileComesFirstThenTheSharedOnesInOrder) {
   In([](const Places& p) {
     p.put("second", "[Preferences]\nDir = second\n");
     EXPECT_EQ(Read(), "second");
@@ -67,7 +67,7 @@ TEST(LoaderPreference, TheOwnFileComesFirstThenTheSharedOnesInOrder) {
   });
 }
 
-TEST(LoaderPreference, AFileWithoutTheItemIsPassedOver) {
+TEST(Preference, AFileWithoutTheItemIsPassedOver) {
   In([](const Places& p) {
     p.put("home/.config", "[Other]\nDir = x\n[Preferences]\nDirectory = y\n");
     p.put("first", "[Preferences]\ndir = first\n");
@@ -75,7 +75,7 @@ TEST(LoaderPreference, AFileWithoutTheItemIsPassedOver) {
   });
 }
 
-TEST(LoaderPreference, AnEmptyValueIsAValue) {
+TEST(Preference, AnEmptyValueIsAValue) {
   In([](const Places& p) {
     p.put("home/.config", "[Preferences]\nDir = \"\"\n");
     p.put("first", "[Preferences]\nDir = first\n");
@@ -83,7 +83,7 @@ TEST(LoaderPreference, AnEmptyValueIsAValue) {
   });
 }
 
-TEST(LoaderPreference, QuotesOfBothKindsGoAndBackslashesStay) {
+TEST(Preference, QuotesOfBothKindsGoAndBackslashesStay) {
   In([](const Places& p) {
     p.put("first", "[Preferences]\nDir = \"/a \\n b\"\n");
     EXPECT_EQ(Read(), "/a \\n b");
@@ -92,7 +92,7 @@ TEST(LoaderPreference, QuotesOfBothKindsGoAndBackslashesStay) {
   });
 }
 
-TEST(LoaderPreference, RelativeAndEmptyDirectoriesAreIgnored) {
+TEST(Preference, RelativeAndEmptyDirectoriesAreIgnored) {
   In([](const Places& p) {
     p.put("first", "[Preferences]\nDir = first\n");
     ASSERT_EQ(chdir(p.path("").c_str()), 0);
@@ -107,7 +107,7 @@ TEST(LoaderPreference, RelativeAndEmptyDirectoriesAreIgnored) {
   });
 }
 
-TEST(LoaderPreference, WhatIsNoFileDoesNotHoldUp) {
+TEST(Preference, WhatIsNoFileDoesNotHoldUp) {
   In([](const Places& p) {
     std::string directory = p.home() + "/.config/d.ini";
     p.put("home/.config", "");
@@ -124,7 +124,7 @@ TEST(LoaderPreference, WhatIsNoFileDoesNotHoldUp) {
 }
 
 // Otherwise a busy process would work on another installation for the rest of its life.
-TEST(LoaderPreference, WithoutMemoryOrDescriptorsThereIsNoAnswer) {
+TEST(Preference, WithoutMemoryOrDescriptorsThereIsNoAnswer) {
   for (int error : {ENOMEM, EMFILE, ENFILE}) {
     In([&](const Places& p) {
       p.put("first", "[Preferences]\nDir = first\n");
@@ -139,7 +139,7 @@ TEST(LoaderPreference, WithoutMemoryOrDescriptorsThereIsNoAnswer) {
   });
 }
 
-TEST(LoaderPreference, ALackOfDescriptorsIsNotRemembered) {
+TEST(Preference, ALackOfDescriptorsIsNotRemembered) {
   In([](const Places& p) {
     p.put("first", "");
     WriteBytes(p.path("first") + "/com.zentrex.kor.ini", "[Preferences]\nDir = /there\n");
@@ -154,7 +154,7 @@ TEST(LoaderPreference, ALackOfDescriptorsIsNotRemembered) {
   });
 }
 
-TEST(LoaderPreference, IsReadAnewAtEachCall) {
+TEST(Preference, IsReadAnewAtEachCall) {
   In([](const Places& p) {
     p.put("first", "[Preferences]\nDir = one\n");
     EXPECT_EQ(Read(), "one");
@@ -163,7 +163,7 @@ TEST(LoaderPreference, IsReadAnewAtEachCall) {
   });
 }
 
-TEST(LoaderPreference, TheInstallDirectoryHasItsDefaultAndItsLimit) {
+TEST(Preference, TheInstallDirectoryHasItsDefaultAndItsLimit) {
   In([](const Places& p) {
     constexpr const char* kDefault = "/Library/Application Support/Zentrex/KOR";
     EXPECT_EQ(vlLookUpInstallDirectory(), kDefault);

@@ -78,14 +78,14 @@ class Storage : public Installation {
   TempDir m_notes;
 };
 
-TEST_IN_CHILD(Loader, ThePathIsTheDefaultWithoutAPreference) {
+TEST_IN_CHILD(vlloader, ThePathIsTheDefaultWithoutAPreference) {
   TempDir empty;
   setenv("XDG_CONFIG_HOME", empty.path().c_str(), 1);
   EXPECT_STREQ(GetCurrentVltPath(), "/Library/Application Support/Zentrex/KOR");
   EXPECT_STREQ(GetCurrentKorPath(), "/Library/Application Support/Zentrex/KOR");
 }
 
-TEST_IN_CHILD(Loader, ThePathIsLookedUpOnce) {
+TEST_IN_CHILD(vlloader, ThePathIsLookedUpOnce) {
   Installation i;
   EXPECT_EQ(GetCurrentVltPath(), i.root());
   Installation::setDir("/elsewhere");
@@ -93,14 +93,14 @@ TEST_IN_CHILD(Loader, ThePathIsLookedUpOnce) {
   EXPECT_EQ(vlLookUpInstallDirectory(), "/elsewhere");
 }
 
-TEST_IN_CHILD(Loader, AnEmptyPathIsNull) {
+TEST_IN_CHILD(vlloader, AnEmptyPathIsNull) {
   Installation i;
   Installation::setDir("");
   EXPECT_EQ(GetCurrentVltPath(), nullptr);
   EXPECT_EQ(GetCurrentKorPath(), nullptr);
 }
 
-TEST_IN_CHILD(Loader, NothingElseIsKnown) {
+TEST_IN_CHILD(vlloader, NothingElseIsKnown) {
   Installation i;
   EXPECT_EQ(GetInstalledVltPath(), nullptr);
   EXPECT_EQ(GetInstalledVltVersion(), nullptr);
@@ -112,7 +112,7 @@ TEST_IN_CHILD(Loader, NothingElseIsKnown) {
   EXPECT_STREQ(GetCurrentKorVersion(), "");
 }
 
-TEST(Loader, WithoutAPathTheLoadingIsGivenUpWithAWord) {
+TEST(vlloader, WithoutAPathTheLoadingIsGivenUpWithAWord) {
   Installation i;
   Installation::setDir("");
   TempDir out;
@@ -124,7 +124,7 @@ TEST(Loader, WithoutAPathTheLoadingIsGivenUpWithAWord) {
   EXPECT_EQ(ReadBytes(out / "text"), "Failed to get kor install path.\n");
 }
 
-TEST(Loader, BothModulesMakeTheStoragePresent) {
+TEST(vlloader, BothModulesMakeTheStoragePresent) {
   for (bool bundles : {true, false}) {
     Storage s(bundles);
     ExpectInChild([&] {
@@ -136,7 +136,7 @@ TEST(Loader, BothModulesMakeTheStoragePresent) {
   }
 }
 
-TEST(Loader, AMissingModuleStaysMissingForTheProcess) {
+TEST(vlloader, AMissingModuleStaysMissingForTheProcess) {
   for (const char* missing : {"vlt", "vltutils"}) {
     Storage s;
     TempDir aside;
@@ -154,14 +154,14 @@ TEST(Loader, AMissingModuleStaysMissingForTheProcess) {
   }
 }
 
-TEST_IN_CHILD(Loader, ABundleWithoutItsLibraryIsMissing) {
+TEST_IN_CHILD(vlloader, ABundleWithoutItsLibraryIsMissing) {
   Storage s;
   std::filesystem::remove(s.fileOf("vlt"));
   WriteBytes(s.root() + "/libvlt.so", "not asked for where there is a bundle");
   EXPECT_FALSE(IsKorStoragePresent());
 }
 
-TEST_IN_CHILD(Loader, FinalizeWithoutInitializeFails) {
+TEST_IN_CHILD(vlloader, FinalizeWithoutInitializeFails) {
   Storage s;
   EXPECT_EQ(KorFinalize(), E_FAIL);
   EXPECT_TRUE(IsKorStoragePresent());
@@ -169,7 +169,7 @@ TEST_IN_CHILD(Loader, FinalizeWithoutInitializeFails) {
   EXPECT_EQ(s.notes(), "");
 }
 
-TEST_IN_CHILD(Loader, TheLastFinalizeCleansUp) {
+TEST_IN_CHILD(vlloader, TheLastFinalizeCleansUp) {
   Storage s;
   EXPECT_EQ(KorInitialize(), 1);  // the storage's own answer
   EXPECT_EQ(KorInitialize(), S_OK);
@@ -185,7 +185,7 @@ TEST_IN_CHILD(Loader, TheLastFinalizeCleansUp) {
   EXPECT_EQ(KorFinalize(), E_FAIL);
 }
 
-TEST_IN_CHILD(Loader, AfterACleanUpThePreferenceIsReadAnew) {
+TEST_IN_CHILD(vlloader, AfterACleanUpThePreferenceIsReadAnew) {
   Storage s;
   KorInitialize();
   EXPECT_EQ(GetCurrentVltPath(), s.root());
@@ -195,7 +195,7 @@ TEST_IN_CHILD(Loader, AfterACleanUpThePreferenceIsReadAnew) {
 }
 
 // A caller may still be copying the text while another one cleans up.
-TEST_IN_CHILD(Loader, ThePathOutlivesACleanUp) {
+TEST_IN_CHILD(vlloader, ThePathOutlivesACleanUp) {
   Storage s;
   KorInitialize();
   const char* text = GetCurrentVltPath();
@@ -209,7 +209,7 @@ TEST_IN_CHILD(Loader, ThePathOutlivesACleanUp) {
 }
 
 // Each forwarded call before KorInitialize counts a load that nothing takes back.
-TEST_IN_CHILD(Loader, LoadsBeforeInitializeKeepTheModules) {
+TEST_IN_CHILD(vlloader, LoadsBeforeInitializeKeepTheModules) {
   Storage s;
   EXPECT_TRUE(IsKorStoragePresent());
   KorInitialize();
@@ -217,7 +217,7 @@ TEST_IN_CHILD(Loader, LoadsBeforeInitializeKeepTheModules) {
   EXPECT_TRUE(IsMapped(s.fileOf("vlt")));
 }
 
-TEST_IN_CHILD(Loader, LoadsWhileInitializedAreNotCounted) {
+TEST_IN_CHILD(vlloader, LoadsWhileInitializedAreNotCounted) {
   Storage s;
   KorInitialize();
   for (int n = 0; n < 5; ++n) IsKorStoragePresent();
@@ -225,7 +225,7 @@ TEST_IN_CHILD(Loader, LoadsWhileInitializedAreNotCounted) {
   EXPECT_FALSE(IsMapped(s.fileOf("vlt")));
 }
 
-TEST_IN_CHILD(Loader, InitializeWithoutAStorageSucceedsAndIsInEffect) {
+TEST_IN_CHILD(vlloader, InitializeWithoutAStorageSucceedsAndIsInEffect) {
   Installation i;
   EXPECT_EQ(KorInitialize(), S_OK);
   EXPECT_FALSE(IsKorStoragePresent());
@@ -233,20 +233,20 @@ TEST_IN_CHILD(Loader, InitializeWithoutAStorageSucceedsAndIsInEffect) {
   EXPECT_EQ(KorFinalize(), E_FAIL);
 }
 
-TEST_IN_CHILD(Loader, ASaturatedCountNeverFalls) {
+TEST_IN_CHILD(vlloader, ASaturatedCountNeverFalls) {
   Installation i;
   for (int n = 0; n < 1000005; ++n) KorInitialize();
   for (int n = 0; n < 1000010; ++n) ASSERT_EQ(KorFinalize(), S_OK);
 }
 
-TEST_IN_CHILD(Loader, ACountBelowSaturationFalls) {
+TEST_IN_CHILD(vlloader, ACountBelowSaturationFalls) {
   Installation i;
   for (int n = 0; n < 999998; ++n) KorInitialize();
   for (int n = 0; n < 999998; ++n) ASSERT_EQ(KorFinalize(), S_OK);
   EXPECT_EQ(KorFinalize(), E_FAIL);
 }
 
-TEST_IN_CHILD(Loader, ConfigurationsComeWithTheStoragesResult) {
+TEST_IN_CHILD(vlloader, ConfigurationsComeWithTheStoragesResult) {
   Storage s;
   int status = 7;
   EXPECT_NE(GetKorConfiguration2(1, nullptr, &status), nullptr);
@@ -264,14 +264,14 @@ TEST_IN_CHILD(Loader, ConfigurationsComeWithTheStoragesResult) {
             "configuration\nconfiguration\n");
 }
 
-TEST_IN_CHILD(Loader, SuccessWithoutAConfigurationIsAFailure) {
+TEST_IN_CHILD(vlloader, SuccessWithoutAConfigurationIsAFailure) {
   Storage s;
   int status = 7;
   EXPECT_EQ(GetKorConfiguration2(0, nullptr, &status), nullptr);
   EXPECT_EQ(status, E_FAIL);
 }
 
-TEST_IN_CHILD(Loader, NullOptionsLoadNothing) {
+TEST_IN_CHILD(vlloader, NullOptionsLoadNothing) {
   Storage s;
   int status = 7;
   EXPECT_EQ(GetKorConfigurationEx(nullptr, &status), nullptr);
@@ -284,7 +284,7 @@ TEST_IN_CHILD(Loader, NullOptionsLoadNothing) {
   EXPECT_EQ(status, S_OK);
 }
 
-TEST_IN_CHILD(Loader, ConversionsAreForwarded) {
+TEST_IN_CHILD(vlloader, ConversionsAreForwarded) {
   Storage s;
   TaskMem<wchar_t> seven(KorU32ToString(7)), nine(KorGuidToString({9, 0, 0, {}}));
   EXPECT_STREQ(seven.get(), L"seven");
@@ -294,7 +294,7 @@ TEST_IN_CHILD(Loader, ConversionsAreForwarded) {
   EXPECT_EQ(KorFree(malloc(1)), nullptr);
 }
 
-TEST_IN_CHILD(Loader, WithoutAStorageConversionsAnswerNothing) {
+TEST_IN_CHILD(vlloader, WithoutAStorageConversionsAnswerNothing) {
   Installation i;
   EXPECT_EQ(KorU32ToString(7), nullptr);
   EXPECT_EQ(KorGuidToString({9, 0, 0, {}}), nullptr);
@@ -303,7 +303,7 @@ TEST_IN_CHILD(Loader, WithoutAStorageConversionsAnswerNothing) {
   EXPECT_EQ(KorFree(&here), nullptr);
 }
 
-TEST_IN_CHILD(Loader, ANameThatIsNotFoundIsLeftOut) {
+TEST_IN_CHILD(vlloader, ANameThatIsNotFoundIsLeftOut) {
   Storage s;
   BuildModule(s.fileOf("vlt"), "extern \"C\" int vltSomething() { return 0; }");
   EXPECT_TRUE(IsKorStoragePresent());
@@ -314,7 +314,7 @@ TEST_IN_CHILD(Loader, ANameThatIsNotFoundIsLeftOut) {
   EXPECT_EQ(KorFinalize(), S_OK);
 }
 
-TEST_IN_CHILD(Loader, ThreadsMayAskAtOnce) {
+TEST_IN_CHILD(vlloader, ThreadsMayAskAtOnce) {
   Storage s;
   std::vector<std::thread> threads;
   for (int n = 0; n < 4; ++n) {

@@ -37,7 +37,7 @@ double Corrected(V::tUnitConversion conversion, std::uint32_t unit, double numbe
 
 }  // namespace
 
-TEST(TimeAbsTime, LimitsAndSize) {
+TEST(AbsTime, LimitsAndSize) {
   static_assert(AbsTime::size == 16 && sizeof(AbsTime) == 16);
   EXPECT_EQ(Fixed(0x7FFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF), AbsTime::max.value());
   EXPECT_EQ(Fixed(0x80000000, 0, 0, 0), AbsTime::min.value());
@@ -45,13 +45,13 @@ TEST(TimeAbsTime, LimitsAndSize) {
   EXPECT_EQ(0, AbsTime().getSeconds());
 }
 
-TEST(TimeAbsTime, UnixZeroCountsFrom1904) {
+TEST(AbsTime, UnixZeroCountsFrom1904) {
   EXPECT_EQ(2082844800, Unix(0).getSeconds());
   EXPECT_EQ(2082844800, Unix(0).value().integerPart());
   EXPECT_EQ(0, Unix(0).toTime_T(false));
 }
 
-TEST(TimeAbsTime, UnixTimeTruncatesOrRounds) {
+TEST(AbsTime, UnixTimeTruncatesOrRounds) {
   const struct {
     double unixTime;
     std::int64_t truncated, rounded;
@@ -72,7 +72,7 @@ TEST(TimeAbsTime, UnixTimeTruncatesOrRounds) {
   }
 }
 
-TEST(TimeAbsTime, TicksCountFrom1601) {
+TEST(AbsTime, TicksCountFrom1601) {
   EXPECT_EQ(116444736000000000, Unix(0).toLKTIME(false));
   EXPECT_EQ(116444736000000000 + 15000000, Unix(1.5).toLKTIME(true));
   EXPECT_EQ(0, AbsTime(-9561628800.0, 0).toLKTIME(true));
@@ -85,7 +85,7 @@ TEST(TimeAbsTime, TicksCountFrom1601) {
   EXPECT_EQ(95616288000000000, AbsTime(Fixed(7) / Fixed(100000000)).toLKTIME(false));
 }
 
-TEST(TimeAbsTime, WhatDoesNotFitEndsAtTheLimits) {
+TEST(AbsTime, WhatDoesNotFitEndsAtTheLimits) {
   EXPECT_EQ(k_least, AbsTime::min.toTime_T(true));
   EXPECT_EQ(k_least, AbsTime::min.toTime_T(false));
   EXPECT_EQ(k_most - 2082844800 + 1, AbsTime::max.toTime_T(true));
@@ -96,7 +96,7 @@ TEST(TimeAbsTime, WhatDoesNotFitEndsAtTheLimits) {
 }
 
 // Products that pass the range more than once come back with the sign that they should have.
-TEST(TimeAbsTime, FarTimesEndAtTheLimitsOfTicks) {
+TEST(AbsTime, FarTimesEndAtTheLimitsOfTicks) {
   for (double seconds : {1.9e12, 2e12, 1e13, 1e15, 1e17, 9e18}) {
     for (bool round : {false, true}) {
       EXPECT_EQ(k_most, AbsTime(seconds, 0).toLKTIME(round)) << seconds;
@@ -107,7 +107,7 @@ TEST(TimeAbsTime, FarTimesEndAtTheLimitsOfTicks) {
   }
 }
 
-TEST(TimeAbsTime, TicksAroundTheLimit) {
+TEST(AbsTime, TicksAroundTheLimit) {
   // The last tick of 64 bits is 922337203685.4775807 seconds away from 1601, which is in 1904:
   const auto after = [](std::int64_t seconds, int ticks) {
     return AbsTime(Fixed(seconds) + Fixed(ticks) / Fixed(10000000));
@@ -124,7 +124,7 @@ TEST(TimeAbsTime, TicksAroundTheLimit) {
   EXPECT_EQ(k_least, after(-931898832487, 0).toLKTIME(false));
 }
 
-TEST(TimeAbsTime, SecondsTruncateTowardZero) {
+TEST(AbsTime, SecondsTruncateTowardZero) {
   EXPECT_EQ(1, AbsTime(1, 0.75).getSeconds());
   EXPECT_EQ(-1, AbsTime(-1.25, 0).getSeconds());
   EXPECT_EQ(0, AbsTime(-0.75, 0).getSeconds());
@@ -132,7 +132,7 @@ TEST(TimeAbsTime, SecondsTruncateTowardZero) {
   EXPECT_EQ(k_most, AbsTime::max.getSeconds()) << "the carry does not wrap";
 }
 
-TEST(TimeAbsTime, FractionThatShowsAsOneCarriesOver) {
+TEST(AbsTime, FractionThatShowsAsOneCarriesOver) {
   const AbsTime almost(Fixed(0, 4, 0xFFFFFFFF, 0xFFFFFFFF));
   EXPECT_EQ(5, almost.getSeconds());
   EXPECT_EQ(0.0, almost.getFraction());
@@ -146,14 +146,14 @@ TEST(TimeAbsTime, FractionThatShowsAsOneCarriesOver) {
   EXPECT_EQ(0.0, edge.getFraction());
 }
 
-TEST(TimeAbsTime, FractionIsTheBitsBehindThePoint) {
+TEST(AbsTime, FractionIsTheBitsBehindThePoint) {
   EXPECT_EQ(0.25, AbsTime(7, 0.25).getFraction());
   EXPECT_EQ(0.75, AbsTime(-1.25, 0).getFraction()) << "counted from the second below";
   EXPECT_EQ(0.0, AbsTime::min.getFraction());
   EXPECT_EQ(0.0, AbsTime::max.getFraction());
 }
 
-TEST(TimeAbsTime, RangesCountTheirEnds) {
+TEST(AbsTime, RangesCountTheirEnds) {
   const AbsTime t1(1.0, 0), t2(2.0, 0), t3(3.0, 0), t4(4.0, 0);
   EXPECT_TRUE(AbsTime::doRangesIntersect(t1, t2, t2, t3));
   EXPECT_TRUE(AbsTime::doRangesIntersect(t2, t3, t1, t2));
@@ -166,7 +166,7 @@ TEST(TimeAbsTime, RangesCountTheirEnds) {
   EXPECT_FALSE(AbsTime::isSubRange(t2, t4, t1, t3));
 }
 
-TEST(TimeValue, UnitsMultiplyOrDivide) {
+TEST(AbsTimeValue, UnitsMultiplyOrDivide) {
   const struct {
     std::uint32_t unit;
     double value, inSeconds;
@@ -183,13 +183,13 @@ TEST(TimeValue, UnitsMultiplyOrDivide) {
   }
 }
 
-TEST(TimeValue, UnknownUnitKeepsTheValue) {
+TEST(AbsTimeValue, UnknownUnitKeepsTheValue) {
   std::int32_t status = 0;
   EXPECT_EQ(2.5, Corrected(V::kToSeconds, 0x36CAD7B8, 2.5, &status));
   EXPECT_EQ(-50003, status);
 }
 
-TEST(TimeValue, SignChangeOfAProductIsTheOverflow) {
+TEST(AbsTimeValue, SignChangeOfAProductIsTheOverflow) {
   std::int32_t status = 0;
   Corrected(V::kFromSeconds, kTimeUnitTicks, 1e12, &status);
   EXPECT_EQ(-50175, status);
@@ -198,7 +198,7 @@ TEST(TimeValue, SignChangeOfAProductIsTheOverflow) {
   EXPECT_EQ(0, status);
 }
 
-TEST(TimeValue, FirstErrorStaysAndDoesNotStopTheWork) {
+TEST(AbsTimeValue, FirstErrorStaysAndDoesNotStopTheWork) {
   std::int32_t status = -7;
   EXPECT_EQ(60, Corrected(V::kToSeconds, kTimeUnitMinute, 1, &status));
   EXPECT_EQ(-7, status);
@@ -211,7 +211,7 @@ TEST(TimeValue, FirstErrorStaysAndDoesNotStopTheWork) {
   EXPECT_EQ(Fixed(9), value);
 }
 
-TEST(TimeValue, RoundsByTable) {
+TEST(AbsTimeValue, RoundsByTable) {
   const struct {
     double value, nearest, zero, up, down;
   } table[] = {{1.25, 1, 1, 2, 1},     {1.5, 2, 1, 2, 1},       {2.5, 2, 2, 3, 2},
@@ -227,7 +227,7 @@ TEST(TimeValue, RoundsByTable) {
   }
 }
 
-TEST(TimeValue, ResultsOutsideTheBoundsDoNotFit) {
+TEST(AbsTimeValue, ResultsOutsideTheBoundsDoNotFit) {
   const struct {
     double value;
     std::int32_t status;

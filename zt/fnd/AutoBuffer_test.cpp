@@ -27,7 +27,7 @@ std::string Text(const AutoBuffer& buffer) {
              : std::string(reinterpret_cast<const char*>(buffer.Data()), buffer.Len());
 }
 
-TEST(BufferAuto, DefaultHasNoBlock) {
+TEST(AutoBuffer, DefaultHasNoBlock) {
   AutoBuffer b;
   EXPECT_EQ(0u, b.Len());
   EXPECT_EQ(nullptr, b.Data());
@@ -39,14 +39,14 @@ TEST(BufferAuto, DefaultHasNoBlock) {
   EXPECT_EQ(nullptr, b.Data());
 }
 
-TEST(BufferAuto, ConstructionReserves) {
+TEST(AutoBuffer, ConstructionReserves) {
   AutoBuffer b(50u);
   EXPECT_EQ(0u, b.Len());
   EXPECT_EQ(50u, b.Capacity());
   EXPECT_NE(nullptr, b.Data());
 }
 
-TEST(BufferAuto, AppendGrowsByATenthAndAtLeast128) {
+TEST(AutoBuffer, AppendGrowsByATenthAndAtLeast128) {
   const std::string bytes(2000, 'x');
   AutoBuffer small, large;
   small.Append(bytes.data(), 1000);
@@ -60,7 +60,7 @@ TEST(BufferAuto, AppendGrowsByATenthAndAtLeast128) {
   EXPECT_EQ(1129u, small.Len());
 }
 
-TEST(BufferAuto, AppendedBytesStandInOrderAndReversed) {
+TEST(AutoBuffer, AppendedBytesStandInOrderAndReversed) {
   AutoBuffer b = Of("ab");
   b.Append("cd", 2);
   b.appendReverseByteOrder("123", 3);
@@ -68,7 +68,7 @@ TEST(BufferAuto, AppendedBytesStandInOrderAndReversed) {
   EXPECT_EQ("abcd321", Text(b));
 }
 
-TEST(BufferAuto, AppendFromInsideItself) {
+TEST(AutoBuffer, AppendFromInsideItself) {
   AutoBuffer b = Of("abc");
   for (int i = 0; i < 10; ++i) b.Append(b.Data(), b.Len());
   std::string expected = "abc";
@@ -80,7 +80,7 @@ TEST(BufferAuto, AppendFromInsideItself) {
   EXPECT_EQ("xyz", Text(other));
 }
 
-TEST(BufferAuto, CopiesShareUntilOneIsWritten) {
+TEST(AutoBuffer, CopiesShareUntilOneIsWritten) {
   AutoBuffer a = Of("abc"), b(a), c;
   c = b;
   EXPECT_EQ(a.Data(), b.Data());
@@ -92,7 +92,7 @@ TEST(BufferAuto, CopiesShareUntilOneIsWritten) {
   EXPECT_EQ(a.Data(), c.Data());
 }
 
-TEST(BufferAuto, EveryWriterMakesItsOwnFirst) {
+TEST(AutoBuffer, EveryWriterMakesItsOwnFirst) {
   const std::string before = "abcdef";
   void (*const writers[])(AutoBuffer&) = {
       [](AutoBuffer& b) { b.Append("x", 1); },
@@ -127,7 +127,7 @@ TEST(BufferAuto, EveryWriterMakesItsOwnFirst) {
   }
 }
 
-TEST(BufferAuto, AssignmentOfItselfOrOfTheSameBlockChangesNothing) {
+TEST(AutoBuffer, AssignmentOfItselfOrOfTheSameBlockChangesNothing) {
   AutoBuffer a = Of("abc"), b(a);
   AutoBuffer& self = a;
   a = self;
@@ -139,13 +139,13 @@ TEST(BufferAuto, AssignmentOfItselfOrOfTheSameBlockChangesNothing) {
   EXPECT_EQ("abc", Text(b));
 }
 
-TEST(BufferAuto, AssignmentFromAViewOfItself) {
+TEST(AutoBuffer, AssignmentFromAViewOfItself) {
   AutoBuffer a = Of("abcdef");
   a = BufferWrapper(a.Data() + 2, 3);
   EXPECT_EQ("cde", Text(a));
 }
 
-TEST(BufferAuto, EraseKeepsAnUnsharedBlockAndDropsASharedOne) {
+TEST(AutoBuffer, EraseKeepsAnUnsharedBlockAndDropsASharedOne) {
   AutoBuffer a = Of("abc");
   const unsigned char* block = a.Data();
   a.Erase();
@@ -157,7 +157,7 @@ TEST(BufferAuto, EraseKeepsAnUnsharedBlockAndDropsASharedOne) {
   EXPECT_EQ("abc", Text(c));
 }
 
-TEST(BufferAuto, ReserveAndSkipAreExact) {
+TEST(AutoBuffer, ReserveAndSkipAreExact) {
   AutoBuffer b;
   b.Reserve(10);
   EXPECT_EQ(10u, b.Capacity());
@@ -171,7 +171,7 @@ TEST(BufferAuto, ReserveAndSkipAreExact) {
   EXPECT_EQ("0123456789abc", Text(b));
 }
 
-TEST(BufferAuto, UnAppendShortensAndStopsAtEmpty) {
+TEST(AutoBuffer, UnAppendShortensAndStopsAtEmpty) {
   AutoBuffer b = Of("abcdef");
   b.UnAppend(2);
   EXPECT_EQ("abcd", Text(b));
@@ -181,7 +181,7 @@ TEST(BufferAuto, UnAppendShortensAndStopsAtEmpty) {
   EXPECT_EQ("z", Text(b));
 }
 
-TEST(BufferAuto, ModifyOverwritesWithoutMovingTheEnd) {
+TEST(AutoBuffer, ModifyOverwritesWithoutMovingTheEnd) {
   AutoBuffer b = Of("abcdef");
   b.Modify(2, "XY", 2);
   EXPECT_EQ("abXYef", Text(b));
@@ -192,7 +192,7 @@ TEST(BufferAuto, ModifyOverwritesWithoutMovingTheEnd) {
   EXPECT_EQ("abXY12345678", Text(b));
 }
 
-TEST(BufferAuto, CloneHasAllTheRoomItClaims) {
+TEST(AutoBuffer, CloneHasAllTheRoomItClaims) {
   AutoBuffer a(4096u);
   a.Append("abc", 3);
   AutoBuffer b(a);
@@ -205,7 +205,7 @@ TEST(BufferAuto, CloneHasAllTheRoomItClaims) {
   EXPECT_EQ("abc", Text(a));
 }
 
-TEST(BufferAuto, LengthsBeyondThirtyTwoBitsAreOutOfRange) {
+TEST(AutoBuffer, LengthsBeyondThirtyTwoBitsAreOutOfRange) {
   AutoBuffer b = Of("abc");
   EXPECT_THROW(b.Append("x", 0xFFFFFFFFu), exception::OutOfRange);
   EXPECT_THROW(b.appendReverseByteOrder("x", 0xFFFFFFFDu), exception::OutOfRange);
@@ -214,7 +214,7 @@ TEST(BufferAuto, LengthsBeyondThirtyTwoBitsAreOutOfRange) {
   EXPECT_EQ("abc", Text(b));
 }
 
-TEST(BufferAuto, FailedAllocationLeavesTheBytes) {
+TEST(AutoBuffer, FailedAllocationLeavesTheBytes) {
   if (!vlt::test::kCanLimitMemory) GTEST_SKIP() << "the sanitizer needs its address space";
   // In a child, whose address space can be made too small without harm to this process.
   vlt::test::Child child([] {
@@ -237,7 +237,7 @@ TEST(BufferAuto, FailedAllocationLeavesTheBytes) {
   EXPECT_EQ(0, child.wait());
 }
 
-TEST(BufferAuto, CompareIsByByteThenByLength) {
+TEST(AutoBuffer, CompareIsByByteThenByLength) {
   auto compare = [](const std::string& a, const std::string& b) {
     return CompareBuffers(Of(a), Of(b));
   };
@@ -251,7 +251,7 @@ TEST(BufferAuto, CompareIsByByteThenByLength) {
   EXPECT_FALSE(Of("b") < Of("b"));
 }
 
-TEST(BufferAuto, WireFormIsLengthAndBytes) {
+TEST(AutoBuffer, WireFormIsLengthAndBytes) {
   AutoBuffer b = Of("abc");
   EXPECT_EQ(7u, b.serializationSize());
   EXPECT_EQ(4u, AutoBuffer().serializationSize());
@@ -270,7 +270,7 @@ TEST(BufferAuto, WireFormIsLengthAndBytes) {
   EXPECT_EQ(block, back.Data());  // reused
 }
 
-TEST(BufferAuto, WireFormThatDoesNotFitThrowsAndChangesNothing) {
+TEST(AutoBuffer, WireFormThatDoesNotFitThrowsAndChangesNothing) {
   AutoBuffer b = Of("abc");
   unsigned char form[7] = {};
   for (int room = 0; room < 7; ++room) {
@@ -293,7 +293,7 @@ TEST(BufferAuto, WireFormThatDoesNotFitThrowsAndChangesNothing) {
   EXPECT_THROW(back.deserialize(in, hostile + 5), exception::DeserializationError);
 }
 
-TEST(BufferRing, FormWrapsAtEveryPosition) {
+TEST(AutoBufferRing, FormWrapsAtEveryPosition) {
   for (unsigned int start = 0; start <= 11; ++start) {
     unsigned char ring[11] = {};
     AutoBuffer b = Of("abcdefg");  // 7 + 4 bytes fill the ring
@@ -313,7 +313,7 @@ TEST(BufferRing, FormWrapsAtEveryPosition) {
   }
 }
 
-TEST(BufferRing, CursorThatLandsOnTheEndGoesToTheBegin) {
+TEST(AutoBufferRing, CursorThatLandsOnTheEndGoesToTheBegin) {
   unsigned char ring[10] = {};
   unsigned char* out = ring + 4;
   Of("ab").circularSerialize(ring, ring + 10, out);
@@ -328,7 +328,7 @@ TEST(BufferRing, CursorThatLandsOnTheEndGoesToTheBegin) {
   EXPECT_EQ(0u, back.Len());
 }
 
-TEST(BufferRing, FormLargerThanTheRingThrows) {
+TEST(AutoBufferRing, FormLargerThanTheRingThrows) {
   unsigned char ring[10] = {};
   unsigned char* out = ring;
   EXPECT_THROW(Of("abcdefg").circularSerialize(ring, ring + 10, out), exception::BufferOverflow);
@@ -339,7 +339,7 @@ TEST(BufferRing, FormLargerThanTheRingThrows) {
   EXPECT_THROW(Of("a").circularSerialize(ring, ring + 9, out), exception::BufferOverflow);
 }
 
-TEST(BufferRing, HostileLengthsThrow) {
+TEST(AutoBufferRing, HostileLengthsThrow) {
   AutoBuffer back = Of("old");
   for (unsigned char low : {7, 255}) {
     unsigned char ring[10] = {low, 0, 0, 0};
@@ -357,7 +357,7 @@ TEST(BufferRing, HostileLengthsThrow) {
   EXPECT_EQ("old", Text(back));
 }
 
-TEST(BufferRing, LengthAloneAndIncrement) {
+TEST(AutoBufferRing, LengthAloneAndIncrement) {
   unsigned char ring[5] = {};
   unsigned char* cursor = ring + 3;
   AutoBuffer::circularSerializeLength(0x04030201u, ring, ring + 5, cursor);
@@ -371,7 +371,7 @@ TEST(BufferRing, LengthAloneAndIncrement) {
   EXPECT_EQ(ring, cursor);
 }
 
-TEST(BufferAuto, CopiesMayLiveInDifferentThreads) {
+TEST(AutoBuffer, CopiesMayLiveInDifferentThreads) {
   AutoBuffer source = Of(std::string(1000, 's'));
   std::atomic<int> wrong{0};
   std::vector<std::thread> threads;

@@ -7,7 +7,7 @@
 namespace zt::fnd {
 namespace {
 
-TEST(BufferByteOrder, BigEndianCopiesReverse) {
+TEST(ByteOrder, BigEndianCopiesReverse) {
   const unsigned char src[] = {1, 2, 3, 4, 5};
   unsigned char dest[5] = {};
   big_endian::CopyToBigEndian(5, dest, src);
@@ -21,14 +21,14 @@ TEST(BufferByteOrder, BigEndianCopiesReverse) {
   EXPECT_EQ(5, dest[0]);
 }
 
-TEST(BufferByteOrder, ValuesReverseOrStay) {
+TEST(ByteOrder, ValuesReverseOrStay) {
   EXPECT_EQ(0x04030201u, big_endian::ToBigEndian<std::uint32_t>(0x01020304));
   EXPECT_EQ(0x0201u, big_endian::FromBigEndian<std::uint16_t>(0x0102));
   EXPECT_EQ(0x01020304u, little_endian::ToLittleEndian<std::uint32_t>(0x01020304));
   EXPECT_EQ(0x01020304u, little_endian::FromLittleEndian<std::uint32_t>(0x01020304));
 }
 
-TEST(BufferByteOrder, SerializeRawWritesAndMoves) {
+TEST(ByteOrder, SerializeRawWritesAndMoves) {
   unsigned char bytes[5] = {9, 9, 9, 9, 9};
   unsigned char* cursor = bytes + 1;  // unaligned on purpose
   little_endian::SerializeRaw<std::uint32_t>(0x04030201u, cursor, bytes + 5);
@@ -37,7 +37,7 @@ TEST(BufferByteOrder, SerializeRawWritesAndMoves) {
   EXPECT_EQ(0, std::memcmp(expected, bytes, 5));
 }
 
-TEST(BufferByteOrder, SerializeRawWithoutRoomThrowsAndLeavesAll) {
+TEST(ByteOrder, SerializeRawWithoutRoomThrowsAndLeavesAll) {
   unsigned char bytes[3] = {9, 9, 9};
   unsigned char* cursor = bytes;
   EXPECT_THROW(little_endian::SerializeRaw<std::uint32_t>(1, cursor, bytes + 3),
@@ -49,7 +49,7 @@ TEST(BufferByteOrder, SerializeRawWithoutRoomThrowsAndLeavesAll) {
                exception::BufferOverflow);
 }
 
-TEST(BufferByteOrder, DeserializeRawReadsAndMovesOrThrows) {
+TEST(ByteOrder, DeserializeRawReadsAndMovesOrThrows) {
   const unsigned char bytes[] = {0, 1, 2, 3, 4};
   const unsigned char* cursor = bytes + 1;
   std::uint32_t value = 0;
@@ -67,7 +67,7 @@ struct Place : exception::Exception {
   static const char* fileOf(const Exception& e) { return e.*&Place::file; }
 };
 
-TEST(BufferByteOrder, BoundsChecksThrowUnstamped) {
+TEST(ByteOrder, BoundsChecksThrowUnstamped) {
   unsigned char byte = 0;
   unsigned char* cursor = &byte;
   try {

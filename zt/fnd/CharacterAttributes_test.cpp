@@ -11,7 +11,7 @@
 
 using namespace zt::fnd;
 
-TEST(TextCharacterAttributes, DefaultFoldsAsciiOnly) {
+TEST(CharacterAttributes, DefaultFoldsAsciiOnly) {
   const vlt::test::ScopedLocale locale(LC_ALL, "C.UTF-8");
   const CharacterAttributes<wchar_t> wide;
   EXPECT_EQ(L'A', wide.toUpper(L'a'));
@@ -23,14 +23,14 @@ TEST(TextCharacterAttributes, DefaultFoldsAsciiOnly) {
   EXPECT_EQ('\xE9', narrow.toUpper('\xE9'));
 }
 
-TEST(TextCharacterAttributes, NamedLocale) {
+TEST(CharacterAttributes, NamedLocale) {
   const CharacterAttributes<wchar_t> wide("C.UTF-8");
   EXPECT_EQ(L'\xC9', wide.toUpper(L'\xE9'));
   const CharacterAttributes<wchar_t> copy(wide);
   EXPECT_EQ(L'\xC9', copy.toUpper(L'\xE9'));
 }
 
-TEST(TextCharacterAttributes, UnknownNameRaisesWithTheReason) {
+TEST(CharacterAttributes, UnknownNameRaisesWithTheReason) {
   try {
     const CharacterAttributes<char> none("no_SUCH.locale");
     FAIL();
@@ -40,7 +40,7 @@ TEST(TextCharacterAttributes, UnknownNameRaisesWithTheReason) {
   }
 }
 
-TEST(TextCharacterAttributes, NullIsNoNameAndEmptyIsTheEnvironments) {
+TEST(CharacterAttributes, NullIsNoNameAndEmptyIsTheEnvironments) {
   EXPECT_THROW(CharacterAttributes<char>(static_cast<const char*>(nullptr)),
                exception::InvalidArgument2);
   EXPECT_THROW(CharacterAttributes<wchar_t>(static_cast<const char*>(nullptr)),

@@ -13,7 +13,7 @@ namespace {
 // Hidden from the compiler, which would warn about it.
 volatile unsigned long g_impossibleSize = ULONG_MAX - 1000;
 
-TEST(BufferAlloc, MallocGivesABlockThatFreeTakes) {
+TEST(DLLAlloc, MallocGivesABlockThatFreeTakes) {
   void* p = DLLMalloc(100);
   ASSERT_NE(nullptr, p);
   std::memset(p, 1, 100);
@@ -21,17 +21,17 @@ TEST(BufferAlloc, MallocGivesABlockThatFreeTakes) {
   DLLFree(nullptr);
 }
 
-TEST(BufferAlloc, MallocThatFailsThrowsOrReturnsNullByItsName) {
+TEST(DLLAlloc, MallocThatFailsThrowsOrReturnsNullByItsName) {
   EXPECT_THROW(DLLMalloc(g_impossibleSize), std::bad_alloc);
   EXPECT_EQ(nullptr, DLLMallocNoThrow(g_impossibleSize));
 }
 
-TEST(BufferAlloc, ReallocToNothingFreesAndReturnsNull) {
+TEST(DLLAlloc, ReallocToNothingFreesAndReturnsNull) {
   EXPECT_EQ(nullptr, DLLReallocNoThrow(DLLMalloc(10), 0));
   EXPECT_EQ(nullptr, DLLRealloc(DLLMalloc(10), 0));
 }
 
-TEST(BufferAlloc, ReallocOfNullAllocates) {
+TEST(DLLAlloc, ReallocOfNullAllocates) {
   for (unsigned long size : {0ul, 10ul}) {
     void* p = DLLRealloc(nullptr, size);
     EXPECT_NE(nullptr, p) << size;
@@ -39,7 +39,7 @@ TEST(BufferAlloc, ReallocOfNullAllocates) {
   }
 }
 
-TEST(BufferAlloc, ReallocKeepsTheBytes) {
+TEST(DLLAlloc, ReallocKeepsTheBytes) {
   char* p = static_cast<char*>(DLLMalloc(4));
   std::memcpy(p, "abc", 4);
   p = static_cast<char*>(DLLRealloc(p, 100000));
@@ -47,7 +47,7 @@ TEST(BufferAlloc, ReallocKeepsTheBytes) {
   DLLFree(p);
 }
 
-TEST(BufferAlloc, ReallocThatFailsLeavesTheOldBlock) {
+TEST(DLLAlloc, ReallocThatFailsLeavesTheOldBlock) {
   std::unique_ptr<char, void (*)(void*)> p(static_cast<char*>(DLLMalloc(4)), DLLFree);
   std::memcpy(p.get(), "abc", 4);
   EXPECT_THROW(DLLRealloc(p.get(), g_impossibleSize), std::bad_alloc);
@@ -55,7 +55,7 @@ TEST(BufferAlloc, ReallocThatFailsLeavesTheOldBlock) {
   EXPECT_STREQ("abc", p.get());
 }
 
-TEST(BufferAlloc, MakeDLLMallocThrowChangesNothing) {
+TEST(DLLAlloc, MakeDLLMallocThrowChangesNothing) {
   EXPECT_FALSE(MakeDLLMallocThrow(true));
   EXPECT_EQ(nullptr, DLLMallocNoThrow(g_impossibleSize));
   EXPECT_FALSE(MakeDLLMallocThrow(false));
@@ -69,7 +69,7 @@ struct Counted : DLLAlloced {
   char bytes[64];
 };
 
-TEST(BufferAlloc, ObjectsGoThroughTheAllocator) {
+TEST(DLLAlloc, ObjectsGoThroughTheAllocator) {
   Counted* p = new Counted(false);
   delete p;
   EXPECT_THROW(delete new Counted(true), int);

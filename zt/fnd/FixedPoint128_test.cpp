@@ -25,13 +25,13 @@ double D(const Fixed& value) { return static_cast<double>(value); }
 
 }  // namespace
 
-TEST(TimeFixedPoint, WordsStandFromTheMostSignificantDown) {
+TEST(FixedPoint128, WordsStandFromTheMostSignificantDown) {
   static_assert(sizeof(Fixed) == 16);
   ExpectWords(Fixed(1, 2, 3, 4), 1, 2, 3, 4);
   ExpectWords(Fixed(), 0, 0, 0, 0);
 }
 
-TEST(TimeFixedPoint, IntegersBecomeTheIntegerPart) {
+TEST(FixedPoint128, IntegersBecomeTheIntegerPart) {
   ExpectWords(Fixed(5), 0, 5, 0, 0);
   ExpectWords(Fixed(-1), k_ones, k_ones, 0, 0);
   ExpectWords(Fixed(4000000000u), 0, 4000000000u, 0, 0);
@@ -40,7 +40,7 @@ TEST(TimeFixedPoint, IntegersBecomeTheIntegerPart) {
   ExpectWords(Fixed(9561628800LL), 2, 971694208, 0, 0);
 }
 
-TEST(TimeFixedPoint, DoublesKeepTheirFraction) {
+TEST(FixedPoint128, DoublesKeepTheirFraction) {
   ExpectWords(Fixed(1.5), 0, 1, 0x80000000, 0);
   ExpectWords(Fixed(-1.25), k_ones, k_ones - 1, 0xC0000000, 0);
   ExpectWords(Fixed(0.75), 0, 0, 0xC0000000, 0);
@@ -51,7 +51,7 @@ TEST(TimeFixedPoint, DoublesKeepTheirFraction) {
   ExpectWords(Fixed(-std::ldexp(1.0, -65)), 0, 0, 0, 0);
 }
 
-TEST(TimeFixedPoint, DoublesBeyondTheRangeAreClamped) {
+TEST(FixedPoint128, DoublesBeyondTheRangeAreClamped) {
   const double huge = std::numeric_limits<double>::infinity();
   ExpectWords(Fixed(1e30), 0x7FFFFFFF, k_ones, k_ones, k_ones);
   ExpectWords(Fixed(-huge), 0x80000000, 0, 0, 0);
@@ -60,7 +60,7 @@ TEST(TimeFixedPoint, DoublesBeyondTheRangeAreClamped) {
   ExpectWords(Fixed(-huge, -1.0), 0x80000000, 0, 0, 0);
 }
 
-TEST(TimeFixedPoint, BackToFloatingPoint) {
+TEST(FixedPoint128, BackToFloatingPoint) {
   for (const double value : {0.0, 1.5, -1.25, 1e9 + 0.125, -9e18, 0.1, -0.1}) {
     EXPECT_NEAR(value, D(Fixed(value)), std::ldexp(1.0, -63));
     EXPECT_NEAR(value, static_cast<double>(static_cast<long double>(Fixed(value))),
@@ -69,7 +69,7 @@ TEST(TimeFixedPoint, BackToFloatingPoint) {
   EXPECT_EQ(-9223372036854775808.0, D(Fixed(0x80000000, 0, 0, 0)));
 }
 
-TEST(TimeFixedPoint, SumsCarryAndBorrow) {
+TEST(FixedPoint128, SumsCarryAndBorrow) {
   Fixed value(0, 1, k_ones, k_ones);
   value += Fixed(0, 0, 0, 1);
   ExpectWords(value, 0, 2, 0, 0);
@@ -79,7 +79,7 @@ TEST(TimeFixedPoint, SumsCarryAndBorrow) {
   ExpectWords(Fixed(0x7FFFFFFF, k_ones, 0, 0) + Fixed(1), 0x80000000, 0, 0, 0);
 }
 
-TEST(TimeFixedPoint, NegateInvertIncrement) {
+TEST(FixedPoint128, NegateInvertIncrement) {
   Fixed value(1.5);
   value.Negate();
   EXPECT_EQ(Fixed(-1.5), value);
@@ -95,7 +95,7 @@ TEST(TimeFixedPoint, NegateInvertIncrement) {
   EXPECT_TRUE(!value);
 }
 
-TEST(TimeFixedPoint, ProductsTruncateTowardZero) {
+TEST(FixedPoint128, ProductsTruncateTowardZero) {
   EXPECT_EQ(Fixed(6), Fixed(2) * Fixed(3));
   EXPECT_EQ(Fixed(-3.75), Fixed(1.5) * Fixed(-2.5));
   EXPECT_EQ(Fixed(3.75), Fixed(-1.5) * Fixed(-2.5));
@@ -108,7 +108,7 @@ TEST(TimeFixedPoint, ProductsTruncateTowardZero) {
   EXPECT_TRUE(wrapped.IsNegative());
 }
 
-TEST(TimeFixedPoint, QuotientsTruncateTowardZero) {
+TEST(FixedPoint128, QuotientsTruncateTowardZero) {
   EXPECT_EQ(Fixed(2), Fixed(6) / Fixed(3));
   EXPECT_EQ(Fixed(-1.5), Fixed(3) / Fixed(-2));
   ExpectWords(Fixed(1) / Fixed(3), 0, 0, 0x55555555, 0x55555555);
@@ -122,12 +122,12 @@ TEST(TimeFixedPoint, QuotientsTruncateTowardZero) {
   EXPECT_EQ(Fixed(-9000000000000000000LL), Fixed(-4500000000000000000LL) / Fixed(0.5));
 }
 
-TEST(TimeFixedPoint, DivisionByZeroGivesTheLimits) {
+TEST(FixedPoint128, DivisionByZeroGivesTheLimits) {
   ExpectWords(Fixed(1) / Fixed(0), 0x7FFFFFFF, k_ones, k_ones, k_ones);
   ExpectWords(Fixed(-1) / Fixed(0), 0x80000000, 0, 0, 0);
 }
 
-TEST(TimeFixedPoint, BothDivisionsAgree) {
+TEST(FixedPoint128, BothDivisionsAgree) {
   // A divisor of one word, and the same times 2^40 on both sides, which takes the long way.
   const Fixed scale(1LL << 40);
   for (const int divisor : {1, 3, 7, 1000, 86400}) {
@@ -139,7 +139,7 @@ TEST(TimeFixedPoint, BothDivisionsAgree) {
   }
 }
 
-TEST(TimeFixedPoint, ComparesAsSigned) {
+TEST(FixedPoint128, ComparesAsSigned) {
   const Fixed table[] = {Fixed(0x80000000, 0, 0, 0), Fixed(-1.5), Fixed(-1), Fixed(-0.5), Fixed(0),
                          Fixed(0, 0, 0, 1),          Fixed(0.5),  Fixed(1),  Fixed(1.5)};
   for (const Fixed& a : table) {
@@ -154,14 +154,14 @@ TEST(TimeFixedPoint, ComparesAsSigned) {
   }
 }
 
-TEST(TimeFixedPoint, OddAndNegative) {
+TEST(FixedPoint128, OddAndNegative) {
   EXPECT_TRUE(Fixed(1.5).IsOdd());
   EXPECT_FALSE(Fixed(2.5).IsOdd());
   EXPECT_TRUE(Fixed(-1).IsNegative());
   EXPECT_FALSE(Fixed(0).IsNegative());
 }
 
-TEST(TimeFixedPoint, ShiftsMoveTheFillIn) {
+TEST(FixedPoint128, ShiftsMoveTheFillIn) {
   Fixed value(1, 2, 3, 4);
   value.LeftShift(32, false);
   ExpectWords(value, 2, 3, 4, 0);
@@ -183,7 +183,7 @@ TEST(TimeFixedPoint, ShiftsMoveTheFillIn) {
   ExpectWords(value, 3, 4, 0, 0);
 }
 
-TEST(TimeFixedPoint, And) {
+TEST(FixedPoint128, And) {
   Fixed value(0xF0F0F0F0, 0xFF, 0xFF, 0xFF);
   value &= Fixed(k_ones, 0x0F, 0xF0, 0);
   ExpectWords(value, 0xF0F0F0F0, 0x0F, 0xF0, 0);

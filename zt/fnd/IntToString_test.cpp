@@ -17,7 +17,7 @@ std::wstring Std(const String& s) { return std::wstring(s.begin(), s.end()); }
 
 }  // namespace
 
-TEST(TextIntToString, PrintsInCapitalsWithoutPadding) {
+TEST(IntToString, PrintsInCapitalsWithoutPadding) {
   EXPECT_EQ(L"FF", Std(UInt32ToString(255, 16)));
   EXPECT_EQ(L"0", Std(UIntToString(0, 10)));
   EXPECT_EQ(L"0", Std(Int8ToString(0, 2)));
@@ -28,7 +28,7 @@ TEST(TextIntToString, PrintsInCapitalsWithoutPadding) {
   EXPECT_EQ(std::wstring(64, L'1'), Std(Int64ToString(-1, 2)));
 }
 
-TEST(TextIntToString, NegativeValuesInBaseTen) {
+TEST(IntToString, NegativeValuesInBaseTen) {
   EXPECT_EQ(L"-5", Std(Int32ToString(-5, 10)));
   EXPECT_EQ(L"-128", Std(Int8ToString(-128, 10)));
   EXPECT_EQ(L"-32768", Std(Int16ToString(-32768, 10)));
@@ -38,7 +38,7 @@ TEST(TextIntToString, NegativeValuesInBaseTen) {
   EXPECT_EQ(L"-7", Std(IntToString(-7, 10)));
 }
 
-TEST(TextIntToString, NegativeValuesInOtherBasesShowTheirBits) {
+TEST(IntToString, NegativeValuesInOtherBasesShowTheirBits) {
   EXPECT_EQ(L"FF", Std(Int8ToString(-1, 16)));
   EXPECT_EQ(L"10000000", Std(Int8ToString(-128, 2)));
   EXPECT_EQ(L"FFFE", Std(Int16ToString(-2, 16)));
@@ -47,7 +47,7 @@ TEST(TextIntToString, NegativeValuesInOtherBasesShowTheirBits) {
   EXPECT_EQ(std::wstring(2 * sizeof(long), L'F'), Std(IntToString(-1, 16)));
 }
 
-TEST(TextIntToString, WidestValues) {
+TEST(IntToString, WidestValues) {
   EXPECT_EQ(L"9223372036854775807",
             Std(Int64ToString(std::numeric_limits<std::int64_t>::max(), 10)));
   EXPECT_EQ(std::to_wstring(std::numeric_limits<unsigned long>::max()),
@@ -56,7 +56,7 @@ TEST(TextIntToString, WidestValues) {
             Std(IntToString(std::numeric_limits<long>::min(), 10)));
 }
 
-TEST(TextIntToString, BasesOutside2To36Raise) {
+TEST(IntToString, BasesOutside2To36Raise) {
   for (const unsigned base : {0u, 1u, 37u, 0xFFFFFFFFu}) {
     EXPECT_THROW(UInt32ToString(255, base), exception::UnableToConvert);
     EXPECT_THROW(UIntToString(0, base), exception::UnableToConvert) << "the first digit counts";
@@ -66,7 +66,7 @@ TEST(TextIntToString, BasesOutside2To36Raise) {
   EXPECT_EQ(L"Z", Std(UInt32ToString(35, 36)));
 }
 
-TEST(TextIntToString, ThreadIdsShowInHexadecimal) {
+TEST(IntToString, ThreadIdsShowInHexadecimal) {
   const auto id = static_cast<unsigned long>(pthread_self());
   char expected[2 * sizeof id + 1];
   std::snprintf(expected, sizeof expected, "%lX", id);

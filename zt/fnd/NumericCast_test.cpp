@@ -8,7 +8,7 @@
 namespace zt::fnd {
 namespace {
 
-TEST(BufferNumericCast, UnsignedLongAboveThirtyTwoBitsIsOutOfRange) {
+TEST(NumericCast, UnsignedLongAboveThirtyTwoBitsIsOutOfRange) {
   typedef _NumericCast<unsigned int, unsigned long> Cast;
   EXPECT_EQ(0xFFFFFFFFu, Cast::convert(0xFFFFFFFFul));
   EXPECT_EQ(0u, Cast::convert(0));
@@ -21,13 +21,13 @@ TEST(BufferNumericCast, UnsignedLongAboveThirtyTwoBitsIsOutOfRange) {
   }
 }
 
-TEST(BufferNumericCast, NegativeForUnsignedIsOutOfRange) {
+TEST(NumericCast, NegativeForUnsignedIsOutOfRange) {
   EXPECT_THROW((_NumericCast<unsigned int, long>::convert(-1)), exception::OutOfRange);
   EXPECT_THROW((_NumericCast<unsigned int, int>::convert(INT_MIN)), exception::OutOfRange);
   EXPECT_EQ(5u, (_NumericCast<unsigned int, long>::convert(5)));
 }
 
-TEST(BufferNumericCast, SignedTargetsHaveBothLimits) {
+TEST(NumericCast, SignedTargetsHaveBothLimits) {
   EXPECT_EQ(INT_MAX, NumericCast<int>(0x7FFFFFFFu));
   EXPECT_THROW(NumericCast<int>(0x80000000u), exception::OutOfRange);
   EXPECT_EQ(INT_MIN, NumericCast<int>(std::int64_t(INT_MIN)));

@@ -21,7 +21,7 @@ struct Thing : RefCountedThreadSafePolicy {
   ~Thing() override { --alive; }
 };
 
-TEST(BufferRefPtr, ObjectGoesWithItsLastReference) {
+TEST(RefCounted, ObjectGoesWithItsLastReference) {
   {
     RefPtr<Thing> a(new Thing);
     RefPtr<Thing> b(a), c;
@@ -36,7 +36,7 @@ TEST(BufferRefPtr, ObjectGoesWithItsLastReference) {
   EXPECT_EQ(0, Thing::alive);
 }
 
-TEST(BufferRefPtr, DetachedReferenceIsNotReleased) {
+TEST(RefCounted, DetachedReferenceIsNotReleased) {
   Thing* raw = RefPtr<Thing>(new Thing).detach();
   EXPECT_EQ(1, Thing::alive);
   raw->release();
@@ -49,7 +49,7 @@ struct PlainThing : RefCountedThreadUnsafePolicy {
   ~PlainThing() override { --alive; }
 };
 
-TEST(BufferRefPtr, PlainCountWorksTheSameInOneThread) {
+TEST(RefCounted, PlainCountWorksTheSameInOneThread) {
   {
     RefPtr<PlainThing> a(new PlainThing), b(a);
     a = nullptr;
@@ -80,7 +80,7 @@ struct SectionThing : RefCountedCriticalSectionPolicy {
   }
 };
 
-TEST(BufferRefPtr, SectionCountedObjectGoesInsideItsSection) {
+TEST(RefCounted, SectionCountedObjectGoesInsideItsSection) {
   osdep::CriticalSection section;
   std::unique_ptr<WatchedThread> probe;
   std::atomic<bool> entered = false;
@@ -96,7 +96,7 @@ TEST(BufferRefPtr, SectionCountedObjectGoesInsideItsSection) {
   EXPECT_FALSE(enteredWhileGoing);
 }
 
-TEST(BufferRefPtr, SectionCountIsExactAcrossThreads) {
+TEST(RefCounted, SectionCountIsExactAcrossThreads) {
   osdep::CriticalSection section;
   struct Counted : RefCountedCriticalSectionPolicy {
     int* alive;

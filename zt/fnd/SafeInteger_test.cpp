@@ -10,7 +10,7 @@ namespace {
 typedef SafeInteger<unsigned int> Size;
 constexpr unsigned int kMax = 0xFFFFFFFFu;
 
-TEST(BufferSafeInteger, AddStopsAtThirtyTwoBits) {
+TEST(SafeInteger, AddStopsAtThirtyTwoBits) {
   EXPECT_EQ(kMax, Size::Add(kMax, 0));
   EXPECT_EQ(kMax, Size::Add(kMax - 1, 1));
   EXPECT_THROW(Size::Add(kMax, 1), exception::OutOfRange);
@@ -19,7 +19,7 @@ TEST(BufferSafeInteger, AddStopsAtThirtyTwoBits) {
   EXPECT_THROW(Size(1) + Size(kMax), exception::OutOfRange);
 }
 
-TEST(BufferSafeInteger, MultiplyStopsAtThirtyTwoBits) {
+TEST(SafeInteger, MultiplyStopsAtThirtyTwoBits) {
   EXPECT_EQ(0u, Size::Multiply(0, kMax));
   EXPECT_EQ(0xFFFFFFFCu, Size::Multiply(0x3FFFFFFFu, 4));
   EXPECT_THROW(Size::Multiply(0x40000000u, 4), exception::OutOfRange);
@@ -28,7 +28,7 @@ TEST(BufferSafeInteger, MultiplyStopsAtThirtyTwoBits) {
   EXPECT_THROW(Size(3) * Size(0x55555556u), exception::OutOfRange);
 }
 
-TEST(BufferSafeInteger, FailedArithmeticLeavesTheOperand) {
+TEST(SafeInteger, FailedArithmeticLeavesTheOperand) {
   Size n(kMax);
   EXPECT_THROW(n += 1, exception::OutOfRange);
   EXPECT_THROW(n *= 2, exception::OutOfRange);
@@ -39,7 +39,7 @@ TEST(BufferSafeInteger, FailedArithmeticLeavesTheOperand) {
   EXPECT_EQ(24u, n.get());
 }
 
-TEST(BufferSafeInteger, DoublingReportsTheTopBitByTheFlag) {
+TEST(SafeInteger, DoublingReportsTheTopBitByTheFlag) {
   EXPECT_EQ(0x80000000u, Size::k_HIGH_BIT);
   bool overflow = true;
   Size n(0x7FFFFFFFu);
@@ -50,7 +50,7 @@ TEST(BufferSafeInteger, DoublingReportsTheTopBitByTheFlag) {
   EXPECT_TRUE(overflow);
 }
 
-TEST(BufferSafeInteger, WidthIsThatOfTheType) {
+TEST(SafeInteger, WidthIsThatOfTheType) {
   EXPECT_EQ(0x8000u, SafeInteger<std::uint16_t>::k_HIGH_BIT);
   EXPECT_THROW(SafeInteger<std::uint16_t>::Add(0xFFFF, 1), exception::OutOfRange);
   EXPECT_EQ(0x100000000u, SafeInteger<std::uint64_t>::Add(kMax, 1));

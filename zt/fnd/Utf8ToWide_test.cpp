@@ -46,7 +46,7 @@ void ExpectInvalid(const Bytes& bytes) {
 
 }  // namespace
 
-TEST(TextUtf8ToWide, DecodesByTable) {
+TEST(Utf8ToWide, DecodesByTable) {
   const struct {
     Bytes bytes;
     unsigned value;
@@ -79,7 +79,7 @@ TEST(TextUtf8ToWide, DecodesByTable) {
   }
 }
 
-TEST(TextUtf8ToWide, RejectsMalformedSequences) {
+TEST(Utf8ToWide, RejectsMalformedSequences) {
   const Bytes table[] = {
       {0x80},
       {0xBF, 0x80},
@@ -106,7 +106,7 @@ TEST(TextUtf8ToWide, RejectsMalformedSequences) {
   for (const Bytes& bytes : table) ExpectInvalid(bytes);
 }
 
-TEST(TextUtf8ToWide, SequencesThatPassTheEndAreInvalid) {
+TEST(Utf8ToWide, SequencesThatPassTheEndAreInvalid) {
   const Bytes whole[] = {{0xC3, 0xA9},
                          {0xE2, 0x82, 0xAC},
                          {0xF0, 0x9F, 0x98, 0x80},
@@ -118,14 +118,14 @@ TEST(TextUtf8ToWide, SequencesThatPassTheEndAreInvalid) {
   }
 }
 
-TEST(TextUtf8ToWide, FiveBytesOfTheEncoderDoNotDecode) {
+TEST(Utf8ToWide, FiveBytesOfTheEncoderDoNotDecode) {
   const wchar_t text[] = L"\x200000";
   unsigned char out[8];
   ASSERT_EQ(5u, WideToUtf8(text, text + 1, out, out + 8));
   ExpectInvalid(Bytes(out, out + 5));
 }
 
-TEST(TextUtf8ToWide, EmptyAndNullRanges) {
+TEST(Utf8ToWide, EmptyAndNullRanges) {
   const unsigned char text[] = {'a', 0};
   wchar_t out[4];
   EXPECT_EQ(0u, GetUtf8StringLength(nullptr, nullptr));
@@ -141,7 +141,7 @@ TEST(TextUtf8ToWide, EmptyAndNullRanges) {
   EXPECT_EQ(L'\0', c);
 }
 
-TEST(TextUtf8ToWide, BadDestinationsRaiseBeforeAnythingElse) {
+TEST(Utf8ToWide, BadDestinationsRaiseBeforeAnythingElse) {
   wchar_t out[4];
   EXPECT_THROW(Utf8ToWide(nullptr, nullptr, nullptr, out), exception::InvalidArgument);
   EXPECT_THROW(Utf8ToWide(nullptr, nullptr, out + 1, out), exception::InvalidArgument);
@@ -150,7 +150,7 @@ TEST(TextUtf8ToWide, BadDestinationsRaiseBeforeAnythingElse) {
   EXPECT_THROW(Utf8ToWideNoOverflow(none, nullptr, out + 1, out), exception::InvalidArgument);
 }
 
-TEST(TextUtf8ToWide, DestinationThatEndsFirstOverflows) {
+TEST(Utf8ToWide, DestinationThatEndsFirstOverflows) {
   const unsigned char text[] = {'a', 0xC3, 0xA9, 'b'};
   wchar_t out[] = L"####";
   EXPECT_THROW(Utf8ToWide(text, text + 4, out, out + 2), exception::BufferOverflow);
@@ -158,7 +158,7 @@ TEST(TextUtf8ToWide, DestinationThatEndsFirstOverflows) {
   EXPECT_EQ(3u, Utf8ToWide(text, text + 4, out, out + 3));
 }
 
-TEST(TextUtf8ToWide, NoOverflowDecodesWhatFits) {
+TEST(Utf8ToWide, NoOverflowDecodesWhatFits) {
   const unsigned char text[] = {'a', 0xC3, 0xA9, 'b'};
   const unsigned char* cursor = text;
   wchar_t out[] = L"####";
@@ -172,7 +172,7 @@ TEST(TextUtf8ToWide, NoOverflowDecodesWhatFits) {
   EXPECT_EQ(text, cursor);
 }
 
-TEST(TextUtf8ToWide, NewBlockIsTerminated) {
+TEST(Utf8ToWide, NewBlockIsTerminated) {
   const unsigned char text[] = {'a', 0xC3, 0xA9, 'b'};
   const std::unique_ptr<wchar_t[]> all(Utf8ToWide(text, 4)), part(Utf8ToWide(text, 1)),
       none(Utf8ToWide(nullptr, 9)), zero(Utf8ToWide(text, 0));
@@ -185,7 +185,7 @@ TEST(TextUtf8ToWide, NewBlockIsTerminated) {
   EXPECT_STREQ(L"", zero.get());
 }
 
-TEST(TextUtf8ToWide, OneCharacterAtATime) {
+TEST(Utf8ToWide, OneCharacterAtATime) {
   const unsigned char text[] = {'a', 0, 0xE2, 0x82, 0xAC};
   const unsigned char* const end = text + sizeof text;
   wchar_t c;
@@ -199,7 +199,7 @@ TEST(TextUtf8ToWide, OneCharacterAtATime) {
   EXPECT_EQ(0x20AC, c);
 }
 
-TEST(TextUtf8ToWide, EveryEncodableValueOutsideTheFiveByteFormComesBack) {
+TEST(Utf8ToWide, EveryEncodableValueOutsideTheFiveByteFormComesBack) {
   for (std::uint32_t value = 0; value < 0x80000000u; value += value < 0x20000 ? 1 : value / 300) {
     if (value > 0x1FFFFF && value <= 0x3FFFFFF) continue;
     const wchar_t c = static_cast<wchar_t>(value);

@@ -7,7 +7,7 @@
 namespace zt::fnd {
 namespace {
 
-TEST(BufferVector, EmptyHasNoBlock) {
+TEST(Vector, EmptyHasNoBlock) {
   Vector<int> v;
   EXPECT_EQ(0u, v.size());
   EXPECT_EQ(0u, v.capacity());
@@ -15,7 +15,7 @@ TEST(BufferVector, EmptyHasNoBlock) {
   EXPECT_EQ(v.begin(), v.end());
 }
 
-TEST(BufferVector, CapacitiesRunOneThreeSevenFifteen) {
+TEST(Vector, CapacitiesRunOneThreeSevenFifteen) {
   Vector<int> v;
   const unsigned int expected[] = {1, 3, 3, 7, 7, 7, 7, 15};
   for (unsigned int i = 0; i < 8; ++i) {
@@ -26,7 +26,7 @@ TEST(BufferVector, CapacitiesRunOneThreeSevenFifteen) {
   for (unsigned int i = 0; i < 8; ++i) EXPECT_EQ(static_cast<int>(i), v[i]);
 }
 
-TEST(BufferVector, NextCapacityAtTheEdgesOfThirtyTwoBits) {
+TEST(Vector, NextCapacityAtTheEdgesOfThirtyTwoBits) {
   EXPECT_EQ(1u, vector_detail::NextCapacity(0));
   EXPECT_EQ(0xFFFFFFFDu, vector_detail::NextCapacity(0x7FFFFFFEu));
   EXPECT_THROW(vector_detail::NextCapacity(0x7FFFFFFFu), exception::OutOfRange);
@@ -40,12 +40,12 @@ struct Huge {
   unsigned char bytes[0x40000000];
 };
 
-TEST(BufferVector, BlockOfMoreThanThirtyTwoBitsIsOutOfRange) {
+TEST(Vector, BlockOfMoreThanThirtyTwoBitsIsOutOfRange) {
   EXPECT_THROW(vector_detail::Builder<Huge>(4), exception::OutOfRange);
   EXPECT_THROW(vector_detail::Builder<std::string>(0xFFFFFFFDu), exception::OutOfRange);
 }
 
-TEST(BufferVector, CopyHasACapacityOfItsSizeAndItsOwnElements) {
+TEST(Vector, CopyHasACapacityOfItsSizeAndItsOwnElements) {
   Vector<std::string> v;
   for (const char* s : {"a", "b", "c", "d"}) v.push_back(s);
   Vector<std::string> copy(v);
@@ -55,7 +55,7 @@ TEST(BufferVector, CopyHasACapacityOfItsSizeAndItsOwnElements) {
   EXPECT_EQ(0u, Vector<std::string>(Vector<std::string>()).capacity());
 }
 
-TEST(BufferVector, AssignmentReplacesAndToleratesItself) {
+TEST(Vector, AssignmentReplacesAndToleratesItself) {
   Vector<std::string> v, w;
   v.push_back("a");
   w.push_back("x");
@@ -68,7 +68,7 @@ TEST(BufferVector, AssignmentReplacesAndToleratesItself) {
   EXPECT_EQ("x", v[0]);
 }
 
-TEST(BufferVector, SwapExchangesAllAndClearFrees) {
+TEST(Vector, SwapExchangesAllAndClearFrees) {
   Vector<int> v, w;
   v.push_back(1);
   v.swap(w);
@@ -82,7 +82,7 @@ TEST(BufferVector, SwapExchangesAllAndClearFrees) {
   EXPECT_EQ(1u, w.capacity());
 }
 
-TEST(BufferVector, PushBackOfAnOwnElementSurvivesTheMove) {
+TEST(Vector, PushBackOfAnOwnElementSurvivesTheMove) {
   Vector<std::string> v;
   v.push_back("a text that is long enough for a block of its own");
   v.push_back(v[0]);
@@ -102,7 +102,7 @@ struct Fragile {
   ~Fragile() { --alive; }
 };
 
-TEST(BufferVector, FailedPushBackLeavesTheOldBlock) {
+TEST(Vector, FailedPushBackLeavesTheOldBlock) {
   {
     Vector<Fragile> v;
     Fragile::copiesLeft = 100;

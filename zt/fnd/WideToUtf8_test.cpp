@@ -23,7 +23,7 @@ std::string Encode(const std::wstring& text) {
 
 }  // namespace
 
-TEST(TextWideToUtf8, EncodesByTable) {
+TEST(WideToUtf8, EncodesByTable) {
   const struct {
     unsigned value;
     const char* bytes;
@@ -51,7 +51,7 @@ TEST(TextWideToUtf8, EncodesByTable) {
   EXPECT_EQ(std::string("a\0b", 3), Encode(std::wstring(L"a\0b", 3)));
 }
 
-TEST(TextWideToUtf8, CountsTerminatedAndRangedText) {
+TEST(WideToUtf8, CountsTerminatedAndRangedText) {
   EXPECT_EQ(0u, GetUtf8EncodingBytes(nullptr));
   EXPECT_EQ(0u, GetUtf8EncodingBytes(L""));
   EXPECT_EQ(6u, GetUtf8EncodingBytes(L"a\xE9\x20AC"));
@@ -60,7 +60,7 @@ TEST(TextWideToUtf8, CountsTerminatedAndRangedText) {
   EXPECT_EQ(2u, GetUtf8EncodingBytes(bad, bad + 2));
 }
 
-TEST(TextWideToUtf8, CountingStopsBeforeTheLimit) {
+TEST(WideToUtf8, CountingStopsBeforeTheLimit) {
   const wchar_t text[] = L"a\xE9\x20ACz";
   const unsigned expected[] = {0, 1, 1, 3, 3, 3, 6, 7, 7};
   for (unsigned limit = 0; limit < 9; ++limit) {
@@ -70,7 +70,7 @@ TEST(TextWideToUtf8, CountingStopsBeforeTheLimit) {
   EXPECT_EQ(7u, GetUtf8EncodingBytesWithBufferLimit(text, text + 4, 0xFFFFFFFF));
 }
 
-TEST(TextWideToUtf8, BadDestinationsRaiseBeforeAnythingElse) {
+TEST(WideToUtf8, BadDestinationsRaiseBeforeAnythingElse) {
   unsigned char out[4];
   EXPECT_THROW(WideToUtf8(nullptr, nullptr, nullptr, out), exception::InvalidArgument);
   EXPECT_THROW(WideToUtf8(nullptr, nullptr, out + 1, out), exception::InvalidArgument);
@@ -79,7 +79,7 @@ TEST(TextWideToUtf8, BadDestinationsRaiseBeforeAnythingElse) {
   EXPECT_EQ(0u, WideToUtf8(nullptr, nullptr, out, out + 4));
 }
 
-TEST(TextWideToUtf8, CharacterThatDoesNotFitStopsTheRun) {
+TEST(WideToUtf8, CharacterThatDoesNotFitStopsTheRun) {
   const wchar_t text[] = L"a\x20ACz";
   for (unsigned room = 1; room < 4; ++room) {
     unsigned char out[8] = "#######";
@@ -96,7 +96,7 @@ TEST(TextWideToUtf8, CharacterThatDoesNotFitStopsTheRun) {
   EXPECT_EQ(5u, WideToUtf8(text, text + 3, out, out + 5));
 }
 
-TEST(TextWideToUtf8, NewBlockIsTerminated) {
+TEST(WideToUtf8, NewBlockIsTerminated) {
   const wchar_t text[] = L"a\xE9";
   const auto chars = [](const std::unique_ptr<unsigned char[]>& p) {
     return reinterpret_cast<const char*>(p.get());

@@ -59,7 +59,7 @@ struct LinkedPlace {
   }
 };
 
-TEST(PosixFiles, LinksCountByTheirOwners) {
+TEST(Files, LinksCountByTheirOwners) {
   NEEDS_ROOT();
   const struct {
     uid_t link, target;
@@ -81,7 +81,7 @@ TEST(PosixFiles, LinksCountByTheirOwners) {
   }
 }
 
-TEST(PosixFiles, TheCallersOwnLinksCount) {
+TEST(Files, TheCallersOwnLinksCount) {
   NEEDS_ROOT();
   LinkedPlace place(kUser, kOther);
   chmod(place.secret.c_str(), 0644);
@@ -93,7 +93,7 @@ TEST(PosixFiles, TheCallersOwnLinksCount) {
   EXPECT_EQ(child.wait(), 0);
 }
 
-TEST(PosixFiles, TheRuleHoldsWithoutTheKernelsOwnWalk) {
+TEST(Files, TheRuleHoldsWithoutTheKernelsOwnWalk) {
   NEEDS_ROOT();
   LinkedPlace good(0, kUser), bad(kUser, 0);
   Child child([&] {
@@ -106,7 +106,7 @@ TEST(PosixFiles, TheRuleHoldsWithoutTheKernelsOwnWalk) {
   EXPECT_EQ(child.wait(), 0);
 }
 
-TEST(PosixFiles, ChainsAndCirclesOfLinks) {
+TEST(Files, ChainsAndCirclesOfLinks) {
   TempDir dir;
   WriteBytes(dir / "file", "x");
   ASSERT_EQ(symlink("file", (dir / "0").c_str()), 0);
@@ -121,7 +121,7 @@ TEST(PosixFiles, ChainsAndCirclesOfLinks) {
   EXPECT_EQ(errno, ELOOP);
 }
 
-TEST(PosixFiles, PathsAreReadAsTheSystemReadsThem) {
+TEST(Files, PathsAreReadAsTheSystemReadsThem) {
   TempDir dir;
   dir.makeDir("a/b");
   WriteBytes(dir / "a/file", "x");
@@ -150,7 +150,7 @@ TEST(PosixFiles, PathsAreReadAsTheSystemReadsThem) {
   EXPECT_EQ(errno, ENAMETOOLONG);
 }
 
-TEST(PosixFiles, WhatIsNoRegularFileIsNeverOpened) {
+TEST(Files, WhatIsNoRegularFileIsNeverOpened) {
   TempDir dir;
   ASSERT_EQ(mkfifo((dir / "fifo").c_str(), 0666), 0);
   Child child([&] {
@@ -166,7 +166,7 @@ TEST(PosixFiles, WhatIsNoRegularFileIsNeverOpened) {
   EXPECT_EQ(child.wait(), 0);
 }
 
-TEST(PosixFiles, DescriptorsAreThreeOrMoreAndCloseOnExec) {
+TEST(Files, DescriptorsAreThreeOrMoreAndCloseOnExec) {
   TempDir dir;
   WriteBytes(dir / "old", "x");
   Child child([&] {
@@ -187,7 +187,7 @@ TEST(PosixFiles, DescriptorsAreThreeOrMoreAndCloseOnExec) {
   EXPECT_EQ(child.wait(), 0);
 }
 
-TEST(PosixFiles, NothingIsMadeWhereADanglingLinkLeads) {
+TEST(Files, NothingIsMadeWhereADanglingLinkLeads) {
   TempDir dir;
   ASSERT_EQ(symlink("nowhere", (dir / "link").c_str()), 0);
   EXPECT_FALSE(CreateNew((dir / "link").c_str(), O_WRONLY, 0666));
@@ -197,7 +197,7 @@ TEST(PosixFiles, NothingIsMadeWhereADanglingLinkLeads) {
   EXPECT_FALSE(Exists(dir / "nowhere"));
 }
 
-TEST(PosixFiles, EntriesAreThoseOfTheDirectoryThatWasLookedUp) {
+TEST(Files, EntriesAreThoseOfTheDirectoryThatWasLookedUp) {
   NEEDS_ROOT();
   LinkedPlace place(kUser, 0);
   std::string inside = place.throughDirectory;
@@ -213,7 +213,7 @@ TEST(PosixFiles, EntriesAreThoseOfTheDirectoryThatWasLookedUp) {
   EXPECT_EQ(ModeOf(place.secret), 0600);
 }
 
-TEST(PosixFiles, ModesOfFilesWithTwoNamesOrOfOthersStay) {
+TEST(Files, ModesOfFilesWithTwoNamesOrOfOthersStay) {
   NEEDS_ROOT();
   TempDir dir;
   WriteBytes(dir / "linked", "x");
@@ -232,7 +232,7 @@ TEST(PosixFiles, ModesOfFilesWithTwoNamesOrOfOthersStay) {
   EXPECT_EQ(ModeOf(dir / "own"), 0777);
 }
 
-TEST(PosixFiles, MoveAsideReplacesNothing) {
+TEST(Files, MoveAsideReplacesNothing) {
   TempDir dir;
   for (const char* bytes : {"first", "second", "third"}) {
     WriteBytes(dir / "f", bytes);
@@ -245,7 +245,7 @@ TEST(PosixFiles, MoveAsideReplacesNothing) {
   EXPECT_EQ(errno, ENOENT);
 }
 
-TEST(PosixFiles, MoveAsideTakesAStamp) {
+TEST(Files, MoveAsideTakesAStamp) {
   TempDir dir;
   for (const char* bytes : {"first", "second"}) {
     WriteBytes(dir / "f", bytes);
@@ -255,7 +255,7 @@ TEST(PosixFiles, MoveAsideTakesAStamp) {
   EXPECT_EQ(ReadBytes(dir / "f_11222026.1.bad"), "second");
 }
 
-TEST(PosixFiles, LinksInTheLastPlaceAreRefusedOnRequest) {
+TEST(Files, LinksInTheLastPlaceAreRefusedOnRequest) {
   TempDir dir;
   WriteBytes(dir / "f", "x");
   ASSERT_EQ(symlink("f", (dir / "link").c_str()), 0);
@@ -268,7 +268,7 @@ TEST(PosixFiles, LinksInTheLastPlaceAreRefusedOnRequest) {
   EXPECT_EQ(errno, ELOOP);
 }
 
-TEST(PosixFiles, AnEntryThatIsALinkIsLookedUpItself) {
+TEST(Files, AnEntryThatIsALinkIsLookedUpItself) {
   TempDir dir;
   dir.makeDir("d");
   ASSERT_EQ(symlink("d", (dir / "link").c_str()), 0);
@@ -283,7 +283,7 @@ TEST(PosixFiles, AnEntryThatIsALinkIsLookedUpItself) {
   EXPECT_TRUE(LookUpEntry(directory.get(), "d", O_DIRECTORY));
 }
 
-TEST(PosixFiles, MakeRoomRemovesFilesAndMovesDirectoriesAside) {
+TEST(Files, MakeRoomRemovesFilesAndMovesDirectoriesAside) {
   TempDir dir;
   WriteBytes(dir / "f", "x");
   EXPECT_EQ(MakeRoom((dir / "f").c_str()), 0);
@@ -294,7 +294,7 @@ TEST(PosixFiles, MakeRoomRemovesFilesAndMovesDirectoriesAside) {
   EXPECT_TRUE(Exists(dir / "f.bad/inside"));
 }
 
-TEST(PosixFiles, WritesGoOnAfterShortOnes) {
+TEST(Files, WritesGoOnAfterShortOnes) {
   TempDir dir;
   int ends[2];
   ASSERT_EQ(pipe2(ends, O_CLOEXEC), 0);
@@ -311,7 +311,7 @@ TEST(PosixFiles, WritesGoOnAfterShortOnes) {
   EXPECT_EQ(total, data.size());
 }
 
-TEST(PosixFiles, FlockFailsWithErrnoWhileAnotherHasTheLock) {
+TEST(Files, FlockFailsWithErrnoWhileAnotherHasTheLock) {
   TempDir dir;
   ScopedFd a = OpenOrCreate((dir / "f").c_str(), O_RDWR, 0600);
   ScopedFd b = OpenOrCreate((dir / "f").c_str(), O_RDWR, 0600);
@@ -322,7 +322,7 @@ TEST(PosixFiles, FlockFailsWithErrnoWhileAnotherHasTheLock) {
   EXPECT_EQ(Flock(b.get(), LOCK_EX | LOCK_NB), 0);
 }
 
-TEST(PosixFiles, SyncReportsRealFailuresOnly) {
+TEST(Files, SyncReportsRealFailuresOnly) {
   TempDir dir;
   WriteBytes(dir / "f", "x");
   const struct {

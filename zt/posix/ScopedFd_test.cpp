@@ -16,7 +16,7 @@ using vlt::test::IsOpen;
 
 int OpenNull() { return open("/dev/null", O_RDONLY | O_CLOEXEC); }
 
-TEST(PosixScopedFd, ClosesOnceAndKeepsErrno) {
+TEST(ScopedFd, ClosesOnceAndKeepsErrno) {
   int fd = OpenNull();
   errno = EDOM;
   {
@@ -28,7 +28,7 @@ TEST(PosixScopedFd, ClosesOnceAndKeepsErrno) {
   EXPECT_FALSE(IsOpen(fd));
 }
 
-TEST(PosixScopedFd, MovesAndReleases) {
+TEST(ScopedFd, MovesAndReleases) {
   int fd = OpenNull();
   ScopedFd first(fd);
   ScopedFd second(std::move(first));
@@ -43,7 +43,7 @@ TEST(PosixScopedFd, MovesAndReleases) {
   EXPECT_FALSE(IsOpen(fd));
 }
 
-TEST(PosixScopedFd, AnObjectThatIsMovedToItselfKeepsItsDescriptor) {
+TEST(ScopedFd, AnObjectThatIsMovedToItselfKeepsItsDescriptor) {
   ScopedFd fd(OpenNull());
   int number = fd.get();
   ScopedFd& same = fd;
@@ -52,7 +52,7 @@ TEST(PosixScopedFd, AnObjectThatIsMovedToItselfKeepsItsDescriptor) {
   EXPECT_TRUE(IsOpen(number));
 }
 
-TEST(PosixRetry, RepeatsInterruptedCallsOnly) {
+TEST(ScopedFdRetry, RepeatsInterruptedCallsOnly) {
   int calls = 0;
   EXPECT_EQ(RetryEintr([&] {
               errno = EINTR;

@@ -61,7 +61,7 @@ class Thing : public IThing, public CZTComObjectRootEx<CZTComMultiThreadModelNoC
   }
 };
 
-class ComObject : public testing::Test {
+class ztcomObject : public testing::Test {
  protected:
   void SetUp() override {
     g_alive = 0;
@@ -70,7 +70,7 @@ class ComObject : public testing::Test {
   }
 };
 
-TEST_F(ComObject, StartsAtZeroFromCreateInstanceAndAtOneFromNew) {
+TEST_F(ztcomObject, StartsAtZeroFromCreateInstanceAndAtOneFromNew) {
   CZTComObject<Thing>* object = nullptr;
   ASSERT_EQ(CZTComObject<Thing>::CreateInstance(&object), S_OK);
   EXPECT_EQ(object->m_refCount, 0);
@@ -82,7 +82,7 @@ TEST_F(ComObject, StartsAtZeroFromCreateInstanceAndAtOneFromNew) {
   object->Release();
 }
 
-TEST_F(ComObject, UnknownAndFirstInterfaceAreOnePointer) {
+TEST_F(ztcomObject, UnknownAndFirstInterfaceAreOnePointer) {
   CZTComObject<Thing>* object = ZtATLNew<Thing>();
   void *unknown = nullptr, *thing = nullptr;
   EXPECT_EQ(object->QueryInterface(IID_IUnknown, &unknown), S_OK);
@@ -96,7 +96,7 @@ TEST_F(ComObject, UnknownAndFirstInterfaceAreOnePointer) {
   EXPECT_EQ(g_alive, 0);
 }
 
-TEST_F(ComObject, UnknownIdNullsTheOutPointer) {
+TEST_F(ztcomObject, UnknownIdNullsTheOutPointer) {
   CZTComObject<Thing>* object = ZtATLNew<Thing>();
   void* out = object;
   EXPECT_EQ(object->QueryInterface(kUnknown, &out), E_NOINTERFACE);
@@ -104,7 +104,7 @@ TEST_F(ComObject, UnknownIdNullsTheOutPointer) {
   object->Release();
 }
 
-TEST_F(ComObject, RowFunctionsDecideByTheirResult) {
+TEST_F(ztcomObject, RowFunctionsDecideByTheirResult) {
   CZTComObject<Thing>* object = ZtATLNew<Thing>();
   void* out = nullptr;
   g_rowResult =
@@ -123,16 +123,16 @@ TEST_F(ComObject, RowFunctionsDecideByTheirResult) {
   object->Release();
 }
 
-TEST_F(ComObject, AReferenceTakenWhileDyingDoesNotDeleteTwice) {
+TEST_F(ztcomObject, AReferenceTakenWhileDyingDoesNotDeleteTwice) {
   g_queryWhileDying = true;
   ZtATLNew<Thing>()->Release();
   EXPECT_EQ(g_alive, 0);
   g_queryWhileDying = false;
 }
 
-using ComObjectDeathTest = ComObject;
+using ztcomObjectDeathTest = ztcomObject;
 
-TEST_F(ComObjectDeathTest, BrokenContractsAbort) {
+TEST_F(ztcomObjectDeathTest, BrokenContractsAbort) {
   CZTComObject<Thing>* object = nullptr;
   CZTComObject<Thing>::CreateInstance(&object);
   EXPECT_EXIT(object->Release(), testing::KilledBySignal(SIGABRT), "");
@@ -150,7 +150,7 @@ TEST_F(ComObjectDeathTest, BrokenContractsAbort) {
   object->Release();
 }
 
-TEST_F(ComObject, TryQueryInterfaceGivesAReferenceOrNull) {
+TEST_F(ztcomObject, TryQueryInterfaceGivesAReferenceOrNull) {
   CZTComObject<Thing>* object = ZtATLNew<Thing>();
   EXPECT_EQ((ZtTryQueryInterface<IThing, IThing>(kThing, nullptr)), nullptr);
   EXPECT_EQ((ZtTryQueryInterface<IThing>(kUnknown, static_cast<IThing*>(object))), nullptr);
@@ -162,7 +162,7 @@ TEST_F(ComObject, TryQueryInterfaceGivesAReferenceOrNull) {
   EXPECT_EQ(ZtAddRef<IThing>(nullptr), nullptr);
 }
 
-TEST_F(ComObject, PointerHoldsOneReferenceAndLeavesEqualObjectsAlone) {
+TEST_F(ztcomObject, PointerHoldsOneReferenceAndLeavesEqualObjectsAlone) {
   CZTComObject<Thing>* object = ZtATLNew<Thing>();
   {
     CztComPtr<IThing> held(object);
@@ -182,7 +182,7 @@ TEST_F(ComObject, PointerHoldsOneReferenceAndLeavesEqualObjectsAlone) {
   EXPECT_EQ(g_alive, 0);
 }
 
-TEST_F(ComObject, CountsFromManyThreadsAddUp) {
+TEST_F(ztcomObject, CountsFromManyThreadsAddUp) {
   CZTComObject<Thing>* object = ZtATLNew<Thing>();
   std::vector<std::thread> threads;
   for (int t = 0; t < 4; ++t) {
@@ -196,14 +196,14 @@ TEST_F(ComObject, CountsFromManyThreadsAddUp) {
   object->Release();
 }
 
-TEST(ComResult, MapsNegativeResults) {
+TEST(ztcomResult, MapsNegativeResults) {
   EXPECT_EQ(HResultFromZTResult(-5), static_cast<HRESULT>(0x800A0005));
   EXPECT_EQ(HResultFromZTResult(7), 0);
   EXPECT_EQ(HResultFromZTResult(0), 0);
   EXPECT_EQ(HResultFromZTResult(INT_MIN), static_cast<HRESULT>(0x800A0000));
 }
 
-TEST(ComMutex, NestsOnlyForItsOwnerWhileHeld) {
+TEST(ztcomMutex, NestsOnlyForItsOwnerWhileHeld) {
   CZTMutex mutex;
   EXPECT_FALSE(mutex.IsNesting());
   mutex.Lock();
@@ -215,7 +215,7 @@ TEST(ComMutex, NestsOnlyForItsOwnerWhileHeld) {
   EXPECT_FALSE(mutex.IsNesting());
 }
 
-TEST(ComMutex, InterlockedReturnsTheNewValue) {
+TEST(ztcomMutex, InterlockedReturnsTheNewValue) {
   int counter = 5;
   EXPECT_EQ(ZTInterlockedInc(&counter), 6);
   EXPECT_EQ(ZTInterlockedDec(&counter), 5);
@@ -231,7 +231,7 @@ struct Sink final : IZTDebugOutputStream {
   bool nest = false;
 };
 
-TEST(ComTrace, FormatsForTheSinkAndCuts) {
+TEST(ztcomTrace, FormatsForTheSinkAndCuts) {
   ZTTrace("nobody %d", 1);
   Sink sink;
   g_pZTDebugOutputStream = &sink;
@@ -242,7 +242,7 @@ TEST(ComTrace, FormatsForTheSinkAndCuts) {
   g_pZTDebugOutputStream = nullptr;
 }
 
-TEST(ComTraceDeathTest, ANestedTraceAborts) {
+TEST(ztcomTraceDeathTest, ANestedTraceAborts) {
   Sink sink;
   sink.nest = true;
   g_pZTDebugOutputStream = &sink;
@@ -250,7 +250,7 @@ TEST(ComTraceDeathTest, ANestedTraceAborts) {
   g_pZTDebugOutputStream = nullptr;
 }
 
-TEST(ComMemory, SystemStringsCountTheirCharacters) {
+TEST(ztcomMemory, SystemStringsCountTheirCharacters) {
   wchar_t* text = ZtSysAllocString(L"abc");
   ASSERT_NE(text, nullptr);
   EXPECT_STREQ(text, L"abc");

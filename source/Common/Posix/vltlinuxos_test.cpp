@@ -60,7 +60,7 @@ class Database : public Installation {
   explicit Database(const std::string& bytes = kDatabase) { WriteBytes(database(), bytes); }
 };
 
-TEST(StringResource, AFileWithoutASlashMatchesNothing) {
+TEST(vltlinuxosStringResource, AFileWithoutASlashMatchesNothing) {
   Database d;
   Expect(Ask(";", L"One.vle"), E_FAIL, "(untouched)");
   Expect(Ask(nullptr, L"One.vle"), E_FAIL, "(untouched)");
@@ -69,7 +69,7 @@ TEST(StringResource, AFileWithoutASlashMatchesNothing) {
 
 // A stored name that ends in a slash has no base name either, and is no component's file. The second
 // round walks the list as the early trace has it.
-TEST(StringResource, AnEmptyBaseNameMatchesNothing) {
+TEST(vltlinuxosStringResource, AnEmptyBaseNameMatchesNothing) {
   for (const char* flags : {"", "2 0"}) {
     Database d("[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/dir/\"\nKey = \"k\"\n");
     WriteBytes(d.root() + "/vlttrace.txt", flags);
@@ -80,7 +80,7 @@ TEST(StringResource, AnEmptyBaseNameMatchesNothing) {
   }
 }
 
-TEST(StringResource, ASeparatorJoinsTheTextsInTheOrderOfTheList) {
+TEST(vltlinuxosStringResource, ASeparatorJoinsTheTextsInTheOrderOfTheList) {
   Database d;
   Expect(Ask(";", L"/anywhere/ONE.vle"), S_OK, "first;second");
   Expect(Ask("", L"/one.vle"), S_OK, "firstsecond");
@@ -88,14 +88,14 @@ TEST(StringResource, ASeparatorJoinsTheTextsInTheOrderOfTheList) {
   Expect(Ask(";", L"/two.vle"), S_OK, "third");
 }
 
-TEST(StringResource, WithoutASeparatorTheFirstComponentDecides) {
+TEST(vltlinuxosStringResource, WithoutASeparatorTheFirstComponentDecides) {
   Database d;
   Expect(Ask(nullptr, L"/x/one.vle"), S_OK, "first");
   Expect(Ask(nullptr, L"/x/one.vle", L"OnlyA"), S_OK, "a");
   Expect(Ask(nullptr, L"/x/one.vle", L"OnlyB"), E_FAIL, "(untouched)");
 }
 
-TEST(StringResource, ALongTextIsCutAndTerminated) {
+TEST(vltlinuxosStringResource, ALongTextIsCutAndTerminated) {
   Database d;
   Expect(Ask(";", L"/one.vle", L"Key", 13), S_OK, "first;second");
   Expect(Ask(";", L"/one.vle", L"Key", 12), S_OK, "first;secon");
@@ -104,20 +104,20 @@ TEST(StringResource, ALongTextIsCutAndTerminated) {
   Expect(Ask(nullptr, L"/one.vle", L"Key", 2), S_OK, "f");
 }
 
-TEST(StringResource, NoRoomAtAllIsHarmless) {
+TEST(vltlinuxosStringResource, NoRoomAtAllIsHarmless) {
   Database d;
   EXPECT_EQ(Ask(nullptr, L"/one.vle", L"Key", 0).text, "(untouched)");
   EXPECT_EQ(Ask(nullptr, L"/one.vle", L"Key", 0).result, E_FAIL);
   EXPECT_EQ(Ask(nullptr, L"/one.vle", L"Key", 1).text, "(untouched)");
 }
 
-TEST(StringResource, AnEmptyTextIsFoundButHandsNothingOut) {
+TEST(vltlinuxosStringResource, AnEmptyTextIsFoundButHandsNothingOut) {
   Database d;
   Expect(Ask(nullptr, L"/two.vle", L"Empty"), S_OK, "(untouched)");
   Expect(Ask(";", L"/two.vle", L"Empty"), S_OK, "(untouched)");
 }
 
-TEST(StringResource, EscapesAreDecodedAndSingleQuotesStay) {
+TEST(vltlinuxosStringResource, EscapesAreDecodedAndSingleQuotesStay) {
   Database d(
       "[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/x/a\\x62.vle\"\n"
       "Key = \"tab\\tquote\\\"\"\nSingle = 'q'\n");
@@ -125,7 +125,7 @@ TEST(StringResource, EscapesAreDecodedAndSingleQuotesStay) {
   Expect(Ask(nullptr, L"/ab.vle", L"Single"), S_OK, "'q'");
 }
 
-TEST(StringResource, WhatIsMissingIsPassedOver) {
+TEST(vltlinuxosStringResource, WhatIsMissingIsPassedOver) {
   Database d(
       "[KORComponents]\nGone = \"x\"\nNoFile = \"x\"\nA = \"x\"\n[NoFile]\nKey = \"n\"\n"
       "[A]\nFileName = \"/a.vle\"\nKey = \"a\"\n[Unlisted]\nFileName = \"/a.vle\"\n"
@@ -133,7 +133,7 @@ TEST(StringResource, WhatIsMissingIsPassedOver) {
   Expect(Ask(";", L"/a.vle"), S_OK, "a");
 }
 
-TEST_IN_CHILD(StringResource, WithoutADatabaseOrItsListThereIsNothing) {
+TEST_IN_CHILD(vltlinuxosStringResource, WithoutADatabaseOrItsListThereIsNothing) {
   Installation i;
   Expect(Ask(nullptr, L"/a.vle"), E_FAIL, "(untouched)");
   WriteBytes(i.database(), "[A]\nFileName = \"/a.vle\"\nKey = \"a\"\n");
@@ -141,7 +141,7 @@ TEST_IN_CHILD(StringResource, WithoutADatabaseOrItsListThereIsNothing) {
   EXPECT_EQ(vltGetStringResource(nullptr, L"/a", L"k", nullptr, 10), E_POINTER);
 }
 
-TEST(StringResource, PreviousDictionariesHaveADatabaseBesideThem) {
+TEST(vltlinuxosStringResource, PreviousDictionariesHaveADatabaseBesideThem) {
   Database d;
   std::filesystem::create_directories(d.root() + "/Data Dictionaries/Last");
   WriteBytes(d.root() + "/Data Dictionaries/Last/vlt.vlr",
@@ -151,7 +151,7 @@ TEST(StringResource, PreviousDictionariesHaveADatabaseBesideThem) {
   Expect(Ask(nullptr, L"/nowhere/Last/One.vle"), E_FAIL, "(untouched)");
 }
 
-TEST(StringResource, TheDatabaseIsLookedForAnewEachTime) {
+TEST(vltlinuxosStringResource, TheDatabaseIsLookedForAnewEachTime) {
   Database d;
   Expect(Ask(nullptr, L"/two.vle"), S_OK, "third");
   WriteBytes(d.database(),
@@ -161,7 +161,7 @@ TEST(StringResource, TheDatabaseIsLookedForAnewEachTime) {
   Expect(Ask(nullptr, L"/two.vle"), S_OK, "o");
 }
 
-TEST(StringResource, StoredNamesCountUpToTheirLimit) {
+TEST(vltlinuxosStringResource, StoredNamesCountUpToTheirLimit) {
   // 259 bytes are read: what stands behind belongs to no name.
   std::string deep = "/" + std::string(250, 'd') + "/";
   Database d("[KORComponents]\nA = \"A\"\n[A]\nFileName = \"" + deep +
@@ -170,7 +170,7 @@ TEST(StringResource, StoredNamesCountUpToTheirLimit) {
   Expect(Ask(nullptr, L"/1234567890"), E_FAIL, "(untouched)");
 }
 
-TEST_IN_CHILD(StringResource, ManyQuestionsReadTheDatabaseOnce) {
+TEST_IN_CHILD(vltlinuxosStringResource, ManyQuestionsReadTheDatabaseOnce) {
   Database d;
   vltStringResources resources;
   auto ask = [&] {
@@ -186,7 +186,7 @@ TEST_IN_CHILD(StringResource, ManyQuestionsReadTheDatabaseOnce) {
   EXPECT_EQ(ask(), "n");
 }
 
-TEST_IN_CHILD(StringResource, AWantOfMemoryIsNotRemembered) {
+TEST_IN_CHILD(vltlinuxosStringResource, AWantOfMemoryIsNotRemembered) {
   if (!kCanLimitMemory) GTEST_SKIP() << "NOT TESTED: the sanitizer owns the address space";
   Database d;
   constexpr unsigned kMuch = 128u << 20;
@@ -203,7 +203,7 @@ TEST_IN_CHILD(StringResource, AWantOfMemoryIsNotRemembered) {
   EXPECT_EQ(ask(), S_OK);
 }
 
-TEST(StringResource, BinaryOnesDoNotExist) { EXPECT_EQ(vltGetBinaryResource(), 0); }
+TEST(vltlinuxosStringResource, BinaryOnesDoNotExist) { EXPECT_EQ(vltGetBinaryResource(), 0); }
 
 // ---- Warnings
 
@@ -219,7 +219,7 @@ std::string Printed(const std::string& flags, const std::function<void()>& body)
   return ReadBytes(out / "text");
 }
 
-TEST(EarlyTrace, LinesHaveTheirForm) {
+TEST(vltlinuxosEarlyTrace, LinesHaveTheirForm) {
   TempDir out;
   std::string expected;
   ExpectInChild([&] {
@@ -235,7 +235,7 @@ TEST(EarlyTrace, LinesHaveTheirForm) {
   EXPECT_NE(ReadBytes(out / "text").find("source(8) : trace"), std::string::npos);
 }
 
-TEST(EarlyTrace, ResourcesWarnWhenAskedTo) {
+TEST(vltlinuxosEarlyTrace, ResourcesWarnWhenAskedTo) {
   struct Row {
     const char* database;
     int line;
@@ -261,7 +261,7 @@ TEST(EarlyTrace, ResourcesWarnWhenAskedTo) {
   }
 }
 
-TEST(EarlyTrace, AResourceThatCannotBeReadIsToldWhenAskedTo) {
+TEST(vltlinuxosEarlyTrace, AResourceThatCannotBeReadIsToldWhenAskedTo) {
   Database d;
   std::string text = Printed("2 0", [] { Ask(nullptr, L"/one.vle", L"Key", 0); });
   EXPECT_EQ(text.find(std::string(kSource) + "(120) : trace "), 0u) << text;
@@ -270,7 +270,7 @@ TEST(EarlyTrace, AResourceThatCannotBeReadIsToldWhenAskedTo) {
       << text;
 }
 
-TEST(EarlyTrace, AMissingInstallDirectoryIsToldWhenAskedTo) {
+TEST(vltlinuxosEarlyTrace, AMissingInstallDirectoryIsToldWhenAskedTo) {
   for (const char* flags : {"0 0", "1 0"}) {
     Database d;
     std::string text = Printed(flags, [] {
@@ -290,7 +290,7 @@ TEST(EarlyTrace, AMissingInstallDirectoryIsToldWhenAskedTo) {
   }
 }
 
-TEST(EarlyTrace, AnswersDoNotDependOnTheFlags) {
+TEST(vltlinuxosEarlyTrace, AnswersDoNotDependOnTheFlags) {
   for (const char* flags : {"0 0", "3 0"}) {
     Database d;
     WriteBytes(d.root() + "/vlttrace.txt", flags);
@@ -312,7 +312,7 @@ unsigned Flags(const std::string& bytes) {
   return static_cast<unsigned>(std::stoul(ReadBytes(out / "flags")));
 }
 
-TEST(EarlyTrace, FlagsAreTwoNumbers) {
+TEST(vltlinuxosEarlyTrace, FlagsAreTwoNumbers) {
   EXPECT_EQ(Flags("1 2"), 33u);
   EXPECT_EQ(Flags("  3\n\t1\nmore"), 19u);
   EXPECT_EQ(Flags("2"), 2u);
@@ -322,14 +322,14 @@ TEST(EarlyTrace, FlagsAreTwoNumbers) {
   EXPECT_EQ(Flags("16 1"), 16u);
 }
 
-TEST_IN_CHILD(EarlyTrace, FlagsAreReadOnce) {
+TEST_IN_CHILD(vltlinuxosEarlyTrace, FlagsAreReadOnce) {
   Installation i;
   EXPECT_EQ(vltGetTraceFlags(), 0u);
   WriteBytes(i.root() + "/vlttrace.txt", "1 2");
   EXPECT_EQ(vltGetTraceFlags(), 0u);
 }
 
-TEST(EarlyTrace, APipeInTheFlagsPlaceDoesNotHoldUp) {
+TEST(vltlinuxosEarlyTrace, APipeInTheFlagsPlaceDoesNotHoldUp) {
   Installation i;
   ASSERT_EQ(mkfifo((i.root() + "/vlttrace.txt").c_str(), 0666), 0);
   ExpectInChild([&] { EXPECT_EQ(vltGetTraceFlags(), 0u); }, 5000);
@@ -337,7 +337,7 @@ TEST(EarlyTrace, APipeInTheFlagsPlaceDoesNotHoldUp) {
 
 // ---- The log directory
 
-TEST(LogDirectory, ForOthersThanTheSuperuser) {
+TEST(vltlinuxosLogDirectory, ForOthersThanTheSuperuser) {
   if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
   TempDir home;
   chmod(home.path().c_str(), 0777);
@@ -361,7 +361,7 @@ TEST(LogDirectory, ForOthersThanTheSuperuser) {
   });
 }
 
-TEST(LogDirectory, WithoutAHomeItIsTheTemporaryOne) {
+TEST(vltlinuxosLogDirectory, WithoutAHomeItIsTheTemporaryOne) {
   if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
   ExpectInChild([&] {
     // The place is fixed; a user without the right to make it shows the text alone.
@@ -374,7 +374,7 @@ TEST(LogDirectory, WithoutAHomeItIsTheTemporaryOne) {
   });
 }
 
-TEST(TracerOptions, ComeFromTheSectionThenFromAllComponentsThenFromDefaults) {
+TEST(vltlinuxosTracerOptions, ComeFromTheSectionThenFromAllComponentsThenFromDefaults) {
   TempDir dir;
   WriteBytes(dir / "x.ini",
              "[AllComponents]\nSeverity = 5\nTarget = 6\nLowDiskThreshold = 7\n"
@@ -402,12 +402,12 @@ TEST(TracerOptions, ComeFromTheSectionThenFromAllComponentsThenFromDefaults) {
 
 // ---- set-user-id programs
 
-TEST(LogDirectory, DISABLED_PrintsItself) {
+TEST(vltlinuxosLogDirectory, DISABLED_PrintsItself) {
   printf("directory=%s secure=%lu\n", zt::fnd::AnsiString(vlLogDirectory()).c_str(),
          getauxval(AT_SECURE));
 }
 
-TEST(LogDirectory, HomeOfTheCallerOfASetUserIdProgramIsNotTaken) {
+TEST(vltlinuxosLogDirectory, HomeOfTheCallerOfASetUserIdProgramIsNotTaken) {
   if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   const std::string program = dir / "program";
@@ -415,7 +415,7 @@ TEST(LogDirectory, HomeOfTheCallerOfASetUserIdProgramIsNotTaken) {
   ASSERT_EQ(chown(program.c_str(), 65534, 65534), 0);
   ASSERT_EQ(chmod(program.c_str(), 04755), 0);
   ProgramResult result = RunProgram({program, "--gtest_also_run_disabled_tests",
-                                     "--gtest_filter=LogDirectory.DISABLED_PrintsItself"},
+                                     "--gtest_filter=vltlinuxosLogDirectory.DISABLED_PrintsItself"},
                                     {{"HOME", "/callers"}});
   if (result.out.find("secure=0") != std::string::npos) {
     GTEST_SKIP() << "NOT TESTED: programs keep their caller's rights in this file system";

@@ -9,7 +9,7 @@
 namespace zt::fnd::osdep {
 namespace {
 
-TEST(ThreadAtomicInt, StepsReturnTheNewValue) {
+TEST(AtomicInt, StepsReturnTheNewValue) {
   AtomicInt n(5);
   EXPECT_EQ(5, n.getCount());
   EXPECT_EQ(6, n.increment());
@@ -17,7 +17,7 @@ TEST(ThreadAtomicInt, StepsReturnTheNewValue) {
   EXPECT_EQ(5, n.getCount());
 }
 
-TEST(ThreadAtomicInt, CompareExchangeReturnsTheOldValueEitherWay) {
+TEST(AtomicInt, CompareExchangeReturnsTheOldValueEitherWay) {
   AtomicInt n(5);
   EXPECT_EQ(5, n.compareExchange(4, 9));
   EXPECT_EQ(5, n.getCount());
@@ -25,14 +25,14 @@ TEST(ThreadAtomicInt, CompareExchangeReturnsTheOldValueEitherWay) {
   EXPECT_EQ(9, n.getCount());
 }
 
-TEST(ThreadAtomicInt, ReplaceStoresAndTheOtherReturnsTheOldValue) {
+TEST(AtomicInt, ReplaceStoresAndTheOtherReturnsTheOldValue) {
   AtomicInt n(1);
   n.replace(2);
   EXPECT_EQ(2, n.replaceAndReturn(3));
   EXPECT_EQ(3, n.getCount());
 }
 
-TEST(ThreadAtomicInt, Comparisons) {
+TEST(AtomicInt, Comparisons) {
   AtomicInt n(3);
   EXPECT_TRUE(n == 3);
   EXPECT_FALSE(n == 4);
@@ -44,13 +44,13 @@ TEST(ThreadAtomicInt, Comparisons) {
   EXPECT_FALSE(n >= 4);
 }
 
-TEST(ThreadAtomicInt, WrapsAtBothEnds) {
+TEST(AtomicInt, WrapsAtBothEnds) {
   AtomicInt n(INT_MAX);
   EXPECT_EQ(INT_MIN, n.increment());
   EXPECT_EQ(INT_MAX, n.decrement());
 }
 
-TEST(ThreadAtomicInt, ThreadsLoseNoStep) {
+TEST(AtomicInt, ThreadsLoseNoStep) {
   AtomicInt n(0);
   std::vector<std::thread> threads;
   for (int t = 0; t < 4; ++t) {

@@ -51,14 +51,14 @@ struct Opened {
   std::int64_t position() const { return file.seek(0, Origin::Current); }
 };
 
-TEST(FileBinary, ModeBitsHaveTheirValues) {
+TEST(BinaryFile, ModeBitsHaveTheirValues) {
   EXPECT_EQ(1u, static_cast<unsigned>(Mode::Read));
   EXPECT_EQ(0x14u, static_cast<unsigned>(Mode::ReadWrite | Mode::Create));
   EXPECT_EQ(0x1Cu, static_cast<unsigned>(Mode::ReadWrite | Mode::Create | Mode::Truncate));
   EXPECT_EQ(2u, static_cast<unsigned>(Mode::Write));
 }
 
-TEST(FileBinary, CreatedFileIsPrivateAndCloseOnExec) {
+TEST(BinaryFile, CreatedFileIsPrivateAndCloseOnExec) {
   TempDir dir;
   BinaryFile file(Wide(dir / "new"), static_cast<Mode>(20), false);
   EXPECT_EQ(0600, ModeOf(dir / "new"));
@@ -67,7 +67,7 @@ TEST(FileBinary, CreatedFileIsPrivateAndCloseOnExec) {
   ::close(fd);
 }
 
-TEST(FileBinary, CreateObeysTheUmask) {
+TEST(BinaryFile, CreateObeysTheUmask) {
   TempDir dir;
   vlt::test::Child child([&] {
     umask(0277);
@@ -79,7 +79,7 @@ TEST(FileBinary, CreateObeysTheUmask) {
   EXPECT_EQ(0400, ModeOf(dir / "new"));
 }
 
-TEST(FileBinary, ModesOpenAsToldBitByBit) {
+TEST(BinaryFile, ModesOpenAsToldBitByBit) {
   Opened o("0123456789");
   char c;
   auto tryMode = [&](unsigned mode, bool reads, bool writes) {
@@ -99,7 +99,7 @@ TEST(FileBinary, ModesOpenAsToldBitByBit) {
   EXPECT_EQ("", ReadBytes(o.path));
 }
 
-TEST(FileBinary, OpenFailuresThrowOrReturn) {
+TEST(BinaryFile, OpenFailuresThrowOrReturn) {
   TempDir dir;
   BinaryFile file;
   EXPECT_EQ(ENOENT, PosixErrorOf([&] { file.open(Wide(dir / "no"), Mode::Read); }));
@@ -111,7 +111,7 @@ TEST(FileBinary, OpenFailuresThrowOrReturn) {
   EXPECT_FALSE(BinaryFile(Wide(dir / "no"), Mode::Read, true).isOpen());
 }
 
-TEST(FileBinary, OpeningAnOpenObjectIsRefusedAndLeavesIt) {
+TEST(BinaryFile, OpeningAnOpenObjectIsRefusedAndLeavesIt) {
   Opened o("abc");
   char c;
   ASSERT_EQ(1, o.file.read(&c, 1));
@@ -124,7 +124,7 @@ TEST(FileBinary, OpeningAnOpenObjectIsRefusedAndLeavesIt) {
   EXPECT_EQ('b', c);
 }
 
-TEST(FileBinary, ClosedObjectReportsAndDoesNothing) {
+TEST(BinaryFile, ClosedObjectReportsAndDoesNothing) {
   BinaryFile file;
   char c = 'x';
   AutoBuffer buffer;
@@ -146,7 +146,7 @@ TEST(FileBinary, ClosedObjectReportsAndDoesNothing) {
   file.close();
 }
 
-TEST(FileBinary, CloseAndDestructorGiveTheDescriptorBack) {
+TEST(BinaryFile, CloseAndDestructorGiveTheDescriptorBack) {
   TempDir dir;
   int before = vlt::test::OpenDescriptors();
   {
@@ -159,7 +159,7 @@ TEST(FileBinary, CloseAndDestructorGiveTheDescriptorBack) {
   EXPECT_EQ(before, vlt::test::OpenDescriptors());
 }
 
-TEST(FileBinary, ReadMayBeShortAndIsZeroAtTheEnd) {
+TEST(BinaryFile, ReadMayBeShortAndIsZeroAtTheEnd) {
   Opened o("abcdef");
   char bytes[10];
   EXPECT_EQ(6, o.file.read(bytes, 10));
@@ -172,7 +172,7 @@ TEST(FileBinary, ReadMayBeShortAndIsZeroAtTheEnd) {
   EXPECT_EQ("xydef", Text(buffer));
 }
 
-TEST(FileBinary, ExactReadIsAllOrNothing) {
+TEST(BinaryFile, ExactReadIsAllOrNothing) {
   Opened o("abcdef");
   char bytes[10];
   EXPECT_EQ(4, o.file.readExactSize(bytes, 4));
@@ -189,7 +189,7 @@ TEST(FileBinary, ExactReadIsAllOrNothing) {
   EXPECT_EQ(6, o.position());
 }
 
-TEST(FileBinary, HugeExactReadOfASmallFileTakesNoMemory) {
+TEST(BinaryFile, HugeExactReadOfASmallFileTakesNoMemory) {
   Opened o("abc");
   AutoBuffer buffer;
   errno = EDOM;
@@ -199,7 +199,7 @@ TEST(FileBinary, HugeExactReadOfASmallFileTakesNoMemory) {
   EXPECT_EQ(0, o.position());
 }
 
-TEST(FileBinary, ReadThatNoBufferCanHoldIsENOMEM) {
+TEST(BinaryFile, ReadThatNoBufferCanHoldIsENOMEM) {
   BinaryFile zeros(L"/dev/zero", Mode::Read, false);
   AutoBuffer buffer(BufferWrapper(std::string(32, 'x').data(), 32));
   errno = EDOM;
@@ -211,7 +211,7 @@ TEST(FileBinary, ReadThatNoBufferCanHoldIsENOMEM) {
   EXPECT_EQ(std::string(32, 'x'), Text(buffer));
 }
 
-TEST(FileBinary, ExactTransferGoesOnAfterShortOnes) {
+TEST(BinaryFile, ExactTransferGoesOnAfterShortOnes) {
   int fds[2];
   ASSERT_EQ(0, pipe2(fds, O_CLOEXEC));
   std::string sent(300000, 's'), got(300000, '\0');  // several times what a pipe holds
@@ -226,7 +226,7 @@ TEST(FileBinary, ExactTransferGoesOnAfterShortOnes) {
   ::close(fds[0]);
 }
 
-TEST(FileBinary, ExactTransferSurvivesSignals) {
+TEST(BinaryFile, ExactTransferSurvivesSignals) {
   struct sigaction action = {}, before = {};
   action.sa_handler = [](int) {};
   sigaction(SIGUSR1, &action, &before);  // without SA_RESTART
@@ -248,7 +248,7 @@ TEST(FileBinary, ExactTransferSurvivesSignals) {
   ::close(fds[1]);
 }
 
-TEST(FileBinary, ExactWriteThatFailsLeavesWhatItWrote) {
+TEST(BinaryFile, ExactWriteThatFailsLeavesWhatItWrote) {
   TempDir dir;
   vlt::test::Child child([&] {
     signal(SIGXFSZ, SIG_IGN);
@@ -263,7 +263,7 @@ TEST(FileBinary, ExactWriteThatFailsLeavesWhatItWrote) {
   EXPECT_EQ("0123456789", ReadBytes(dir / "f"));
 }
 
-TEST(FileBinary, ExactCountBeyondThirtyOneBitsThrowsAfterTheTransfer) {
+TEST(BinaryFile, ExactCountBeyondThirtyOneBitsThrowsAfterTheTransfer) {
   if constexpr (sizeof(void*) > 4) {
     TempDir dir;
     int fd = ::open((dir / "sparse").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600);
@@ -282,7 +282,7 @@ TEST(FileBinary, ExactCountBeyondThirtyOneBitsThrowsAfterTheTransfer) {
   }
 }
 
-TEST(FileBinary, ByteVectorsInBothOrders) {
+TEST(BinaryFile, ByteVectorsInBothOrders) {
   for (Endianness order : {Endianness::Little, Endianness::Big, static_cast<Endianness>(7)}) {
     Opened o("");
     EXPECT_EQ(7, o.file.writeByteVector(BufferWrapper("abc", 3), order));
@@ -302,7 +302,7 @@ TEST(FileBinary, ByteVectorsInBothOrders) {
   }
 }
 
-TEST(FileBinary, ByteVectorTooLongWritesNothing) {
+TEST(BinaryFile, ByteVectorTooLongWritesNothing) {
   Opened o("");
   EXPECT_EQ(-1, o.file.writeByteVector(BufferWrapper("x", 0x80000000u), Endianness::Little));
   EXPECT_EQ(-1, o.file.writeByteVector(BufferWrapper("x", 0xFFFFFFFFu), Endianness::Big));
@@ -310,7 +310,7 @@ TEST(FileBinary, ByteVectorTooLongWritesNothing) {
   EXPECT_EQ(0, o.position());
 }
 
-TEST(FileBinary, BrokenByteVectorsLeavePositionAndBuffer) {
+TEST(BinaryFile, BrokenByteVectorsLeavePositionAndBuffer) {
   const std::string rows[] = {std::string("z\5\0\0\0abc", 8), std::string("z\0\0\0\x80q", 6),
                               std::string("z\xff\xff\xff\x7f", 5), std::string("z\1\0\0", 4)};
   for (const std::string& bytes : rows) {
@@ -323,7 +323,7 @@ TEST(FileBinary, BrokenByteVectorsLeavePositionAndBuffer) {
   }
 }
 
-TEST(FileBinary, SeekResizeSync) {
+TEST(BinaryFile, SeekResizeSync) {
   Opened o("abcdef");
   EXPECT_EQ(4, o.file.seek(-2, Origin::End));
   EXPECT_EQ(3, o.file.seek(-1, Origin::Current));

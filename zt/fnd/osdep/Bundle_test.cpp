@@ -23,7 +23,7 @@ using vlt::test::MakeModule;
 using vlt::test::TempDir;
 using vlt::test::Wide;
 
-TEST(LibraryBundle, DecorateName) {
+TEST(Bundle, DecorateName) {
   const char* rows[][2] = {
       {"X", "X.bundle"}, {"X.framework", "X.framework"}, {"/a.b/X", "/a.b/X.bundle"}, {".", "."}};
   for (const auto& row : rows) {
@@ -32,7 +32,7 @@ TEST(LibraryBundle, DecorateName) {
   EXPECT_THROW(Bundle::decorateName(String()), exception::InvalidArgument);
 }
 
-TEST(LibraryBundle, OpensTheFirstModuleInsideThatLoads) {
+TEST(Bundle, OpensTheFirstModuleInsideThatLoads) {
   for (const char* inside : {"libX.so", "X.so", "X"}) {
     for (const char* name : {"X.framework", "X.bundle", "X.vle"}) {
       TempDir dir;
@@ -51,7 +51,7 @@ TEST(LibraryBundle, OpensTheFirstModuleInsideThatLoads) {
   }
 }
 
-TEST(LibraryBundle, OrderInsideIsLibraryPlainBare) {
+TEST(Bundle, OrderInsideIsLibraryPlainBare) {
   TempDir dir;
   dir.makeDir("X.bundle");
   vlt::test::WriteBytes(dir / "X.bundle/libX.so", "no module");
@@ -68,7 +68,7 @@ TEST(LibraryBundle, OrderInsideIsLibraryPlainBare) {
   EXPECT_FALSE(IsMapped(dir / "X.bundle/X.so"));
 }
 
-TEST(LibraryBundle, WhatIsNoDirectoryIsNoBundle) {
+TEST(Bundle, WhatIsNoDirectoryIsNoBundle) {
   TempDir dir;
   MakeModule(dir / "X.bundle");
   dir.makeDir("empty.framework");
@@ -84,7 +84,7 @@ TEST(LibraryBundle, WhatIsNoDirectoryIsNoBundle) {
   }
 }
 
-TEST(LibraryBundle, LookUpFailures) {
+TEST(Bundle, LookUpFailures) {
   Bundle closed{String()};
   EXPECT_EQ(nullptr, closed.getFunctionPointer(L"cos", true));
   EXPECT_THROW(closed.getFunctionPointer(L"cos", false), exception::InvalidOperation);
@@ -102,7 +102,7 @@ TEST(LibraryBundle, LookUpFailures) {
   }
 }
 
-TEST(LibraryBundle, CopiesShareTheModule) {
+TEST(Bundle, CopiesShareTheModule) {
   TempDir dir;
   dir.makeDir("X.bundle");
   MakeModule(dir / "X.bundle/libX.so");

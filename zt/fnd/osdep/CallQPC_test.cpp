@@ -8,7 +8,7 @@
 namespace zt::fnd::osdep {
 namespace {
 
-TEST(ThreadCallQPC, UnitIsTheTickLengthInNanoseconds) {
+TEST(CallQPC, UnitIsTheTickLengthInNanoseconds) {
   CallQPC clock;
   const std::uint64_t ticks = 12345678901ull;  // 12.345678901 seconds
   ASSERT_EQ(1000000000u, MonotonicTicksPerSecond());
@@ -21,7 +21,7 @@ TEST(ThreadCallQPC, UnitIsTheTickLengthInNanoseconds) {
   for (const auto& row : rows) EXPECT_EQ(row.count, clock.convert(ticks, row.unit)) << row.unit;
 }
 
-TEST(ThreadCallQPC, LargeReadingsDoNotOverflow) {
+TEST(CallQPC, LargeReadingsDoNotOverflow) {
   CallQPC clock;
   const std::uint64_t all = ~std::uint64_t(0);
   EXPECT_EQ(all, clock.convert(all, 1));
@@ -29,7 +29,7 @@ TEST(ThreadCallQPC, LargeReadingsDoNotOverflow) {
   EXPECT_EQ(all / 1000000000, clock.convert(all, 1000000000));
 }
 
-TEST(ThreadCallQPC, ReadingsGoUpWithTime) {
+TEST(CallQPC, ReadingsGoUpWithTime) {
   CallQPC clock;
   std::uint64_t before = clock.hires(1000000);
   Sleep(30);

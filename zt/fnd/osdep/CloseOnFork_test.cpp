@@ -34,7 +34,7 @@ using vlt::test::TempDir;
 
 AnsiString Path(const TempDir& dir, const char* name) { return AnsiString((dir / name).c_str()); }
 
-TEST(ForkClose, ChildHasTheDescriptorClosedAndTheParentKeepsItsLock) {
+TEST(CloseOnFork, ChildHasTheDescriptorClosedAndTheParentKeepsItsLock) {
   TempDir dir;
   CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
   const int number = fd.get();
@@ -47,7 +47,7 @@ TEST(ForkClose, ChildHasTheDescriptorClosedAndTheParentKeepsItsLock) {
   EXPECT_NE(0, Flock(other.get(), LOCK_EX | LOCK_NB));
 }
 
-TEST(ForkClose, LockOfAKilledParentDoesNotOutliveItInTheChild) {
+TEST(CloseOnFork, LockOfAKilledParentDoesNotOutliveItInTheChild) {
   TempDir dir;
   vlt::test::Signal ready, end;
   Child parent([&] {
@@ -69,7 +69,7 @@ TEST(ForkClose, LockOfAKilledParentDoesNotOutliveItInTheChild) {
   end.notify();
 }
 
-TEST(ForkClose, UnmarkedAndRemarkedDescriptors) {
+TEST(CloseOnFork, UnmarkedAndRemarkedDescriptors) {
   TempDir dir;
   CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
   const int number = fd.get();
@@ -86,7 +86,7 @@ TEST(ForkClose, UnmarkedAndRemarkedDescriptors) {
 }
 
 // In a process of its own, where no other object's number is free after a fork.
-TEST_IN_CHILD(ForkClose, GrandchildDoesNotCloseTheNumberAgain) {
+TEST_IN_CHILD(CloseOnFork, GrandchildDoesNotCloseTheNumberAgain) {
   TempDir dir;
   CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
   const int number = fd.get();
@@ -102,7 +102,7 @@ TEST_IN_CHILD(ForkClose, GrandchildDoesNotCloseTheNumberAgain) {
 }
 
 // Daemons close all descriptors they find, and open others.
-TEST(ForkClose, NumberThatTheHostHasTakenIsTheHosts) {
+TEST(CloseOnFork, NumberThatTheHostHasTakenIsTheHosts) {
   TempDir dir;
   CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
   CloseOnForkFd kept = CloseOnForkFd::OpenShared(Path(dir, "kept"));
@@ -123,7 +123,7 @@ TEST(ForkClose, NumberThatTheHostHasTakenIsTheHosts) {
   EXPECT_TRUE(one.isOpen() && two.isOpen());
 }
 
-TEST(ForkClose, NumberThatAnotherObjectHasGotIsTheOthers) {
+TEST(CloseOnFork, NumberThatAnotherObjectHasGotIsTheOthers) {
   TempDir dir;
   CloseOnForkFd first = CloseOnForkFd::OpenShared(Path(dir, "file"));
   const int number = first.get();
@@ -138,7 +138,7 @@ TEST(ForkClose, NumberThatAnotherObjectHasGotIsTheOthers) {
   EXPECT_EQ(0, child.wait());
 }
 
-TEST(ForkClose, FailedOpenMarksNothing) {
+TEST(CloseOnFork, FailedOpenMarksNothing) {
   TempDir dir;
   int before = vlt::test::OpenDescriptors();
   EXPECT_EQ(EISDIR,
@@ -150,7 +150,7 @@ TEST(ForkClose, FailedOpenMarksNothing) {
 }
 
 // Whatever the moment of the fork: no child keeps a lock that its parent's thread had.
-TEST(ForkClose, ForksAtAnyMomentLeaveNoLockBehind) {
+TEST(CloseOnFork, ForksAtAnyMomentLeaveNoLockBehind) {
   TempDir dir;
   std::atomic<bool> stop{false};
   std::thread opener([&] {

@@ -22,7 +22,7 @@ bool OthersMayEnter(const UnixCriticalSection& section) {
   return entered;
 }
 
-TEST(ThreadCriticalSection, EnteredTwiceIsFreeAfterTwoLeaves) {
+TEST(CriticalSection, EnteredTwiceIsFreeAfterTwoLeaves) {
   UnixCriticalSection section;
   section.enter();
   section.enter();
@@ -33,7 +33,7 @@ TEST(ThreadCriticalSection, EnteredTwiceIsFreeAfterTwoLeaves) {
   EXPECT_TRUE(OthersMayEnter(section));
 }
 
-TEST(ThreadCriticalSection, LeaveByAStrangerChangesNothing) {
+TEST(CriticalSection, LeaveByAStrangerChangesNothing) {
   UnixCriticalSection section;
   section.leave();  // nobody owns it
   section.enter();
@@ -48,7 +48,7 @@ TEST(ThreadCriticalSection, LeaveByAStrangerChangesNothing) {
   EXPECT_TRUE(OthersMayEnter(section));
 }
 
-TEST(ThreadCriticalSection, TryEnterCountsAsAnEntry) {
+TEST(CriticalSection, TryEnterCountsAsAnEntry) {
   UnixCriticalSection section;
   EXPECT_TRUE(section.tryEnter());
   EXPECT_TRUE(section.tryEnter());
@@ -58,7 +58,7 @@ TEST(ThreadCriticalSection, TryEnterCountsAsAnEntry) {
   EXPECT_TRUE(OthersMayEnter(section));
 }
 
-TEST(ThreadCriticalSection, OwnerIsTheThreadInside) {
+TEST(CriticalSection, OwnerIsTheThreadInside) {
   UnixCriticalSection section;
   EXPECT_FALSE(section.inOwningThread());
   section.enter();
@@ -70,7 +70,7 @@ TEST(ThreadCriticalSection, OwnerIsTheThreadInside) {
   EXPECT_FALSE(section.inOwningThread());
 }
 
-TEST(ThreadCriticalSection, EnterWaitsForTheOwner) {
+TEST(CriticalSection, EnterWaitsForTheOwner) {
   CriticalSection section;
   std::atomic<bool> inside{false};
   section.enter();
@@ -85,7 +85,7 @@ TEST(ThreadCriticalSection, EnterWaitsForTheOwner) {
   EXPECT_TRUE(inside);
 }
 
-TEST(ThreadCriticalSection, GuardedCountIsExact) {
+TEST(CriticalSection, GuardedCountIsExact) {
   CriticalSection section;
   int count = 0;
   std::vector<std::thread> threads;
@@ -101,7 +101,7 @@ TEST(ThreadCriticalSection, GuardedCountIsExact) {
   EXPECT_EQ(40000, count);
 }
 
-TEST(ThreadCriticalSection, OwnedSectionMayBeDestroyed) {
+TEST(CriticalSection, OwnedSectionMayBeDestroyed) {
   auto* section = new UnixCriticalSection;
   std::thread([&] { section->enter(); }).join();
   delete section;

@@ -47,36 +47,36 @@ class ScopedZone {
 
 }  // namespace
 
-TEST(TimeText, DateAndTimeStandWithABlank) {
+TEST(DateTimeText, DateAndTimeStandWithABlank) {
   EXPECT_EQ(L"20261114 133425", Text(At(k_seconds), L"%Y%m%d", L"%H%M%S", 0));
   EXPECT_EQ(L"13:34:25 14.11.2026",
             Std(AbsTimeToString(At(k_seconds), L"%d.%m.%Y", L"%H:%M:%S", 0, kTimeUTC, true)));
 }
 
-TEST(TimeText, UsesOfTheSystem) {
+TEST(DateTimeText, UsesOfTheSystem) {
   EXPECT_EQ(L"_11142026", Text(At(k_seconds), L"_%m%d%Y", L"", 0));
   EXPECT_EQ(L"20261114 133425.123", Text(At(k_seconds, 0.123), L"%Y%m%d", L"%H%M%S", 3));
 }
 
-TEST(TimeText, MissingPartsLeaveNoBlank) {
+TEST(DateTimeText, MissingPartsLeaveNoBlank) {
   EXPECT_EQ(L"13:34", Text(At(k_seconds), L"", L"%H:%M", 0));
   EXPECT_EQ(L"2026", Text(At(k_seconds), L"%Y", L"", 0));
   EXPECT_EQ(L"", Text(At(k_seconds), L"", L"", 0));
   EXPECT_EQ(L"13", Std(AbsTimeToString(At(k_seconds), L"", L"%H", 0, kTimeUTC, true)));
 }
 
-TEST(TimeText, NoTimeIsEmptyWhateverTheFormats) {
+TEST(DateTimeText, NoTimeIsEmptyWhateverTheFormats) {
   EXPECT_EQ(L"", Text(AbsTime::min, L"%Y", L"%H", 3));
   EXPECT_EQ(L"", Text(AbsTime::min, L"%Q%", L"%", 0));
   EXPECT_EQ(L"", Text(AbsTime::min, nullptr, nullptr, 0));
 }
 
-TEST(TimeText, TooManyDigitsRaiseFirst) {
+TEST(DateTimeText, TooManyDigitsRaiseFirst) {
   EXPECT_THROW(Text(AbsTime::min, L"", L"", 4), exception::InvalidArgument);
   EXPECT_THROW(Text(At(0), L"%Y", L"", 0xFFFFFFFF), exception::InvalidArgument);
 }
 
-TEST(TimeText, FractionsAreRoundedHalfUpWithCarry) {
+TEST(DateTimeText, FractionsAreRoundedHalfUpWithCarry) {
   const struct {
     double fraction;
     unsigned digits;
@@ -90,26 +90,26 @@ TEST(TimeText, FractionsAreRoundedHalfUpWithCarry) {
   }
 }
 
-TEST(TimeText, WithoutDigitsWholeSecondsAreRoundedHalfToEven) {
+TEST(DateTimeText, WithoutDigitsWholeSecondsAreRoundedHalfToEven) {
   EXPECT_EQ(L"26", Text(At(k_seconds, 0.5), L"", L"%S", 0));
   EXPECT_EQ(L"26", Text(At(k_seconds + 1, 0.5), L"", L"%S", 0));
   EXPECT_EQ(L"25", Text(At(k_seconds, 0.25), L"", L"%S", 0));
 }
 
-TEST(TimeText, EmptyTimeFormatIgnoresTheDigits) {
+TEST(DateTimeText, EmptyTimeFormatIgnoresTheDigits) {
   EXPECT_EQ(L"2026", Text(At(k_seconds, 0.5), L"%Y", L"", 3));
   EXPECT_EQ(L"25", Text(At(k_seconds, 0.75), L"%S", L"", 3))
       << "truncated, as digits are asked for";
   EXPECT_EQ(L"26", Text(At(k_seconds, 0.75), L"%S", L"", 0));
 }
 
-TEST(TimeText, FractionStandsBehindEverySecond) {
+TEST(DateTimeText, FractionStandsBehindEverySecond) {
   EXPECT_EQ(L"25.5|25.5|34", Text(At(k_seconds, 0.5), L"", L"%S|%#S|%M", 1));
   EXPECT_EQ(L"%S.5", Text(At(k_seconds, 0.5), L"", L"%%S", 1)) << "found in the text as it stands";
   EXPECT_EQ(L"25", Text(At(k_seconds, 0.5), L"%S", L"%M", 1).substr(0, 2)) << "not in the date";
 }
 
-TEST(TimeText, SeparatorComesFromTheLastArgument) {
+TEST(DateTimeText, SeparatorComesFromTheLastArgument) {
   EXPECT_EQ(L"25.5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 1));
   EXPECT_EQ(L"25,5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 2));
   const std::wstring point = Std(String(std::localeconv()->decimal_point));
@@ -117,7 +117,7 @@ TEST(TimeText, SeparatorComesFromTheLastArgument) {
   EXPECT_EQ(L"25" + point + L"5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 99));
 }
 
-TEST(TimeText, SuffixFollowsATimeFormat) {
+TEST(DateTimeText, SuffixFollowsATimeFormat) {
   const auto text = [](const wchar_t* clock, const wchar_t* suffix) {
     return Std(AbsTimeToString(At(k_seconds), L"%Y", clock, 0, kTimeUTC, false, suffix));
   };
@@ -126,7 +126,7 @@ TEST(TimeText, SuffixFollowsATimeFormat) {
   EXPECT_EQ(L"2026", text(L"", L"UTC"));
 }
 
-TEST(TimeText, LocalTimeForTypesOneAndTwo) {
+TEST(DateTimeText, LocalTimeForTypesOneAndTwo) {
   const ScopedZone zone("XYZ-2");
   const auto text = [](TimeStringType type) {
     return Std(AbsTimeToString(At(k_seconds), L"", L"%H:%M", 0, type));
@@ -136,7 +136,7 @@ TEST(TimeText, LocalTimeForTypesOneAndTwo) {
   EXPECT_EQ(L"15:34", text(kTimeLocal2));
 }
 
-TEST(TimeText, NullFormatsAreTheSystemsOwn) {
+TEST(DateTimeText, NullFormatsAreTheSystemsOwn) {
   const ScopedLocale locale(LC_TIME, "C");
   EXPECT_EQ(L"%x", Std(GetSystemDateFormat()));
   EXPECT_EQ(L"%X", Std(GetSystemTimeFormat()));
@@ -145,7 +145,7 @@ TEST(TimeText, NullFormatsAreTheSystemsOwn) {
   EXPECT_FALSE(both.empty());
 }
 
-TEST(TimeText, SystemFormatsTakeTheTimeLocaleFromTheEnvironment) {
+TEST(DateTimeText, SystemFormatsTakeTheTimeLocaleFromTheEnvironment) {
   const ScopedLocale locale(LC_TIME, "C");
   setenv("LC_ALL", "C.UTF-8", 1);
   GetSystemDateFormat();
@@ -154,7 +154,7 @@ TEST(TimeText, SystemFormatsTakeTheTimeLocaleFromTheEnvironment) {
   unsetenv("LC_ALL");
 }
 
-TEST(TimeText, ExplicitFormatsLeaveTheLocaleAlone) {
+TEST(DateTimeText, ExplicitFormatsLeaveTheLocaleAlone) {
   const ScopedLocale locale(LC_TIME, "C");
   setenv("LC_ALL", "C.UTF-8", 1);
   Text(At(k_seconds), L"%Y", L"%H", 3);
@@ -162,20 +162,20 @@ TEST(TimeText, ExplicitFormatsLeaveTheLocaleAlone) {
   unsetenv("LC_ALL");
 }
 
-TEST(TimeText, TextBeyondTheBufferIsEmpty) {
+TEST(DateTimeText, TextBeyondTheBufferIsEmpty) {
   const std::wstring format(511, L'x'), longer(512, L'x'), longest(100000, L'x');
   EXPECT_EQ(format, Text(At(0), format.c_str(), L"", 0));
   EXPECT_EQ(L"", Text(At(0), longer.c_str(), L"", 0));
   EXPECT_EQ(L"", Text(At(0), longest.c_str(), longest.c_str(), 0));
 }
 
-TEST(TimeText, YearsBeyondTheCalendarRaise) {
+TEST(DateTimeText, YearsBeyondTheCalendarRaise) {
   EXPECT_THROW(Text(AbsTime::max, L"%Y", L"", 0), exception::OutOfRange);
   EXPECT_THROW(AbsTimeToUTCDateTime(AbsTime::max, false), exception::OutOfRange);
   EXPECT_THROW(AbsTimeToLocalDateTime(AbsTime(-9e18, 0), true), exception::OutOfRange);
 }
 
-TEST(TimeFields, RoundOrTruncate) {
+TEST(DateTimeFields, RoundOrTruncate) {
   EXPECT_EQ(25, AbsTimeToUTCDateTime(At(k_seconds, 0.75), false).tm_sec);
   EXPECT_EQ(26, AbsTimeToUTCDateTime(At(k_seconds, 0.75), true).tm_sec);
   const std::tm fields = AbsTimeToUTCDateTime(At(0), false);
@@ -186,17 +186,17 @@ TEST(TimeFields, RoundOrTruncate) {
   EXPECT_EQ(1, old.tm_mday);
 }
 
-TEST(TimeFields, PassTheYear2038) {
+TEST(DateTimeFields, PassTheYear2038) {
   EXPECT_EQ(138, AbsTimeToUTCDateTime(At(2147483648.0), false).tm_year);
   EXPECT_EQ(1100, AbsTimeToUTCDateTime(At(32503680000.0), false).tm_year);
 }
 
-TEST(TimeFields, LocalTimeFollowsTheZone) {
+TEST(DateTimeFields, LocalTimeFollowsTheZone) {
   const ScopedZone zone("XYZ5");
   EXPECT_EQ(8, AbsTimeToLocalDateTime(At(k_seconds), false).tm_hour);
 }
 
-TEST(TimeClock, TimevalKeepsItsMicroseconds) {
+TEST(DateTimeClock, TimevalKeepsItsMicroseconds) {
   timeval time;
   time.tv_sec = 1794663265;
   time.tv_usec = 500000;
@@ -210,7 +210,7 @@ TEST(TimeClock, TimevalKeepsItsMicroseconds) {
   EXPECT_EQ(2082844799, TimevalToAbsTime(time).getSeconds());
 }
 
-TEST(TimeClock, CurrentTimeIsNow) {
+TEST(DateTimeClock, CurrentTimeIsNow) {
   const std::int64_t before = std::time(nullptr);
   const AbsTime now = CurrentSystemTime();
   const std::int64_t after = std::time(nullptr);

@@ -53,7 +53,7 @@ struct Raw {
   ScopedFd open() const { return OpenRaw(path); }
 };
 
-TEST(EventLockAccess, AloneIsTrueAndBesideSharersFalse) {
+TEST(EventFileLockAccess, AloneIsTrueAndBesideSharersFalse) {
   Raw raw;
   ScopedFd first = raw.open(), second = raw.open(), third = raw.open();
   EXPECT_TRUE(GetLockAccessToFile(first.get()));
@@ -65,7 +65,7 @@ TEST(EventLockAccess, AloneIsTrueAndBesideSharersFalse) {
   EXPECT_NE(0, Flock(raw.open().get(), LOCK_EX | LOCK_NB));  // the third still shares
 }
 
-TEST(EventLockAccess, WaitsForTheExclusivePhaseOfAnother) {
+TEST(EventFileLockAccess, WaitsForTheExclusivePhaseOfAnother) {
   Raw raw;
   ScopedFd first = raw.open(), second = raw.open();
   ASSERT_TRUE(GetLockAccessToFile(first.get()));
@@ -80,7 +80,7 @@ TEST(EventLockAccess, WaitsForTheExclusivePhaseOfAnother) {
   finisher.join();
 }
 
-TEST(EventLockAccess, GivesUpAfterHalfASecondWithTheErrnoAndNoLock) {
+TEST(EventFileLockAccess, GivesUpAfterHalfASecondWithTheErrnoAndNoLock) {
   Raw raw;
   ScopedFd first = raw.open(), second = raw.open();
   ASSERT_EQ(0, Flock(first.get(), LOCK_EX));
@@ -92,7 +92,7 @@ TEST(EventLockAccess, GivesUpAfterHalfASecondWithTheErrnoAndNoLock) {
   EXPECT_EQ(0, Flock(raw.open().get(), LOCK_EX | LOCK_NB));
 }
 
-TEST(EventLockAccess, RefusedLocksEndInTheirErrno) {
+TEST(EventFileLockAccess, RefusedLocksEndInTheirErrno) {
   Raw raw;
   Child child([&] {
     ScopedFd fd = raw.open();

@@ -23,14 +23,14 @@ using vlt::test::kManual;
 using vlt::test::kSet;
 using vlt::test::MsSince;
 
-TEST(ThreadEvent, StartsAsTold) {
+TEST(Event, StartsAsTold) {
   EXPECT_TRUE(Event(kManual, kSet).check());
   EXPECT_FALSE(Event(kManual, kClear).check());
   EXPECT_TRUE(Event(kAutomatic, kSet).check());
   EXPECT_FALSE(Event(kAutomatic, kClear).check());
 }
 
-TEST(ThreadEvent, AutomaticSetTwiceReleasesOneWait) {
+TEST(Event, AutomaticSetTwiceReleasesOneWait) {
   Event event(kAutomatic, kClear);
   event.set();
   event.set();
@@ -38,7 +38,7 @@ TEST(ThreadEvent, AutomaticSetTwiceReleasesOneWait) {
   EXPECT_FALSE(event.check());
 }
 
-TEST(ThreadEvent, WaitOfZeroOnASetManualEventLeavesItSet) {
+TEST(Event, WaitOfZeroOnASetManualEventLeavesItSet) {
   Event event(kManual, kSet);
   EXPECT_TRUE(event.wait(0));
   EXPECT_TRUE(event.wait(0));
@@ -47,13 +47,13 @@ TEST(ThreadEvent, WaitOfZeroOnASetManualEventLeavesItSet) {
   EXPECT_TRUE(event.check());
 }
 
-TEST(ThreadEvent, WaitOfZeroIsACheck) {
+TEST(Event, WaitOfZeroIsACheck) {
   Event event(kAutomatic, kSet);
   EXPECT_TRUE(event.wait(0));
   EXPECT_FALSE(event.wait(0));
 }
 
-TEST(ThreadEvent, TimedWaitOnAnUnsetEventEndsAfterItsTime) {
+TEST(Event, TimedWaitOnAnUnsetEventEndsAfterItsTime) {
   for (bool manual : {kManual, kAutomatic}) {
     Event event(manual, kClear);
     auto start = Clock::now();
@@ -63,13 +63,13 @@ TEST(ThreadEvent, TimedWaitOnAnUnsetEventEndsAfterItsTime) {
   }
 }
 
-TEST(ThreadEvent, TimedWaitThatIsSetConsumesAnAutomaticEvent) {
+TEST(Event, TimedWaitThatIsSetConsumesAnAutomaticEvent) {
   Event event(kAutomatic, kSet);
   EXPECT_TRUE(event.wait(10000));
   EXPECT_FALSE(event.check());
 }
 
-TEST(ThreadEvent, ResetAndResetIfAuto) {
+TEST(Event, ResetAndResetIfAuto) {
   Event manual(kManual, kSet), automatic(kAutomatic, kSet);
   manual.resetIfAuto();
   EXPECT_TRUE(manual.check());
@@ -79,7 +79,7 @@ TEST(ThreadEvent, ResetAndResetIfAuto) {
   EXPECT_FALSE(automatic.check());
 }
 
-TEST(ThreadEvent, ManualSetReleasesAllWaitersAutomaticOne) {
+TEST(Event, ManualSetReleasesAllWaitersAutomaticOne) {
   for (bool manual : {kManual, kAutomatic}) {
     Event event(manual, kClear);
     std::atomic<int> released{0};
@@ -105,7 +105,7 @@ TEST(ThreadEvent, ManualSetReleasesAllWaitersAutomaticOne) {
   }
 }
 
-TEST(ThreadEvent, WaitWithoutLimitReturnsTrue) {
+TEST(Event, WaitWithoutLimitReturnsTrue) {
   Event event(kAutomatic, kClear);
   bool result = false;
   std::thread waiter([&] { result = event.wait(0xFFFFFFFFu); });
@@ -114,7 +114,7 @@ TEST(ThreadEvent, WaitWithoutLimitReturnsTrue) {
   EXPECT_TRUE(result);
 }
 
-TEST(ThreadEvent, SetDuringATimedWaitEndsIt) {
+TEST(Event, SetDuringATimedWaitEndsIt) {
   Event event(kManual, kClear);
   auto start = Clock::now();
   std::thread setter([&] { event.set(); });
@@ -123,7 +123,7 @@ TEST(ThreadEvent, SetDuringATimedWaitEndsIt) {
   setter.join();
 }
 
-TEST(ThreadPumpEvent, WaitsAsAnEventDoesWhateverTheFlag) {
+TEST(EventPump, WaitsAsAnEventDoesWhateverTheFlag) {
   for (bool pump : {true, false}) {
     PumpEvent event(kAutomatic, kSet, pump);
     event.wait(pump);
@@ -134,7 +134,7 @@ TEST(ThreadPumpEvent, WaitsAsAnEventDoesWhateverTheFlag) {
   }
 }
 
-TEST(ThreadPumpEvent, TimeAboveThirtyTwoBitsIsOutOfRange) {
+TEST(EventPump, TimeAboveThirtyTwoBitsIsOutOfRange) {
   PumpEvent event(kManual, kSet, true);
   EXPECT_TRUE(event.wait(0xFFFFFFFFul, true));
   if constexpr (sizeof(unsigned long) > 4) {

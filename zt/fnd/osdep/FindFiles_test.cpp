@@ -59,7 +59,7 @@ struct Tree {
   }
 };
 
-TEST(FileFind, StarLeavesHiddenNamesOutUnlessAsked) {
+TEST(FindFiles, StarLeavesHiddenNamesOutUnlessAsked) {
   Tree t;
   const Names plain = {"B.TXT", "a.txt", "ldangling", "ldir", "lfile", "sub"};
   EXPECT_EQ(t.full(plain), Find(t / "*"));
@@ -69,7 +69,7 @@ TEST(FileFind, StarLeavesHiddenNamesOutUnlessAsked) {
   EXPECT_EQ(t.full(all), Find(t / "*", Flags::Hidden));
 }
 
-TEST(FileFind, MasksIgnoreCase) {
+TEST(FindFiles, MasksIgnoreCase) {
   Tree t;
   EXPECT_EQ(t.full({"B.TXT", "a.txt"}), Find(t / "*.TXT"));
   EXPECT_EQ(t.full({"B.TXT"}), Find(t / "b.*"));
@@ -77,7 +77,7 @@ TEST(FileFind, MasksIgnoreCase) {
   EXPECT_EQ(Names(), Find(t / "*.hid*"));
 }
 
-TEST(FileFind, MaskThatEndsInASeparatorListsNothing) {
+TEST(FindFiles, MaskThatEndsInASeparatorListsNothing) {
   Tree t;
   EXPECT_EQ(Names(), Find(t / "sub/"));
   EXPECT_EQ(Names(), Find(t / ""));
@@ -85,7 +85,7 @@ TEST(FileFind, MaskThatEndsInASeparatorListsNothing) {
   EXPECT_EQ(Names(), Find(t / "missing/", Flags::Hidden));
 }
 
-TEST(FileFind, MissingDirectoryIsQuietWithoutFlagsOnly) {
+TEST(FindFiles, MissingDirectoryIsQuietWithoutFlagsOnly) {
   Tree t;
   EXPECT_EQ(Names(), Find(t / "missing/*"));
   try {
@@ -101,13 +101,13 @@ TEST(FileFind, MissingDirectoryIsQuietWithoutFlagsOnly) {
   EXPECT_THROW(Find("/*", Flags::None), PosixError);
 }
 
-TEST(FileFind, DirectoriesOnlyEndInASlash) {
+TEST(FindFiles, DirectoriesOnlyEndInASlash) {
   Tree t;
   EXPECT_EQ(t.full({"ldir/", "sub/"}), Find(t / "*", Flags::Directories));
   EXPECT_EQ(t.full({".dot/", "ldir/", "sub/"}), Find(t / "*", Flags::Directories | Flags::Hidden));
 }
 
-TEST(FileFind, LinksAreReplacedByTheirText) {
+TEST(FindFiles, LinksAreReplacedByTheirText) {
   Tree t;
   Names expected = t.full({"B.TXT", "a.txt", "sub", "sub"});
   expected.insert(expected.end(), {"a.txt", "nowhere"});
@@ -117,7 +117,7 @@ TEST(FileFind, LinksAreReplacedByTheirText) {
   EXPECT_EQ(t.full({"ldir/", "sub/"}), Find(t / "*", Flags::Directories | Flags::FollowLinks));
 }
 
-TEST(FileFind, DotEntriesStandAtTheEndWhateverThePattern) {
+TEST(FindFiles, DotEntriesStandAtTheEndWhateverThePattern) {
   Tree t;
   Vector<String> found = FindFiles().getFilenames(Wide(t / "a*"), Flags::DotEntries);
   ASSERT_EQ(3u, found.size());
@@ -127,7 +127,7 @@ TEST(FileFind, DotEntriesStandAtTheEndWhateverThePattern) {
   EXPECT_EQ(2u, FindFiles().getFilenames(Wide(t / "nothing"), Flags::DotEntries).size());
 }
 
-TEST(FileFind, RelativeMasks) {
+TEST(FindFiles, RelativeMasks) {
   Tree t;
   String before = path::SetCWD(Wide(t.dir.path()));
   EXPECT_EQ((Names{"./B.TXT", "./a.txt"}), Find("*.txt"));
@@ -140,7 +140,7 @@ TEST(FileFind, RelativeMasks) {
   path::SetCWD(before);
 }
 
-TEST(FileFind, LaterSeparatorSplitsTheMask) {
+TEST(FindFiles, LaterSeparatorSplitsTheMask) {
   TempDir dir;
   dir.makeDir("d\\e");
   WriteBytes(dir / "d\\e/f", "");
@@ -149,13 +149,13 @@ TEST(FileFind, LaterSeparatorSplitsTheMask) {
   EXPECT_EQ(Names(), Find(dir / "d\\*"));
 }
 
-TEST(FileFind, ManyEntriesAreAllListed) {
+TEST(FindFiles, ManyEntriesAreAllListed) {
   TempDir dir;
   for (int i = 0; i < 3000; ++i) WriteBytes(dir / ("n" + std::to_string(i)), "");
   EXPECT_EQ(3000u, Find(dir / "n*").size());
 }
 
-TEST(FileWildcard, Table) {
+TEST(FindFilesWildcard, Table) {
   const struct {
     const wchar_t* pattern;
     const wchar_t* name;
@@ -190,7 +190,7 @@ TEST(FileWildcard, Table) {
   }
 }
 
-TEST(FileWildcard, HostilePatternEndsSoon) {
+TEST(FindFilesWildcard, HostilePatternEndsSoon) {
   String pattern, name(5000, L'a');
   for (int i = 0; i < 500; ++i) pattern += L"*a";
   pattern += L"b";

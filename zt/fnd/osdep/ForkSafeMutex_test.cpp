@@ -265,7 +265,7 @@ struct Counted {
   ~Counted() { --alive; }
 };
 
-TEST(LeakedInstance, ThreadsThatComeFirstAtOnceGetOneObject) {
+TEST(ForkSafeMutexLeakedInstance, ThreadsThatComeFirstAtOnceGetOneObject) {
   std::atomic<Counted*> seen{nullptr};
   std::atomic<int> others{0};
   std::vector<std::thread> threads;

@@ -31,7 +31,7 @@ std::string ToNarrow(const std::wstring& text, const char* to, std::size_t room 
 
 }  // namespace
 
-TEST(TextIConv, ConvertsBothWays) {
+TEST(IConv, ConvertsBothWays) {
   EXPECT_EQ(L"a\xE9\x20AC", ToWide("a\xC3\xA9\xE2\x82\xAC", "UTF-8"));
   EXPECT_EQ("a\xC3\xA9\xE2\x82\xAC", ToNarrow(L"a\xE9\x20AC", "UTF-8"));
   EXPECT_EQ(L"a\xE9", ToWide("a\xE9", "ISO-8859-1"));
@@ -39,7 +39,7 @@ TEST(TextIConv, ConvertsBothWays) {
   EXPECT_EQ(std::wstring(L"a\0b", 3), ToWide(std::string("a\0b", 3), "UTF-8"));
 }
 
-TEST(TextIConv, EachBadUnitBecomesOneQuestionMark) {
+TEST(IConv, EachBadUnitBecomesOneQuestionMark) {
   EXPECT_EQ(L"a??b", ToWide("a\xFF\xFE"
                             "b",
                             "UTF-8"));
@@ -51,20 +51,20 @@ TEST(TextIConv, EachBadUnitBecomesOneQuestionMark) {
   EXPECT_EQ("??", ToNarrow(L"\xD800\x110000", "UTF-8"));
 }
 
-TEST(TextIConv, ShortageOfRoomTruncates) {
+TEST(IConv, ShortageOfRoomTruncates) {
   EXPECT_EQ(L"ab", ToWide("abcd", "UTF-8", 2));
   EXPECT_EQ(L"", ToWide("abcd", "UTF-8", 0));
   EXPECT_EQ("ab", ToNarrow(L"abcd", "UTF-8", 2));
   EXPECT_EQ("a?", ToNarrow(L"a\x20AC", "UTF-8", 2)) << "some room, but not enough, is bad text";
 }
 
-TEST(TextIConv, UnknownEncodingRaisesAlsoForNothing) {
+TEST(IConv, UnknownEncodingRaisesAlsoForNothing) {
   EXPECT_THROW(ToWide("a", "no-such-code"), exception::InvalidLocale);
   EXPECT_THROW(ToWide("", "no-such-code"), exception::InvalidLocale);
   EXPECT_THROW(ToNarrow(L"a", "en_US.UTF-8"), exception::InvalidLocale) << "a locale, no encoding";
 }
 
-TEST(TextIConv, LeavesNoDescriptorOpen) {
+TEST(IConv, LeavesNoDescriptorOpen) {
   const int before = vlt::test::OpenDescriptors();
   for (int i = 0; i < 50; ++i) ToWide("a\xFF", "UTF-8");
   EXPECT_EQ(before, vlt::test::OpenDescriptors());

@@ -28,7 +28,7 @@ std::string ToNarrow(const std::wstring& text, const char* locale) {
 
 }  // namespace
 
-TEST(TextLocale, RequiredLengthsAreUpperBounds) {
+TEST(LocaleText, RequiredLengthsAreUpperBounds) {
   const char text[] = "abc";
   const wchar_t wide[] = L"abc";
   for (const char* locale : {"", "carbon", "US-ASCII", "UTF-8"}) {
@@ -39,7 +39,7 @@ TEST(TextLocale, RequiredLengthsAreUpperBounds) {
   }
 }
 
-TEST(TextLocale, LengthsBeyond32BitsAreOutOfRange) {
+TEST(LocaleText, LengthsBeyond32BitsAreOutOfRange) {
   if (sizeof(void*) == 4) GTEST_SKIP() << "such ranges do not fit the address space";
   const char* const begin = reinterpret_cast<const char*>(0x10000);
   const wchar_t* const wide = reinterpret_cast<const wchar_t*>(0x10000);
@@ -55,7 +55,7 @@ TEST(TextLocale, LengthsBeyond32BitsAreOutOfRange) {
   EXPECT_THROW(WideToAnsi(wide, wide + 0x40000000, ""), exception::OutOfRange);
 }
 
-TEST(TextLocale, ProcessLocaleUnderUtf8) {
+TEST(LocaleText, ProcessLocaleUnderUtf8) {
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
   EXPECT_EQ(
       L"abc\xE9\x20AC"
@@ -77,7 +77,7 @@ TEST(TextLocale, ProcessLocaleUnderUtf8) {
   EXPECT_EQ("\xC3\xA9", ToNarrow(L"\xE9", nullptr));
 }
 
-TEST(TextLocale, ProcessLocaleUnderCIsAscii) {
+TEST(LocaleText, ProcessLocaleUnderCIsAscii) {
   const ScopedLocale locale(LC_CTYPE, "C");
   EXPECT_EQ(L"ab??c", ToWide("ab\xC3\xA9"
                              "c",
@@ -88,13 +88,13 @@ TEST(TextLocale, ProcessLocaleUnderCIsAscii) {
   EXPECT_EQ(L"abc", ToWide("abc", "carbon"));
 }
 
-TEST(TextLocale, FollowsAChangeOfTheHostsLocale) {
+TEST(LocaleText, FollowsAChangeOfTheHostsLocale) {
   EXPECT_EQ("?", ToNarrow(L"\xE9", ""));
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
   EXPECT_EQ("\xC3\xA9", ToNarrow(L"\xE9", ""));
 }
 
-TEST(TextLocale, AsciiIsTheSameInEveryLocale) {
+TEST(LocaleText, AsciiIsTheSameInEveryLocale) {
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
   EXPECT_EQ(L"ab??", ToWide("ab\xC3\xA9", "US-ASCII"));
   EXPECT_EQ("ab??c", ToNarrow(L"ab\xE9\x20AC"
@@ -103,7 +103,7 @@ TEST(TextLocale, AsciiIsTheSameInEveryLocale) {
   EXPECT_EQ("?", ToNarrow(std::wstring(1, static_cast<wchar_t>(0x80000041)), "US-ASCII"));
 }
 
-TEST(TextLocale, OtherEncodingsByName) {
+TEST(LocaleText, OtherEncodingsByName) {
   EXPECT_EQ(L"\xE9", ToWide("\xE9", "ISO-8859-1"));
   EXPECT_EQ("\xE9?", ToNarrow(L"\xE9\x20AC", "ISO-8859-1"));
   EXPECT_THROW(ToWide("a", "no-such-code"), exception::InvalidLocale);
@@ -111,7 +111,7 @@ TEST(TextLocale, OtherEncodingsByName) {
   EXPECT_THROW(ToNarrow(L"a", "Carbon"), exception::InvalidLocale) << "the name is exact";
 }
 
-TEST(TextLocale, ConvertsIntoABufferAsFarAsThereIsRoom) {
+TEST(LocaleText, ConvertsIntoABufferAsFarAsThereIsRoom) {
   for (const char* name : {"C", "C.UTF-8"}) {
     const ScopedLocale locale(LC_CTYPE, name);
     const char text[] = "abcd";
@@ -136,7 +136,7 @@ TEST(TextLocale, ConvertsIntoABufferAsFarAsThereIsRoom) {
   }
 }
 
-TEST(TextLocale, MixedTextIsTruncatedInItsSecondHalf) {
+TEST(LocaleText, MixedTextIsTruncatedInItsSecondHalf) {
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
   const wchar_t source[] =
       L"ab\x20AC"
@@ -150,7 +150,7 @@ TEST(TextLocale, MixedTextIsTruncatedInItsSecondHalf) {
   EXPECT_EQ("ab?c", std::string(narrow, 4));
 }
 
-TEST(TextLocale, NewBlocksTellTheirEnd) {
+TEST(LocaleText, NewBlocksTellTheirEnd) {
   const char text[] = "abc";
   wchar_t *wide, *wideEnd;
   AnsiToWide(text, text + 3, "US-ASCII", wide, wideEnd);
@@ -169,7 +169,7 @@ TEST(TextLocale, NewBlocksTellTheirEnd) {
   EXPECT_EQ(L"", ToWide("", ""));
 }
 
-TEST(TextLocale, ThrowingOnBadTextCannotBeSwitchedOn) {
+TEST(LocaleText, ThrowingOnBadTextCannotBeSwitchedOn) {
   EXPECT_FALSE(MakeWideToAnsiThrow(true));
   EXPECT_EQ("?", ToNarrow(L"\xE9", "US-ASCII"));
   EXPECT_FALSE(MakeWideToAnsiThrow(false));

@@ -24,7 +24,7 @@ bool NoSource(unsigned char (&)[16]) { return false; }
 
 }  // namespace
 
-TEST(GuidMake, TextReadsAsTheUuid) {
+TEST(MakeGUID, TextReadsAsTheUuid) {
   const _GUID guid = MakeGUID(CountingSource);
   EXPECT_EQ(0x00112233u, guid.Data1);
   EXPECT_EQ(0x4455u, guid.Data2);
@@ -36,11 +36,11 @@ TEST(GuidMake, TextReadsAsTheUuid) {
   EXPECT_EQ(0, text.exactCompare(L"{00112233-4455-6677-8899-AABBCCDDEEFF}"));
 }
 
-TEST(GuidMake, WithoutASourceRaises) {
+TEST(MakeGUID, WithoutASourceRaises) {
   EXPECT_THROW(MakeGUID(NoSource), exception::InitializationFailure);
 }
 
-TEST(GuidMake, VersionFourAndNeverTheSame) {
+TEST(MakeGUID, VersionFourAndNeverTheSame) {
   std::set<std::string> seen;
   for (int i = 0; i < 1000; ++i) {
     const _GUID guid = MakeGUID();
@@ -50,7 +50,7 @@ TEST(GuidMake, VersionFourAndNeverTheSame) {
   }
 }
 
-TEST(GuidMake, SourceFillsAllBytes) {
+TEST(MakeGUID, SourceFillsAllBytes) {
   unsigned char ones[16] = {};
   for (int i = 0; i < 200; ++i) {
     unsigned char bytes[16] = {};

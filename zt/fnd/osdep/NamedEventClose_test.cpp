@@ -45,7 +45,7 @@ constexpr auto Open = [](const std::string& name, bool manual = kManual, bool in
 // ---- the host's locale
 
 // The host may change its locale at any time; files and entries are found under any.
-TEST_IN_CHILD(NamedEventFiles, ClosesUnderAnotherLocaleThanItWasOpenedUnder) {
+TEST_IN_CHILD(NamedEventClose, ClosesUnderAnotherLocaleThanItWasOpenedUnder) {
   EventPlace place;
   vlt::test::ScopedLocale plain(LC_ALL, "C");
   auto first = std::make_unique<NamedEvent>(L"\xCA", kManual, kClear);
@@ -62,7 +62,7 @@ TEST_IN_CHILD(NamedEventFiles, ClosesUnderAnotherLocaleThanItWasOpenedUnder) {
 
 // ---- processes that die
 
-TEST(NamedEventFiles, KilledProcessLeavesItsSlotToTheNextOpener) {
+TEST(NamedEventClose, KilledProcessLeavesItsSlotToTheNextOpener) {
   EventPlace place;
   auto other = Open("other");
   for (bool manual : {kManual, kAutomatic}) {
@@ -87,7 +87,7 @@ TEST(NamedEventFiles, KilledProcessLeavesItsSlotToTheNextOpener) {
   }
 }
 
-TEST(NamedEventFiles, SetWhoseUsersAllDiedIsMadeAnew) {
+TEST(NamedEventClose, SetWhoseUsersAllDiedIsMadeAnew) {
   EventPlace place;
   int id = -1;
   {
@@ -116,7 +116,7 @@ TEST(NamedEventFiles, SetWhoseUsersAllDiedIsMadeAnew) {
   EXPECT_EQ(Names(), place.files());
 }
 
-TEST(NamedEventFiles, SlotOfADeadEventOfTheOtherKindIsNotTaken) {
+TEST(NamedEventClose, SlotOfADeadEventOfTheOtherKindIsNotTaken) {
   EventPlace place;
   auto other = Open("other");
   Keeper killed([] { return Open("name", kManual); });
@@ -128,7 +128,7 @@ TEST(NamedEventFiles, SlotOfADeadEventOfTheOtherKindIsNotTaken) {
   EXPECT_TRUE(RecordOf(place.file("sem_1"), 1).inUse);
 }
 
-TEST(NamedEventFiles, HolderThatDiesBetweenTwoOthersIsNotMissed) {
+TEST(NamedEventClose, HolderThatDiesBetweenTwoOthersIsNotMissed) {
   EventPlace place;
   Keeper first([] { return Open("name"); });
   Keeper second([] { return Open("name"); });
@@ -143,7 +143,7 @@ TEST(NamedEventFiles, HolderThatDiesBetweenTwoOthersIsNotMissed) {
 
 // ---- closing in a changed world
 
-TEST(NamedEventFiles, CloseLeavesALockFileThatIsNotItsOwn) {
+TEST(NamedEventClose, CloseLeavesALockFileThatIsNotItsOwn) {
   EventPlace place;
   auto event = Open("name"), other = Open("other");
   std::filesystem::remove(place.file("name"));
@@ -158,7 +158,7 @@ TEST(NamedEventFiles, CloseLeavesALockFileThatIsNotItsOwn) {
   EXPECT_FALSE(Exists(place.file("name")));
 }
 
-TEST(NamedEventFiles, CloseGivesBackOnlyWhatIsItsOwn) {
+TEST(NamedEventClose, CloseGivesBackOnlyWhatIsItsOwn) {
   EventPlace place;
   auto event = Open("name"), other = Open("other");
   std::string state = ReadBytes(place.file("sem_1"));
@@ -169,7 +169,7 @@ TEST(NamedEventFiles, CloseGivesBackOnlyWhatIsItsOwn) {
   EXPECT_FALSE(Exists(place.file("name")));
 }
 
-TEST(NamedEventFiles, SetThatAnotherUserRemovesLastStaysForTheNext) {
+TEST(NamedEventClose, SetThatAnotherUserRemovesLastStaysForTheNext) {
   if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   EventPlace place;
   auto event = Open("name");
@@ -193,7 +193,7 @@ TEST(NamedEventFiles, SetThatAnotherUserRemovesLastStaysForTheNext) {
   EXPECT_EQ(Names(), place.files());
 }
 
-TEST(NamedEventFiles, EventsOfAnotherUserAreJoined) {
+TEST(NamedEventClose, EventsOfAnotherUserAreJoined) {
   if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   EventPlace place;
   Keeper other([] {
@@ -214,7 +214,7 @@ TEST(NamedEventFiles, EventsOfAnotherUserAreJoined) {
   EXPECT_EQ(Names(), place.files());
 }
 
-TEST(NamedEventFiles, StaticEventsCloseWhenTheProgramEnds) {
+TEST(NamedEventClose, StaticEventsCloseWhenTheProgramEnds) {
   EventPlace place;
   Child child([]() -> int {
     static NamedEvent event(L"name", kManual, kSet);
@@ -228,7 +228,7 @@ void OpenAfterTheStaticsWent() {
   if (!Open("late", kManual, kSet)->checkOnly()) _exit(9);
 }
 
-TEST(NamedEventFiles, EventsWorkInExitFunctionsThatRunAfterTheirOwn) {
+TEST(NamedEventClose, EventsWorkInExitFunctionsThatRunAfterTheirOwn) {
   EventPlace place;
   Child child([]() -> int {
     std::atexit(OpenAfterTheStaticsWent);  // before the first use, so it runs after
@@ -239,7 +239,7 @@ TEST(NamedEventFiles, EventsWorkInExitFunctionsThatRunAfterTheirOwn) {
   EXPECT_EQ(Names(), place.files());
 }
 
-TEST(NamedEventFiles, ObjectThatOutlivesTheStaticsCloses) {
+TEST(NamedEventClose, ObjectThatOutlivesTheStaticsCloses) {
   EventPlace place;
   Child child([]() -> int {
     static std::unique_ptr<NamedEvent> late;
@@ -251,7 +251,7 @@ TEST(NamedEventFiles, ObjectThatOutlivesTheStaticsCloses) {
   EXPECT_EQ(Names(), place.files());
 }
 
-TEST(NamedEventFiles, EndWithoutClosingLeavesEverythingForTheNext) {
+TEST(NamedEventClose, EndWithoutClosingLeavesEverythingForTheNext) {
   EventPlace place;
   Child child([] {
     new NamedEvent(L"name", kManual, kSet);

@@ -70,7 +70,7 @@ int ErrorElsewhere(const std::string& name, bool manual) {
 
 // ---- one process
 
-TEST(NamedEventFiles, FirstEventTakesSlotZeroOfSetOne) {
+TEST(NamedEventOpen, FirstEventTakesSlotZeroOfSetOne) {
   EventPlace place;
   auto event = Open("name");
   EXPECT_EQ((Names{"name", "sem_1"}), place.files());
@@ -86,7 +86,7 @@ TEST(NamedEventFiles, FirstEventTakesSlotZeroOfSetOne) {
   EXPECT_EQ(std::string("\0\0\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF", 10), state.substr(1288));
 }
 
-TEST(NamedEventFiles, KernelSetHas128SemaphoresForEverybody) {
+TEST(NamedEventOpen, KernelSetHas128SemaphoresForEverybody) {
   EventPlace place;
   auto event = Open("name");
   semid_ds info = {};
@@ -96,7 +96,7 @@ TEST(NamedEventFiles, KernelSetHas128SemaphoresForEverybody) {
   EXPECT_EQ(0777u, info.sem_perm.mode & 0777u);
 }
 
-TEST(NamedEventFiles, FilesAreOpenToAllWhateverTheUmask) {
+TEST(NamedEventOpen, FilesAreOpenToAllWhateverTheUmask) {
   EventPlace place;
   Keeper keeper([] {
     umask(0077);
@@ -109,7 +109,7 @@ TEST(NamedEventFiles, FilesAreOpenToAllWhateverTheUmask) {
   EXPECT_TRUE(keeper.finish());
 }
 
-TEST(NamedEventFiles, LastCloseRemovesFilesAndSet) {
+TEST(NamedEventOpen, LastCloseRemovesFilesAndSet) {
   EventPlace place;
   int before = EventPlace::CountSets();
   Open("warm up");
@@ -124,7 +124,7 @@ TEST(NamedEventFiles, LastCloseRemovesFilesAndSet) {
   EXPECT_EQ(descriptors, OpenDescriptors());
 }
 
-TEST(NamedEventFiles, ClosedSlotGoesToTheFrontOfTheFreeList) {
+TEST(NamedEventOpen, ClosedSlotGoesToTheFrontOfTheFreeList) {
   EventPlace place;
   auto a = Open("a"), b = Open("b", kAutomatic), c = Open("c");
   EXPECT_EQ((Slot{1, 1}), place.slotOf("b"));
@@ -146,7 +146,7 @@ TEST(NamedEventFiles, ClosedSlotGoesToTheFrontOfTheFreeList) {
   EXPECT_EQ((Slot{1, 3}), place.slotOf("f"));
 }
 
-TEST(NamedEventFiles, The129thEventGoesToSetTwo) {
+TEST(NamedEventOpen, The129thEventGoesToSetTwo) {
   EventPlace place;
   std::vector<std::unique_ptr<NamedEvent>> events;
   for (int i = 0; i < 128; ++i) events.push_back(Open("e" + std::to_string(i)));
@@ -171,7 +171,7 @@ TEST(NamedEventFiles, The129thEventGoesToSetTwo) {
   EXPECT_EQ(Names(), place.files());
 }
 
-TEST(NamedEventFiles, EventsOfManySetsAreIndependent) {
+TEST(NamedEventOpen, EventsOfManySetsAreIndependent) {
   EventPlace place;
   std::vector<std::unique_ptr<NamedEvent>> events;
   for (int i = 0; i < 300; ++i) events.push_back(Open("e" + std::to_string(i), kAutomatic));
@@ -182,7 +182,7 @@ TEST(NamedEventFiles, EventsOfManySetsAreIndependent) {
   EXPECT_EQ(Names(), place.files());
 }
 
-TEST(NamedEventFiles, ObjectsOfOneNameShareTheEvent) {
+TEST(NamedEventOpen, ObjectsOfOneNameShareTheEvent) {
   EventPlace place;
   auto first = Open("name", kAutomatic);
   int descriptors = OpenDescriptors();
@@ -197,7 +197,7 @@ TEST(NamedEventFiles, ObjectsOfOneNameShareTheEvent) {
   EXPECT_TRUE(second->check());
 }
 
-TEST(NamedEventFiles, OtherKindInOneProcessIsEINVAL) {
+TEST(NamedEventOpen, OtherKindInOneProcessIsEINVAL) {
   EventPlace place;
   auto event = Open("name", kManual, kSet);
   std::string before = ReadBytes(place.file("sem_1"));
@@ -209,7 +209,7 @@ TEST(NamedEventFiles, OtherKindInOneProcessIsEINVAL) {
   EXPECT_EQ(-1, PosixErrorOf([] { Open("name", kAutomatic); }));
 }
 
-TEST(NamedEventFiles, NamesFoldInAProcessAndNotInTheFileSystem) {
+TEST(NamedEventOpen, NamesFoldInAProcessAndNotInTheFileSystem) {
   EventPlace place;
   auto lower = Open("name"), upper = Open("NAME");
   EXPECT_EQ((Names{"name", "sem_1"}), place.files());
@@ -222,7 +222,7 @@ TEST(NamedEventFiles, NamesFoldInAProcessAndNotInTheFileSystem) {
   EXPECT_TRUE(other.finish());
 }
 
-TEST(NamedEventFiles, NamesOfTheWrongShape) {
+TEST(NamedEventOpen, NamesOfTheWrongShape) {
   EventPlace place;
   auto other = Open("other");
   int descriptors = OpenDescriptors();
@@ -238,7 +238,7 @@ TEST(NamedEventFiles, NamesOfTheWrongShape) {
 
 // ---- several processes
 
-TEST(NamedEventFiles, TwoProcessesOpenANewNameAtOnceAndGetOneSlot) {
+TEST(NamedEventOpen, TwoProcessesOpenANewNameAtOnceAndGetOneSlot) {
   EventPlace place;
   for (int round = 0; round < 40; ++round) {
     vlt::test::Signal go, opened[2], end;
@@ -267,7 +267,7 @@ TEST(NamedEventFiles, TwoProcessesOpenANewNameAtOnceAndGetOneSlot) {
   }
 }
 
-TEST(NamedEventFiles, OpenerWaitsWhileAnotherSetsTheFileUp) {
+TEST(NamedEventOpen, OpenerWaitsWhileAnotherSetsTheFileUp) {
   EventPlace place;
   auto other = Open("other");
   // The exclusive phase of another opener, played with a descriptor of the test.
@@ -286,7 +286,7 @@ TEST(NamedEventFiles, OpenerWaitsWhileAnotherSetsTheFileUp) {
   EXPECT_EQ(0, opener.wait());
 }
 
-TEST(NamedEventFiles, OtherKindInAnotherProcessIsENOLCKAndChangesNothing) {
+TEST(NamedEventOpen, OtherKindInAnotherProcessIsENOLCKAndChangesNothing) {
   EventPlace place;
   for (bool manual : {kManual, kAutomatic}) {
     auto event = Open("name", manual, kSet);
@@ -301,7 +301,7 @@ TEST(NamedEventFiles, OtherKindInAnotherProcessIsENOLCKAndChangesNothing) {
   }
 }
 
-TEST(NamedEventFiles, JoiningIgnoresTheInitialState) {
+TEST(NamedEventOpen, JoiningIgnoresTheInitialState) {
   EventPlace place;
   for (bool manual : {kManual, kAutomatic}) {
     for (bool initial : {kSet, kClear}) {
@@ -313,7 +313,7 @@ TEST(NamedEventFiles, JoiningIgnoresTheInitialState) {
   }
 }
 
-TEST(NamedEventFiles, EventLivesUntilTheLastProcessCloses) {
+TEST(NamedEventOpen, EventLivesUntilTheLastProcessCloses) {
   EventPlace place;
   auto mine = Open("name");
   Keeper other([] { return Open("name"); });
@@ -329,7 +329,7 @@ TEST(NamedEventFiles, EventLivesUntilTheLastProcessCloses) {
   EXPECT_EQ(Names(), place.files());
 }
 
-TEST(NamedEventFiles, SetLivesUntilTheLastOfItsEventsGoes) {
+TEST(NamedEventOpen, SetLivesUntilTheLastOfItsEventsGoes) {
   EventPlace place;
   Keeper other([] { return Open("other"); });
   ASSERT_TRUE(other.good());

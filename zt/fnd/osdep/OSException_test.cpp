@@ -9,7 +9,7 @@
 namespace zt::fnd::osdep {
 namespace {
 
-TEST(ExceptionOS, PlainFormsKeepTheirOwnSmallCode) {
+TEST(OSException, PlainFormsKeepTheirOwnSmallCode) {
   EXPECT_STREQ("Unknown error", OSException().what());
   EXPECT_EQ(0u, OSException().whatcode());
   EXPECT_EQ(42u, OSException().getErrorCode());
@@ -19,7 +19,7 @@ TEST(ExceptionOS, PlainFormsKeepTheirOwnSmallCode) {
   EXPECT_EQ(42u, e.getErrorCode());  // 7 belongs to the two derived classes
 }
 
-TEST(ExceptionOS, PosixErrorMapsNothingAndNotFound) {
+TEST(OSException, PosixErrorMapsNothingAndNotFound) {
   const struct {
     int errnum;
     unsigned int code;
@@ -30,7 +30,7 @@ TEST(ExceptionOS, PosixErrorMapsNothingAndNotFound) {
   }
 }
 
-TEST(ExceptionOS, PosixErrorHasTheSystemsText) {
+TEST(OSException, PosixErrorHasTheSystemsText) {
   EXPECT_STREQ(strerror(ENOENT), PosixError(ENOENT).what());
   EXPECT_STREQ(strerror(0), PosixError(0).what());
   EXPECT_STREQ(strerror(100000), PosixError(100000).what());
@@ -39,7 +39,7 @@ TEST(ExceptionOS, PosixErrorHasTheSystemsText) {
   EXPECT_STREQ("", PosixError(nullptr, 1).what());
 }
 
-TEST(ExceptionOS, PosixErrorTakesTheErrnoOfTheFailedCall) {
+TEST(OSException, PosixErrorTakesTheErrnoOfTheFailedCall) {
   EXPECT_EQ(-1, close(-1));
   PosixError e;
   EXPECT_EQ(static_cast<unsigned int>(EBADF), e.whatcode());
@@ -53,7 +53,7 @@ TEST(ExceptionOS, PosixErrorTakesTheErrnoOfTheFailedCall) {
   }
 }
 
-TEST(ExceptionOS, CarbonErrorSignExtendsItsStatus) {
+TEST(OSException, CarbonErrorSignExtendsItsStatus) {
   EXPECT_STREQ("Unknown error code", CarbonError(-43).what());
   EXPECT_EQ(7u, CarbonError(-43).getErrorCode());
   EXPECT_EQ(0xFFFFFFD5u, CarbonError(-43).whatcode());
@@ -64,7 +64,7 @@ TEST(ExceptionOS, CarbonErrorSignExtendsItsStatus) {
   EXPECT_EQ(5u, CarbonError("own", 5).whatcode());
 }
 
-TEST(ExceptionOS, OneHandlerCatchesAllThree) {
+TEST(OSException, OneHandlerCatchesAllThree) {
   EXPECT_THROW(ZT_RAISE(PosixError(1)), OSException);
   EXPECT_THROW(ZT_RAISE(CarbonError(1)), OSException);
   EXPECT_THROW(ZT_RAISE(OSException()), exception::Exception);

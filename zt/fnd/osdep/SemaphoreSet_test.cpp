@@ -40,7 +40,7 @@ struct Set {
   }
 };
 
-TEST(NamedEventSet, IsBuiltReadyAndAllFree) {
+TEST(SemaphoreSet, IsBuiltReadyAndAllFree) {
   Set s;
   ASSERT_TRUE(s.set->usable());
   bool ready = false;
@@ -55,7 +55,7 @@ TEST(NamedEventSet, IsBuiltReadyAndAllFree) {
   EXPECT_EQ(SemaphoreSet::State::Usable, s.set->state());
 }
 
-TEST(NamedEventSet, ReadHeaderDoesNotAskForReady) {
+TEST(SemaphoreSet, ReadHeaderDoesNotAskForReady) {
   Set s;
   s.patch(4, 0);  // reserved, ready, and the low half of the count
   s.patch(6, 128);
@@ -66,7 +66,7 @@ TEST(NamedEventSet, ReadHeaderDoesNotAskForReady) {
   EXPECT_EQ(128u, count);
 }
 
-TEST(NamedEventSet, BadHeaderClearsAllOutputs) {
+TEST(SemaphoreSet, BadHeaderClearsAllOutputs) {
   Set s;
   s.patch(0, 0x15E35E30);
   bool ready = true;
@@ -82,7 +82,7 @@ TEST(NamedEventSet, BadHeaderClearsAllOutputs) {
   EXPECT_EQ(0u, count + freeCount + firstFree);
 }
 
-TEST(NamedEventSet, UpdateChangesCountAndFirstFreeAlone) {
+TEST(SemaphoreSet, UpdateChangesCountAndFirstFreeAlone) {
   Set s;
   std::string before = ReadBytes(s.path);
   unsigned old = 99;
@@ -97,7 +97,7 @@ TEST(NamedEventSet, UpdateChangesCountAndFirstFreeAlone) {
   EXPECT_EQ(std::string("\x80\0\0\0\xFF\xFF\xFF\xFF", 8), ReadBytes(s.path).substr(10, 8));
 }
 
-TEST(NamedEventSet, UpdateOfAShortFileFails) {
+TEST(SemaphoreSet, UpdateOfAShortFileFails) {
   Set s;
   unsigned old;
   ASSERT_EQ(0, truncate(s.path.c_str(), 17));
@@ -105,7 +105,7 @@ TEST(NamedEventSet, UpdateOfAShortFileFails) {
   EXPECT_EQ(17u, ReadBytes(s.path).size());
 }
 
-TEST(NamedEventSet, TakeAndGiveBackAreEachOthersReverse) {
+TEST(SemaphoreSet, TakeAndGiveBackAreEachOthersReverse) {
   Set s;
   const std::string before = ReadBytes(s.path);
   for (int round = 0; round < 2; ++round) {
@@ -122,7 +122,7 @@ TEST(NamedEventSet, TakeAndGiveBackAreEachOthersReverse) {
   }
 }
 
-TEST(NamedEventSet, GiveBackOfAnothersSlotDoesNothing) {
+TEST(SemaphoreSet, GiveBackOfAnothersSlotDoesNothing) {
   Set s;
   ASSERT_TRUE(s.set->take(0, false, 42));
   std::string before = ReadBytes(s.path);
@@ -133,7 +133,7 @@ TEST(NamedEventSet, GiveBackOfAnothersSlotDoesNothing) {
   EXPECT_EQ(before, ReadBytes(s.path));
 }
 
-TEST(NamedEventSet, SlotsOutsideTheFileAreNotRead) {
+TEST(SemaphoreSet, SlotsOutsideTheFileAreNotRead) {
   Set s;
   SlotRecord record;
   EXPECT_TRUE(s.set->readSlot(127, record));
@@ -147,7 +147,7 @@ TEST(NamedEventSet, SlotsOutsideTheFileAreNotRead) {
   EXPECT_FALSE(s.set->readSlot(2, record));
 }
 
-TEST(NamedEventSet, OneObjectANumberInAProcess) {
+TEST(SemaphoreSet, OneObjectANumberInAProcess) {
   Set s;
   RefPtr<SemaphoreSet> again = s.statics->getOrCreateSemaphoreSet(1);
   EXPECT_EQ(s.set.get(), again.get());
@@ -162,7 +162,7 @@ TEST(NamedEventSet, OneObjectANumberInAProcess) {
   EXPECT_EQ(Names(), s.place.files());
 }
 
-TEST(NamedEventSet, UnusableSetStaysInTheMapWhileItIsHeld) {
+TEST(SemaphoreSet, UnusableSetStaysInTheMapWhileItIsHeld) {
   EventPlace place;
   RefPtr<NamedEventGlobalStatics> statics = NamedEventGlobalStatics::Get();
   Hold hold(statics->section);

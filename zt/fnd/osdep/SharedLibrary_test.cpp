@@ -26,7 +26,7 @@ using vlt::test::MakeModule;
 using vlt::test::TempDir;
 using vlt::test::Wide;
 
-TEST(Library, EmptyNameLoadsNothing) {
+TEST(SharedLibrary, EmptyNameLoadsNothing) {
   SharedLibrary none;
   EXPECT_FALSE(none.isLoaded());
   none.load();
@@ -36,7 +36,7 @@ TEST(Library, EmptyNameLoadsNothing) {
   none.unload();
 }
 
-TEST(Library, RelativeNameInAWorkingDirectoryThatIsGoneLoadsNothing) {
+TEST(SharedLibrary, RelativeNameInAWorkingDirectoryThatIsGoneLoadsNothing) {
   TempDir dir;
   vlt::test::Child child([&] {
     if (chdir(dir.makeDir("gone").c_str()) != 0 || rmdir((dir / "gone").c_str()) != 0) return 1;
@@ -48,7 +48,7 @@ TEST(Library, RelativeNameInAWorkingDirectoryThatIsGoneLoadsNothing) {
   EXPECT_EQ(0, child.wait());
 }
 
-TEST(Library, NameWithoutADotIsDecoratedInItsDirectory) {
+TEST(SharedLibrary, NameWithoutADotIsDecoratedInItsDirectory) {
   TempDir dir;
   MakeModule(dir / "libfoo.so");
   {
@@ -61,7 +61,7 @@ TEST(Library, NameWithoutADotIsDecoratedInItsDirectory) {
   EXPECT_FALSE(IsMapped(dir / "libfoo.so"));
 }
 
-TEST(Library, NameWithADotGetsNoSuffixInAnyStep) {
+TEST(SharedLibrary, NameWithADotGetsNoSuffixInAnyStep) {
   TempDir dir;
   MakeModule(dir / "libfoo.x.so");
   MakeModule(dir / "foo.x");
@@ -76,20 +76,20 @@ TEST(Library, NameWithADotGetsNoSuffixInAnyStep) {
   EXPECT_FALSE(IsMapped(dir / "foo.x.bundle/libfoo.x.so"));
 }
 
-TEST(Library, NameWithoutADotIsNeverTriedUndecorated) {
+TEST(SharedLibrary, NameWithoutADotIsNeverTriedUndecorated) {
   TempDir dir;
   MakeModule(dir / "foo");
   EXPECT_FALSE(SharedLibrary(Wide(dir / "foo"), true, false).isLoaded());
 }
 
-TEST(Library, DottedDirectoryDoesNotCountAsADottedName) {
+TEST(SharedLibrary, DottedDirectoryDoesNotCountAsADottedName) {
   TempDir dir;
   dir.makeDir("a.b");
   MakeModule(dir / "a.b/libfoo.so");
   EXPECT_TRUE(SharedLibrary(Wide(dir / "a.b/foo"), true, false).isLoaded());
 }
 
-TEST(Library, SearchOrderIsFrameworkBundleLibrary) {
+TEST(SharedLibrary, SearchOrderIsFrameworkBundleLibrary) {
   TempDir dir;
   const std::string framework = dir / "X.framework/libX.so", bundle = dir / "X.bundle/libX.so",
                     library = dir / "libX.so";
@@ -117,7 +117,7 @@ TEST(Library, SearchOrderIsFrameworkBundleLibrary) {
   EXPECT_FALSE(IsMapped(framework));
 }
 
-TEST(Library, FileWithABundlesNameIsLoadedItself) {
+TEST(SharedLibrary, FileWithABundlesNameIsLoadedItself) {
   TempDir dir;
   MakeModule(dir / "X.vle");
   SharedLibrary library(Wide(dir / "X.vle"), true, false);
@@ -125,7 +125,7 @@ TEST(Library, FileWithABundlesNameIsLoadedItself) {
   EXPECT_TRUE(IsMapped(dir / "X.vle"));
 }
 
-TEST(Library, FailedLoadIsQuiet) {
+TEST(SharedLibrary, FailedLoadIsQuiet) {
   TempDir dir;
   vlt::test::WriteBytes(dir / "libbroken.so", "no module");
   ASSERT_EQ(0, mkfifo((dir / "libpipe.so").c_str(), 0600));
@@ -138,7 +138,7 @@ TEST(Library, FailedLoadIsQuiet) {
   }
 }
 
-TEST(Library, LoadByNameAfterALoadIsInvalidEvenWhenUnloaded) {
+TEST(SharedLibrary, LoadByNameAfterALoadIsInvalidEvenWhenUnloaded) {
   TempDir dir;
   MakeModule(dir / "libfoo.so");
   SharedLibrary library;
@@ -153,7 +153,7 @@ TEST(Library, LoadByNameAfterALoadIsInvalidEvenWhenUnloaded) {
   EXPECT_TRUE(library.isLoaded());
 }
 
-TEST(Library, LoadAgainReplacesTheHandle) {
+TEST(SharedLibrary, LoadAgainReplacesTheHandle) {
   TempDir dir;
   MakeModule(dir / "libfoo.so");
   {
@@ -165,7 +165,7 @@ TEST(Library, LoadAgainReplacesTheHandle) {
   EXPECT_FALSE(IsMapped(dir / "libfoo.so")) << "a load was not given back";
 }
 
-TEST(Library, UnloadedLookUp) {
+TEST(SharedLibrary, UnloadedLookUp) {
   SharedLibrary library;
   EXPECT_EQ(nullptr, library.getFunctionPointer(AnsiString("cos"), true));
   EXPECT_EQ(nullptr, library.getFunctionPointer(String(L"cos"), true));
@@ -179,7 +179,7 @@ TEST(Library, UnloadedLookUp) {
   }
 }
 
-TEST(Library, MissingFunctionIsThrownWithTheLoadersText) {
+TEST(SharedLibrary, MissingFunctionIsThrownWithTheLoadersText) {
   TempDir dir;
   MakeModule(dir / "libfoo.so");
   SharedLibrary library(AnsiString((dir / "foo").c_str()), true, true);
@@ -192,7 +192,7 @@ TEST(Library, MissingFunctionIsThrownWithTheLoadersText) {
   }
 }
 
-TEST(Library, ModuleStaysWhenTheObjectIsToldSo) {
+TEST(SharedLibrary, ModuleStaysWhenTheObjectIsToldSo) {
   for (bool bundle : {false, true}) {
     TempDir dir;
     dir.makeDir("X.bundle");
@@ -208,7 +208,7 @@ TEST(Library, ModuleStaysWhenTheObjectIsToldSo) {
   }
 }
 
-TEST(Library, CopiesHoldLoadsOfTheirOwn) {
+TEST(SharedLibrary, CopiesHoldLoadsOfTheirOwn) {
   TempDir dir;
   MakeModule(dir / "libfoo.so");
   MakeModule(dir / "libbar.so");
@@ -231,7 +231,7 @@ TEST(Library, CopiesHoldLoadsOfTheirOwn) {
   EXPECT_FALSE(IsMapped(dir / "libfoo.so"));
 }
 
-TEST(Library, SwapExchangesAll) {
+TEST(SharedLibrary, SwapExchangesAll) {
   TempDir dir;
   MakeModule(dir / "libfoo.so");
   SharedLibrary loaded(Wide(dir / "foo"), true, false), empty;
@@ -243,7 +243,7 @@ TEST(Library, SwapExchangesAll) {
   EXPECT_FALSE(loaded.isLoaded());  // the requested name went along
 }
 
-TEST(Library, DecorateNameChangesNothing) {
+TEST(SharedLibrary, DecorateNameChangesNothing) {
   EXPECT_STREQ("foo", AnsiString(SharedLibrary::decorateName(L"foo")).c_str());
 }
 
@@ -263,7 +263,7 @@ constexpr char kNamesOnly[] = "VLT_TEST_BARE_NAMES_ONLY";
   _exit(loaded);
 }
 
-TEST(LibraryBare, NameGoesToTheLoaderAsLibNameSo) {
+TEST(SharedLibraryBare, NameGoesToTheLoaderAsLibNameSo) {
   TempDir dir;
   MakeModule(dir / "libbare.so");
   auto run = [&](const std::string& path) {
@@ -274,7 +274,7 @@ TEST(LibraryBare, NameGoesToTheLoaderAsLibNameSo) {
   EXPECT_EQ(0, run(dir / "elsewhere"));
 }
 
-TEST(LibraryBare, WorkingDirectoryIsNotSearched) {
+TEST(SharedLibraryBare, WorkingDirectoryIsNotSearched) {
   TempDir dir;
   MakeModule(dir / "libhere.so");
   vlt::test::Child child([&] {

@@ -42,7 +42,7 @@ int Open(const std::string& path) {
 
 // ---- where
 
-TEST(FileShared, BaseIsTheAbsoluteVariableOrTheDefault) {
+TEST(SharedUnixObject, BaseIsTheAbsoluteVariableOrTheDefault) {
   std::string kept = getenv(kVariable);
   const struct {
     const char* value;
@@ -62,7 +62,7 @@ TEST(FileShared, BaseIsTheAbsoluteVariableOrTheDefault) {
   setenv(kVariable, kept.c_str(), 1);
 }
 
-TEST(FileShared, PathIsBaseDirectoryAndNameAndTheDirectoryExists) {
+TEST(SharedUnixObject, PathIsBaseDirectoryAndNameAndTheDirectoryExists) {
   TempDir dir;
   setenv(kVariable, (dir / "base").c_str(), 1);
   EXPECT_EQ(dir / "base/things/name", BuildSharedUnixFilePath(L"things", L"name").c_str());
@@ -74,7 +74,7 @@ TEST(FileShared, PathIsBaseDirectoryAndNameAndTheDirectoryExists) {
 
 // ---- directories
 
-TEST(FileShared, ModesStandUnderEveryUmask) {
+TEST(SharedUnixObject, ModesStandUnderEveryUmask) {
   for (mode_t mask : {077, 0, 022, 0777}) {
     TempDir dir;
     Child child([&] {
@@ -90,7 +90,7 @@ TEST(FileShared, ModesStandUnderEveryUmask) {
   }
 }
 
-TEST(FileShared, ExistingObjectsAreOpenedToAllAtEachCall) {
+TEST(SharedUnixObject, ExistingObjectsAreOpenedToAllAtEachCall) {
   TempDir dir;
   mkdir((dir / "d").c_str(), 0700);
   WriteBytes(dir / "d/file", "kept");
@@ -102,7 +102,7 @@ TEST(FileShared, ExistingObjectsAreOpenedToAllAtEachCall) {
   EXPECT_EQ("kept", ReadBytes(dir / "d/file"));
 }
 
-TEST(FileShared, FileInTheDirectorysPlaceIsENOTDIR) {
+TEST(SharedUnixObject, FileInTheDirectorysPlaceIsENOTDIR) {
   TempDir dir;
   WriteBytes(dir / "d", "x");
   EXPECT_EQ(ENOTDIR, PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/")); }));
@@ -113,7 +113,7 @@ TEST(FileShared, FileInTheDirectorysPlaceIsENOTDIR) {
 }
 
 // The last component of such a path is not made, however often it is asked for.
-TEST(FileShared, PathThatEndsInNoDirectoryIsENOTDIR) {
+TEST(SharedUnixObject, PathThatEndsInNoDirectoryIsENOTDIR) {
   TempDir dir;
   Child child([&] {
     if (PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "a/b")); }) != ENOTDIR) return 1;
@@ -128,14 +128,14 @@ TEST(FileShared, PathThatEndsInNoDirectoryIsENOTDIR) {
   EXPECT_FALSE(vlt::test::Exists(dir / "a/b"));
 }
 
-TEST(FileShared, DirectoryNeedsNoSlashAtTheEndOnceItIsThere) {
+TEST(SharedUnixObject, DirectoryNeedsNoSlashAtTheEndOnceItIsThere) {
   TempDir dir;
   ASSERT_EQ(0, mkdir((dir / "d").c_str(), 0700));
   CreateSharedUnixDir(Wide(dir / "d"));
   EXPECT_EQ(0777, ModeOf(dir / "d"));
 }
 
-TEST(FileShared, LinkInTheDirectorysPlaceIsNotFollowed) {
+TEST(SharedUnixObject, LinkInTheDirectorysPlaceIsNotFollowed) {
   TempDir dir;
   ASSERT_EQ(0, mkdir((dir / "target").c_str(), 0700));
   ASSERT_EQ(0, symlink("target", (dir / "d").c_str()));
@@ -143,11 +143,11 @@ TEST(FileShared, LinkInTheDirectorysPlaceIsNotFollowed) {
   EXPECT_EQ(0700, ModeOf(dir / "target"));
 }
 
-TEST(FileShared, RefusedDirectoryIsAccessDenied) {
+TEST(SharedUnixObject, RefusedDirectoryIsAccessDenied) {
   EXPECT_THROW(CreateSharedUnixDir(L"/proc/no/such/"), exception::AccessDenied);
 }
 
-TEST(FileShared, SimultaneousStartsAllSucceed) {
+TEST(SharedUnixObject, SimultaneousStartsAllSucceed) {
   for (int round = 0; round < 20; ++round) {
     TempDir dir;
     vlt::test::Signal go;
@@ -166,7 +166,7 @@ TEST(FileShared, SimultaneousStartsAllSucceed) {
   }
 }
 
-TEST(FileShared, DirectoryOfAnotherUserIsUsedAsItIs) {
+TEST(SharedUnixObject, DirectoryOfAnotherUserIsUsedAsItIs) {
   if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   chmod(dir.path().c_str(), 0755);
@@ -185,7 +185,7 @@ TEST(FileShared, DirectoryOfAnotherUserIsUsedAsItIs) {
   EXPECT_EQ(0711, ModeOf(dir / "unreadable"));
 }
 
-TEST(FileShared, OwnDirectoryThatMayNotBeReadIsOpenedToAll) {
+TEST(SharedUnixObject, OwnDirectoryThatMayNotBeReadIsOpenedToAll) {
   if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   chmod(dir.path().c_str(), 0777);
@@ -201,7 +201,7 @@ TEST(FileShared, OwnDirectoryThatMayNotBeReadIsOpenedToAll) {
 
 // ---- files
 
-TEST(FileShared, DescriptorReadsWritesAndClosesOnExec) {
+TEST(SharedUnixObject, DescriptorReadsWritesAndClosesOnExec) {
   TempDir dir;
   ScopedFd fd(CreateSharedUnixFile(AnsiString((dir / "f").c_str())));
   EXPECT_EQ(O_RDWR, fcntl(fd.get(), F_GETFL) & O_ACCMODE);
@@ -211,7 +211,7 @@ TEST(FileShared, DescriptorReadsWritesAndClosesOnExec) {
   EXPECT_EQ("abc", ReadBytes(dir / "f"));  // opening again cuts nothing
 }
 
-TEST(FileShared, FileOfAnotherUserIsUsedThoughItsModeCannotBeSet) {
+TEST(SharedUnixObject, FileOfAnotherUserIsUsedThoughItsModeCannotBeSet) {
   if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   chmod(dir.path().c_str(), 0777);
@@ -228,7 +228,7 @@ TEST(FileShared, FileOfAnotherUserIsUsedThoughItsModeCannotBeSet) {
   EXPECT_EQ("y", ReadBytes(dir / "f"));
 }
 
-TEST(FileShared, RefusedFileIsTriedThreeTimes) {
+TEST(SharedUnixObject, RefusedFileIsTriedThreeTimes) {
   if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   chmod(dir.path().c_str(), 0777);
@@ -246,7 +246,7 @@ TEST(FileShared, RefusedFileIsTriedThreeTimes) {
   EXPECT_EQ(0, child.wait());
 }
 
-TEST(FileShared, WhatIsNoFileOfItsOwnIsRefusedOrMovedAside) {
+TEST(SharedUnixObject, WhatIsNoFileOfItsOwnIsRefusedOrMovedAside) {
   TempDir dir;
   dir.makeDir("directory/inside");
   ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0600));
@@ -277,7 +277,7 @@ TEST(FileShared, WhatIsNoFileOfItsOwnIsRefusedOrMovedAside) {
   EXPECT_FALSE(vlt::test::Exists(dir / "nowhere"));
 }
 
-TEST(FileShared, WhatThisUserMayNotMoveIsNamed) {
+TEST(SharedUnixObject, WhatThisUserMayNotMoveIsNamed) {
   if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   chmod(dir.path().c_str(), 0755);
@@ -295,7 +295,7 @@ TEST(FileShared, WhatThisUserMayNotMoveIsNamed) {
   EXPECT_EQ(0, child.wait());
 }
 
-TEST(FileShared, FailureToSetTheModeIsAlwaysEPERM) {
+TEST(SharedUnixObject, FailureToSetTheModeIsAlwaysEPERM) {
   TempDir dir;
   dir.makeDir("d");
   Child child([&] {
@@ -309,7 +309,7 @@ TEST(FileShared, FailureToSetTheModeIsAlwaysEPERM) {
   EXPECT_EQ(0, child.wait());
 }
 
-TEST(FileShared, RefusedModeIsAcceptedForFilesAndDirectories) {
+TEST(SharedUnixObject, RefusedModeIsAcceptedForFilesAndDirectories) {
   TempDir dir;
   dir.makeDir("d");
   Child child([&] {
@@ -323,7 +323,7 @@ TEST(FileShared, RefusedModeIsAcceptedForFilesAndDirectories) {
 
 // ---- identity
 
-TEST(FileShared, IdentityTellsWhetherThePathStillNamesTheFile) {
+TEST(SharedUnixObject, IdentityTellsWhetherThePathStillNamesTheFile) {
   TempDir dir;
   AnsiString path((dir / "f").c_str());
   ScopedFd fd(CreateSharedUnixFile(path));

@@ -14,7 +14,7 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 
-TEST(ThreadSleep, SleepsItsTime) {
+TEST(Sleep, SleepsItsTime) {
   auto start = Clock::now();
   Sleep(20);
   EXPECT_GE(Clock::now() - start, std::chrono::milliseconds(20));
@@ -23,7 +23,7 @@ TEST(ThreadSleep, SleepsItsTime) {
 
 std::atomic<int> g_signals{0};
 
-TEST(ThreadSleep, SignalDoesNotCutItShort) {
+TEST(Sleep, SignalDoesNotCutItShort) {
   struct sigaction action = {}, before = {};
   action.sa_handler = [](int) { ++g_signals; };
   sigaction(SIGUSR1, &action, &before);  // without SA_RESTART

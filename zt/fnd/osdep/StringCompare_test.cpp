@@ -29,7 +29,7 @@ const wchar_t* const k_wideNull = nullptr;
 
 }  // namespace
 
-TEST(TextCompare, NullIsEmpty) {
+TEST(StringCompare, NullIsEmpty) {
   EXPECT_EQ(0, StringCaseCompare(k_null, ""));
   EXPECT_EQ(0, StringCaseCompare(k_null, k_null));
   EXPECT_EQ(0, StringCaseCompare(L"", k_wideNull));
@@ -41,14 +41,14 @@ TEST(TextCompare, NullIsEmpty) {
   EXPECT_LT(StringExactCompare(k_wideNull, L"a"), 0);
 }
 
-TEST(TextCompare, CaseIsFolded) {
+TEST(StringCompare, CaseIsFolded) {
   EXPECT_EQ(0, StringCaseCompare("KORComponents", "korcomponentS"));
   EXPECT_EQ(0, StringCaseCompare(L"KORComponents", L"korcomponentS"));
   EXPECT_LT(StringCaseCompare("abc", "ABD"), 0);
   EXPECT_GT(StringCaseCompare(L"abd", L"ABC"), 0);
 }
 
-TEST(TextCompare, NarrowResultIsTheDifferenceOfTheFoldedCharacters) {
+TEST(StringCompare, NarrowResultIsTheDifferenceOfTheFoldedCharacters) {
   EXPECT_EQ('A' - 'C', StringCaseCompare("xa", "Xc"));
   EXPECT_EQ('C', StringCaseCompare("abc", "ab"));
   EXPECT_EQ(-'C', StringCaseCompare("AB", "abc"));
@@ -56,7 +56,7 @@ TEST(TextCompare, NarrowResultIsTheDifferenceOfTheFoldedCharacters) {
   EXPECT_EQ(0xE9 - 'A', StringCaseCompare("\xE9", "a")) << "bytes are unsigned";
 }
 
-TEST(TextCompare, WideResultHasASign) {
+TEST(StringCompare, WideResultHasASign) {
   EXPECT_LT(StringCaseCompare(L"ab", L"ABC"), 0);
   EXPECT_GT(StringCaseCompare(L"abc", L"AB"), 0);
   EXPECT_LT(StringCaseCompare(L"", L"a"), 0);
@@ -65,14 +65,14 @@ TEST(TextCompare, WideResultHasASign) {
   EXPECT_GT(StringCaseCompare(L"\x10FFFF", L"a"), 0);
 }
 
-TEST(TextCompare, ExactSeesCase) {
+TEST(StringCompare, ExactSeesCase) {
   EXPECT_EQ(0, StringExactCompare("abc", "abc"));
   EXPECT_GT(StringExactCompare("a", "A"), 0);
   EXPECT_LT(StringExactCompare(L"A", L"a"), 0);
   EXPECT_EQ(0, StringExactCompare(L"a\xE9", L"a\xE9"));
 }
 
-TEST(TextCompare, FoldsByTheHostsLocale) {
+TEST(StringCompare, FoldsByTheHostsLocale) {
   const wchar_t lower[] = L"\xE9", upper[] = L"\xC9";
   {
     const ScopedLocale locale(LC_CTYPE, "C");
@@ -86,7 +86,7 @@ TEST(TextCompare, FoldsByTheHostsLocale) {
   EXPECT_NE(0, StringExactCompare(lower, upper));
 }
 
-TEST(TextCompare, RangesReturnLengthDifferences) {
+TEST(StringCompare, RangesReturnLengthDifferences) {
   EXPECT_EQ(-1, CaseRanges("ab", "abc"));
   EXPECT_EQ(-1, CaseRanges(L"ab", L"ABC"));
   EXPECT_EQ(3, CaseRanges("abcde", "AB"));
@@ -96,7 +96,7 @@ TEST(TextCompare, RangesReturnLengthDifferences) {
   EXPECT_EQ(0, StringCaseCompare(k_null, k_null, k_null, k_null));
 }
 
-TEST(TextCompare, RangesStopAtTheFirstDifference) {
+TEST(StringCompare, RangesStopAtTheFirstDifference) {
   EXPECT_EQ('A' - 'B', CaseRanges("aazz", "abb"));
   EXPECT_GT(CaseRanges(L"bzz", L"azzzz"), 0);
   EXPECT_EQ('a' - 'A', ExactRanges("a", "A"));
@@ -104,13 +104,13 @@ TEST(TextCompare, RangesStopAtTheFirstDifference) {
   EXPECT_GT(ExactRanges(L"a", L"A"), 0);
 }
 
-TEST(TextCompare, RangesSeeThroughZeros) {
+TEST(StringCompare, RangesSeeThroughZeros) {
   EXPECT_NE(0, CaseRanges("a\0b", "a\0c"));
   EXPECT_EQ(0, CaseRanges("a\0b", "A\0B"));
   EXPECT_EQ(1, ExactRanges(L"a\0b", L"a\0"));
 }
 
-TEST(TextCompare, DifferenceBeyond32BitsRaises) {
+TEST(StringCompare, DifferenceBeyond32BitsRaises) {
   EXPECT_EQ(INT_MAX, LengthDifference(INT_MAX, 0));
   EXPECT_EQ(INT_MIN, LengthDifference(0, 0x80000000LL));
   EXPECT_THROW(LengthDifference(0x80000000LL, 0), exception::OutOfRange);

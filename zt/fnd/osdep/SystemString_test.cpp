@@ -23,14 +23,14 @@ std::uint32_t CountOf(const wchar_t* s) {
 
 }  // namespace
 
-TEST(TextSystemString, CountStandsInFrontOfTheText) {
+TEST(SystemString, CountStandsInFrontOfTheText) {
   wchar_t* const s = SystemAllocStringLen(L"ab", 2);
   EXPECT_EQ(2u, CountOf(s));
   EXPECT_STREQ(L"ab", s);
   DLLFree(reinterpret_cast<char*>(s) - 4);
 }
 
-TEST(TextSystemString, TakesForcedLengths) {
+TEST(SystemString, TakesForcedLengths) {
   wchar_t* const part = SystemAllocStringLen(L"abcdef", 3);
   EXPECT_STREQ(L"abc", part);
   SystemFreeString(part);
@@ -43,7 +43,7 @@ TEST(TextSystemString, TakesForcedLengths) {
   SystemFreeString(empty);
 }
 
-TEST(TextSystemString, NullTextLeavesRoomToFill) {
+TEST(SystemString, NullTextLeavesRoomToFill) {
   wchar_t* const s = SystemAllocStringLen(nullptr, 5);
   ASSERT_NE(nullptr, s);
   EXPECT_EQ(5u, CountOf(s));
@@ -52,7 +52,7 @@ TEST(TextSystemString, NullTextLeavesRoomToFill) {
   SystemFreeString(s);
 }
 
-TEST(TextSystemString, CopiesTerminatedText) {
+TEST(SystemString, CopiesTerminatedText) {
   wchar_t* const s = SystemAllocString(L"text");
   EXPECT_STREQ(L"text", s);
   EXPECT_EQ(4u, CountOf(s));
@@ -61,7 +61,7 @@ TEST(TextSystemString, CopiesTerminatedText) {
   SystemFreeString(nullptr);
 }
 
-TEST(TextSystemString, SizesBeyond32BitsYieldNull) {
+TEST(SystemString, SizesBeyond32BitsYieldNull) {
   for (const unsigned n : {0x3FFFFFFEu, 0x3FFFFFFFu, 0x40000000u, 0xFFFFFFFEu, 0xFFFFFFFFu}) {
     EXPECT_EQ(nullptr, SystemAllocStringLen(nullptr, n)) << n;
   }
@@ -76,7 +76,7 @@ int AllocateWithoutMemory() {
 
 }  // namespace
 
-TEST(TextSystemString, MissingMemoryYieldsNull) {
+TEST(SystemString, MissingMemoryYieldsNull) {
   if (!vlt::test::kCanLimitMemory) GTEST_SKIP() << "the sanitizer owns the address space";
   vlt::test::Child child(AllocateWithoutMemory);
   EXPECT_EQ(0, child.wait());

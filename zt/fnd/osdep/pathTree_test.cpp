@@ -39,7 +39,7 @@ ino_t InodeOf(const std::string& path) {
   return info.st_ino;
 }
 
-TEST(PathTree, RemoveDirForceTakesHiddenEntriesAndLinksButNotTheirTargets) {
+TEST(pathTree, RemoveDirForceTakesHiddenEntriesAndLinksButNotTheirTargets) {
   TempDir dir;
   WriteBytes(dir.makeDir("keep") + "/file", "kept");
   std::string top = dir.makeDir("top");
@@ -53,7 +53,7 @@ TEST(PathTree, RemoveDirForceTakesHiddenEntriesAndLinksButNotTheirTargets) {
   EXPECT_EQ("kept", ReadBytes(dir / "keep/file"));
 }
 
-TEST(PathTree, RemoveDirForceOfALinkRemovesTheLinkOnlyWithOrWithoutSlash) {
+TEST(pathTree, RemoveDirForceOfALinkRemovesTheLinkOnlyWithOrWithoutSlash) {
   TempDir dir;
   WriteBytes(dir.makeDir("target") + "/file", "kept");
   for (const char* name : {"link", "link/", "link//"}) {
@@ -66,7 +66,7 @@ TEST(PathTree, RemoveDirForceOfALinkRemovesTheLinkOnlyWithOrWithoutSlash) {
   EXPECT_FALSE(Exists(dir / "target"));
 }
 
-TEST(PathTree, RemoveDirForceOfWhatIsNoDirectory) {
+TEST(pathTree, RemoveDirForceOfWhatIsNoDirectory) {
   TempDir dir;
   WriteBytes(dir / "file", "x");
   EXPECT_THROW(path::RemoveDirForce(Wide(dir / "missing").c_str()),
@@ -76,7 +76,7 @@ TEST(PathTree, RemoveDirForceOfWhatIsNoDirectory) {
   EXPECT_THROW(path::RemoveDirForce(nullptr), exception::NonexistentException);
 }
 
-TEST(PathTree, RenameReplacesTheTarget) {
+TEST(pathTree, RenameReplacesTheTarget) {
   TempDir dir;
   WriteBytes(dir / "from", "new");
   WriteBytes(dir / "to", "old");
@@ -87,7 +87,7 @@ TEST(PathTree, RenameReplacesTheTarget) {
   EXPECT_FALSE(Exists(dir / "from"));
 }
 
-TEST(PathTree, RenameToANameOfOtherCaseDoesNothing) {
+TEST(pathTree, RenameToANameOfOtherCaseDoesNothing) {
   TempDir dir;
   WriteBytes(dir / "File", "x");
   path::RenameFile(Wide(dir / "File"), Wide(dir / "FILE"));
@@ -96,7 +96,7 @@ TEST(PathTree, RenameToANameOfOtherCaseDoesNothing) {
   path::RenameFile(Wide(dir / "missing"), Wide(dir / "MISSING"));
 }
 
-TEST(PathTree, RenameFailures) {
+TEST(pathTree, RenameFailures) {
   TempDir dir;
   WriteBytes(dir / "file", "x");
   EXPECT_THROW(path::RenameFile(L"a", Wide(dir / "b")), exception::InvalidArgument);
@@ -134,7 +134,7 @@ class OtherFileSystem {
   std::string m_path;
 };
 
-TEST(PathTree, RenameBetweenFileSystemsCopiesAndRemoves) {
+TEST(pathTree, RenameBetweenFileSystemsCopiesAndRemoves) {
   TempDir dir;
   OtherFileSystem other(dir.path());
   if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
@@ -147,7 +147,7 @@ TEST(PathTree, RenameBetweenFileSystemsCopiesAndRemoves) {
   EXPECT_FALSE(Exists(dir / "from"));
 }
 
-TEST(PathTree, RenameOfADirectoryBetweenFileSystemsFailsToRead) {
+TEST(pathTree, RenameOfADirectoryBetweenFileSystemsFailsToRead) {
   TempDir dir;
   OtherFileSystem other(dir.path());
   if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
@@ -157,7 +157,7 @@ TEST(PathTree, RenameOfADirectoryBetweenFileSystemsFailsToRead) {
   EXPECT_TRUE(Exists(dir / "d"));
 }
 
-TEST(PathTree, RenameThatCannotRemoveTheSourceTakesTheCopyBack) {
+TEST(pathTree, RenameThatCannotRemoveTheSourceTakesTheCopyBack) {
   TempDir dir;
   OtherFileSystem other(dir.path());
   if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
@@ -178,7 +178,7 @@ TEST(PathTree, RenameThatCannotRemoveTheSourceTakesTheCopyBack) {
   EXPECT_FALSE(Exists(other.path() + "/to"));
 }
 
-TEST(PathTree, RenameBetweenFileSystemsKeepsTheSourceUntilTheCopyIsOnTheDisk) {
+TEST(pathTree, RenameBetweenFileSystemsKeepsTheSourceUntilTheCopyIsOnTheDisk) {
   TempDir dir;
   OtherFileSystem other(dir.path());
   if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
@@ -193,7 +193,7 @@ TEST(PathTree, RenameBetweenFileSystemsKeepsTheSourceUntilTheCopyIsOnTheDisk) {
   EXPECT_FALSE(Exists(other.path() + "/to"));
 }
 
-TEST(PathTree, RenameToAFileSystemWithoutFsyncMovesTheFile) {
+TEST(pathTree, RenameToAFileSystemWithoutFsyncMovesTheFile) {
   TempDir dir;
   OtherFileSystem other(dir.path());
   if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
@@ -208,7 +208,7 @@ TEST(PathTree, RenameToAFileSystemWithoutFsyncMovesTheFile) {
   EXPECT_EQ("bytes", ReadBytes(other.path() + "/to"));
 }
 
-TEST(PathTree, RenameOfALinkOntoItsTargetInAnotherFileSystemKeepsTheBytes) {
+TEST(pathTree, RenameOfALinkOntoItsTargetInAnotherFileSystemKeepsTheBytes) {
   TempDir dir;
   OtherFileSystem other(dir.path());
   if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
@@ -227,7 +227,7 @@ TEST(PathTree, RenameOfALinkOntoItsTargetInAnotherFileSystemKeepsTheBytes) {
 }
 
 // The system calls two mounts of one directory two file systems.
-TEST(PathTree, RenameOfAFileOntoItselfThroughAnotherMountKeepsIt) {
+TEST(pathTree, RenameOfAFileOntoItselfThroughAnotherMountKeepsIt) {
   int code = -1;
   auto allowed = vlt::test::RunInOwnTmp(
       "size=4m",
@@ -251,7 +251,7 @@ TEST(PathTree, RenameOfAFileOntoItselfThroughAnotherMountKeepsIt) {
   EXPECT_EQ(0, code);
 }
 
-TEST(PathTree, CpFileCopiesBytesIntoAPrivateFile) {
+TEST(pathTree, CpFileCopiesBytesIntoAPrivateFile) {
   TempDir dir;
   std::string bytes;
   for (int i = 0; i < 100001; ++i) bytes += static_cast<char>(i * 7);
@@ -265,7 +265,7 @@ TEST(PathTree, CpFileCopiesBytesIntoAPrivateFile) {
   EXPECT_EQ("", ReadBytes(dir / "to2"));
 }
 
-TEST(PathTree, CpFileOverwritesOnlyWhenTold) {
+TEST(pathTree, CpFileOverwritesOnlyWhenTold) {
   TempDir dir;
   WriteBytes(dir / "from", "new");
   WriteBytes(dir / "to", "old, and longer");
@@ -281,7 +281,7 @@ TEST(PathTree, CpFileOverwritesOnlyWhenTold) {
   EXPECT_EQ(0640, ModeOf(dir / "to"));
 }
 
-TEST(PathTree, CpFileOntoItselfUnderAnyNameKeepsTheBytes) {
+TEST(pathTree, CpFileOntoItselfUnderAnyNameKeepsTheBytes) {
   TempDir dir;
   WriteBytes(dir / "File", "kept");
   ASSERT_EQ(0, link((dir / "File").c_str(), (dir / "hard").c_str()));
@@ -293,7 +293,7 @@ TEST(PathTree, CpFileOntoItselfUnderAnyNameKeepsTheBytes) {
   EXPECT_FALSE(Exists(dir / "FILE"));
 }
 
-TEST(PathTree, CpFileFailures) {
+TEST(pathTree, CpFileFailures) {
   TempDir dir;
   WriteBytes(dir / "file", "x");
   dir.makeDir("d");
@@ -311,7 +311,7 @@ TEST(PathTree, CpFileFailures) {
   EXPECT_EQ(ENOENT, PosixErrorOf([&] { copy("file", "no/y"); }));
 }
 
-TEST(PathTree, CpFileNeverWaitsForAPipe) {
+TEST(pathTree, CpFileNeverWaitsForAPipe) {
   TempDir dir;
   WriteBytes(dir / "file", "x");
   ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0600));
@@ -321,7 +321,7 @@ TEST(PathTree, CpFileNeverWaitsForAPipe) {
   EXPECT_FALSE(Exists(dir / "to"));
 }
 
-TEST(PathTree, CpFileThatCannotWriteAllFails) {
+TEST(pathTree, CpFileThatCannotWriteAllFails) {
   TempDir dir;
   WriteBytes(dir / "file", std::string(100000, 'x'));
   vlt::test::Child child([&] {
@@ -340,7 +340,7 @@ TEST(PathTree, CpFileThatCannotWriteAllFails) {
   EXPECT_THROW(path::CpFile(Wide(dir / "file"), L"/dev/full", true), exception::FileWriteFailed);
 }
 
-TEST(PathTree, CpDirCopiesATreeWithoutHiddenEntries) {
+TEST(pathTree, CpDirCopiesATreeWithoutHiddenEntries) {
   TempDir dir;
   WriteBytes(dir.makeDir("from") + "/a", "A");
   WriteBytes(dir.makeDir("from/sub/deep") + "/b", "B");
@@ -359,7 +359,7 @@ TEST(PathTree, CpDirCopiesATreeWithoutHiddenEntries) {
   EXPECT_EQ(0700, ModeOf(dir / "new/one"));
 }
 
-TEST(PathTree, CpDirFailures) {
+TEST(pathTree, CpDirFailures) {
   TempDir dir;
   WriteBytes(dir.makeDir("from") + "/a", "A");
   EXPECT_THROW(path::CpDir(L"from", Wide(dir / "to/")), exception::InvalidArgument);
@@ -372,7 +372,7 @@ TEST(PathTree, CpDirFailures) {
   EXPECT_TRUE(Exists(dir / "x"));
 }
 
-TEST(PathTree, CpDirThroughALoopOfLinksEnds) {
+TEST(pathTree, CpDirThroughALoopOfLinksEnds) {
   TempDir dir;
   dir.makeDir("from/sub");
   // Two loops in one directory would be walked some 2^40 times.
@@ -381,7 +381,7 @@ TEST(PathTree, CpDirThroughALoopOfLinksEnds) {
   EXPECT_EQ(ELOOP, PosixErrorOf([&] { path::CpDir(Wide(dir / "from"), Wide(dir / "to/")); }));
 }
 
-TEST(PathTree, CpDirIntoItselfDoesNotCopyTheCopy) {
+TEST(pathTree, CpDirIntoItselfDoesNotCopyTheCopy) {
   TempDir dir;
   WriteBytes(dir.makeDir("from") + "/a", "A");
   dir.makeDir("from/to");

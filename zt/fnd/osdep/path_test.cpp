@@ -39,9 +39,9 @@ std::string AccessDeniedTextOf(Call call) {
 
 // ---- text
 
-TEST(Path, SymLinksAreSupported) { EXPECT_TRUE(path::PlatformSupportsSymLinks()); }
+TEST(path, SymLinksAreSupported) { EXPECT_TRUE(path::PlatformSupportsSymLinks()); }
 
-TEST(Path, AbsoluteIsWhatStartsWithASlash) {
+TEST(path, AbsoluteIsWhatStartsWithASlash) {
   EXPECT_TRUE(path::IsPathAbsolute(L"/"));
   EXPECT_TRUE(path::IsAbs(L"//x"));
   EXPECT_FALSE(path::IsPathAbsolute(L""));
@@ -50,7 +50,7 @@ TEST(Path, AbsoluteIsWhatStartsWithASlash) {
   EXPECT_FALSE(path::IsPathAbsolute(nullptr));
 }
 
-TEST(Path, DirName) {
+TEST(path, DirName) {
   const char* rows[][2] = {{"/a/b", "/a"},  {"/a/b/", "/a/b"}, {"a", ""},          {"/a", "/"},
                            {"//a", "//"},   {"/", "/"},        {"a/b", "a"},       {"", ""},
                            {"///", "///"},  {"a/", "a"},       {"a//b", "a"},      {"a//", "a"},
@@ -58,13 +58,13 @@ TEST(Path, DirName) {
   for (const auto& row : rows) EXPECT_EQ(row[1], Narrow(path::DirName(Wide(row[0])))) << row[0];
 }
 
-TEST(Path, BaseName) {
+TEST(path, BaseName) {
   const char* rows[][2] = {{"/a/b", "b"}, {"/a/b/", ""}, {"a", "a"},
                            {"", ""},      {"/", ""},     {"/a", "a"}};
   for (const auto& row : rows) EXPECT_EQ(row[1], Narrow(path::BaseName(Wide(row[0])))) << row[0];
 }
 
-TEST(Path, Join) {
+TEST(path, Join) {
   const char* rows[][3] = {{"a", "/b", "/b"}, {"", "b", "b"},   {"a/", "b", "a/b"},
                            {"a", "b", "a/b"}, {"a", "", "a/"},  {"", "", ""},
                            {"/", "b", "/b"},  {"a/", "", "a/"}, {"a//", "b", "a//b"}};
@@ -74,7 +74,7 @@ TEST(Path, Join) {
   }
 }
 
-TEST(Path, MakePathEndInSlash) {
+TEST(path, MakePathEndInSlash) {
   String text(L"/a");
   path::MakePathEndInSlash(text);
   EXPECT_EQ("/a/", Narrow(text));
@@ -85,7 +85,7 @@ TEST(Path, MakePathEndInSlash) {
   EXPECT_TRUE(empty.empty());
 }
 
-TEST(Path, NormalizePath) {
+TEST(path, NormalizePath) {
   const char* rows[][2] = {{"a/b", ""},          {"", ""},
                            {"./a", ""},          {"/a/b/../c", "/a/c"},
                            {"/..", ""},          {"/a/.../b", ""},
@@ -104,7 +104,7 @@ TEST(Path, NormalizePath) {
   }
 }
 
-TEST(Path, NormalizeOfALongPathTakesLittleTime) {
+TEST(path, NormalizeOfALongPathTakesLittleTime) {
   String text;
   for (int i = 0; i < 200000; ++i) text += L"/a/./b/..";
   String result = path::NormalizePath(text);
@@ -113,7 +113,7 @@ TEST(Path, NormalizeOfALongPathTakesLittleTime) {
 
 // ---- the working directory and temporary names
 
-TEST(Path, WorkingDirectory) {
+TEST(path, WorkingDirectory) {
   TempDir dir;
   String before = path::GetCWD();
   String left = path::SetCWD(Wide(dir.path()));
@@ -132,7 +132,7 @@ TEST(Path, WorkingDirectory) {
   path::SetCWD(before);
 }
 
-TEST(Path, WorkingDirectoryThatIsGoneIsAnError) {
+TEST(path, WorkingDirectoryThatIsGoneIsAnError) {
   TempDir dir;
   std::string gone = dir.makeDir("gone");
   vlt::test::Child child([&] {
@@ -142,7 +142,7 @@ TEST(Path, WorkingDirectoryThatIsGoneIsAnError) {
   EXPECT_EQ(0, child.wait());
 }
 
-TEST(Path, TempDirNameIsTheEnvironmentsOrTheDefault) {
+TEST(path, TempDirNameIsTheEnvironmentsOrTheDefault) {
   std::string kept = getenv("TMPDIR");
   setenv("TMPDIR", "/some/where", 1);
   EXPECT_EQ("/some/where", Narrow(path::TempDirName()));
@@ -153,7 +153,7 @@ TEST(Path, TempDirNameIsTheEnvironmentsOrTheDefault) {
   setenv("TMPDIR", kept.c_str(), 1);
 }
 
-TEST(Path, TempFileNameIsFreeAndNothingIsMade) {
+TEST(path, TempFileNameIsFreeAndNothingIsMade) {
   TempDir dir;
   std::string kept = getenv("TMPDIR");
   setenv("TMPDIR", dir.path().c_str(), 1);
@@ -174,7 +174,7 @@ TEST(Path, TempFileNameIsFreeAndNothingIsMade) {
 
 // ---- asking
 
-TEST(Path, IsDirectoryAndIsSymLinkNeverThrow) {
+TEST(path, IsDirectoryAndIsSymLinkNeverThrow) {
   TempDir dir;
   vlt::test::WriteBytes(dir / "file", "x");
   ASSERT_EQ(0, symlink(dir.path().c_str(), (dir / "link").c_str()));
@@ -196,7 +196,7 @@ TEST(Path, IsDirectoryAndIsSymLinkNeverThrow) {
   EXPECT_FALSE(path::IsDirectory((String(L"/") + longName).c_str()));
 }
 
-TEST(Path, DoesFileExistIsTrueForRegularFilesOnly) {
+TEST(path, DoesFileExistIsTrueForRegularFilesOnly) {
   TempDir dir;
   vlt::test::WriteBytes(dir / "file", "x");
   ASSERT_EQ(0, symlink("file", (dir / "link").c_str()));
@@ -216,7 +216,7 @@ TEST(Path, DoesFileExistIsTrueForRegularFilesOnly) {
 
 // ---- making directories
 
-TEST(Path, CreateDirMakesTheDirectoriesOfAFilesPath) {
+TEST(path, CreateDirMakesTheDirectoriesOfAFilesPath) {
   TempDir dir;
   path::CreateDir(Wide(dir / "a/b/c").c_str());
   EXPECT_EQ(0700, ModeOf(dir / "a"));
@@ -226,7 +226,7 @@ TEST(Path, CreateDirMakesTheDirectoriesOfAFilesPath) {
   EXPECT_EQ(0700, ModeOf(dir / "a/b/c"));
 }
 
-TEST(Path, CreateDirOnAnExistingDirectoryChangesNothing) {
+TEST(path, CreateDirOnAnExistingDirectoryChangesNothing) {
   TempDir dir;
   ASSERT_EQ(0, mkdir((dir / "x").c_str(), 0711));
   ASSERT_EQ(0, chmod((dir / "x").c_str(), 0711));
@@ -237,7 +237,7 @@ TEST(Path, CreateDirOnAnExistingDirectoryChangesNothing) {
   EXPECT_FALSE(Exists("/x"));
 }
 
-TEST(Path, CreateDirWithAModeWinsAgainstTheUmask) {
+TEST(path, CreateDirWithAModeWinsAgainstTheUmask) {
   TempDir dir;
   vlt::test::Child child([&] {
     umask(0077);
@@ -254,7 +254,7 @@ TEST(Path, CreateDirWithAModeWinsAgainstTheUmask) {
   EXPECT_EQ(01750, ModeOf(dir / "odd"));  // 16 bits of the mode count
 }
 
-TEST(Path, CreateDirWithoutAModeObeysTheUmask) {
+TEST(path, CreateDirWithoutAModeObeysTheUmask) {
   TempDir dir;
   vlt::test::Child child([&] {
     umask(0300);
@@ -265,14 +265,14 @@ TEST(Path, CreateDirWithoutAModeObeysTheUmask) {
   EXPECT_EQ(0400, ModeOf(dir / "a"));
 }
 
-TEST(Path, CreateDirDemandsAnAbsolutePath) {
+TEST(path, CreateDirDemandsAnAbsolutePath) {
   EXPECT_THROW(path::CreateDir(L"a/b/"), exception::InvalidArgument);
   EXPECT_THROW(path::CreateDir(L""), exception::InvalidArgument);
   EXPECT_THROW(path::CreateDir(nullptr), exception::InvalidArgument);
   EXPECT_THROW(path::CreateDir(nullptr, 0777), exception::InvalidArgument);
 }
 
-TEST(Path, CreateDirThroughAFileIsRefusedByTheFailingPart) {
+TEST(path, CreateDirThroughAFileIsRefusedByTheFailingPart) {
   TempDir dir;
   vlt::test::WriteBytes(dir / "file", "x");
   ASSERT_EQ(0, symlink("nowhere", (dir / "dangling").c_str()));
@@ -290,7 +290,7 @@ TEST(Path, CreateDirThroughAFileIsRefusedByTheFailingPart) {
             }));
 }
 
-TEST(Path, CreateDirWhoseModeCannotBeSetTakesTheDirectoryAway) {
+TEST(path, CreateDirWhoseModeCannotBeSetTakesTheDirectoryAway) {
   TempDir dir;
   vlt::test::Child child([&] {
     if (!vlt::test::FailSystemCall(SYS_fchmod, EIO)) return 1;
@@ -304,7 +304,7 @@ TEST(Path, CreateDirWhoseModeCannotBeSetTakesTheDirectoryAway) {
 
 // ---- removing
 
-TEST(Path, RemoveFile) {
+TEST(path, RemoveFile) {
   TempDir dir;
   vlt::test::WriteBytes(dir / "file", "x");
   path::RemoveFile(Wide(dir / "file"));
@@ -317,7 +317,7 @@ TEST(Path, RemoveFile) {
   EXPECT_FALSE(Exists(dir / "link"));
 }
 
-TEST(Path, RemoveDir) {
+TEST(path, RemoveDir) {
   TempDir dir;
   vlt::test::WriteBytes(dir.makeDir("full") + "/file", "x");
   dir.makeDir("empty");
@@ -337,7 +337,7 @@ TEST(Path, RemoveDir) {
 
 // ---- links
 
-TEST(Path, CreateAndResolveSymLink) {
+TEST(path, CreateAndResolveSymLink) {
   TempDir dir;
   path::CreateSymLink(Wide(dir / "link"), L"some/../target");
   EXPECT_EQ("some/../target", Narrow(path::ResolveSymLink(Wide(dir / "link"))));

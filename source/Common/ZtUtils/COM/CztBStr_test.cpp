@@ -8,7 +8,7 @@ namespace {
 
 using zt::fnd::String;
 
-TEST(BStr, NullIsNeverLessOnEitherSide) {
+TEST(CztBStr, NullIsNeverLessOnEitherSide) {
   CztBStr null, text(String(L"a"));
   EXPECT_FALSE(null < text);
   EXPECT_FALSE(text < null);
@@ -17,7 +17,7 @@ TEST(BStr, NullIsNeverLessOnEitherSide) {
   EXPECT_FALSE(text < CztBStr(String(L"B")));  // exact: capitals come first
 }
 
-TEST(BStr, TakesOrCopiesThePointer) {
+TEST(CztBStr, TakesOrCopiesThePointer) {
   wchar_t* own = ZtSysAllocString(L"own");
   CztBStr taken(own, true);
   EXPECT_EQ(taken.get(), own);
@@ -28,7 +28,7 @@ TEST(BStr, TakesOrCopiesThePointer) {
   EXPECT_EQ(CztBStr(nullptr, false).get(), nullptr);
 }
 
-TEST(BStr, CopyOwnsATextOfItsOwn) {
+TEST(CztBStr, CopyOwnsATextOfItsOwn) {
   CztBStr a(String(L"a"));
   CztBStr b(a);
   EXPECT_NE(a.get(), b.get());
@@ -36,7 +36,7 @@ TEST(BStr, CopyOwnsATextOfItsOwn) {
   EXPECT_EQ(CztBStr(CztBStr()).get(), nullptr);
 }
 
-TEST(BStr, AssigningANullNarrowTextKeepsTheOldOne) {
+TEST(CztBStr, AssigningANullNarrowTextKeepsTheOldOne) {
   CztBStr b("old");
   b = static_cast<const char*>(nullptr);
   EXPECT_STREQ(b.get(), L"old");
@@ -49,7 +49,7 @@ TEST(BStr, AssigningANullNarrowTextKeepsTheOldOne) {
   EXPECT_EQ(CztBStr(static_cast<const char*>(nullptr)).get(), nullptr);
 }
 
-TEST(BStr, ConvertsToStrings) {
+TEST(CztBStr, ConvertsToStrings) {
   CztBStr b("text");
   EXPECT_EQ(String(b).exactCompare(L"text"), 0);
   EXPECT_STREQ(b.ToFNDAnsiString().c_str(), "text");

@@ -31,12 +31,12 @@ FilePtr Open(const std::string& path, Access access, Truncate truncate = Truncat
                                   access == Access::Write || access == Access::Both));
 }
 
-struct FileStream : testing::Test {
+struct CztFileStreamTest : testing::Test {
   TempDir dir;
   std::string path = dir / "stream";
 };
 
-TEST_F(FileStream, AccessAndTruncationDecideHowTheFileOpens) {
+TEST_F(CztFileStreamTest, AccessAndTruncationDecideHowTheFileOpens) {
   struct Row {
     Access access;
     Truncate truncate;
@@ -57,7 +57,7 @@ TEST_F(FileStream, AccessAndTruncationDecideHowTheFileOpens) {
   }
 }
 
-TEST_F(FileStream, WhatDoesNotOpenGivesNullAndNothingStaysOpen) {
+TEST_F(CztFileStreamTest, WhatDoesNotOpenGivesNullAndNothingStaysOpen) {
   int before = OpenDescriptors();
   EXPECT_FALSE(Open(dir / "missing", Access::Read));
   EXPECT_FALSE(Open(dir / "no/such/place", Access::Both));
@@ -65,7 +65,7 @@ TEST_F(FileStream, WhatDoesNotOpenGivesNullAndNothingStaysOpen) {
   EXPECT_EQ(OpenDescriptors(), before);
 }
 
-TEST_F(FileStream, AFailedInitKeepsNameAndFlags) {
+TEST_F(CztFileStreamTest, AFailedInitKeepsNameAndFlags) {
   auto stream = FilePtr::Attach(ZtATLNew<CztFileStream>());
   EXPECT_FALSE(stream->Init(String((dir / "no/file").c_str()), false, true, true));
   char byte = 0;
@@ -80,7 +80,7 @@ TEST_F(FileStream, AFailedInitKeepsNameAndFlags) {
   EXPECT_TRUE(Exists(dir / "no/file"));
 }
 
-TEST_F(FileStream, PermissionIsTestedBeforeFileAndBuffer) {
+TEST_F(CztFileStreamTest, PermissionIsTestedBeforeFileAndBuffer) {
   auto stream = FilePtr::Attach(ZtATLNew<CztFileStream>());
   unsigned done = 99;
   EXPECT_EQ(stream->Read(nullptr, 1, &done), ZT_E_ACCESS_DENIED);
@@ -97,7 +97,7 @@ TEST_F(FileStream, PermissionIsTestedBeforeFileAndBuffer) {
   EXPECT_EQ(ReadBytes(path), "abc");
 }
 
-TEST_F(FileStream, WritesAndReadsBytes) {
+TEST_F(CztFileStreamTest, WritesAndReadsBytes) {
   {
     FilePtr stream = Open(path, Access::Both);
     Put(stream.get(), "abcdef");
@@ -110,7 +110,7 @@ TEST_F(FileStream, WritesAndReadsBytes) {
   EXPECT_EQ(ReadBytes(path), "aXcdef");
 }
 
-TEST_F(FileStream, ReadGivesWhatThereIs) {
+TEST_F(CztFileStreamTest, ReadGivesWhatThereIs) {
   WriteBytes(path, "abcdef");
   FilePtr stream = Open(path, Access::Read);
   char buffer[8] = {};
@@ -124,7 +124,7 @@ TEST_F(FileStream, ReadGivesWhatThereIs) {
   EXPECT_EQ(stream->Read(buffer, 0, &done), S_OK);
 }
 
-TEST_F(FileStream, SeekFollowsTheSystem) {
+TEST_F(CztFileStreamTest, SeekFollowsTheSystem) {
   WriteBytes(path, "abcdef");
   FilePtr stream = Open(path, Access::Both);
   int64_t position = 99;
@@ -140,7 +140,7 @@ TEST_F(FileStream, SeekFollowsTheSystem) {
   EXPECT_EQ(Position(stream.get()), 3);
 }
 
-TEST_F(FileStream, SetSizeKeepsTheCursorInside) {
+TEST_F(CztFileStreamTest, SetSizeKeepsTheCursorInside) {
   WriteBytes(path, "abcdef");
   FilePtr stream = Open(path, Access::Both);
   stream->Seek(2, ztSeekBegin, nullptr);
@@ -163,7 +163,7 @@ TEST_F(FileStream, SetSizeKeepsTheCursorInside) {
   EXPECT_EQ(ReadBytes(path), "abc");
 }
 
-TEST_F(FileStream, SetSizeZeroEmptiesAReadWriteStream) {
+TEST_F(CztFileStreamTest, SetSizeZeroEmptiesAReadWriteStream) {
   WriteBytes(path, "abcdef");
   FilePtr stream = Open(path, Access::Both);
   stream->Seek(3, ztSeekBegin, nullptr);
@@ -173,7 +173,7 @@ TEST_F(FileStream, SetSizeZeroEmptiesAReadWriteStream) {
   EXPECT_EQ(Contents(stream.get()), "new");
 }
 
-TEST_F(FileStream, SetSizeZeroOfAWriteOnlyStreamKeepsContentsAndAllowsReading) {
+TEST_F(CztFileStreamTest, SetSizeZeroOfAWriteOnlyStreamKeepsContentsAndAllowsReading) {
   WriteBytes(path, "abcdef");
   FilePtr stream = Open(path, Access::Write);
   char buffer[6];
@@ -186,7 +186,7 @@ TEST_F(FileStream, SetSizeZeroOfAWriteOnlyStreamKeepsContentsAndAllowsReading) {
   EXPECT_EQ(ReadBytes(path), "abcdefg");
 }
 
-TEST_F(FileStream, SetSizeZeroOfAWriteOnlyStreamLoadsItsSubStreams) {
+TEST_F(CztFileStreamTest, SetSizeZeroOfAWriteOnlyStreamLoadsItsSubStreams) {
   WriteBytes(path, WithArea("data", {{L"one", "1"}}));
   FilePtr stream = Open(path, Access::Write);
   EXPECT_EQ(Count(stream.get()), 0u);
@@ -194,7 +194,7 @@ TEST_F(FileStream, SetSizeZeroOfAWriteOnlyStreamLoadsItsSubStreams) {
   EXPECT_EQ(ContentsOf(stream.get(), L"one"), "1");
 }
 
-TEST_F(FileStream, SetSizeZeroOfAWriteOnlyStreamTellsDamagedSubStreams) {
+TEST_F(CztFileStreamTest, SetSizeZeroOfAWriteOnlyStreamTellsDamagedSubStreams) {
   WriteBytes(path, "data" + Trailer(1000));
   FilePtr stream = Open(path, Access::Write);
   EXPECT_EQ(stream->SetSize(0), E_FAIL);  // damaged ones: the stream itself is open
@@ -202,7 +202,7 @@ TEST_F(FileStream, SetSizeZeroOfAWriteOnlyStreamTellsDamagedSubStreams) {
   EXPECT_EQ(stream->Read(buffer, 4, nullptr), S_OK);
 }
 
-TEST_F(FileStream, AFullDiskIsTold) {
+TEST_F(CztFileStreamTest, AFullDiskIsTold) {
   ExpectInChild([this] {
     FilePtr stream = Open(path, Access::Both);
     rlimit limit = {6, 6};
@@ -219,7 +219,7 @@ TEST_F(FileStream, AFullDiskIsTold) {
 
 // ---- Sub-streams in files
 
-TEST_F(FileStream, ClosingWritesTheSubStreams) {
+TEST_F(CztFileStreamTest, ClosingWritesTheSubStreams) {
   {
     FilePtr stream = Open(path, Access::Both);
     Put(stream.get(), "data");
@@ -230,12 +230,12 @@ TEST_F(FileStream, ClosingWritesTheSubStreams) {
   EXPECT_EQ(ReadBytes(path), WithArea("data", {{L"one", "1"}, {L"two", "2"}}, Width::Writer));
 }
 
-TEST_F(FileStream, AWriteOnlyStreamWritesThemToo) {
+TEST_F(CztFileStreamTest, AWriteOnlyStreamWritesThemToo) {
   { Made(Open(path, Access::Write).get(), L"one", "1"); }
   EXPECT_EQ(ReadBytes(path), WithArea("", {{L"one", "1"}}, Width::Writer));
 }
 
-TEST_F(FileStream, OpeningForWritingTakesTheAreaIntoMemory) {
+TEST_F(CztFileStreamTest, OpeningForWritingTakesTheAreaIntoMemory) {
   WriteBytes(path, WithArea("data", {{L"one", "1"}, {L"two", "2"}}));
   {
     FilePtr stream = Open(path, Access::Both);
@@ -249,7 +249,7 @@ TEST_F(FileStream, OpeningForWritingTakesTheAreaIntoMemory) {
   EXPECT_EQ(ReadBytes(path), WithArea("datamore", {{L"two", "2"}}, Width::Writer));
 }
 
-TEST_F(FileStream, OpeningForReadingLeavesTheArea) {
+TEST_F(CztFileStreamTest, OpeningForReadingLeavesTheArea) {
   std::string bytes = WithArea("data", {{L"one", "1"}});
   WriteBytes(path, bytes);
   {
@@ -263,13 +263,13 @@ TEST_F(FileStream, OpeningForReadingLeavesTheArea) {
   EXPECT_EQ(ReadBytes(path), bytes);
 }
 
-TEST_F(FileStream, TruncatingLoadsNothing) {
+TEST_F(CztFileStreamTest, TruncatingLoadsNothing) {
   WriteBytes(path, WithArea("data", {{L"one", "1"}}));
   { EXPECT_EQ(Count(Open(path, Access::Both, Truncate::Yes).get()), 0u); }
   EXPECT_EQ(ReadBytes(path), "");
 }
 
-TEST_F(FileStream, AnAreaAtTheStartEmptiesTheFile) {
+TEST_F(CztFileStreamTest, AnAreaAtTheStartEmptiesTheFile) {
   WriteBytes(path, WithArea("", {{L"one", "1"}}));
   FilePtr stream = Open(path, Access::Both);
   EXPECT_EQ(ReadBytes(path), "");
@@ -279,7 +279,7 @@ TEST_F(FileStream, AnAreaAtTheStartEmptiesTheFile) {
   EXPECT_EQ(ReadBytes(path), WithArea("data", {{L"one", "1"}}, Width::Writer));
 }
 
-TEST_F(FileStream, WrittenSubStreamsReadBackWhereLongIsFourBytes) {
+TEST_F(CztFileStreamTest, WrittenSubStreamsReadBackWhereLongIsFourBytes) {
   { Made(Open(path, Access::Both).get(), L"one", "1"); }
   std::string bytes = ReadBytes(path);
   if (kLongIs8) {
@@ -292,7 +292,7 @@ TEST_F(FileStream, WrittenSubStreamsReadBackWhereLongIsFourBytes) {
   }
 }
 
-TEST_F(FileStream, ADamagedAreaThrowsAndLeavesTheFile) {
+TEST_F(CztFileStreamTest, ADamagedAreaThrowsAndLeavesTheFile) {
   std::string bytes = "data" + Trailer(5000);
   WriteBytes(path, bytes);
   int before = OpenDescriptors();
@@ -301,11 +301,11 @@ TEST_F(FileStream, ADamagedAreaThrowsAndLeavesTheFile) {
   EXPECT_EQ(ReadBytes(path), bytes);
 }
 
-TEST_F(FileStream, ADirectoryEndsInItsFirstRead) {
+TEST_F(CztFileStreamTest, ADirectoryEndsInItsFirstRead) {
   EXPECT_EQ(WhatThrows([&] { Open(dir.path(), Access::Read); }), Thrown::EndOfStream);
 }
 
-TEST_F(FileStream, ClearStreamsStartsOver) {
+TEST_F(CztFileStreamTest, ClearStreamsStartsOver) {
   WriteBytes(path, WithArea("data", {{L"one", "1"}}));
   FilePtr stream = Open(path, Access::Both);
   EXPECT_EQ(stream->ClearStreams(), S_OK);
@@ -316,7 +316,7 @@ TEST_F(FileStream, ClearStreamsStartsOver) {
   EXPECT_EQ(ReadBytes(path), WithArea("", {{L"two", "2"}}, Width::Writer));
 }
 
-TEST_F(FileStream, AnAreaThatDoesNotFitIsTakenBack) {
+TEST_F(CztFileStreamTest, AnAreaThatDoesNotFitIsTakenBack) {
   for (Access access : {Access::Both, Access::Write}) {
     for (std::string data : {"data", ""}) {
       std::filesystem::remove(path);
@@ -337,7 +337,7 @@ TEST_F(FileStream, AnAreaThatDoesNotFitIsTakenBack) {
   }
 }
 
-TEST_F(FileStream, WithoutMemoryTheFileStaysAndNothingLeaks) {
+TEST_F(CztFileStreamTest, WithoutMemoryTheFileStaysAndNothingLeaks) {
   std::string bytes = WithArea("data", {{L"one", WithArea("1", {{L"deep", "d"}})}});
   WriteBytes(path, bytes);
   int failures = 0;

@@ -12,7 +12,7 @@ namespace {
 
 std::string Fill(size_t n) { return std::string(n, 'x'); }
 
-TEST(MemoryStream, StartsEmptyWithOneReference) {
+TEST(CztMemoryStream, StartsEmptyWithOneReference) {
   CztMemoryStream* stream = CztMemoryStream::CreateStream();
   ASSERT_NE(stream, nullptr);
   EXPECT_EQ(stream->GetBuffer(), nullptr);
@@ -22,12 +22,12 @@ TEST(MemoryStream, StartsEmptyWithOneReference) {
   EXPECT_EQ(stream->Release(), 0u);
 }
 
-TEST(MemoryStream, CreateWithoutMemoryGivesNull) {
+TEST(CztMemoryStream, CreateWithoutMemoryGivesNull) {
   FailAllocation fail(1);
   EXPECT_EQ(CztMemoryStream::CreateStream(), nullptr);
 }
 
-TEST(MemoryStream, UnknownAndFirstInterfaceAreOnePointer) {
+TEST(CztMemoryStream, UnknownAndFirstInterfaceAreOnePointer) {
   MemoryPtr stream = NewMemory();
   void *unknown = nullptr, *first = nullptr;
   EXPECT_EQ(stream->QueryInterface(IID_IUnknown, &unknown), S_OK);
@@ -37,7 +37,7 @@ TEST(MemoryStream, UnknownAndFirstInterfaceAreOnePointer) {
   EXPECT_EQ(stream->Release(), 1u);
 }
 
-TEST(MemoryStream, BlockStartsWith64AndDoubles) {
+TEST(CztMemoryStream, BlockStartsWith64AndDoubles) {
   MemoryPtr stream = NewMemory();
   Put(stream.get(), Fill(1));
   EXPECT_EQ(stream->capacity(), 64u);
@@ -50,7 +50,7 @@ TEST(MemoryStream, BlockStartsWith64AndDoubles) {
   EXPECT_EQ(stream->size(), 129u);
 }
 
-TEST(MemoryStream, CapacityDoublesUntilTheDataFits) {
+TEST(CztMemoryStream, CapacityDoublesUntilTheDataFits) {
   struct Row {
     uint64_t setSize;
     size_t write;
@@ -66,13 +66,13 @@ TEST(MemoryStream, CapacityDoublesUntilTheDataFits) {
   }
 }
 
-TEST(MemoryStream, ManySmallWritesTakeLinearTime) {
+TEST(CztMemoryStream, ManySmallWritesTakeLinearTime) {
   MemoryPtr stream = NewMemory();
   for (int i = 0; i < 2000000; ++i) stream->Write("abc", 3, nullptr);
   EXPECT_EQ(stream->size(), 6000000u);
 }
 
-TEST(MemoryStream, WritesOverAndBeyondWhatIsThere) {
+TEST(CztMemoryStream, WritesOverAndBeyondWhatIsThere) {
   MemoryPtr stream = MemoryOf("abcdef");
   stream->Seek(2, ztSeekBegin, nullptr);
   Put(stream.get(), "XY");
@@ -83,7 +83,7 @@ TEST(MemoryStream, WritesOverAndBeyondWhatIsThere) {
   EXPECT_EQ(stream->Write(nullptr, 0, nullptr), S_OK);
 }
 
-TEST(MemoryStream, ReadGivesWhatThereIs) {
+TEST(CztMemoryStream, ReadGivesWhatThereIs) {
   MemoryPtr stream = MemoryOf("abcdef");
   char buffer[8] = {};
   unsigned done = 99;
@@ -98,7 +98,7 @@ TEST(MemoryStream, ReadGivesWhatThereIs) {
   EXPECT_EQ(stream->Read(buffer, 1, nullptr), ZT_E_END_OF_STREAM);
 }
 
-TEST(MemoryStream, ReadWithoutABlockIsAnInvalidArgument) {
+TEST(CztMemoryStream, ReadWithoutABlockIsAnInvalidArgument) {
   MemoryPtr stream = NewMemory();
   char buffer[1];
   unsigned done = 99;
@@ -109,7 +109,7 @@ TEST(MemoryStream, ReadWithoutABlockIsAnInvalidArgument) {
   EXPECT_EQ(MemoryOf("a")->Write(nullptr, 1, nullptr), E_INVALIDARG);
 }
 
-TEST(MemoryStream, SeekClampsAtTheEndOnly) {
+TEST(CztMemoryStream, SeekClampsAtTheEndOnly) {
   struct Row {
     int64_t offset;
     int32_t mode;
@@ -128,7 +128,7 @@ TEST(MemoryStream, SeekClampsAtTheEndOnly) {
   }
 }
 
-TEST(MemoryStream, PastTheEndThereIsNothingToRead) {
+TEST(CztMemoryStream, PastTheEndThereIsNothingToRead) {
   MemoryPtr stream = MemoryOf("abc");
   stream->Seek(100, ztSeekBegin, nullptr);
   EXPECT_EQ(Position(stream.get()), 3);
@@ -138,7 +138,7 @@ TEST(MemoryStream, PastTheEndThereIsNothingToRead) {
   EXPECT_EQ(done, 0u);
 }
 
-TEST(MemoryStream, InFrontOfTheStartNothingIsReadOrWritten) {
+TEST(CztMemoryStream, InFrontOfTheStartNothingIsReadOrWritten) {
   for (const MemoryPtr& stream : {MemoryOf("abc"), NewMemory()}) {
     int64_t position = 0;
     stream->Seek(-2, ztSeekBegin, &position);
@@ -154,7 +154,7 @@ TEST(MemoryStream, InFrontOfTheStartNothingIsReadOrWritten) {
   }
 }
 
-TEST(MemoryStream, SetSizeMakesTheBlockExact) {
+TEST(CztMemoryStream, SetSizeMakesTheBlockExact) {
   MemoryPtr stream = MemoryOf("abcdef");
   stream->Seek(5, ztSeekBegin, nullptr);
   EXPECT_EQ(stream->SetSize(3), S_OK);
@@ -167,7 +167,7 @@ TEST(MemoryStream, SetSizeMakesTheBlockExact) {
   EXPECT_EQ(Contents(stream.get()), std::string("abc\0\0", 5));
 }
 
-TEST(MemoryStream, BytesThatSetSizeAddsAreZero) {
+TEST(CztMemoryStream, BytesThatSetSizeAddsAreZero) {
   MemoryPtr stream = MemoryOf(Fill(60));
   stream->SetSize(10);
   stream->Seek(0, ztSeekEnd, nullptr);
@@ -176,7 +176,7 @@ TEST(MemoryStream, BytesThatSetSizeAddsAreZero) {
   EXPECT_EQ(Contents(stream.get()), Fill(10) + "y" + std::string(9, '\0'));
 }
 
-TEST(MemoryStream, SetSizeZeroFreesTheBlock) {
+TEST(CztMemoryStream, SetSizeZeroFreesTheBlock) {
   MemoryPtr stream = MemoryOf("abc");
   EXPECT_EQ(stream->SetSize(0), S_OK);
   EXPECT_EQ(stream->GetBuffer(), nullptr);
@@ -189,7 +189,7 @@ TEST(MemoryStream, SetSizeZeroFreesTheBlock) {
   EXPECT_EQ(NewMemory()->SetSize(0), S_OK);
 }
 
-TEST(MemoryStream, SizesBeyond32BitsAreInvalid) {
+TEST(CztMemoryStream, SizesBeyond32BitsAreInvalid) {
   MemoryPtr stream = MemoryOf("abc");
   EXPECT_EQ(stream->SetSize(0x100000000), E_INVALIDARG);
   EXPECT_EQ(stream->SetSize(UINT64_MAX), E_INVALIDARG);
@@ -209,7 +209,7 @@ TEST(MemoryStream, SizesBeyond32BitsAreInvalid) {
   EXPECT_EQ(Contents(stream.get()), "abc");
 }
 
-TEST_IN_CHILD(MemoryStream, WithoutMemoryNothingChanges) {
+TEST_IN_CHILD(CztMemoryStream, WithoutMemoryNothingChanges) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer holds the address space";
   LimitMemoryTo(32 << 20);
   MemoryPtr stream = MemoryOf("abc");
@@ -225,7 +225,7 @@ TEST_IN_CHILD(MemoryStream, WithoutMemoryNothingChanges) {
 
 // ---- Blocks that come and go
 
-TEST(MemoryStream, AReadOnlyBlockRefusesChangesAndIsNotFreed) {
+TEST(CztMemoryStream, AReadOnlyBlockRefusesChangesAndIsNotFreed) {
   std::string bytes = "abc";
   auto* block = reinterpret_cast<unsigned char*>(bytes.data());
   {
@@ -243,7 +243,7 @@ TEST(MemoryStream, AReadOnlyBlockRefusesChangesAndIsNotFreed) {
   EXPECT_EQ(bytes, "abc");
 }
 
-TEST(MemoryStream, AReadOnlyBlocksSubStreamsStayReadable) {
+TEST(CztMemoryStream, AReadOnlyBlocksSubStreamsStayReadable) {
   std::string bytes = WithArea("data", {{L"one", "first"}});
   MemoryPtr stream = NewMemory();
   stream->AttachBuffer(reinterpret_cast<unsigned char*>(bytes.data()), bytes.size(), true);
@@ -256,7 +256,7 @@ TEST(MemoryStream, AReadOnlyBlocksSubStreamsStayReadable) {
   EXPECT_EQ(Contents(stream.get()), bytes);
 }
 
-TEST(MemoryStream, AnOwnedBlockCanChange) {
+TEST(CztMemoryStream, AnOwnedBlockCanChange) {
   MemoryPtr stream = Attached("abc");
   EXPECT_EQ(Position(stream.get()), 0);
   EXPECT_EQ(stream->capacity(), 3u);
@@ -266,7 +266,7 @@ TEST(MemoryStream, AnOwnedBlockCanChange) {
   EXPECT_EQ(Contents(stream.get()), "abcd");
 }
 
-TEST(MemoryStream, AttachFreesTheOwnedBlockBefore) {
+TEST(CztMemoryStream, AttachFreesTheOwnedBlockBefore) {
   std::string second = "second";
   MemoryPtr stream = Attached("first");
   EXPECT_EQ(
@@ -281,7 +281,7 @@ TEST(MemoryStream, AttachFreesTheOwnedBlockBefore) {
   EXPECT_EQ(stream->GetBuffer(), nullptr);
 }
 
-TEST(MemoryStream, AttachLoadsSubStreamsOnceInItsLife) {
+TEST(CztMemoryStream, AttachLoadsSubStreamsOnceInItsLife) {
   MemoryPtr stream = Attached(WithArea("data", {{L"one", "1"}}));
   EXPECT_EQ(Contents(stream.get()), "data");
   std::string second = WithArea("more", {{L"two", "2"}});
@@ -291,7 +291,7 @@ TEST(MemoryStream, AttachLoadsSubStreamsOnceInItsLife) {
   EXPECT_EQ(ContentsOf(stream.get(), L"one"), "1");
 }
 
-TEST(MemoryStream, AnEmptyOwnedBlockIsABlock) {
+TEST(CztMemoryStream, AnEmptyOwnedBlockIsABlock) {
   MemoryPtr stream = Attached("");
   char buffer[1];
   EXPECT_EQ(stream->Read(buffer, 1, nullptr), ZT_E_END_OF_STREAM);
@@ -299,7 +299,7 @@ TEST(MemoryStream, AnEmptyOwnedBlockIsABlock) {
   EXPECT_EQ(stream->capacity(), 64u);
 }
 
-TEST(MemoryStream, ABlockWithADamagedAreaBelongsToTheStreamAllTheSame) {
+TEST(CztMemoryStream, ABlockWithADamagedAreaBelongsToTheStreamAllTheSame) {
   std::string bytes = "data" + Trailer(1000);
   MemoryPtr stream = NewMemory();
   unsigned char* block = MallocCopy(bytes);
@@ -308,7 +308,7 @@ TEST(MemoryStream, ABlockWithADamagedAreaBelongsToTheStreamAllTheSame) {
   EXPECT_EQ(Count(stream.get()), 0u);
 }
 
-TEST(MemoryStream, DetachHandsOutTheBlock) {
+TEST(CztMemoryStream, DetachHandsOutTheBlock) {
   MemoryPtr stream = MemoryOf("abc");
   unsigned char* block = stream->DetachBuffer();
   EXPECT_EQ(memcmp(block, "abc", 3), 0);
@@ -320,7 +320,7 @@ TEST(MemoryStream, DetachHandsOutTheBlock) {
   EXPECT_EQ(NewMemory()->DetachBuffer(), nullptr);
 }
 
-TEST(MemoryStream, DetachWritesTheSubStreamsFirst) {
+TEST(CztMemoryStream, DetachWritesTheSubStreamsFirst) {
   MemoryPtr stream = MemoryOf("data");
   Made(stream.get(), L"one", "1");
   std::string expected = WithArea("data", {{L"one", "1"}}, Width::Writer);
@@ -338,7 +338,7 @@ TEST(MemoryStream, DetachWritesTheSubStreamsFirst) {
   free(block);
 }
 
-TEST(MemoryStream, AStreamThatIsNotDetachedWritesNothing) {
+TEST(CztMemoryStream, AStreamThatIsNotDetachedWritesNothing) {
   MemoryPtr stream = MemoryOf("data");
   Made(stream.get(), L"one", "1");
   EXPECT_EQ(Contents(stream.get()), "data");

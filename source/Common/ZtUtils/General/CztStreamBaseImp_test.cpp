@@ -10,7 +10,7 @@
 namespace vlt::test {
 namespace {
 
-TEST(StreamInterfaces, SlotsStandInOrder) {
+TEST(CztStreamBaseImpInterfaces, SlotsStandInOrder) {
   EXPECT_EQ(SlotOf(&IUnknown::Release), 2u);
   EXPECT_EQ(SlotOf(&IztStream::Read), 3u);
   EXPECT_EQ(SlotOf(&IztStream::Write), 4u);
@@ -29,7 +29,7 @@ TEST(StreamInterfaces, SlotsStandInOrder) {
   EXPECT_EQ(SlotOf(&IztStream3::Clone), 17u);
 }
 
-TEST(SubStreams, EveryInterfaceIsTheSamePointer) {
+TEST(CztStreamBaseImp, EveryInterfaceIsTheSamePointer) {
   MemoryPtr stream = NewMemory();
   for (const GUID& iid : {IID_IUnknown, IID_IztStream, IID_IztStream2, IID_IztStream3}) {
     void* out = nullptr;
@@ -42,19 +42,19 @@ TEST(SubStreams, EveryInterfaceIsTheSamePointer) {
   EXPECT_EQ(out, nullptr);
 }
 
-TEST(SubStreams, MarkerBytesAreThoseOfTheFormat) {
+TEST(CztStreamBaseImp, MarkerBytesAreThoseOfTheFormat) {
   const auto* bytes = reinterpret_cast<const char*>(&CztStreamBaseImp::s_SubStreamMarker);
   EXPECT_EQ(Hexed(std::string(bytes, 16)), "A1 BB 00 D3 D6 C3 CF 47 B7 52 CB 9F FD 8A BC CC ");
 }
 
-TEST(SubStreams, OpenOfAMissingOneNullsThePointer) {
+TEST(CztStreamBaseImp, OpenOfAMissingOneNullsThePointer) {
   MemoryPtr stream = NewMemory();
   auto* out = reinterpret_cast<IztStream*>(1);
   EXPECT_EQ(stream->OpenSubStream(L"one", &out), S_FALSE);
   EXPECT_EQ(out, nullptr);
 }
 
-TEST(SubStreams, CreateMakesOnceAndOpensAfterwards) {
+TEST(CztStreamBaseImp, CreateMakesOnceAndOpensAfterwards) {
   MemoryPtr stream = NewMemory();
   CztComPtr<IztStream> one = Made(stream.get(), L"one", "abc");
   EXPECT_EQ(Made(stream.get(), L"one").get(), one.get());
@@ -65,7 +65,7 @@ TEST(SubStreams, CreateMakesOnceAndOpensAfterwards) {
   one->Release();
 }
 
-TEST(SubStreams, ANullNameIsAnEmptyOne) {
+TEST(CztStreamBaseImp, ANullNameIsAnEmptyOne) {
   MemoryPtr stream = NewMemory();
   CztComPtr<IztStream> one = Made(stream.get(), nullptr);
   EXPECT_EQ(Opened(stream.get(), L"").get(), one.get());
@@ -73,7 +73,7 @@ TEST(SubStreams, ANullNameIsAnEmptyOne) {
   EXPECT_EQ(stream->DeleteSubStream(nullptr), S_OK);
 }
 
-TEST(SubStreams, NullPointersAreRefused) {
+TEST(CztStreamBaseImp, NullPointersAreRefused) {
   MemoryPtr stream = NewMemory();
   wchar_t** names = nullptr;
   unsigned count = 0;
@@ -86,7 +86,7 @@ TEST(SubStreams, NullPointersAreRefused) {
   EXPECT_EQ(Count(stream.get()), 0u);
 }
 
-TEST(SubStreams, DeleteTakesTheNameAndLeavesReferences) {
+TEST(CztStreamBaseImp, DeleteTakesTheNameAndLeavesReferences) {
   MemoryPtr stream = NewMemory();
   CztComPtr<IztStream> one = Made(stream.get(), L"one", "abc");
   EXPECT_EQ(stream->DeleteSubStream(L"two"), S_FALSE);
@@ -98,7 +98,7 @@ TEST(SubStreams, DeleteTakesTheNameAndLeavesReferences) {
   one->Release();
 }
 
-TEST(SubStreams, OnAStreamThatIsNotWritable) {
+TEST(CztStreamBaseImp, OnAStreamThatIsNotWritable) {
   std::string bytes = "abc";
   MemoryPtr stream = NewMemory();
   stream->AttachBuffer(reinterpret_cast<unsigned char*>(bytes.data()), 3, true);
@@ -125,7 +125,7 @@ std::vector<std::wstring> NamesOf(IztStream2* stream) {
   return found;
 }
 
-TEST(SubStreams, NamesComeInOrderWhateverTheCase) {
+TEST(CztStreamBaseImp, NamesComeInOrderWhateverTheCase) {
   MemoryPtr stream = NewMemory();
   EXPECT_TRUE(NamesOf(stream.get()).empty());
   for (const wchar_t* name : {L"b", L"C", L"a", L"", L"_", L"A"}) Made(stream.get(), name);
@@ -133,7 +133,7 @@ TEST(SubStreams, NamesComeInOrderWhateverTheCase) {
   EXPECT_EQ(NamesOf(stream.get()), (std::vector<std::wstring>{L"", L"a", L"b", L"C", L"_"}));
 }
 
-TEST(SubStreams, ResetGoesThroughAllLevels) {
+TEST(CztStreamBaseImp, ResetGoesThroughAllLevels) {
   MemoryPtr stream = MemoryOf("abc");
   stream->Seek(2, ztSeekBegin, nullptr);
   CztComPtr<IztStream> one = Made(stream.get(), L"one", "abc");
@@ -145,7 +145,7 @@ TEST(SubStreams, ResetGoesThroughAllLevels) {
   EXPECT_EQ(Contents(deep.get()), "abcd");
 }
 
-TEST(SubStreams, ClearLetsThemBeLoadedAndWrittenAgain) {
+TEST(CztStreamBaseImp, ClearLetsThemBeLoadedAndWrittenAgain) {
   MemoryPtr stream = Attached(WithArea("data", {{L"one", "1"}}));
   EXPECT_EQ(stream->WriteSubStreamInfo(), S_OK);
   EXPECT_EQ(stream->ClearStreams(), S_OK);
@@ -160,7 +160,7 @@ TEST(SubStreams, ClearLetsThemBeLoadedAndWrittenAgain) {
 
 // ---- Clone
 
-TEST(SubStreams, CloneCopiesContentsAndSubStreams) {
+TEST(CztStreamBaseImp, CloneCopiesContentsAndSubStreams) {
   MemoryPtr source = MemoryOf("data");
   CztComPtr<IztStream> one = Made(source.get(), L"one", "first");
   Made(Nested(one).get(), L"deep", "d");
@@ -179,13 +179,13 @@ TEST(SubStreams, CloneCopiesContentsAndSubStreams) {
   target->Release();
 }
 
-TEST(SubStreams, CloneOfAnEmptyStreamWritesNothing) {
+TEST(CztStreamBaseImp, CloneOfAnEmptyStreamWritesNothing) {
   MemoryPtr target = NewMemory();
   EXPECT_EQ(NewMemory()->Clone(target.get()), S_OK);
   EXPECT_EQ(target->GetBuffer(), nullptr);
 }
 
-TEST(SubStreams, CloneOfAReadOnlyStreamCopiesAreaAndSubStreams) {
+TEST(CztStreamBaseImp, CloneOfAReadOnlyStreamCopiesAreaAndSubStreams) {
   std::string bytes = WithArea("data", {{L"one", "1"}});
   MemoryPtr source = NewMemory();
   source->AttachBuffer(reinterpret_cast<unsigned char*>(bytes.data()), bytes.size(), true);
@@ -195,7 +195,7 @@ TEST(SubStreams, CloneOfAReadOnlyStreamCopiesAreaAndSubStreams) {
   EXPECT_EQ(ContentsOf(target.get(), L"one"), "1");
 }
 
-TEST(SubStreams, CloneNeedsSubStreamsAndRoomInTheTarget) {
+TEST(CztStreamBaseImp, CloneNeedsSubStreamsAndRoomInTheTarget) {
   ForeignStream foreign;
   MemoryPtr source = MemoryOf("data");
   EXPECT_EQ(source->Clone(&foreign), E_FAIL);
@@ -227,7 +227,7 @@ int FailEach(Operation operation) {
   }
 }
 
-TEST(SubStreams, CreateWithoutMemoryMakesNothing) {
+TEST(CztStreamBaseImp, CreateWithoutMemoryMakesNothing) {
   int failures = FailEach([&](CztMemoryStream* stream) {
     CztComPtr<IztStream> out;
     return stream->CreateSubStream(L"one", out.out());
@@ -235,7 +235,7 @@ TEST(SubStreams, CreateWithoutMemoryMakesNothing) {
   EXPECT_EQ(failures, 2);  // the stream and its place in the map
 }
 
-TEST(SubStreams, CloneWithoutMemoryTellsIt) {
+TEST(CztStreamBaseImp, CloneWithoutMemoryTellsIt) {
   MemoryPtr source = MemoryOf("data");
   Made(source.get(), L"one", "1");
   int failures = FailEach([&](CztMemoryStream* target) { return source->Clone(target); });

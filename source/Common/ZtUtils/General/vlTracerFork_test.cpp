@@ -41,7 +41,7 @@ std::string LogIn(const std::string& directory) {
   return path;
 }
 
-TEST(TracerFork, ChildrenOfTracingThreadsTrace) {
+TEST(vlTracerFork, ChildrenOfTracingThreadsTrace) {
   if (!kCanForkWhileThreadsAllocate) GTEST_SKIP() << "the sanitizer's allocator is not fork-safe";
   TempDir dir;
   ExpectInChild(
@@ -70,7 +70,7 @@ TEST(TracerFork, ChildrenOfTracingThreadsTrace) {
 }
 
 // The thread is inside a write, with the log's mutex.
-TEST_IN_CHILD(TracerFork, ChildOfAForkDuringAWriteKeepsNoLock) {
+TEST_IN_CHILD(vlTracerFork, ChildOfAForkDuringAWriteKeepsNoLock) {
   TempDir dir;
   int ends[2];
   ASSERT_EQ(0, pipe(ends));
@@ -102,7 +102,7 @@ TEST_IN_CHILD(TracerFork, ChildOfAForkDuringAWriteKeepsNoLock) {
   waitpid(idle, nullptr, 0);
 }
 
-TEST_IN_CHILD(TracerDescriptor, HostsFileUnderItsNumberIsLeftAloneAndTheLogGoesOn) {
+TEST_IN_CHILD(vlTracerForkDescriptor, HostsFileUnderItsNumberIsLeftAloneAndTheLogGoesOn) {
   TempDir dir;
   Start(dir.makeDir("logs"));
   Say("one");
@@ -116,7 +116,7 @@ TEST_IN_CHILD(TracerDescriptor, HostsFileUnderItsNumberIsLeftAloneAndTheLogGoesO
   EXPECT_TRUE(hosts.unchanged());
 }
 
-TEST_IN_CHILD(TracerDescriptor, HostsFileUnderItsNumberOutlivesTheEnd) {
+TEST_IN_CHILD(vlTracerForkDescriptor, HostsFileUnderItsNumberOutlivesTheEnd) {
   TempDir dir;
   Start(dir.makeDir("logs"));
   Say("one");
@@ -126,7 +126,7 @@ TEST_IN_CHILD(TracerDescriptor, HostsFileUnderItsNumberOutlivesTheEnd) {
   EXPECT_TRUE(hosts.unchanged());
 }
 
-TEST_IN_CHILD(TracerDescriptor, ClosedOneIsOpenedAgain) {
+TEST_IN_CHILD(vlTracerForkDescriptor, ClosedOneIsOpenedAgain) {
   TempDir dir;
   Start(dir.makeDir("logs"));
   Say("one");
@@ -137,7 +137,7 @@ TEST_IN_CHILD(TracerDescriptor, ClosedOneIsOpenedAgain) {
 }
 
 // What such a host prints later goes to what it opens as its output, or nowhere.
-TEST(TracerDescriptor, IsNoneOfTheStandardStreams) {
+TEST(vlTracerForkDescriptor, IsNoneOfTheStandardStreams) {
   TempDir dir;
   EXPECT_EQ(0, Child([&] {
                  for (int fd = 0; fd <= 2; ++fd) close(fd);

@@ -38,7 +38,7 @@ std::vector<std::string> ComingNames(const std::string& directory) {
   return names;
 }
 
-TEST(Tracer, WhatOthersPutUnderTheLogsNameIsLeftAlone) {
+TEST(vlTracerHostile, WhatOthersPutUnderTheLogsNameIsLeftAlone) {
   for (bool pipe : {true, false}) {
     TempDir dir;
     std::string logs = dir.makeDir("logs"), errors = dir / "err", target = dir / "target";
@@ -75,7 +75,7 @@ std::string Emptied(int end) {
 }
 
 // Standard error is a pipe that nobody empties: its writer stands there with the lock.
-TEST(Tracer, TheEndDoesNotWaitForAWriteThatDoesNotEnd) {
+TEST(vlTracerHostile, TheEndDoesNotWaitForAWriteThatDoesNotEnd) {
   EXPECT_EQ(Child([] {
               int ends[2];
               if (pipe(ends) != 0) return 1;

@@ -66,7 +66,7 @@ void Start(int target, const wchar_t* directory, long threshold = 0) {
   vlTracer::Initialize(kMask, static_cast<vlTracer::TraceTarget>(target), directory, threshold);
 }
 
-TEST(Tracer, WritesNothingBeforeTheStartAndAfterTheEnd) {
+TEST(vlTracer, WritesNothingBeforeTheStartAndAfterTheEnd) {
   Traced t = Trace([](const std::wstring& directory) {
     vlt_vlTracer::TraceOutput(' ', "early", false);
     Start(7, directory.c_str());
@@ -79,7 +79,7 @@ TEST(Tracer, WritesNothingBeforeTheStartAndAfterTheEnd) {
   EXPECT_EQ(t.logName, "");
 }
 
-TEST(Tracer, LineGoesToEveryTarget) {
+TEST(vlTracer, LineGoesToEveryTarget) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(7, directory.c_str());
     vlt_vlTracer::TraceOutput('*', "text", false);
@@ -89,7 +89,7 @@ TEST(Tracer, LineGoesToEveryTarget) {
   EXPECT_EQ(t.out, "* text\n");
 }
 
-TEST(Tracer, FileNameHoldsTheStartAndTheProcess) {
+TEST(vlTracer, FileNameHoldsTheStartAndTheProcess) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(1, (directory + L"/").c_str());
     vlt_vlTracer::TraceOutput(' ', "x", false);
@@ -103,7 +103,7 @@ TEST(Tracer, FileNameHoldsTheStartAndTheProcess) {
   EXPECT_EQ(t.log, "  x\n  " + match[1].str() + "\n");
 }
 
-TEST(Tracer, DetailLineTellsThreadAndTime) {
+TEST(vlTracer, DetailLineTellsThreadAndTime) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(1, directory.c_str());
     vlt_vlTracer::TraceOutput(' ', "x", true);
@@ -113,7 +113,7 @@ TEST(Tracer, DetailLineTellsThreadAndTime) {
       << t.log;
 }
 
-TEST(Tracer, DetailLineIsThatOfTheCallingThreadAndOfNow) {
+TEST(vlTracer, DetailLineIsThatOfTheCallingThreadAndOfNow) {
   auto now = [] {
     char text[32];
     time_t seconds = time(nullptr);
@@ -140,7 +140,7 @@ TEST(Tracer, DetailLineIsThatOfTheCallingThreadAndOfNow) {
   EXPECT_GE(now(), match[3].str());
 }
 
-TEST(Tracer, LongTextIsCutTo2047BytesWithItsMarker) {
+TEST(vlTracer, LongTextIsCutTo2047BytesWithItsMarker) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(1, directory.c_str());
     vlt_vlTracer::TraceOutput('m', std::string(3000, 'x').c_str(), false);
@@ -150,7 +150,7 @@ TEST(Tracer, LongTextIsCutTo2047BytesWithItsMarker) {
   EXPECT_EQ(t.log, "m " + std::string(2045, 'x') + "\nm " + std::string(2045, 'y') + "\nm \n");
 }
 
-TEST(Tracer, NoTargetWritesNothing) {
+TEST(vlTracer, NoTargetWritesNothing) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(0, directory.c_str());
     if (vlt_vlTracer::GetTraceMask() != 2) _exit(1);
@@ -160,7 +160,7 @@ TEST(Tracer, NoTargetWritesNothing) {
   EXPECT_EQ(t.out + t.err + t.logName, "");
 }
 
-TEST(Tracer, WithoutADirectoryOnlyTheOtherTargetsWrite) {
+TEST(vlTracer, WithoutADirectoryOnlyTheOtherTargetsWrite) {
   Traced t = Trace([](const std::wstring&) {
     Start(1 | 4, nullptr);
     vlt_vlTracer::TraceOutput(' ', "x", false);
@@ -170,7 +170,7 @@ TEST(Tracer, WithoutADirectoryOnlyTheOtherTargetsWrite) {
   EXPECT_EQ(t.logName, "");
 }
 
-TEST(Tracer, ASecondStartChangesTheTargetAndNotTheFile) {
+TEST(vlTracer, ASecondStartChangesTheTargetAndNotTheFile) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(4, directory.c_str());
     vlt_vlTracer::TraceOutput(' ', "one", false);
@@ -186,7 +186,7 @@ TEST(Tracer, ASecondStartChangesTheTargetAndNotTheFile) {
   EXPECT_EQ(t.logName, "");
 }
 
-TEST(Tracer, ANewDirectoryOfASecondStartIsIgnored) {
+TEST(vlTracer, ANewDirectoryOfASecondStartIsIgnored) {
   TempDir other;
   Traced t = Trace([&](const std::wstring& directory) {
     Start(1, directory.c_str());
@@ -198,7 +198,7 @@ TEST(Tracer, ANewDirectoryOfASecondStartIsIgnored) {
   EXPECT_TRUE(std::filesystem::is_empty(other.path()));
 }
 
-TEST(Tracer, AStartAfterTheEndGoesOnInTheSameFile) {
+TEST(vlTracer, AStartAfterTheEndGoesOnInTheSameFile) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(1, directory.c_str());
     vlt_vlTracer::TraceOutput(' ', "one", false);
@@ -209,7 +209,7 @@ TEST(Tracer, AStartAfterTheEndGoesOnInTheSameFile) {
   EXPECT_EQ(t.log, "  one\n  two\n");
 }
 
-TEST(Tracer, ABackslashEndsADirectoryToo) {
+TEST(vlTracer, ABackslashEndsADirectoryToo) {
   TempDir dir;
   std::string name = dir / "logs\\";
   EXPECT_EQ(Child([&] {
@@ -226,7 +226,7 @@ TEST(Tracer, ABackslashEndsADirectoryToo) {
   EXPECT_TRUE(names[0].starts_with("logs\\2")) << names[0];
 }
 
-TEST(Tracer, AFailedLockDoesNotStopTheOutput) {
+TEST(vlTracer, AFailedLockDoesNotStopTheOutput) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(1, directory.c_str());
     vlt_vlTracer::TraceOutput(' ', "one", false);
@@ -237,7 +237,7 @@ TEST(Tracer, AFailedLockDoesNotStopTheOutput) {
   EXPECT_TRUE(std::regex_match(t.log, std::regex("  one\n  two\n  Thread = .*\n"))) << t.log;
 }
 
-TEST(Tracer, LinesAreInTheFileWhenTheCallReturns) {
+TEST(vlTracer, LinesAreInTheFileWhenTheCallReturns) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(1, directory.c_str());
     vlt_vlTracer::TraceOutput(' ', "x", false);
@@ -247,7 +247,7 @@ TEST(Tracer, LinesAreInTheFileWhenTheCallReturns) {
   EXPECT_EQ(t.log, "  x\n");
 }
 
-TEST(Tracer, ADirectoryThatAppearsLaterGetsTheLog) {
+TEST(vlTracer, ADirectoryThatAppearsLaterGetsTheLog) {
   TempDir dir;
   std::string logs = dir / "later";
   EXPECT_EQ(Child([&] {
@@ -263,7 +263,7 @@ TEST(Tracer, ADirectoryThatAppearsLaterGetsTheLog) {
   }
 }
 
-TEST(Tracer, ADiskThatIsShortAtTheFirstLineLeavesNoFileAndNoMessage) {
+TEST(vlTracer, ADiskThatIsShortAtTheFirstLineLeavesNoFileAndNoMessage) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(1 | 4, directory.c_str(), INT32_MAX);
     Start(1 | 4, directory.c_str(), static_cast<long>(~0ul >> 1));
@@ -276,7 +276,7 @@ TEST(Tracer, ADiskThatIsShortAtTheFirstLineLeavesNoFileAndNoMessage) {
   EXPECT_EQ(t.err, "  x\n  y\n");
 }
 
-TEST(Tracer, ADiskThatBecomesShortEndsTheFileWithAMessage) {
+TEST(vlTracer, ADiskThatBecomesShortEndsTheFileWithAMessage) {
   if (sizeof(long) == 4) GTEST_SKIP() << "a 32-bit limit may be below what the disk has";
   Traced t = Trace([](const std::wstring& directory) {
     Start(1 | 4, directory.c_str(), 1);
@@ -291,7 +291,7 @@ TEST(Tracer, ADiskThatBecomesShortEndsTheFileWithAMessage) {
   EXPECT_EQ(t.err, "  one\n" + kDiskShort + "  three\n  four\n");
 }
 
-TEST(Tracer, AFullSmallFileSystemStopsTheLog) {
+TEST(vlTracer, AFullSmallFileSystemStopsTheLog) {
   TempDir dir;
   std::string logs = dir.makeDir("small"), err = dir / "err";
   Child child([&] {
@@ -327,7 +327,7 @@ TEST(Tracer, AFullSmallFileSystemStopsTheLog) {
 }
 
 // Without a limit nothing is looked at: lines that find no room are lost, and nobody hears of it.
-TEST(Tracer, AFullFileSystemWithoutALimitIsSilent) {
+TEST(vlTracer, AFullFileSystemWithoutALimitIsSilent) {
   TempDir dir;
   std::string logs = dir.makeDir("small");
   int result = Child([&] {
@@ -346,7 +346,7 @@ TEST(Tracer, AFullFileSystemWithoutALimitIsSilent) {
   EXPECT_EQ(result, 0);
 }
 
-TEST(Tracer, ThresholdOfTheOptionsNeverTurnsNegative) {
+TEST(vlTracer, ThresholdOfTheOptionsNeverTurnsNegative) {
   EXPECT_EQ(vlTracer::Threshold(0), 0);
   EXPECT_EQ(vlTracer::Threshold(2147483647u), 2147483647);
   for (uint32_t bytes : {2147483648u, 4294967295u}) {
@@ -354,12 +354,12 @@ TEST(Tracer, ThresholdOfTheOptionsNeverTurnsNegative) {
   }
 }
 
-TEST(Tracer, FreeSpaceOfAMissingPathIsMinusOne) {
+TEST(vlTracer, FreeSpaceOfAMissingPathIsMinusOne) {
   EXPECT_EQ(CalcFreeSpace("/no/such/path"), -1);
   EXPECT_GT(CalcFreeSpace("/"), 0);
 }
 
-TEST(Tracer, TwoThreadsNeverInterleaveTheirLines) {
+TEST(vlTracer, TwoThreadsNeverInterleaveTheirLines) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(1, directory.c_str());
     std::vector<std::thread> threads;
@@ -385,7 +385,7 @@ TEST(Tracer, TwoThreadsNeverInterleaveTheirLines) {
   for (const auto& [marker, ids] : threads) EXPECT_EQ(ids.size(), 1u) << marker;
 }
 
-TEST(Tracer, ObjectsTellTheirCall) {
+TEST(vlTracer, ObjectsTellTheirCall) {
   Traced t = Trace([](const std::wstring& directory) {
     Start(1, directory.c_str());
     vlTracer0 none('>', "NoArguments");
@@ -408,7 +408,7 @@ TEST(Tracer, ObjectsTellTheirCall) {
       << t.log;
 }
 
-TEST(Tracer, ObjectTextIsCutToTheBuffer) {
+TEST(vlTracer, ObjectTextIsCutToTheBuffer) {
   std::string name(2000, 'n');
   vlTracer0 object('>', name.c_str());
   char buffer[16];
@@ -419,7 +419,7 @@ TEST(Tracer, ObjectTextIsCutToTheBuffer) {
 
 std::wstring g_callbackDirectory;
 
-TEST(Tracer, APendingCallbackStartsTheLogWhenTheMaskIsAsked) {
+TEST(vlTracer, APendingCallbackStartsTheLogWhenTheMaskIsAsked) {
   Traced t = Trace([](const std::wstring& directory) {
     g_callbackDirectory = directory;
     vlTracer::Initialize([] { Start(1, g_callbackDirectory.c_str()); });

@@ -180,14 +180,14 @@ std::vector<Call> FileCalls(const std::string& file) {
            keepsItsData}};
 }
 
-class StreamMemory : public testing::TestWithParam<bool> {
+class ztStreamMemory : public testing::TestWithParam<bool> {
  protected:
   void SetUp() override {
     if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer has a malloc of its own";
   }
 };
 
-TEST_P(StreamMemory, EveryOperationSurvivesEveryFailedAllocation) {
+TEST_P(ztStreamMemory, EveryOperationSurvivesEveryFailedAllocation) {
   TempDir dir;
   WriteBytes(dir / "file", NestedBytes());
   std::vector<Call> calls = MemoryCalls();
@@ -210,7 +210,7 @@ TEST_P(StreamMemory, EveryOperationSurvivesEveryFailedAllocation) {
   EXPECT_GT(total, 200);
 }
 
-INSTANTIATE_TEST_SUITE_P(Failures, StreamMemory, testing::Bool(),
+INSTANTIATE_TEST_SUITE_P(Failures, ztStreamMemory, testing::Bool(),
                          [](const auto& info) { return info.param ? "ForEver" : "Once"; });
 
 // ---- What is cut leaves nothing
@@ -224,7 +224,7 @@ long Left(const std::string& bytes, ReadOne read) {
   return heap::g_live - before;
 }
 
-TEST(StreamMemoryOfCutInput, AreasLeaveNothing) {
+TEST(ztStreamMemoryOfCutInput, AreasLeaveNothing) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer counts its own blocks, and tells of leaks";
   std::string area = NestedBytes().substr(0, NestedBytes().size() - 24);
   EXPECT_EQ(Left(area,
@@ -235,7 +235,7 @@ TEST(StreamMemoryOfCutInput, AreasLeaveNothing) {
             0);
 }
 
-TEST(StreamMemoryOfCutInput, TypedValuesLeaveNothing) {
+TEST(ztStreamMemoryOfCutInput, TypedValuesLeaveNothing) {
   if (!kCanLimitMemory) GTEST_SKIP() << "the sanitizer counts its own blocks, and tells of leaks";
   for (Order order : {Order::Little, Order::Big}) {
     std::string bytes = Header(1, 2, 3, order) + LongNumber(100, order) + std::string(100, 't') +

@@ -28,7 +28,7 @@ Thrown Loading(const std::string& bytes) {
 
 // ---- Writing
 
-TEST(SubStreamArea, BytesOfOneSubStream) {
+TEST(ztSubStreamArea, BytesOfOneSubStream) {
   MemoryPtr stream = MemoryOf("data");
   Made(stream.get(), L"a\u00E9", "xyz");
   EXPECT_EQ(stream->WriteSubStreamInfo(), S_OK);
@@ -42,7 +42,7 @@ TEST(SubStreamArea, BytesOfOneSubStream) {
   EXPECT_EQ(Count(stream.get()), 0u);  // forgotten
 }
 
-TEST(SubStreamArea, SubStreamsComeOutSortedByName) {
+TEST(ztSubStreamArea, SubStreamsComeOutSortedByName) {
   MemoryPtr stream = NewMemory();
   for (const wchar_t* name : {L"z", L"B", L"a"}) Made(stream.get(), name, "1");
   stream->WriteSubStreamInfo();
@@ -50,7 +50,7 @@ TEST(SubStreamArea, SubStreamsComeOutSortedByName) {
             WithArea("", {{L"a", "1"}, {L"B", "1"}, {L"z", "1"}}, Width::Writer));
 }
 
-TEST(SubStreamArea, NestedAreasAreCompleteInTheParents) {
+TEST(ztSubStreamArea, NestedAreasAreCompleteInTheParents) {
   MemoryPtr stream = MemoryOf("outer");
   CztComPtr<IztStream> one = Made(stream.get(), L"one", "inner");
   Made(Nested(one).get(), L"deep", "core");
@@ -62,7 +62,7 @@ TEST(SubStreamArea, NestedAreasAreCompleteInTheParents) {
 }
 
 // The same bytes on both word sizes.
-TEST(SubStreamArea, BytesOfNestedAreas) {
+TEST(ztSubStreamArea, BytesOfNestedAreas) {
   MemoryPtr stream = MemoryOf("o");
   Made(Nested(Made(stream.get(), L"s", "i")).get(), L"d", "c");
   EXPECT_EQ(stream->WriteSubStreamInfo(), S_OK);
@@ -77,7 +77,7 @@ TEST(SubStreamArea, BytesOfNestedAreas) {
             "A1 BB 00 D3 D6 C3 CF 47 B7 52 CB 9F FD 8A BC CC 01 00 00 00 00 00 00 00 ");
 }
 
-TEST(SubStreamArea, TheAreaStandsAtTheEndWhereverTheCursorIs) {
+TEST(ztSubStreamArea, TheAreaStandsAtTheEndWhereverTheCursorIs) {
   MemoryPtr stream = MemoryOf("data");
   Made(stream.get(), L"a", "1");
   stream->Seek(1, ztSeekBegin, nullptr);
@@ -85,7 +85,7 @@ TEST(SubStreamArea, TheAreaStandsAtTheEndWhereverTheCursorIs) {
   EXPECT_EQ(Contents(stream.get()), WithArea("data", {{L"a", "1"}}, Width::Writer));
 }
 
-TEST(SubStreamArea, ASecondWriteDoesNothing) {
+TEST(ztSubStreamArea, ASecondWriteDoesNothing) {
   MemoryPtr stream = MemoryOf("data");
   Made(stream.get(), L"a", "1");
   stream->WriteSubStreamInfo();
@@ -96,7 +96,7 @@ TEST(SubStreamArea, ASecondWriteDoesNothing) {
   EXPECT_EQ(Count(stream.get()), 1u);
 }
 
-TEST(SubStreamArea, AWriteOfNoneCountsAsTheOne) {
+TEST(ztSubStreamArea, AWriteOfNoneCountsAsTheOne) {
   MemoryPtr stream = MemoryOf("data");
   EXPECT_EQ(stream->WriteSubStreamInfo(), S_OK);
   Made(stream.get(), L"a", "1");
@@ -104,7 +104,7 @@ TEST(SubStreamArea, AWriteOfNoneCountsAsTheOne) {
   EXPECT_EQ(Contents(stream.get()), "data");
 }
 
-TEST(SubStreamArea, ASubStreamBeyond31BitsIsRefusedAndNothingIsLeft) {
+TEST(ztSubStreamArea, ASubStreamBeyond31BitsIsRefusedAndNothingIsLeft) {
   if (!kLongIs8) GTEST_SKIP() << "no address space for such a block";
   MemoryPtr stream = MemoryOf("data");
   Made(stream.get(), L"a", "1");
@@ -121,7 +121,7 @@ TEST(SubStreamArea, ASubStreamBeyond31BitsIsRefusedAndNothingIsLeft) {
 
 // ---- Reading
 
-TEST(SubStreamArea, AreasWithLongNameLengthsLoad) {
+TEST(ztSubStreamArea, AreasWithLongNameLengthsLoad) {
   for (Order order : {Order::Little, Order::Big}) {
     MemoryPtr stream = Attached(
         WithArea("data", {{L"a\u00E9", "xyz"}, {L"", ""}, {L"big", std::string(1000, 'b')}},
@@ -135,7 +135,7 @@ TEST(SubStreamArea, AreasWithLongNameLengthsLoad) {
   }
 }
 
-TEST(SubStreamArea, NestedAreasLoadAtOnce) {
+TEST(ztSubStreamArea, NestedAreasLoadAtOnce) {
   std::string core = WithArea("core", {{L"deepest", "!"}}, Width::Reader, Order::Big);
   std::string inner = WithArea("inner", {{L"deep", core}});
   MemoryPtr stream = Attached(WithArea("outer", {{L"one", inner}, {L"two", "2"}}));
@@ -147,7 +147,7 @@ TEST(SubStreamArea, NestedAreasLoadAtOnce) {
   EXPECT_EQ(ContentsOf(Nested(deep).get(), L"deepest"), "!");
 }
 
-TEST(SubStreamArea, OwnAreasReadBackWhereLongIsFourBytes) {
+TEST(ztSubStreamArea, OwnAreasReadBackWhereLongIsFourBytes) {
   MemoryPtr stream = MemoryOf("data");
   CztComPtr<IztStream> one = Made(stream.get(), L"one", "first");
   Made(Nested(one).get(), L"deep", "d");
@@ -166,13 +166,13 @@ TEST(SubStreamArea, OwnAreasReadBackWhereLongIsFourBytes) {
   EXPECT_EQ(Contents(again.get()), bytes);
 }
 
-TEST(SubStreamArea, OfEqualNamesTheLaterCounts) {
+TEST(ztSubStreamArea, OfEqualNamesTheLaterCounts) {
   MemoryPtr stream = Attached(WithArea("", {{L"Name", "1"}, {L"other", "x"}, {L"nAME", "2"}}));
   EXPECT_EQ(Count(stream.get()), 2u);
   EXPECT_EQ(ContentsOf(stream.get(), L"name"), "2");
 }
 
-TEST(SubStreamArea, TheCursorComesBack) {
+TEST(ztSubStreamArea, TheCursorComesBack) {
   MemoryPtr stream = MemoryOf(WithArea("data", {{L"a", "1"}}));
   stream->Seek(2, ztSeekBegin, nullptr);
   EXPECT_EQ(stream->LoadSubStreamInfo(1), S_OK);
@@ -181,7 +181,7 @@ TEST(SubStreamArea, TheCursorComesBack) {
   EXPECT_EQ(Count(stream.get()), 1u);
 }
 
-TEST(SubStreamArea, NotWritableLeavesTheArea) {
+TEST(ztSubStreamArea, NotWritableLeavesTheArea) {
   std::string bytes = WithArea("data", {{L"a", "1"}});
   MemoryPtr stream = MemoryOf(bytes);
   EXPECT_EQ(stream->LoadSubStreamInfo(0), S_OK);
@@ -190,7 +190,7 @@ TEST(SubStreamArea, NotWritableLeavesTheArea) {
   EXPECT_EQ(stream->DeleteSubStream(L"a"), E_FAIL);
 }
 
-TEST(SubStreamArea, WithoutATrailerThereAreNone) {
+TEST(ztSubStreamArea, WithoutATrailerThereAreNone) {
   std::string trailer = Trailer(0);
   for (const std::string& bytes :
        {std::string(), std::string("a"), trailer, trailer.substr(1), std::string(25, 'x'),
@@ -204,13 +204,13 @@ TEST(SubStreamArea, WithoutATrailerThereAreNone) {
   }
 }
 
-TEST(SubStreamArea, AnAreaAtTheStartLeavesNoData) {
+TEST(ztSubStreamArea, AnAreaAtTheStartLeavesNoData) {
   MemoryPtr stream = Attached(WithArea("", {{L"a", "1"}}));
   EXPECT_EQ(stream->GetBuffer(), nullptr);
   EXPECT_EQ(ContentsOf(stream.get(), L"a"), "1");
 }
 
-TEST(SubStreamArea, ACountOfNoneIsAnEmptyArea) {
+TEST(ztSubStreamArea, ACountOfNoneIsAnEmptyArea) {
   MemoryPtr stream = Attached(WithArea("data", {}));
   EXPECT_EQ(Contents(stream.get()), "data");
   EXPECT_EQ(Count(stream.get()), 0u);
@@ -218,7 +218,7 @@ TEST(SubStreamArea, ACountOfNoneIsAnEmptyArea) {
 
 // ---- Damage
 
-TEST(SubStreamArea, OffsetsThatCannotBe) {
+TEST(ztSubStreamArea, OffsetsThatCannotBe) {
   for (int64_t offset : {int64_t{-2}, INT64_MIN, INT64_MAX, int64_t{1000}, int64_t{92}}) {
     EXPECT_EQ(Loading(std::string(100, 'd') + Trailer(offset)), Thrown::Stream) << offset;
   }
@@ -226,7 +226,7 @@ TEST(SubStreamArea, OffsetsThatCannotBe) {
   EXPECT_EQ(Loading(std::string(100, '\0') + Trailer(87)), Thrown::EndOfStream);  // no count
 }
 
-TEST(SubStreamArea, CountsAndLengthsThatCannotBe) {
+TEST(ztSubStreamArea, CountsAndLengthsThatCannotBe) {
   const std::string head = Header(1), end = Trailer(0);
   const std::string name = LongNumber(1) + std::string("a\0\0\0", 4);
   struct Row {
@@ -254,7 +254,7 @@ TEST(SubStreamArea, CountsAndLengthsThatCannotBe) {
   }
 }
 
-TEST_IN_CHILD(SubStreamArea, HostileLengthsTakeNoMemory) {
+TEST_IN_CHILD(ztSubStreamArea, HostileLengthsTakeNoMemory) {
   if (kCanLimitMemory) LimitMemoryTo(32 << 20);
   EXPECT_EQ(Loading(Header(1) + Number(1, 4) + LongNumber(0) + Number(0x7FFFFFFF, 4) + Trailer(0)),
             Thrown::Stream);
@@ -263,7 +263,7 @@ TEST_IN_CHILD(SubStreamArea, HostileLengthsTakeNoMemory) {
 }
 
 // The area cut after each of its bytes, with an intact trailer behind the cut.
-TEST(SubStreamArea, EveryTruncationPointThrows) {
+TEST(ztSubStreamArea, EveryTruncationPointThrows) {
   std::string nested = WithArea("n", {{L"deep", "d"}});
   for (Order order : {Order::Little, Order::Big}) {
     std::string whole = WithArea("data", {{L"a", "xyz"}, {L"bc", nested}}, Width::Reader, order);
@@ -277,7 +277,7 @@ TEST(SubStreamArea, EveryTruncationPointThrows) {
 }
 
 // Which of the two exceptions, by the value that the cut goes through.
-TEST(SubStreamArea, EveryTruncationPointGivesItsException) {
+TEST(ztSubStreamArea, EveryTruncationPointGivesItsException) {
   const size_t lengthEnd = 17 + sizeof(unsigned long), nameEnd = lengthEnd + 4;
   for (Order order : {Order::Little, Order::Big}) {
     std::string area = Area({{L"a", "xyz"}}, 0, Width::Reader, order);
@@ -294,20 +294,20 @@ TEST(SubStreamArea, EveryTruncationPointGivesItsException) {
   }
 }
 
-TEST(SubStreamArea, EveryTruncationOfTheWholeIsWithoutSubStreams) {
+TEST(ztSubStreamArea, EveryTruncationOfTheWholeIsWithoutSubStreams) {
   std::string whole = WithArea("data", {{L"a", "xyz"}});
   for (size_t size = 0; size < whole.size(); ++size) {
     EXPECT_EQ(MemoryOf(whole.substr(0, size))->LoadSubStreamInfo(1), S_FALSE) << size;
   }
 }
 
-TEST(SubStreamArea, DamageInANestedAreaFailsTheWhole) {
+TEST(ztSubStreamArea, DamageInANestedAreaFailsTheWhole) {
   std::string damaged = "inner" + Trailer(1000);
   EXPECT_EQ(Loading(WithArea("outer", {{L"a", "1"}, {L"b", damaged}})), Thrown::Stream);
 }
 
 // Every byte of a valid area changed to each of a few values: an exception or a load, no more.
-TEST(SubStreamArea, ChangedBytesNeverBreakTheReader) {
+TEST(ztSubStreamArea, ChangedBytesNeverBreakTheReader) {
   std::string whole = WithArea("data", {{L"a", "xyz"}, {L"bc", WithArea("n", {{L"d", "e"}})}});
   int loaded = 0, refused = 0;
   for (size_t at = 0; at < whole.size(); ++at) {
@@ -329,7 +329,7 @@ std::string NestedBytes(unsigned levels, const std::string& core) {
   return bytes;
 }
 
-TEST(SubStreamArea, AreasNestUpToTheLimit) {
+TEST(ztSubStreamArea, AreasNestUpToTheLimit) {
   EXPECT_EQ(Loading(NestedBytes(CztStreamBaseImp::kDeepestArea, "core")), Thrown::Nothing);
   EXPECT_EQ(Loading(NestedBytes(CztStreamBaseImp::kDeepestArea + 1, "core")), Thrown::Stream);
 }
@@ -345,13 +345,13 @@ std::string DeepBytes(unsigned levels) {
   return bytes;
 }
 
-TEST_IN_CHILD(SubStreamArea, DeepNestingNeitherOverflowsTheStackNorTheMemory) {
+TEST_IN_CHILD(ztSubStreamArea, DeepNestingNeitherOverflowsTheStackNorTheMemory) {
   EXPECT_EQ(Loading(DeepBytes(3)), Thrown::Nothing);
   if (kCanLimitMemory) LimitMemoryTo(64 << 20);
   EXPECT_EQ(Loading(DeepBytes(20000)), Thrown::Stream);
 }
 
-TEST(SubStreamArea, TooDeepIsNotWrittenEither) {
+TEST(ztSubStreamArea, TooDeepIsNotWrittenEither) {
   MemoryPtr stream = MemoryOf("data");
   CztComPtr<IztStream> last = Made(stream.get(), L"", "");
   for (unsigned i = 1; i < CztStreamBaseImp::kDeepestArea; ++i) {
@@ -370,7 +370,7 @@ TEST(SubStreamArea, TooDeepIsNotWrittenEither) {
   EXPECT_EQ(Contents(deeper.get()), "");
 }
 
-TEST(SubStreamArea, ManySubStreamsLoadInProportion) {
+TEST(ztSubStreamArea, ManySubStreamsLoadInProportion) {
   std::string area = Header(1) + Number(100000, 4);
   for (uint32_t i = 0; i < 100000; ++i) {
     std::wstring name = std::to_wstring(i);
@@ -382,7 +382,7 @@ TEST(SubStreamArea, ManySubStreamsLoadInProportion) {
 
 // ---- Memory runs out
 
-TEST(SubStreamArea, LoadingWithoutMemoryLeavesTheStream) {
+TEST(ztSubStreamArea, LoadingWithoutMemoryLeavesTheStream) {
   std::string bytes = WithArea("data", {{L"a", WithArea("1", {{L"deep", "d"}})}, {L"b", "2"}});
   int failures = 0;
   for (int nth = 1;; ++nth) {

@@ -49,14 +49,14 @@ struct Described : CztSyncObject {
   bool pumps() const { return m_pumpMsgs; }
 };
 
-TEST(Sync, BaseKeepsThePumpFlagWhichBeginsFalse) {
+TEST(ztSync, BaseKeepsThePumpFlagWhichBeginsFalse) {
   Described object;
   EXPECT_FALSE(object.pumps());
   object.SetPumpMsgs(true);
   EXPECT_TRUE(object.pumps());
 }
 
-TEST(Sync, LocksAndUnlocksThroughTheBase) {
+TEST(ztSync, LocksAndUnlocksThroughTheBase) {
   Described object;
   CztSyncObject& lock = object;
   EXPECT_TRUE(lock.Lock(-1));
@@ -67,7 +67,7 @@ TEST(Sync, LocksAndUnlocksThroughTheBase) {
 
 // ---- CztCS
 
-TEST(SyncCS, IsRecursiveAndExcludesOtherThreads) {
+TEST(ztSyncCS, IsRecursiveAndExcludesOtherThreads) {
   CztCS section;
   EXPECT_TRUE(section.Lock(0));
   EXPECT_TRUE(section.Lock(-1));
@@ -87,7 +87,7 @@ TEST(SyncCS, IsRecursiveAndExcludesOtherThreads) {
 
 // ---- CztMutex
 
-TEST(SyncMutex, NullAndEmptyNamesAreOneAcrossProcesses) {
+TEST(ztSyncMutex, NullAndEmptyNamesAreOneAcrossProcesses) {
   EventPlace place;
   CztMutex null(nullptr, false), named(L"UNNAMED_MUTEX", false);
   null.Lock(-1);
@@ -109,7 +109,7 @@ TEST(SyncMutex, NullAndEmptyNamesAreOneAcrossProcesses) {
   EXPECT_EQ(0, another.wait());
 }
 
-TEST(SyncMutex, LockOfZeroBlocks) {
+TEST(ztSyncMutex, LockOfZeroBlocks) {
   EventPlace place;
   CztMutex mutex(L"name", true);
   Child other([] { return CztMutex(L"name", false).Lock(0) ? 0 : 1; });
@@ -118,7 +118,7 @@ TEST(SyncMutex, LockOfZeroBlocks) {
   EXPECT_EQ(0, other.wait());
 }
 
-TEST(SyncMutex, InitiallyOwnedAndRecursive) {
+TEST(ztSyncMutex, InitiallyOwnedAndRecursive) {
   EventPlace place;
   CztMutex mutex(true, L"name", true);
   EXPECT_TRUE(mutex.Lock(5));
@@ -129,7 +129,7 @@ TEST(SyncMutex, InitiallyOwnedAndRecursive) {
   EXPECT_EQ(0, other.wait());
 }
 
-TEST(SyncMutex, FailureOfThePrimitivePassesThrough) {
+TEST(ztSyncMutex, FailureOfThePrimitivePassesThrough) {
   EventPlace place;
   const std::string name(256, 'n');
   EXPECT_EQ(ENAMETOOLONG, PosixErrorOf([&] { CztMutex m(String(name.c_str()).c_str(), true); }));
@@ -137,7 +137,7 @@ TEST(SyncMutex, FailureOfThePrimitivePassesThrough) {
 
 // ---- CztEvent
 
-TEST(SyncEvent, LockOfAnUnsetEventIsTrueAfterItsTime) {
+TEST(ztSyncEvent, LockOfAnUnsetEventIsTrueAfterItsTime) {
   CztEvent event("name", false, true);
   auto begin = Clock::now();
   EXPECT_TRUE(event.Lock(100));
@@ -145,7 +145,7 @@ TEST(SyncEvent, LockOfAnUnsetEventIsTrueAfterItsTime) {
   EXPECT_TRUE(event.Lock(0));
 }
 
-TEST(SyncEvent, InitialStateComesBeforeManualReset) {
+TEST(ztSyncEvent, InitialStateComesBeforeManualReset) {
   auto begin = Clock::now();
   CztEvent set("name", true, true);
   EXPECT_TRUE(set.Lock(20000));
@@ -158,7 +158,7 @@ TEST(SyncEvent, InitialStateComesBeforeManualReset) {
   EXPECT_GE(MsSince(begin), 49);
 }
 
-TEST(SyncEvent, UnlockSetsAndEndsAWaitWithoutLimit) {
+TEST(ztSyncEvent, UnlockSetsAndEndsAWaitWithoutLimit) {
   CztEvent event(nullptr, false, false);
   std::atomic<bool> released{false};
   WatchedThread waiter([&] {
@@ -171,7 +171,7 @@ TEST(SyncEvent, UnlockSetsAndEndsAWaitWithoutLimit) {
   waiter.join();
 }
 
-TEST(SyncEvent, OtherNegativeTimeoutsAreLongOnes) {
+TEST(ztSyncEvent, OtherNegativeTimeoutsAreLongOnes) {
   CztEvent event("name", false, false);
   std::atomic<bool> released{false};
   WatchedThread waiter([&] {
@@ -191,7 +191,7 @@ TEST(SyncEvent, OtherNegativeTimeoutsAreLongOnes) {
 
 // ---- CztSemaphore
 
-TEST(SyncSemaphore, ReleaseClampsToTheMaximumAndTellsTheOldCount) {
+TEST(ztSyncSemaphore, ReleaseClampsToTheMaximumAndTellsTheOldCount) {
   CztSemaphore semaphore(L"name", 2, 1);
   EXPECT_EQ(1, semaphore.Release(5));
   EXPECT_EQ(2, semaphore.Release(0));
@@ -199,7 +199,7 @@ TEST(SyncSemaphore, ReleaseClampsToTheMaximumAndTellsTheOldCount) {
   EXPECT_EQ(2, semaphore.Release(1));
 }
 
-TEST(SyncSemaphore, FullFromTheBeginDoesNotWait) {
+TEST(ztSyncSemaphore, FullFromTheBeginDoesNotWait) {
   CztSemaphore semaphore(L"name", 2, 2);
   auto begin = Clock::now();
   EXPECT_TRUE(semaphore.Lock(20000));
@@ -208,7 +208,7 @@ TEST(SyncSemaphore, FullFromTheBeginDoesNotWait) {
   EXPECT_EQ(0, semaphore.Release(0));
 }
 
-TEST(SyncSemaphore, TimeoutLimitsEachWaitAndNotTheCall) {
+TEST(ztSyncSemaphore, TimeoutLimitsEachWaitAndNotTheCall) {
   CztSemaphore semaphore(nullptr, 1, 0);
   std::atomic<bool> got{false};
   WatchedThread waiter([&] {
@@ -225,7 +225,7 @@ TEST(SyncSemaphore, TimeoutLimitsEachWaitAndNotTheCall) {
 }
 
 // A wait of no time at all, again and again, would keep a processor busy.
-TEST(SyncSemaphore, TimeoutOfNothingSleepsUntilThereIsAUnit) {
+TEST(ztSyncSemaphore, TimeoutOfNothingSleepsUntilThereIsAUnit) {
   CztSemaphore semaphore(nullptr, 1, 0);
   WatchedThread waiter([&] { EXPECT_TRUE(semaphore.Lock(0)); });
   EXPECT_TRUE(waiter.blocksInLock());
@@ -234,7 +234,7 @@ TEST(SyncSemaphore, TimeoutOfNothingSleepsUntilThereIsAUnit) {
   EXPECT_EQ(0, semaphore.Release(0));
 }
 
-TEST(SyncSemaphore, ReleaseWakesAsManyAsThereAreUnits) {
+TEST(ztSyncSemaphore, ReleaseWakesAsManyAsThereAreUnits) {
   CztSemaphore semaphore(L"name", 10, 0);
   std::atomic<int> got{0};
   std::vector<std::unique_ptr<WatchedThread>> waiters;
@@ -259,7 +259,7 @@ TEST(SyncSemaphore, ReleaseWakesAsManyAsThereAreUnits) {
 }
 
 // A set event with nothing to take would keep the waiter awake.
-TEST(SyncSemaphore, ReleaseOfNothingLeavesWaitersAsleep) {
+TEST(ztSyncSemaphore, ReleaseOfNothingLeavesWaitersAsleep) {
   CztSemaphore semaphore(L"name", 10, 0);
   std::promise<clockid_t> clock;
   std::thread waiter([&] {
@@ -279,7 +279,7 @@ TEST(SyncSemaphore, ReleaseOfNothingLeavesWaitersAsleep) {
   waiter.join();
 }
 
-TEST(SyncSemaphore, NegativeReleasesAreDebts) {
+TEST(ztSyncSemaphore, NegativeReleasesAreDebts) {
   CztSemaphore semaphore(L"name", 5, 1);
   EXPECT_EQ(1, semaphore.Release(-3));
   EXPECT_EQ(-2, semaphore.Release(std::numeric_limits<int>::min()));
@@ -289,7 +289,7 @@ TEST(SyncSemaphore, NegativeReleasesAreDebts) {
   EXPECT_EQ(0, semaphore.Release(0));
 }
 
-TEST(SyncSemaphore, UnitsAreNeitherLostNorMade) {
+TEST(ztSyncSemaphore, UnitsAreNeitherLostNorMade) {
   CztSemaphore semaphore(L"name", 3, 3);
   std::atomic<int> inside{0}, most{0};
   std::vector<std::thread> threads;
@@ -315,7 +315,7 @@ TEST(SyncSemaphore, UnitsAreNeitherLostNorMade) {
 
 using zt::fnd::osdep::NamedEvent;
 
-TEST(SyncStatefulMutex, OthersSeeInTheEventWhetherItIsHeld) {
+TEST(ztSyncStatefulMutex, OthersSeeInTheEventWhetherItIsHeld) {
   EventPlace place;
   CztStatefulMutex mutex(L"name");
   Keeper observer([] { return std::make_unique<NamedEvent>(L"name-event", true, false); });
@@ -329,7 +329,7 @@ TEST(SyncStatefulMutex, OthersSeeInTheEventWhetherItIsHeld) {
   EXPECT_FALSE(event.checkOnly());
 }
 
-TEST(SyncStatefulMutex, NamesOfItsParts) {
+TEST(ztSyncStatefulMutex, NamesOfItsParts) {
   EventPlace place;
   CztStatefulMutex mutex(L"name");
   EXPECT_EQ((std::vector<std::string>{"name-event", "sem_1"}), place.files());
@@ -337,7 +337,7 @@ TEST(SyncStatefulMutex, NamesOfItsParts) {
       vlt::test::Exists(std::string(getenv("ZTFNDTMPSHAREDFILEDIR")) + "/mutex/name-mutex"));
 }
 
-TEST(SyncStatefulMutex, LockWithoutStateLeavesTheEventAlone) {
+TEST(ztSyncStatefulMutex, LockWithoutStateLeavesTheEventAlone) {
   EventPlace place;
   CztStatefulMutex mutex(L"name");
   NamedEvent event(L"name-event", true, false);
@@ -351,7 +351,7 @@ TEST(SyncStatefulMutex, LockWithoutStateLeavesTheEventAlone) {
   EXPECT_TRUE(event.checkOnly());
 }
 
-TEST(SyncStatefulMutex, WaitOfZeroTries) {
+TEST(ztSyncStatefulMutex, WaitOfZeroTries) {
   EventPlace place;
   CztStatefulMutex mutex(L"name");
   EXPECT_TRUE(mutex.LockAndSetState(true, 0));
@@ -366,7 +366,7 @@ TEST(SyncStatefulMutex, WaitOfZeroTries) {
   EXPECT_EQ(0, next.wait());
 }
 
-TEST(SyncStatefulMutex, AnyOtherWaitIsWithoutLimit) {
+TEST(ztSyncStatefulMutex, AnyOtherWaitIsWithoutLimit) {
   EventPlace place;
   CztStatefulMutex mutex(L"name");
   mutex.Lock(-1);
@@ -377,7 +377,7 @@ TEST(SyncStatefulMutex, AnyOtherWaitIsWithoutLimit) {
   EXPECT_EQ(0, other.wait());
 }
 
-TEST(SyncStatefulMutex, HolderThatDiesLeavesTheLockFreeAndTheEventSet) {
+TEST(ztSyncStatefulMutex, HolderThatDiesLeavesTheLockFreeAndTheEventSet) {
   EventPlace place;
   NamedEvent event(L"name-event", true, false);
   Keeper holder([] {
@@ -395,7 +395,7 @@ TEST(SyncStatefulMutex, HolderThatDiesLeavesTheLockFreeAndTheEventSet) {
   EXPECT_FALSE(event.checkOnly());
 }
 
-TEST(SyncStatefulMutex, EventThatFailsLeavesNoLockBehind) {
+TEST(ztSyncStatefulMutex, EventThatFailsLeavesNoLockBehind) {
   EventPlace place;
   CztStatefulMutex mutex(L"name");
   auto freeElsewhere = [] {
@@ -417,7 +417,7 @@ TEST(SyncStatefulMutex, EventThatFailsLeavesNoLockBehind) {
   EXPECT_TRUE(mutex.UnlockAndResetState(false));
 }
 
-TEST(SyncStatefulMutex, ConstructorThatFailsCleansUp) {
+TEST(ztSyncStatefulMutex, ConstructorThatFailsCleansUp) {
   EventPlace place;
   { CztStatefulMutex mutex(L"warm up"); }
   int descriptors = vlt::test::OpenDescriptors();

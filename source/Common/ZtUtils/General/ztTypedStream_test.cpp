@@ -19,14 +19,14 @@ constexpr bool kLongIs8 = sizeof(unsigned long) == 8;
 constexpr GUID kGuid = {
     0x00112233, 0x4455, 0x6677, {0x88, 0x99, 0xAA, 0xBB, 0xCC, 0xDD, 0xEE, 0xFF}};
 
-TEST(TypedStream, HeaderOverAnEmptyStreamIsThirteenZeros) {
+TEST(ztTypedStream, HeaderOverAnEmptyStreamIsThirteenZeros) {
   MemoryPtr stream = NewMemory();
   CztOutStream out(stream.get());
   EXPECT_EQ(Contents(stream.get()), std::string(13, '\0'));
   EXPECT_EQ(out.GetByteOrder(), 0);
 }
 
-TEST(TypedStream, HeaderHasTheGivenVersion) {
+TEST(ztTypedStream, HeaderHasTheGivenVersion) {
   MemoryPtr stream = NewMemory();
   CztOutStream out(stream.get(), 1, 0x01020304, -2);
   EXPECT_EQ(Hexed(Contents(stream.get())), "00 01 00 00 00 04 03 02 01 FE FF FF FF ");
@@ -42,14 +42,14 @@ struct ModuleVersion {
   ~ModuleVersion() { CztStreamBase::SetModuleStreamVersion(0, 0, 0); }
 };
 
-TEST(TypedStream, ModuleVersionStandsInTheHeader) {
+TEST(ztTypedStream, ModuleVersionStandsInTheHeader) {
   ModuleVersion version(3, 4, 5);
   MemoryPtr stream = NewMemory();
   CztOutStream out(stream.get());
   EXPECT_EQ(Contents(stream.get()), Header(3, 4, 5));
 }
 
-TEST(TypedStream, CopyWritesOneMoreHeader) {
+TEST(ztTypedStream, CopyWritesOneMoreHeader) {
   ModuleVersion version(3, 4, 5);
   MemoryPtr stream = NewMemory();
   CztOutStream out(stream.get(), 1, 1, 1);
@@ -60,7 +60,7 @@ TEST(TypedStream, CopyWritesOneMoreHeader) {
   EXPECT_EQ(versioned.GetMajorVersion(), 7);
 }
 
-TEST(TypedStream, ReaderTakesTheWritersVersionAndOrder) {
+TEST(ztTypedStream, ReaderTakesTheWritersVersionAndOrder) {
   ModuleVersion version(3, 4, 5);
   MemoryPtr stream = MemoryOf(Header(1, 2, 0xFFFFFFFF) + Header(7, 8, 9, Order::Big));
   CztInStream in(stream.get());
@@ -76,7 +76,7 @@ TEST(TypedStream, ReaderTakesTheWritersVersionAndOrder) {
   EXPECT_EQ(Position(stream.get()), 26);
 }
 
-TEST(TypedStream, StreamIsNotCounted) {
+TEST(ztTypedStream, StreamIsNotCounted) {
   ForeignStream stream;
   stream.input = Header();
   {
@@ -87,7 +87,7 @@ TEST(TypedStream, StreamIsNotCounted) {
   EXPECT_EQ(stream.references, 1);
 }
 
-TEST(TypedStream, ValuesAreOneWriteEach) {
+TEST(ztTypedStream, ValuesAreOneWriteEach) {
   ForeignStream stream;
   CztOutStream out(&stream);
   out << int32_t{-2} << 0x89ABCDEFu << int16_t{-2} << uint16_t{0x1234}
@@ -103,7 +103,7 @@ TEST(TypedStream, ValuesAreOneWriteEach) {
                                       "02 00 00 00 ", "61 62 ", "00 00 00 00 ", "05 00 00 00 "}));
 }
 
-TEST(TypedStream, GuidFieldsAndBytesAreWrittenOneByOne) {
+TEST(ztTypedStream, GuidFieldsAndBytesAreWrittenOneByOne) {
   ForeignStream stream;
   CztOutStream out(&stream);
   out << kGuid;
@@ -139,7 +139,7 @@ void ExpectValues(const std::string& bytes) {
   EXPECT_EQ(u64, 0x0102030405060708u);
 }
 
-TEST(TypedStream, ValuesOfBothByteOrdersReadBack) {
+TEST(ztTypedStream, ValuesOfBothByteOrdersReadBack) {
   ExpectValues(Values(Order::Little));
   std::string big = Values(Order::Big);
   ExpectValues(big);
@@ -147,7 +147,7 @@ TEST(TypedStream, ValuesOfBothByteOrdersReadBack) {
   ExpectValues(big);
 }
 
-TEST(TypedStream, TextIsReadBehindALengthOfLongWidth) {
+TEST(ztTypedStream, TextIsReadBehindALengthOfLongWidth) {
   for (Order order : {Order::Little, Order::Big}) {
     MemoryPtr stream = MemoryOf(Header(0, 0, 0, order) + LongNumber(3, order) +
                                 std::string("a\0b", 3) + LongNumber(0, order) + "tail");
@@ -161,7 +161,7 @@ TEST(TypedStream, TextIsReadBehindALengthOfLongWidth) {
   }
 }
 
-TEST(TypedStream, WrittenTextReadsBackWhereLongIsFourBytes) {
+TEST(ztTypedStream, WrittenTextReadsBackWhereLongIsFourBytes) {
   MemoryPtr stream = NewMemory();
   CztOutStream out(stream.get());
   out << AnsiString("text") << AnsiString() << AnsiString("more");
@@ -177,7 +177,7 @@ TEST(TypedStream, WrittenTextReadsBackWhereLongIsFourBytes) {
   }
 }
 
-TEST(TypedStream, LongTextsReadWhole) {
+TEST(ztTypedStream, LongTextsReadWhole) {
   std::string bytes;
   for (int i = 0; i < 200000; ++i) bytes += static_cast<char>(i * 7);
   MemoryPtr stream = MemoryOf(Header() + LongNumber(bytes.size()) + bytes);
@@ -187,7 +187,7 @@ TEST(TypedStream, LongTextsReadWhole) {
   EXPECT_TRUE(std::string(text.begin(), text.end()) == bytes);
 }
 
-TEST(TypedStream, AnUntrueTextLengthTakesNoMemoryAndLeavesTheTarget) {
+TEST(ztTypedStream, AnUntrueTextLengthTakesNoMemoryAndLeavesTheTarget) {
   ExpectInChild([] {
     if (kCanLimitMemory) LimitMemoryTo(64 << 20);
     for (uint64_t length : {uint64_t{4}, uint64_t{0x7FFFFFFF}, uint64_t{0xFFFFFFFF}}) {
@@ -206,7 +206,7 @@ TEST(TypedStream, AnUntrueTextLengthTakesNoMemoryAndLeavesTheTarget) {
   EXPECT_TRUE(text == (kLongIs8 ? "old" : ""));
 }
 
-TEST(TypedStream, GuidReadsDataOneInLongWidthAndKeepsItsLowHalf) {
+TEST(ztTypedStream, GuidReadsDataOneInLongWidthAndKeepsItsLowHalf) {
   for (Order order : {Order::Little, Order::Big}) {
     uint64_t data1 = 0x00112233 | (kLongIs8 ? 0xABCDEF0100000000u : 0);
     MemoryPtr stream =
@@ -221,7 +221,7 @@ TEST(TypedStream, GuidReadsDataOneInLongWidthAndKeepsItsLowHalf) {
 
 // ---- Failures
 
-TEST(TypedStream, EveryWriteThatFailsThrows) {
+TEST(ztTypedStream, EveryWriteThatFailsThrows) {
   auto write = [](IztStream* stream) {
     CztOutStream out(stream, 1, 2, 3);
     out << 1 << uint16_t{2} << static_cast<unsigned char>(3) << uint64_t{4} << AnsiString("text")
@@ -259,7 +259,7 @@ void ReadEverything(IztStream* stream) {
   CztInStream inner(in);
 }
 
-TEST(TypedStream, EveryReadThatFailsThrowsByItsResult) {
+TEST(ztTypedStream, EveryReadThatFailsThrowsByItsResult) {
   ForeignStream whole;
   whole.input = Everything();
   ReadEverything(&whole);
@@ -276,7 +276,7 @@ TEST(TypedStream, EveryReadThatFailsThrowsByItsResult) {
   }
 }
 
-TEST(TypedStream, EveryTruncationIsTheEndOfTheStream) {
+TEST(ztTypedStream, EveryTruncationIsTheEndOfTheStream) {
   std::string bytes = Everything();
   for (size_t size = 1; size < bytes.size(); ++size) {
     MemoryPtr stream = MemoryOf(bytes.substr(0, size));
@@ -286,12 +286,12 @@ TEST(TypedStream, EveryTruncationIsTheEndOfTheStream) {
   EXPECT_EQ(WhatThrows([&] { ReadEverything(stream.get()); }), Thrown::Nothing);
 }
 
-TEST(TypedStream, AStreamWithoutABlockIsNotAtItsEnd) {
+TEST(ztTypedStream, AStreamWithoutABlockIsNotAtItsEnd) {
   MemoryPtr stream = NewMemory();
   EXPECT_EQ(WhatThrows([&] { CztInStream in(stream.get()); }), Thrown::Stream);
 }
 
-TEST(TypedStream, AValueThatFailsLeavesItsTarget) {
+TEST(ztTypedStream, AValueThatFailsLeavesItsTarget) {
   MemoryPtr stream = MemoryOf(Header() + "ab");
   CztInStream in(stream.get());
   uint32_t value = 77;
@@ -299,7 +299,7 @@ TEST(TypedStream, AValueThatFailsLeavesItsTarget) {
   EXPECT_EQ(value, 77u);
 }
 
-TEST(StreamException, HoldsItsMessage) {
+TEST(ztTypedStreamException, HoldsItsMessage) {
   EXPECT_TRUE(CztStreamException().what().empty());
   EXPECT_TRUE(CztEndOfStreamException(String(L"why")).what() == L"why");
   EXPECT_THROW(throw CztEndOfStreamException(), CztStreamException);
@@ -308,7 +308,7 @@ TEST(StreamException, HoldsItsMessage) {
 
 // ---- Sub-streams
 
-TEST(TypedStream, SubStreamsAreThoseOfTheByteStream) {
+TEST(ztTypedStream, SubStreamsAreThoseOfTheByteStream) {
   MemoryPtr stream = NewMemory();
   CztOutStream out(stream.get());
   auto made = CztComPtr<IztStream>::Attach(out.CreateSubStream(L"one"));
@@ -327,7 +327,7 @@ TEST(TypedStream, SubStreamsAreThoseOfTheByteStream) {
   stream->Release();
 }
 
-TEST(TypedStream, WithoutSubStreamsThereAreNone) {
+TEST(ztTypedStream, WithoutSubStreamsThereAreNone) {
   ForeignStream stream;
   stream.input = Header();
   CztOutStream out(&stream);
