@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <nlohmann/json.hpp>
 
+#include "tools/common/Commands.h"
 #include "tools/common/Terminal.h"
 #include "tools/common/Usage.h"
 #include "tools/vltctl-client/Check.h"
@@ -18,8 +19,10 @@ using nlohmann::json;
 using vltctl::Client;
 using vltctl::Component;
 using vltctl::ForTerminal;
-
-enum ExitCode { kGood = 0, kNotFound = 1, kUsage = 2, kDataUnusable = 3 };
+using vltctl::kDataUnusable;
+using vltctl::kGood;
+using vltctl::kNotFound;
+using vltctl::kUsage;
 
 json ToJson(const Component& c) {
   json out = {{"type", c.type}, {"name", c.name}, {"guid", c.guid}, {"file", c.file}};
@@ -214,12 +217,7 @@ int Run(int argc, char** argv) {
   CLI::App* url = command("url", "Where the local server listens");
   CLI::App* identity = command("identity", "Identity of this machine's server");
   // Listed for the help; the command itself has done them before this program is asked.
-  command("settings", "Each setting and where it comes from");
-  command("jar", "What server and clients have left each other");
-  command("verify", "A guarded file and its sidecar");
-  command("hook", "Fault injection: list, arm, clear");
-  command("trace", "Where the log of this user goes");
-  command("events", "Named events and who holds them");
+  for (const auto& [name, summary] : vltctl::kFileCommands) command(name, summary);
   app.footer("Exit codes: 0 good, 1 not found, 2 usage, 3 the installation's data cannot be used.");
   try {
     app.parse(argc, argv);

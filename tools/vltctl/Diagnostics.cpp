@@ -93,21 +93,21 @@ int Trace(bool json) {
   if (!newest.empty()) rows.push_back({"newest log", directory + newest, ""});
   if (json) {
     Print(rows, true);
-    return kGood;
+    return vltctl::kGood;
   }
   Print(rows, false);
-  if (newest.empty()) return kGood;
+  if (newest.empty()) return vltctl::kGood;
   for (const std::string& line : LastLines(directory + newest)) {
     printf("| %s\n", ForTerminal(line).c_str());
   }
-  return kGood;
+  return vltctl::kGood;
 }
 
 int HookList(bool json) {
   std::vector<Row> rows;
   for (const auto& point : vlt::hook::kPoints) rows.push_back({point.name, point.where, ""});
   Print(rows, json);
-  return kGood;
+  return vltctl::kGood;
 }
 
 namespace {
@@ -154,7 +154,7 @@ bool IsPoint(const std::string& name) {
 int HookArm(const std::string& name, const std::vector<std::string>& flags) {
   if (!IsPoint(name)) {
     fprintf(stderr, "vltctl: no such point: %s\n", ForTerminal(name).c_str());
-    return kNotFound;
+    return vltctl::kNotFound;
   }
   ExpectUsable(HookFile());
   CvlIniMgr ini = CvlIniMgr::OpenRaw(HookFile());
@@ -164,17 +164,17 @@ int HookArm(const std::string& name, const std::vector<std::string>& flags) {
     if (SetFlag(ini, flag)) continue;
     fprintf(stderr, "vltctl: no such flag: %s (hang[=MS], crash, fail, throw, exhaust)\n",
             ForTerminal(flag).c_str());
-    return kUsage;
+    return vltctl::kUsage;
   }
-  return ini.Write() < 0 ? kDataUnusable : kGood;
+  return ini.Write() < 0 ? vltctl::kDataUnusable : vltctl::kGood;
 }
 
 int HookClear() {
-  if (!fs::exists(HookFile())) return kGood;
+  if (!fs::exists(HookFile())) return vltctl::kGood;
   ExpectUsable(HookFile());
   CvlIniMgr ini = CvlIniMgr::OpenRaw(HookFile());
   ini.EraseSection("Hook");
-  return ini.Write() < 0 ? kDataUnusable : kGood;
+  return ini.Write() < 0 ? vltctl::kDataUnusable : vltctl::kGood;
 }
 
 }  // namespace admin

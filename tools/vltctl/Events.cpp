@@ -124,7 +124,7 @@ int Events(bool json) {
   }
   std::sort(rows.begin(), rows.end(), [](const Row& a, const Row& b) { return a.name < b.name; });
   Print(rows, json);
-  return kGood;
+  return vltctl::kGood;
 }
 
 }  // namespace admin

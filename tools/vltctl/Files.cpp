@@ -56,7 +56,7 @@ int Settings(unsigned index, bool client, bool server, const std::string& name, 
   GuardedBytes read = ReadGuarded(file);
   if (read.state == GuardedBytes::State::Unreadable) {
     fprintf(stderr, "vltctl: %s: %s\n", ForTerminal(file).c_str(), read.error.c_str());
-    return kDataUnusable;
+    return vltctl::kDataUnusable;
   }
   Document document(read.bytes);
   SettingRows out(file, document);
@@ -81,7 +81,7 @@ int Settings(unsigned index, bool client, bool server, const std::string& name, 
     }
   }
   Print(out.rows, json);
-  return kGood;
+  return vltctl::kGood;
 }
 
 int Jar(bool json) {
@@ -91,7 +91,7 @@ int Jar(bool json) {
     bool missing = read.state == GuardedBytes::State::Missing;
     fprintf(stderr, "vltctl: %s: %s\n", ForTerminal(file).c_str(),
             missing ? "no jar" : read.error.c_str());
-    return missing ? kNotFound : kDataUnusable;
+    return missing ? vltctl::kNotFound : vltctl::kDataUnusable;
   }
   Document document(read.bytes);
   std::vector<Row> rows;
@@ -108,7 +108,7 @@ int Jar(bool json) {
       out[row.origin.substr(1, row.origin.size() - 2)][row.name] = row.value;
     PrintJson(out);
   }
-  return document.status() < 0 ? kDataUnusable : kGood;
+  return document.status() < 0 ? vltctl::kDataUnusable : vltctl::kGood;
 }
 
 namespace {
@@ -133,24 +133,24 @@ constexpr const char* kSetAside = "sets the file aside as .bad and begins an emp
 
 Verdict Judge(const GuardedBytes& read) {
   if (read.state == GuardedBytes::State::Missing) {
-    return {"the file is missing", "makes an empty file", kNotFound};
+    return {"the file is missing", "makes an empty file", vltctl::kNotFound};
   }
   if (read.state == GuardedBytes::State::Unreadable) {
-    return {"the file cannot be opened", "fails and leaves the file", kDataUnusable};
+    return {"the file cannot be opened", "fails and leaves the file", vltctl::kDataUnusable};
   }
   if (read.sidecar && read.sidecar->size() < IniSidecar::kSizeBytes) {
-    return {"the sidecar is short", kSetAside, kDataUnusable};
+    return {"the sidecar is short", kSetAside, vltctl::kDataUnusable};
   }
   if (Document(read.bytes).status() < 0) {
-    return {"the file cannot be parsed", kSetAside, kDataUnusable};
+    return {"the file cannot be parsed", kSetAside, vltctl::kDataUnusable};
   }
-  if (!read.sidecar) return {"there is no sidecar", kTaken, kGood};
+  if (!read.sidecar) return {"there is no sidecar", kTaken, vltctl::kGood};
   std::string digest = read.sidecar->substr(0, IniSidecar::kSizeBytes);
-  if (digest == Md5(read.bytes)) return {"the digest matches", kTaken, kGood};
+  if (digest == Md5(read.bytes)) return {"the digest matches", kTaken, vltctl::kGood};
   if (std::equal(digest.begin(), digest.end(), IniSidecar::kInvalidMark.begin())) {
-    return {"the sidecar is the mark of a first save under way", kTaken, kGood};
+    return {"the sidecar is the mark of a first save under way", kTaken, vltctl::kGood};
   }
-  return {"the digest differs", kTaken, kGood};
+  return {"the digest differs", kTaken, vltctl::kGood};
 }
 
 }  // namespace

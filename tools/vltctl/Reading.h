@@ -6,6 +6,7 @@
 #include <utility>
 #include <vector>
 
+#include "tools/common/Commands.h"
 #include "zt/posix/ScopedFd.h"
 #include "ztini/ztini.h"
 
@@ -61,7 +62,7 @@ struct Row {
 void Print(const std::vector<Row>& rows, bool json);
 void PrintJson(const nlohmann::json& value);
 
-enum ExitCode { kGood = 0, kNotFound = 1, kUsage = 2, kDataUnusable = 3 };
+using vltctl::ExitCode;
 
 // ---- The commands.
 int Settings(unsigned index, bool client, bool server, const std::string& name, bool json);

@@ -9,6 +9,7 @@
 #include <exception>
 #include <filesystem>
 
+#include "tools/common/Commands.h"
 #include "tools/common/Terminal.h"
 #include "tools/common/Usage.h"
 #include "tools/vltctl/Reading.h"
@@ -23,14 +24,7 @@ namespace {
     if (access(program.c_str(), X_OK) == 0) execv(program.c_str(), argv);
   }
   fprintf(stderr, "vltctl: vltctl-client is not installed\n");
-  exit(admin::kDataUnusable);
-}
-
-bool IsOwnCommand(const std::string& word) {
-  for (const char* name : {"settings", "jar", "verify", "hook", "trace", "events"}) {
-    if (word == name) return true;
-  }
-  return false;
+  exit(vltctl::kDataUnusable);
 }
 
 struct Arguments {
@@ -42,7 +36,7 @@ struct Arguments {
 
 int Run(int argc, char** argv) {
   Arguments a;
-  int result = admin::kUsage;
+  int result = vltctl::kUsage;
   CLI::App app("Files of the storage's rendezvous and diagnostics.", "vltctl");
   app.require_subcommand(1);
   auto command = [&](CLI::App& parent, const char* name, const char* text, auto run) {
@@ -50,28 +44,27 @@ int Run(int argc, char** argv) {
     sub->callback([&result, run] { result = run(); });
     return sub;
   };
+  auto own = [&](const char* name, auto run) {
+    return command(app, name, vltctl::SummaryOfFileCommand(name), run);
+  };
   auto json = [&](CLI::App* sub) { sub->add_flag("--json", a.json, "Print JSON"); };
 
-  CLI::App* settings = command(app, "settings", "Each setting and where it comes from", [&] {
-    return admin::Settings(a.index, a.client, a.server, a.name, a.json);
-  });
+  CLI::App* settings =
+      own("settings", [&] { return admin::Settings(a.index, a.client, a.server, a.name, a.json); });
   settings->add_option("--index", a.index, "Number behind the names of the items")
       ->capture_default_str();
   settings->add_flag("--client", a.client, "What a client reads");
   settings->add_flag("--server", a.server, "What the server reads");
   settings->add_option("--name", a.name, "NAME.ini instead of kor.ini");
   json(settings);
-  json(command(app, "jar", "What stands in the jar", [&] { return admin::Jar(a.json); }));
-  CLI::App* verify = command(app, "verify", "A guarded file and its sidecar",
-                             [&] { return admin::Verify(a.file, a.json); });
+  json(own("jar", [&] { return admin::Jar(a.json); }));
+  CLI::App* verify = own("verify", [&] { return admin::Verify(a.file, a.json); });
   verify->add_option("file", a.file, "The INI file")->required();
   json(verify);
-  json(command(app, "trace", "Where the log of this user goes",
-               [&] { return admin::Trace(a.json); }));
-  json(command(app, "events", "Named events and who holds them",
-               [&] { return admin::Events(a.json); }));
+  json(own("trace", [&] { return admin::Trace(a.json); }));
+  json(own("events", [&] { return admin::Events(a.json); }));
 
-  CLI::App* hook = app.add_subcommand("hook", "Fault injection");
+  CLI::App* hook = app.add_subcommand("hook", vltctl::SummaryOfFileCommand("hook"));
   hook->require_subcommand(1);
   json(command(*hook, "list", "The points", [&] { return admin::HookList(a.json); }));
   CLI::App* arm = command(*hook, "arm", "Arms one point for processes that refresh their hooks",
@@ -83,7 +76,7 @@ int Run(int argc, char** argv) {
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& error) {
-    return vltctl::ExitOf(app, error) == 0 ? admin::kGood : admin::kUsage;
+    return vltctl::ExitOf(app, error) == 0 ? vltctl::kGood : vltctl::kUsage;
   }
   return result;
 }
@@ -92,7 +85,7 @@ int Run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
   setlocale(LC_ALL, "");
-  if (argc < 2 || !IsOwnCommand(argv[1])) BecomeClient(argv);
+  if (argc < 2 || !vltctl::SummaryOfFileCommand(argv[1])) BecomeClient(argv);
   try {
     return Run(argc, argv);
   } catch (const std::exception& error) {
@@ -100,5 +93,5 @@ int main(int argc, char** argv) {
   } catch (int) {
     fprintf(stderr, "vltctl: the file cannot be opened\n");
   }
-  return admin::kDataUnusable;
+  return vltctl::kDataUnusable;
 }
