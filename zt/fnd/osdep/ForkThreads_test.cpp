@@ -20,8 +20,8 @@ namespace zt::fnd::osdep {
 namespace {
 
 using vlt::test::CompiledLocales;
-using vlt::test::ForkStorm;
 using vlt::test::ExpectInChild;
+using vlt::test::ForkStorm;
 using vlt::test::MutexPlace;
 
 class ForkThreads : public testing::Test {
