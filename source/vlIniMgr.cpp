@@ -232,16 +232,10 @@ void CvlIniMgr::SetAside(const String& fileName) {
 }
 
 CvlIniMgr::FileState CvlIniMgr::stateOfFile() const {
-  FileState state;
   struct stat info;
   ScopedFd file = zt::posix::LookUp(m_fileName.c_str());
-  if (!file || fstat(file.get(), &info) != 0) return state;
-  state.device = info.st_dev;
-  state.inode = info.st_ino;
-  state.sizeBytes = info.st_size;
-  state.modifiedSeconds = info.st_mtim.tv_sec;
-  state.modifiedNanoseconds = info.st_mtim.tv_nsec;
-  return state;
+  if (!file || fstat(file.get(), &info) != 0) return FileState();
+  return IniFileStateOf(info);
 }
 
 // Whether others are kept out, at the latest from now on.
@@ -279,12 +273,24 @@ void CvlIniMgr::AbandonDocument() {
 }
 
 HRESULT CvlIniMgr::Write() {
-  if (!m_dirty) return S_OK;
+  bool isInPlace;
+  return m_dirty ? writeDocument(nullptr, &isInPlace) : S_OK;
+}
+
+// *digest, if asked for, is that of the bytes that were written; *isInPlace, whether they are still what
+// the path leads to.
+HRESULT CvlIniMgr::writeDocument(IniSidecar::Digest* digest, bool* isInPlace) {
   if (!m_ini || !ownsLock()) return E_FAIL;
   // The changes may have been made to what the file no longer is.
   if (m_lockWasLost && !isUnchanged(stateOfFile())) return E_FAIL;
-  int32_t status = IniWriteToFile(m_ini, m_fileName.c_str());
-  m_known = stateOfFile();
+  IniTextFunction takeDigest = [](void* context, const char* text, size_t sizeBytes) {
+    GetMD5Checksum(reinterpret_cast<const unsigned char*>(text), sizeBytes,
+                   static_cast<IniSidecar::Digest*>(context)->data());
+  };
+  int32_t status = IniWriteToFileAndTell(m_ini, m_fileName.c_str(), digest ? takeDigest : nullptr,
+                                         digest, &m_known);
+  *isInPlace = m_known.isKnown();
+  if (!*isInPlace) m_known = stateOfFile();
   return status == 0 ? S_OK : E_FAIL;
 }
 
@@ -301,9 +307,17 @@ HRESULT CvlIniMgr::DigestFile(IniSidecar::Digest* digest) const {
 }
 
 HRESULT CvlIniMgr::WriteAndGetDigest(IniSidecar::Digest* digest) {
-  HRESULT result = Write();
-  if (result < 0) return result;
-  result = DigestFile(digest);
+  if (m_dirty) {
+    bool isInPlace = false;
+    HRESULT result = writeDocument(digest, &isInPlace);
+    if (result < 0) return result;
+    // Reading the file could only fail.
+    if (isInPlace && IniIsSettled(m_ini)) {
+      IniTakeAsRead(m_ini);
+      return S_OK;
+    }
+  }
+  HRESULT result = DigestFile(digest);
   if (InitializeIniBindings() != 0 && result >= 0) result = E_FAIL;
   return result;
 }

@@ -72,8 +72,8 @@ class CvlIniMgr {
   // Replaces the file if anything was changed since construction. A failure leaves the file. E_FAIL also
   // where the lock was lost and another process has it, or has changed the file since.
   HRESULT Write();
-  // Write, then the digest of the file as it is, new[]; then reads the file again, so that the object
-  // holds exactly what the file holds. Null on failure. Where the file cannot be read again, for whatever
+  // Write, then the digest of the file as it is, new[]; then the object holds exactly what the file
+  // holds: it is read again, unless it is known to read back as this object. Null on failure. Where the file cannot be read again, for whatever
   // reason, the object keeps what it held.
   HRESULT WriteAndGetChecksum(unsigned char** digest);
   // The same into *digest, which is indeterminate on failure.
@@ -118,16 +118,11 @@ class CvlIniMgr {
   int32_t InitializeIniBindings();
   [[noreturn]] void CleanupAndThrow(bool setAside);
   HRESULT DigestFile(IniSidecar::Digest* digest) const;
+  HRESULT writeDocument(IniSidecar::Digest* digest, bool* isInPlace);
   void DisposeDocument();
   bool ownsLock();
 
-  // Tells one state of the file from another without reading it.
-  struct FileState {
-    uint64_t device = 0, inode = 0;
-    int64_t sizeBytes = -1, modifiedSeconds = 0, modifiedNanoseconds = 0;
-    bool isKnown() const { return sizeBytes >= 0; }
-    bool operator==(const FileState&) const = default;
-  };
+  using FileState = IniFileState;
   FileState stateOfFile() const;
   // Whether that is the state in which this object last read or wrote the file.
   bool isUnchanged(const FileState& now) const { return now.isKnown() && now == m_known; }

@@ -43,8 +43,9 @@ class FileReplacement {
 
   // Closes the file and puts it in place. 0, or kIniWriteFailed,
   // kIniNotReplaceable. kIniWriteFailed after the rename, with the new file in place, if its directory
-  // could not be synced: a power cut may still lose it.
-  int32_t commit(IniDurability durability);
+  // could not be synced: a power cut may still lose it. Sets *state, if asked for, to that of the
+  // written file.
+  int32_t commit(IniDurability durability, IniFileState* state = nullptr);
 
  private:
   bool safely() const { return m_temporary != nullptr; }

@@ -136,10 +136,12 @@ int32_t FileReplacement::closeFile() {
   return close(m_file.release()) == 0 || errno == EINTR ? 0 : kIniWriteFailed;
 }
 
-int32_t FileReplacement::commit(IniDurability durability) {
+int32_t FileReplacement::commit(IniDurability durability, IniFileState* state) {
   const bool synced = durability != IniDurability::None;
   if (safely()) inheritFromTarget();
   int32_t status = synced && !zt::posix::Sync(m_file.get()) ? kIniWriteFailed : 0;
+  struct stat now;
+  if (state && fstat(m_file.get(), &now) == 0) *state = IniFileStateOf(now);
   const int32_t closed = closeFile();
   if (status == 0) status = closed;
   if (status == 0 && safely() && zt::posix::Rename(written(), m_target) != 0) {
@@ -155,6 +157,11 @@ int32_t FileReplacement::commit(IniDurability durability) {
 }
 
 }  // namespace ztini
+
+IniFileState IniFileStateOf(const struct stat& status) {
+  return {status.st_dev, status.st_ino, status.st_size, status.st_mtim.tv_sec,
+          status.st_mtim.tv_nsec};
+}
 
 int32_t ztini_SyncFile(const char* path) {
   if (!path) return kIniBadPath;

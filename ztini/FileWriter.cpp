@@ -1,12 +1,17 @@
+#include <sys/stat.h>
+
 #include <utility>
 
 #include "ztini/Document.h"
 #include "ztini/FileReplace.h"
+#include "ztini/OpenFile.h"
 #include "ztini/Render.h"
 #include "ztini/StringTools.h"
 #include "ztini/TextBuffer.h"
 
-int32_t IniWriteToFile(IniStructForwardReferenceTag* doc, const char* path) {
+int32_t IniWriteToFileAndTell(IniStructForwardReferenceTag* doc, const char* path,
+                              IniTextFunction seen, void* context, IniFileState* written) {
+  *written = IniFileState();
   if (!doc || !path || !*path) return kIniBadPath;
   // Beforehand: once the file is in place nothing may fail.
   ztini::OwnedText name(ztini_StrDup(path));
@@ -16,11 +21,21 @@ int32_t IniWriteToFile(IniStructForwardReferenceTag* doc, const char* path) {
   ztini::TextBuffer text;
   if (status == 0) status = ztini::IniRender(doc, &text);
   if (status == 0) status = file.write(text.text(), text.size());
-  if (status == 0) status = file.commit(doc->durability);
+  if (status == 0 && seen) seen(context, text.text(), text.size());
+  IniFileState state;
+  if (status == 0) status = file.commit(doc->durability, &state);
   if (status < 0) return status;
-  int64_t written = 0;
-  IniGetFileTimestamp(path, &written);
+  // What is too large to be read back is not settled.
+  if (text.size() > static_cast<size_t>(ztini::kLargestFileBytes)) doc->settled = false;
+  struct stat now;
+  const bool known = stat(path, &now) == 0;
+  if (known && IniFileStateOf(now) == state) *written = state;
   doc->fileName = std::move(name);
-  doc->fileTimestamp = written;
+  doc->fileTimestamp = known ? now.st_mtime : 0;
   return 0;
+}
+
+int32_t IniWriteToFile(IniStructForwardReferenceTag* doc, const char* path) {
+  IniFileState ignored;
+  return IniWriteToFileAndTell(doc, path, nullptr, nullptr, &ignored);
 }

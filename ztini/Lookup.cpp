@@ -130,6 +130,7 @@ int32_t IniRenameSection(Doc* doc, const char* section, const char* name) {
   if (!found || !name) return 0;
   char* copy = ztini_StrDupWithoutSurrWhiteSpace(name);
   if (!copy) return kIniOutOfMemory;
+  doc->settled = false;
   doc->sections.rename(found, copy);
   return 1;
 }

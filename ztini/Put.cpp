@@ -2,6 +2,7 @@
 
 #include "ztini/Document.h"
 #include "ztini/EscapeCodec.h"
+#include "ztini/Settled.h"
 #include "ztini/StringTools.h"
 
 namespace {
@@ -39,6 +40,9 @@ int32_t IniPut(Doc* doc, const char* section, const char* item, const char* valu
   if (!doc) return 0;
   if (!ztini_HasNonWhiteSpace(section) || !ztini_HasNonWhiteSpace(item)) return kIniEmptyName;
   if (!value) value = "";
+  if (doc->settled) {
+    doc->settled = ztini::IniSurvivesFile(section, item, value, quoteCharacter);
+  }
   IniSection* known = nullptr;
   if (IniSeekSection(doc, section, &known) < 0) return OutOfMemory(doc);
   if (known) {

@@ -23,6 +23,7 @@
 // 8. Cost. Look-up takes constant time on average, reading and writing linear time.
 
 struct IniStructForwardReferenceTag;
+struct stat;
 struct IniSection;
 struct IniEntry;
 
@@ -197,6 +198,37 @@ int32_t IniPutDouble(IniStructForwardReferenceTag* doc, const char* section, con
 // although kIniWriteFailed is returned, where its directory could not be synced. Without it a failed write deletes the target. Never waits for a
 // named pipe; targets other than regular files are refused.
 int32_t IniWriteToFile(IniStructForwardReferenceTag* doc, const char* path);
+
+// Tells one state of a file from another without reading it.
+struct IniFileState {
+  uint64_t device = 0, inode = 0;
+  int64_t sizeBytes = -1, modifiedSeconds = 0, modifiedNanoseconds = 0;
+  bool isKnown() const { return sizeBytes >= 0; }
+  bool operator==(const IniFileState&) const = default;
+};
+IniFileState IniFileStateOf(const struct stat& status);
+
+// Takes all bytes of a file that is about to be put in place.
+using IniTextFunction = void (*)(void* context, const char* text, size_t sizeBytes);
+
+// IniWriteToFile for a caller who goes on with what was written: passes the bytes on, if `seen` is not
+// null, and sets *written to the state of the file. That stays unknown on a failure, and where the path
+// already leads to another file.
+int32_t IniWriteToFileAndTell(IniStructForwardReferenceTag* doc, const char* path,
+                              IniTextFunction seen, void* context, IniFileState* written);
+
+// ---- Settled documents. Reading back a file that was written can change the document: pieces of a
+// value are joined, a line feed in a value breaks the line, an empty value goes. A settled document is
+// one that is known not to change. It need not be read back.
+
+// 1 if the document is settled under the locale in force: all of its names and values come from a file,
+// or were put and survive the way there and back. 0 is always safe to answer.
+int32_t IniIsSettled(IniStructForwardReferenceTag* doc);
+
+// After a settled document was written: does what reading the file back would do, that is, gives all
+// sections and items their lines.
+void IniTakeAsRead(IniStructForwardReferenceTag* doc);
+
 // The byte order mark, if asked for, and the text; flushes.
 int32_t ztini_IniWriteToFileHelper(IniStructForwardReferenceTag* doc, FILE* file);
 int32_t IniWrite(IniStructForwardReferenceTag* doc, IniLineOutputFunction output, void* stream);
