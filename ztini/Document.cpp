@@ -87,6 +87,7 @@ IniEntry* IniNewEntry(const char* name, const char* value, int32_t readOptions) 
     IniDisposeEntry(entry);
     return nullptr;
   }
+  entry->knownNameLength = IniKnownLength(strlen(entry->name));
   IniNewEntryHandleQuotes(entry, readOptions);
   return entry;
 }
@@ -101,18 +102,22 @@ IniSection* IniReadSection(IniStructForwardReferenceTag* doc, char* name) {
   return section;
 }
 
-IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, char* value, size_t length) {
+IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, size_t nameLength,
+                       char* value, size_t valueLength) {
   void* place = doc->arena.record(sizeof(IniEntry));
   if (!place) return nullptr;
   auto* entry = new (place) IniEntry;
   entry->name = name;
   entry->value = value;
+  entry->knownNameLength = IniKnownLength(nameLength);
   entry->nameInArena = entry->valueInArena = entry->recordInArena = 1;
-  entry->quote = EnclosingQuote(value, length, doc->readOptions);
+  entry->quote = EnclosingQuote(value, valueLength, doc->readOptions);
   if (entry->quote) {
-    value[length - 1] = 0;
+    value[valueLength - 1] = 0;
     ++entry->value;
+    valueLength -= 2;
   }
+  entry->knownValueLength = IniKnownLength(valueLength);
   return entry;
 }
 
@@ -140,7 +145,9 @@ void IniDisposeEntry(IniEntry* entry) {
 void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions) {
   const size_t length = strlen(entry->value);
   entry->quote = EnclosingQuote(entry->value, length, readOptions);
+  entry->knownValueLength = IniKnownLength(length);
   if (!entry->quote) return;
+  entry->knownValueLength = IniKnownLength(length - 2);
   memmove(entry->value, entry->value + 1, length - 2);
   entry->value[length - 2] = 0;
 }
@@ -148,6 +155,7 @@ void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions) {
 void IniReplaceValue(IniEntry* entry, char* value) {
   if (!entry->valueInArena) std::free(entry->value);
   entry->value = value;
+  entry->knownValueLength = IniKnownLength(strlen(value));
   entry->valueInArena = 0;
 }
 

@@ -1,6 +1,8 @@
 #pragma once
 
 #include <cstdint>
+#include <cstring>
+#include <string_view>
 
 #include "ztini/Alloc.h"
 #include "ztini/Arena.h"
@@ -20,8 +22,31 @@ inline constexpr char kIniNullSectionName[] = "(null)";
 struct IniEntry : ztini::NameNode {
   char* value = nullptr;  // without surrounding white space and enclosing quotes
   int32_t line = -1;      // -1: not from a file
-  int32_t quote = 0;      // what encloses the value in the file: 0, 34, 39, or as put
+  // What encloses the value in the file: 0, 34, 39, or as put. More than a character, because a put of
+  // 256 is not one of 0: it writes the character 0.
+  uint32_t quote : 9 = 0;
+  // Lengths of both texts, so that a save does not count them; 0 where that is unknown.
+  uint32_t knownNameLength : 11 = 0;
+  uint32_t knownValueLength : 12 = 0;
+
+  std::string_view nameText() const {
+    return {name, knownNameLength ? knownNameLength : strlen(name)};
+  }
+  std::string_view valueText() const {
+    return {value, knownValueLength ? knownValueLength : strlen(value)};
+  }
 };
+
+// The field for a quote as put.
+inline uint32_t IniQuoteField(int32_t quote) {
+  const auto character = static_cast<unsigned char>(quote);
+  return character == 0 && quote != 0 ? 256 : character;
+}
+
+// For the fields above: 0 for what they cannot hold.
+inline uint32_t IniKnownLength(size_t length) {
+  return length < 1u << 11 ? static_cast<uint32_t>(length) : 0;
+}
 
 struct IniSection : ztini::NameNode {
   explicit IniSection(ztini::NameFold* fold) : items(fold) {}
@@ -72,8 +97,8 @@ IniEntry* IniNewEntry(const char* name, const char* value, int32_t readOptions);
 // The same in the document's arena, over texts that live as long and have no surrounding white space. The
 // quotes that enclose the value are cut off in place, where the options ask for it.
 IniSection* IniReadSection(IniStructForwardReferenceTag* doc, char* name);
-IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, char* value,
-                       size_t valueLength);
+IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, size_t nameLength,
+                       char* value, size_t valueLength);
 
 // Frees the record and what it holds, but for what lies in the arena; it must be in no list. Null is
 // allowed.

@@ -89,6 +89,7 @@ bool SectionJoin::merge(int32_t begin, int32_t end) {
   if (!name || !value) return false;
   IniReplaceValue(first, value.release());
   ztini::ReplaceName(first, name.release());
+  first->knownNameLength = 0;
   for (int32_t piece = begin + 1; piece < end; ++piece) IniDisposeEntry(item(piece));
   return true;
 }

@@ -202,7 +202,8 @@ int32_t DocumentBuilder::appendEntry(char* name, char* nameEnd, char* value, cha
   char* keptName = keep(name, nameEnd);
   char* keptValue = keptName ? keep(value, valueEnd) : nullptr;
   if (!keptValue) return kIniOutOfMemory;
-  IniEntry* entry = IniReadEntry(m_doc, keptName, keptValue, static_cast<size_t>(valueEnd - value));
+  IniEntry* entry = IniReadEntry(m_doc, keptName, static_cast<size_t>(nameEnd - name), keptValue,
+                                 static_cast<size_t>(valueEnd - value));
   if (!entry) return kIniOutOfMemory;
   entry->line = line;
   // As many as the section before has; without memory the append tries again.

@@ -19,12 +19,12 @@ bool PutIntoSection(Doc* doc, IniSection* section, const char* item, const char*
     char* copy = ztini_StrDupWithoutSurrWhiteSpace(value);
     if (!copy) return false;
     IniReplaceValue(known, copy);
-    known->quote = quote;
+    known->quote = IniQuoteField(quote);
     return true;
   }
   IniEntry* entry = IniNewEntry(item, value, 0);
   if (!entry) return false;
-  entry->quote = quote;
+  entry->quote = IniQuoteField(quote);
   return IniAppendEntry(section, entry);
 }
 

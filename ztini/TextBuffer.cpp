@@ -18,7 +18,7 @@ bool TextBuffer::fit(size_t length) {
   return true;
 }
 
-TextBuffer& TextBuffer::append(std::string_view text) {
+TextBuffer& TextBuffer::appendGrowing(std::string_view text) {
   m_good = m_good && text.size() <= SIZE_MAX - m_length && fit(m_length + text.size());
   if (!m_good) return *this;
   memcpy(m_text.get() + m_length, text.data(), text.size());

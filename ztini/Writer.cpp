@@ -11,14 +11,57 @@ namespace {
 // " Line", four digits and a separator of three, whether or not it is that wide.
 constexpr int64_t kPieceOverhead = 12;
 
+// Takes lines one by one and passes each on.
+class FunctionLines {
+ public:
+  FunctionLines(IniLineOutputFunction output, void* stream) : m_output(output), m_stream(stream) {}
+
+  ztini::TextBuffer& begin() {
+    m_line.clear();
+    return m_line;
+  }
+  int32_t end() { return m_line.ok() ? m_output(m_stream, m_line.text()) : kIniOutOfMemory; }
+
+ private:
+  IniLineOutputFunction m_output;
+  void* m_stream;
+  ztini::TextBuffer m_line;
+};
+
+// Puts lines together in one text, as they stand in a file.
+class TextInMemory {
+ public:
+  TextInMemory(ztini::TextBuffer* text, bool marked) : m_text(text), m_isFirst(!marked) {}
+
+  ztini::TextBuffer& begin() { return m_isFirst ? m_first : *m_text; }
+  int32_t end() {
+    if (m_isFirst) endFirst();
+    m_text->append('\n');
+    return m_text->ok() && m_first.ok() ? 0 : kIniOutOfMemory;
+  }
+
+ private:
+  // A name may begin with the bytes of a byte order mark. As the first bytes of the file they would be
+  // lost or get the whole file refused, so an empty line goes before them.
+  void endFirst() {
+    m_isFirst = false;
+    const char* line = m_first.text();
+    if (ztini::MarkIn(line, strnlen(line, 4)) != ztini::ByteOrderMark::kNone) m_text->append('\n');
+    m_text->append({line, m_first.size()});
+  }
+
+  ztini::TextBuffer* m_text;
+  ztini::TextBuffer m_first;
+  bool m_isFirst;
+};
+
 // Emits a document line by line. Every operation gives 0 or a negative status.
+template <class Lines>
 class DocumentWriter {
  public:
-  DocumentWriter(const IniStructForwardReferenceTag* doc, IniLineOutputFunction output,
-                 void* stream)
+  DocumentWriter(const IniStructForwardReferenceTag* doc, Lines* lines)
       : m_doc(doc),
-        m_output(output),
-        m_stream(stream),
+        m_lines(*lines),
         m_separator(doc->writeOptions & kIniWriteSpaces ? " = " : "=") {}
 
   int32_t write();
@@ -26,24 +69,24 @@ class DocumentWriter {
  private:
   int32_t writeSection(const IniSection* section, const IniSection* previous);
   int32_t writeHeader(const IniSection* section);
+  int32_t writeEmptyLine();
   int32_t writeItem(const IniEntry* entry);
   int32_t writePieces(const IniEntry* entry, int64_t room);
-  int32_t emitValue(std::string_view value, int32_t quote);
-  int32_t emitLine();
+  int32_t endWithValue(ztini::TextBuffer& line, std::string_view value, uint32_t quote);
   size_t pieceLength(std::string_view rest, size_t room) const;
   bool tight() const { return (m_doc->writeOptions & kIniWriteTight) != 0; }
 
   const IniStructForwardReferenceTag* m_doc;
-  IniLineOutputFunction m_output;
-  void* m_stream;
+  Lines& m_lines;
   std::string_view m_separator;
-  ztini::TextBuffer m_line;
 };
 
-int32_t DocumentWriter::write() {
+template <class Lines>
+int32_t DocumentWriter<Lines>::write() {
   const IniSection* previous = nullptr;
-  for (int32_t n = 1; n <= m_doc->sections.count(); ++n) {
-    const IniSection* section = m_doc->section(n);
+  ztini::NameNode** sections = m_doc->sections.nodes();
+  for (int32_t n = 0; n < m_doc->sections.count(); ++n) {
+    auto* section = static_cast<const IniSection*>(sections[n]);
     const int32_t status = writeSection(section, previous);
     if (status < 0) return status;
     previous = section;
@@ -51,28 +94,36 @@ int32_t DocumentWriter::write() {
   return 0;
 }
 
-int32_t DocumentWriter::writeSection(const IniSection* section, const IniSection* previous) {
+template <class Lines>
+int32_t DocumentWriter<Lines>::writeSection(const IniSection* section, const IniSection* previous) {
   const bool fromFile = IniSectionWasReadFromFile(section);
   const bool isNull = IniSectionIsNull(section);
   int32_t status = 0;
-  if (tight() && !fromFile && IniSectionWasReadFromFile(previous)) status = m_output(m_stream, "");
+  if (tight() && !fromFile && IniSectionWasReadFromFile(previous)) status = writeEmptyLine();
   if (status >= 0 && !isNull) status = writeHeader(section);
-  for (int32_t n = 1; status >= 0 && n <= section->items.count(); ++n) {
-    status = writeItem(section->item(n));
+  ztini::NameNode** items = section->items.nodes();
+  for (int32_t n = 0; status >= 0 && n < section->items.count(); ++n) {
+    status = writeItem(static_cast<const IniEntry*>(items[n]));
   }
   if (status < 0) return status;
-  if (tight() && (fromFile || isNull)) return 0;
-  return m_output(m_stream, "");
+  return tight() && (fromFile || isNull) ? 0 : writeEmptyLine();
 }
 
-int32_t DocumentWriter::writeHeader(const IniSection* section) {
-  m_line.clear();
-  m_line.append('[').append(section->name).append(']');
-  return emitLine();
+template <class Lines>
+int32_t DocumentWriter<Lines>::writeEmptyLine() {
+  m_lines.begin();
+  return m_lines.end();
 }
 
-int32_t DocumentWriter::writeItem(const IniEntry* entry) {
-  const std::string_view name = entry->name, value = entry->value;
+template <class Lines>
+int32_t DocumentWriter<Lines>::writeHeader(const IniSection* section) {
+  m_lines.begin().append('[').append(section->name).append(']');
+  return m_lines.end();
+}
+
+template <class Lines>
+int32_t DocumentWriter<Lines>::writeItem(const IniEntry* entry) {
+  const std::string_view name = entry->nameText(), value = entry->valueText();
   const int64_t quotes = entry->quote ? 2 : 0;
   const int64_t nameLength = static_cast<int64_t>(name.size());
   const int64_t total =
@@ -80,19 +131,18 @@ int32_t DocumentWriter::writeItem(const IniEntry* entry) {
   if (m_doc->maxLineLength != -1 && total > m_doc->maxLineLength) {
     return writePieces(entry, m_doc->maxLineLength - nameLength - kPieceOverhead - quotes);
   }
-  m_line.clear();
-  m_line.append(name);
-  return emitValue(value, entry->quote);
+  return endWithValue(m_lines.begin().append(name), value, entry->quote);
 }
 
-int32_t DocumentWriter::writePieces(const IniEntry* entry, int64_t room) {
+template <class Lines>
+int32_t DocumentWriter<Lines>::writePieces(const IniEntry* entry, int64_t room) {
   if (room < 1) return kIniNoRoom;
-  std::string_view rest = entry->value;
+  std::string_view rest = entry->valueText();
   for (unsigned number = 1; !rest.empty(); ++number) {
     const size_t length = pieceLength(rest, static_cast<size_t>(room));
-    m_line.clear();
-    m_line.append(entry->name).append(" Line").appendNumber(number);
-    const int32_t status = emitValue(rest.substr(0, length), entry->quote);
+    ztini::TextBuffer& line = m_lines.begin();
+    line.append(entry->nameText()).append(" Line").appendNumber(number);
+    const int32_t status = endWithValue(line, rest.substr(0, length), entry->quote);
     if (status < 0) return status;
     rest.remove_prefix(length);
   }
@@ -101,30 +151,30 @@ int32_t DocumentWriter::writePieces(const IniEntry* entry, int64_t room) {
 
 // A last break character among the first `room` bytes ends the piece, even where exactly `room`
 // bytes are left.
-size_t DocumentWriter::pieceLength(std::string_view rest, size_t room) const {
+template <class Lines>
+size_t DocumentWriter<Lines>::pieceLength(std::string_view rest, size_t room) const {
   if (rest.size() < room) return rest.size();
   if (!m_doc->breakCharacter) return room;
   const size_t at = rest.substr(0, room).rfind(static_cast<char>(m_doc->breakCharacter));
   return at == std::string_view::npos ? room : at + 1;
 }
 
-int32_t DocumentWriter::emitValue(std::string_view value, int32_t quote) {
-  m_line.append(m_separator);
-  if (quote) m_line.append(static_cast<char>(quote));
-  m_line.append(value);
-  if (quote) m_line.append(static_cast<char>(quote));
-  return emitLine();
-}
-
-int32_t DocumentWriter::emitLine() {
-  return m_line.ok() ? m_output(m_stream, m_line.text()) : kIniOutOfMemory;
+template <class Lines>
+int32_t DocumentWriter<Lines>::endWithValue(ztini::TextBuffer& line, std::string_view value,
+                                            uint32_t quote) {
+  line.append(m_separator);
+  if (quote) line.append(static_cast<char>(quote));
+  line.append(value);
+  if (quote) line.append(static_cast<char>(quote));
+  return m_lines.end();
 }
 
 }  // namespace
 
 int32_t IniWrite(IniStructForwardReferenceTag* doc, IniLineOutputFunction output, void* stream) {
   if (!doc || !output) return 0;
-  return DocumentWriter(doc, output, stream).write();
+  FunctionLines lines(output, stream);
+  return DocumentWriter(doc, &lines).write();
 }
 
 int32_t ztini_WriteStringToFile(FILE* file, const char* text) {
@@ -138,32 +188,11 @@ int32_t IniFileOutputFunc(void* file, const char* line) {
   return status < 0 ? status : ztini_WriteStringToFile(stream, "\n");
 }
 
-namespace {
-
-struct FirstLine {
-  ztini::TextBuffer* text;
-  bool comes;
-};
-
-// A name may begin with the bytes of a byte order mark. As the first bytes of the file they would be
-// lost or get the whole file refused, so an empty line goes before them.
-int32_t AppendLine(void* state, const char* line) {
-  auto* first = static_cast<FirstLine*>(state);
-  if (first->comes && ztini::MarkIn(line, strnlen(line, 4)) != ztini::ByteOrderMark::kNone) {
-    first->text->append('\n');
-  }
-  first->comes = false;
-  first->text->append(line).append('\n');
-  return first->text->ok() ? 0 : kIniOutOfMemory;
-}
-
-}  // namespace
-
 int32_t ztini::IniRender(IniStructForwardReferenceTag* doc, TextBuffer* text) {
   const bool marked = (doc->writeOptions & kIniWriteMark) != 0;
-  FirstLine first = {text, !marked};
   if (marked) text->append(kUtf8Mark);
-  const int32_t status = IniWrite(doc, AppendLine, &first);
+  TextInMemory lines(text, marked);
+  const int32_t status = DocumentWriter(doc, &lines).write();
   if (status < 0) return status;
   return text->ok() ? 0 : kIniOutOfMemory;
 }
