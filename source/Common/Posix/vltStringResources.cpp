@@ -11,7 +11,16 @@
 
 namespace {
 
+// The early-trace lines of this file. Source and numbers are frozen; they do not follow the code.
 constexpr const char* kEarlyTraceSource = "./source/Utilities/../Common/Posix/vltlinuxos";
+enum EarlyTraceLine : long {
+  kNoInstallDirectory = 57,
+  kNoText = 120,
+  kNoFileName = 134,
+  kNoSection = 143,
+  kNoComponents = 152,
+};
+
 constexpr const char* kComponents = "KORComponents";
 constexpr size_t kFileNameSize = 260;
 
@@ -51,12 +60,11 @@ struct vltStringResources::Database {
   void answer(Question& q);
   bool fileNameOf(const char* section, std::string* base);
   bool take(Question& q, const char* section);
-  void walk(Question& q);
   void search(Question& q);
-  void index();
+  const char* indexNext(std::string* base);
 
   IniStructForwardReferenceTag* document;
-  bool indexed = false;
+  int32_t indexed = 0;  // items of the list that are in sectionsOf
   // Base name of a component's file to the sections that have it, in the order of the list.
   std::map<std::string, std::vector<std::string>, NameLess> sectionsOf;
 
@@ -74,7 +82,7 @@ struct vltStringResources::Database {
 bool vltStringResources::Database::fileNameOf(const char* section, std::string* base) {
   if (!IniSectionExists(document, section)) {
     if (Warns()) {
-      vltEarlyTrace(kEarlyTraceSource, 143,
+      vltEarlyTrace(kEarlyTraceSource, kNoSection,
                     "Warning: %s section has component %s but no section for this component in "
                     "vlt.vlr file",
                     kComponents, section);
@@ -86,7 +94,7 @@ bool vltStringResources::Database::fileNameOf(const char* section, std::string* 
   int32_t status = IniGetStringIntoBuffer(document, section, "FileName", file, sizeof file);
   if (status < 1) {
     if (Warns()) {
-      vltEarlyTrace(kEarlyTraceSource, 134,
+      vltEarlyTrace(kEarlyTraceSource, kNoFileName,
                     "Warning: Could not read file name from section %s, result = %d", section,
                     static_cast<int>(status));
     }
@@ -110,7 +118,7 @@ bool vltStringResources::Database::take(Question& q, const char* section) {
       q.joined += text.get();
       q.result = S_OK;
     } else if (Warns()) {
-      vltEarlyTrace(kEarlyTraceSource, 120,
+      vltEarlyTrace(kEarlyTraceSource, kNoText,
                     "Warning: Could not get string resource %s from section %s, result = %d",
                     q.key.c_str(), section, static_cast<int>(status));
     }
@@ -118,42 +126,33 @@ bool vltStringResources::Database::take(Question& q, const char* section) {
   return !q.separator;
 }
 
-void vltStringResources::Database::walk(Question& q) {
-  int32_t count = IniNumberOfItems(document, kComponents);
-  for (int32_t n = 1; n <= count; ++n) {
-    const char* section = nullptr;
-    std::string base;
-    if (IniNthItemName(document, kComponents, n, &section) != 1) continue;
-    if (!fileNameOf(section, &base) || base.empty()) continue;  // an empty name matches nothing
-    if (zt::fnd::osdep::StringCaseCompare(base.c_str(), q.target.c_str()) != 0) continue;
-    if (take(q, section)) return;
-  }
-}
-
-void vltStringResources::Database::index() {
-  if (indexed) return;
-  sectionsOf.clear();  // of an attempt that ran out of memory
-  int32_t count = IniNumberOfItems(document, kComponents);
-  for (int32_t n = 1; n <= count; ++n) {
-    const char* section = nullptr;
-    std::string base;
-    if (IniNthItemName(document, kComponents, n, &section) != 1) continue;
-    if (fileNameOf(section, &base) && !base.empty()) sectionsOf[base].push_back(section);
-  }
-  indexed = true;
+// Puts the next component of the list into the index. Returns its section and the base name of its file,
+// which is empty if it has none; null at the end of the list.
+const char* vltStringResources::Database::indexNext(std::string* base) {
+  base->clear();
+  const char* section = nullptr;
+  if (IniNthItemName(document, kComponents, indexed + 1, &section) != 1) return nullptr;
+  // An empty name matches nothing.
+  if (fileNameOf(section, base) && !base->empty()) sectionsOf[*base].push_back(section);
+  ++indexed;  // Last: out of memory leaves the component to the next question.
+  return section;
 }
 
 void vltStringResources::Database::answer(Question& q) {
   if (!document) return;
   if (IniSectionExists(document, kComponents) != 1) {
     if (Warns()) {
-      vltEarlyTrace(kEarlyTraceSource, 152, "Warning: There should always be %s", kComponents);
+      vltEarlyTrace(kEarlyTraceSource, kNoComponents, "Warning: There should always be %s",
+                    kComponents);
     }
     return;
   }
-  // The walk has each question repeat its warnings; without them the index gives the same answer.
-  if (Warns()) return walk(q);
-  index();
+  if (Warns()) {
+    // Each question repeats its warnings, up to where it ends.
+    indexed = 0;
+    sectionsOf.clear();
+    answers.clear();
+  }
   Kind kind(q.separator != nullptr, q.separator ? q.separator : "", q.key, q.maxLength);
   auto& known = answers[kind];
   if (auto found = known.find(q.target); found != known.end()) {
@@ -166,11 +165,18 @@ void vltStringResources::Database::answer(Question& q) {
   if (!q.outOfMemory) known.emplace(q.target, Answer{q.result, q.joined});
 }
 
+// The index first, and then what follows it in the list.
 void vltStringResources::Database::search(Question& q) {
-  auto found = sectionsOf.find(q.target);
-  if (found == sectionsOf.end()) return;
-  for (const std::string& section : found->second) {
-    if (take(q, section.c_str())) return;
+  if (auto found = sectionsOf.find(q.target); found != sectionsOf.end()) {
+    for (const std::string& section : found->second) {
+      if (take(q, section.c_str())) return;
+    }
+  }
+  std::string base;
+  while (const char* section = indexNext(&base)) {
+    bool matches =
+        !base.empty() && zt::fnd::osdep::StringCaseCompare(base.c_str(), q.target.c_str()) == 0;
+    if (matches && take(q, section)) return;
   }
 }
 
@@ -196,7 +202,7 @@ vltStringResources::Database* vltStringResources::databaseFor(const std::string&
   if (directory.empty()) {
     // An installation without a place; the file must not be looked for at the top of the system.
     if (vltGetTraceFlagsImpl() & kEarlyTraceMask) {
-      vltEarlyTrace(kEarlyTraceSource, 57,
+      vltEarlyTrace(kEarlyTraceSource, kNoInstallDirectory,
                     "Could not get path to KOR Data in getstringresourceimpl\n");
     }
     return nullptr;
