@@ -85,11 +85,9 @@ HRESULT GuardedIniFile::setAside() const {
 }
 
 bool GuardedIniFile::hasSidecar() const {
-  try {
-    return zt::fnd::osdep::path::DoesFileExist(String(m_sidecar.c_str()));
-  } catch (const std::exception&) {
-    return false;  // The mark that is written then does no harm, whatever is there.
-  }
+  // Where that cannot be said, the mark that is written does no harm, whatever is there.
+  return vlt::Attempt<std::exception>(
+      [&] { return zt::fnd::osdep::path::DoesFileExist(String(m_sidecar.c_str())); });
 }
 
 HRESULT GuardedIniFile::writeSidecar(const IniSidecar::Digest& digest,

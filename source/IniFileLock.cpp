@@ -11,6 +11,7 @@
 #include <string>
 
 #include "source/Cmd5vlt.h"
+#include "source/Common/vltResultOf.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/Mutex.h"
 #include "zt/fnd/osdep/ProcessMark.h"
@@ -207,15 +208,14 @@ bool IniFileLock::excludesOthers() const {
 
 bool IniFileLock::retake() {
   if (m_entry->process.isCurrent()) return m_entry->mutex && m_entry->mutex->retake();
-  try {
+  // A lock file that cannot be made excludes no other process.
+  return vlt::Attempt<std::exception>([&] {
     Entry* own = Table::Instance().tryAcquire(m_entry->mutexName);
     if (!own) return false;
     m_entry->mutex.reset();  // a copy of the parent's, whose lock stays
     m_entry = own;
     return true;
-  } catch (const std::exception&) {
-    return false;  // A lock file that cannot be made excludes no other process.
-  }
+  });
 }
 
 std::unique_ptr<IniFileLock> IniFileLock::ForFile(const char* fileName) {

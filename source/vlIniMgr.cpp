@@ -29,7 +29,6 @@ using zt::posix::ScopedFd;
 
 namespace {
 
-constexpr unsigned kDigestSize = 16;
 constexpr int32_t kReadOptions =
     kIniReadDoubleQuotes | kIniReadSingleQuotes | 16;  // 16 is idle here
 constexpr int32_t kWriteOptions = kIniWriteSafely | kIniWriteSpaces | kIniWriteTight;
@@ -63,11 +62,9 @@ HRESULT CopyOut(const char* value, std::string* out) {
 }
 
 void SetAsideIfPossible(const std::string& fileName) {
-  try {
-    CvlIniMgr::SetAside(String(fileName.c_str()));
-  } catch (const zt::fnd::exception::Exception&) {
-    // The caller is about to throw anyway; a file that cannot be set aside is met again next time.
-  }
+  // The caller is about to throw anyway; a file that cannot be set aside is met again next time.
+  vlt::Attempt<zt::fnd::exception::Exception>(
+      [&] { CvlIniMgr::SetAside(String(fileName.c_str())); });
 }
 
 void MoveAside(const std::string& file, const std::string& stamp) {
@@ -108,11 +105,9 @@ CvlIniMgr::~CvlIniMgr() {
   if (m_lockOnly) return;
   if (m_ini && m_saveOnDestroy) Write();
   DisposeDocument();
-  try {
-    vlrSetFileSecurity(String(m_fileName.c_str()), kSharedMode);
-  } catch (const std::exception&) {
-    // A destructor cannot report it; the next opening sets the mode again.
-  }
+  // A destructor cannot report it; the next opening sets the mode again.
+  vlt::Attempt<std::exception>(
+      [&] { vlrSetFileSecurity(String(m_fileName.c_str()), kSharedMode); });
 }
 
 void CvlIniMgr::Initialize(unsigned char const* digest) {
@@ -135,13 +130,12 @@ void CvlIniMgr::Initialize(unsigned char const* digest) {
 }
 
 void CvlIniMgr::CreateFile() {
-  try {
+  // If the directory is really missing the file cannot be made either, and that is reported.
+  vlt::Attempt<zt::fnd::exception::Exception>([&] {
     String directory = path::DirName(String(m_fileName.c_str()));
     path::MakePathEndInSlash(directory);
     vltMakeSharedDirectory(directory);
-  } catch (const zt::fnd::exception::Exception&) {
-    // If the directory is really missing the file cannot be made either, and that is reported.
-  }
+  });
   m_dirty = true;
   // A file that another process has created since the check is used as it is.
   ScopedFd fd = zt::posix::CreateNew(m_fileName.c_str(), O_RDWR, kNewFileMode);
@@ -166,15 +160,14 @@ void CvlIniMgr::GetMD5Checksum(const unsigned char* data, unsigned long lengthBy
 
 bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest) const {
   if (!digest) return true;
-  try {
+  // What cannot be checked is not accepted.
+  return vlt::Attempt<std::bad_alloc>([&] {
     std::vector<unsigned char> data;
     if (!ReadWhole(fd, GetFileLength(fd), &data)) return false;
-    unsigned char found[kDigestSize];
-    GetMD5Checksum(data.data(), data.size(), found);
-    return memcmp(found, digest, kDigestSize) == 0;
-  } catch (const std::bad_alloc&) {
-    return false;  // What cannot be checked is not accepted.
-  }
+    IniSidecar::Digest found;
+    GetMD5Checksum(data.data(), data.size(), found.data());
+    return memcmp(found.data(), digest, found.size()) == 0;
+  });
 }
 
 int32_t CvlIniMgr::InitializeIniBindings() {

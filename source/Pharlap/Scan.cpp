@@ -5,6 +5,7 @@
 #include <utility>
 #include <vector>
 
+#include "source/Common/vltResultOf.h"
 #include "source/Pharlap/registrarText.h"
 #include "source/Pharlap/registrationFiles.h"
 #include "source/vlIniMgr.h"
@@ -65,14 +66,9 @@ void Scan::setStamp(const std::string& file, const zt::fnd::AbsTime& time) {
 }
 
 bool Scan::openFragment(const std::string& file) {
-  try {
-    m_fragment.reset(new CvlIniMgr(CvlIniMgr::OpenForUpdate(file)));
-    return true;
-  } catch (...) {
-    // A file that cannot be parsed has been set aside by its manager already. Any other reason - no
-    // memory, no descriptor - says nothing about the file, which stays.
-    return false;
-  }
+  // A file that cannot be parsed has been set aside by its manager already. Any other reason - no
+  // memory, no descriptor - says nothing about the file, which stays.
+  return vlt::Attempt([&] { m_fragment.reset(new CvlIniMgr(CvlIniMgr::OpenForUpdate(file))); });
 }
 
 std::unique_ptr<CvlIniMgr> Scan::takeFragment(const std::string& file) {

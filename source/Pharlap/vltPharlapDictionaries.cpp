@@ -2,6 +2,7 @@
 #include <string.h>
 
 #include "source/Common/vltFileSecurity.h"
+#include "source/Common/vltResultOf.h"
 #include "source/Common/vltcmn.h"
 #include "source/Pharlap/registrarText.h"
 #include "source/Pharlap/vltPharlapRegistrar.h"
@@ -148,11 +149,9 @@ HRESULT CvltPharlapRegistrar::previousDictionariesFolder(String* folder) {
   if (result < 0) return result;
   *folder = path::Join(*folder, String(L"Last"));
   path::MakePathEndInSlash(*folder);
-  try {
-    return vltMakeSharedDirectory(*folder);
-  } catch (const zt::fnd::exception::AccessDenied&) {
-    return E_FAIL;  // A result of the interface, not an error of the caller's program.
-  }
+  // A result of the interface, not an error of the caller's program.
+  return vlt::ResultOf<zt::fnd::exception::AccessDenied>(
+      E_FAIL, [&] { return vltMakeSharedDirectory(*folder); });
 }
 
 HRESULT CvltPharlapRegistrar::GetPrevDictsLastFolder(Vector<String>& names) {
@@ -196,10 +195,9 @@ HRESULT CvltPharlapRegistrar::RemovePreviousDictionaries(const _vltStartupOption
   HRESULT result = GetPrevDictsLastFolder(names);
   if (result < 0) return result;
   auto remove = [&result](const String& file) {
-    try {
-      path::RemoveFile(file);
-    } catch (const zt::fnd::exception::Exception&) {
-      result = E_FAIL;  // The others can still go.
+    // The others can still go.
+    if (!vlt::Attempt<zt::fnd::exception::Exception>([&] { path::RemoveFile(file); })) {
+      result = E_FAIL;
     }
   };
   for (const String& name : names) remove(name);

@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "source/Common/vltFileSecurity.h"
+#include "source/Common/vltResultOf.h"
 #include "source/Common/vltcmn.h"
 #include "source/Pharlap/registrarText.h"
 #include "vlloader/source/vlloader.h"
@@ -48,12 +49,9 @@ HRESULT vlrMakeRootDirectory(const wchar_t* name, String* directory) {
   if (directory->empty()) return E_FAIL;
   *directory += name;
   path::MakePathEndInSlash(*directory);
-  try {
-    return vltMakeSharedDirectory(*directory);
-  } catch (const zt::fnd::exception::AccessDenied&) {
-    // A client without the rights still reads what another user's process has registered.
-    return E_FAIL;
-  }
+  // A client without the rights still reads what another user's process has registered.
+  return vlt::ResultOf<zt::fnd::exception::AccessDenied>(
+      E_FAIL, [&] { return vltMakeSharedDirectory(*directory); });
 }
 
 CvltPharlapRegistrar::CvltPharlapRegistrar(const String& registrationFilePath,

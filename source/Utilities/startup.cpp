@@ -9,6 +9,7 @@
 
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/Common/ZtUtils/General/vlTracer.h"
+#include "source/Common/vltResultOf.h"
 #include "source/Utilities/vltRegistrarEntry.h"
 #include "zt/fnd/String.h"
 #include "ztini/ztini.h"
@@ -35,19 +36,11 @@ void StartTracer() {
   atexit(vlTracer::Cleanup);
 }
 
-// Runs one step. Nothing that fails while loading may end the host, which has not called anything
-// yet; what could not be made is made at the first call, and fails there, or is done without.
-template <class Step>
-void Attempt(Step step) {
-  try {
-    step();
-  } catch (...) {
-  }
-}
-
+// Nothing that fails while loading may end the host, which has not called anything yet; what could not be
+// made is made at the first call, and fails there, or is done without.
 __attribute__((constructor)) void StartUp() {
-  Attempt(StartTracer);
-  Attempt(vlPrepareRegistrarEntry);
+  vlt::Attempt(StartTracer);
+  vlt::Attempt(vlPrepareRegistrarEntry);
 }
 
 }  // namespace

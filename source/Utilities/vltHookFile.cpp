@@ -5,6 +5,7 @@
 #include <new>
 #include <string>
 
+#include "source/Common/vltResultOf.h"
 #include "source/Common/vltTestHook.h"
 #include "source/Utilities/vltutils.h"
 #include "source/vlIniMgr.h"
@@ -43,23 +44,22 @@ vlt::hook::Faults FaultsOf(const CvlIniMgr& ini) {
   return faults;
 }
 
+void ArmFromFile() {
+  const char* directory = GetCurrentVltPath();
+  if (!directory) return;
+  String file(directory);
+  zt::fnd::osdep::path::MakePathEndInSlash(file);
+  file += L"VLTHooks.ini";
+  if (!zt::fnd::osdep::path::DoesFileExist(file)) return;
+  CvlIniMgr ini = CvlIniMgr::OpenRaw(zt::fnd::AnsiString(file).c_str());
+  std::string name;
+  if (ini.GetItem("Hook", "Name", &name) >= 0) vlt::hook::Arm(name, FaultsOf(ini));
+}
+
 }  // namespace
 
-void vltRefreshHook() {
-  try {
-    const char* directory = GetCurrentVltPath();
-    if (!directory) return;
-    String file(directory);
-    zt::fnd::osdep::path::MakePathEndInSlash(file);
-    file += L"VLTHooks.ini";
-    if (!zt::fnd::osdep::path::DoesFileExist(file)) return;
-    CvlIniMgr ini = CvlIniMgr::OpenRaw(zt::fnd::AnsiString(file).c_str());
-    std::string name;
-    if (ini.GetItem("Hook", "Name", &name) >= 0) vlt::hook::Arm(name, FaultsOf(ini));
-  } catch (...) {
-    // The process under test must not notice a bad hook file; it is simply not armed.
-  }
-}
+// The process under test must not notice a bad hook file; it is simply not armed.
+void vltRefreshHook() { vlt::Attempt(ArmFromFile); }
 
 namespace {
 
@@ -108,15 +108,10 @@ void exhaustMemory() {
   uint32_t limit = state.s_entryNum == 1 || state.s_increaseChunkSize ? 10 : 1000;
   uint32_t i = 0;
   for (;;) {
-    bool stop;
-    try {
-      TakeChunk(state.s_chunkSize);
-      stop = Grow(state, i, &limit);
-      ++i;
-    } catch (const std::bad_alloc&) {
-      // What this is for: the heap refuses, and smaller blocks have their turn.
-      stop = Shrink(state);
-    }
+    // What this is for: the heap refuses, and smaller blocks have their turn.
+    bool taken = vlt::Attempt<std::bad_alloc>([&] { TakeChunk(state.s_chunkSize); });
+    bool stop = taken ? Grow(state, i, &limit) : Shrink(state);
+    if (taken) ++i;
     if (stop) return;
   }
 }

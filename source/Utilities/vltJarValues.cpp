@@ -4,6 +4,7 @@
 #include <stdlib.h>
 
 #include "source/Common/vltFileSecurity.h"
+#include "source/Common/vltResultOf.h"
 #include "source/Common/vltcmn.h"
 #include "source/Utilities/vltjar.h"
 #include "source/Utilities/vltutils.h"
@@ -47,11 +48,9 @@ HRESULT PrepareDataDirectory(String& dataDir) {
   if (!dataDir.empty()) return S_OK;
   dataDir = DataDirectory();
   if (dataDir.empty()) return E_FAIL;
-  try {
-    return vltMakeSharedDirectory(dataDir);
-  } catch (const zt::fnd::exception::AccessDenied&) {
-    return E_FAIL;  // A result of the exports, not an error of the caller's program.
-  }
+  // A result of the exports, not an error of the caller's program.
+  return vlt::ResultOf<zt::fnd::exception::AccessDenied>(
+      E_FAIL, [&] { return vltMakeSharedDirectory(dataDir); });
 }
 
 bool DirectoryIsUnknown(const String& directory) {

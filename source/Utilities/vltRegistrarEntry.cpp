@@ -6,6 +6,7 @@
 
 #include "source/Common/vltFailure.h"
 #include "source/Common/vltHookPoints.h"
+#include "source/Common/vltResultOf.h"
 #include "source/Common/vltTestHook.h"
 #include "source/Posix/vltLinuxRegistrar.h"
 #include "source/Utilities/vltCheck.h"
@@ -68,13 +69,10 @@ class InProgress {
 };
 
 bool LookUp(const char* failure, std::string* directory) {
-  try {
-    *directory = vlLookUpInstallDirectory();
-    return true;
-  } catch (const std::exception&) {
-    vltTraceError("%s", failure);  // The caller has a result for this, and nothing was begun yet.
-    return false;
-  }
+  // The caller has a result for a failure, and nothing was begun yet.
+  if (vlt::Attempt<std::exception>([&] { *directory = vlLookUpInstallDirectory(); })) return true;
+  vltTraceError("%s", failure);
+  return false;
 }
 
 constexpr const char* kGetRegistrar2Signature =

@@ -6,6 +6,7 @@
 #include <memory>
 #include <string>
 
+#include "source/Common/vltResultOf.h"
 #include "source/Common/vltcmn.h"
 #include "source/Utilities/vltjar.h"
 #include "source/Utilities/vltutils.h"
@@ -34,12 +35,8 @@ constinit std::atomic<const std::wstring*> s_localServer{nullptr};
 HRESULT ReadPort(std::string* port) {
   String file = path::Join(path::DirName(String(g_ModulePath)), String(L"kor.ini"));
   std::unique_ptr<CvlIniMgr> ini;
-  HRESULT result = E_FAIL;
-  try {
-    result = VltjarOpen(file.c_str(), &ini);
-  } catch (int) {
-    return E_FAIL;  // A directory that cannot be written is no reason to fail the caller otherwise.
-  }
+  // A directory that cannot be written is no reason to fail the caller otherwise.
+  HRESULT result = vlt::ResultOf<int>(E_FAIL, [&] { return VltjarOpen(file.c_str(), &ini); });
   if (ini && ini->GetItem("STORAGE", "LocalServerEndpoint3", port) < 0) *port = kDefaultEndpoint;
   return result;
 }
