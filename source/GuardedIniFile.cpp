@@ -13,8 +13,6 @@ using zt::fnd::String;
 
 namespace {
 
-unsigned Pass(const char* point) { return point ? vltTestHook(point) : 0; }
-
 void Trace(const char* message) {
   if (message) vltTraceError("%s", message);
 }
@@ -31,7 +29,7 @@ std::unique_ptr<CvlIniMgr> GuardedIniFile::create(const char* point,
   if (!m_kind.openSignature) {
     return std::make_unique<CvlIniMgr>(m_file.c_str(), false, digest, false, m_kind.useEscapes);
   }
-  if (Pass(point)) return nullptr;
+  if (vltTestHook(point)) return nullptr;
   return std::unique_ptr<CvlIniMgr>(
       new (std::nothrow) CvlIniMgr(m_file.c_str(), false, digest, false, m_kind.useEscapes));
 }
@@ -57,15 +55,15 @@ HRESULT GuardedIniFile::open(std::unique_ptr<CvlIniMgr>* out) const {
 }
 
 HRESULT GuardedIniFile::save(CvlIniMgr& ini) const {
-  // Without the mark, a crash in the first save would leave a file that looks as if it had never had a
-  // sidecar, and so cannot be told from a whole one.
+  // Without the mark, a crash in the first save would leave a file that looks as if it had never
+  // had a sidecar, and so cannot be told from a whole one.
   if (!hasSidecar()) writeSidecar(IniSidecar::kInvalidMark, ini.durability());
   IniSidecar::Digest digest;
   HRESULT result = ini.WriteAndGetDigest(&digest);
-  Pass(m_kind.writtenPoint);
+  vltTestHook(m_kind.writtenPoint);
   if (result < 0) return result;
   result = writeSidecar(digest, ini.durability());
-  Pass(m_kind.sealedPoint);
+  vltTestHook(m_kind.sealedPoint);
   return result;
 }
 

@@ -9,17 +9,17 @@
 // What differs between the kinds of guarded files. The texts are static; a null one is left out.
 struct GuardedIniKind {
   bool useEscapes;  // as CvlIniMgr takes it
-  // Result of a step that the system did not refuse and that failed all the same: out of memory, or a
-  // relative path where a full one is needed.
+  // Result of a step that the system did not refuse and that failed all the same: out of memory, or
+  // a relative path where a full one is needed.
   HRESULT otherFailure;
   // Lines of the log for a file that cannot be set aside: where the system refuses, and otherwise.
   const char* refusedMessage;
   const char* otherFailureMessage;
-  // Function that an opening reports as out of memory, with the result E_OUTOFMEMORY. Null: the opening
-  // throws std::bad_alloc.
+  // Function that an opening reports as out of memory, with the result E_OUTOFMEMORY. Null: the
+  // opening throws std::bad_alloc.
   const char* openSignature;
-  // Hook points (source/Common/vltHookPoints.h) in the order in which they are passed. An answer other
-  // than 0 at the first two means out of memory.
+  // Hook points (source/Common/vltHookPoints.h) in the order in which they are passed. An answer
+  // other than 0 at the first two means out of memory.
   const char* openPoint;
   const char* retryPoint;    // before the second opening
   const char* writtenPoint;  // the file is written, its sidecar is old
@@ -28,17 +28,17 @@ struct GuardedIniKind {
 
 // An INI file with its sidecar (source/IniSidecar.h): how both are opened, saved and set aside.
 //
-//   found at open                 | *out               | result
-//   no sidecar                    | the file as it is  | S_OK
-//   the digest matches            | the file           | S_OK
-//   the digest differs            | the file as it is  | S_OK; the old sidecar stays until a save
-//   the file cannot be parsed     | an empty file      | S_OK; the old one is set aside
-//   the sidecar is short          | an empty file      | E_FAIL; the old one is set aside if possible
-//   the sidecar cannot be read    | null               | E_FAIL; nothing is known of the file, which
-//   at the moment                 |                    | stays
+//   found at open              | *out              | result
+//   no sidecar                 | the file as it is | S_OK
+//   the digest matches         | the file          | S_OK
+//   the digest differs         | the file as it is | S_OK; a save repairs the sidecar
+//   the file cannot be parsed  | an empty file     | S_OK; the old one is set aside
+//   the sidecar is short       | an empty file     | E_FAIL; the old one is set aside, if possible
+//   the sidecar cannot be read | null              | E_FAIL; nothing is known of the file, and it
+//   at the moment              |                   | stays
 //
-// A crash at any moment of a save leaves the old or the new file, with a sidecar that matches it or one
-// that cannot match: never a file that looks as if it had not been guarded.
+// A crash at any moment of a save leaves the old or the new file, with a sidecar that matches it or
+// one that cannot match: never a file that looks as if it had not been guarded.
 //
 // Threads: the object is constant; save is for the thread that the manager belongs to.
 class GuardedIniFile {
@@ -46,16 +46,17 @@ class GuardedIniFile {
   // `kind` is kept by reference. Throws std::bad_alloc.
   GuardedIniFile(std::string file, const GuardedIniKind& kind);
 
-  // Waits for other processes without limit. Sets *out, whose earlier object is destroyed first. Throws
-  // what the second opening throws, the int 1 of CvlIniMgr included; *out is null then.
+  // Waits for other processes without limit. Sets *out, whose earlier object is destroyed first.
+  // Throws what the second opening throws, the int 1 of CvlIniMgr included; *out is null then.
   HRESULT open(std::unique_ptr<CvlIniMgr>* out) const;
 
-  // Writes file and sidecar, as durable as the manager writes. Results are those of the file, or of the
-  // sidecar if that cannot be written: the file is the new one then, and the next opening takes it.
+  // Writes file and sidecar, as durable as the manager writes. Results are those of the file, or of
+  // the sidecar if that cannot be written: the file is the new one then, and the next opening takes
+  // it.
   HRESULT save(CvlIniMgr& ini) const;
 
-  // Renames the file and removes the sidecar (CvlIniMgr::SetAside). E_FAIL where the system refuses.
-  // The caller holds the file's lock.
+  // Renames the file and removes the sidecar (CvlIniMgr::SetAside). E_FAIL where the system
+  // refuses. The caller holds the file's lock.
   HRESULT setAside() const;
 
   // False for an inaccessible sidecar, too: a failed write of the mark is ignored.

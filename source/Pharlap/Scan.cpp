@@ -98,8 +98,8 @@ void Scan::eraseComponentsOf(const std::string& file) {
 bool Scan::isMerged(const CvlIniMgr& fragment, const std::string& section) {
   // Written without a header, so that its items would fall to whichever section comes before.
   if (section == kHeaderless) return false;
-  // A component that is named like a section of the database itself must not overlay it. The list of
-  // components is one of those, and is extended.
+  // A component that is named like a section of the database itself must not overlay it. The list
+  // of components is one of those, and is extended.
   return !IsReserved(section) || SameName(section, kComponents) ||
          fragment.ItemExists(kComponents, section.c_str()) < 0;
 }
@@ -148,8 +148,8 @@ void Scan::erase(const std::string& component, const std::string& file) {
   if (!path::IsAbs(Widen(file))) m_droppedPlanted = true;
   if (!IsReserved(component)) m_database.EraseSection(component.c_str());
   m_database.EraseItem(kComponents, component.c_str());
-  // The file may be registered by its whole path or by its bare name, which follows the last separator of
-  // either system.
+  // The file may be registered by its whole path or by its bare name, which follows the last
+  // separator of either system.
   size_t separator = file.rfind('\\');
   if (separator == std::string::npos) separator = file.rfind('/');
   m_database.EraseItem(kRegistrations, file.substr(separator + 1).c_str());

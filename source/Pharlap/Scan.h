@@ -13,12 +13,12 @@ class CvlIniMgr;
 
 namespace registrar {
 
-// What one comparison of the installation with the database knows, and the changes of the database that
-// it makes. Lives for one CvltPharlapRegistrar::UpdateRegistrationFile, which drives it.
+// What one comparison of the installation with the database knows, and the changes of the database
+// that it makes. Lives for one CvltPharlapRegistrar::UpdateRegistrationFile, which drives it.
 //
-// Changes the open document only; saving is the caller's. Results of single changes are dropped: what
-// could not be set now is missing in the database, and the file is merged again when it changes.
-// Threads: one.
+// Changes the open document only; saving is the caller's. Results of single changes are dropped:
+// what could not be set now is missing in the database, and the file is merged again when it
+// changes. Threads: one.
 class Scan {
  public:
   // The database stays open as long as the object lives.
@@ -31,8 +31,8 @@ class Scan {
   bool isUpToDate(const std::string& file, const zt::fnd::AbsTime& time);
   void setStamp(const std::string& file, const zt::fnd::AbsTime& time);
 
-  // Opens the registration file for takeFragment. False if it cannot be used. One that cannot be parsed
-  // has been set aside then; any other failure leaves it.
+  // Opens the registration file for takeFragment. False if it cannot be used. One that cannot be
+  // parsed has been set aside then; any other failure leaves it.
   bool openFragment(const std::string& file);
   // The file that was opened last; opens it if there is none. Null if it cannot be used.
   std::unique_ptr<CvlIniMgr> takeFragment(const std::string& file);
@@ -40,11 +40,11 @@ class Scan {
   // Erases what the database has from the file.
   void eraseComponentsOf(const std::string& file);
 
-  // Whether the section is merged: it has a header, and is no component that is named like a section of
-  // the database itself. The list of components is merged, too.
+  // Whether the section is merged: it has a header, and is no component that is named like a
+  // section of the database itself. The list of components is merged, too.
   static bool isMerged(const CvlIniMgr& fragment, const std::string& section);
-  // Copies the items of one section of the registration file; `changed` becomes the mark of a dictionary.
-  // True if it has a file name.
+  // Copies the items of one section of the registration file; `changed` becomes the mark of a
+  // dictionary. True if it has a file name.
   bool mergeSection(const CvlIniMgr& fragment, const zt::fnd::String& installDirectory,
                     const std::string& file, const std::string& section, bool changed);
 
@@ -52,7 +52,8 @@ class Scan {
   bool isPresent(const std::string& file) const;
   // Erases a component whose registration file is gone, but for its items in the list of contents.
   void erase(const std::string& component, const std::string& file);
-  // Whether an entry was erased that no file can stand for: such must not come back with the next start.
+  // Whether an entry was erased that no file can stand for: such must not come back with the next
+  // start.
   bool droppedPlanted() const { return m_droppedPlanted; }
 
  private:
