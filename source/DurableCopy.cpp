@@ -85,8 +85,8 @@ bool DurableCopy::isLeft() const {
 }
 
 bool DurableCopy::begin() {
-  // One that a process has left which did not finish is older than what the file holds now, but no value
-  // has been promised since. It stays what counts until everything is on disk.
+  // One that a process has left which did not finish is older than what the file holds now, but no
+  // value has been promised since. It stays what counts until everything is on disk.
   m_pending = isLeft();
   if (m_pending) {
     syncDirectory();
@@ -134,7 +134,8 @@ bool DurableCopy::takeUp(const std::string& file) {
   // rename() does nothing where both are names of one file.
   int result = SameFile(file, copy) ? zt::posix::Unlink(copy.c_str())
                                     : zt::posix::Rename(copy.c_str(), file.c_str());
-  // Without the right to do it the file is used as it is, like any other whose sidecar does not match.
+  // Without the right to do it the file is used as it is, like any other whose sidecar does not
+  // match.
   if (result != 0) return errno == EACCES || errno == EPERM || errno == EROFS;
   zt::posix::SyncDirectoryOf(file.c_str());
   return true;

@@ -149,7 +149,8 @@ TEST(DurableCopy, TakeUpFailsWhereItCannotRead) {
   EXPECT_EQ(ReadBytes(place.copy), "durable");
 }
 
-// Other users can write to the directory. What no save leaves must keep no process from its database.
+// Other users can write to the directory. What no save leaves must keep no process from its
+// database.
 TEST(DurableCopy, WhatIsNoFileOfItsOwnIsOutOfTheWay) {
   for (bool matches : {true, false}) {
     for (bool isDirectory : {true, false}) {

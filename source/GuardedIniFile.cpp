@@ -56,7 +56,7 @@ HRESULT GuardedIniFile::open(std::unique_ptr<CvlIniMgr>* out) const {
 
 HRESULT GuardedIniFile::save(CvlIniMgr& ini) const {
   // Without the mark, a crash in the first save would leave a file that looks as if it had never
-  // had a sidecar, and so cannot be told from a whole one.
+  // had a sidecar, and so looks like a whole one.
   if (!hasSidecar()) writeSidecar(IniSidecar::kInvalidMark, ini.durability());
   IniSidecar::Digest digest;
   HRESULT result = ini.WriteAndGetDigest(&digest);

@@ -46,7 +46,7 @@ void AppendToName(std::string* name, unsigned char byte) {
   }
 }
 
-// The directory of the locks may be made by two processes at once, and one of them is told so.
+// Two processes may make the directory of the locks at once; one of them then gets an exception.
 std::unique_ptr<zt::fnd::osdep::Mutex> CreateMutex(const String& name) {
   try {
     return std::make_unique<zt::fnd::osdep::Mutex>(name);
@@ -61,7 +61,7 @@ struct IniFileLock::Entry {
   std::string name;  // key of the table
   String mutexName;
   zt::fnd::osdep::ProcessMark process;
-  std::unique_ptr<zt::fnd::osdep::Mutex> mutex;  // present while somebody owns the lock
+  std::unique_ptr<zt::fnd::osdep::Mutex> mutex;  // present while the lock is owned
   uint64_t owner = kNobody;
   unsigned depth = 0;
   unsigned users = 0;  // owners and those that wait
@@ -178,8 +178,8 @@ void IniFileLock::Table::release(Entry* entry) {
     return;
   }
   auto mutex = std::move(entry->mutex);
-  // The owner is another thread where a hold ends on a thread that did not begin it, and must wait as
-  // all others do.
+  // The owner is another thread where a hold ends on a thread that did not begin it, and must wait
+  // as all others do.
   entry->owner = kReleasing;
   hold.unlock();
   mutex->unlock();
@@ -230,8 +230,8 @@ std::unique_ptr<IniFileLock> IniFileLock::ForFile(const char* fileName) {
 String IniFileLock::NameForFile(const char* fileName) {
   constexpr size_t kLongestEntry = 255;
   constexpr size_t kKept = 200;
-  // By the bytes of the path, as the kernel has it: the locale, which would fold and convert them, is
-  // not the same in all processes.
+  // By the bytes of the path, as the kernel has it: the locale, which would fold and convert them,
+  // is not the same in all processes.
   std::string name;
   for (; fileName && *fileName; ++fileName)
     AppendToName(&name, static_cast<unsigned char>(*fileName));

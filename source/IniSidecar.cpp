@@ -42,7 +42,8 @@ bool Create(const std::string& sidecar, const Digest& digest, bool durable) {
     if (!fd) return false;
     // Before the rename, so that a kill right after it leaves no sidecar that others cannot write.
     zt::posix::SetSharedMode(fd.get(), kSharedMode);
-    // Always synced: a rename that outlives its file's bytes in a power cut would leave a short one.
+    // Always synced: a rename that outlives its file's bytes in a power cut would leave a short
+    // one.
     if (!Overwrite(fd.get(), digest, true) ||
         zt::posix::Rename(temporary.c_str(), sidecar.c_str()) != 0) {
       zt::posix::Unlink(temporary.c_str());
@@ -73,7 +74,8 @@ HRESULT Write(const std::string& sidecar, const Digest& digest, bool durable) {
   if (!fd) return errno == ENOENT && Create(sidecar, digest, durable) ? S_OK : E_FAIL;
   struct stat info;
   if (fstat(fd.get(), &info) != 0) return E_FAIL;
-  // A file that has a second name elsewhere is not overwritten: the new one takes this name from it.
+  // A file that has a second name elsewhere is not overwritten: the new one takes this name from
+  // it.
   if (info.st_nlink > 1) return Create(sidecar, digest, durable) ? S_OK : E_FAIL;
   if (!Overwrite(fd.get(), digest, durable)) return E_FAIL;
   zt::posix::SetSharedMode(fd.get(), kSharedMode);

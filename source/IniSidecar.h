@@ -8,9 +8,9 @@
 
 // The sidecar of a guarded INI file: 16 bytes, the MD5 of every byte of the file.
 //
-// Written in place, so that at no moment a shorter one can be found: a short sidecar means that the file
-// beside it cannot be trusted, while an old one does no harm. The caller holds the file's lock. A sidecar
-// is neither read nor written through a symbolic link in its own place.
+// Written in place, so that at no moment a shorter one can be found: a short sidecar means that the
+// file beside it cannot be trusted, while an old one does no harm. The caller holds the file's
+// lock. A sidecar is neither read nor written through a symbolic link in its own place.
 namespace IniSidecar {
 
 inline constexpr unsigned kSizeBytes = 16;

@@ -40,11 +40,11 @@ ScopedFd OpenForReading(const std::string& fileName) {
   return zt::posix::OpenExisting(fileName.c_str(), O_RDONLY, zt::posix::Kind::FileOrDirectory);
 }
 
-// The machine could not open or read the file now: no memory, no descriptors, no right, a failing disk.
-// The one status of a parser is left over: a file in an encoding that cannot be read.
+// The machine could not open or read the file now: no memory, no descriptors, no right, a failing
+// disk. The one status of a parser is left over: a file in an encoding that cannot be read.
 bool ConcernsTheContents(int32_t status) { return status == kIniUnsupportedEncoding; }
 
-// The whole file; false if it could not be read to the told length.
+// The whole file; false if it could not be read to its length.
 bool ReadWhole(int fd, int32_t lengthBytes, std::vector<unsigned char>* data) {
   if (lengthBytes < 0) return false;
   data->resize(static_cast<size_t>(lengthBytes));
@@ -120,8 +120,8 @@ void CvlIniMgr::Initialize(unsigned char const* digest) {
     // By the path, so that what a link leads to keeps its mode.
     zt::posix::SetSharedMode(m_fileName.c_str(), kSharedMode);
   } else if (errno == ENOENT) {
-    // Only a file that is not there is a new one: one that cannot be opened just now, because of missing
-    // descriptors for example, must not be begun again.
+    // Only a file that is not there is a new one: one that cannot be opened just now, because of
+    // missing descriptors for example, must not be begun again.
     CreateFile();
   }
   int32_t status = InitializeIniBindings();
@@ -144,8 +144,8 @@ void CvlIniMgr::CreateFile() {
 
 int32_t CvlIniMgr::GetFileLength(int fd) {
   struct stat info;
-  // Only regular files have a length. Those that cannot be parsed for their size are not read for their
-  // digest either: any user can make one that large.
+  // Only regular files have a length. Those that cannot be parsed for their size are not read for
+  // their digest either: any user can make one that large.
   if (fstat(fd, &info) != 0 || !S_ISREG(info.st_mode)) return -1;
   if (info.st_size > ztini::kLargestFileBytes) return -1;
   return static_cast<int32_t>(info.st_size);
@@ -177,7 +177,8 @@ int32_t CvlIniMgr::InitializeIniBindings() {
   IniSetWriteOptions(fresh, kNoLineLimit, ' ', kWriteOptions);
   IniSetDurability(fresh, m_durability);
   int32_t status = IniReadFromFile(fresh, m_fileName.c_str());
-  // What is held stays, whatever the status: the next save would otherwise replace the file by less.
+  // What is held stays, whatever the status: the next save would otherwise replace the file by
+  // less.
   if (m_ini && status != 0) {
     IniDispose(fresh);
     return status;
@@ -214,8 +215,8 @@ void CvlIniMgr::SetAside(const String& fileName) {
   std::string file = AnsiString(fileName).c_str();
   std::string stamp = AnsiString(vlrGetCurrentLocalTime()).c_str();
   std::string sidecar = SidecarName(file);
-  // A directory in the sidecar's place goes first. Left there, it would have every later opening set the
-  // file aside once more.
+  // A directory in the sidecar's place goes first. Left there, it would have every later opening
+  // set the file aside once more.
   if (path::IsDirectory(String(sidecar.c_str()).c_str())) MoveAside(sidecar, stamp);
   if (path::DoesFileExist(fileName)) MoveAside(file, stamp);
   if (path::DoesFileExist(String(sidecar.c_str())) && zt::posix::Unlink(sidecar.c_str()) != 0) {

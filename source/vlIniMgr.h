@@ -14,7 +14,7 @@
 //
 // From construction to destruction the object holds the file's named lock, so that reading,
 // checking and rewriting are one critical section among all processes; the lock is recursive within
-// a thread. Beside the file stands its sidecar, NAME.vl5: the 16 raw bytes of the MD5 of every byte
+// a thread. Beside the file is its sidecar, NAME.vl5: the 16 raw bytes of the MD5 of every byte
 // of the file.
 //
 //   found at construction              | what happens
@@ -32,7 +32,8 @@
 // Threads: an object belongs to one at a time; any may destroy it.
 class CvlIniMgr {
  public:
-  // The usual ways to open a file, without a check of its digest. They throw what the constructor throws.
+  // The usual ways to open a file, without a check of its digest. They throw what the constructor
+  // throws.
 
   // Values are in the escape encoding. The caller saves what it changes.
   static CvlIniMgr OpenForUpdate(const std::string& fileName);
@@ -53,24 +54,24 @@ class CvlIniMgr {
   CvlIniMgr(const CvlIniMgr&) = delete;
   CvlIniMgr& operator=(const CvlIniMgr&) = delete;
 
-  // Makes sure that the lock still keeps other processes out: a fork, a host that closes all descriptors
-  // and a removed lock file each end it without a word. A lost lock is taken again without waiting; the
-  // file is read again if it is no longer what this object last read or wrote, and changes that were not
-  // written are dropped. To be called before a change of an object that lives long. E_FAIL, with the
-  // object as it was and a line in the log, where another process has the lock or the file cannot be
-  // read. One thread at a time.
+  // Makes sure that the lock still keeps other processes out: a fork, a host that closes all
+  // descriptors and a removed lock file each end it without a word. A lost lock is taken again
+  // without waiting; the file is read again if it is no longer what this object last read or wrote,
+  // and changes that were not written are dropped. To be called before a change of an object that
+  // lives long. E_FAIL, with the object as it was and a line in the log, where another process has
+  // the lock or the file cannot be read. One thread at a time.
   HRESULT MakeSureOfLock();
 
   // Whether the lock keeps other processes out at this moment. Takes nothing, changes nothing.
   bool HoldsLock() const { return m_lock->excludesOthers(); }
 
-  // For a forked child whose copy of the document another thread was changing at the fork: reads the file
-  // again and leaves the copy, which may be in no state to be freed, where it is. Where the file cannot
-  // be read the object is empty, and MakeSureOfLock fails until it can.
+  // For a forked child whose copy of the document another thread was changing at the fork: reads
+  // the file again and leaves the copy, which may be in no state to be freed, where it is. Where
+  // the file cannot be read the object is empty, and MakeSureOfLock fails until it can.
   void AbandonDocument();
 
-  // Replaces the file if anything was changed since construction. A failure leaves the file. E_FAIL also
-  // where the lock was lost and another process has it, or has changed the file since.
+  // Replaces the file if anything was changed since construction. A failure leaves the file. E_FAIL
+  // also where the lock was lost and another process has it, or has changed the file since.
   HRESULT Write();
   // Write, then the digest of the file as it is, new[]; then the object holds exactly what the file
   // holds: it is read again, unless it is known to read back as this object. Null on failure. Where the file cannot be read again, for whatever
@@ -103,9 +104,9 @@ class CvlIniMgr {
   // Path of the sidecar: the part from the last "." of the whole path on becomes ".vl5".
   static std::string SidecarName(const std::string& fileName);
 
-  // Renames the file, if it is there, to NAME_mmddyyyy.bad, with a number after the date where that is
-  // taken, and removes its sidecar. The caller holds the lock. Throws what zt::fnd::osdep::path throws;
-  // a directory in the sidecar's place that cannot be moved leaves the file.
+  // Renames the file, if it is there, to NAME_mmddyyyy.bad, with a number after the date where that
+  // is taken, and removes its sidecar. The caller holds the lock. Throws what zt::fnd::osdep::path
+  // throws; a directory in the sidecar's place that cannot be moved leaves the file.
   static void SetAside(const zt::fnd::String& fileName);
 
  private:

@@ -1,5 +1,5 @@
-// Guarded files whose lock an object has lost, or has never had in this process: by fork(), by a host that
-// closes descriptors, by a cleaner of the lock directory.
+// Guarded files whose lock an object has lost, or has never had in this process: by fork(), by a
+// host that closes descriptors, by a cleaner of the lock directory.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <stdlib.h>

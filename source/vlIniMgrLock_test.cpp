@@ -21,7 +21,8 @@ std::unique_ptr<CvlIniMgr> Open(const std::string& file) {
   return std::unique_ptr<CvlIniMgr>(new CvlIniMgr(CvlIniMgr::OpenForUpdate(file)));
 }
 
-// Sets an item as a client does that holds the object for long: makes sure of the lock, changes, saves.
+// Sets an item as a client does that holds the object for long: makes sure of the lock, changes,
+// saves.
 HRESULT Set(CvlIniMgr& ini, const char* item, const char* value) {
   HRESULT result = ini.MakeSureOfLock();
   if (result < 0) return result;

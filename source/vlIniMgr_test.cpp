@@ -287,7 +287,7 @@ TEST(vlIniMgr, ChecksumIsThatOfTheFile) {
   WriteBytes(file, "[s]\na=1\n");
   CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
   unsigned char* digest = nullptr;
-  ASSERT_EQ(ini.WriteAndGetChecksum(&digest), S_OK);  // clean: the file as it stands
+  ASSERT_EQ(ini.WriteAndGetChecksum(&digest), S_OK);  // clean: the file as it is
   EXPECT_EQ(Hex(std::string(reinterpret_cast<char*>(digest), 16)), Md5Sum(file));
   EXPECT_EQ(ReadBytes(file), "[s]\na=1\n");
   delete[] digest;

@@ -22,7 +22,8 @@ GUID vlrGuidFromString(const String& text) {
     bool hasBrace = text.find(L'{') != String::npos;
     return zt::fnd::Guid(hasBrace ? text : String(L"{") + text + L"}").get();
   } catch (const zt::fnd::exception::BadGuidString&) {
-    return GUID_NULL;  // Bad text is no failure here: the component stands under the null GUID.
+    // Bad text is no failure here: the component is registered under the null GUID.
+    return GUID_NULL;
   }
 }
 
@@ -43,6 +44,7 @@ HRESULT vlrDuplicateString(const wchar_t* source, wchar_t** target) {
 namespace {
 
 HRESULT ListNames(const String& mask, zt::fnd::Vector<String>& names) {
+  // By swap: an exception leaves the caller's list as it was.
   zt::fnd::Vector<String> found = zt::fnd::osdep::FindFiles().getFilenames(mask);
   names.swap(found);
   return names.size() ? S_OK : S_FALSE;
@@ -52,6 +54,7 @@ HRESULT ListNames(const String& mask, zt::fnd::Vector<String>& names) {
 
 HRESULT vlrGetComponentNamesFromDirectory(const String& directory, const String& extension,
                                           zt::fnd::Vector<String>& names) {
+  // FindFiles takes either separator; a directory of this form ends in none.
   return ListNames(directory + L"\\*." + extension, names);
 }
 

@@ -14,7 +14,8 @@ GUID vlrGuidFromString(const zt::fnd::String& text);
 zt::fnd::AbsTime vlrGetFileModificationTime(const zt::fnd::String& path);
 // Copy in a ZtTaskMemAlloc block. E_POINTER, E_OUTOFMEMORY; *target is then untouched.
 HRESULT vlrDuplicateString(const wchar_t* source, wchar_t** target);
-// Full paths of the entries that match directory + "\*." + extension. 0, or 1 if there are none.
+// Full paths of the entries that match directory + "\*." + extension. S_OK, or S_FALSE if there are
+// none.
 HRESULT vlrGetComponentNamesFromDirectory(const zt::fnd::String& directory,
                                           const zt::fnd::String& extension,
                                           zt::fnd::Vector<zt::fnd::String>& names);

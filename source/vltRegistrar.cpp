@@ -170,7 +170,7 @@ HRESULT CvltEnumComponentRegistrar::Next(unsigned int count, _vltComponent2* rec
   for (unsigned i = 0; i < count; ++i) {
     result = Next(&records[i]);
     if (result == S_FALSE) break;
-    ++*fetched;
+    ++*fetched;  // Not reset: the caller starts it at 0.
   }
   return result;
 }
@@ -184,6 +184,8 @@ template <class Record>
 HRESULT CvltEnumComponentRegistrar::step(Record* record) {
   while (m_cursor < m_identifiers.size()) {
     GUID identifier = m_identifiers[m_cursor++];
+    // Neither a failed scan nor a component that has gone since, or cannot be copied, ends the
+    // walk.
     if (m_registrar->Scan() < 0) continue;
     if (m_registrar->CopyComponent(identifier, m_type, record) >= 0) return S_OK;
   }

@@ -50,7 +50,7 @@ class CvlrProtectedMap {
 };
 
 // Answers from a map of components in memory. Never created by itself: what Scan does, and all that
-// needs a database, comes with the classes behind it.
+// needs a database, comes with the derived classes.
 //
 // Threads: any. The map's lock is held for look-ups, changes and the copying of a record, never for
 // anything that reads a file or waits.
@@ -84,13 +84,13 @@ class CvltRegistrar : public IvltRegistrar2 {
   HRESULT GetStorageClientCacheSize(unsigned int*) override { return E_NOTIMPL; }
   HRESULT SetStorageClientCacheSize(unsigned int) override { return E_NOTIMPL; }
 
-  // ---- Behind the interface, in the order of the dispatch table.
+  // ---- After the interface, in the order of the dispatch table.
   virtual ~CvltRegistrar();
   // Brings the map up to date; its negative result is that of the operation that asked.
   virtual HRESULT Scan() = 0;
 
-  // The component, or E_INVALIDARG and `component` untouched. The pointer holds as long as nobody
-  // removes the component.
+  // The component, or E_INVALIDARG and `component` untouched. The pointer is valid until the
+  // component is removed.
   HRESULT InternalGetComponent(GUID identifier, CvltComponent*& component);
   HRESULT InternalGetComponentNoScan(GUID identifier, CvltComponent*& component);
 
@@ -99,7 +99,7 @@ class CvltRegistrar : public IvltRegistrar2 {
   template <class Record>
   HRESULT CopyComponent(GUID identifier, std::optional<_vltComponentType> type, Record* record);
 
-  // Takes ownership; an earlier component of the same identifier is destroyed. 0.
+  // Takes ownership; an earlier component of the same identifier is destroyed. S_OK.
   HRESULT AddComponent(CvltComponent* component);
   // Destroys the stored component with the identifier of this one: 0, or 1 if there is none.
   HRESULT RemoveComponent(CvltComponent* component);
@@ -124,7 +124,7 @@ class CvltRegistrar : public IvltRegistrar2 {
   ComponentMap m_components;
 };
 
-// Walks a snapshot of identifiers and hands out the components of one type that are still there.
+// Walks a snapshot of identifiers and returns the components of one type that are still there.
 // Keeps the registrar alive. Threads: one; the count is not atomic.
 class CvltEnumComponentRegistrar : public IvltEnumComponent {
  public:
@@ -142,7 +142,7 @@ class CvltEnumComponentRegistrar : public IvltEnumComponent {
   HRESULT Clone(IvltEnumComponent**) override { return E_NOTIMPL; }
   virtual ~CvltEnumComponentRegistrar();
 
-  // One step: 0 with a copy that belongs to the caller, or 1 at the end.
+  // One step: S_OK with a copy that belongs to the caller, or S_FALSE at the end.
   HRESULT Next(_vltComponent2* record);
   HRESULT Next(_vltComponent2point2* record);
 

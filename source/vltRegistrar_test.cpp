@@ -154,7 +154,7 @@ TEST_F(vltRegistrar, AFailedScanIsTheResult) {
   EXPECT_EQ(registrar->count(), 1u);
 }
 
-// Names that an enumerator hands out one by one.
+// Names that an enumerator returns one by one.
 std::vector<std::wstring> Names(IvltEnumComponent* enumerator) {
   std::vector<std::wstring> names;
   for (;;) {

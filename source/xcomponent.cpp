@@ -66,8 +66,8 @@ void FreeAndNull(wchar_t** text) {
   *text = nullptr;
 }
 
-// Takes back what a copy made whose variant failed: the caller of a failed copy frees nothing, and fills
-// the record anew. The text that failed is null already.
+// Takes back what a copy made whose variant failed: the caller of a failed copy frees nothing, and
+// fills the record again. The text that failed is null already.
 template <class Target>
 void TakeBack(Target* target) {
   FreeAndNull(&target->name);

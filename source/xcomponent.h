@@ -35,7 +35,7 @@ class CvltComponent {
 
   // Frees the texts and zeroes the common fields; the variant keeps its old values, which the type
   // 0 makes unreachable. A component whose name holds both "Motion" and "Expert" keeps its name and
-  // pnp blocks for ever: such components have handed those pointers out.
+  // pnp blocks indefinitely: such components have given those pointers to clients.
   void Clear();
 
   // Deep copies of a source record into an uninitialised target.
@@ -52,7 +52,7 @@ class CvltComponent {
   HRESULT CopyTo(_vltComponent2point1* target) const { return Copy2(target, &m_record); }
   HRESULT CopyTo(_vltComponent2point2* target) const { return Copy2(target, &m_record); }
 
-  // A null source gives a null target and 0.
+  // A null source gives a null target and S_OK.
   static HRESULT DuplicateStringNullOK(const wchar_t* source, wchar_t** target);
 
   _vltComponent2& record() { return m_record; }

@@ -1,6 +1,6 @@
 #pragma once
 
-// Component records on typed streams. The bytes are told in docs/stream-format.md.
+// Component records on typed streams. The bytes are documented in docs/stream-format.md.
 
 #include "source/Common/ZtUtils/General/ztTypedStream.h"
 #include "source/xcomponent.h"
@@ -14,7 +14,7 @@ CztOutStream& operator<<(CztOutStream& out, const CvltComponent& component);
 // the component held are not freed. Lengths and Data1 are read in long width, so that only 32-bit
 // builds read back what was written.
 //
-// Throws CztStreamVersionException for another record size, with nothing read behind it;
+// Throws CztStreamVersionException for another record size, with nothing read after it;
 // CztEndOfStreamException and CztStreamException for numbers that do not come;
 // zt::fnd::exception::OutOfRange for a text length beyond 32 bits; std::bad_alloc. What was read
 // until then stays in the component, which remains safe to use and destroy. Bytes of a text or of

@@ -207,7 +207,7 @@ void ExpectFilled(const CvltComponent& component, int32_t type) {
   }
 }
 
-// Reads a record behind a header of that order; returns what came, with the stream at its end.
+// Reads a record after a header of that order; returns what came, with the stream at its end.
 Thrown Read(const std::string& record, CvltComponent& component, Order order = Order::Little,
             size_t* consumed = nullptr) {
   MemoryPtr stream = MemoryOf(Header(0, 0, 0, order) + record);
@@ -310,7 +310,7 @@ TEST(xcomponentStream, EveryTruncationPoint) {
       std::string whole = Record(type, Width::Reader, order);
       for (size_t size = 0; size < whole.size(); ++size) {
         CvltComponent component;
-        // The bytes of a text are not examined, and behind those of pnp nothing follows.
+        // The bytes of a text are not examined, and after those of pnp nothing follows.
         bool inPnp = type == vltComponentResourceExpert && size >= whole.size() - 4;
         EXPECT_EQ(Read(whole.substr(0, size), component, order),
                   inPnp ? Thrown::Nothing : Thrown::EndOfStream)

@@ -320,7 +320,7 @@ TEST(xcomponent, MotionExpertsKeepNameAndPnp) {
   vltFree(r.resource.pnp);
 }
 
-// Blocks that a component of this name, which takes its record over, leaves behind.
+// Blocks that a component of this name, which takes its record over, leaves allocated.
 long LeftBehindBy(const wchar_t* name, _vltComponentType type) {
   long before = heap::LiveBlocks();
   _vltComponent2 r = FullRecord(type);
@@ -342,8 +342,8 @@ TEST(xcomponent, AnyOtherNameIsFreedWhole) {
 
 // ---- Copies that fail
 
-// Copies into a record of the generation, with the n-th allocation, from 0, failing: nothing stays, and no
-// text of the target dangles. False once the copy has succeeded.
+// Copies into a record of the generation, with the n-th allocation, from 0, failing: nothing stays,
+// and no text of the target dangles. False once the copy has succeeded.
 template <class Target, class Source>
 bool FailsAtAndLeavesNothing(const Source& source, long n) {
   Target target;

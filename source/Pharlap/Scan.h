@@ -18,7 +18,8 @@ namespace registrar {
 //
 // Changes the open document only; saving is the caller's. Results of single changes are dropped:
 // what could not be set now is missing in the database, and the file is merged again when it
-// changes. Threads: one.
+// changes.
+// Threads: one.
 class Scan {
  public:
   // The database stays open as long as the object lives.
@@ -52,7 +53,7 @@ class Scan {
   bool isPresent(const std::string& file) const;
   // Erases a component whose registration file is gone, but for its items in the list of contents.
   void erase(const std::string& component, const std::string& file);
-  // Whether an entry was erased that no file can stand for: such must not come back with the next
+  // Whether an entry was erased that no file can have made: such must not come back with the next
   // start.
   bool droppedPlanted() const { return m_droppedPlanted; }
 

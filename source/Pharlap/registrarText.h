@@ -32,8 +32,8 @@ inline constexpr const char* kPrefix = "Prefix";
 inline constexpr const char* kPnp = "PnP";
 inline constexpr const char* kBindingClasses = "BINDING_CLASSES";
 
-// Whether a section of this name belongs to the database itself. A component of such a name would erase
-// or overlay what all others need.
+// Whether a section of this name belongs to the database itself. A component of such a name would
+// erase or overlay what all others need.
 inline bool IsReserved(const std::string& section) {
   for (const char* own : {kGlobalSection, kComponents, kRegistrations, kContents}) {
     if (ztini_StrICmpWithoutSurrWhiteSpace(section.c_str(), own) == 0) return true;
@@ -69,8 +69,8 @@ inline void ReplaceText(wchar_t** text, const wchar_t* by) {
   *text = copy;
 }
 
-// Cuts the braces of a 38-character GUID text: S_OK; S_FALSE for another length, E_FAIL for 38 characters
-// without both braces, the text then untouched.
+// Cuts the braces of a 38-character GUID text: S_OK; S_FALSE for another length, E_FAIL for 38
+// characters without both braces, the text then untouched.
 template <class Char>
 HRESULT StripBraces(Char* text, size_t length) {
   constexpr size_t kBracedLength = 38;

@@ -20,14 +20,14 @@ namespace {
 
 constexpr const wchar_t* kRegistrationFile = L"Resources/Info.vlr";
 
-// Nothing can be found at the path, now or later: no entry, a file where a directory should be, links
-// that go in circles, or a name that no file can have.
+// Nothing can be found at the path, now or later: no entry, a file where a directory should be,
+// links that go in circles, or a name that no file can have.
 bool NamesNothing(int error) {
   return error == ENOENT || error == ENOTDIR || error == ELOOP || error == ENAMETOOLONG;
 }
 
-// Another user's bundle that this user may not enter. It is none of this process's business, and must
-// not keep it from the others.
+// Another user's bundle that this user may not enter. It is none of this process's business, and
+// must not keep it from the others.
 bool MayNotLook(int error) { return error == EACCES || error == EPERM; }
 
 // One stat() answers both whether the file is there and how old it is.

@@ -1,4 +1,4 @@
-// Data dictionaries: their registration, the flag that tells of a change, and the previous ones.
+// Data dictionaries: their registration, the flag that reports a change, and the previous ones.
 #include <string.h>
 
 #include "source/Common/vltFileSecurity.h"

@@ -49,7 +49,7 @@ HRESULT CvltPharlapRegistrar::EnumComponents(_vltComponentType type,
 
 HRESULT CvltPharlapRegistrar::Duplicate(_vltComponent2* target, const _vltComponent2* source) {
   memcpy(target, source, sizeof *target);
-  // Each text starts from null, so that a failed copy never hands out the registrar's own.
+  // Each text starts from null, so that a failed copy never returns the registrar's own.
   target->name = CopyOf(source->name);
   target->fileName = CopyOf(source->fileName);
   if (source->type == vltComponentDataDictionary) {
@@ -165,7 +165,7 @@ HRESULT CvltPharlapRegistrar::ReadSection(const wchar_t* wideSection, EmptyFileN
   std::string section = Narrow(wideSection);
   auto component = std::make_unique<CvltComponent>();
   _vltComponent2& record = component->record();
-  // The stamp is that of the object: clients tell by it that the record came from here.
+  // The stamp is that of the object: clients see by it that the record came from here.
   record.size = sizeof(CvltComponent);
   record.name = CopyOf(wideSection);
   std::string identifier;

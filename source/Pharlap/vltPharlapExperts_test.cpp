@@ -17,7 +17,7 @@ namespace fs = std::filesystem;
 
 constexpr uint32_t kObjectSize = sizeof(void*) == 8 ? 120 : 76;
 
-// Runs on both classes: what is said of one holds for the other unless a test tells.
+// Runs on both classes: what one does the other does, unless a test says so.
 template <class Start>
 class vltPharlapExpertsReading : public testing::Test {};
 using BothClasses = testing::Types<PharlapStart, LinuxStart>;

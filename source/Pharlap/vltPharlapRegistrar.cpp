@@ -91,8 +91,8 @@ HRESULT CvltPharlapRegistrar::QueryInterface(const GUID& iid, void** out) {
 
 namespace {
 
-// Ends the scan's saves, however the scan ends: what they have replaced must be on disk even where the
-// constructor is left by an exception.
+// Ends the scan's saves, however the scan ends: what they have replaced must be on disk even where
+// the constructor is left by an exception.
 class AtEnd {
  public:
   explicit AtEnd(std::function<void()> action) : m_action(std::move(action)) {}
@@ -123,7 +123,8 @@ void CvltPharlapRegistrar::update() {
   m_resources.forget();
 }
 
-// The scan's saves become durable; later ones are durable each. A failure is met again by the next save.
+// The scan's saves become durable; later ones are durable each. A failure is met again by the next
+// save.
 HRESULT CvltPharlapRegistrar::finishScan() {
   ScanSaves saves = std::exchange(m_scanSaves, ScanSaves::NotScanning);
   m_registrationIni->SetDurability(IniDurability::Synced);
@@ -134,8 +135,8 @@ HRESULT CvltPharlapRegistrar::finishScan() {
   return S_OK;
 }
 
-// Without the lock - in a child that was forked in the scan, or after the lock file was removed - the second
-// name may stand for another process's saves by now.
+// Without the lock - in a child that was forked in the scan, or after the lock file was removed -
+// the second name may cover another process's saves by now.
 bool CvltPharlapRegistrar::finishDurableCopy() {
   if (m_registrationIni->HoldsLock()) return m_durableCopy->finish();
   m_durableCopy->leave();
@@ -205,20 +206,22 @@ HRESULT CvltPharlapRegistrar::OpenIniWithValidation() {
   return result;
 }
 
-// From here on the second name of the database stands for the scan's saves, where it can be made.
+// From here on the second name of the database covers the scan's saves, where it can be made.
 void CvltPharlapRegistrar::coverSaves() {
   bool covered = m_registrationIni->HoldsLock() && m_durableCopy->begin();
   m_scanSaves = covered ? ScanSaves::Covered : ScanSaves::Synced;
   m_registrationIni->SetDurability(covered ? IniDurability::None : IniDurability::ContentOnly);
 }
 
-// Decides how durable the next save is. The first one of a scan is on disk before it takes its name, as
-// most starts make no other. From the second one on the second name of the database stands for all.
+// Decides how durable the next save is. The first one of a scan is on disk before it takes its
+// name, as most starts make no other. From the second save on the second name of the database
+// covers all.
 bool CvltPharlapRegistrar::prepareSave() {
   switch (m_scanSaves) {
     case ScanSaves::NotScanning:
       if (m_durableCopy == nullptr) return true;
-      // A scan's end that failed, or another process's scan that was killed while this one had lost the lock.
+      // A scan's end that failed, or another process's scan that was killed while this one had lost
+      // the lock.
       if (m_durableCopy->isLeft()) m_durableCopy->begin();
       return m_durableCopy->finish();
     case ScanSaves::None:
@@ -265,8 +268,8 @@ HRESULT CvltPharlapRegistrar::GetSchemaVersion(unsigned int* version) {
   return S_OK;
 }
 
-// A name of our own is not set only where memory is out. Then nothing is saved, or the caller would be
-// told that it was.
+// Setting an item of the library's own name fails only when out of memory. Then nothing is saved: a
+// success of the save would report the item as saved.
 HRESULT CvltPharlapRegistrar::setAndSave(const char* key, const char* value, bool quote) {
   if (m_registrationIni->SetItem(kGlobalSection, key, value, quote) < 0) return E_OUTOFMEMORY;
   return SaveChanges();

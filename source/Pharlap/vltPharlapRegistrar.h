@@ -25,13 +25,13 @@ class Scan;
 // registrar waits for the first one's end.
 //
 // Each changed registration file is saved on its own, so that a start that is killed has done what
-// it has done. The scan waits for the disk a few times in all (source/DurableCopy.h). Saves that a client
-// asks for are durable each.
+// it has done. The scan waits for the disk a few times in all (source/DurableCopy.h). Saves that a
+// client asks for are durable each.
 //
-// The lock can be lost: by a fork, by a host that closes all descriptors, by a cleaner that removes the
-// lock file. Every operation that changes the database makes sure of it first (CvlIniMgr::MakeSureOfLock)
-// and fails with E_FAIL, nothing written, where another process has the database now. What is answered
-// from memory is answered all the same.
+// The lock can be lost: by a fork, by a host that closes all descriptors, by a cleaner that removes
+// the lock file. Every operation that changes the database makes sure of it first
+// (CvlIniMgr::MakeSureOfLock) and fails with E_FAIL, nothing written, where another process has the
+// database now. What is answered from memory is answered all the same.
 //
 // Threads: any after Init. m_iniLock orders the operations that use the database, and is taken
 // before the map's lock.
@@ -73,18 +73,18 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   ~CvltPharlapRegistrar() override;
   HRESULT Scan() override { return S_OK; }
 
-  // For the first use in a process that did not make the object: takes the database's lock again, if no
-  // other process has it.
+  // For the first use in a process that did not make the object: takes the database's lock again,
+  // if no other process has it.
   void ContinueInThisProcess();
 
-  // ---- Behind Scan, in the order of the dispatch table.
+  // ---- After Scan, in the order of the dispatch table.
   HRESULT ResetDDUpdatedFlags() override;
   HRESULT GetComponentsForBindingClass(_vltComponentType type, GUID bindingClass,
                                        unsigned int* count, GUID** components) override;
   HRESULT GetPreviousDictionaries(const _vltStartupOptions* options, unsigned int* count,
                                   wchar_t*** paths) override;
   HRESULT RemovePreviousDictionaries(const _vltStartupOptions* options) override;
-  // Copies a record with texts of its own; failed texts are null. 0.
+  // Copies a record with texts of its own; failed texts are null. S_OK.
   virtual HRESULT Duplicate(_vltComponent2* target, const _vltComponent2* source);
   // Writes the record's section, saves, and brings the copy in memory up to date, if there is one.
   virtual HRESULT RegisterDataDictionary(_vltComponent2* record);
@@ -100,7 +100,7 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   virtual void RemoveComponentsIfFileDoesNotExist(char* section, char* file,
                                                   zt::fnd::Vector<zt::fnd::String>& eraseList,
                                                   int first, int last);
-  // Full paths of the dictionaries in "Data Dictionaries/Last": 0, or 1 if there are none.
+  // Full paths of the dictionaries in "Data Dictionaries/Last": S_OK, or S_FALSE if there are none.
   virtual HRESULT GetPrevDictsLastFolder(zt::fnd::Vector<zt::fnd::String>& names);
   virtual HRESULT RegisterResourceExpert(_vltComponent2* record);
   virtual HRESULT RegisterObjectExpert(_vltComponent2* record);
@@ -108,8 +108,8 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   virtual HRESULT ReadComponent(const wchar_t* section);
   virtual HRESULT PopulateBindingClasses(_vltComponent2*) { return S_OK; }
 
-  // Cuts the braces of a 38-character GUID text: 0; 1 for another length, E_FAIL for 38 characters
-  // without both braces, the text then untouched; E_POINTER.
+  // Cuts the braces of a 38-character GUID text: S_OK; S_FALSE for another length, E_FAIL for 38
+  // characters without both braces, the text then untouched; E_POINTER.
   static HRESULT StripBracesFromGuid(char* text);
   static HRESULT StripBracesFromGuid(wchar_t* text);
 
@@ -123,8 +123,8 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   // the file system refuses, and what the second opening throws, passes.
   void Init();
   HRESULT ReadSection(const wchar_t* section, EmptyFileName emptyFileName);
-  // Sets the items that every expert has, in the section *name. E_FAIL for a reserved name, or where an
-  // item cannot be set; then nothing may be saved.
+  // Sets the items that every expert has, in the section *name. E_FAIL for a reserved name, or
+  // where an item cannot be set; then nothing may be saved.
   HRESULT WriteExpert(const _vltComponent2* record, GuidText guidText, std::string* name);
   HRESULT SaveExpert(const _vltComponent2* record);
   void AddBindingClasses(const _vltComponent2* record, const CvltBindingClasses& classes);
@@ -146,8 +146,8 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   // Orders the operations that use the database.
   zt::fnd::osdep::ForkSafeMutex m_iniLock{zt::fnd::osdep::AtFork::Wait, 40};
 
-  // Holds m_iniLock for a scope. In a child that was forked while another thread was inside, the document
-  // may be half changed: it is read from the file again.
+  // Holds m_iniLock for a scope. In a child that was forked while another thread was inside, the
+  // document may be half changed: it is read from the file again.
   class DatabaseHold {
    public:
     explicit DatabaseHold(CvltPharlapRegistrar& registrar);

@@ -56,8 +56,8 @@ HRESULT CvltPharlapRegistrar::UpdateRegistrationFile() {
     std::string file = Narrow(wideFile);
     if (scan->isUpToDate(file, time)) continue;
     bool opened = scan->openFragment(file);
-    // A file that could not be opened just now keeps its components and its old stamp, so that the next
-    // start tries again. One that cannot be used has been set aside, and is not met again.
+    // A file that could not be opened just now keeps its components and its old stamp, so that the
+    // next start tries again. One that cannot be used has been set aside, and is not met again.
     if (!opened && FileIsThere(file)) continue;
     scan->eraseComponentsOf(file);
     if (opened) MergeRegistrationFile(directory, file.c_str());

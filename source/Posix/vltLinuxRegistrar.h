@@ -12,12 +12,12 @@ class CvltLinuxRegistrar : public CvltPharlapRegistrar {
 
   // Stores the identifier with its braces, and the binding classes that are known for the record's
   // file name as it is given. Throws zt::fnd::exception::OutOfRange when the component's position
-  // in the table of its file has no counterpart among its classes. The items before it stay set, and
-  // go out with the next save.
+  // in the table of its file has no counterpart among its classes. The items before it stay set,
+  // and go out with the next save.
   HRESULT RegisterResourceExpert(_vltComponent2* record) override;
   HRESULT RegisterObjectExpert(_vltComponent2* record) override;
   HRESULT ReadComponent(const wchar_t* section) override;
-  // Enters the record's classes into the map of its type: 0, or E_FAIL if its file has no text.
+  // Enters the record's classes into the map of its type: S_OK, or E_FAIL if its file has no text.
   HRESULT PopulateBindingClasses(_vltComponent2* record) override;
 
  private:

@@ -36,8 +36,8 @@ void StartTracer() {
   atexit(vlTracer::Cleanup);
 }
 
-// Nothing that fails while loading may end the host, which has not called anything yet; what could not be
-// made is made at the first call, and fails there, or is done without.
+// Nothing that fails while loading may end the host, which has not called anything yet; what could
+// not be made is made at the first call, and fails there, or is done without.
 __attribute__((constructor)) void StartUp() {
   vlt::Attempt(StartTracer);
   vlt::Attempt(vlPrepareRegistrarEntry);

@@ -53,8 +53,8 @@ HRESULT TellOfFile(vltErrors& errors, const wchar_t* word, const wchar_t* file, 
 constexpr const char* kMissing = "does not exist";
 constexpr const char* kUnreadable = "is not readable";
 
-// A relative path is nowhere: dictionaries keep their prefix in a field that is checked as a file. Throws
-// what keeps the system from looking.
+// A relative path is nowhere: dictionaries keep their prefix in a field that is checked as a file.
+// Throws what keeps the system from looking.
 bool IsThere(const wchar_t* file) {
   if (!path::IsPathAbsolute(file)) return false;
   try {
@@ -146,7 +146,7 @@ HRESULT CheckComponents(IvltRegistrar* registrar, _vltComponentType type, vltErr
   CztComPtr<IvltEnumComponent> enumerator;
   HRESULT status = registrar->EnumComponents(type, enumerator.out());
   if (status < 0) return status;
-  if (!enumerator) abort();  // A registrar that says yes and hands out nothing.
+  if (!enumerator) abort();  // A registrar that reports success and returns nothing.
   for (;;) {
     OwnedRecord record;
     unsigned int fetched = 0;

@@ -1,7 +1,7 @@
 #pragma once
 
-// The component check: are the registered files there, can they be read, and do they offer the entry
-// point that the system will look for?
+// The component check: are the registered files there, can they be read, and do they offer the
+// entry point that the system will look for?
 //
 //   type             files                          entry point
 //   dictionary       fileName, prefix, auxString1   none
@@ -28,7 +28,7 @@ class CEnumErrorString : public IEnumString {
   HRESULT QueryInterface(const GUID& iid, void** out) override;
   uint32_t AddRef() override;
   uint32_t Release() override;
-  // S_OK if all `count` were handed out, else S_FALSE; *fetched, unless null, gets the number.
+  // S_OK if all `count` were returned, else S_FALSE; *fetched, unless null, gets the number.
   HRESULT Next(unsigned int count, wchar_t** strings, unsigned int* fetched) override;
   HRESULT RemoteNext(unsigned int, wchar_t**, unsigned int*) override { return E_NOTIMPL; }
   HRESULT Skip(unsigned int count) override;  // past the end there is simply nothing left
@@ -43,15 +43,16 @@ class CEnumErrorString : public IEnumString {
 };
 
 // S_OK, or E_FAIL and one message more. A relative path, and one below what is no directory, do not
-// exist. Where anything else keeps the system from looking whether the file is there - a directory that
-// may not be entered, a name too long, links in a circle - the file is not readable.
+// exist. Where anything else keeps the system from looking whether the file is there - a directory
+// that may not be entered, a name too long, links in a circle - the file is not readable.
 HRESULT CheckFileExistence(const wchar_t* path, const wchar_t* word, vltErrors& errors);
 HRESULT CheckEntryPoint(const wchar_t* path, const wchar_t* entryPoint, vltErrors& errors);
 // Of a dictionary's files the last one decides the result; all are checked.
 HRESULT CheckComponent(const _vltComponent2& component, vltErrors& errors);
 // All components of the type; the first failure is the result.
 HRESULT CheckComponents(IvltRegistrar* registrar, _vltComponentType type, vltErrors& errors);
-// Frees every text of a record of this library, whatever its type.
+// Frees every text of a record of this library, whatever its type: those that a type has not are
+// null.
 void FreeComponent(_vltComponent2& record);
 
 // A record that a call fills, with the texts that it then has.

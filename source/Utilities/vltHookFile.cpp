@@ -75,7 +75,7 @@ struct Exhaustion {
   uint32_t s_entryNum = 0;
 };
 
-// The block is kept for good. Volatile, or the compiler sees that nobody uses it and takes it away.
+// The block is never freed. Volatile, or the compiler sees that it is not used and removes it.
 void TakeChunk(uint32_t chunkSize) {
   [[maybe_unused]] static void* volatile s_last;
   s_last = ::operator new[](static_cast<size_t>(chunkSize) * kChunkUnitBytes);

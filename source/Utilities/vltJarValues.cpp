@@ -1,4 +1,4 @@
-// What stands in the jar: the server's process, cookie and identity, and the offline endpoints.
+// What the jar holds: the server's process, cookie and identity, and the offline endpoints.
 #include <errno.h>
 #include <stdio.h>
 #include <stdlib.h>
@@ -57,7 +57,7 @@ bool DirectoryIsUnknown(const String& directory) {
   return !zt::posix::LookUp(Narrow(directory.c_str()).c_str()) && zt::posix::IsPassing(errno);
 }
 
-// Runs `use` on the opened jar, if there is one to be had.
+// Runs `use` on the opened jar, if it can be opened.
 template <class Use>
 HRESULT WithJar(const wchar_t* jar, Use use) {
   std::unique_ptr<CvlIniMgr> ini;
@@ -70,14 +70,14 @@ HRESULT WithPreparedJar(String& dataDir, Use use) {
   HRESULT result = PrepareDataDirectory(dataDir);
   if (result < 0) return result;
   std::unique_ptr<wchar_t[]> jar(GetJarFilePath());
-  // The directory stays absent: there is nothing to read or to keep. One that cannot be looked at for the
-  // moment is not absent, and what it holds must not be reported as missing.
+  // The directory stays absent: there is nothing to read or to keep. One that cannot be looked at
+  // for the moment is not absent, and what it holds must not be reported as missing.
   if (!jar) return DirectoryIsUnknown(dataDir) ? E_FAIL : result;
   return WithJar(jar.get(), [&](CvlIniMgr& ini) { return use(jar.get(), ini); });
 }
 
-// For names of the library's own, which are not set only where memory is out. Then nothing is saved, or
-// the caller would be told that it was.
+// For names of the library's own: setting one fails only when out of memory. Then nothing is saved:
+// a success of the save would report the item as saved.
 HRESULT SetAndSave(const wchar_t* jar, CvlIniMgr& ini, const char* section, const char* item,
                    const std::string& value) {
   if (ini.SetItem(section, item, value.c_str(), false) < 0) return E_OUTOFMEMORY;
@@ -153,7 +153,7 @@ HRESULT vltGetServerIdentityFromFile(GUID* out, String& dataDir) {
     }
     if (vltCreateGuid2(out) < 0) return result;
     TaskMem<wchar_t> text(vltGuidToString2(*out));
-    // Never an empty identity: nobody could read it again.
+    // Never an empty identity: it could not be read again.
     if (!text || !*text.get()) return E_OUTOFMEMORY;
     return SetAndSave(jar, ini, kServerSection, kServerIdentity, Narrow(text.get()));
   });
@@ -161,7 +161,7 @@ HRESULT vltGetServerIdentityFromFile(GUID* out, String& dataDir) {
 
 namespace {
 
-// The next port of the circle; the one behind it is stored for the next caller.
+// The next port of the circle; the one after it is stored for the next caller.
 std::string TakeCandidate(CvlIniMgr& ini) {
   std::string value;
   int candidate = kFirstEndpoint;

@@ -28,15 +28,15 @@ using zt::fnd::osdep::LeakedInstance;
 namespace {
 
 // Never destroyed, like the registrar itself: other libraries ask for it from their exit handlers.
-// The locks here are held while the registrar waits for other processes, so that no fork may wait for
-// them in turn.
+// The locks here are held while the registrar waits for other processes, so that no fork may wait
+// for them in turn.
 struct RegistrarGuard {
   ForkSafeMutex lock{AtFork::Renew, 10};
 };
 
 // The process-wide registrar, and the lock of its creation: two first calls would otherwise make
-// two, and the second would wait for the first one's database for ever. Recursive, so that a call
-// from inside the creation can be told apart from one of another thread.
+// two, and the second would wait for the first one's database indefinitely. Recursive, so that a
+// call from inside the creation can be distinguished from one of another thread.
 struct Creation {
   ForkSafeMutex lock{AtFork::Renew, 20};
   bool inProgress = false;
@@ -45,8 +45,8 @@ struct Creation {
   zt::fnd::osdep::ProcessMark process;        // the one that made it, or went on with it last
 };
 
-// Holds the creation's lock. In a child that was forked while another thread was making the registrar
-// nothing has begun: what that thread has made so far is left as it is, out of sight.
+// Holds the creation's lock. In a child that was forked while another thread was making the
+// registrar nothing has begun: what that thread has made so far is left as it is, out of sight.
 class CreationHold {
  public:
   explicit CreationHold(Creation& creation) : m_hold(creation.lock) {

@@ -1,4 +1,4 @@
-// What the way to the registrar, and the loading test of the dictionaries, tell the log.
+// What the way to the registrar, and the loading test of the dictionaries, report to the log.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <unistd.h>

@@ -14,8 +14,8 @@ using zt::fnd::String;
 
 namespace {
 
-// An open settings file, or none, which answers with the defaults. Every output is optional: a value
-// that nobody wants is not read.
+// An open settings file, or none, which answers with the defaults. Every output is optional: a
+// value that the caller does not want is not read.
 class Settings {
  public:
   // `named`: the file is <name>.ini, if there is a name.

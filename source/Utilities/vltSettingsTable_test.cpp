@@ -1,5 +1,5 @@
-// Every item of the settings file, absent, present and malformed, at the index that has defaults and at
-// another one, with every choice of outputs.
+// Every item of the settings file, absent, present and malformed, at the index that has defaults
+// and at another one, with every choice of outputs.
 #include <gtest/gtest.h>
 
 #include "tests/support/SettingsProbe.h"

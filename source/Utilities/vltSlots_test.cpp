@@ -1,4 +1,5 @@
-// The order of the operations in the dispatch tables, which programs that were built long ago count on.
+// The order of the operations in the dispatch tables, which programs that were built long ago count
+// on.
 #include <gtest/gtest.h>
 
 #include "source/Pharlap/vltPharlapRegistrar.h"
@@ -9,7 +10,7 @@
 namespace vlt::test {
 namespace {
 
-// Each operation stands right behind the one before it.
+// Each operation has the slot after the one before it.
 template <class... Members>
 void ExpectSlotsFrom(size_t first, Members... members) {
   size_t expected = first;
@@ -51,8 +52,8 @@ TEST(vltSlots, OfTheEnumerators) {
                   &C::Skip, &C::Reset, &C::Clone);
 }
 
-// Two slots behind the interfaces are the destructor's. The side interfaces' operations have a place in
-// the registrar's own table too.
+// Two slots after the interfaces are the destructor's. The side interfaces' operations have a place
+// in the registrar's own table too.
 template <class P>
 void ExpectSlotsBehindTheInterfaces() {
   EXPECT_EQ(SlotOf(&P::SetSnapshotPath), 18u);

@@ -1,4 +1,4 @@
-// Where the local server listens, and which kind of storage a name or an address stands for.
+// Where the local server listens, and which kind of storage a name or an address is.
 #include <string.h>
 #include <wchar.h>
 
@@ -19,16 +19,16 @@ using zt::fnd::osdep::StringCaseCompare;
 
 namespace {
 
-// A name without a directory: the settings file of this look-up lies in the working directory, unlike
-// that of the settings calls.
+// A name without a directory: the settings file of this look-up lies in the working directory,
+// unlike that of the settings calls.
 constexpr const wchar_t* g_ModulePath = L"vltutils";
 constexpr const wchar_t* kLocalHost = L"127.0.0.1:";
 constexpr const char* kDefaultEndpoint = "61900";
 constexpr const wchar_t* kOfflineMarker = L"VLTOFFLINESTORAGE=";
 
-// The answer of the first call, which stays whatever the file says later; never freed. Without a lock,
-// which a forked child could find held: of two first calls at once each reads the file, and the
-// answer of one counts.
+// The answer of the first call, which stays whatever the file says later; never freed. Without a
+// lock, which a forked child could find held: of two first calls at once each reads the file, and
+// the answer of one counts.
 constinit std::atomic<const std::wstring*> s_localServer{nullptr};
 
 // The port of the settings file; empty if the file cannot be opened.

@@ -1,5 +1,5 @@
-// Every point armed with every fault: what comes out, what is told to others, what leaks, and what
-// stays on the disk.
+// Every point armed with every fault: what comes out, what is reported to others, what leaks, and
+// what stays on the disk.
 #include <gtest/gtest.h>
 #include <malloc.h>
 
@@ -111,8 +111,8 @@ Outcome Perform(Outcome (*action)()) {
   }
 }
 
-// Again and again, with one outcome. What leaks makes each run leave more allocated than the one before;
-// the heap's caches do not.
+// Again and again, with one outcome. What leaks makes each run leave more allocated than the one
+// before; the heap's caches do not.
 int PerformOften(Outcome (*action)()) {
   constexpr int kWarm = 8, kRuns = 14;
   Outcome outcome = Perform(action);

@@ -22,8 +22,8 @@ namespace {
 
 using namespace vlt::test;
 
-// The install directory is read once a process, so each start is a child of its own. Its exit code is
-// the body's result; the hook file is written first.
+// The install directory is read once a process, so each start is a child of its own. Its exit code
+// is the body's result; the hook file is written first.
 int Armed(const std::string& hookFile, const std::function<int()>& body) {
   Installation installation;
   if (!hookFile.empty()) WriteBytes(installation.root() + "/VLTHooks.ini", hookFile);

@@ -12,7 +12,7 @@
 //
 // Every change is one critical section among all processes, and on disk when its call returns.
 // Results are those of the save; E_FAIL without an install directory or the right to make its data
-// directory. Where the data directory stays absent a function does nothing and returns 0.
+// directory. Where the data directory stays absent a function does nothing and returns S_OK.
 // Lock order: the settings file before the jar.
 
 #include <memory>
@@ -28,14 +28,16 @@ wchar_t* GetJarFilePath();
 
 // Opens the file, checked against its sidecar. *out may be set although the result is negative: the
 // sidecar was short, and the file was begun again. A digest that differs costs nothing; a file that
-// cannot be parsed is set aside. E_FAIL and null where the sidecar cannot be read at the moment: nothing
-// is set aside for that. Throws what the second opening throws, the int 1 of CvlIniMgr included.
+// cannot be parsed is set aside. E_FAIL and null where the sidecar cannot be read at the moment:
+// nothing is set aside for that. Throws what the second opening throws, the int 1 of CvlIniMgr
+// included.
 HRESULT VltjarOpenIniWithValidation(const wchar_t* path, CvlIniMgr** out);
 // The same, owned. Without an object the result is negative.
 HRESULT VltjarOpen(const wchar_t* path, std::unique_ptr<CvlIniMgr>* out);
 // Writes file and sidecar. A crash at any moment leaves the old or the new file.
 HRESULT VltjarSaveChanges(const wchar_t* path, CvlIniMgr* ini);
-// Sets the file aside and removes its sidecar. E_FAIL if the system refuses, E_UNEXPECTED otherwise.
+// Sets the file aside and removes its sidecar. E_FAIL if the system refuses, E_UNEXPECTED
+// otherwise.
 HRESULT VltjarDeleteIniFile(const wchar_t* path);
 bool VltjarChecksumFileExists(const wchar_t* path);
 // S_OK and a new[] digest; S_FALSE if there is none; E_FAIL if it is short or cannot be read;

@@ -234,7 +234,7 @@ TEST_F(vltjar, AStoragesEntryIsItsEndpoint) {
   EXPECT_EQ(run([] {
               if (Endpoint(L"mine") != "7000") return 1;
               if (Endpoint(L"NextEndpt") != "61950") return 2;
-              return Endpoint(L"other") == "61950" ? 0 : 3;  // taken, but nobody can say so
+              return Endpoint(L"other") == "61950" ? 0 : 3;  // taken, but that cannot be found out
             }),
             0);
 }

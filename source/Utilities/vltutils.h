@@ -66,7 +66,7 @@ VLT_EXPORT HRESULT vltLoadDataDictionaries2(IvltRegistrar* registrar);
 // is as it should be; E_FAIL, or the registrar's failure, where anything is not. *errors walks the
 // messages and is returned also when the result is a failure, but for E_POINTER, E_OUTOFMEMORY and
 // a registrar that cannot be made. Loads the libraries of experts into this process, and unloads
-// them. A path that the system does not let it look at is reported as not readable.
+// them. A path that the system does not allow to be examined is reported as not readable.
 VLT_EXPORT HRESULT vltCheckComponent(vltID id, IEnumString** errors);
 // vltGetRegistrar for a null storage or the default one (vltIsDefaultStorage); for others E_FAIL,
 // and *out is untouched. The same function twice.
