@@ -3,9 +3,6 @@
 #include <string.h>
 #include <wchar.h>
 
-#include <functional>
-#include <utility>
-
 #include "source/Common/vltFileSecurity.h"
 #include "source/Common/vltResultOf.h"
 #include "source/Common/vltcmn.h"
@@ -61,8 +58,8 @@ CvltPharlapRegistrar::CvltPharlapRegistrar(const String& registrationFilePath,
 }
 
 CvltPharlapRegistrar::~CvltPharlapRegistrar() {
-  if (m_registrationIni && m_durableCopy) finishDurableCopy();
-  // Before the rest, so that the lock is free for the next process.
+  // Under the lock; and the lock before the rest, so that it is free for the next process.
+  m_saves.reset();
   m_registrationIni.reset();
   ComponentMap::Hold map(components());
   for (auto& [identifier, component] : *map) {
@@ -89,29 +86,10 @@ HRESULT CvltPharlapRegistrar::QueryInterface(const GUID& iid, void** out) {
   return S_OK;
 }
 
-namespace {
-
-// Ends the scan's saves, however the scan ends: what they have replaced must be on disk even where
-// the constructor is left by an exception.
-class AtEnd {
- public:
-  explicit AtEnd(std::function<void()> action) : m_action(std::move(action)) {}
-  ~AtEnd() { m_action(); }
-  AtEnd(const AtEnd&) = delete;
-  AtEnd& operator=(const AtEnd&) = delete;
-
- private:
-  std::function<void()> m_action;
-};
-
-}  // namespace
-
 void CvltPharlapRegistrar::Init() {
   if (OpenIniWithValidation() < 0 || !m_registrationIni) return;
-  m_durableCopy = std::make_unique<DurableCopy>(m_file.file());
-  AtEnd end([this] { finishScan(); });
-  m_scanSaves = ScanSaves::None;
-  if (m_durableCopy->isLeft()) coverSaves();
+  m_saves = std::make_unique<DatabaseSaves>(m_file.file(), *m_registrationIni);
+  DatabaseSaves::ScanScope scan(*m_saves);
   update();
 }
 
@@ -121,26 +99,6 @@ void CvltPharlapRegistrar::update() {
   UpdateRegistrationFile();
   readComponents();
   m_resources.forget();
-}
-
-// The scan's saves become durable; later ones are durable each. A failure is met again by the next
-// save.
-HRESULT CvltPharlapRegistrar::finishScan() {
-  ScanSaves saves = std::exchange(m_scanSaves, ScanSaves::NotScanning);
-  m_registrationIni->SetDurability(IniDurability::Synced);
-  if (saves == ScanSaves::Covered) return finishDurableCopy() ? S_OK : E_FAIL;
-  if (saves == ScanSaves::First || saves == ScanSaves::Synced) {
-    return m_durableCopy->syncDirectory() ? S_OK : E_FAIL;
-  }
-  return S_OK;
-}
-
-// Without the lock - in a child that was forked in the scan, or after the lock file was removed -
-// the second name may cover another process's saves by now.
-bool CvltPharlapRegistrar::finishDurableCopy() {
-  if (m_registrationIni->HoldsLock()) return m_durableCopy->finish();
-  m_durableCopy->leave();
-  return false;
 }
 
 CvltPharlapRegistrar::DatabaseHold::DatabaseHold(CvltPharlapRegistrar& registrar)
@@ -206,42 +164,10 @@ HRESULT CvltPharlapRegistrar::OpenIniWithValidation() {
   return result;
 }
 
-// From here on the second name of the database covers the scan's saves, where it can be made.
-void CvltPharlapRegistrar::coverSaves() {
-  bool covered = m_registrationIni->HoldsLock() && m_durableCopy->begin();
-  m_scanSaves = covered ? ScanSaves::Covered : ScanSaves::Synced;
-  m_registrationIni->SetDurability(covered ? IniDurability::None : IniDurability::ContentOnly);
-}
-
-// Decides how durable the next save is. The first one of a scan is on disk before it takes its
-// name, as most starts make no other. From the second save on the second name of the database
-// covers all.
-bool CvltPharlapRegistrar::prepareSave() {
-  switch (m_scanSaves) {
-    case ScanSaves::NotScanning:
-      if (m_durableCopy == nullptr) return true;
-      // A scan's end that failed, or another process's scan that was killed while this one had lost
-      // the lock.
-      if (m_durableCopy->isLeft()) m_durableCopy->begin();
-      return m_durableCopy->finish();
-    case ScanSaves::None:
-      m_scanSaves = ScanSaves::First;
-      m_registrationIni->SetDurability(IniDurability::ContentOnly);
-      return true;
-    case ScanSaves::First:
-      coverSaves();
-      return true;
-    case ScanSaves::Covered:
-    case ScanSaves::Synced:
-      break;
-  }
-  return true;
-}
-
 HRESULT CvltPharlapRegistrar::SaveChanges() {
   if (!m_registrationIni) return S_OK;
   m_resources.forget();
-  if (!prepareSave()) return E_FAIL;
+  if (m_saves && !m_saves->prepare()) return E_FAIL;
   return m_file.save(*m_registrationIni);
 }
 

@@ -6,8 +6,8 @@
 
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/Common/vltBindingClasses.h"
-#include "source/DurableCopy.h"
 #include "source/GuardedIniFile.h"
+#include "source/Pharlap/DatabaseSaves.h"
 #include "source/Pharlap/registrationFiles.h"
 #include "source/vlIniMgr.h"
 #include "source/vltRegistrar.h"
@@ -159,10 +159,6 @@ class CvltPharlapRegistrar : public CvltRegistrar,
  private:
   HRESULT OpenIniWithValidation();
   void update();
-  HRESULT finishScan();
-  bool finishDurableCopy();
-  bool prepareSave();
-  void coverSaves();
 
   void initSettings();
   void registerBuiltInDictionary();
@@ -178,10 +174,7 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   zt::fnd::String m_installDirectory;
   GuardedIniFile m_file;
   std::unique_ptr<CvlIniMgr> m_registrationIni;
-  // The scan's saves: none, the first, those that the second name of the database covers.
-  enum class ScanSaves { NotScanning, None, First, Covered, Synced };
-  ScanSaves m_scanSaves = ScanSaves::NotScanning;
-  std::unique_ptr<DurableCopy> m_durableCopy;
+  std::unique_ptr<DatabaseSaves> m_saves;  // null where the opening failed
   class ScanHold;
   registrar::Scan* m_scan = nullptr;  // the one under way, if there is one
 };

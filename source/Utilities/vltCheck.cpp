@@ -8,9 +8,8 @@
 #include <string>
 
 #include "source/Common/vltFailure.h"
-#include "source/Common/vltHookPoints.h"
-#include "source/Common/vltTestHook.h"
 #include "source/Common/vltcmn.h"
+#include "source/Utilities/vltAllocationPoints.h"
 #include "source/Utilities/vltutils.h"
 #include "zt/fnd/Guid.h"
 #include "zt/fnd/osdep/BinaryFile.h"
@@ -164,9 +163,9 @@ HRESULT vltCheckComponent(vltID id, IEnumString** errors) {
   vltErrors found;
   status =
       id == GUID_NULL ? CheckAll(registrar.get(), found) : CheckOne(registrar.get(), id, found);
-  CEnumErrorString* list = nullptr;
-  if (!vltTestHook(vlt::hook::kCheckComponent)) list = new (std::nothrow) CEnumErrorString(found);
-  if (!list) return vltReportOutOfMemory("BOOL vltCheckComponent(vltID, IEnumString**)");
+  CEnumErrorString* list = vlt::Allocate(
+      vlt::kErrorListPoint, [&] { return new (std::nothrow) CEnumErrorString(found); });
+  if (!list) return vltReportOutOfMemory(vlt::kErrorListPoint.signature);
   // The list is the result; the status is only its summary.
   list->QueryInterface(IID_IEnumString, reinterpret_cast<void**>(errors));
   return status;

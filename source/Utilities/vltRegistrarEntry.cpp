@@ -5,10 +5,9 @@
 #include <string>
 
 #include "source/Common/vltFailure.h"
-#include "source/Common/vltHookPoints.h"
 #include "source/Common/vltResultOf.h"
-#include "source/Common/vltTestHook.h"
 #include "source/Posix/vltLinuxRegistrar.h"
+#include "source/Utilities/vltAllocationPoints.h"
 #include "source/Utilities/vltCheck.h"
 #include "source/Utilities/vltutils.h"
 #include "vlloader/source/vlloader.h"
@@ -75,9 +74,6 @@ bool LookUp(const char* failure, std::string* directory) {
   return false;
 }
 
-constexpr const char* kGetRegistrar2Signature =
-    "HRESULT vltGetRegistrar2(const TCHAR*, const TCHAR*, IvltRegistrar**)";
-
 }  // namespace
 
 void vlPrepareRegistrarEntry() {
@@ -107,13 +103,12 @@ HRESULT vltGetRegistrar2(const wchar_t* registrationFile, const wchar_t* install
   CreationHold hold(creation);
   if (creation.inProgress) return E_FAIL;
   if (!creation.s_LinuxRegistrar) {
-    CvltLinuxRegistrar* created = nullptr;
-    if (!vltTestHook(vlt::hook::kGetRegistrar2)) {
+    CvltLinuxRegistrar* created = vlt::Allocate(vlt::kRegistrarPoint, [&] {
       InProgress inProgress(creation);
-      created = new (std::nothrow)
+      return new (std::nothrow)
           CvltLinuxRegistrar(String(registrationFile), String(installDir ? installDir : L""));
-    }
-    if (!created) return vltReportOutOfMemory(kGetRegistrar2Signature);
+    });
+    if (!created) return vltReportOutOfMemory(vlt::kRegistrarPoint.signature);
     creation.object = created;
     creation.process = zt::fnd::osdep::ProcessMark::Current();
     // Last: a child that another thread forks in between finds it whole or not at all.

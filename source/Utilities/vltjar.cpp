@@ -3,9 +3,9 @@
 #include <algorithm>
 #include <new>
 
-#include "source/Common/vltHookPoints.h"
 #include "source/Common/vltResultOf.h"
 #include "source/GuardedIniFile.h"
+#include "source/Utilities/vltAllocationPoints.h"
 
 using zt::fnd::AnsiString;
 
@@ -21,16 +21,15 @@ using vltjar::Narrow;
 
 namespace {
 
-constexpr GuardedIniKind kJar = {
-    .useEscapes = false,
-    .otherFailure = E_UNEXPECTED,
-    .refusedMessage = "Insufficient privilege to delete cache file",
-    .otherFailureMessage = "Bad error trying to delete cache file",
-    .openSignature = "HRESULT VltjarOpenIniWithValidation(const wchar_t*, CvlIniMgr**)",
-    .openPoint = vlt::hook::kJarOpen,
-    .retryPoint = vlt::hook::kJarRetry,
-    .writtenPoint = vlt::hook::kJarInvalidChecksumSet,
-    .sealedPoint = vlt::hook::kJarValidChecksumSet};
+constexpr GuardedIniKind kJar = {.useEscapes = false,
+                                 .otherFailure = E_UNEXPECTED,
+                                 .refusedMessage = "Insufficient privilege to delete cache file",
+                                 .otherFailureMessage = "Bad error trying to delete cache file",
+                                 .openSignature = vlt::kJarPoint.signature,
+                                 .openPoint = vlt::kJarPoint.hookPoint,
+                                 .retryPoint = vlt::hook::kJarRetry,
+                                 .writtenPoint = vlt::hook::kJarInvalidChecksumSet,
+                                 .sealedPoint = vlt::hook::kJarValidChecksumSet};
 
 GuardedIniFile Guarded(const wchar_t* file) { return GuardedIniFile(Narrow(file), kJar); }
 
