@@ -2,6 +2,7 @@
 
 #include <new>
 
+#include "source/Common/ZtUtils/General/CztMemoryStream.h"
 #include "source/Common/ZtUtils/General/ztStreamException.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/posix/Transfer.h"
@@ -45,6 +46,8 @@ CztFileStream* CztFileStream::CreateStream(const zt::fnd::String& name, bool tru
 CztFileStream::~CztFileStream() {
   if (m_canWrite && m_file) WriteSubStreamInfo();
 }
+
+CztSubStream* CztFileStream::newSubStream() { return CztMemoryStream::CreateStream(); }
 
 bool CztFileStream::Init(const zt::fnd::String& name, bool truncate, bool read, bool write) {
   m_file.reset();

@@ -37,6 +37,7 @@ class CztFileStream : public CztStreamBaseImp {
   CztFileStream() = default;
   ~CztFileStream();
   void takeBack(int64_t size) override;
+  CztSubStream* newSubStream() override;
 
  private:
   HRESULT openAnew();

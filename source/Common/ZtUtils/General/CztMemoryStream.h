@@ -8,7 +8,7 @@
 // only read. Results: E_INVALIDARG for sizes beyond 32 bits, a null buffer, a cursor in front of
 // the start, and for Read while there is no block; E_FAIL when memory is out and for changes to a
 // read-only block. A failed call changes nothing.
-class CztMemoryStream : public CztStreamBaseImp {
+class CztMemoryStream : public CztSubStream {
  public:
   // New stream with one reference; null when memory is out.
   static CztMemoryStream* CreateStream();
@@ -22,8 +22,7 @@ class CztMemoryStream : public CztStreamBaseImp {
   HRESULT SetSize(uint64_t size) override;
   HRESULT Flush() override { return S_OK; }
 
-  // The block, which the stream keeps; null while there is none. Good until the next change.
-  unsigned char* GetBuffer() const { return m_begin; }
+  unsigned char* GetBuffer() const override { return m_begin; }
 
   // Writes the sub-streams and hands out the block, whose owner frees it with free(). The size is
   // known to who calls WriteSubStreamInfo and seeks to the end before.
@@ -35,8 +34,7 @@ class CztMemoryStream : public CztStreamBaseImp {
   // for a size beyond 32 bits or a null with a size.
   HRESULT AttachBuffer(unsigned char* buffer, unsigned long size, bool readOnly);
 
-  // For the loading of sub-streams: a block to own that lies `depth` areas deep.
-  HRESULT attachNested(unsigned char* buffer, uint32_t size, unsigned depth);
+  HRESULT attachNested(unsigned char* buffer, uint32_t size, unsigned depth) override;
 
   uint32_t capacity() const { return m_capacity; }
   uint32_t size() const { return m_size; }
@@ -44,6 +42,7 @@ class CztMemoryStream : public CztStreamBaseImp {
  protected:
   CztMemoryStream() = default;
   ~CztMemoryStream();
+  CztSubStream* newSubStream() override { return CreateStream(); }
 
  private:
   HRESULT growTo(uint64_t size);

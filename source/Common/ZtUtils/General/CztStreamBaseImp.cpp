@@ -6,9 +6,7 @@
 #include <new>
 #include <vector>
 
-#include "source/Common/ZtUtils/General/CztMemoryStream.h"
 #include "source/Common/ZtUtils/General/ztStreamException.h"
-#include "source/Common/ZtUtils/General/ztSubStreamArea.h"
 #include "zt/fnd/Exception.h"
 #include "ztcom/ztcore/ztmemmgr.h"
 
@@ -96,8 +94,7 @@ HRESULT CopyContents(IztStream* from, IztStream* to) {
 
 }  // namespace
 
-const GUID CztStreamBaseImp::s_SubStreamMarker = {
-    0xD300BBA1, 0xC3D6, 0x47CF, {0xB7, 0x52, 0xCB, 0x9F, 0xFD, 0x8A, 0xBC, 0xCC}};
+const GUID CztStreamBaseImp::s_SubStreamMarker = kSubStreamMarker;
 
 const _ZTCOM_INTMAP_ENTRY* CztStreamBaseImp::_GetEntries() {
   static constexpr _ZTCOM_INTMAP_ENTRY kEntries[] = {{&IID_IztStream, 0, kZtComSimpleEntry},
@@ -131,10 +128,23 @@ HRESULT CztStreamBaseImp::loadArea(int64_t offset, int64_t areaEnd, unsigned dep
   // A nested area goes at once, or memory would hold every level's copy of the innermost data. The
   // outermost is cut when all is known to be good: it may be a file's only copy.
   if (depth > 0) result = cutArea();
-  CztSubStreamMap loaded = AttachSubStreams(std::move(blocks), depth + 1);
+  CztSubStreamMap loaded = attach(std::move(blocks), depth + 1);
   loaded.merge(m_subStreams);  // Like-named ones are replaced; nothing can fail from here on.
   m_subStreams.swap(loaded);
   return depth > 0 ? result : cutArea();
+}
+
+// Makes streams of the blocks, `depth` areas deep, with the sub-streams of their own loaded. Of two
+// names that are equal the later counts. Throws what loading throws.
+CztSubStreamMap CztStreamBaseImp::attach(std::vector<CztSubStreamBlock> blocks, unsigned depth) {
+  CztSubStreamMap subStreams;
+  for (CztSubStreamBlock& block : blocks) {
+    auto stream = CztComPtr<CztSubStream>::Attach(newSubStream());
+    if (!stream) throw std::bad_alloc();
+    stream->attachNested(block.data.release(), block.sizeBytes, depth);
+    subStreams.insert_or_assign(block.name, stream);
+  }
+  return subStreams;
 }
 
 HRESULT CztStreamBaseImp::cutArea() {
@@ -156,6 +166,23 @@ bool CztStreamBaseImp::nestsDeeperThan(unsigned levels) const {
   return false;
 }
 
+// E_INVALIDARG for a count or size beyond 31 bits, and failures of the sub-streams' own
+// WriteSubStreamInfo. Throws as the typed streams do.
+HRESULT CztStreamBaseImp::writeArea(int64_t start) {
+  if (m_subStreams.size() > kMostOfSubStreamArea) return E_INVALIDARG;
+  CztSubStreamAreaWriter area(this, m_subStreams.size());
+  for (const auto& [name, stream] : m_subStreams) {
+    HRESULT result = stream->WriteSubStreamInfo();
+    if (result < 0) return result;
+    int64_t size = 0;
+    stream->Seek(0, ztSeekEnd, &size);
+    if (static_cast<uint64_t>(size) > kMostOfSubStreamArea) return E_INVALIDARG;
+    area.add(name, stream->GetBuffer(), size);
+  }
+  area.finish(start);
+  return S_OK;
+}
+
 HRESULT CztStreamBaseImp::WriteSubStreamInfo() {
   if (m_subStreamsWritten) return S_OK;
   m_subStreamsWritten = true;
@@ -164,7 +191,7 @@ HRESULT CztStreamBaseImp::WriteSubStreamInfo() {
   int64_t start = 0;
   HRESULT result = Seek(0, ztSeekEnd, &start);
   if (result < 0) return result;
-  result = Guarded([&] { return WriteSubStreamArea(this, m_subStreams, start); });
+  result = Guarded([&] { return writeArea(start); });
   if (result < 0) {
     takeBack(start);
     return result;
@@ -188,7 +215,7 @@ HRESULT CztStreamBaseImp::CreateSubStream(const wchar_t* name, IztStream** out) 
   HRESULT result = OpenSubStream(name, out);
   if (result != S_FALSE) return result;
   return Guarded([&] {
-    auto stream = CztComPtr<CztMemoryStream>::Attach(CztMemoryStream::CreateStream());
+    auto stream = CztComPtr<CztSubStream>::Attach(newSubStream());
     if (!stream) return E_OUTOFMEMORY;
     m_subStreams.insert_or_assign(String(name), stream);
     *out = ZtAddRef(stream.get());

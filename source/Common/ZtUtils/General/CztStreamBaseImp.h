@@ -1,23 +1,26 @@
 #pragma once
 
 #include <map>
+#include <vector>
 
 #include "source/Common/ZtUtils/General/ztStreamInterfaces.h"
+#include "source/Common/ZtUtils/General/ztSubStreamArea.h"
 #include "zt/fnd/String.h"
 #include "ztcom/ztcore/ztcom.h"
 
-class CztMemoryStream;
+class CztSubStream;
 
-using CztSubStreamMap = std::map<zt::fnd::String, CztComPtr<CztMemoryStream>>;
+using CztSubStreamMap = std::map<zt::fnd::String, CztComPtr<CztSubStream>>;
 
-// The sub-streams of every stream, over the five byte operations of the class derived from it.
+// The sub-streams of every stream, over the five byte operations of the class derived from it, which
+// also makes them.
 //
 // Sub-streams are memory streams, in the order of their names, and may have sub-streams of their
 // own. Areas within areas are read and written up to kDeepestArea levels: reading throws
 // CztStreamException and writing gives E_INVALIDARG beyond, since each level costs stack.
 class CztStreamBaseImp : public IztStream3, public CZTComObjectRootEx<CZTComMultiThreadModelNoCS> {
  public:
-  // Stands behind the sub-streams, in front of the offset of their first byte.
+  // Written after the sub-streams, before the offset of their first byte.
   static const GUID s_SubStreamMarker;
   static constexpr unsigned kDeepestArea = 256;
 
@@ -43,11 +46,16 @@ class CztStreamBaseImp : public IztStream3, public CZTComObjectRootEx<CZTComMult
   // LoadSubStreamInfo of a stream that lies `depth` areas below the outermost one.
   HRESULT loadSubStreams(bool writable, unsigned depth);
 
-  // Cuts off what a failed writing has left behind the first `size` bytes.
+  // Cuts off what a failed writing has left after the first `size` bytes.
   virtual void takeBack(int64_t size);
+
+  // New empty stream with one reference; null when memory is out.
+  virtual CztSubStream* newSubStream() = 0;
 
  private:
   HRESULT loadArea(int64_t offset, int64_t areaEnd, unsigned depth);
+  CztSubStreamMap attach(std::vector<CztSubStreamBlock> blocks, unsigned depth);
+  HRESULT writeArea(int64_t start);
   HRESULT cutArea();
   bool nestsDeeperThan(unsigned levels) const;
 
@@ -56,4 +64,17 @@ class CztStreamBaseImp : public IztStream3, public CZTComObjectRootEx<CZTComMult
   bool m_subStreamsWritten = false;
   bool m_subStreamsWritable = true;
   int64_t m_subStreamInfoOffset = -1;  // of the area's header; -1 for none
+};
+
+// A stream that can be a sub-stream: its data are one block of malloc.
+class CztSubStream : public CztStreamBaseImp {
+ public:
+  // The block, which the stream keeps; null while there is none. Good until the next change.
+  virtual unsigned char* GetBuffer() const = 0;
+
+  // For the loading of sub-streams: a block to own that lies `depth` areas deep.
+  virtual HRESULT attachNested(unsigned char* buffer, uint32_t size, unsigned depth) = 0;
+
+ protected:
+  ~CztSubStream() = default;
 };

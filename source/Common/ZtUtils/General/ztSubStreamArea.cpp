@@ -4,16 +4,12 @@
 
 #include <new>
 
-#include "source/Common/ZtUtils/General/CztMemoryStream.h"
-#include "source/Common/ZtUtils/General/ztTypedStream.h"
-
 namespace {
 
 constexpr int64_t kHeaderSize = 13;
 constexpr int64_t kCountSize = 4;
 constexpr int64_t kDataLengthSize = 4;
 constexpr uint64_t kLongestName = UINT32_MAX / sizeof(wchar_t) - 1;  // and a terminator
-constexpr size_t kMost = INT32_MAX;
 
 // Reads an area value by value and knows how many of its bytes are left.
 class AreaReader {
@@ -88,28 +84,14 @@ void WriteBytes(IztStream* stream, const void* bytes, uint32_t count) {
   if (count > 0) ztWriteStreamBytes(stream, bytes, count);
 }
 
-HRESULT WriteEntry(CztOutStream& out, const zt::fnd::String& name, CztMemoryStream& subStream) {
-  HRESULT result = subStream.WriteSubStreamInfo();
-  if (result < 0) return result;
-  int64_t size = 0;
-  subStream.Seek(0, ztSeekEnd, &size);
-  if (static_cast<uint64_t>(size) > kMost) return E_INVALIDARG;
-  out << name.length();
-  WriteBytes(out.GetStream(), name.c_str(), name.length() * uint32_t{sizeof(wchar_t)});
-  out << static_cast<int32_t>(size);
-  WriteBytes(out.GetStream(), subStream.GetBuffer(), static_cast<uint32_t>(size));
-  return S_OK;
-}
-
 }  // namespace
 
 bool ReadSubStreamTrailer(IztStream* stream, int64_t streamSize, int64_t* offset) {
   unsigned char trailer[kSubStreamTrailerSize];
   stream->Seek(streamSize - kSubStreamTrailerSize, ztSeekBegin, nullptr);
   ztReadStreamBytes(stream, trailer, sizeof trailer);
-  const GUID& marker = CztStreamBaseImp::s_SubStreamMarker;
-  memcpy(offset, trailer + sizeof marker, sizeof *offset);
-  return memcmp(trailer, &marker, sizeof marker) == 0 && *offset != -1;
+  memcpy(offset, trailer + sizeof kSubStreamMarker, sizeof *offset);
+  return memcmp(trailer, &kSubStreamMarker, sizeof kSubStreamMarker) == 0 && *offset != -1;
 }
 
 std::vector<CztSubStreamBlock> ReadSubStreamArea(IztStream* stream, int64_t offset,
@@ -122,26 +104,20 @@ std::vector<CztSubStreamBlock> ReadSubStreamArea(IztStream* stream, int64_t offs
   return blocks;
 }
 
-CztSubStreamMap AttachSubStreams(std::vector<CztSubStreamBlock> blocks, unsigned depth) {
-  CztSubStreamMap subStreams;
-  for (CztSubStreamBlock& block : blocks) {
-    auto stream = CztComPtr<CztMemoryStream>::Attach(CztMemoryStream::CreateStream());
-    if (!stream) throw std::bad_alloc();
-    stream->attachNested(block.data.release(), block.sizeBytes, depth);
-    subStreams.insert_or_assign(block.name, stream);
-  }
-  return subStreams;
+CztSubStreamAreaWriter::CztSubStreamAreaWriter(IztStream* stream, size_t count)
+    : m_out(stream, 1, 0, 0) {
+  m_out << static_cast<int32_t>(count);
 }
 
-HRESULT WriteSubStreamArea(IztStream* stream, const CztSubStreamMap& subStreams, int64_t start) {
-  if (subStreams.size() > kMost) return E_INVALIDARG;
-  CztOutStream out(stream, 1, 0, 0);
-  out << static_cast<int32_t>(subStreams.size());
-  for (const auto& [name, subStream] : subStreams) {
-    HRESULT result = WriteEntry(out, name, *subStream.get());
-    if (result < 0) return result;
-  }
-  WriteBytes(stream, &CztStreamBaseImp::s_SubStreamMarker, sizeof(GUID));
-  WriteBytes(stream, &start, sizeof start);
-  return S_OK;
+void CztSubStreamAreaWriter::add(const zt::fnd::String& name, const unsigned char* bytes,
+                                 int64_t sizeBytes) {
+  m_out << name.length();
+  WriteBytes(m_out.GetStream(), name.c_str(), name.length() * uint32_t{sizeof(wchar_t)});
+  m_out << static_cast<int32_t>(sizeBytes);
+  WriteBytes(m_out.GetStream(), bytes, static_cast<uint32_t>(sizeBytes));
+}
+
+void CztSubStreamAreaWriter::finish(int64_t start) {
+  WriteBytes(m_out.GetStream(), &kSubStreamMarker, sizeof kSubStreamMarker);
+  WriteBytes(m_out.GetStream(), &start, sizeof start);
 }

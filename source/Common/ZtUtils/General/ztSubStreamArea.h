@@ -8,9 +8,15 @@
 #include <memory>
 #include <vector>
 
-#include "source/Common/ZtUtils/General/CztStreamBaseImp.h"
+#include "source/Common/ZtUtils/General/ztStreamInterfaces.h"
+#include "source/Common/ZtUtils/General/ztTypedStream.h"
+#include "zt/fnd/String.h"
 
+// First part of the trailer.
+inline constexpr GUID kSubStreamMarker = {
+    0xD300BBA1, 0xC3D6, 0x47CF, {0xB7, 0x52, 0xCB, 0x9F, 0xFD, 0x8A, 0xBC, 0xCC}};
 inline constexpr int64_t kSubStreamTrailerSize = 24;
+inline constexpr size_t kMostOfSubStreamArea = INT32_MAX;  // sub-streams, and bytes of each
 
 struct CztFreeBlock {
   void operator()(unsigned char* block) const { free(block); }
@@ -35,11 +41,14 @@ bool ReadSubStreamTrailer(IztStream* stream, int64_t streamSize, int64_t* offset
 std::vector<CztSubStreamBlock> ReadSubStreamArea(IztStream* stream, int64_t offset,
                                                  int64_t areaEnd);
 
-// Makes streams of the blocks, `depth` areas deep, with the sub-streams of their own loaded. Of two
-// names that are equal the later counts. Throws what loading throws.
-CztSubStreamMap AttachSubStreams(std::vector<CztSubStreamBlock> blocks, unsigned depth);
+// Appends area and trailer at a stream's cursor. Counts and sizes are at most kMostOfSubStreamArea.
+// Throws as the typed streams do.
+class CztSubStreamAreaWriter {
+ public:
+  CztSubStreamAreaWriter(IztStream* stream, size_t count);
+  void add(const zt::fnd::String& name, const unsigned char* bytes, int64_t sizeBytes);
+  void finish(int64_t start);  // where the area begins
 
-// Appends area and trailer at the stream's cursor, which is at `start`. E_INVALIDARG for a count or
-// size beyond 31 bits, and failures of the sub-streams' own WriteSubStreamInfo. Throws as the typed
-// streams do.
-HRESULT WriteSubStreamArea(IztStream* stream, const CztSubStreamMap& subStreams, int64_t start);
+ private:
+  CztOutStream m_out;
+};
