@@ -1,7 +1,7 @@
-#include "zt/fnd/StringBase.h"
+#include "zt/fnd/StringBase.inl"
 
-#include "zt/fnd/StringSearch.h"
-#include "zt/fnd/StringWire.h"
+#include "zt/fnd/StringSearch.inl"
+#include "zt/fnd/StringWire.inl"
 
 namespace zt {
 namespace fnd {

@@ -6,11 +6,11 @@
 
 #include <cstdint>
 #include <cstring>
+#include <functional>
 
 #include "zt/fnd/ByteOrder.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
-#include "zt/fnd/StringBase.h"
 #include "zt/fnd/Utf8ToWide.h"
 #include "zt/fnd/WideToUtf8.h"
 
@@ -37,7 +37,7 @@ inline std::uint32_t TakeLength(const unsigned char*& cursor, const unsigned cha
 }
 
 inline std::uint32_t FitOrAllOnes(std::uint64_t size) {
-  return size > k_max32 ? 0xFFFFFFFFu : static_cast<std::uint32_t>(size);
+  return size > UINT32_MAX ? UINT32_MAX : static_cast<std::uint32_t>(size);
 }
 
 }  // namespace string_detail

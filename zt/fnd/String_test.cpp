@@ -12,7 +12,7 @@
 #include "tests/support/MemoryLimit.h"
 #include "zt/fnd/DLLAlloc.h"
 #include "zt/fnd/Exception.h"
-#include "zt/fnd/StringBase.h"
+#include "zt/fnd/StringBase.inl"
 
 using namespace zt::fnd;
 
