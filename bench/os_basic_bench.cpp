@@ -16,6 +16,7 @@
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/CriticalSection.h"
 #include "zt/fnd/osdep/FindFiles.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/Mutex.h"
 
 namespace {
@@ -93,7 +94,7 @@ BENCHMARK(RecursiveMutexOfTheLibrary);
 void CriticalSectionEnterLeave(benchmark::State& state) {
   CriticalSection section;
   for (auto _ : state) {
-    CriticalSectionGuard guard(section);
+    Hold hold(section);
     benchmark::ClobberMemory();
   }
 }

@@ -20,7 +20,7 @@
 #include "fuzz/Bytes.h"
 #include "fuzz/Place.h"
 #include "zt/fnd/String.h"
-#include "zt/fnd/osdep/EventStateFile.h"
+#include "zt/fnd/osdep/events/EventStateFile.h"
 #include "zt/fnd/osdep/NamedEvent.h"
 #include "zt/fnd/osdep/OSException.h"
 

@@ -8,7 +8,7 @@
 
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
-#include "zt/fnd/osdep/EventStateFile.h"
+#include "zt/fnd/osdep/events/EventStateFile.h"
 #include "zt/fnd/osdep/NamedEvent.h"
 
 namespace vlt::test {

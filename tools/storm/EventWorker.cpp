@@ -9,7 +9,7 @@
 #include "tools/storm/Process.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/NamedEvent.h"
-#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
+#include "zt/fnd/osdep/events/NamedEventGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
 
 namespace storm {

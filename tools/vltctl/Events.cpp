@@ -12,7 +12,7 @@
 
 #include "tools/vltctl/Reading.h"
 #include "zt/fnd/String.h"
-#include "zt/fnd/osdep/EventStateFile.h"
+#include "zt/fnd/osdep/events/EventStateFile.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 #include "zt/posix/ScopedFd.h"
 

@@ -7,9 +7,9 @@
 #include "zt/fnd/osdep/ForkSafeMutex.h"
 #include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/MutexGlobalStatics.h"
-#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
 #include "zt/fnd/osdep/PosixMutex.h"
 #include "zt/fnd/osdep/ProcessStatics.h"
+#include "zt/fnd/osdep/events/NamedEventGlobalStatics.h"
 
 namespace zt {
 namespace fnd {

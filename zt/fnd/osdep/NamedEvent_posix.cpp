@@ -5,11 +5,11 @@
 
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
-#include "zt/fnd/osdep/EventData.h"
 #include "zt/fnd/osdep/NamedEvent.h"
-#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/Sleep.h"
+#include "zt/fnd/osdep/events/EventData.h"
+#include "zt/fnd/osdep/events/NamedEventGlobalStatics.h"
 #include "zt/posix/Retry.h"
 
 using zt::posix::RetryEintr;
@@ -29,7 +29,7 @@ NamedEvent::NamedEvent(const String& name, bool manualReset, bool initialState)
                  ->getOrCreateNamedEvent(name, manualReset, initialState)
                  .detach()) {}
 
-NamedEvent::~NamedEvent() { m_data->drop(); }
+NamedEvent::~NamedEvent() { NamedEventGlobalStatics::Release(*m_data); }
 
 // An assignment and not an addition: two sets with no waiter between them release one waiter.
 void NamedEvent::assign(bool signaled) const {

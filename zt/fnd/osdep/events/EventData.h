@@ -2,9 +2,10 @@
 
 #include "zt/fnd/RefCounted.h"
 #include "zt/fnd/String.h"
-#include "zt/fnd/osdep/EventFile.h"
 #include "zt/fnd/osdep/ProcessMark.h"
-#include "zt/fnd/osdep/SemaphoreSet.h"
+#include "zt/fnd/osdep/events/EventFile.h"
+#include "zt/fnd/osdep/events/EventRegistry.h"
+#include "zt/fnd/osdep/events/SemaphoreSet.h"
 
 namespace zt {
 namespace fnd {
@@ -18,7 +19,7 @@ namespace osdep {
 // close gives the slot back and removes the lock file. Destruction throws nothing.
 class EventData : public RefCountedCriticalSectionPolicy {
  public:
-  EventData(NamedEventGlobalStatics& statics, const String& name, bool manualReset);
+  EventData(EventRegistry& statics, const String& name, bool manualReset);
   ~EventData() override;
 
   // Opens or joins. False if the event is being closed by others: nothing is held then, and the
@@ -26,8 +27,10 @@ class EventData : public RefCountedCriticalSectionPolicy {
   // getOrCreateNamedEvent; nothing is held then, and a file that this call has made is gone.
   bool open(bool initialState);
 
-  // Takes one reference away, in a forked child too, where the parent's event stays as it is.
-  void drop();
+  bool isOfThisProcess() const { return m_process.isCurrent(); }
+
+  // release(), with the section kept until it is over.
+  void releaseInSection();
 
   const String& name() const { return m_name; }
   bool manualReset() const { return m_manualReset; }
@@ -48,7 +51,7 @@ class EventData : public RefCountedCriticalSectionPolicy {
   bool join(const EventFile& file);
   void close();
 
-  RefPtr<NamedEventGlobalStatics> m_statics;
+  RefPtr<EventRegistry> m_statics;
   const ProcessMark m_process;
   const String m_name;
   const bool m_manualReset;

@@ -5,10 +5,9 @@
 #include <utility>
 
 #include "zt/fnd/Exception.h"
-#include "zt/fnd/osdep/EventData.h"
 #include "zt/fnd/osdep/Hold.h"
-#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/events/EventData.h"
 
 namespace zt {
 namespace fnd {
@@ -67,7 +66,7 @@ bool ReadPlace(const EventFile& file, EventPlace& place) {
 
 }  // namespace
 
-EventData::EventData(NamedEventGlobalStatics& statics, const String& name, bool manualReset)
+EventData::EventData(EventRegistry& statics, const String& name, bool manualReset)
     : RefCountedCriticalSectionPolicy(&statics.section),
       m_statics(&statics),
       m_process(ProcessMark::Current()),
@@ -176,12 +175,8 @@ bool EventData::join(const EventFile& file) {
 
 // ---- closing
 
-void EventData::drop() {
-  if (!m_process.isCurrent()) {
-    NamedEventGlobalStatics::ReleaseInherited(*this);
-    return;
-  }
-  RefPtr<NamedEventGlobalStatics> hold(m_statics);  // the section has to outlive the release
+void EventData::releaseInSection() {
+  RefPtr<EventRegistry> hold(m_statics);  // the section has to outlive the release
   release();
 }
 

@@ -1,4 +1,4 @@
-#include "zt/fnd/osdep/EventFile.h"
+#include "zt/fnd/osdep/events/EventFile.h"
 
 #include <sys/file.h>
 #include <sys/ipc.h>

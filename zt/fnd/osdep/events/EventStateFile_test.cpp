@@ -1,4 +1,4 @@
-#include "zt/fnd/osdep/EventStateFile.h"
+#include "zt/fnd/osdep/events/EventStateFile.h"
 
 #include <gtest/gtest.h>
 

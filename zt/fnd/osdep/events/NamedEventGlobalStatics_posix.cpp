@@ -1,4 +1,4 @@
-#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
+#include "zt/fnd/osdep/events/NamedEventGlobalStatics.h"
 
 #include <unistd.h>
 
@@ -22,9 +22,7 @@ constexpr unsigned kJoinPatienceMs = 2000;
 
 }  // namespace
 
-NamedEventGlobalStatics::NamedEventGlobalStatics()
-    : process(ProcessMark::Current()),
-      stateFileMutex(String(L"zt_fnd_osdep_NamedEvent_StateFileMutex")) {}
+NamedEventGlobalStatics::NamedEventGlobalStatics() : process(ProcessMark::Current()) {}
 
 RefPtr<NamedEventGlobalStatics> NamedEventGlobalStatics::Get() {
   return ProcessStatics<NamedEventGlobalStatics>::Get();
@@ -85,7 +83,11 @@ bool NamedEventGlobalStatics::hasSemaphoreSetOfId(int id) const {
   return std::ranges::any_of(m_sets, [id](const auto& entry) { return entry.second->id() == id; });
 }
 
-void NamedEventGlobalStatics::ReleaseInherited(const EventData& event) {
+void NamedEventGlobalStatics::Release(EventData& event) {
+  if (event.isOfThisProcess()) {
+    event.releaseInSection();
+    return;
+  }
   Hold hold(ProcessStatics<NamedEventGlobalStatics>::Lock());
   event.RefCountedThreadUnsafePolicy::release();
 }

@@ -25,8 +25,8 @@
 #include "tests/support/TempDir.h"
 #include "tests/support/ThreadState.h"
 #include "zt/fnd/String.h"
-#include "zt/fnd/osdep/EventStateFile.h"
 #include "zt/fnd/osdep/NamedEvent.h"
+#include "zt/fnd/osdep/events/EventStateFile.h"
 #include "zt/posix/Files.h"
 
 using zt::posix::Flock;

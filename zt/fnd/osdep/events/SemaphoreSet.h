@@ -3,14 +3,13 @@
 #include <sys/types.h>
 
 #include "zt/fnd/RefCounted.h"
-#include "zt/fnd/osdep/EventFile.h"
-#include "zt/fnd/osdep/EventStateFile.h"
+#include "zt/fnd/osdep/events/EventFile.h"
+#include "zt/fnd/osdep/events/EventRegistry.h"
+#include "zt/fnd/osdep/events/EventStateFile.h"
 
 namespace zt {
 namespace fnd {
 namespace osdep {
-
-class NamedEventGlobalStatics;
 
 // One System V semaphore set of 128, with its state file "sem_" + number; one object a number in a
 // process. The set and its file go with the last object of all processes.
@@ -24,7 +23,7 @@ class NamedEventGlobalStatics;
 // take away stays for the next one who has the file alone.
 class SemaphoreSet : public RefCountedCriticalSectionPolicy {
  public:
-  SemaphoreSet(NamedEventGlobalStatics& statics, unsigned number);
+  SemaphoreSet(EventRegistry& statics, unsigned number);
   ~SemaphoreSet() override;
 
   unsigned number() const { return m_number; }
@@ -69,7 +68,7 @@ class SemaphoreSet : public RefCountedCriticalSectionPolicy {
   void close();
 
   // Holds the process's statics, and with them the section in which objects are counted.
-  RefPtr<NamedEventGlobalStatics> m_statics;
+  RefPtr<EventRegistry> m_statics;
   const unsigned m_number;
   const ProcessMark m_process;
   EventFile m_file;

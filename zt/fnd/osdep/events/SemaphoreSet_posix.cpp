@@ -1,4 +1,4 @@
-#include "zt/fnd/osdep/SemaphoreSet.h"
+#include "zt/fnd/osdep/events/SemaphoreSet.h"
 
 #include <sys/ipc.h>
 #include <sys/sem.h>
@@ -10,7 +10,6 @@
 
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/Hold.h"
-#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/posix/Retry.h"
 
@@ -39,7 +38,7 @@ void RemoveSet(int id) {
 
 }  // namespace
 
-SemaphoreSet::SemaphoreSet(NamedEventGlobalStatics& statics, unsigned number)
+SemaphoreSet::SemaphoreSet(EventRegistry& statics, unsigned number)
     : RefCountedCriticalSectionPolicy(&statics.section),
       m_statics(&statics),
       m_number(number),

@@ -1,4 +1,4 @@
-#include "zt/fnd/osdep/SemaphoreSet.h"
+#include "zt/fnd/osdep/events/SemaphoreSet.h"
 
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -11,7 +11,7 @@
 #include "tests/support/EventPlace.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/osdep/Hold.h"
-#include "zt/fnd/osdep/NamedEventGlobalStatics.h"
+#include "zt/fnd/osdep/events/NamedEventGlobalStatics.h"
 
 namespace zt::fnd::osdep {
 namespace {
