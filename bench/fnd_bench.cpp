@@ -23,10 +23,10 @@ using zt::fnd::AnsiString;
 using zt::fnd::Guid;
 using zt::fnd::String;
 
-const std::wstring k_wideAscii(
+const std::wstring kWideAscii(
     L"/Library/Frameworks/Example Dictionary.framework/Resources/Info.vlr");
-const std::string k_ascii("/Library/Frameworks/Example Dictionary.framework/Resources/Info.vlr");
-const char k_guidText[] = "{00112233-4455-6677-8899-AABBCCDDEEFF}";
+const std::string kAscii("/Library/Frameworks/Example Dictionary.framework/Resources/Info.vlr");
+const char kGuidText[] = "{00112233-4455-6677-8899-AABBCCDDEEFF}";
 
 // Half ASCII, half of two to four bytes.
 std::wstring MixedText() {
@@ -86,7 +86,7 @@ BENCHMARK(CopyStd)->Name("Copy/std::wstring")->Arg(64)->Arg(4096);
 // ---- case-insensitive compare of equal texts; the argument tells whether their case differs
 
 std::wstring OtherCase(bool differs) {
-  std::wstring text = k_wideAscii;
+  std::wstring text = kWideAscii;
   for (wchar_t& c : text) {
     if (differs && c >= L'a' && c <= L'z') c = static_cast<wchar_t>(c - L'a' + L'A');
   }
@@ -94,13 +94,13 @@ std::wstring OtherCase(bool differs) {
 }
 
 void CompareString(benchmark::State& state) {
-  const String a(k_wideAscii.c_str()), b(OtherCase(state.range(0) != 0).c_str());
+  const String a(kWideAscii.c_str()), b(OtherCase(state.range(0) != 0).c_str());
   for (auto _ : state) benchmark::DoNotOptimize(a.compare(b));
 }
 BENCHMARK(CompareString)->Name("CaseCompare/String")->Arg(0)->Arg(1);
 
 void CompareStd(benchmark::State& state) {
-  const std::wstring a(k_wideAscii), b(OtherCase(state.range(0) != 0));
+  const std::wstring a(kWideAscii), b(OtherCase(state.range(0) != 0));
   for (auto _ : state) benchmark::DoNotOptimize(wcscasecmp(a.c_str(), b.c_str()));
 }
 BENCHMARK(CompareStd)->Name("CaseCompare/wcscasecmp")->Arg(0)->Arg(1);
@@ -108,7 +108,7 @@ BENCHMARK(CompareStd)->Name("CaseCompare/wcscasecmp")->Arg(0)->Arg(1);
 // ---- UTF-8, both ways; the argument is 0 for ASCII and 1 for mixed text
 
 void DecodeFoundation(benchmark::State& state) {
-  const std::string text = state.range(0) == 0 ? k_ascii : MixedUtf8();
+  const std::string text = state.range(0) == 0 ? kAscii : MixedUtf8();
   const auto* const begin = reinterpret_cast<const unsigned char*>(text.data());
   std::vector<wchar_t> out(text.size());
   for (auto _ : state) {
@@ -120,7 +120,7 @@ void DecodeFoundation(benchmark::State& state) {
 BENCHMARK(DecodeFoundation)->Name("Utf8Decode/Utf8ToWide")->Arg(0)->Arg(1);
 
 void DecodePosix(benchmark::State& state) {
-  const std::string text = state.range(0) == 0 ? k_ascii : MixedUtf8();
+  const std::string text = state.range(0) == 0 ? kAscii : MixedUtf8();
   std::vector<wchar_t> out(text.size() + 1);
   for (auto _ : state) {
     benchmark::DoNotOptimize(std::mbstowcs(out.data(), text.c_str(), out.size()));
@@ -130,7 +130,7 @@ void DecodePosix(benchmark::State& state) {
 BENCHMARK(DecodePosix)->Name("Utf8Decode/mbstowcs")->Arg(0)->Arg(1);
 
 void EncodeFoundation(benchmark::State& state) {
-  const std::wstring text = state.range(0) == 0 ? k_wideAscii : MixedText();
+  const std::wstring text = state.range(0) == 0 ? kWideAscii : MixedText();
   std::vector<unsigned char> out(text.size() * 4);
   for (auto _ : state) {
     benchmark::DoNotOptimize(zt::fnd::WideToUtf8(text.data(), text.data() + text.size(), out.data(),
@@ -141,7 +141,7 @@ void EncodeFoundation(benchmark::State& state) {
 BENCHMARK(EncodeFoundation)->Name("Utf8Encode/WideToUtf8")->Arg(0)->Arg(1);
 
 void EncodePosix(benchmark::State& state) {
-  const std::wstring text = state.range(0) == 0 ? k_wideAscii : MixedText();
+  const std::wstring text = state.range(0) == 0 ? kWideAscii : MixedText();
   std::vector<char> out(text.size() * 4 + 1);
   for (auto _ : state) {
     benchmark::DoNotOptimize(std::wcstombs(out.data(), text.c_str(), out.size()));
@@ -154,7 +154,7 @@ BENCHMARK(EncodePosix)->Name("Utf8Encode/wcstombs")->Arg(0)->Arg(1);
 
 void WidenString(benchmark::State& state) {
   for (auto _ : state) {
-    const String s(k_ascii.c_str());
+    const String s(kAscii.c_str());
     benchmark::DoNotOptimize(s.c_str());
   }
 }
@@ -162,8 +162,8 @@ BENCHMARK(WidenString)->Name("Widen/String");
 
 void WidenPosix(benchmark::State& state) {
   for (auto _ : state) {
-    std::wstring s(k_ascii.size(), L'\0');
-    s.resize(std::mbstowcs(s.data(), k_ascii.c_str(), s.size() + 1));
+    std::wstring s(kAscii.size(), L'\0');
+    s.resize(std::mbstowcs(s.data(), kAscii.c_str(), s.size() + 1));
     benchmark::DoNotOptimize(s.c_str());
   }
 }
@@ -171,7 +171,7 @@ BENCHMARK(WidenPosix)->Name("Widen/mbstowcs");
 
 void NarrowString(benchmark::State& state) {
   for (auto _ : state) {
-    const AnsiString s(k_wideAscii.c_str());
+    const AnsiString s(kWideAscii.c_str());
     benchmark::DoNotOptimize(s.c_str());
   }
 }
@@ -179,8 +179,8 @@ BENCHMARK(NarrowString)->Name("Narrow/AnsiString");
 
 void NarrowPosix(benchmark::State& state) {
   for (auto _ : state) {
-    std::string s(k_wideAscii.size() * 4, '\0');
-    s.resize(std::wcstombs(s.data(), k_wideAscii.c_str(), s.size() + 1));
+    std::string s(kWideAscii.size() * 4, '\0');
+    s.resize(std::wcstombs(s.data(), kWideAscii.c_str(), s.size() + 1));
     benchmark::DoNotOptimize(s.c_str());
   }
 }
@@ -189,7 +189,7 @@ BENCHMARK(NarrowPosix)->Name("Narrow/wcstombs");
 // ---- GUIDs
 
 void ParseGuid(benchmark::State& state) {
-  const String text(k_guidText);
+  const String text(kGuidText);
   Guid guid;
   for (auto _ : state) {
     guid.fromString(text);
@@ -201,7 +201,7 @@ BENCHMARK(ParseGuid)->Name("GuidParse/Guid");
 void ParseScanf(benchmark::State& state) {
   for (auto _ : state) {
     unsigned d1, d[10];
-    benchmark::DoNotOptimize(std::sscanf(k_guidText, "{%8x-%4x-%4x-%2x%2x-%2x%2x%2x%2x%2x%2x}", &d1,
+    benchmark::DoNotOptimize(std::sscanf(kGuidText, "{%8x-%4x-%4x-%2x%2x-%2x%2x%2x%2x%2x%2x}", &d1,
                                          &d[0], &d[1], &d[2], &d[3], &d[4], &d[5], &d[6], &d[7],
                                          &d[8], &d[9]));
     benchmark::DoNotOptimize(d);
@@ -210,7 +210,7 @@ void ParseScanf(benchmark::State& state) {
 BENCHMARK(ParseScanf)->Name("GuidParse/sscanf");
 
 void PrintGuid(benchmark::State& state) {
-  const Guid guid{String(k_guidText)};
+  const Guid guid{String(kGuidText)};
   String text;
   for (auto _ : state) {
     guid.toString(text);
@@ -220,7 +220,7 @@ void PrintGuid(benchmark::State& state) {
 BENCHMARK(PrintGuid)->Name("GuidPrint/Guid");
 
 void PrintPrintf(benchmark::State& state) {
-  const _GUID g = Guid(String(k_guidText)).get();
+  const _GUID g = Guid(String(kGuidText)).get();
   char text[39];
   for (auto _ : state) {
     std::snprintf(text, sizeof text, "{%08X-%04X-%04X-%02X%02X-%02X%02X%02X%02X%02X%02X}", g.Data1,

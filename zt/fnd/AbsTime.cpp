@@ -11,8 +11,8 @@ namespace {
 
 typedef tSSTimeValue::tValue Value;
 
-constexpr std::uint64_t k_half = std::uint64_t(1) << 63;
-constexpr double k_two64 = 18446744073709551616.0;
+constexpr std::uint64_t kHalf = std::uint64_t(1) << 63;
+constexpr double kTwo64 = 18446744073709551616.0;
 
 void SetStatus(std::int32_t* status, std::int32_t error) {
   if (status != nullptr && *status == tSSTimeValue::kNoError) *status = error;
@@ -24,7 +24,7 @@ struct UnitFactor {
   bool perSecond;  // so many to the second; otherwise so many seconds
 };
 
-constexpr UnitFactor k_unitFactors[] = {
+constexpr UnitFactor kUnitFactors[] = {
     {nZTSS100::kTimeUnitAtto, 1000000000000000000, true},
     {nZTSS100::kTimeUnitFemto, 1000000000000000, true},
     {nZTSS100::kTimeUnitPico, 1000000000000, true},
@@ -42,7 +42,7 @@ bool RoundsAway(tSSTimeValue::tRoundMethod method, const Value& magnitude, bool 
   const std::uint64_t fraction = magnitude.fractionBits();
   switch (method) {
     case tSSTimeValue::kRoundNearest:
-      return fraction > k_half || (fraction == k_half && magnitude.IsOdd());
+      return fraction > kHalf || (fraction == kHalf && magnitude.IsOdd());
     case tSSTimeValue::kRoundUp:
       return fraction != 0 && !negative;
     case tSSTimeValue::kRoundDown:
@@ -57,8 +57,8 @@ bool RoundsAway(tSSTimeValue::tRoundMethod method, const Value& magnitude, bool 
 void tSSTimeValue::_CorrectUnits(tUnitConversion conversion, tTimeUnit unit, tValue& value,
                                  std::int32_t* status) {
   if (unit == nZTSS100::kTimeUnitSecond) return;
-  const UnitFactor* const end = std::end(k_unitFactors);
-  const UnitFactor* const row = std::find_if(std::begin(k_unitFactors), end,
+  const UnitFactor* const end = std::end(kUnitFactors);
+  const UnitFactor* const row = std::find_if(std::begin(kUnitFactors), end,
                                              [=](const UnitFactor& f) { return f.unit == unit; });
   if (row == end) return SetStatus(status, kInvalidUnit);
   const tValue factor(static_cast<long long>(row->factor));
@@ -89,11 +89,11 @@ namespace zt {
 namespace fnd {
 namespace {
 
-constexpr Value k_most(0x7FFFFFFF, 0xFFFFFFFF, 0, 0);
-constexpr Value k_least(0x80000000, 0, 0, 0);
+constexpr Value kMost(0x7FFFFFFF, 0xFFFFFFFF, 0, 0);
+constexpr Value kLeast(0x80000000, 0, 0, 0);
 
 // Seconds from 1904 in which 64 bits of ticks surely end, on either side, and well before 65 would.
-constexpr Value k_ticksEnd(1000000000000LL);
+constexpr Value kTicksEnd(1000000000000LL);
 
 std::int64_t Limit(bool negative) {
   return negative ? std::numeric_limits<std::int64_t>::min()
@@ -110,7 +110,7 @@ std::int64_t CountSince(Value value, std::int64_t offset, tTimeUnit unit, bool r
   std::int32_t status = tSSTimeValue::kNoError;
   tSSTimeValue::_CorrectUnits(tSSTimeValue::kFromSeconds, unit, value, &status);
   const auto method = round ? tSSTimeValue::kRoundNearest : tSSTimeValue::kRoundTowardZero;
-  tSSTimeValue::_RoundAndCheckFit(method, k_most, k_least, value, &status);
+  tSSTimeValue::_RoundAndCheckFit(method, kMost, kLeast, value, &status);
   return status == tSSTimeValue::kNoError ? value.integerPart() : Limit(negative);
 }
 
@@ -120,9 +120,7 @@ bool ShowsAsOne(double fraction) {
   return fraction >= 1.0 || 1.0 - fraction <= band;
 }
 
-double FractionOf(const Value& value) {
-  return static_cast<double>(value.fractionBits()) / k_two64;
-}
+double FractionOf(const Value& value) { return static_cast<double>(value.fractionBits()) / kTwo64; }
 
 }  // namespace
 
@@ -130,7 +128,7 @@ std::int64_t AbsTime::getSeconds() const noexcept {
   const bool negative = m_value.IsNegative();
   const Value magnitude = negative ? -m_value : m_value;
   Value whole = m_value;
-  tSSTimeValue::_RoundAndCheckFit(tSSTimeValue::kRoundTowardZero, k_most, k_least, whole, nullptr);
+  tSSTimeValue::_RoundAndCheckFit(tSSTimeValue::kRoundTowardZero, kMost, kLeast, whole, nullptr);
   const std::int64_t seconds = whole.integerPart();
   if (!ShowsAsOne(FractionOf(magnitude)) || seconds == Limit(negative)) return seconds;
   return negative ? seconds - 1 : seconds + 1;
@@ -142,14 +140,14 @@ double AbsTime::getFraction() const noexcept {
 }
 
 std::int64_t AbsTime::toTime_T(bool round) const noexcept {
-  return CountSince(m_value, -k_unixEpoch, nZTSS100::kTimeUnitSecond, round);
+  return CountSince(m_value, -kUnixEpoch, nZTSS100::kTimeUnitSecond, round);
 }
 
 std::int64_t AbsTime::toLKTIME(bool round) const noexcept {
   // The change of its sign tells a product that is too large, but only up to twice the range.
   const bool negative = m_value.IsNegative();
-  if (negative ? m_value < -k_ticksEnd : m_value > k_ticksEnd) return Limit(negative);
-  return CountSince(m_value, k_lktimeEpoch, nZTSS100::kTimeUnitTicks, round);
+  if (negative ? m_value < -kTicksEnd : m_value > kTicksEnd) return Limit(negative);
+  return CountSince(m_value, kLktimeEpoch, nZTSS100::kTimeUnitTicks, round);
 }
 
 }  // namespace fnd

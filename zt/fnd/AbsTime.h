@@ -66,8 +66,8 @@ class AbsTime {
   static const AbsTime min;
 
   // Seconds from 1904 to the Unix epoch, and from 1601, where LKTIME starts, to 1904.
-  static constexpr std::int64_t k_unixEpoch = 2082844800;
-  static constexpr std::int64_t k_lktimeEpoch = 9561628800;
+  static constexpr std::int64_t kUnixEpoch = 2082844800;
+  static constexpr std::int64_t kLktimeEpoch = 9561628800;
 
   constexpr AbsTime() noexcept = default;  // 1904
   constexpr explicit AbsTime(const Value& value) noexcept : m_value(value) {}

@@ -12,17 +12,17 @@ typedef V::tValue Fixed;
 
 namespace {
 
-constexpr std::int64_t k_most = std::numeric_limits<std::int64_t>::max();
-constexpr std::int64_t k_least = std::numeric_limits<std::int64_t>::min();
+constexpr std::int64_t kMost = std::numeric_limits<std::int64_t>::max();
+constexpr std::int64_t kLeast = std::numeric_limits<std::int64_t>::min();
 
 AbsTime Unix(double seconds) { return AbsTime(2082844800.0, seconds); }
 
-const Fixed k_wholeMax(0x7FFFFFFF, 0xFFFFFFFF, 0, 0), k_wholeMin(0x80000000, 0, 0, 0);
+const Fixed kWholeMax(0x7FFFFFFF, 0xFFFFFFFF, 0, 0), kWholeMin(0x80000000, 0, 0, 0);
 
 double Rounded(V::tRoundMethod method, double number) {
   Fixed value(number);
   std::int32_t status = 0;
-  V::_RoundAndCheckFit(method, k_wholeMax, k_wholeMin, value, &status);
+  V::_RoundAndCheckFit(method, kWholeMax, kWholeMin, value, &status);
   EXPECT_EQ(0, status);
   EXPECT_EQ(0u, value.fractionBits());
   return static_cast<double>(value);
@@ -99,8 +99,8 @@ TEST(AbsTime, WhatDoesNotFitEndsAtTheLimits) {
 TEST(AbsTime, FarTimesEndAtTheLimitsOfTicks) {
   for (double seconds : {1.9e12, 2e12, 1e13, 1e15, 1e17, 9e18}) {
     for (bool round : {false, true}) {
-      EXPECT_EQ(k_most, AbsTime(seconds, 0).toLKTIME(round)) << seconds;
-      EXPECT_EQ(k_least, AbsTime(-seconds, 0).toLKTIME(round)) << seconds;
+      EXPECT_EQ(kMost, AbsTime(seconds, 0).toLKTIME(round)) << seconds;
+      EXPECT_EQ(kLeast, AbsTime(-seconds, 0).toLKTIME(round)) << seconds;
       EXPECT_EQ(static_cast<std::int64_t>(seconds) - 2082844800,
                 AbsTime(seconds, 0).toTime_T(round));
     }
@@ -112,24 +112,24 @@ TEST(AbsTime, TicksAroundTheLimit) {
   const auto after = [](std::int64_t seconds, int ticks) {
     return AbsTime(Fixed(seconds) + Fixed(ticks) / Fixed(10000000));
   };
-  EXPECT_EQ(k_most - 1, after(912775574885, 4775806).toLKTIME(true));
-  EXPECT_EQ(k_most, after(912775574885, 4775807).toLKTIME(true));
-  EXPECT_EQ(k_most, after(912775574885, 4775808).toLKTIME(true));
-  EXPECT_EQ(k_most, after(912775574886, 0).toLKTIME(false));
-  EXPECT_EQ(k_most, after(912775574887, 0).toLKTIME(false));
-  EXPECT_EQ(k_least + 1, after(-931898832485, -4775807).toLKTIME(true));
-  EXPECT_EQ(k_least, after(-931898832485, -4775808).toLKTIME(true));
-  EXPECT_EQ(k_least, after(-931898832485, -4775809).toLKTIME(true));
-  EXPECT_EQ(k_least, after(-931898832486, 0).toLKTIME(false));
-  EXPECT_EQ(k_least, after(-931898832487, 0).toLKTIME(false));
+  EXPECT_EQ(kMost - 1, after(912775574885, 4775806).toLKTIME(true));
+  EXPECT_EQ(kMost, after(912775574885, 4775807).toLKTIME(true));
+  EXPECT_EQ(kMost, after(912775574885, 4775808).toLKTIME(true));
+  EXPECT_EQ(kMost, after(912775574886, 0).toLKTIME(false));
+  EXPECT_EQ(kMost, after(912775574887, 0).toLKTIME(false));
+  EXPECT_EQ(kLeast + 1, after(-931898832485, -4775807).toLKTIME(true));
+  EXPECT_EQ(kLeast, after(-931898832485, -4775808).toLKTIME(true));
+  EXPECT_EQ(kLeast, after(-931898832485, -4775809).toLKTIME(true));
+  EXPECT_EQ(kLeast, after(-931898832486, 0).toLKTIME(false));
+  EXPECT_EQ(kLeast, after(-931898832487, 0).toLKTIME(false));
 }
 
 TEST(AbsTime, SecondsTruncateTowardZero) {
   EXPECT_EQ(1, AbsTime(1, 0.75).getSeconds());
   EXPECT_EQ(-1, AbsTime(-1.25, 0).getSeconds());
   EXPECT_EQ(0, AbsTime(-0.75, 0).getSeconds());
-  EXPECT_EQ(k_least, AbsTime::min.getSeconds());
-  EXPECT_EQ(k_most, AbsTime::max.getSeconds()) << "the carry does not wrap";
+  EXPECT_EQ(kLeast, AbsTime::min.getSeconds());
+  EXPECT_EQ(kMost, AbsTime::max.getSeconds()) << "the carry does not wrap";
 }
 
 TEST(AbsTime, FractionThatShowsAsOneCarriesOver) {
@@ -240,6 +240,6 @@ TEST(AbsTimeValue, ResultsOutsideTheBoundsDoNotFit) {
   }
   Fixed value(0x7FFFFFFF, 0xFFFFFFFF, 0x80000000, 0);
   std::int32_t status = 0;
-  V::_RoundAndCheckFit(V::kRoundNearest, k_wholeMax, k_wholeMin, value, &status);
+  V::_RoundAndCheckFit(V::kRoundNearest, kWholeMax, kWholeMin, value, &status);
   EXPECT_EQ(-50175, status) << "rounding passes the largest number";
 }

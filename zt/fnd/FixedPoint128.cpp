@@ -7,11 +7,11 @@ namespace {
 
 typedef tFixedPoint128<64, true> Fixed;
 
-constexpr Fixed k_largest(0x7FFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF);
-constexpr Fixed k_least(0x80000000, 0, 0, 0);
-constexpr double k_two63 = 9223372036854775808.0;
-constexpr double k_two64 = 18446744073709551616.0;
-constexpr long double k_longTwo64 = 18446744073709551616.0L;
+constexpr Fixed kLargest(0x7FFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF);
+constexpr Fixed kLeast(0x80000000, 0, 0, 0);
+constexpr double kTwo63 = 9223372036854775808.0;
+constexpr double kTwo64 = 18446744073709551616.0;
+constexpr long double kLongTwo64 = 18446744073709551616.0L;
 
 // A number of words of 32 bits, least significant first.
 struct Words {
@@ -25,7 +25,7 @@ Fixed FromMagnitude(double value) {
   const double integer = std::floor(value);
   const auto high = static_cast<std::uint64_t>(integer);
   // Exact: the difference has no more bits than the value, and scaling only moves the exponent.
-  const auto low = static_cast<std::uint64_t>((value - integer) * k_two64);
+  const auto low = static_cast<std::uint64_t>((value - integer) * kTwo64);
   return Fixed(static_cast<std::uint32_t>(high >> 32), static_cast<std::uint32_t>(high),
                static_cast<std::uint32_t>(low >> 32), static_cast<std::uint32_t>(low));
 }
@@ -34,10 +34,10 @@ Fixed FromMagnitude(double value) {
 
 Fixed::tFixedPoint128(double value) noexcept : tFixedPoint128() {
   if (std::isnan(value)) return;
-  if (value >= k_two63) {
-    *this = k_largest;
-  } else if (value <= -k_two63) {
-    *this = k_least;
+  if (value >= kTwo63) {
+    *this = kLargest;
+  } else if (value <= -kTwo63) {
+    *this = kLeast;
   } else {
     *this = FromMagnitude(std::fabs(value));
     if (value < 0) Negate();
@@ -49,14 +49,14 @@ Fixed::tFixedPoint128(double integer, double fraction) noexcept : tFixedPoint128
   const bool wasNegative = IsNegative();
   *this += more;
   if (wasNegative == more.IsNegative() && wasNegative != IsNegative()) {
-    *this = wasNegative ? k_least : k_largest;
+    *this = wasNegative ? kLeast : kLargest;
   }
 }
 
 Fixed::operator long double() const noexcept {
   const tFixedPoint128 m = magnitude();
   const long double value =
-      static_cast<long double>(m.m_high) + static_cast<long double>(m.m_low) / k_longTwo64;
+      static_cast<long double>(m.m_high) + static_cast<long double>(m.m_low) / kLongTwo64;
   return IsNegative() ? -value : value;
 }
 
@@ -109,7 +109,7 @@ Fixed& Fixed::operator*=(const tFixedPoint128& other) noexcept {
 
 Fixed& Fixed::operator/=(const tFixedPoint128& other) noexcept {
   const bool negative = IsNegative() != other.IsNegative();
-  if (!other) return *this = IsNegative() ? k_least : k_largest;
+  if (!other) return *this = IsNegative() ? kLeast : kLargest;
   *this = magnitude();
   DivideInternal(other.magnitude());
   if (negative) Negate();

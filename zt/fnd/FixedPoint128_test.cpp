@@ -9,7 +9,7 @@ typedef nZTSS100::tFixedPoint128<64, true> Fixed;
 
 namespace {
 
-constexpr std::uint32_t k_ones = 0xFFFFFFFF;
+constexpr std::uint32_t kOnes = 0xFFFFFFFF;
 
 void ExpectWords(const Fixed& value, std::uint32_t w3, std::uint32_t w2, std::uint32_t w1,
                  std::uint32_t w0) {
@@ -33,16 +33,16 @@ TEST(FixedPoint128, WordsStandFromTheMostSignificantDown) {
 
 TEST(FixedPoint128, IntegersBecomeTheIntegerPart) {
   ExpectWords(Fixed(5), 0, 5, 0, 0);
-  ExpectWords(Fixed(-1), k_ones, k_ones, 0, 0);
+  ExpectWords(Fixed(-1), kOnes, kOnes, 0, 0);
   ExpectWords(Fixed(4000000000u), 0, 4000000000u, 0, 0);
-  ExpectWords(Fixed(-2L), k_ones, k_ones - 1, 0, 0);
+  ExpectWords(Fixed(-2L), kOnes, kOnes - 1, 0, 0);
   ExpectWords(Fixed(7UL), 0, 7, 0, 0);
   ExpectWords(Fixed(9561628800LL), 2, 971694208, 0, 0);
 }
 
 TEST(FixedPoint128, DoublesKeepTheirFraction) {
   ExpectWords(Fixed(1.5), 0, 1, 0x80000000, 0);
-  ExpectWords(Fixed(-1.25), k_ones, k_ones - 1, 0xC0000000, 0);
+  ExpectWords(Fixed(-1.25), kOnes, kOnes - 1, 0xC0000000, 0);
   ExpectWords(Fixed(0.75), 0, 0, 0xC0000000, 0);
   ExpectWords(Fixed(1.0, 0.5), 0, 1, 0x80000000, 0);
   ExpectWords(Fixed(4294967296.0, 0.25), 1, 0, 0x40000000, 0);
@@ -53,10 +53,10 @@ TEST(FixedPoint128, DoublesKeepTheirFraction) {
 
 TEST(FixedPoint128, DoublesBeyondTheRangeAreClamped) {
   const double huge = std::numeric_limits<double>::infinity();
-  ExpectWords(Fixed(1e30), 0x7FFFFFFF, k_ones, k_ones, k_ones);
+  ExpectWords(Fixed(1e30), 0x7FFFFFFF, kOnes, kOnes, kOnes);
   ExpectWords(Fixed(-huge), 0x80000000, 0, 0, 0);
   ExpectWords(Fixed(std::nan("")), 0, 0, 0, 0);
-  ExpectWords(Fixed(huge, 1.0), 0x7FFFFFFF, k_ones, k_ones, k_ones);
+  ExpectWords(Fixed(huge, 1.0), 0x7FFFFFFF, kOnes, kOnes, kOnes);
   ExpectWords(Fixed(-huge, -1.0), 0x80000000, 0, 0, 0);
 }
 
@@ -74,9 +74,9 @@ TEST(FixedPoint128, SumsCarryAndBorrow) {
   value += Fixed(0, 0, 0, 1);
   ExpectWords(value, 0, 2, 0, 0);
   value -= Fixed(0, 0, 0, 1);
-  ExpectWords(value, 0, 1, k_ones, k_ones);
-  ExpectWords(Fixed(3) - Fixed(5), k_ones, k_ones - 1, 0, 0);
-  ExpectWords(Fixed(0x7FFFFFFF, k_ones, 0, 0) + Fixed(1), 0x80000000, 0, 0, 0);
+  ExpectWords(value, 0, 1, kOnes, kOnes);
+  ExpectWords(Fixed(3) - Fixed(5), kOnes, kOnes - 1, 0, 0);
+  ExpectWords(Fixed(0x7FFFFFFF, kOnes, 0, 0) + Fixed(1), 0x80000000, 0, 0, 0);
 }
 
 TEST(FixedPoint128, NegateInvertIncrement) {
@@ -86,7 +86,7 @@ TEST(FixedPoint128, NegateInvertIncrement) {
   EXPECT_EQ(Fixed(1.5), -value);
   value = Fixed(0, 0, 0, 0);
   value.Invert();
-  ExpectWords(value, k_ones, k_ones, k_ones, k_ones);
+  ExpectWords(value, kOnes, kOnes, kOnes, kOnes);
   value.IncrementLSB();
   EXPECT_TRUE(!value);
   value = Fixed(7);
@@ -100,9 +100,8 @@ TEST(FixedPoint128, ProductsTruncateTowardZero) {
   EXPECT_EQ(Fixed(-3.75), Fixed(1.5) * Fixed(-2.5));
   EXPECT_EQ(Fixed(3.75), Fixed(-1.5) * Fixed(-2.5));
   EXPECT_EQ(Fixed(0), Fixed(0, 0, 0, 1) * Fixed(0.5));
-  EXPECT_EQ(Fixed(0), Fixed(k_ones, k_ones, k_ones, k_ones) * Fixed(0.5));
-  ExpectWords(Fixed(0, k_ones, k_ones, k_ones) * Fixed(0x10000), 0xFFFF, k_ones, k_ones,
-              0xFFFF0000);
+  EXPECT_EQ(Fixed(0), Fixed(kOnes, kOnes, kOnes, kOnes) * Fixed(0.5));
+  ExpectWords(Fixed(0, kOnes, kOnes, kOnes) * Fixed(0x10000), 0xFFFF, kOnes, kOnes, 0xFFFF0000);
   Fixed wrapped(0x40000000, 0, 0, 0);
   wrapped *= Fixed(2);
   EXPECT_TRUE(wrapped.IsNegative());
@@ -112,7 +111,7 @@ TEST(FixedPoint128, QuotientsTruncateTowardZero) {
   EXPECT_EQ(Fixed(2), Fixed(6) / Fixed(3));
   EXPECT_EQ(Fixed(-1.5), Fixed(3) / Fixed(-2));
   ExpectWords(Fixed(1) / Fixed(3), 0, 0, 0x55555555, 0x55555555);
-  ExpectWords(Fixed(-1) / Fixed(3), k_ones, k_ones, 0xAAAAAAAA, 0xAAAAAAAB);
+  ExpectWords(Fixed(-1) / Fixed(3), kOnes, kOnes, 0xAAAAAAAA, 0xAAAAAAAB);
   ExpectWords(Fixed(0x12345678, 0x9ABCDEF0, 0, 0) / Fixed(0x10000), 0x1234, 0x56789ABC, 0xDEF00000,
               0);
   EXPECT_EQ(Fixed(4), Fixed(1) / Fixed(0.25)) << "a divisor with a fraction";
@@ -170,9 +169,9 @@ TEST(FixedPoint128, ShiftsMoveTheFillIn) {
   value.RightShift(1, false);
   ExpectWords(value, 2, 3, 4, 0);
   value.RightShift(96, true);
-  ExpectWords(value, k_ones, k_ones, k_ones, 2);
+  ExpectWords(value, kOnes, kOnes, kOnes, 2);
   value.LeftShift(200, true);
-  ExpectWords(value, k_ones, k_ones, k_ones, k_ones);
+  ExpectWords(value, kOnes, kOnes, kOnes, kOnes);
   value.RightShift(128, false);
   ExpectWords(value, 0, 0, 0, 0);
   value = Fixed(1, 2, 3, 4);
@@ -185,7 +184,7 @@ TEST(FixedPoint128, ShiftsMoveTheFillIn) {
 
 TEST(FixedPoint128, And) {
   Fixed value(0xF0F0F0F0, 0xFF, 0xFF, 0xFF);
-  value &= Fixed(k_ones, 0x0F, 0xF0, 0);
+  value &= Fixed(kOnes, 0x0F, 0xF0, 0);
   ExpectWords(value, 0xF0F0F0F0, 0x0F, 0xF0, 0);
-  ExpectWords(Fixed(1.5) & Fixed(0, 0, k_ones, k_ones), 0, 0, 0x80000000, 0);
+  ExpectWords(Fixed(1.5) & Fixed(0, 0, kOnes, kOnes), 0, 0, 0x80000000, 0);
 }

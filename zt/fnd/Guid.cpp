@@ -21,39 +21,38 @@ namespace zt {
 namespace fnd {
 namespace {
 
-constexpr unsigned k_textLength = 38;
-constexpr unsigned k_size = sizeof(_GUID);
+constexpr unsigned kTextLength = 38;
+constexpr unsigned kSize = sizeof(_GUID);
 
 // Which byte in memory each pair of digits shows; -1 is a hyphen.
-constexpr int k_byteOrder[] = {3,  2, 1, 0,  -1, 5,  4,  -1, 7,  6,
-                               -1, 8, 9, -1, 10, 11, 12, 13, 14, 15};
+constexpr int kByteOrder[] = {3, 2, 1, 0, -1, 5, 4, -1, 7, 6, -1, 8, 9, -1, 10, 11, 12, 13, 14, 15};
 
 }  // namespace
 
 Guid Guid::make() { return Guid(osdep::MakeGUID()); }
 
 void Guid::toString(String& out) const {
-  static constexpr wchar_t k_digits[] = L"0123456789ABCDEF";
-  unsigned char bytes[k_size];
-  std::memcpy(bytes, &m_guid, k_size);
-  wchar_t text[k_textLength];
+  static constexpr wchar_t kDigits[] = L"0123456789ABCDEF";
+  unsigned char bytes[kSize];
+  std::memcpy(bytes, &m_guid, kSize);
+  wchar_t text[kTextLength];
   wchar_t* p = text;
   *p++ = L'{';
-  for (const int index : k_byteOrder) {
+  for (const int index : kByteOrder) {
     if (index < 0) {
       *p++ = L'-';
     } else {
-      *p++ = k_digits[bytes[index] >> 4];
-      *p++ = k_digits[bytes[index] & 0x0F];
+      *p++ = kDigits[bytes[index] >> 4];
+      *p++ = kDigits[bytes[index] & 0x0F];
     }
   }
   *p = L'}';
-  out.assign(text, k_textLength);
+  out.assign(text, kTextLength);
 }
 
 void Guid::fromString(const String& text) {
-  if (text.length() != k_textLength) ZT_RAISE(exception::BadGuidString());
-  unsigned char bytes[k_size] = {};
+  if (text.length() != kTextLength) ZT_RAISE(exception::BadGuidString());
+  unsigned char bytes[kSize] = {};
   unsigned char* out = bytes;
   const wchar_t* cursor = text.begin();
   const wchar_t* const end = text.end();
@@ -70,7 +69,7 @@ void Guid::fromString(const String& text) {
   for (int i = 0; i < 6; ++i) ParseHex<std::uint8_t>(cursor, end, out, ok);
   SkipCharacter(cursor, end, L'}', ok);
   if (!ok) ZT_RAISE(exception::BadGuidString());
-  std::memcpy(&m_guid, bytes, k_size);
+  std::memcpy(&m_guid, bytes, kSize);
 }
 
 void Guid::deserialize(const unsigned char*& cursor, const unsigned char* limit) {

@@ -12,8 +12,8 @@ using namespace zt::fnd;
 
 namespace {
 
-constexpr wchar_t k_text[] = L"{00112233-4455-6677-8899-AABBCCDDEEFF}";
-constexpr _GUID k_guid = {
+constexpr wchar_t kText[] = L"{00112233-4455-6677-8899-AABBCCDDEEFF}";
+constexpr _GUID kGuid = {
     0x00112233, 0x4455, 0x6677, {0x88, 0x99, 0xAA, 0xBB, 0xCC, 0xDD, 0xEE, 0xFF}};
 
 std::wstring Text(const Guid& guid) {
@@ -26,9 +26,9 @@ std::wstring Text(const Guid& guid) {
 
 TEST(Guid, IsSixteenBytesThatCopyAsTheyAre) {
   static_assert(sizeof(Guid) == 16 && std::is_trivially_copyable_v<Guid>);
-  const Guid guid(k_guid);
+  const Guid guid(kGuid);
   const Guid copy(guid);
-  EXPECT_EQ(0, std::memcmp(&copy, &k_guid, 16));
+  EXPECT_EQ(0, std::memcmp(&copy, &kGuid, 16));
 }
 
 TEST(Guid, ZerosRoundTrip) {
@@ -38,21 +38,21 @@ TEST(Guid, ZerosRoundTrip) {
 }
 
 TEST(Guid, ParsesItsFields) {
-  const Guid guid(k_text);
+  const Guid guid(kText);
   EXPECT_EQ(0x00112233u, guid.get().Data1);
   EXPECT_EQ(0x4455u, guid.get().Data2);
   EXPECT_EQ(0x6677u, guid.get().Data3);
-  EXPECT_EQ(0, std::memcmp(guid.get().Data4, k_guid.Data4, 8));
-  EXPECT_EQ(k_text, Text(guid));
+  EXPECT_EQ(0, std::memcmp(guid.get().Data4, kGuid.Data4, 8));
+  EXPECT_EQ(kText, Text(guid));
 }
 
 TEST(Guid, LowerCaseParsesAndPrintsInCapitals) {
-  EXPECT_EQ(k_text, Text(Guid(L"{00112233-4455-6677-8899-aabbccddeeff}")));
-  EXPECT_EQ(k_text, Text(Guid(L"{00112233-4455-6677-8899-AaBbCcDdEeFf}")));
+  EXPECT_EQ(kText, Text(Guid(L"{00112233-4455-6677-8899-aabbccddeeff}")));
+  EXPECT_EQ(kText, Text(Guid(L"{00112233-4455-6677-8899-AaBbCcDdEeFf}")));
 }
 
 TEST(Guid, WrongLengthsRaise) {
-  const std::wstring text(k_text);
+  const std::wstring text(kText);
   for (const std::wstring& bad :
        {std::wstring(), text.substr(1, 36), text.substr(0, 37), text + L" ", text + text}) {
     EXPECT_THROW(Guid(String(bad.c_str())), exception::BadGuidString);
@@ -60,16 +60,16 @@ TEST(Guid, WrongLengthsRaise) {
 }
 
 TEST(Guid, EveryWrongCharacterRaisesAndChangesNothing) {
-  Guid guid(k_text);
+  Guid guid(kText);
   for (unsigned i = 0; i < 38; ++i) {
     for (const wchar_t wrong : {L'g', L'G', L'/', L':', L'@', L'`', L' ', L'\0', L'\xFF11'}) {
       String bad(L"{FFFFFFFF-FFFF-FFFF-FFFF-FFFFFFFFFFFF}");
       bad[i] = wrong;
       EXPECT_THROW(guid.fromString(bad), exception::BadGuidString) << i;
-      EXPECT_EQ(k_text, Text(guid));
+      EXPECT_EQ(kText, Text(guid));
     }
   }
-  String bad(k_text);
+  String bad(kText);
   bad[37] = L')';
   EXPECT_THROW(guid.fromString(bad), exception::BadGuidString) << "38 characters, wrong end";
   bad = L"{0011223344-55-6677-8899-AABBCCDDEEFF}";
@@ -107,20 +107,20 @@ TEST(Guid, DeserializesTheMemoryForm) {
   Guid guid;
   const unsigned char* cursor = bytes;
   guid.deserialize(cursor, bytes + 17);
-  EXPECT_EQ(k_text, Text(guid));
+  EXPECT_EQ(kText, Text(guid));
   EXPECT_EQ(bytes + 16, cursor);
   EXPECT_EQ(16u, guid.serializationSize());
 }
 
 TEST(Guid, DeserializingFewerThanSixteenBytesRaises) {
   const unsigned char bytes[16] = {};
-  Guid guid(k_text);
+  Guid guid(kText);
   for (int n = 0; n < 16; ++n) {
     const unsigned char* cursor = bytes;
     EXPECT_THROW(guid.deserialize(cursor, bytes + n), exception::DeserializationError);
     EXPECT_EQ(bytes, cursor);
   }
-  EXPECT_EQ(k_text, Text(guid));
+  EXPECT_EQ(kText, Text(guid));
 }
 
 TEST(Guid, MakeGivesFreshVersionFourUuids) {

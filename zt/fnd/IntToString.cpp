@@ -10,7 +10,7 @@ namespace zt {
 namespace fnd {
 namespace {
 
-constexpr wchar_t k_digits[] = L"0123456789ABCDEFGHIJKLMNOPQRSTUVWXYZ";
+constexpr wchar_t kDigits[] = L"0123456789ABCDEFGHIJKLMNOPQRSTUVWXYZ";
 
 // Prints from the last digit to the first, with "-" in front if asked for.
 template <class Unsigned>
@@ -21,7 +21,7 @@ String Print(Unsigned value, unsigned int base, bool minus = false) {
   wchar_t* const end = buffer + std::numeric_limits<Unsigned>::digits + 1;
   wchar_t* p = end;
   do {
-    *--p = k_digits[value % base];
+    *--p = kDigits[value % base];
     value = static_cast<Unsigned>(value / base);
   } while (value != 0);
   if (minus) *--p = L'-';

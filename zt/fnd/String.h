@@ -18,17 +18,17 @@ enum class BufferStrategy : std::int32_t {
 
 // The tagged conversions: which string is built from which.
 template <class To, class From>
-inline constexpr bool k_convertsByTag = false;
+inline constexpr bool kConvertsByTag = false;
 template <>
-inline constexpr bool k_convertsByTag<Utf8String, String> = true;
+inline constexpr bool kConvertsByTag<Utf8String, String> = true;
 template <>
-inline constexpr bool k_convertsByTag<String, Utf8String> = true;
+inline constexpr bool kConvertsByTag<String, Utf8String> = true;
 template <>
-inline constexpr bool k_convertsByTag<AsciiString, String> = true;
+inline constexpr bool kConvertsByTag<AsciiString, String> = true;
 template <>
-inline constexpr bool k_convertsByTag<String, AsciiString> = true;
+inline constexpr bool kConvertsByTag<String, AsciiString> = true;
 template <>
-inline constexpr bool k_convertsByTag<Utf8String, AsciiString> = true;  // copies the bytes
+inline constexpr bool kConvertsByTag<Utf8String, AsciiString> = true;  // copies the bytes
 
 // Text of 32-bit length in one heap block of its own.
 //
@@ -83,7 +83,7 @@ class StringBase {
 
   // Conversion between encodings. The first argument is ignored: it only selects the overload.
   template <class From>
-  requires k_convertsByTag<StringBase, From> StringBase(const void*, const From& other) {
+  requires kConvertsByTag<StringBase, From> StringBase(const void*, const From& other) {
     convertFrom(other);
   }
 

@@ -21,13 +21,13 @@ namespace zt {
 namespace fnd {
 namespace string_detail {
 
-inline constexpr std::uint64_t k_max32 = 0xFFFFFFFFu;
+inline constexpr std::uint64_t kMax32 = 0xFFFFFFFFu;
 
 // Bytes of a block for n characters and the terminator.
 template <class T>
 std::uint32_t BlockBytes(std::uint32_t n) {
   const std::uint64_t bytes = (static_cast<std::uint64_t>(n) + 1) * sizeof(T);
-  if (n == k_max32 || bytes > k_max32) ZT_RAISE(exception::OutOfRange());
+  if (n == kMax32 || bytes > kMax32) ZT_RAISE(exception::OutOfRange());
   return static_cast<std::uint32_t>(bytes);
 }
 
@@ -85,7 +85,7 @@ void Grow(std::uint32_t required, T*& begin, T*& end, T*& capacityEnd) {
   std::uint64_t capacity = 2 * static_cast<std::uint64_t>(required);
   const std::uint64_t bytes = (capacity + 1) * sizeof(T);
   void* block = nullptr;
-  if (bytes <= k_max32) block = DLLReallocNoThrow(begin, static_cast<std::uint32_t>(bytes));
+  if (bytes <= kMax32) block = DLLReallocNoThrow(begin, static_cast<std::uint32_t>(bytes));
   if (block == nullptr) {
     capacity = required;
     block = DLLRealloc(begin, BlockBytes<T>(required));

@@ -15,8 +15,8 @@
 namespace zt {
 namespace fnd {
 
-inline constexpr char k_processLocale[] = "";
-inline constexpr char k_ascii[] = "US-ASCII";
+inline constexpr char kProcessLocale[] = "";
+inline constexpr char kAscii[] = "US-ASCII";
 
 template <const char* Locale>
 struct FromLocaleText {
@@ -44,13 +44,13 @@ template <class To, class From>
 struct StringCodec;
 
 template <>
-struct StringCodec<String, AnsiString> : FromLocaleText<k_processLocale> {};
+struct StringCodec<String, AnsiString> : FromLocaleText<kProcessLocale> {};
 template <>
-struct StringCodec<String, AsciiString> : FromLocaleText<k_ascii> {};
+struct StringCodec<String, AsciiString> : FromLocaleText<kAscii> {};
 template <>
-struct StringCodec<AnsiString, String> : ToLocaleText<k_processLocale> {};
+struct StringCodec<AnsiString, String> : ToLocaleText<kProcessLocale> {};
 template <>
-struct StringCodec<AsciiString, String> : ToLocaleText<k_ascii> {};
+struct StringCodec<AsciiString, String> : ToLocaleText<kAscii> {};
 
 template <>
 struct StringCodec<String, Utf8String> {

@@ -19,23 +19,23 @@ std::string Bytes(const Utf8String& s) {
 }
 std::wstring Std(const String& s) { return std::wstring(s.begin(), s.end()); }
 
-constexpr wchar_t k_text[] = L"a\xE9\x20AC\x1F600";
-constexpr char k_utf8[] = "a\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80";
+constexpr wchar_t kText[] = L"a\xE9\x20AC\x1F600";
+constexpr char kUtf8[] = "a\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80";
 
 }  // namespace
 
 TEST(StringConvert, LocaleTextUnderUtf8) {
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
-  EXPECT_EQ(k_utf8, Bytes(AnsiString(k_text)));
-  EXPECT_EQ(k_text, Std(String(k_utf8)));
-  EXPECT_EQ(k_utf8, Bytes(AnsiString(String(k_text))));
-  EXPECT_EQ(k_text, Std(String(AnsiString(k_utf8))));
+  EXPECT_EQ(kUtf8, Bytes(AnsiString(kText)));
+  EXPECT_EQ(kText, Std(String(kUtf8)));
+  EXPECT_EQ(kUtf8, Bytes(AnsiString(String(kText))));
+  EXPECT_EQ(kText, Std(String(AnsiString(kUtf8))));
 }
 
 TEST(StringConvert, LocaleTextUnderCIsAsciiWithQuestionMarks) {
   const ScopedLocale locale(LC_CTYPE, "C");
-  EXPECT_EQ("a???", Bytes(AnsiString(k_text)));
-  EXPECT_EQ(L"a?????????", Std(String(k_utf8))) << "one for each byte";
+  EXPECT_EQ("a???", Bytes(AnsiString(kText)));
+  EXPECT_EQ(L"a?????????", Std(String(kUtf8))) << "one for each byte";
 }
 
 TEST(StringConvert, BadTextBecomesQuestionMarks) {
@@ -56,7 +56,7 @@ TEST(StringConvert, CapacityIsTheUpperBound) {
   EXPECT_EQ(0u, AnsiString(L"").capacity());
   EXPECT_EQ(0u, String("").capacity());
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
-  const String s(k_utf8);
+  const String s(kUtf8);
   EXPECT_EQ(4u, s.length());
   EXPECT_EQ(10u, s.capacity());
 }
@@ -70,16 +70,16 @@ TEST(StringConvert, ForcedLengthsAndRanges) {
 
 TEST(StringConvert, AsciiStringsAreAsciiInEveryLocale) {
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
-  EXPECT_EQ("a???", Bytes(AsciiString(k_text)));
-  EXPECT_EQ("a???", Bytes(AsciiString(nullptr, String(k_text))));
+  EXPECT_EQ("a???", Bytes(AsciiString(kText)));
+  EXPECT_EQ("a???", Bytes(AsciiString(nullptr, String(kText))));
   EXPECT_EQ(L"a??", Std(String(nullptr, AsciiString("a\xC3\xA9"))));
 }
 
 TEST(StringConvert, TaggedConversions) {
-  const String s(k_text);
+  const String s(kText);
   const Utf8String u(nullptr, s);
-  EXPECT_EQ(k_utf8, Bytes(u));
-  EXPECT_EQ(k_text, Std(String(nullptr, u)));
+  EXPECT_EQ(kUtf8, Bytes(u));
+  EXPECT_EQ(kText, Std(String(nullptr, u)));
   EXPECT_EQ(4u, String(nullptr, u).capacity()) << "counted";
   const AsciiString ascii("a\xC3\xA9");
   EXPECT_EQ("a\xC3\xA9", Bytes(Utf8String(nullptr, ascii))) << "the bytes as they are";

@@ -33,12 +33,12 @@ class Pretended {
   T* m_saved[3];
 };
 
-constexpr bool k_wideEnough = sizeof(void*) == 8;
+constexpr bool kWideEnough = sizeof(void*) == 8;
 
 }  // namespace
 
 TEST(StringLimits, ReplaceRefusesAResultOfAllOnes) {
-  if (!k_wideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
+  if (!kWideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
   Pretended<AnsiString> s(0xFFFFFFFE);
   try {
     (*s).replace(0, 0, AnsiString("x"));
@@ -53,7 +53,7 @@ TEST(StringLimits, ReplaceRefusesAResultOfAllOnes) {
 }
 
 TEST(StringLimits, SumsThatPass32BitsAreOutOfRange) {
-  if (!k_wideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
+  if (!kWideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
   Pretended<AnsiString> s(0xFFFFFFFE), more(0x10);
   EXPECT_THROW((*s).append(2, 'x'), exception::OutOfRange);
   EXPECT_THROW((*s).append(1, 'x'), exception::OutOfRange) << "no room for the terminator";
@@ -66,7 +66,7 @@ TEST(StringLimits, SumsThatPass32BitsAreOutOfRange) {
 }
 
 TEST(StringLimits, ConversionsOfTooMuchTextAreOutOfRange) {
-  if (!k_wideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
+  if (!kWideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
   Pretended<String> s(0x40000000);  // four bytes a character
   EXPECT_THROW(AnsiString a(*s), exception::OutOfRange);
   EXPECT_THROW(AsciiString(nullptr, *s), exception::OutOfRange);
@@ -75,7 +75,7 @@ TEST(StringLimits, ConversionsOfTooMuchTextAreOutOfRange) {
 }
 
 TEST(StringLimits, WireSizesThatDoNotFitAreAllOnes) {
-  if (!k_wideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
+  if (!kWideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
   EXPECT_EQ(0xFFFFFFFFu, (*Pretended<AnsiString>(0xFFFFFFFA)).serializationSize()) << "exactly";
   EXPECT_EQ(0xFFFFFFFFu, (*Pretended<AnsiString>(0xFFFFFFFB)).serializationSize());
   EXPECT_EQ(0xFFFFFFFEu, (*Pretended<AnsiString>(0xFFFFFFF9)).serializationSize());

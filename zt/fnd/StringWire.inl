@@ -18,7 +18,7 @@ namespace zt {
 namespace fnd {
 namespace string_detail {
 
-inline constexpr std::uint32_t k_lengthField = 4;
+inline constexpr std::uint32_t kLengthField = 4;
 
 // Bytes from the cursor to the limit; a limit before the cursor leaves none.
 inline std::uint64_t Remaining(const unsigned char* cursor, const unsigned char* limit) {
@@ -29,7 +29,7 @@ inline std::uint64_t Remaining(const unsigned char* cursor, const unsigned char*
 
 // Reads the length field and checks that so many bytes follow. Moves the cursor behind the field.
 inline std::uint32_t TakeLength(const unsigned char*& cursor, const unsigned char* limit) {
-  if (Remaining(cursor, limit) < k_lengthField) throw exception::DeserializationError();
+  if (Remaining(cursor, limit) < kLengthField) throw exception::DeserializationError();
   std::uint32_t n = 0;
   little_endian::DeserializeRaw<std::uint32_t>(n, cursor, limit);
   if (n > Remaining(cursor, limit)) throw exception::DeserializationError();
@@ -44,32 +44,32 @@ inline std::uint32_t FitOrAllOnes(std::uint64_t size) {
 
 template <class T, class O, class E>
 auto StringBase<T, O, E>::serializationSize() const -> size_type {
-  using string_detail::k_lengthField;
+  using string_detail::kLengthField;
   if constexpr (kIsWide) {
     // The limit leaves room for the length field below 32 bits.
-    return k_lengthField + GetUtf8EncodingBytesWithBufferLimit(m_begin, m_end, 0xFFFFFFFBu);
+    return kLengthField + GetUtf8EncodingBytesWithBufferLimit(m_begin, m_end, 0xFFFFFFFBu);
   } else {
     const std::uint64_t terminator = kIsUtf8 ? 0 : 1;
-    return string_detail::FitOrAllOnes(k_lengthField + terminator + length());
+    return string_detail::FitOrAllOnes(kLengthField + terminator + length());
   }
 }
 
 // The length is written last, so that nothing has moved when the text does not fit after all.
 template <class T, class O, class E>
 void StringBase<T, O, E>::serialize(unsigned char*& cursor, const unsigned char* limit) const {
-  using string_detail::k_lengthField;
+  using string_detail::kLengthField;
   const std::uint32_t size = serializationSize();
   if (size == npos || size > string_detail::Remaining(cursor, limit)) {
     throw exception::BufferOverflow();
   }
-  unsigned char* const body = cursor + k_lengthField;
+  unsigned char* const body = cursor + kLengthField;
   unsigned char* const stop = cursor + size;
   if constexpr (kIsWide) {
     WideToUtf8(m_begin, m_end, body, stop);
   } else {
-    std::memcpy(body, m_begin, size - k_lengthField);
+    std::memcpy(body, m_begin, size - kLengthField);
   }
-  little_endian::SerializeRaw<std::uint32_t>(size - k_lengthField, cursor, limit);
+  little_endian::SerializeRaw<std::uint32_t>(size - kLengthField, cursor, limit);
   cursor = stop;
 }
 

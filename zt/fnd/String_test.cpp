@@ -384,15 +384,15 @@ TEST(String, GrowChecksItsArithmetic) {
 
 namespace {
 
-constexpr unsigned k_big = 16u << 20;  // characters: 64 MB
+constexpr unsigned kBig = 16u << 20;  // characters: 64 MB
 
 // Each step ends the child with its own number where it went wrong.
 int AppendWithLittleMemory() {
-  String s(k_big, L'x');
+  String s(kBig, L'x');
   vlt::test::LimitMemoryTo(32u << 20);
   s += L'y';
-  if (s.capacity() != k_big + 1) return 1;  // doubling failed, the exact size was had
-  if (s.length() != k_big + 1 || s[k_big] != L'y' || *s.end() != 0) return 2;
+  if (s.capacity() != kBig + 1) return 1;  // doubling failed, the exact size was had
+  if (s.length() != kBig + 1 || s[kBig] != L'y' || *s.end() != 0) return 2;
   return 0;
 }
 
@@ -408,8 +408,8 @@ bool FailsAndChangesNothing(String& s, Operation operation) {
 }
 
 int OperationsWithoutMemory() {
-  const String big(k_big, L'x');
-  const std::string narrow(k_big, 'x');
+  const String big(kBig, L'x');
+  const std::string narrow(kBig, 'x');
   String s(L"abc");
   vlt::test::LimitMemoryTo(8u << 20);
   // Earlier tests of the process may have left room in the heap, beyond what the limit is about.
@@ -422,13 +422,13 @@ int OperationsWithoutMemory() {
   };
   if (!fails([&] { String copy(big); })) return step;
   if (!fails([&] { s = big; })) return step;
-  if (!fails([&] { s.assign(big.c_str() + 1, k_big - 1); })) return step;
+  if (!fails([&] { s.assign(big.c_str() + 1, kBig - 1); })) return step;
   if (!fails([&] { s = narrow.c_str(); })) return step;
   if (!fails([&] { s.append(big); })) return step;
   if (!fails([&] { s.append(narrow.c_str()); })) return step;
-  if (!fails([&] { s.append(k_big, L'x'); })) return step;
-  if (!fails([&] { s.reserve(k_big); })) return step;
-  if (!fails([&] { s.resize(k_big, L'x'); })) return step;
+  if (!fails([&] { s.append(kBig, L'x'); })) return step;
+  if (!fails([&] { s.reserve(kBig); })) return step;
+  if (!fails([&] { s.resize(kBig, L'x'); })) return step;
   if (!fails([&] { s.replace(1, 1, big); })) return step;
   if (!fails([&] { s = s + big; })) return step;
   if (!fails([&] { String both(big, big); })) return step;

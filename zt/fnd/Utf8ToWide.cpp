@@ -18,19 +18,19 @@ struct LeadRule {
   unsigned char leastSecond;  // for the overlong forms
 };
 
-constexpr LeadRule k_leadRules[] = {
+constexpr LeadRule kLeadRules[] = {
     {0x80, 0, 0x00, 0x80}, {0xC2, 2, 0x1F, 0x80}, {0xE0, 3, 0x0F, 0xA0},
     {0xE1, 3, 0x0F, 0x80}, {0xF0, 4, 0x07, 0x90}, {0xF1, 4, 0x07, 0x80},
     {0xF8, 6, 0x01, 0x84}, {0xFD, 6, 0x01, 0x80}, {0xFE, 0, 0x00, 0x80},
 };
 
 // The row of each lead from 0x80 on.
-constexpr auto k_rowOfLead = [] {
+constexpr auto kRowOfLead = [] {
   std::array<unsigned char, 0x80> rows{};
   unsigned char row = 0;
   for (unsigned lead = 0x80; lead <= 0xFF; ++lead) {
     const std::size_t next = row + 1u;
-    if (next < std::size(k_leadRules) && k_leadRules[next].lead == lead) ++row;
+    if (next < std::size(kLeadRules) && kLeadRules[next].lead == lead) ++row;
     rows[lead - 0x80] = row;
   }
   return rows;
@@ -39,7 +39,7 @@ constexpr auto k_rowOfLead = [] {
 // Decodes the sequence of a lead byte of 0x80 or more; s is below end.
 const unsigned char* DecodeSequence(const unsigned char* s, const unsigned char* end,
                                     std::uint32_t& value) {
-  const LeadRule rule = k_leadRules[k_rowOfLead[*s - 0x80u]];
+  const LeadRule rule = kLeadRules[kRowOfLead[*s - 0x80u]];
   if (rule.length == 0 || end - s < rule.length || s[1] < rule.leastSecond) {
     ZT_RAISE(exception::InvalidSequence());
   }

@@ -14,11 +14,11 @@ namespace fnd {
 namespace osdep {
 namespace {
 
-constexpr unsigned k_mostDigits = 3;
-constexpr std::size_t k_textSize = 512;
-constexpr unsigned k_powersOfTen[k_mostDigits + 1] = {1, 10, 100, 1000};
+constexpr unsigned kMostDigits = 3;
+constexpr std::size_t kTextSize = 512;
+constexpr unsigned kPowersOfTen[kMostDigits + 1] = {1, 10, 100, 1000};
 
-const AbsTime::Value k_unixEpoch(static_cast<long long>(AbsTime::k_unixEpoch));
+const AbsTime::Value kUnixEpoch(static_cast<long long>(AbsTime::kUnixEpoch));
 
 // The C library keeps time zone and locale under locks of its own, which a child may find held for
 // good.
@@ -34,7 +34,7 @@ String SeparatorText(int separator) {
 
 // The separator and the decimals of the time, which moves on by a second where they round up to 1.
 String FractionText(AbsTime& time, unsigned digits, int separator) {
-  const unsigned one = k_powersOfTen[digits];
+  const unsigned one = kPowersOfTen[digits];
   double f = time.getFraction() * one + 0.5;
   if (f >= one) {
     time = AbsTime(time.value() + AbsTime::Value(1));
@@ -66,7 +66,7 @@ String Join(const String& first, const String& second) {
 }
 
 String Format(const std::tm& fields, const String& format) {
-  char text[k_textSize];
+  char text[kTextSize];
   const AnsiString narrow(format);
   Hold hold(LeakedInstance<SystemTimes>().lock);
   const std::size_t n = std::strftime(text, sizeof text, narrow.c_str(), &fields);
@@ -98,7 +98,7 @@ AbsTime TimevalToAbsTime(const timeval& time) {
       static_cast<std::uint64_t>(time.tv_sec) * 1000000 + static_cast<std::uint64_t>(time.tv_usec);
   AbsTime::Value value(static_cast<std::int64_t>(micros));
   tSSTimeValue::_CorrectUnits(tSSTimeValue::kToSeconds, nZTSS100::kTimeUnitMicro, value, nullptr);
-  value += k_unixEpoch;
+  value += kUnixEpoch;
   return AbsTime(value);
 }
 
@@ -119,7 +119,7 @@ std::tm AbsTimeToUTCDateTime(const AbsTime& time, bool round) {
 String AbsTimeToString(AbsTime time, const wchar_t* dateFormat, const wchar_t* timeFormat,
                        unsigned int fractionDigits, TimeStringType type, bool timeFirst,
                        const wchar_t* timeSuffix, int separator) {
-  if (fractionDigits > k_mostDigits) ZT_RAISE(exception::InvalidArgument());
+  if (fractionDigits > kMostDigits) ZT_RAISE(exception::InvalidArgument());
   if (time == AbsTime::min) return String();
   const String datePart = dateFormat == nullptr ? GetSystemDateFormat() : String(dateFormat);
   String timePart = timeFormat == nullptr ? GetSystemTimeFormat() : String(timeFormat);

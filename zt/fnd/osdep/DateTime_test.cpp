@@ -19,7 +19,7 @@ using vlt::test::ScopedLocale;
 namespace {
 
 // 2026-11-14 13:34:25 UTC.
-constexpr double k_seconds = 1794663265;
+constexpr double kSeconds = 1794663265;
 
 AbsTime At(double seconds, double fraction = 0) {
   return AbsTime(2082844800.0 + seconds, fraction);
@@ -50,7 +50,7 @@ class ScopedZone {
 TEST(DateTimeText, DateAndTimeStandWithABlank) {
   EXPECT_EQ(L"20261114 133425", Text(At(k_seconds), L"%Y%m%d", L"%H%M%S", 0));
   EXPECT_EQ(L"13:34:25 14.11.2026",
-            Std(AbsTimeToString(At(k_seconds), L"%d.%m.%Y", L"%H:%M:%S", 0, kTimeUTC, true)));
+            Std(AbsTimeToString(At(kSeconds), L"%d.%m.%Y", L"%H:%M:%S", 0, kTimeUTC, true)));
 }
 
 TEST(DateTimeText, UsesOfTheSystem) {
@@ -86,7 +86,7 @@ TEST(DateTimeText, FractionsAreRoundedHalfUpWithCarry) {
                {0.04, 1, L"25.0"},     {0.05078125, 1, L"25.1"}, {0.95, 1, L"26.0"},
                {0.5, 1, L"25.5"},      {0.25, 2, L"25.25"}};
   for (const auto& row : table) {
-    EXPECT_EQ(row.text, Text(At(k_seconds, row.fraction), L"", L"%S", row.digits)) << row.fraction;
+    EXPECT_EQ(row.text, Text(At(kSeconds, row.fraction), L"", L"%S", row.digits)) << row.fraction;
   }
 }
 
@@ -113,13 +113,13 @@ TEST(DateTimeText, SeparatorComesFromTheLastArgument) {
   EXPECT_EQ(L"25.5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 1));
   EXPECT_EQ(L"25,5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 2));
   const std::wstring point = Std(String(std::localeconv()->decimal_point));
-  EXPECT_EQ(L"25" + point + L"5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 0));
-  EXPECT_EQ(L"25" + point + L"5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 99));
+  EXPECT_EQ(L"25" + point + L"5", Text(At(kSeconds, 0.5), L"", L"%S", 1, 0));
+  EXPECT_EQ(L"25" + point + L"5", Text(At(kSeconds, 0.5), L"", L"%S", 1, 99));
 }
 
 TEST(DateTimeText, SuffixFollowsATimeFormat) {
   const auto text = [](const wchar_t* clock, const wchar_t* suffix) {
-    return Std(AbsTimeToString(At(k_seconds), L"%Y", clock, 0, kTimeUTC, false, suffix));
+    return Std(AbsTimeToString(At(kSeconds), L"%Y", clock, 0, kTimeUTC, false, suffix));
   };
   EXPECT_EQ(L"2026 13 UTC", text(L"%H", L"UTC"));
   EXPECT_EQ(L"2026 13", text(L"%H", L""));
@@ -129,7 +129,7 @@ TEST(DateTimeText, SuffixFollowsATimeFormat) {
 TEST(DateTimeText, LocalTimeForTypesOneAndTwo) {
   const ScopedZone zone("XYZ-2");
   const auto text = [](TimeStringType type) {
-    return Std(AbsTimeToString(At(k_seconds), L"", L"%H:%M", 0, type));
+    return Std(AbsTimeToString(At(kSeconds), L"", L"%H:%M", 0, type));
   };
   EXPECT_EQ(L"13:34", text(kTimeUTC));
   EXPECT_EQ(L"15:34", text(kTimeLocal));
@@ -140,8 +140,8 @@ TEST(DateTimeText, NullFormatsAreTheSystemsOwn) {
   const ScopedLocale locale(LC_TIME, "C");
   EXPECT_EQ(L"%x", Std(GetSystemDateFormat()));
   EXPECT_EQ(L"%X", Std(GetSystemTimeFormat()));
-  const std::wstring both = Text(At(k_seconds), nullptr, nullptr, 0);
-  EXPECT_EQ(Text(At(k_seconds), L"%x", L"%X", 0), both);
+  const std::wstring both = Text(At(kSeconds), nullptr, nullptr, 0);
+  EXPECT_EQ(Text(At(kSeconds), L"%x", L"%X", 0), both);
   EXPECT_FALSE(both.empty());
 }
 
@@ -157,7 +157,7 @@ TEST(DateTimeText, SystemFormatsTakeTheTimeLocaleFromTheEnvironment) {
 TEST(DateTimeText, ExplicitFormatsLeaveTheLocaleAlone) {
   const ScopedLocale locale(LC_TIME, "C");
   setenv("LC_ALL", "C.UTF-8", 1);
-  Text(At(k_seconds), L"%Y", L"%H", 3);
+  Text(At(kSeconds), L"%Y", L"%H", 3);
   EXPECT_STREQ("C", std::setlocale(LC_TIME, nullptr));
   unsetenv("LC_ALL");
 }
@@ -193,7 +193,7 @@ TEST(DateTimeFields, PassTheYear2038) {
 
 TEST(DateTimeFields, LocalTimeFollowsTheZone) {
   const ScopedZone zone("XYZ5");
-  EXPECT_EQ(8, AbsTimeToLocalDateTime(At(k_seconds), false).tm_hour);
+  EXPECT_EQ(8, AbsTimeToLocalDateTime(At(kSeconds), false).tm_hour);
 }
 
 TEST(DateTimeClock, TimevalKeepsItsMicroseconds) {

@@ -14,7 +14,7 @@ namespace osdep {
 
 AbsTime Time_TtoAbsTime(std::time_t seconds) {
   AbsTime::Value value(static_cast<std::int64_t>(seconds));
-  value += AbsTime::Value(AbsTime::k_unixEpoch);
+  value += AbsTime::Value(AbsTime::kUnixEpoch);
   return AbsTime(value);
 }
 

@@ -17,8 +17,8 @@ namespace {
 
 typedef SafeInteger<std::uint32_t> SafeCount;
 
-constexpr char k_wideCode[] = "UTF-32LE";
-constexpr std::uint32_t k_mostBytesPerCharacter = 4;
+constexpr char kWideCode[] = "UTF-32LE";
+constexpr std::uint32_t kMostBytesPerCharacter = 4;
 
 bool Same(const char* a, const char* b) { return std::strcmp(a, b) == 0; }
 
@@ -73,17 +73,17 @@ std::size_t LengthByLead(unsigned char lead) {
 
 // Reads a character. Returns its bytes; 0, with `c` undefined, where there is no whole and valid one.
 std::size_t ReadUtf8(const char* begin, const char* end, std::uint32_t& c) {
-  static constexpr unsigned char k_leadBits[] = {0, 0x7F, 0x1F, 0x0F, 0x07};
-  static constexpr std::uint32_t k_least[] = {0, 0, 0x80, 0x800, 0x10000};
+  static constexpr unsigned char kLeadBits[] = {0, 0x7F, 0x1F, 0x0F, 0x07};
+  static constexpr std::uint32_t kLeast[] = {0, 0, 0x80, 0x800, 0x10000};
   const std::size_t n = LengthByLead(static_cast<unsigned char>(*begin));
   if (n == 0 || static_cast<std::size_t>(end - begin) < n) return 0;
-  c = static_cast<unsigned char>(*begin) & k_leadBits[n];
+  c = static_cast<unsigned char>(*begin) & kLeadBits[n];
   for (std::size_t i = 1; i < n; ++i) {
     const unsigned char next = static_cast<unsigned char>(begin[i]);
     if ((next & 0xC0) != 0x80) return 0;
     c = c << 6 | (next & 0x3F);
   }
-  return c >= k_least[n] && IsCharacter(c) ? n : 0;
+  return c >= kLeast[n] && IsCharacter(c) ? n : 0;
 }
 
 // Of each malformed sequence every byte becomes a "?" of its own.
@@ -104,9 +104,9 @@ std::size_t Utf8Length(std::uint32_t c) {
 }
 
 void WriteUtf8(std::uint32_t c, std::size_t n, char* dest) {
-  static constexpr unsigned char k_mark[] = {0, 0, 0xC0, 0xE0, 0xF0};
+  static constexpr unsigned char kMark[] = {0, 0, 0xC0, 0xE0, 0xF0};
   for (std::size_t i = n; --i > 0; c >>= 6) dest[i] = static_cast<char>(0x80 | (c & 0x3F));
-  *dest = static_cast<char>(k_mark[n] | c);
+  *dest = static_cast<char>(kMark[n] | c);
 }
 
 // A character that has no room becomes a "?" too, and the next ones may have room again.
@@ -165,19 +165,19 @@ std::uint32_t GetAnsiToWideRequiredBufferLength(const char* begin, const char* e
 
 std::uint32_t GetWideToAnsiRequiredBufferLength(const wchar_t* begin, const wchar_t* end,
                                                 const char*) {
-  return SafeCount::Multiply(CountOf(begin, end), k_mostBytesPerCharacter);
+  return SafeCount::Multiply(CountOf(begin, end), kMostBytesPerCharacter);
 }
 
 std::uint32_t AnsiToWideNoAlloc(const char* begin, const char* end, const char* locale,
                                 wchar_t* dest, wchar_t*& destEnd) {
   const char* const encoding = EncodingOf(locale);
-  return Convert(begin, end, encoding, dest, destEnd, encoding, k_wideCode);
+  return Convert(begin, end, encoding, dest, destEnd, encoding, kWideCode);
 }
 
 std::uint32_t WideToAnsiNoAlloc(const wchar_t* begin, const wchar_t* end, const char* locale,
                                 char* dest, char*& destEnd) {
   const char* const encoding = EncodingOf(locale);
-  return Convert(begin, end, encoding, dest, destEnd, k_wideCode, encoding);
+  return Convert(begin, end, encoding, dest, destEnd, kWideCode, encoding);
 }
 
 void AnsiToWide(const char* begin, const char* end, const char* locale, wchar_t*& out,

@@ -24,8 +24,8 @@ int ExactRanges(const C (&a)[A], const C (&b)[B]) {
   return StringExactCompare(a, a + A - 1, b, b + B - 1);
 }
 
-const char* const k_null = nullptr;
-const wchar_t* const k_wideNull = nullptr;
+const char* const kNull = nullptr;
+const wchar_t* const kWideNull = nullptr;
 
 }  // namespace
 
@@ -93,7 +93,7 @@ TEST(StringCompare, RangesReturnLengthDifferences) {
   EXPECT_EQ(-2, ExactRanges("", "ab"));
   EXPECT_EQ(2, ExactRanges(L"ab", L""));
   EXPECT_EQ(0, CaseRanges("", ""));
-  EXPECT_EQ(0, StringCaseCompare(k_null, k_null, k_null, k_null));
+  EXPECT_EQ(0, StringCaseCompare(kNull, kNull, kNull, kNull));
 }
 
 TEST(StringCompare, RangesStopAtTheFirstDifference) {

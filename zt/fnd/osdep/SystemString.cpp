@@ -14,19 +14,19 @@ namespace {
 
 typedef std::uint32_t Count;
 
-constexpr std::uint64_t k_max32 = std::numeric_limits<std::uint32_t>::max();
+constexpr std::uint64_t kMax32 = std::numeric_limits<std::uint32_t>::max();
 
 }  // namespace
 
 wchar_t* SystemAllocString(const wchar_t* s) {
   if (s == nullptr) return nullptr;
   const std::uint64_t n = std::wcslen(s);
-  return n > k_max32 ? nullptr : SystemAllocStringLen(s, static_cast<unsigned int>(n));
+  return n > kMax32 ? nullptr : SystemAllocStringLen(s, static_cast<unsigned int>(n));
 }
 
 wchar_t* SystemAllocStringLen(const wchar_t* s, unsigned int n) {
   const std::uint64_t bytes = (static_cast<std::uint64_t>(n) + 1) * sizeof(wchar_t) + sizeof(Count);
-  if (bytes > k_max32) return nullptr;
+  if (bytes > kMax32) return nullptr;
   char* const block = static_cast<char*>(DLLMallocNoThrow(static_cast<unsigned long>(bytes)));
   if (block == nullptr) return nullptr;
   const Count count = n;

@@ -14,21 +14,20 @@ namespace fnd {
 namespace osdep {
 namespace {
 
-constexpr ssize_t k_size = 16;
+constexpr ssize_t kSize = 16;
 
 // For a kernel or a sandbox without getrandom().
 bool ReadRandomDevice(unsigned char* bytes) {
   const ScopedFd device(RetryEintr([] { return open("/dev/urandom", O_RDONLY | O_CLOEXEC); }));
   if (device.get() < 0) return false;
-  return RetryEintr([&] { return read(device.get(), bytes, k_size); }) == k_size;
+  return RetryEintr([&] { return read(device.get(), bytes, kSize); }) == kSize;
 }
 
 }  // namespace
 
 // Requests of up to 256 bytes come whole from both sources once the pool is ready.
 bool NewUuidBytes(unsigned char (&bytes)[16]) {
-  if (RetryEintr([&] { return getrandom(bytes, k_size, 0); }) != k_size &&
-      !ReadRandomDevice(bytes)) {
+  if (RetryEintr([&] { return getrandom(bytes, kSize, 0); }) != kSize && !ReadRandomDevice(bytes)) {
     return false;
   }
   bytes[6] = static_cast<unsigned char>((bytes[6] & 0x0F) | 0x40);  // version 4
