@@ -19,9 +19,9 @@
 #define VLT_E_NO_BINDING_CLASSES (static_cast<HRESULT>(0x80040306))
 
 // Attribute number, with array bits and a database type tag above it where told.
-typedef uint32_t vltAttributeID;
+using vltAttributeID = uint32_t;
 
-typedef _GUID vltID;
+using vltID = _GUID;
 
 // The underlying types are fixed, so that any 32-bit value may be passed.
 enum _vltAttributeType : int32_t {

@@ -9,7 +9,7 @@ using nZTSS100::tTimeUnit;
 
 namespace {
 
-typedef tSSTimeValue::tValue Value;
+using Value = tSSTimeValue::tValue;
 
 constexpr std::uint64_t kHalf = std::uint64_t(1) << 63;
 constexpr double kTwo64 = 18446744073709551616.0;

@@ -27,7 +27,7 @@ enum tTimeUnit : std::uint32_t {
 // Conversions of a number of seconds. Each reports through a status, which is set only if it holds
 // no error yet and never stops the work; a null status is not written.
 struct tSSTimeValue {
-  typedef nZTSS100::tFixedPoint128<64, true> tValue;
+  using tValue = nZTSS100::tFixedPoint128<64, true>;
 
   enum tUnitConversion : std::int32_t { kToSeconds = 1, kFromSeconds = 2 };
   enum tRoundMethod : std::int32_t {
@@ -59,7 +59,7 @@ namespace fnd {
 // `min` doubles as "no time". Threads: a plain value of 16 bytes, copied like an integer.
 class AbsTime {
  public:
-  typedef nZTSS100::tFixedPoint128<64, true> Value;
+  using Value = nZTSS100::tFixedPoint128<64, true>;
 
   static constexpr unsigned int size = 16;  // bytes
   static const AbsTime max;

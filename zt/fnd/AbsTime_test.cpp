@@ -7,8 +7,8 @@
 
 using namespace zt::fnd;
 using namespace nZTSS100;
-typedef tSSTimeValue V;
-typedef V::tValue Fixed;
+using V = tSSTimeValue;
+using Fixed = V::tValue;
 
 namespace {
 

@@ -16,7 +16,7 @@ namespace {
 
 constexpr std::uint32_t kSmallestGrowth = 128;
 
-typedef SafeInteger<std::uint32_t> Size;
+using Size = SafeInteger<std::uint32_t>;
 
 // memcpy that takes null for no bytes.
 void CopyBytes(unsigned char* dest, const unsigned char* src, std::size_t n) {

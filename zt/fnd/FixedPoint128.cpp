@@ -5,7 +5,7 @@
 namespace nZTSS100 {
 namespace {
 
-typedef tFixedPoint128<64, true> Fixed;
+using Fixed = tFixedPoint128<64, true>;
 
 constexpr Fixed kLargest(0x7FFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF);
 constexpr Fixed kLeast(0x80000000, 0, 0, 0);

@@ -5,7 +5,7 @@
 #include <cmath>
 #include <limits>
 
-typedef nZTSS100::tFixedPoint128<64, true> Fixed;
+using Fixed = nZTSS100::tFixedPoint128<64, true>;
 
 namespace {
 

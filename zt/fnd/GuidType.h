@@ -13,6 +13,6 @@ struct _GUID {
   unsigned char Data4[8];
 };
 }
-typedef _GUID GUID;
+using GUID = _GUID;
 
 static_assert(sizeof(GUID) == 16 && std::is_trivially_copyable_v<GUID>);

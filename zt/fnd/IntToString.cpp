@@ -30,7 +30,7 @@ String Print(Unsigned value, unsigned int base, bool minus = false) {
 
 template <class Signed>
 String PrintSigned(Signed value, unsigned int base) {
-  typedef std::make_unsigned_t<Signed> Unsigned;
+  using Unsigned = std::make_unsigned_t<Signed>;
   const Unsigned bits = static_cast<Unsigned>(value);
   if (value >= 0 || base != 10) return Print(bits, base);
   return Print(static_cast<Unsigned>(0u - bits), base, true);  // unsigned: the least value has none

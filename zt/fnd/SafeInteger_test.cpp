@@ -7,7 +7,7 @@
 namespace zt::fnd {
 namespace {
 
-typedef SafeInteger<unsigned int> Size;
+using Size = SafeInteger<unsigned int>;
 constexpr unsigned int kMax = 0xFFFFFFFFu;
 
 TEST(SafeInteger, AddStopsAtThirtyTwoBits) {

@@ -55,12 +55,12 @@ class StringBase {
   static constexpr bool kIsAscii = std::is_same_v<T, char> && std::is_same_v<Encoding, char>;
 
  public:
-  typedef T value_type;
-  typedef std::uint32_t size_type;
-  typedef T* iterator;
-  typedef const T* const_iterator;
+  using value_type = T;
+  using size_type = std::uint32_t;
+  using iterator = T*;
+  using const_iterator = const T*;
   // The string type that converts without a tag.
-  typedef std::conditional_t<kIsWide, AnsiString, String> Partner;
+  using Partner = std::conditional_t<kIsWide, AnsiString, String>;
 
   // "not found", and "up to the end".
   static constexpr size_type npos = 0xFFFFFFFFu;

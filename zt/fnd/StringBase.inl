@@ -359,7 +359,7 @@ auto StringBase<T, O, E>::append(const O* s) -> StringBase& {
 template <class T, class O, class E>
 auto StringBase<T, O, E>::append(const O* s, size_type n) -> StringBase& {
   if (s == nullptr || n == 0) return *this;
-  typedef StringCodec<StringBase, Partner> Codec;
+  using Codec = StringCodec<StringBase, Partner>;
   makeRoom(Codec::requiredLength(s, s + n));
   try {
     m_end = Codec::convert(s, s + n, m_end, m_capacityEnd);

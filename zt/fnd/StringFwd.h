@@ -12,10 +12,10 @@ namespace fnd {
 template <class T, class Other, class Encoding>
 class StringBase;
 
-typedef StringBase<wchar_t, char, wchar_t> String;               // 32-bit code points
-typedef StringBase<char, wchar_t, wchar_t> AnsiString;           // the process locale
-typedef StringBase<char, wchar_t, char> AsciiString;             // US-ASCII
-typedef StringBase<unsigned char, wchar_t, wchar_t> Utf8String;  // UTF-8
+using String = StringBase<wchar_t, char, wchar_t>;               // 32-bit code points
+using AnsiString = StringBase<char, wchar_t, wchar_t>;           // the process locale
+using AsciiString = StringBase<char, wchar_t, char>;             // US-ASCII
+using Utf8String = StringBase<unsigned char, wchar_t, wchar_t>;  // UTF-8
 
 }  // namespace fnd
 }  // namespace zt

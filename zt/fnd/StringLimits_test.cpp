@@ -14,7 +14,7 @@ namespace {
 template <class S>
 class Pretended {
  public:
-  typedef typename S::value_type T;
+  using T = typename S::value_type;
 
   explicit Pretended(std::uint32_t length) {
     T** const fields = reinterpret_cast<T**>(&m_string);

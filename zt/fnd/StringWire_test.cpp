@@ -10,7 +10,7 @@ using namespace zt::fnd;
 
 namespace {
 
-typedef std::vector<unsigned char> Bytes;
+using Bytes = std::vector<unsigned char>;
 
 template <class S>
 Bytes Wire(const S& s) {

@@ -14,7 +14,7 @@ using namespace zt::fnd;
 
 namespace {
 
-typedef std::vector<unsigned char> Bytes;
+using Bytes = std::vector<unsigned char>;
 
 // In a block of exactly the size, so that a sanitizer sees every byte read beyond it.
 std::wstring Decode(const Bytes& bytes) {

@@ -23,9 +23,9 @@ class Vector {
   static_assert(alignof(T) <= alignof(std::max_align_t), "the block is aligned as malloc aligns");
 
  public:
-  typedef T value_type;
-  typedef T* iterator;
-  typedef const T* const_iterator;
+  using value_type = T;
+  using iterator = T*;
+  using const_iterator = const T*;
 
   Vector() noexcept = default;
   Vector(const Vector& other);

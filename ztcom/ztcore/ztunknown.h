@@ -8,7 +8,7 @@
 
 // Result of an exported function or interface operation. Negative is failure: test the sign, for 1
 // (S_FALSE) is a success. Always 32 bits wide, so that 0x80004005 is negative on every word size.
-typedef int32_t HRESULT;
+using HRESULT = int32_t;
 
 #ifndef S_OK
 #define S_OK (static_cast<HRESULT>(0))

@@ -31,9 +31,9 @@ using vlt::test::ReadBytes;
 using vlt::test::TempDir;
 using vlt::test::Wide;
 using vlt::test::WriteBytes;
-typedef BinaryFile::Mode Mode;
-typedef BinaryFile::Origin Origin;
-typedef BinaryFile::Endianness Endianness;
+using Mode = BinaryFile::Mode;
+using Origin = BinaryFile::Origin;
+using Endianness = BinaryFile::Endianness;
 
 std::string Text(const AutoBuffer& b) {
   return b.Len() == 0 ? std::string() : std::string(reinterpret_cast<char*>(b.Data()), b.Len());

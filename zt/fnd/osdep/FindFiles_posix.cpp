@@ -14,8 +14,8 @@ namespace fnd {
 namespace osdep {
 namespace {
 
-typedef FindFiles::FindFlags Flags;
-typedef std::unique_ptr<DIR, int (*)(DIR*)> ScopedDir;
+using Flags = FindFiles::FindFlags;
+using ScopedDir = std::unique_ptr<DIR, int (*)(DIR*)>;
 
 enum class Errors { Quiet, Thrown };
 

@@ -22,8 +22,8 @@ namespace {
 using vlt::test::TempDir;
 using vlt::test::Wide;
 using vlt::test::WriteBytes;
-typedef FindFiles::FindFlags Flags;
-typedef std::vector<std::string> Names;
+using Flags = FindFiles::FindFlags;
+using Names = std::vector<std::string>;
 
 Names Sorted(const Vector<String>& found) {
   Names names;

@@ -15,7 +15,7 @@ namespace fnd {
 namespace osdep {
 namespace {
 
-typedef SafeInteger<std::uint32_t> SafeCount;
+using SafeCount = SafeInteger<std::uint32_t>;
 
 constexpr char kWideCode[] = "UTF-32LE";
 constexpr std::uint32_t kMostBytesPerCharacter = 4;

@@ -11,7 +11,7 @@ namespace osdep {
 _GUID MakeGUID();
 
 // What fills in the 16 bytes of a UUID in network order; false if there is none.
-typedef bool (*UuidSource)(unsigned char (&bytes)[16]);
+using UuidSource = bool (*)(unsigned char (&bytes)[16]);
 
 // The same from another source.
 _GUID MakeGUID(UuidSource source);

@@ -25,7 +25,7 @@ struct MutexData {
 // at the fork, are never touched again.
 class MutexGlobalStatics : public RefCountedThreadSafePolicy {
  public:
-  typedef std::map<String, MutexData, SharedObjectNameLess> Map;
+  using Map = std::map<String, MutexData, SharedObjectNameLess>;
 
   // The statics of the calling process, made where there are none.
   static RefPtr<MutexGlobalStatics> Get();

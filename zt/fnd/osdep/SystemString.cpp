@@ -12,7 +12,7 @@ namespace fnd {
 namespace osdep {
 namespace {
 
-typedef std::uint32_t Count;
+using Count = std::uint32_t;
 
 constexpr std::uint64_t kMax32 = std::numeric_limits<std::uint32_t>::max();
 

@@ -13,7 +13,7 @@ namespace fnd {
 namespace osdep {
 namespace {
 
-typedef String::size_type size_type;
+using size_type = String::size_type;
 
 template <class S>
 bool EndsInSlash(const S& text) {
@@ -32,7 +32,7 @@ S JoinText(const S& a, const S& b) {
 }
 
 // A component of a path, by place and length.
-typedef std::pair<size_type, size_type> Component;
+using Component = std::pair<size_type, size_type>;
 
 // The components of a text that ends in "/", each without its "/".
 std::vector<Component> Split(const String& text) {

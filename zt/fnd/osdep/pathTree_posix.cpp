@@ -80,7 +80,7 @@ void CopyInto(BinaryFile& copy, const String& from, const String& to, bool overw
   if (source.sameAs(target)) return;
   if (source.special()) ZT_RAISE(exception::FileReadFailed());
   if (target.special()) ZT_RAISE(exception::FileWriteFailed());
-  typedef BinaryFile::Mode Mode;
+  using Mode = BinaryFile::Mode;
   BinaryFile in;
   in.open(from, Mode::Read);
   Mode write = Mode::ReadWrite | Mode::Create;

@@ -23,7 +23,7 @@ namespace fnd {
 namespace osdep {
 namespace {
 
-typedef std::unique_ptr<char, void (*)(void*)> MallocText;
+using MallocText = std::unique_ptr<char, void (*)(void*)>;
 
 constexpr unsigned int kModeBits = 0xFFFF;
 constexpr mode_t kPrivateDirMode = 0700;

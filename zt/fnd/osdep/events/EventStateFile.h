@@ -20,7 +20,7 @@ constexpr std::uint32_t kNoSlot = 0xFFFFFFFFu;  // behind the last free slot
 //   0  1  reserved, 0        1  4  set number        5  4  slot index
 struct EventPlace {
   static constexpr std::size_t kSize = 9;
-  typedef std::array<unsigned char, kSize> Bytes;
+  using Bytes = std::array<unsigned char, kSize>;
 
   std::uint32_t set = 0;
   std::uint32_t slot = 0;
@@ -38,7 +38,7 @@ struct SetHeader {
   static constexpr std::uint32_t kMagic = 0x15E35E31u;
   static constexpr std::size_t kReadyOffset = 5;
   static constexpr std::size_t kFreeOffset = 10;  // free count, then first free, to the end
-  typedef std::array<unsigned char, kSize> Bytes;
+  using Bytes = std::array<unsigned char, kSize>;
 
   bool ready = false;
   std::uint32_t count = 0;
@@ -58,7 +58,7 @@ struct SetHeader {
 //         Written with its sign; only the low 32 bits are read back.
 struct SlotRecord {
   static constexpr std::size_t kSize = 10;
-  typedef std::array<unsigned char, kSize> Bytes;
+  using Bytes = std::array<unsigned char, kSize>;
 
   bool inUse = false;
   bool manualReset = false;
@@ -73,7 +73,7 @@ struct SlotRecord {
 };
 
 constexpr std::size_t kStateFileSize = SetHeader::kSize + kSlotsPerSet * SlotRecord::kSize;
-typedef std::array<unsigned char, kStateFileSize> StateFileBytes;
+using StateFileBytes = std::array<unsigned char, kStateFileSize>;
 
 // A state file with all slots free and the ready flag clear.
 StateFileBytes EncodeEmptySet();

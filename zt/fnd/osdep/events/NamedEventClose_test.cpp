@@ -35,8 +35,8 @@ using vlt::test::kSet;
 using vlt::test::ReadBytes;
 using vlt::test::RecordOf;
 using vlt::test::WriteBytes;
-typedef std::vector<std::string> Names;
-typedef EventPlace::Slot Slot;
+using Names = std::vector<std::string>;
+using Slot = EventPlace::Slot;
 
 constexpr auto Open = [](const std::string& name, bool manual = kManual, bool initial = kClear) {
   return vlt::test::OpenEvent(name, manual, initial);

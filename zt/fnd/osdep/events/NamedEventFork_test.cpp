@@ -40,7 +40,7 @@ using vlt::test::kManual;
 using vlt::test::kSet;
 using vlt::test::OpenDescriptors;
 using vlt::test::Wide;
-typedef std::vector<std::string> Names;
+using Names = std::vector<std::string>;
 
 constexpr const wchar_t* kStateFileMutex = L"zt_fnd_osdep_NamedEvent_StateFileMutex";
 

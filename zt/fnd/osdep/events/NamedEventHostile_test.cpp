@@ -55,8 +55,8 @@ using vlt::test::TempDir;
 using vlt::test::Wide;
 using vlt::test::WriteBytes;
 using Clock = std::chrono::steady_clock;
-typedef std::vector<std::string> Names;
-typedef EventPlace::Slot Slot;
+using Names = std::vector<std::string>;
+using Slot = EventPlace::Slot;
 
 constexpr auto kSoon = std::chrono::seconds(5);
 

@@ -47,7 +47,7 @@ using vlt::test::PosixErrorOf;
 using vlt::test::Wide;
 using vlt::test::WriteBytes;
 using Clock = std::chrono::steady_clock;
-typedef std::vector<std::string> Names;
+using Names = std::vector<std::string>;
 
 constexpr auto kSoon = std::chrono::seconds(5);
 // A 32-bit process has two ways to ask for a set.

@@ -58,7 +58,7 @@ class NamedEventListing : public testing::Test {
   EventPlace m_place;
 };
 
-typedef std::map<std::string, std::string> Rows;
+using Rows = std::map<std::string, std::string>;
 
 std::string HeldBy(std::set<pid_t> pids) {
   std::string text = "; held by";

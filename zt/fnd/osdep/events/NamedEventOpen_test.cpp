@@ -51,9 +51,9 @@ using vlt::test::ReadBytes;
 using vlt::test::RecordOf;
 using vlt::test::Wide;
 using vlt::test::WriteBytes;
-typedef std::vector<std::string> Names;
+using Names = std::vector<std::string>;
 
-typedef EventPlace::Slot Slot;
+using Slot = EventPlace::Slot;
 
 constexpr auto Open = [](const std::string& name, bool manual = kManual, bool initial = kClear) {
   return vlt::test::OpenEvent(name, manual, initial);

@@ -20,8 +20,8 @@ using vlt::test::EventPlace;
 using vlt::test::OpenDescriptors;
 using vlt::test::ReadBytes;
 using vlt::test::WriteBytes;
-typedef std::vector<std::string> Names;
-typedef SemaphoreSet::Room Room;
+using Names = std::vector<std::string>;
+using Room = SemaphoreSet::Room;
 
 struct Set {
   EventPlace place;
