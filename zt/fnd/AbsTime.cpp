@@ -85,8 +85,7 @@ void tSSTimeValue::_RoundAndCheckFit(tRoundMethod method, const tValue& maximum,
   if (passed || value > maximum || value < minimum) SetStatus(status, kDoesNotFit);
 }
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace {
 
 constexpr Value kMost(0x7FFFFFFF, 0xFFFFFFFF, 0, 0);
@@ -150,5 +149,4 @@ std::int64_t AbsTime::toLKTIME(bool round) const noexcept {
   return CountSince(m_value, kLktimeEpoch, nZTSS100::kTimeUnitTicks, round);
 }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -51,8 +51,7 @@ struct tSSTimeValue {
                                 tValue& value, std::int32_t* status);
 };
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // A point in time: fixed-point seconds since 1904-01-01 00:00:00 UTC.
 //
@@ -111,5 +110,4 @@ inline constexpr AbsTime AbsTime::min{Value(0x80000000, 0, 0, 0)};
 
 static_assert(sizeof(AbsTime) == AbsTime::size);
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -10,8 +10,7 @@
 #include "zt/fnd/ByteOrder.h"
 #include "zt/fnd/SafeInteger.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace {
 
 constexpr std::uint32_t kSmallestGrowth = 128;
@@ -204,5 +203,4 @@ void AutoBuffer::deserialize(const unsigned char*& cursor, const unsigned char* 
   cursor = body + length;
 }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -4,8 +4,7 @@
 
 #include "zt/fnd/osdep/AtomicInt.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 class AutoBuffer;
 
@@ -124,5 +123,4 @@ class AutoBuffer {
 inline BufferWrapper::BufferWrapper(const AutoBuffer& buffer) noexcept
     : m_data(buffer.Data()), m_length(buffer.Len()) {}
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

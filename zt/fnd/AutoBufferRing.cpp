@@ -5,8 +5,7 @@
 #include "zt/fnd/Exception.h"
 
 // The wire form of a buffer inside a ring of bytes.
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace {
 
 constexpr std::ptrdiff_t kLengthBytes = 4;
@@ -90,5 +89,4 @@ unsigned int AutoBuffer::GetCircularDeserializationSize(const unsigned char* rin
   return ReadLength(ringBegin, ringEnd, cursor) + static_cast<unsigned int>(kLengthBytes);
 }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

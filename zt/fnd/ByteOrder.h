@@ -9,8 +9,7 @@
 #include "zt/fnd/Exception.h"
 
 // Byte order of numbers in files and wire forms. The host is little-endian.
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 static_assert(std::endian::native == std::endian::little, "the wire routines copy host numbers");
 
@@ -75,5 +74,4 @@ void DeserializeRaw(T& value, const unsigned char*& cursor, const unsigned char*
 }
 
 }  // namespace little_endian
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

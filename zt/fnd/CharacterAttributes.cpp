@@ -4,8 +4,7 @@
 
 #include "zt/fnd/Exception.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace {
 
 std::locale NamedLocale(const char* name) {
@@ -30,5 +29,4 @@ CharacterAttributes<T>::CharacterAttributes(const char* name) : m_locale(NamedLo
 template class CharacterAttributes<char>;
 template class CharacterAttributes<wchar_t>;
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -2,8 +2,7 @@
 
 #include <locale>
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // Properties of characters under one C++ locale, whatever the host's C locale is.
 // T is char or wchar_t. Threads: a plain value.
@@ -26,5 +25,4 @@ class CharacterAttributes {
 extern template class CharacterAttributes<char>;
 extern template class CharacterAttributes<wchar_t>;
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -3,8 +3,7 @@
 #include <cstdlib>
 #include <new>
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 void* DLLMallocNoThrow(unsigned long size) noexcept { return std::malloc(size); }
 
@@ -32,5 +31,4 @@ void DLLFree(void* block) noexcept { std::free(block); }
 
 bool MakeDLLMallocThrow(bool) noexcept { return false; }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

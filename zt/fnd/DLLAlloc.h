@@ -4,8 +4,7 @@
 
 // The allocator of blocks that may cross a shared-library boundary: allocated in one module, freed
 // in another. Every block is malloc's. Threads: any.
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // malloc. A null result raises std::bad_alloc, or is returned as it is.
 void* DLLMalloc(unsigned long size);
@@ -36,5 +35,4 @@ class DLLAlloced {
   ~DLLAlloced() = default;
 };
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

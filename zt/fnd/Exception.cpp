@@ -1,7 +1,6 @@
 #include "zt/fnd/Exception.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace exception {
 namespace {
 
@@ -51,5 +50,4 @@ ZT_DETAILED(AccessDenied, "Access denied")
 std::uint32_t AccessDenied::getErrorCode() const noexcept { return 0x8ABC7019u; }
 
 }  // namespace exception
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

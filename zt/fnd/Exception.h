@@ -26,8 +26,7 @@
 
 #define ZT_RAISE(...) ::zt::fnd::exception::detail::Raise(__VA_ARGS__, __LINE__, ZT_FILE_STEM)
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace exception {
 
 namespace detail {
@@ -152,5 +151,4 @@ template <class E>
 
 }  // namespace detail
 }  // namespace exception
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

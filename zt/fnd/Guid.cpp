@@ -17,8 +17,7 @@ bool operator==(const _GUID& a, const _GUID& b) noexcept {
   return std::memcmp(&a, &b, sizeof a) == 0;
 }
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace {
 
 constexpr unsigned kTextLength = 38;
@@ -116,5 +115,4 @@ template void ParseHex<std::uint8_t>(const wchar_t*&, const wchar_t*, unsigned c
 template void ParseHex<std::uint16_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
 template void ParseHex<std::uint32_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -10,8 +10,7 @@
 bool operator<(const _GUID& a, const _GUID& b) noexcept;
 bool operator==(const _GUID& a, const _GUID& b) noexcept;
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // A 128-bit identifier and its text form, "{00112233-4455-6677-8899-AABBCCDDEEFF}".
 //
@@ -64,5 +63,4 @@ extern template void ParseHex<std::uint16_t>(const wchar_t*&, const wchar_t*, un
 extern template void ParseHex<std::uint32_t>(const wchar_t*&, const wchar_t*, unsigned char*&,
                                              bool&);
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

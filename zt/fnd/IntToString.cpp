@@ -6,8 +6,7 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/ThreadID.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace {
 
 constexpr wchar_t kDigits[] = L"0123456789ABCDEFGHIJKLMNOPQRSTUVWXYZ";
@@ -56,5 +55,4 @@ String ThreadID::getDisplayStringHex() const {
 }
 
 }  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

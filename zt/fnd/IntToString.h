@@ -4,8 +4,7 @@
 
 #include "zt/fnd/String.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // Integers to text: digits 0-9 and A-Z, without padding or prefix.
 //
@@ -21,5 +20,4 @@ String UInt16ToString(unsigned short value, unsigned int base);
 String Int32ToString(int value, unsigned int base);
 String UInt32ToString(unsigned int value, unsigned int base);
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

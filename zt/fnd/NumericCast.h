@@ -4,8 +4,7 @@
 
 #include "zt/fnd/Exception.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // Conversion between integer types that keeps the value. Throws OutOfRange where `To` cannot hold
 // it, a negative number for an unsigned type included.
@@ -22,5 +21,4 @@ To NumericCast(From value) {
   return _NumericCast<To, From>::convert(value);
 }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -7,8 +7,7 @@
 #include "zt/fnd/osdep/CriticalSection.h"
 #include "zt/fnd/osdep/Hold.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // Base of objects with a reference count that any thread may change. The count starts at 0; the
 // object goes with its last reference.
@@ -95,5 +94,4 @@ class RefPtr {
   T* m_object;
 };
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

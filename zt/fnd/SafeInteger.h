@@ -5,8 +5,7 @@
 
 #include "zt/fnd/Exception.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // Unsigned number whose arithmetic cannot wrap.
 //
@@ -58,5 +57,4 @@ class SafeInteger {
   T m_value;
 };
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -7,8 +7,7 @@
 
 #include "zt/fnd/StringFwd.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // What a string does with its block after it became shorter.
 enum class BufferStrategy : std::int32_t {
@@ -256,5 +255,4 @@ inline bool operator<(const AnsiString& a, const String& b) { return b.compare(a
 
 static_assert(sizeof(String) == 3 * sizeof(void*), "a string is three pointers");
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -3,8 +3,7 @@
 #include "zt/fnd/StringSearch.inl"
 #include "zt/fnd/StringWire.inl"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 template class StringBase<wchar_t, char, wchar_t>;
 template class StringBase<char, wchar_t, wchar_t>;
@@ -18,5 +17,4 @@ template void AsciiString::convertFrom(const String&);
 template void String::convertFrom(const AsciiString&);
 template void Utf8String::convertFrom(const AsciiString&);
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

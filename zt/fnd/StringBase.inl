@@ -17,8 +17,7 @@
 #include "zt/fnd/String.h"
 #include "zt/fnd/StringCodec.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace string_detail {
 
 inline constexpr std::uint64_t kMax32 = 0xFFFFFFFFu;
@@ -448,5 +447,4 @@ auto StringBase<T, O, E>::copy(T* dest, size_type n, size_type pos) const -> siz
   return n;
 }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -12,8 +12,7 @@
 #include "zt/fnd/WideToUtf8.h"
 #include "zt/fnd/osdep/LocaleText.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 inline constexpr char kProcessLocale[] = "";
 inline constexpr char kAscii[] = "US-ASCII";
@@ -88,5 +87,4 @@ struct StringCodec<Utf8String, AsciiString> {
   }
 };
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -3,8 +3,7 @@
 // Names of the string template and its four instances, for headers that only pass strings by
 // reference or return them. Whoever touches a string includes zt/fnd/String.h.
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // T is the character, Other the character it converts from and to. The third argument selects the
 // encoding of an 8-bit string: wchar_t the process locale, char US-ASCII. A string of unsigned char
@@ -17,5 +16,4 @@ using AnsiString = StringBase<char, wchar_t, wchar_t>;           // the process 
 using AsciiString = StringBase<char, wchar_t, char>;             // US-ASCII
 using Utf8String = StringBase<unsigned char, wchar_t, wchar_t>;  // UTF-8
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -10,8 +10,7 @@
 #include "zt/fnd/Utf8StringCompare.h"
 #include "zt/fnd/osdep/StringCompare.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace string_detail {
 
 inline const wchar_t* FindChar(const wchar_t* s, wchar_t c, std::size_t n) {
@@ -171,5 +170,4 @@ int StringBase<T, O, E>::compareOther(const O* s) const {
   }
 }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

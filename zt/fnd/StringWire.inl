@@ -14,8 +14,7 @@
 #include "zt/fnd/Utf8ToWide.h"
 #include "zt/fnd/WideToUtf8.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace string_detail {
 
 inline constexpr std::uint32_t kLengthField = 4;
@@ -91,5 +90,4 @@ void StringBase<T, O, E>::deserialize(const unsigned char*& cursor, const unsign
   cursor = body + n;
 }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

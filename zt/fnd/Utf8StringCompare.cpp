@@ -6,8 +6,7 @@
 #include "zt/fnd/Utf8ToWide.h"
 #include "zt/fnd/osdep/StringCompare.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace {
 
 const unsigned char* OrEmpty(const unsigned char* s) {
@@ -61,5 +60,4 @@ int Utf8StringExactCompare(const unsigned char* a, const unsigned char* b) {
   return Utf8StringExactCompare(a, EndOf(a), b, EndOf(b));
 }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

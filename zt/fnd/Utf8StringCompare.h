@@ -2,8 +2,7 @@
 
 #include "zt/fnd/CharacterAttributes.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // Comparison of UTF-8 texts, character by character: below 0, 0, above 0.
 //
@@ -27,5 +26,4 @@ int Utf8StringCompareInternal(const unsigned char* a, const unsigned char* aEnd,
                               const unsigned char* b, const unsigned char* bEnd, bool foldCase,
                               const CharacterAttributes<wchar_t>& attributes);
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -6,8 +6,7 @@
 
 #include "zt/fnd/Exception.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace {
 
 // Sequences by lead byte; a row holds from its lead up to the next row's.
@@ -132,5 +131,4 @@ const unsigned char* ConvertNextUtf8Character(const unsigned char* s, const unsi
   return s;
 }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -2,8 +2,7 @@
 
 #include <cstdint>
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // UTF-8 to 32-bit characters, by rules of its own:
 //
@@ -44,5 +43,4 @@ wchar_t* Utf8ToWide(const unsigned char* s, std::uint32_t n);
 const unsigned char* ConvertNextUtf8Character(const unsigned char* s, const unsigned char* end,
                                               wchar_t& out);
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -9,8 +9,7 @@
 #include "zt/fnd/DLLAlloc.h"
 #include "zt/fnd/SafeInteger.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // Growable array in one block from DLLMalloc; 32-bit size.
 //
@@ -153,5 +152,4 @@ void Vector<T>::clear() noexcept {
   m_begin = m_end = m_capacityEnd = nullptr;
 }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

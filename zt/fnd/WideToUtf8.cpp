@@ -5,8 +5,7 @@
 
 #include "zt/fnd/Exception.h"
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 namespace {
 
 bool IsEmpty(const wchar_t* begin, const wchar_t* end) { return begin == nullptr || begin >= end; }
@@ -105,5 +104,4 @@ unsigned char* WideToUtf8(const wchar_t* begin, const wchar_t* end) {
 
 unsigned char* WideToUtf8(const wchar_t* s) { return WideToUtf8(s, EndOf(s)); }
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -2,8 +2,7 @@
 
 #include <cstdint>
 
-namespace zt {
-namespace fnd {
+namespace zt::fnd {
 
 // 32-bit characters to UTF-8, by rules of its own: one byte up to 0x7F, two up to 0x7FF, three up
 // to 0xFFFF, four up to 0x1FFFFF, five up to 0x3FFFFFF, six up to 0x7FFFFFFF. Surrogates are
@@ -35,5 +34,4 @@ std::uint32_t WideToUtf8NoOverflow(const wchar_t*& begin, const wchar_t* end, un
 unsigned char* WideToUtf8(const wchar_t* begin, const wchar_t* end);
 unsigned char* WideToUtf8(const wchar_t* s);
 
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd

@@ -1,8 +1,6 @@
 #include "zt/fnd/osdep/AtomicInt.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 int AtomicInt::getCount() const { return m_value.load(); }
 
@@ -25,6 +23,4 @@ int AtomicInt::compareExchange(int expected, int replacement) {
 
 int AtomicInt::replaceAndReturn(int value) { return m_value.exchange(value); }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -3,9 +3,7 @@
 #include <atomic>
 #include <cstdint>
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // A 32-bit signed number on which each operation is one indivisible step. Arithmetic wraps. No
 // locks: a child that is forked during a step of another thread can go on. Threads: any.
@@ -35,6 +33,4 @@ class AtomicInt {
       nullptr;  // of the size that objects with a number in them have always had
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -5,9 +5,7 @@
 #include "zt/fnd/AutoBuffer.h"
 #include "zt/fnd/StringFwd.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Owner of one open file.
 //
@@ -78,6 +76,4 @@ class BinaryFile {
   std::int32_t m_fd;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -18,9 +18,7 @@
 using zt::posix::RetryEintr;
 using zt::posix::ScopedFd;
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr std::uint32_t kTopBit = 0x80000000u;
@@ -196,6 +194,4 @@ void BinaryFile::sync() {
   if (RetryEintr([&] { return ::fsync(m_fd); }) != 0) ZT_RAISE(PosixError());
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -4,9 +4,7 @@
 
 #include "zt/fnd/StringFwd.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // A directory that holds a code module: "X.framework", "X.bundle" and the like.
 //
@@ -46,6 +44,4 @@ class Bundle {
   std::shared_ptr<Module> m_bundle;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -5,9 +5,7 @@
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/path.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 // "/a/X.framework" gives "X".
@@ -82,6 +80,4 @@ String Bundle::decorateName(const String& name) {
   return NeedsDecoration(name) ? name + L".bundle" : name;
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -2,9 +2,7 @@
 
 #include "zt/fnd/osdep/MonotonicClock.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 CallQPC::CallQPC() : m_rate(MonotonicTicksPerSecond()) {}
 
@@ -18,6 +16,4 @@ std::uint64_t CallQPC::convert(std::uint64_t ticks, unsigned int unit) const {
   return ticks / m_rate * factor + ticks % m_rate * factor / m_rate;
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -2,9 +2,7 @@
 
 #include <cstdint>
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // The high-resolution clock, read in ticks of a chosen length. Threads: any.
 class CallQPC {
@@ -22,6 +20,4 @@ class CallQPC {
   std::uint64_t m_rate;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -6,9 +6,7 @@
 #include "zt/fnd/osdep/ProcessMark.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Owner of a descriptor that a forked child does not keep (O_CLOFORK, which Linux lacks).
 //
@@ -58,6 +56,4 @@ class CloseOnForkFd {
   bool m_kept = false;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -15,9 +15,7 @@
 
 using zt::posix::ScopedFd;
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 // Plain objects, ready before any initialiser and good after every destructor.
@@ -139,6 +137,4 @@ void CloseOnForkFd::reset() noexcept {
   m_fd = -1;
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -6,9 +6,7 @@
 #include <cerrno>
 #include <cstdint>
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 struct UnixCriticalSection::Block {
   // Atomic, because threads that are not the owner compare it with themselves.
@@ -66,6 +64,4 @@ CriticalSection::~CriticalSection() { delete m_section; }
 void CriticalSection::enter() const { m_section->enter(); }
 void CriticalSection::leave() const { m_section->leave(); }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

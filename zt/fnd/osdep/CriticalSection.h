@@ -12,9 +12,7 @@
 //
 // Nothing here throws but the constructors (std::bad_alloc). A section has to be left as often as
 // it was entered before it goes; one that is still owned then is abandoned quietly.
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 class UnixCriticalSection {
  public:
@@ -56,6 +54,4 @@ class CAPABILITY("critical section") CriticalSection {
 
 static_assert(sizeof(CriticalSection) == sizeof(void*));
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -9,9 +9,7 @@
 #include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr unsigned kMostDigits = 3;
@@ -139,6 +137,4 @@ String AbsTimeToString(AbsTime time, const wchar_t* dateFormat, const wchar_t* t
 String GetSystemDateFormat() { return SystemFormat(L"%x"); }
 String GetSystemTimeFormat() { return SystemFormat(L"%X"); }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -8,9 +8,7 @@
 #include "zt/fnd/AbsTime.h"
 #include "zt/fnd/StringFwd.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 AbsTime CurrentSystemTime();
 AbsTime TimevalToAbsTime(const timeval& time);
@@ -39,6 +37,4 @@ String AbsTimeToString(AbsTime time, const wchar_t* dateFormat, const wchar_t* t
 String GetSystemDateFormat();
 String GetSystemTimeFormat();
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

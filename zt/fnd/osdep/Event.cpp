@@ -10,9 +10,7 @@
 #include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/PosixMutex.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr unsigned int kNoLimit = 0xFFFFFFFFu;
@@ -99,6 +97,4 @@ bool PumpEvent::wait(unsigned long ms, bool) const {
   return Event::wait(static_cast<unsigned int>(ms));
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

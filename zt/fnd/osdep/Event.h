@@ -8,9 +8,7 @@
 //
 // A set wakes all waiters of a manual-reset event, one of an automatic one. Sets do not add up.
 // Only PumpEvent's timed wait and the constructors (std::bad_alloc) throw. Threads: any.
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 class Event {
  public:
@@ -49,6 +47,4 @@ class PumpEvent : public Event {
   [[maybe_unused]] bool m_pump;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -5,9 +5,7 @@
 #include "zt/fnd/AbsTime.h"
 #include "zt/fnd/StringFwd.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // A Unix time.
 AbsTime Time_TtoAbsTime(std::time_t seconds);
@@ -16,6 +14,4 @@ AbsTime Time_TtoAbsTime(std::time_t seconds);
 // because stored stamps are compared with this one. AbsTime::min if the file cannot be asked.
 AbsTime GetFileLastWriteTime(const String& path);
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -8,9 +8,7 @@
 
 using zt::posix::RetryEintr;
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 AbsTime Time_TtoAbsTime(std::time_t seconds) {
   AbsTime::Value value(static_cast<std::int64_t>(seconds));
@@ -25,6 +23,4 @@ AbsTime GetFileLastWriteTime(const String& path) {
   return Time_TtoAbsTime(info.st_mtime);
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -5,9 +5,7 @@
 #include "zt/fnd/String.h"
 #include "zt/fnd/Vector.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Lists the entries of one directory whose names fit a mask.
 //
@@ -37,6 +35,4 @@ class FindFiles {
 // The rule for patterns. Takes no more steps than the product of the two lengths.
 bool WildcardFit(const wchar_t* pattern, const wchar_t* name);
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -9,9 +9,7 @@
 #include "zt/fnd/osdep/StringCompare.h"
 #include "zt/fnd/osdep/path.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 using Flags = FindFiles::FindFlags;
@@ -137,6 +135,4 @@ Vector<String> FindFiles::getFilenames(const String& mask, FindFlags flags) {
   return List(mask, flags, Errors::Thrown);
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

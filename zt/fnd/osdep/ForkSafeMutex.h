@@ -8,9 +8,7 @@
 #include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/ThreadAnnotations.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // What a fork() does with a mutex that another thread holds.
 enum class AtFork {
@@ -74,6 +72,4 @@ class CAPABILITY("mutex") ForkSafeMutex {
 
 using ForkSafeHold = Hold<ForkSafeMutex>;
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

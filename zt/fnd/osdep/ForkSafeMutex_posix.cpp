@@ -11,9 +11,7 @@
 #include "zt/fnd/osdep/ProcessStatics.h"
 #include "zt/fnd/osdep/events/NamedEventGlobalStatics.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr std::int64_t kNanosecondsPerSecond = 1000000000;
@@ -177,6 +175,4 @@ void ForkSafeMutex::renew() noexcept {
   m_depth = 0;
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

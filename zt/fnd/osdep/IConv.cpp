@@ -10,9 +10,7 @@
 #include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 // The C library opens and closes under a lock of its own, which a child may find held for good.
@@ -78,6 +76,4 @@ void IConv(const wchar_t* begin, const wchar_t* end, const char* fromCode, char*
   Convert(begin, end, fromCode, dest, destEnd, toCode);
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -1,8 +1,6 @@
 #pragma once
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Conversion by the platform's iconv, which cannot fail on bad text.
 //
@@ -17,6 +15,4 @@ void IConv(const char* begin, const char* end, const char* fromCode, wchar_t* de
 void IConv(const wchar_t* begin, const wchar_t* end, const char* fromCode, char* dest,
            char*& destEnd, const char* toCode);
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -2,9 +2,7 @@
 
 #include <atomic>
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // The one T of the process, made by the first call and never destroyed, as other libraries call in
 // from their exit handlers.
@@ -24,6 +22,4 @@ T& LeakedInstance() {
   return *present;
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -2,9 +2,7 @@
 
 #include "zt/fnd/StringFwd.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // The system's loader, for SharedLibrary and Bundle.
 
@@ -20,6 +18,4 @@ void* FindFunction(void* module, const AnsiString& name);  // null if there is n
 // True if the last component holds no ".": such a name gets a suffix.
 bool NeedsDecoration(const String& name);
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -13,9 +13,7 @@
 
 using zt::posix::RetryEintr;
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 namespace {
 
@@ -58,6 +56,4 @@ void RaiseLoaderError() {
 
 bool NeedsDecoration(const String& name) { return path::BaseName(name).find(L'.') == String::npos; }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -10,9 +10,7 @@
 #include "zt/fnd/SafeInteger.h"
 #include "zt/fnd/osdep/IConv.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 using SafeCount = SafeInteger<std::uint32_t>;
@@ -220,6 +218,4 @@ char* WideToAnsi(const wchar_t* s, const char* locale) { return WideToAnsi(s, En
 
 bool MakeWideToAnsiThrow(bool) { return false; }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -2,9 +2,7 @@
 
 #include <cstdint>
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Conversion between 32-bit characters and the text of a locale.
 //
@@ -40,6 +38,4 @@ char* WideToAnsi(const wchar_t* s, const char* locale);
 // Does nothing and returns false: bad text becomes "?".
 bool MakeWideToAnsiThrow(bool doThrow);
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -6,9 +6,7 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/UuidSource.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 template <class T>
@@ -33,6 +31,4 @@ _GUID MakeGUID(UuidSource source) {
   return guid;
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

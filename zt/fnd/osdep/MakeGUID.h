@@ -2,9 +2,7 @@
 
 #include "zt/fnd/GuidType.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // A new GUID: a random (version 4) UUID of RFC 4122, whose text form reads as the UUID's does.
 // Throws InitializationFailure if the system gives none. Threads: any.
@@ -16,6 +14,4 @@ using UuidSource = bool (*)(unsigned char (&bytes)[16]);
 // The same from another source.
 _GUID MakeGUID(UuidSource source);
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

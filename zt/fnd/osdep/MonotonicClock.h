@@ -2,14 +2,10 @@
 
 #include <cstdint>
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Ticks since an arbitrary moment, never set back, and how many of them make a second.
 std::uint64_t MonotonicTicks();
 std::uint64_t MonotonicTicksPerSecond();
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

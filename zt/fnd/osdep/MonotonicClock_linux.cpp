@@ -2,9 +2,7 @@
 
 #include "zt/fnd/osdep/MonotonicClock.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 std::uint64_t MonotonicTicks() {
   timespec now;
@@ -15,6 +13,4 @@ std::uint64_t MonotonicTicks() {
 
 std::uint64_t MonotonicTicksPerSecond() { return 1000000000u; }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

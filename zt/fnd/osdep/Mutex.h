@@ -3,9 +3,7 @@
 #include "zt/fnd/StringFwd.h"
 #include "zt/fnd/osdep/ThreadAnnotations.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Lock known by name to every process of the machine.
 //
@@ -65,6 +63,4 @@ class CAPABILITY("named mutex") Mutex {
   Record* m_record;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

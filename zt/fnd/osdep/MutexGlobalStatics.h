@@ -9,9 +9,7 @@
 #include "zt/fnd/osdep/ProcessMark.h"
 #include "zt/fnd/osdep/SharedObjectName.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // What the Mutex objects of one name in this process share.
 struct MutexData {
@@ -50,6 +48,4 @@ class MutexGlobalStatics : public RefCountedThreadSafePolicy {
   Map m_data GUARDED_BY(section);
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -3,9 +3,7 @@
 #include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/ProcessStatics.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 MutexGlobalStatics::MutexGlobalStatics() : process(ProcessMark::Current()) {}
 
@@ -25,6 +23,4 @@ void MutexGlobalStatics::detach(Map::iterator data) {
   if (--data->second.objects == 0) m_data.erase(data);
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -19,9 +19,7 @@
 
 using zt::posix::Flock;
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr const wchar_t* kDirectory = L"mutex";
@@ -214,6 +212,4 @@ bool Mutex::retake() const {
   }
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

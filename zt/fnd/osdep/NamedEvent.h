@@ -2,9 +2,7 @@
 
 #include "zt/fnd/StringFwd.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 class EventData;
 
@@ -64,6 +62,4 @@ class NamedEvent {
   EventData* m_data;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -14,9 +14,7 @@
 
 using zt::posix::RetryEintr;
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr unsigned int kNoLimit = 0xFFFFFFFFu;
@@ -87,6 +85,4 @@ bool NamedEvent::wait(unsigned int ms) const {
   }
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

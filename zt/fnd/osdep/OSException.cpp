@@ -3,9 +3,7 @@
 #include <cerrno>
 #include <cstring>
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr std::uint32_t kNoError = 0;
@@ -56,6 +54,4 @@ std::uint32_t CarbonError::getErrorCode() const noexcept {
   return SmallCode(code, kFileNotFoundStatus);
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

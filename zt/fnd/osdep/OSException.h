@@ -5,9 +5,7 @@
 
 #include "zt/fnd/Exception.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // A failure that the operating system reports. getErrorCode() of this family is a small number, not
 // one of the foundation's block; whatcode() is the system's own number.
@@ -54,6 +52,4 @@ class ZT_EXCEPTION_CLASS CarbonError : public OSException {
   std::uint32_t getErrorCode() const noexcept override;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

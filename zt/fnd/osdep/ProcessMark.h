@@ -4,9 +4,7 @@
 
 #include <atomic>
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Tells the process that an object belongs to from the children that it forks.
 //
@@ -30,6 +28,4 @@ class ProcessMark {
   std::atomic<unsigned> m_generation{0};
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -3,9 +3,7 @@
 
 #include "zt/fnd/osdep/ProcessMark.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 // Plain objects, ready before any initialiser and good after every destructor.
@@ -38,6 +36,4 @@ bool ProcessMark::isCurrent() const noexcept {
              s_generation.load(std::memory_order_relaxed);
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -9,9 +9,7 @@
 #include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/PosixMutex.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // The one Statics of this process: made on demand, shared by reference, let go at exit.
 //
@@ -80,6 +78,4 @@ class ProcessStatics {
   static inline Statics* s_inherited GUARDED_BY(s_lock) = nullptr;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -8,9 +8,7 @@
 #include "zt/fnd/osdep/LoadModule.h"
 #include "zt/fnd/osdep/path.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 // Of the library file; the system's own suffix.
@@ -134,6 +132,4 @@ void* SharedLibrary::getFunctionPointer(const String& name, bool noThrow) const 
   return getFunctionPointer(AnsiString(name), noThrow);
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

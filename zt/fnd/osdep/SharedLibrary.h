@@ -2,9 +2,7 @@
 
 #include "zt/fnd/String.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // A code module found by a bare name or a path, in whatever form it is installed.
 //
@@ -59,6 +57,4 @@ class SharedLibrary {
   bool m_isBundle;  // what m_handle is
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -8,9 +8,7 @@
 #include "zt/fnd/osdep/LocaleText.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 bool IsAscii(wchar_t c) { return static_cast<std::uint32_t>(c) < 0x80; }
@@ -45,6 +43,4 @@ bool SharedObjectNameLess::operator()(const String& a, const String& b) const no
   return Folded(*left) < Folded(*right);
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

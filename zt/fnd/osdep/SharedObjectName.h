@@ -6,9 +6,7 @@
 //
 // One name has one file and one entry in each process, whatever the locales of the processes: nothing
 // here asks the locale, which differs between processes and which a host may change at any time.
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // The name as the bytes of a file's name: UTF-8. A value that is no character becomes "?".
 AnsiString SharedObjectFileName(const String& name);
@@ -21,6 +19,4 @@ struct SharedObjectNameLess {
   bool operator()(const String& a, const String& b) const noexcept;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

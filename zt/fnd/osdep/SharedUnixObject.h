@@ -10,9 +10,7 @@
 // is removed when a process ends. As any user may put anything there, nothing follows a symbolic
 // link in the last place, waits for a pipe, or touches a file that has a second name elsewhere
 // (zt/posix/Files.h). All steps may be repeated, and run in several processes at once. Threads: any.
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // "/var/tmp/zentrex/shared", or $ZTFNDTMPSHAREDFILEDIR, read at each call, where that is absolute.
 String GetSharedUnixBase();
@@ -57,6 +55,4 @@ struct FileIdentity {
   bool isNamedBy(const AnsiString& path) const;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

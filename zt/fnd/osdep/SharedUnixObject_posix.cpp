@@ -18,9 +18,7 @@
 using zt::posix::RetryEintr;
 using zt::posix::ScopedFd;
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr const wchar_t* kDefaultBase = L"/var/tmp/zentrex/shared";
@@ -151,6 +149,4 @@ bool FileIdentity::isNamedBy(const AnsiString& path) const {
   return info.st_dev == device && info.st_ino == inode;
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

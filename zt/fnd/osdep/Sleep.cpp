@@ -3,9 +3,7 @@
 #include <cerrno>
 #include <ctime>
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 void Sleep(unsigned int ms) {
   timespec left = {static_cast<time_t>(ms / 1000), static_cast<long>(ms % 1000) * 1000000L};
@@ -13,6 +11,4 @@ void Sleep(unsigned int ms) {
   }
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -1,12 +1,8 @@
 #pragma once
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Blocks the calling thread for at least this time; a signal does not cut it short.
 void Sleep(unsigned int ms);
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

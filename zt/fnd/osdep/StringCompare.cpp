@@ -9,9 +9,7 @@
 
 #include "zt/fnd/Exception.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 const char* OrEmpty(const char* s) { return s == nullptr ? "" : s; }
@@ -105,6 +103,4 @@ int StringExactCompare(const wchar_t* a, const wchar_t* aEnd, const wchar_t* b,
   return CompareRanges<wchar_t, RawDifference<wchar_t>>(a, aEnd, b, bEnd);
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -1,8 +1,6 @@
 #pragma once
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Comparison of texts: below 0, 0, above 0.
 //
@@ -30,6 +28,4 @@ int StringExactCompare(const wchar_t* a, const wchar_t* aEnd, const wchar_t* b,
 // The difference of two counts as a comparison result. Throws OutOfRange as above.
 int LengthDifference(long long a, long long b);
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

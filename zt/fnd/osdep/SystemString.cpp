@@ -7,9 +7,7 @@
 
 #include "zt/fnd/DLLAlloc.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 using Count = std::uint32_t;
@@ -41,6 +39,4 @@ void SystemFreeString(wchar_t* s) {
   if (s != nullptr) DLLFree(reinterpret_cast<char*>(s) - sizeof(Count));
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

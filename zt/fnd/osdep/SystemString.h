@@ -1,8 +1,6 @@
 #pragma once
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Texts that carry their length: a terminated wide text with its count of characters (not bytes) in
 // the 32-bit word in front of it. The block comes from the module allocator but starts at that
@@ -18,6 +16,4 @@ wchar_t* SystemAllocStringLen(const wchar_t* s, unsigned int n);
 // Null does nothing.
 void SystemFreeString(wchar_t* s);
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

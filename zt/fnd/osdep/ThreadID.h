@@ -4,9 +4,7 @@
 
 #include "zt/fnd/StringFwd.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Identity of a thread, as long as that thread lives: the system may give it to a later one.
 class ThreadID {
@@ -30,6 +28,4 @@ class ThreadID {
 
 static_assert(sizeof(ThreadID) == sizeof(pthread_t));
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -9,9 +9,7 @@
 using zt::posix::RetryEintr;
 using zt::posix::ScopedFd;
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr ssize_t kSize = 16;
@@ -35,6 +33,4 @@ bool NewUuidBytes(unsigned char (&bytes)[16]) {
   return true;
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -8,9 +8,7 @@
 #include "zt/fnd/String.h"
 
 // The operations on path text.
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 using size_type = String::size_type;
@@ -120,6 +118,4 @@ String path::NormalizePath(const String& path) {
   return appended ? DirName(result) : result;
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

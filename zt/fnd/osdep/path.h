@@ -2,9 +2,7 @@
 
 #include "zt/fnd/StringFwd.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Operations on path text and on the file system.
 //
@@ -94,6 +92,4 @@ class path {
   static String ResolveSymLink(const String& path);
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

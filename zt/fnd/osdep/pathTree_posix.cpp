@@ -21,9 +21,7 @@
 using zt::posix::RetryEintr;
 
 // Renaming, copying and the operations on trees, which need files and listings.
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr unsigned long kCopyBlock = 32768;
@@ -204,6 +202,4 @@ void path::CpDir(const String& from, const String& to) {
   TreeCopy().copy(from, to);
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

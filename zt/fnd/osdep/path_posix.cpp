@@ -18,9 +18,7 @@
 using zt::posix::RetryEintr;
 
 // The operations on single entries of the file system.
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 using MallocText = std::unique_ptr<char, void (*)(void*)>;
@@ -187,6 +185,4 @@ String path::ResolveSymLink(const String& path) {
   return String(text.data(), static_cast<String::size_type>(length));
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -7,9 +7,7 @@
 #include "zt/fnd/osdep/events/EventRegistry.h"
 #include "zt/fnd/osdep/events/SemaphoreSet.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // One open event; one object a name in a process.
 //
@@ -60,6 +58,4 @@ class EventData : public RefCountedCriticalSectionPolicy {
   unsigned m_slot = 0;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -9,9 +9,7 @@
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/events/EventData.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 // Counts the sets without a slot, up to the number after which the search ends.
@@ -204,6 +202,4 @@ void EventData::close() {
   m_file.close();
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -11,9 +11,7 @@
 #include "zt/fnd/osdep/ProcessMark.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // Locks an open file: true if the caller has it alone, false if beside others who share it.
 //
@@ -86,6 +84,4 @@ class EventFile {
   key_t m_key = -1;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -18,9 +18,7 @@
 using zt::posix::Flock;
 using zt::posix::RetryEintr;
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr const wchar_t* kDirectory = L"namedEvent";
@@ -134,6 +132,4 @@ void EventFile::close() noexcept {
   m_fd.reset();
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

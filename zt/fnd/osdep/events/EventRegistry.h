@@ -5,9 +5,7 @@
 #include "zt/fnd/osdep/CriticalSection.h"
 #include "zt/fnd/osdep/Mutex.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 class EventData;
 class SemaphoreSet;
@@ -30,6 +28,4 @@ class EventRegistry : public RefCountedThreadSafePolicy {
   Mutex stateFileMutex{String(L"zt_fnd_osdep_NamedEvent_StateFileMutex")};
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -3,9 +3,7 @@
 #include <algorithm>
 #include <cstring>
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 template <class Number>
@@ -86,6 +84,4 @@ StateFileBytes EncodeEmptySet() {
   return bytes;
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

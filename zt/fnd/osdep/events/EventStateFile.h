@@ -8,9 +8,7 @@
 //
 // All numbers are in the host's byte order, field behind field, without padding, and the same in
 // 32-bit and 64-bit processes. docs/event-files.md shows them in worked examples.
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 constexpr std::uint32_t kSlotsPerSet = 128;
 constexpr std::uint32_t kNoSlot = 0xFFFFFFFFu;  // behind the last free slot
@@ -78,6 +76,4 @@ using StateFileBytes = std::array<unsigned char, kStateFileSize>;
 // A state file with all slots free and the ready flag clear.
 StateFileBytes EncodeEmptySet();
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -9,9 +9,7 @@
 #include "zt/fnd/osdep/events/EventRegistry.h"
 #include "zt/fnd/osdep/events/SemaphoreSet.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // The named events of this process.
 //
@@ -48,6 +46,4 @@ class NamedEventGlobalStatics : public EventRegistry {
   std::map<String, EventData*, SharedObjectNameLess> m_events GUARDED_BY(section);
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -12,9 +12,7 @@
 #include "zt/fnd/osdep/ProcessStatics.h"
 #include "zt/fnd/osdep/Sleep.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 // How long an event that others hold, but that cannot be joined, is tried again.
@@ -92,6 +90,4 @@ void NamedEventGlobalStatics::Release(EventData& event) {
   event.RefCountedThreadUnsafePolicy::release();
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

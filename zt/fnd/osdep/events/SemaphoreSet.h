@@ -7,9 +7,7 @@
 #include "zt/fnd/osdep/events/EventRegistry.h"
 #include "zt/fnd/osdep/events/EventStateFile.h"
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 
 // One System V semaphore set of 128, with its state file "sem_" + number; one object a number in a
 // process. The set and its file go with the last object of all processes.
@@ -77,6 +75,4 @@ class SemaphoreSet : public RefCountedCriticalSectionPolicy {
   State m_state = State::Missing;
 };
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep

@@ -15,9 +15,7 @@
 
 using zt::posix::RetryEintr;
 
-namespace zt {
-namespace fnd {
-namespace osdep {
+namespace zt::fnd::osdep {
 namespace {
 
 constexpr int kSetMode = 0777;
@@ -222,6 +220,4 @@ void SemaphoreSet::close() {
   }
 }
 
-}  // namespace osdep
-}  // namespace fnd
-}  // namespace zt
+}  // namespace zt::fnd::osdep
