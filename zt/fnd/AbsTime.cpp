@@ -15,7 +15,7 @@ constexpr std::uint64_t kHalf = std::uint64_t(1) << 63;
 constexpr double kTwo64 = 18446744073709551616.0;
 
 void SetStatus(std::int32_t* status, std::int32_t error) {
-  if (status != nullptr && *status == tSSTimeValue::kNoError) *status = error;
+  if (status && *status == tSSTimeValue::kNoError) *status = error;
 }
 
 struct UnitFactor {

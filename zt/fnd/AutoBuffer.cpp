@@ -30,11 +30,11 @@ void FreeGuts(AutoBufferGuts* guts) noexcept {
 
 AutoBufferGuts* NewGuts(std::uint32_t capacity) {
   void* place = std::malloc(sizeof(AutoBufferGuts));
-  if (place == nullptr) throw std::bad_alloc();
+  if (!place) throw std::bad_alloc();
   AutoBufferGuts* guts = new (place) AutoBufferGuts;
   if (capacity == 0) return guts;
   guts->data = static_cast<unsigned char*>(std::malloc(capacity));
-  if (guts->data == nullptr) {
+  if (!guts->data) {
     FreeGuts(guts);
     throw std::bad_alloc();
   }
@@ -53,13 +53,13 @@ AutoBufferGuts* CloneGuts(const AutoBufferGuts& source) {
 }
 
 void ReleaseGuts(AutoBufferGuts* guts) noexcept {
-  if (guts != nullptr && guts->references.decrement() == 0) FreeGuts(guts);
+  if (guts && guts->references.decrement() == 0) FreeGuts(guts);
 }
 
 void ReallocData(AutoBufferGuts* guts, std::uint32_t capacity) {
   std::size_t used = static_cast<std::size_t>(guts->end - guts->data);
   void* moved = std::realloc(guts->data, capacity);
-  if (moved == nullptr) throw std::bad_alloc();
+  if (!moved) throw std::bad_alloc();
   guts->data = static_cast<unsigned char*>(moved);
   guts->end = guts->data + used;
   guts->capacity = capacity;
@@ -83,7 +83,7 @@ int CompareBuffers(const BufferWrapper& a, const BufferWrapper& b) noexcept {
 AutoBuffer::AutoBuffer(unsigned int n) : m_guts(NewGuts(n)) {}
 
 AutoBuffer::AutoBuffer(const AutoBuffer& other) : m_guts(other.m_guts) {
-  if (m_guts != nullptr) m_guts->references.increment();
+  if (m_guts) m_guts->references.increment();
 }
 
 AutoBuffer::AutoBuffer(const BufferWrapper& bytes) : AutoBuffer() {
@@ -92,7 +92,7 @@ AutoBuffer::AutoBuffer(const BufferWrapper& bytes) : AutoBuffer() {
 
 AutoBuffer& AutoBuffer::operator=(const AutoBuffer& other) {
   if (m_guts == other.m_guts) return *this;
-  if (other.m_guts != nullptr) other.m_guts->references.increment();
+  if (other.m_guts) other.m_guts->references.increment();
   AutoBufferGuts* old = std::exchange(m_guts, other.m_guts);
   ReleaseGuts(old);
   return *this;
@@ -108,13 +108,13 @@ void AutoBuffer::Free() noexcept { ReleaseGuts(std::exchange(m_guts, nullptr)); 
 void AutoBuffer::Erase() noexcept {
   if (shared()) {
     Free();
-  } else if (m_guts != nullptr) {
+  } else if (m_guts) {
     m_guts->end = m_guts->data;
   }
 }
 
 void AutoBuffer::makeOwn() {
-  if (m_guts == nullptr) {
+  if (!m_guts) {
     m_guts = NewGuts(0);
   } else if (shared()) {
     AutoBufferGuts* own = CloneGuts(*m_guts);
@@ -134,7 +134,7 @@ const unsigned char* AutoBuffer::prepare(const void* bytes, std::uint32_t requir
   const unsigned char* source = static_cast<const unsigned char*>(bytes);
   const unsigned char* old = Data();
   std::less<const unsigned char*> before;
-  bool inside = old != nullptr && !before(source, old) && before(source, old + Capacity());
+  bool inside = old && !before(source, old) && before(source, old + Capacity());
   makeOwnWithRoom(required, Growth::ByATenth);
   return inside ? Data() + (source - old) : source;
 }
@@ -161,7 +161,7 @@ void AutoBuffer::Skip(unsigned int n) {
 }
 
 void AutoBuffer::UnAppend(unsigned int n) {
-  if (m_guts == nullptr) return;
+  if (!m_guts) return;
   makeOwn();
   m_guts->end -= std::min(n, Len());
 }
@@ -173,7 +173,7 @@ void AutoBuffer::Modify(unsigned int offset, const void* bytes, unsigned int n) 
 
 // Takes the bytes as the whole contents; reuses an own block that is large enough.
 void AutoBuffer::replaceWith(const unsigned char* bytes, std::uint32_t n) {
-  if (m_guts == nullptr || shared() || m_guts->capacity < n) {
+  if (!m_guts || shared() || m_guts->capacity < n) {
     AutoBufferGuts* fresh = NewGuts(n);
     CopyBytes(fresh->data, bytes, n);
     ReleaseGuts(std::exchange(m_guts, fresh));

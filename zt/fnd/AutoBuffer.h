@@ -111,7 +111,7 @@ class AutoBuffer {
  private:
   enum class Growth { Exact, ByATenth };
 
-  bool shared() const { return m_guts != nullptr && m_guts->references > 1; }
+  bool shared() const { return m_guts && m_guts->references > 1; }
   void makeOwn();
   void makeOwnWithRoom(std::uint32_t required, Growth growth);
   const unsigned char* prepare(const void* bytes, std::uint32_t required);

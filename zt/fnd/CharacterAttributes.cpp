@@ -8,7 +8,7 @@ namespace zt::fnd {
 namespace {
 
 std::locale NamedLocale(const char* name) {
-  if (name == nullptr) ZT_RAISE(exception::InvalidArgument2("no locale name"));
+  if (!name) ZT_RAISE(exception::InvalidArgument2("no locale name"));
   try {
     return std::locale(name);
   } catch (const std::exception& e) {

@@ -9,12 +9,12 @@ void* DLLMallocNoThrow(unsigned long size) noexcept { return std::malloc(size); 
 
 void* DLLMalloc(unsigned long size) {
   void* block = DLLMallocNoThrow(size);
-  if (block == nullptr) throw std::bad_alloc();
+  if (!block) throw std::bad_alloc();
   return block;
 }
 
 void* DLLReallocNoThrow(void* block, unsigned long size) noexcept {
-  if (size == 0 && block != nullptr) {
+  if (size == 0 && block) {
     std::free(block);
     return nullptr;
   }
@@ -23,7 +23,7 @@ void* DLLReallocNoThrow(void* block, unsigned long size) noexcept {
 
 void* DLLRealloc(void* block, unsigned long size) {
   void* moved = DLLReallocNoThrow(block, size);
-  if (moved == nullptr && size > 0) throw std::bad_alloc();
+  if (!moved && size > 0) throw std::bad_alloc();
   return moved;
 }
 

@@ -6,7 +6,7 @@ namespace {
 
 std::string WithDetail(const char* prefix, const char* detail) {
   std::string text(prefix);
-  if (detail != nullptr) text += detail;
+  if (detail) text += detail;
   return text;
 }
 

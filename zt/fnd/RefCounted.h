@@ -70,12 +70,12 @@ template <class T>
 class RefPtr {
  public:
   RefPtr(T* object = nullptr) : m_object(object) {
-    if (m_object != nullptr) m_object->addRef();
+    if (m_object) m_object->addRef();
   }
   RefPtr(const RefPtr& other) : RefPtr(other.m_object) {}
   RefPtr(RefPtr&& other) noexcept : m_object(other.detach()) {}
   ~RefPtr() {
-    if (m_object != nullptr) m_object->release();
+    if (m_object) m_object->release();
   }
   RefPtr& operator=(RefPtr other) noexcept {
     std::swap(m_object, other.m_object);

@@ -37,7 +37,7 @@ inline std::uint32_t Sum(std::uint32_t a, std::uint32_t b) {
 // Characters of a range; a null or reversed one is judged here for all callers.
 template <class C>
 std::uint32_t RangeLength(const C* first, const C* last) {
-  return first == nullptr ? 0 : NumericCast<std::uint32_t>(last - first);
+  return first ? NumericCast<std::uint32_t>(last - first) : 0;
 }
 
 inline std::size_t RawLength(const wchar_t* s) { return std::wcslen(s); }
@@ -48,7 +48,7 @@ inline std::size_t RawLength(const unsigned char* s) {
 
 template <class C>
 std::uint32_t TextLength(const C* s) {
-  return s == nullptr ? 0 : NumericCast<std::uint32_t>(RawLength(s));
+  return s ? NumericCast<std::uint32_t>(RawLength(s)) : 0;
 }
 
 // A fresh block of n characters and the terminator; goes back unless released.
@@ -85,7 +85,7 @@ void Grow(std::uint32_t required, T*& begin, T*& end, T*& capacityEnd) {
   const std::uint64_t bytes = (capacity + 1) * sizeof(T);
   void* block = nullptr;
   if (bytes <= kMax32) block = DLLReallocNoThrow(begin, static_cast<std::uint32_t>(bytes));
-  if (block == nullptr) {
+  if (!block) {
     capacity = required;
     block = DLLRealloc(begin, BlockBytes<T>(required));
   }
@@ -117,7 +117,7 @@ std::ptrdiff_t OffsetWithin(const T* s, const T* begin, const T* end) {
 
 template <class T, class O, class E>
 void StringBase<T, O, E>::construct(const T* s, size_type n) {
-  if (s == nullptr) n = 0;
+  if (!s) n = 0;
   string_detail::Block<T> block(n);
   string_detail::CopyChars(block.get(), s, n);
   m_begin = block.release();
@@ -195,7 +195,7 @@ template <class T, class O, class E>
 StringBase<T, O, E>::StringBase(const O* s) : StringBase(s, string_detail::TextLength(s)) {}
 template <class T, class O, class E>
 StringBase<T, O, E>::StringBase(const O* s, size_type n) {
-  construct<StringCodec<StringBase, Partner>>(s, s == nullptr ? s : s + n);
+  construct<StringCodec<StringBase, Partner>>(s, s ? s + n : s);
 }
 template <class T, class O, class E>
 StringBase<T, O, E>::StringBase(const O* first, const O* last) {
@@ -252,7 +252,7 @@ void StringBase<T, O, E>::fitBuffer(size_type n) {
 template <class T, class O, class E>
 auto StringBase<T, O, E>::assign(const T* s, size_type n) -> StringBase& {
   if (s == m_begin) return *this;
-  if (s == nullptr) n = 0;
+  if (!s) n = 0;
   if (string_detail::OffsetWithin<T>(s, m_begin, m_end) >= 0) {
     // A part of the string itself: it moves down before the block may go.
     string_detail::MoveChars(m_begin, s, n);
@@ -316,7 +316,7 @@ auto StringBase<T, O, E>::append(const T* s) -> StringBase& {
 
 template <class T, class O, class E>
 auto StringBase<T, O, E>::append(const T* s, size_type n) -> StringBase& {
-  if (s == nullptr || n == 0) return *this;
+  if (!s || n == 0) return *this;
   const std::ptrdiff_t own = string_detail::OffsetWithin<T>(s, m_begin, m_end);
   makeRoom(n);
   if (own >= 0) s = m_begin + own;  // the block may have moved
@@ -357,7 +357,7 @@ auto StringBase<T, O, E>::append(const O* s) -> StringBase& {
 // its terminator back.
 template <class T, class O, class E>
 auto StringBase<T, O, E>::append(const O* s, size_type n) -> StringBase& {
-  if (s == nullptr || n == 0) return *this;
+  if (!s || n == 0) return *this;
   using Codec = StringCodec<StringBase, Partner>;
   makeRoom(Codec::requiredLength(s, s + n));
   try {

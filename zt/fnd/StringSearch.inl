@@ -74,7 +74,7 @@ template <class T, class O, class E>
 auto StringBase<T, O, E>::find(T c, size_type pos) const -> size_type {
   if (pos >= length()) return npos;
   const T* const hit = string_detail::FindChar(m_begin + pos, c, length() - pos);
-  return hit == nullptr ? npos : static_cast<size_type>(hit - m_begin);
+  return hit ? static_cast<size_type>(hit - m_begin) : npos;
 }
 
 template <class T, class O, class E>
@@ -85,7 +85,7 @@ auto StringBase<T, O, E>::find(const StringBase& s, size_type pos) const -> size
   const size_type last = length() - s.length();
   while (pos <= last) {
     const T* const hit = string_detail::FindChar(m_begin + pos, s[0], last - pos + 1);
-    if (hit == nullptr) return npos;
+    if (!hit) return npos;
     if (string_detail::SameChars(hit, s.m_begin, s.length())) {
       return static_cast<size_type>(hit - m_begin);
     }

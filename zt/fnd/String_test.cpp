@@ -413,7 +413,7 @@ int OperationsWithoutMemory() {
   String s(L"abc");
   vlt::test::LimitMemoryTo(8u << 20);
   // Earlier tests of the process may have left room in the heap, beyond what the limit is about.
-  while (DLLMallocNoThrow(4u << 20) != nullptr) {
+  while (DLLMallocNoThrow(4u << 20)) {
   }
   int step = 0;
   const auto fails = [&](auto operation) {

@@ -11,7 +11,7 @@ namespace {
 
 const unsigned char* OrEmpty(const unsigned char* s) {
   static const unsigned char s_empty[1] = {0};
-  return s == nullptr ? s_empty : s;
+  return s ? s : s_empty;
 }
 
 const unsigned char* EndOf(const unsigned char* s) {

@@ -75,7 +75,7 @@ inline const unsigned char* DecodeOne(const unsigned char* s, const unsigned cha
 }
 
 bool IsEmpty(const unsigned char* begin, const unsigned char* end) {
-  return begin == nullptr || begin >= end;
+  return !begin || begin >= end;
 }
 
 }  // namespace
@@ -91,7 +91,7 @@ std::uint32_t GetUtf8StringLength(const unsigned char* begin, const unsigned cha
 
 std::uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* end,
                                    wchar_t* dest, wchar_t* destEnd) {
-  if (dest == nullptr || dest > destEnd) ZT_RAISE(exception::InvalidArgument());
+  if (!dest || dest > destEnd) ZT_RAISE(exception::InvalidArgument());
   if (IsEmpty(begin, end)) return 0;
   const unsigned char* s = begin;
   wchar_t* out = dest;
@@ -113,7 +113,7 @@ std::uint32_t Utf8ToWide(const unsigned char* begin, const unsigned char* end, w
 }
 
 wchar_t* Utf8ToWide(const unsigned char* s, std::uint32_t n) {
-  const unsigned char* const end = s == nullptr ? s : s + n;
+  const unsigned char* const end = s ? s + n : s;
   const std::uint64_t size = static_cast<std::uint64_t>(GetUtf8StringLength(s, end)) + 1;
   if (size * sizeof(wchar_t) > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
   std::unique_ptr<wchar_t[]> text(new wchar_t[static_cast<std::size_t>(size)]);

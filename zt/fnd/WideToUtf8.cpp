@@ -8,9 +8,9 @@
 namespace zt::fnd {
 namespace {
 
-bool IsEmpty(const wchar_t* begin, const wchar_t* end) { return begin == nullptr || begin >= end; }
+bool IsEmpty(const wchar_t* begin, const wchar_t* end) { return !begin || begin >= end; }
 
-const wchar_t* EndOf(const wchar_t* s) { return s == nullptr ? s : s + std::wcslen(s); }
+const wchar_t* EndOf(const wchar_t* s) { return s ? s + std::wcslen(s) : s; }
 
 // Whether wchar_t is signed differs between processors; the bits decide.
 std::uint32_t ValueOf(wchar_t c) { return static_cast<std::uint32_t>(c); }
@@ -68,7 +68,7 @@ std::uint32_t GetUtf8EncodingBytesWithBufferLimit(const wchar_t* begin, const wc
 
 std::uint32_t WideToUtf8NoOverflow(const wchar_t*& begin, const wchar_t* end, unsigned char* dest,
                                    unsigned char* destEnd) {
-  if (dest == nullptr || dest > destEnd) ZT_RAISE(exception::InvalidArgument());
+  if (!dest || dest > destEnd) ZT_RAISE(exception::InvalidArgument());
   if (IsEmpty(begin, end)) return 0;
   const wchar_t* s = begin;
   unsigned char* out = dest;

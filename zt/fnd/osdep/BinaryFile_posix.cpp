@@ -122,7 +122,7 @@ long BinaryFile::write(const void* bytes, unsigned long n) {
 
 long BinaryFile::read(AutoBuffer& buffer, unsigned int n) const {
   unsigned char* room = MakeRoom(buffer, n);
-  if (room == nullptr && n > 0) return -1;
+  if (!room && n > 0) return -1;
   long got = read(room, n);
   int failure = errno;
   buffer.UnAppend(got < 0 ? n : n - static_cast<unsigned int>(got));
@@ -136,7 +136,7 @@ int BinaryFile::readExactSize(AutoBuffer& buffer, unsigned int n) const {
     return -1;
   }
   unsigned char* room = MakeRoom(buffer, n);
-  if (room == nullptr && n > 0) return -1;
+  if (!room && n > 0) return -1;
   int got = readExactSize(room, n);
   int failure = errno;
   if (got < 0) buffer.UnAppend(n);

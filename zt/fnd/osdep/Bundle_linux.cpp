@@ -67,7 +67,7 @@ void* Bundle::getFunctionPointer(const String& name, bool noThrow) const {
     ZT_RAISE(exception::InvalidOperation());
   }
   void* function = FindFunction(m_bundle->handle, AnsiString(name));
-  if (function == nullptr && !noThrow) RaiseLoaderError();
+  if (!function && !noThrow) RaiseLoaderError();
   return function;
 }
 

@@ -39,7 +39,7 @@ void InParent() RELEASE(s_lock) { s_lock.unlock(); }
 
 // Makes system calls only, as other threads may have been anywhere at the fork.
 void InChild() RELEASE(s_lock) {
-  for (std::size_t fd = 0; s_marks != nullptr && fd < s_marks->size(); ++fd) {
+  for (std::size_t fd = 0; s_marks && fd < s_marks->size(); ++fd) {
     Mark& mark = (*s_marks)[fd];
     if (!mark.closesInChild) continue;
     if (mark.file.isBehind(static_cast<int>(fd))) ::close(static_cast<int>(fd));
@@ -60,7 +60,7 @@ unsigned ForksSoFar() {
 std::uint64_t MarkIfNoFork(int fd, const FileIdentity& file, unsigned forks) {
   Hold hold(s_lock);
   if (s_forks != forks) return 0;
-  if (s_marks == nullptr) s_marks = new std::vector<Mark>;
+  if (!s_marks) s_marks = new std::vector<Mark>;
   std::size_t index = static_cast<std::size_t>(fd);
   if (s_marks->size() <= index) s_marks->resize(index + 64);
   (*s_marks)[index] = Mark{++s_serial, file, true};
@@ -70,7 +70,7 @@ std::uint64_t MarkIfNoFork(int fd, const FileIdentity& file, unsigned forks) {
 // The mark of this opening; null if another has the number.
 Mark* FindMark(int fd, std::uint64_t serial) noexcept REQUIRES(s_lock) {
   std::size_t index = static_cast<std::size_t>(fd);
-  if (s_marks == nullptr || index >= s_marks->size()) return nullptr;
+  if (!s_marks || index >= s_marks->size()) return nullptr;
   Mark& mark = (*s_marks)[index];
   return mark.serial == serial ? &mark : nullptr;
 }
@@ -115,7 +115,7 @@ int CloseOnForkFd::get() const noexcept {
     if (!m_kept) return -1;
   } else {
     Hold hold(s_lock);
-    if (FindMark(m_fd, m_serial) == nullptr) return -1;
+    if (!FindMark(m_fd, m_serial)) return -1;
   }
   return m_file.isBehind(m_fd) ? m_fd : -1;
 }

@@ -76,7 +76,7 @@ std::tm ToFields(const AbsTime& time, bool round, BreakDown breakDown) {
   const std::time_t seconds = static_cast<std::time_t>(time.toTime_T(round));
   std::tm fields;
   Hold hold(LeakedInstance<SystemTimes>().lock);
-  if (breakDown(&seconds, &fields) == nullptr) ZT_RAISE(exception::OutOfRange());
+  if (!breakDown(&seconds, &fields)) ZT_RAISE(exception::OutOfRange());
   return fields;
 }
 
@@ -119,10 +119,10 @@ String AbsTimeToString(AbsTime time, const wchar_t* dateFormat, const wchar_t* t
                        const wchar_t* timeSuffix, int separator) {
   if (fractionDigits > kMostDigits) ZT_RAISE(exception::InvalidArgument());
   if (time == AbsTime::min) return String();
-  const String datePart = dateFormat == nullptr ? GetSystemDateFormat() : String(dateFormat);
-  String timePart = timeFormat == nullptr ? GetSystemTimeFormat() : String(timeFormat);
+  const String datePart = dateFormat ? String(dateFormat) : GetSystemDateFormat();
+  String timePart = timeFormat ? String(timeFormat) : GetSystemTimeFormat();
   if (!timePart.empty()) {
-    if (timeSuffix != nullptr && *timeSuffix != L'\0') timePart = timePart + L" " + timeSuffix;
+    if (timeSuffix && *timeSuffix != L'\0') timePart = timePart + L" " + timeSuffix;
     if (fractionDigits != 0) {
       timePart = WithFraction(timePart, FractionText(time, fractionDigits, separator));
     }

@@ -45,7 +45,7 @@ ScopedDir OpenDirectory(const String& directory) {
   DIR* dir;
   do {
     dir = ::opendir(narrow.c_str());
-  } while (dir == nullptr && errno == EINTR);
+  } while (!dir && errno == EINTR);
   return ScopedDir(dir, ::closedir);
 }
 
@@ -116,7 +116,7 @@ bool WildcardFit(const wchar_t* pattern, const wchar_t* name) {
     } else if (*pattern != L'\0' && (*pattern == L'?' || SameCharacter(*pattern, *name))) {
       ++pattern;
       ++name;
-    } else if (star != nullptr) {
+    } else if (star) {
       pattern = star;
       name = ++resume;
     } else {

@@ -42,7 +42,7 @@ class ForkSafeMutex::Registry {
     pthread_once(&s_once, Register);
     Hold hold(s_lock);
     ForkSafeMutex** place = &s_first;
-    while (*place != nullptr && (*place)->m_rank <= mutex.m_rank) place = &(*place)->m_next;
+    while (*place && (*place)->m_rank <= mutex.m_rank) place = &(*place)->m_next;
     mutex.m_next = *place;
     *place = &mutex;
   }
@@ -68,7 +68,7 @@ class ForkSafeMutex::Registry {
     s_lock.lock();
     const std::int64_t end = Now() + kPatience;
     ForkSafeMutex* missed = TakeAll(nullptr, end);
-    while (missed != nullptr && Now() < end) {
+    while (missed && Now() < end) {
       GiveBack();
       missed = TakeAll(missed, end);
     }
@@ -79,11 +79,11 @@ class ForkSafeMutex::Registry {
   // Returns the first that was missed; once the end has come all that are free are taken.
   static ForkSafeMutex* TakeAll(ForkSafeMutex* first, std::int64_t end) REQUIRES(s_lock) {
     ForkSafeMutex* missed = nullptr;
-    if (first != nullptr && !Take(*first, end)) missed = first;
-    for (ForkSafeMutex* m = s_first; m != nullptr; m = m->m_next) {
+    if (first && !Take(*first, end)) missed = first;
+    for (ForkSafeMutex* m = s_first; m; m = m->m_next) {
       if (m == first || m->m_atFork != AtFork::Wait || m->mine()) continue;
       if (Take(*m, std::min(Now() + kTurn, end))) continue;
-      if (missed == nullptr) missed = m;
+      if (!missed) missed = m;
       if (Now() < end) break;
     }
     return missed;
@@ -94,7 +94,7 @@ class ForkSafeMutex::Registry {
   }
 
   static void GiveBack() REQUIRES(s_lock) {
-    for (ForkSafeMutex* m = s_first; m != nullptr; m = m->m_next) {
+    for (ForkSafeMutex* m = s_first; m; m = m->m_next) {
       if (std::exchange(m->m_takenByFork, false)) pthread_mutex_unlock(&m->m_mutex);
     }
   }
@@ -105,7 +105,7 @@ class ForkSafeMutex::Registry {
   }
 
   static void InChild() RELEASE(s_lock) {
-    for (ForkSafeMutex* m = s_first; m != nullptr; m = m->m_next) m->renew();
+    for (ForkSafeMutex* m = s_first; m; m = m->m_next) m->renew();
     s_lock.unlock();
   }
 

@@ -85,7 +85,7 @@ TEST_F(ForkThreads, ModulesAreLoadedInChildren) {
   vlt::test::MakeModule(file);
   storm([&] {
     void* module = LoadModule(String(file.c_str()));
-    bool found = module != nullptr && FindFunction(module, AnsiString("cos")) != nullptr;
+    bool found = module && FindFunction(module, AnsiString("cos")) != nullptr;
     UnloadModule(module);
     return found;
   });

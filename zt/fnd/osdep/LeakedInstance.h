@@ -15,7 +15,7 @@ template <class T>
 T& LeakedInstance() {
   static constinit std::atomic<T*> s_instance{nullptr};
   T* present = s_instance.load(std::memory_order_acquire);
-  if (present != nullptr) return *present;
+  if (present) return *present;
   T* fresh = new T;
   if (s_instance.compare_exchange_strong(present, fresh, std::memory_order_acq_rel)) return *fresh;
   delete fresh;

@@ -39,7 +39,7 @@ void* LoadModule(const String& name) {
 }
 
 void UnloadModule(void* module) {
-  if (module == nullptr) return;
+  if (!module) return;
   Hold hold(LoadingLock());
   ::dlclose(module);
 }
@@ -51,7 +51,7 @@ void* FindFunction(void* module, const AnsiString& name) {
 
 void RaiseLoaderError() {
   const char* text = ::dlerror();
-  ZT_RAISE(PosixError(text == nullptr ? "" : text, -1));
+  ZT_RAISE(PosixError(text ? text : "", -1));
 }
 
 bool NeedsDecoration(const String& name) { return path::BaseName(name).find(L'.') == String::npos; }

@@ -22,7 +22,7 @@ bool Same(const char* a, const char* b) { return std::strcmp(a, b) == 0; }
 
 // The name that iconv gets.
 const char* EncodingOf(const char* locale) {
-  return locale == nullptr || Same(locale, "carbon") ? "" : locale;
+  return !locale || Same(locale, "carbon") ? "" : locale;
 }
 
 // The encodings that need no iconv, which is slow to open and has locks of its own.
@@ -125,7 +125,7 @@ char* ConvertUtf8(const wchar_t* begin, const wchar_t* end, char* dest, char* de
 template <class In, class Out>
 std::uint32_t Convert(const In* begin, const In* end, const char* encoding, Out* dest,
                       Out*& destEnd, const char* fromCode, const char* toCode) {
-  if (begin == nullptr) end = begin;
+  if (!begin) end = begin;
   switch (const ByHand byHand = ByHandOf(encoding)) {
     case ByHand::Ascii:
     case ByHand::LocaleAscii:
@@ -142,7 +142,7 @@ std::uint32_t Convert(const In* begin, const In* end, const char* encoding, Out*
 
 template <class In>
 std::uint32_t CountOf(const In* begin, const In* end) {
-  return begin == nullptr ? 0 : NumericCast<std::uint32_t>(end - begin);
+  return begin ? NumericCast<std::uint32_t>(end - begin) : 0;
 }
 
 // Room for `required` characters and the terminator.
@@ -153,7 +153,7 @@ std::unique_ptr<Out[]> NewText(std::uint32_t required) {
   return std::unique_ptr<Out[]>(new Out[count]);
 }
 
-const wchar_t* EndOf(const wchar_t* s) { return s == nullptr ? s : s + std::wcslen(s); }
+const wchar_t* EndOf(const wchar_t* s) { return s ? s + std::wcslen(s) : s; }
 
 }  // namespace
 

@@ -22,7 +22,7 @@ std::string PosixText(int errnum) {
   return ErrorText(strerror_r(errnum, buffer, sizeof buffer), buffer);
 }
 
-std::string TextOf(const char* text) { return text == nullptr ? std::string() : text; }
+std::string TextOf(const char* text) { return text ? text : std::string(); }
 
 std::uint32_t SmallCode(std::uint32_t code, std::uint32_t notFound) noexcept {
   if (code == 0) return kNoError;

@@ -37,7 +37,7 @@ class ProcessStatics {
     RefPtr<Statics> fresh(new Statics);
     Hold hold(s_lock);
     DropInherited();
-    if (s_statics == nullptr) s_statics = RefPtr<Statics>(fresh).detach();
+    if (!s_statics) s_statics = RefPtr<Statics>(fresh).detach();
     return RefPtr<Statics>(s_statics);
   }
 
@@ -50,7 +50,7 @@ class ProcessStatics {
 
  private:
   static void DropInherited() REQUIRES(s_lock) {
-    if (s_statics == nullptr || s_statics->process.isCurrent()) return;
+    if (!s_statics || s_statics->process.isCurrent()) return;
     s_statics->inherited = std::exchange(s_inherited, s_statics);
     s_statics = nullptr;
   }
@@ -62,7 +62,7 @@ class ProcessStatics {
       DropInherited();
       last = std::exchange(s_statics, nullptr);
     }
-    if (last != nullptr) last->release();
+    if (last) last->release();
   }
 
   static void LockForFork() ACQUIRE(s_lock) { s_lock.lock(); }

@@ -57,7 +57,7 @@ SharedLibrary& SharedLibrary::operator=(const SharedLibrary& other) {
 }
 
 SharedLibrary::~SharedLibrary() {
-  if (!m_unloadOnDestroy && m_isBundle && m_handle != nullptr) {
+  if (!m_unloadOnDestroy && m_isBundle && m_handle) {
     static_cast<Bundle*>(m_handle)->keepLoaded();
     m_unloadOnDestroy = true;  // of the Bundle only its own memory is left to free
   }
@@ -112,7 +112,7 @@ void SharedLibrary::swap(SharedLibrary& other) noexcept {
 }
 
 bool SharedLibrary::isLoaded() const {
-  if (m_handle == nullptr) return false;
+  if (!m_handle) return false;
   return !m_isBundle || static_cast<const Bundle*>(m_handle)->isOpened();
 }
 
@@ -124,7 +124,7 @@ void* SharedLibrary::getFunctionPointer(const AnsiString& name, bool noThrow) co
     }
     function = FindFunction(m_handle, name);
   }
-  if (function == nullptr && !noThrow) RaiseLoaderError();
+  if (!function && !noThrow) RaiseLoaderError();
   return function;
 }
 

@@ -85,7 +85,7 @@ ScopedFd OpenSharedPatiently(const AnsiString& path, InTheWay way) {
 String GetSharedUnixBase() {
   // Not from the environment of somebody who runs a program with more rights than his own.
   const char* base = ::secure_getenv(kBaseVariable);
-  return base != nullptr && base[0] == '/' ? String(base) : String(kDefaultBase);
+  return base && base[0] == '/' ? String(base) : String(kDefaultBase);
 }
 
 AnsiString BuildSharedUnixFilePath(const String& dirName, const String& fileName) {

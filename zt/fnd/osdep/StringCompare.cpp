@@ -12,8 +12,8 @@
 namespace zt::fnd::osdep {
 namespace {
 
-const char* OrEmpty(const char* s) { return s == nullptr ? "" : s; }
-const wchar_t* OrEmpty(const wchar_t* s) { return s == nullptr ? L"" : s; }
+const char* OrEmpty(const char* s) { return s ? s : ""; }
+const wchar_t* OrEmpty(const wchar_t* s) { return s ? s : L""; }
 
 int Upper(char c) { return std::toupper(static_cast<unsigned char>(c)); }
 wchar_t Upper(wchar_t c) {

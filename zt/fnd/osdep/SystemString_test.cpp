@@ -71,7 +71,7 @@ namespace {
 
 int AllocateWithoutMemory() {
   vlt::test::LimitMemoryTo(4u << 20);
-  return SystemAllocStringLen(nullptr, 16u << 20) == nullptr ? 0 : 1;
+  return SystemAllocStringLen(nullptr, 16u << 20) ? 1 : 0;
 }
 
 }  // namespace

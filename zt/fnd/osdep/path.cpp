@@ -73,7 +73,7 @@ bool KeepComponents(const String& text, std::vector<Component>& kept) {
 
 }  // namespace
 
-bool path::IsPathAbsolute(const wchar_t* path) { return path != nullptr && path[0] == L'/'; }
+bool path::IsPathAbsolute(const wchar_t* path) { return path && path[0] == L'/'; }
 
 bool path::IsAbs(const String& path) { return IsPathAbsolute(path.c_str()); }
 

@@ -108,7 +108,7 @@ String path::AbsPath(const String& path) {
 
 String path::TempDirName() {
   const char* dir = ::secure_getenv("TMPDIR");
-  return dir == nullptr ? String(L"/var/tmp/") : String(dir);
+  return dir ? String(dir) : String(L"/var/tmp/");
 }
 
 String path::TempFileName(const String& prefix, const String& dir) {

@@ -24,7 +24,7 @@ void WaitFor(const zt::fnd::osdep::PumpEvent& event, int timeoutMs, bool pumpMsg
 // ---- CztEvent
 
 CztEvent::CztEvent(const char* name, bool initialState, bool manualReset)
-    : m_event(manualReset, initialState, true), m_name(name != nullptr ? name : "") {}
+    : m_event(manualReset, initialState, true), m_name(name ? name : "") {}
 
 CztEvent::CztEvent(bool pumpMsgs, const char* name, bool initialState, bool manualReset)
     : CztEvent(name, initialState, manualReset) {
@@ -44,10 +44,7 @@ bool CztEvent::Unlock() {
 // ---- CztSemaphore
 
 CztSemaphore::CztSemaphore(const wchar_t* name, int maximum, int initial)
-    : m_count(initial),
-      m_maximum(maximum),
-      m_event(true, false, true),
-      m_name(name != nullptr ? name : L"") {}
+    : m_count(initial), m_maximum(maximum), m_event(true, false, true), m_name(name ? name : L"") {}
 
 bool CztSemaphore::Lock(int timeoutMs) {
   // A wait of no time would come back at once, again and again, until there is a unit.

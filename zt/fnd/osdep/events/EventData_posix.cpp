@@ -78,7 +78,7 @@ class EventData::Undo {
  public:
   Undo(EventData& event, EventFile& file) : m_event(&event), m_file(file) {}
   ~Undo() {
-    if (m_event == nullptr || !m_event->m_set) return;
+    if (!m_event || !m_event->m_set) return;
     m_event->m_set->giveBack(m_event->m_slot, m_file.key());
     m_event->m_set = nullptr;
     m_file.discardAtClose(true);

@@ -139,7 +139,7 @@ bool SemaphoreSet::updateFreeRecords(int delta, unsigned newFirst, unsigned& old
   constexpr std::size_t kBase = SetHeader::kFreeOffset;
   StateFileBytes span;
   std::size_t size = SetHeader::kSize - kBase;
-  if (record != nullptr) {
+  if (record) {
     if (slot >= kSlotsPerSet) return false;
     size = static_cast<std::size_t>(SlotRecord::Offset(slot + 1)) - kBase;
   }
@@ -150,7 +150,7 @@ bool SemaphoreSet::updateFreeRecords(int delta, unsigned newFirst, unsigned& old
   std::memcpy(&span[0], &freeCount, sizeof freeCount);
   std::memcpy(&oldFirst, &span[4], sizeof oldFirst);
   std::memcpy(&span[4], &newFirst, sizeof newFirst);
-  if (record != nullptr) {
+  if (record) {
     const SlotRecord::Bytes bytes = record->encode();
     std::memcpy(&span[size - bytes.size()], bytes.data(), bytes.size());
   }
