@@ -2,6 +2,6 @@
 
 namespace ztini {
 
-ReallocFunction g_realloc = std::realloc;
+ReallocFunction g_realloc = realloc;
 
 }  // namespace ztini

@@ -21,7 +21,7 @@ inline void* Allocate(size_t size) { return g_realloc(nullptr, size ? size : 1);
 inline void* Reallocate(void* block, size_t size) { return g_realloc(block, size ? size : 1); }
 
 struct FreeBlock {
-  void operator()(void* block) const { std::free(block); }
+  void operator()(void* block) const { free(block); }
 };
 using OwnedText = std::unique_ptr<char, FreeBlock>;
 
@@ -36,7 +36,7 @@ template <class T>
 void Delete(T* object) {
   if (!object) return;
   object->~T();
-  std::free(object);
+  free(object);
 }
 
 }  // namespace ztini

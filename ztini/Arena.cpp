@@ -65,7 +65,7 @@ void Arena::clear() {
   while (m_blocks) {
     Block* block = m_blocks;
     m_blocks = block->next;
-    std::free(block);
+    free(block);
   }
   m_front = m_back = nullptr;
   m_nextBlockBytes = kFirstBlockBytes;

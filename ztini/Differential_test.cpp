@@ -197,7 +197,7 @@ void Play::values() {
   char* copy = nullptr;
   status = IniGetStringCopy(m_doc.get(), section.c_str(), item.c_str(), &copy);
   see(status, copy);
-  std::free(copy);
+  free(copy);
   char buffer[8];
   status = IniGetRawStringIntoBuffer(m_doc.get(), section.c_str(), item.c_str(), buffer, 8);
   see(status, buffer);

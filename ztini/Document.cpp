@@ -137,8 +137,8 @@ void IniDisposeSection(IniSection* section) {
 
 void IniDisposeEntry(IniEntry* entry) {
   if (!entry) return;
-  if (!entry->nameInArena) std::free(entry->name);
-  if (!entry->valueInArena) std::free(entry->value);
+  if (!entry->nameInArena) free(entry->name);
+  if (!entry->valueInArena) free(entry->value);
   if (!entry->recordInArena) ztini::Delete(entry);
 }
 
@@ -153,7 +153,7 @@ void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions) {
 }
 
 void IniReplaceValue(IniEntry* entry, char* value) {
-  if (!entry->valueInArena) std::free(entry->value);
+  if (!entry->valueInArena) free(entry->value);
   entry->value = value;
   entry->knownValueLength = IniKnownLength(strlen(value));
   entry->valueInArena = 0;

@@ -22,7 +22,7 @@ char EscapeLetter(char c) {
     case '\\':
       return c;
     default:
-      return std::iscntrl(static_cast<unsigned char>(c)) ? 'x' : 0;
+      return iscntrl(static_cast<unsigned char>(c)) ? 'x' : 0;
   }
 }
 

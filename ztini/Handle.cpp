@@ -19,7 +19,7 @@ ztini_Handle ztini_PI_NewHandle(size_t size) {
 
 void ztini_PI_DisposeHandle(ztini_Handle handle) {
   if (!handle) return;
-  std::free(handle->data);
+  free(handle->data);
   ztini::Delete(handle);
 }
 

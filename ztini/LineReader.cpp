@@ -55,7 +55,7 @@ LineFile* LineFileNew(FILE* file) {
   return state;
 }
 
-void LineFileDispose(LineFile* state) { std::free(state); }
+void LineFileDispose(LineFile* state) { free(state); }
 
 int32_t LineFileReadFromFile(LineFile* state) {
   const size_t bytes = ztini::ReadBytes(state->buffer, sizeof state->buffer, state->file);

@@ -81,7 +81,7 @@ void ztini_ListDispose(ztini_List list) {
 
 void ztini_ListClear(ztini_List list) {
   if (!list) return;
-  if (list->capacity) std::free(list->block);
+  if (list->capacity) free(list->block);
   list->block = nullptr;
   list->capacity = list->first = list->count = 0;
 }

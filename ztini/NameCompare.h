@@ -10,7 +10,7 @@ struct LocaleFold {
   static unsigned char upper(char c) {
     return static_cast<unsigned char>(std::toupper(static_cast<unsigned char>(c)));
   }
-  static bool isSpace(char c) { return std::isspace(static_cast<unsigned char>(c)) != 0; }
+  static bool isSpace(char c) { return isspace(static_cast<unsigned char>(c)) != 0; }
 };
 
 template <class Fold>

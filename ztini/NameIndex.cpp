@@ -32,8 +32,8 @@ uint32_t NodesInOrder::placeOf(uint32_t sequence) const {
 }
 
 void NameIndex::clear() {
-  std::free(m_slots);
-  std::free(m_twins);
+  free(m_slots);
+  free(m_twins);
   m_slots = nullptr;
   m_twins = nullptr;
   m_mask = m_used = 0;
@@ -74,7 +74,7 @@ bool NameIndex::grow() {
     while (m_slots[at].head != kNoSequence) at = (at + 1) & m_mask;
     m_slots[at] = old[i];
   }
-  std::free(old);
+  free(old);
   return true;
 }
 

@@ -146,7 +146,7 @@ void NameList::keepFirst(int32_t count) {
 }
 
 void ReplaceName(NameNode* node, char* name) {
-  if (!node->nameInArena) std::free(node->name);
+  if (!node->nameInArena) free(node->name);
   node->name = name;
   node->nameInArena = 0;
 }

@@ -123,7 +123,7 @@ TEST_F(NameListTest, AnIndexThatCannotGrowIsReplacedByAScan) {
   }
   EXPECT_EQ(find("e0"), &extra[0]);
   EXPECT_EQ(find("n29"), list.at(30));
-  for (NameNode& node : extra) std::free(node.name);
+  for (NameNode& node : extra) free(node.name);
 }
 
 TEST_F(NameListTest, CompactionForgetsTheIndex) {

@@ -312,7 +312,7 @@ class FailIndexTables {
     s_refused = 0;
     ztini::g_realloc = [](void* block, size_t size) -> void* {
       const bool isTable = !block && size >= 128 && size != 256 && (size & (size - 1)) == 0;
-      if (!isTable) return std::realloc(block, size);
+      if (!isTable) return realloc(block, size);
       ++s_refused;
       return nullptr;
     };

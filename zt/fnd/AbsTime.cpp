@@ -11,16 +11,16 @@ namespace {
 
 using Value = tSSTimeValue::tValue;
 
-constexpr std::uint64_t kHalf = std::uint64_t(1) << 63;
+constexpr uint64_t kHalf = uint64_t(1) << 63;
 constexpr double kTwo64 = 18446744073709551616.0;
 
-void SetStatus(std::int32_t* status, std::int32_t error) {
+void SetStatus(int32_t* status, int32_t error) {
   if (status && *status == tSSTimeValue::kNoError) *status = error;
 }
 
 struct UnitFactor {
   tTimeUnit unit;
-  std::int64_t factor;
+  int64_t factor;
   bool perSecond;  // so many to the second; otherwise so many seconds
 };
 
@@ -39,7 +39,7 @@ constexpr UnitFactor kUnitFactors[] = {
 
 // Whether the magnitude, truncated, goes up by one.
 bool RoundsAway(tSSTimeValue::tRoundMethod method, const Value& magnitude, bool negative) {
-  const std::uint64_t fraction = magnitude.fractionBits();
+  const uint64_t fraction = magnitude.fractionBits();
   switch (method) {
     case tSSTimeValue::kRoundNearest:
       return fraction > kHalf || (fraction == kHalf && magnitude.IsOdd());
@@ -55,7 +55,7 @@ bool RoundsAway(tSSTimeValue::tRoundMethod method, const Value& magnitude, bool 
 }  // namespace
 
 void tSSTimeValue::_CorrectUnits(tUnitConversion conversion, tTimeUnit unit, tValue& value,
-                                 std::int32_t* status) {
+                                 int32_t* status) {
   if (unit == nZTSS100::kTimeUnitSecond) return;
   const UnitFactor* const end = std::end(kUnitFactors);
   const UnitFactor* const row = std::find_if(std::begin(kUnitFactors), end,
@@ -74,7 +74,7 @@ void tSSTimeValue::_CorrectUnits(tUnitConversion conversion, tTimeUnit unit, tVa
 // Works on the magnitude: the bits before the point of a negative number are its floor, not its
 // integer part.
 void tSSTimeValue::_RoundAndCheckFit(tRoundMethod method, const tValue& maximum,
-                                     const tValue& minimum, tValue& value, std::int32_t* status) {
+                                     const tValue& minimum, tValue& value, int32_t* status) {
   const bool negative = value.IsNegative();
   if (negative) value.Negate();
   const bool away = RoundsAway(method, value, negative);
@@ -94,19 +94,18 @@ constexpr Value kLeast(0x80000000, 0, 0, 0);
 // Seconds from 1904 in which 64 bits of ticks surely end, on either side, and well before 65 would.
 constexpr Value kTicksEnd(1000000000000LL);
 
-std::int64_t Limit(bool negative) {
-  return negative ? std::numeric_limits<std::int64_t>::min()
-                  : std::numeric_limits<std::int64_t>::max();
+int64_t Limit(bool negative) {
+  return negative ? std::numeric_limits<int64_t>::min() : std::numeric_limits<int64_t>::max();
 }
 
 // Seconds since 1904 to a count of units since an epoch that lies `offset` seconds before 1904.
 // A step that leaves the range ends at the limit on the side where it left.
-std::int64_t CountSince(Value value, std::int64_t offset, tTimeUnit unit, bool round) {
+int64_t CountSince(Value value, int64_t offset, tTimeUnit unit, bool round) {
   const bool wasNegative = value.IsNegative();
   value += Value(static_cast<long long>(offset));
   if (wasNegative == (offset < 0) && value.IsNegative() != wasNegative) return Limit(wasNegative);
   const bool negative = value.IsNegative();
-  std::int32_t status = tSSTimeValue::kNoError;
+  int32_t status = tSSTimeValue::kNoError;
   tSSTimeValue::_CorrectUnits(tSSTimeValue::kFromSeconds, unit, value, &status);
   const auto method = round ? tSSTimeValue::kRoundNearest : tSSTimeValue::kRoundTowardZero;
   tSSTimeValue::_RoundAndCheckFit(method, kMost, kLeast, value, &status);
@@ -123,12 +122,12 @@ double FractionOf(const Value& value) { return static_cast<double>(value.fractio
 
 }  // namespace
 
-std::int64_t AbsTime::getSeconds() const noexcept {
+int64_t AbsTime::getSeconds() const noexcept {
   const bool negative = m_value.IsNegative();
   const Value magnitude = negative ? -m_value : m_value;
   Value whole = m_value;
   tSSTimeValue::_RoundAndCheckFit(tSSTimeValue::kRoundTowardZero, kMost, kLeast, whole, nullptr);
-  const std::int64_t seconds = whole.integerPart();
+  const int64_t seconds = whole.integerPart();
   if (!ShowsAsOne(FractionOf(magnitude)) || seconds == Limit(negative)) return seconds;
   return negative ? seconds - 1 : seconds + 1;
 }
@@ -138,11 +137,11 @@ double AbsTime::getFraction() const noexcept {
   return ShowsAsOne(fraction) ? 0.0 : fraction;
 }
 
-std::int64_t AbsTime::toTime_T(bool round) const noexcept {
+int64_t AbsTime::toTime_T(bool round) const noexcept {
   return CountSince(m_value, -kUnixEpoch, nZTSS100::kTimeUnitSecond, round);
 }
 
-std::int64_t AbsTime::toLKTIME(bool round) const noexcept {
+int64_t AbsTime::toLKTIME(bool round) const noexcept {
   // The change of its sign tells a product that is too large, but only up to twice the range.
   const bool negative = m_value.IsNegative();
   if (negative ? m_value < -kTicksEnd : m_value > kTicksEnd) return Limit(negative);

@@ -8,7 +8,7 @@
 namespace nZTSS100 {
 
 // Units of time, by the codes that stand for them in stored data.
-enum tTimeUnit : std::uint32_t {
+enum tTimeUnit : uint32_t {
   kTimeUnitAtto = 0x36CAD7B7,   // 10^18 a second
   kTimeUnitFemto = 0x36CAD7BA,  // 10^15
   kTimeUnitPico = 0x36CAD7BD,   // 10^12
@@ -29,26 +29,26 @@ enum tTimeUnit : std::uint32_t {
 struct tSSTimeValue {
   using tValue = nZTSS100::tFixedPoint128<64, true>;
 
-  enum tUnitConversion : std::int32_t { kToSeconds = 1, kFromSeconds = 2 };
-  enum tRoundMethod : std::int32_t {
+  enum tUnitConversion : int32_t { kToSeconds = 1, kFromSeconds = 2 };
+  enum tRoundMethod : int32_t {
     kRoundNearest = 1,  // a tie goes to the even value
     kRoundTowardZero = 2,
     kRoundUp = 3,
     kRoundDown = 4,
   };
 
-  static constexpr std::int32_t kNoError = 0;
-  static constexpr std::int32_t kInvalidUnit = -50003;
-  static constexpr std::int32_t kDoesNotFit = -50175;
+  static constexpr int32_t kNoError = 0;
+  static constexpr int32_t kInvalidUnit = -50003;
+  static constexpr int32_t kDoesNotFit = -50175;
 
   // Multiplies or divides by the unit's factor. An unknown unit leaves the value: kInvalidUnit. A
   // multiplication that changes the sign: kDoesNotFit.
   static void _CorrectUnits(tUnitConversion conversion, nZTSS100::tTimeUnit unit, tValue& value,
-                            std::int32_t* status);
+                            int32_t* status);
 
   // Rounds to an integer. A result outside minimum to maximum stays as it is: kDoesNotFit.
   static void _RoundAndCheckFit(tRoundMethod method, const tValue& maximum, const tValue& minimum,
-                                tValue& value, std::int32_t* status);
+                                tValue& value, int32_t* status);
 };
 
 namespace zt::fnd {
@@ -65,8 +65,8 @@ class AbsTime {
   static const AbsTime min;
 
   // Seconds from 1904 to the Unix epoch, and from 1601, where LKTIME starts, to 1904.
-  static constexpr std::int64_t kUnixEpoch = 2082844800;
-  static constexpr std::int64_t kLktimeEpoch = 9561628800;
+  static constexpr int64_t kUnixEpoch = 2082844800;
+  static constexpr int64_t kLktimeEpoch = 9561628800;
 
   constexpr AbsTime() noexcept = default;  // 1904
   constexpr explicit AbsTime(const Value& value) noexcept : m_value(value) {}
@@ -76,7 +76,7 @@ class AbsTime {
 
   // Whole seconds, truncated toward zero. A fraction that a double shows as 1.0 carries over, away
   // from zero.
-  std::int64_t getSeconds() const noexcept;
+  int64_t getSeconds() const noexcept;
 
   // The bits behind the point, 0 up to 1; 0 where a double shows 1.0. Before 1904 this is the
   // distance from the second below, not from getSeconds().
@@ -85,8 +85,8 @@ class AbsTime {
   // Unix seconds, and ticks of 100 nanoseconds since 1601-01-01. `round` goes to the nearest whole
   // number, a tie to the even one; without it the result is truncated toward zero, counted from the
   // target's own epoch. What does not fit ends at the limit of 64 bits.
-  std::int64_t toTime_T(bool round) const noexcept;
-  std::int64_t toLKTIME(bool round) const noexcept;
+  int64_t toTime_T(bool round) const noexcept;
+  int64_t toLKTIME(bool round) const noexcept;
 
   // Closed ranges: the ends count.
   static bool doRangesIntersect(const AbsTime& aStart, const AbsTime& aEnd, const AbsTime& bStart,

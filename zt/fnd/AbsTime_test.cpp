@@ -12,8 +12,8 @@ using Fixed = V::tValue;
 
 namespace {
 
-constexpr std::int64_t kMost = std::numeric_limits<std::int64_t>::max();
-constexpr std::int64_t kLeast = std::numeric_limits<std::int64_t>::min();
+constexpr int64_t kMost = std::numeric_limits<int64_t>::max();
+constexpr int64_t kLeast = std::numeric_limits<int64_t>::min();
 
 AbsTime Unix(double seconds) { return AbsTime(2082844800.0, seconds); }
 
@@ -21,15 +21,14 @@ const Fixed kWholeMax(0x7FFFFFFF, 0xFFFFFFFF, 0, 0), kWholeMin(0x80000000, 0, 0,
 
 double Rounded(V::tRoundMethod method, double number) {
   Fixed value(number);
-  std::int32_t status = 0;
+  int32_t status = 0;
   V::_RoundAndCheckFit(method, kWholeMax, kWholeMin, value, &status);
   EXPECT_EQ(0, status);
   EXPECT_EQ(0u, value.fractionBits());
   return static_cast<double>(value);
 }
 
-double Corrected(V::tUnitConversion conversion, std::uint32_t unit, double number,
-                 std::int32_t* status) {
+double Corrected(V::tUnitConversion conversion, uint32_t unit, double number, int32_t* status) {
   Fixed value(number);
   V::_CorrectUnits(conversion, static_cast<tTimeUnit>(unit), value, status);
   return static_cast<double>(value);
@@ -54,7 +53,7 @@ TEST(AbsTime, UnixZeroCountsFrom1904) {
 TEST(AbsTime, UnixTimeTruncatesOrRounds) {
   const struct {
     double unixTime;
-    std::int64_t truncated, rounded;
+    int64_t truncated, rounded;
   } table[] = {{1.25, 1, 1},
                {1.75, 1, 2},
                {1.5, 1, 2},
@@ -101,15 +100,14 @@ TEST(AbsTime, FarTimesEndAtTheLimitsOfTicks) {
     for (bool round : {false, true}) {
       EXPECT_EQ(kMost, AbsTime(seconds, 0).toLKTIME(round)) << seconds;
       EXPECT_EQ(kLeast, AbsTime(-seconds, 0).toLKTIME(round)) << seconds;
-      EXPECT_EQ(static_cast<std::int64_t>(seconds) - 2082844800,
-                AbsTime(seconds, 0).toTime_T(round));
+      EXPECT_EQ(static_cast<int64_t>(seconds) - 2082844800, AbsTime(seconds, 0).toTime_T(round));
     }
   }
 }
 
 TEST(AbsTime, TicksAroundTheLimit) {
   // The last tick of 64 bits is 922337203685.4775807 seconds away from 1601, which is in 1904:
-  const auto after = [](std::int64_t seconds, int ticks) {
+  const auto after = [](int64_t seconds, int ticks) {
     return AbsTime(Fixed(seconds) + Fixed(ticks) / Fixed(10000000));
   };
   EXPECT_EQ(kMost - 1, after(912775574885, 4775806).toLKTIME(true));
@@ -168,14 +166,14 @@ TEST(AbsTime, RangesCountTheirEnds) {
 
 TEST(AbsTimeValue, UnitsMultiplyOrDivide) {
   const struct {
-    std::uint32_t unit;
+    uint32_t unit;
     double value, inSeconds;
   } table[] = {{0x36CAD7B7, 25e17, 2.5}, {0x36CAD7BA, 25e14, 2.5}, {0x36CAD7BD, 25e11, 2.5},
                {0x36CAD7C0, 25e8, 2.5},  {0x36CAD7C2, 25e6, 2.5},  {0x36CAD7C3, 25e5, 2.5},
                {0x36CAD7C6, 2500, 2.5},  {0x36CAD7C9, 2.5, 2.5},   {0x36CAD7CB, 2.5, 150},
                {0x36CAD7CD, 2.5, 9000},  {0x36CAD7CF, 2.5, 216000}};
   for (const auto& row : table) {
-    std::int32_t status = 0;
+    int32_t status = 0;
     EXPECT_EQ(row.inSeconds, Corrected(V::kToSeconds, row.unit, row.value, &status));
     EXPECT_EQ(row.value, Corrected(V::kFromSeconds, row.unit, row.inSeconds, &status));
     EXPECT_EQ(-row.inSeconds, Corrected(V::kToSeconds, row.unit, -row.value, &status));
@@ -230,16 +228,16 @@ TEST(AbsTimeValue, RoundsByTable) {
 TEST(AbsTimeValue, ResultsOutsideTheBoundsDoNotFit) {
   const struct {
     double value;
-    std::int32_t status;
+    int32_t status;
   } table[] = {{10, 0}, {10.25, 0}, {10.75, -50175}, {11, -50175}, {-5, 0}, {-5.75, -50175}};
   for (const auto& row : table) {
     Fixed value(row.value);
-    std::int32_t status = 0;
+    int32_t status = 0;
     V::_RoundAndCheckFit(V::kRoundNearest, Fixed(10), Fixed(-5), value, &status);
     EXPECT_EQ(row.status, status) << row.value;
   }
   Fixed value(0x7FFFFFFF, 0xFFFFFFFF, 0x80000000, 0);
-  std::int32_t status = 0;
+  int32_t status = 0;
   V::_RoundAndCheckFit(V::kRoundNearest, kWholeMax, kWholeMin, value, &status);
   EXPECT_EQ(-50175, status) << "rounding passes the largest number";
 }

@@ -13,27 +13,27 @@
 namespace zt::fnd {
 namespace {
 
-constexpr std::uint32_t kSmallestGrowth = 128;
+constexpr uint32_t kSmallestGrowth = 128;
 
-using Size = SafeInteger<std::uint32_t>;
+using Size = SafeInteger<uint32_t>;
 
 // memcpy that takes null for no bytes.
-void CopyBytes(unsigned char* dest, const unsigned char* src, std::size_t n) {
-  if (n > 0) std::memmove(dest, src, n);
+void CopyBytes(unsigned char* dest, const unsigned char* src, size_t n) {
+  if (n > 0) memmove(dest, src, n);
 }
 
 void FreeGuts(AutoBufferGuts* guts) noexcept {
-  std::free(guts->data);
+  free(guts->data);
   guts->~AutoBufferGuts();
-  std::free(guts);
+  free(guts);
 }
 
-AutoBufferGuts* NewGuts(std::uint32_t capacity) {
-  void* place = std::malloc(sizeof(AutoBufferGuts));
+AutoBufferGuts* NewGuts(uint32_t capacity) {
+  void* place = malloc(sizeof(AutoBufferGuts));
   if (!place) throw std::bad_alloc();
   AutoBufferGuts* guts = new (place) AutoBufferGuts;
   if (capacity == 0) return guts;
-  guts->data = static_cast<unsigned char*>(std::malloc(capacity));
+  guts->data = static_cast<unsigned char*>(malloc(capacity));
   if (!guts->data) {
     FreeGuts(guts);
     throw std::bad_alloc();
@@ -46,7 +46,7 @@ AutoBufferGuts* NewGuts(std::uint32_t capacity) {
 // The clone claims the capacity of its source, so it has to have all of it.
 AutoBufferGuts* CloneGuts(const AutoBufferGuts& source) {
   AutoBufferGuts* guts = NewGuts(source.capacity);
-  std::size_t used = static_cast<std::size_t>(source.end - source.data);
+  size_t used = static_cast<size_t>(source.end - source.data);
   CopyBytes(guts->data, source.data, used);
   if (used > 0) guts->end = guts->data + used;
   return guts;
@@ -56,25 +56,25 @@ void ReleaseGuts(AutoBufferGuts* guts) noexcept {
   if (guts && guts->references.decrement() == 0) FreeGuts(guts);
 }
 
-void ReallocData(AutoBufferGuts* guts, std::uint32_t capacity) {
-  std::size_t used = static_cast<std::size_t>(guts->end - guts->data);
-  void* moved = std::realloc(guts->data, capacity);
+void ReallocData(AutoBufferGuts* guts, uint32_t capacity) {
+  size_t used = static_cast<size_t>(guts->end - guts->data);
+  void* moved = realloc(guts->data, capacity);
   if (!moved) throw std::bad_alloc();
   guts->data = static_cast<unsigned char*>(moved);
   guts->end = guts->data + used;
   guts->capacity = capacity;
 }
 
-std::uint32_t GrownByATenth(std::uint32_t required) {
-  std::uint32_t grown = required + std::max(kSmallestGrowth, required / 10);
+uint32_t GrownByATenth(uint32_t required) {
+  uint32_t grown = required + std::max(kSmallestGrowth, required / 10);
   return grown < required ? required : grown;
 }
 
 }  // namespace
 
 int CompareBuffers(const BufferWrapper& a, const BufferWrapper& b) noexcept {
-  std::size_t common = std::min(a.Len(), b.Len());
-  int order = common > 0 ? std::memcmp(a.Data(), b.Data(), common) : 0;
+  size_t common = std::min(a.Len(), b.Len());
+  int order = common > 0 ? memcmp(a.Data(), b.Data(), common) : 0;
   if (order != 0) return order < 0 ? -1 : 1;
   if (a.Len() == b.Len()) return 0;
   return a.Len() < b.Len() ? -1 : 1;
@@ -122,7 +122,7 @@ void AutoBuffer::makeOwn() {
   }
 }
 
-void AutoBuffer::makeOwnWithRoom(std::uint32_t required, Growth growth) {
+void AutoBuffer::makeOwnWithRoom(uint32_t required, Growth growth) {
   makeOwn();
   if (required <= m_guts->capacity) return;
   ReallocData(m_guts, growth == Growth::Exact ? required : GrownByATenth(required));
@@ -130,7 +130,7 @@ void AutoBuffer::makeOwnWithRoom(std::uint32_t required, Growth growth) {
 
 // Makes room, and returns where the given bytes lie afterwards: the block may have moved, with them
 // inside.
-const unsigned char* AutoBuffer::prepare(const void* bytes, std::uint32_t required) {
+const unsigned char* AutoBuffer::prepare(const void* bytes, uint32_t required) {
   const unsigned char* source = static_cast<const unsigned char*>(bytes);
   const unsigned char* old = Data();
   std::less<const unsigned char*> before;
@@ -172,7 +172,7 @@ void AutoBuffer::Modify(unsigned int offset, const void* bytes, unsigned int n) 
 }
 
 // Takes the bytes as the whole contents; reuses an own block that is large enough.
-void AutoBuffer::replaceWith(const unsigned char* bytes, std::uint32_t n) {
+void AutoBuffer::replaceWith(const unsigned char* bytes, uint32_t n) {
   if (!m_guts || shared() || m_guts->capacity < n) {
     AutoBufferGuts* fresh = NewGuts(n);
     CopyBytes(fresh->data, bytes, n);
@@ -187,18 +187,18 @@ unsigned int AutoBuffer::serializationSize() const { return Size::Add(Len(), 4);
 
 // The bounds checks of wire forms throw unstamped.
 void AutoBuffer::serialize(unsigned char*& cursor, const unsigned char* limit) const {
-  std::ptrdiff_t room = limit - cursor;
-  if (room < 4 || static_cast<std::size_t>(room - 4) < Len()) throw exception::BufferOverflow();
-  little_endian::SerializeRaw<std::uint32_t>(Len(), cursor, limit);
+  ptrdiff_t room = limit - cursor;
+  if (room < 4 || static_cast<size_t>(room - 4) < Len()) throw exception::BufferOverflow();
+  little_endian::SerializeRaw<uint32_t>(Len(), cursor, limit);
   CopyBytes(cursor, Data(), Len());
   cursor += Len();
 }
 
 void AutoBuffer::deserialize(const unsigned char*& cursor, const unsigned char* limit) {
   const unsigned char* body = cursor;
-  std::uint32_t length;
+  uint32_t length;
   little_endian::DeserializeRaw(length, body, limit);
-  if (static_cast<std::size_t>(limit - body) < length) throw exception::DeserializationError();
+  if (static_cast<size_t>(limit - body) < length) throw exception::DeserializationError();
   replaceWith(body, length);
   cursor = body + length;
 }

@@ -21,7 +21,7 @@ class BufferWrapper {
 
  private:
   const unsigned char* m_data;
-  std::uint32_t m_length;
+  uint32_t m_length;
 };
 
 // Byte order of unsigned bytes, a prefix before the longer: -1, 0 or 1.
@@ -31,7 +31,7 @@ int CompareBuffers(const BufferWrapper& a, const BufferWrapper& b) noexcept;
 struct AutoBufferGuts {
   osdep::AtomicInt references{1};
   unsigned char* data = nullptr;
-  std::uint32_t capacity = 0;  // bytes allocated at `data`
+  uint32_t capacity = 0;  // bytes allocated at `data`
   unsigned char* end = nullptr;
 };
 
@@ -96,7 +96,7 @@ class AutoBuffer {
   void circularDeserialize(const unsigned char* ringBegin, const unsigned char* ringEnd,
                            const unsigned char*& cursor);
   // Writes only the 4-byte length, byte by byte. The ring has at least 4 bytes.
-  static void circularSerializeLength(std::uint32_t length, unsigned char* ringBegin,
+  static void circularSerializeLength(uint32_t length, unsigned char* ringBegin,
                                       unsigned char* ringEnd, unsigned char*& cursor);
   // Size of the form at the cursor, length field included. Throws as circularDeserialize does.
   static unsigned int GetCircularDeserializationSize(const unsigned char* ringBegin,
@@ -113,9 +113,9 @@ class AutoBuffer {
 
   bool shared() const { return m_guts && m_guts->references > 1; }
   void makeOwn();
-  void makeOwnWithRoom(std::uint32_t required, Growth growth);
-  const unsigned char* prepare(const void* bytes, std::uint32_t required);
-  void replaceWith(const unsigned char* bytes, std::uint32_t n);
+  void makeOwnWithRoom(uint32_t required, Growth growth);
+  const unsigned char* prepare(const void* bytes, uint32_t required);
+  void replaceWith(const unsigned char* bytes, uint32_t n);
 
   AutoBufferGuts* m_guts;
 };

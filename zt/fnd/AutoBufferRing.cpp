@@ -8,36 +8,36 @@
 namespace zt::fnd {
 namespace {
 
-constexpr std::ptrdiff_t kLengthBytes = 4;
+constexpr ptrdiff_t kLengthBytes = 4;
 
 bool FitsRing(const unsigned char* begin, const unsigned char* end, const unsigned char* cursor) {
   return end - begin >= kLengthBytes && cursor >= begin && cursor <= end;
 }
 
 // True if a form of this length is no larger than the ring, which has at least 4 bytes.
-bool BodyFitsRing(const unsigned char* begin, const unsigned char* end, std::uint32_t length) {
-  return length <= static_cast<std::size_t>(end - begin - kLengthBytes);
+bool BodyFitsRing(const unsigned char* begin, const unsigned char* end, uint32_t length) {
+  return length <= static_cast<size_t>(end - begin - kLengthBytes);
 }
 
 // How many of n bytes lie between the cursor and the end of the ring.
-std::size_t BeforeWrap(const unsigned char* cursor, const unsigned char* end, std::size_t n) {
-  return std::min(n, static_cast<std::size_t>(end - cursor));
+size_t BeforeWrap(const unsigned char* cursor, const unsigned char* end, size_t n) {
+  return std::min(n, static_cast<size_t>(end - cursor));
 }
 
 template <class Byte>
-Byte* Advance(Byte* begin, Byte* end, Byte* cursor, std::size_t n) {
-  std::size_t first = BeforeWrap(cursor, end, n);
+Byte* Advance(Byte* begin, Byte* end, Byte* cursor, size_t n) {
+  size_t first = BeforeWrap(cursor, end, n);
   if (first < n) return begin + (n - first);
   return cursor + first == end ? begin : cursor + first;
 }
 
-std::uint32_t ReadLength(const unsigned char* begin, const unsigned char* end,
-                         const unsigned char*& cursor) {
+uint32_t ReadLength(const unsigned char* begin, const unsigned char* end,
+                    const unsigned char*& cursor) {
   if (!FitsRing(begin, end, cursor)) throw exception::DeserializationError();
   if (cursor == end) cursor = begin;
-  std::uint32_t length = 0;
+  uint32_t length = 0;
   for (int i = 0; i < kLengthBytes; ++i) {
-    length |= static_cast<std::uint32_t>(*cursor) << (8 * i);
+    length |= static_cast<uint32_t>(*cursor) << (8 * i);
     AutoBuffer::circularIncrement(begin, end, cursor);
   }
   if (!BodyFitsRing(begin, end, length)) throw exception::DeserializationError();
@@ -46,7 +46,7 @@ std::uint32_t ReadLength(const unsigned char* begin, const unsigned char* end,
 
 }  // namespace
 
-void AutoBuffer::circularSerializeLength(std::uint32_t length, unsigned char* ringBegin,
+void AutoBuffer::circularSerializeLength(uint32_t length, unsigned char* ringBegin,
                                          unsigned char* ringEnd, unsigned char*& cursor) {
   if (!FitsRing(ringBegin, ringEnd, cursor)) throw exception::BufferOverflow();
   if (cursor == ringEnd) cursor = ringBegin;
@@ -62,17 +62,17 @@ void AutoBuffer::circularSerialize(unsigned char* ringBegin, unsigned char* ring
     throw exception::BufferOverflow();
   }
   circularSerializeLength(Len(), ringBegin, ringEnd, cursor);
-  std::size_t first = BeforeWrap(cursor, ringEnd, Len());
-  if (first > 0) std::memcpy(cursor, Data(), first);
-  if (first < Len()) std::memcpy(ringBegin, Data() + first, Len() - first);
+  size_t first = BeforeWrap(cursor, ringEnd, Len());
+  if (first > 0) memcpy(cursor, Data(), first);
+  if (first < Len()) memcpy(ringBegin, Data() + first, Len() - first);
   cursor = Advance(ringBegin, ringEnd, cursor, Len());
 }
 
 void AutoBuffer::circularDeserialize(const unsigned char* ringBegin, const unsigned char* ringEnd,
                                      const unsigned char*& cursor) {
   const unsigned char* body = cursor;
-  std::uint32_t length = ReadLength(ringBegin, ringEnd, body);
-  std::size_t first = BeforeWrap(body, ringEnd, length);
+  uint32_t length = ReadLength(ringBegin, ringEnd, body);
+  size_t first = BeforeWrap(body, ringEnd, length);
   // Room before the old contents go, so that a failed allocation changes nothing.
   if (shared() || Capacity() < length) *this = AutoBuffer(length);
   Erase();

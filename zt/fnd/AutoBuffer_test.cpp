@@ -167,7 +167,7 @@ TEST(AutoBuffer, ReserveAndSkipAreExact) {
   b.Skip(3);
   EXPECT_EQ(13u, b.Len());
   EXPECT_EQ(13u, b.Capacity());
-  std::memcpy(b.Data() + 10, "abc", 3);
+  memcpy(b.Data() + 10, "abc", 3);
   EXPECT_EQ("0123456789abc", Text(b));
 }
 
@@ -260,7 +260,7 @@ TEST(AutoBuffer, WireFormIsLengthAndBytes) {
   b.serialize(cursor, form + 7);
   EXPECT_EQ(form + 7, cursor);
   const unsigned char expected[] = {3, 0, 0, 0, 'a', 'b', 'c'};
-  EXPECT_EQ(0, std::memcmp(expected, form, 7));
+  EXPECT_EQ(0, memcmp(expected, form, 7));
   AutoBuffer back = Of("something longer");
   const unsigned char* block = back.Data();
   const unsigned char* in = form;
@@ -348,7 +348,7 @@ TEST(AutoBufferRing, HostileLengthsThrow) {
     EXPECT_EQ(ring, in);
   }
   unsigned char all[10];
-  std::memset(all, 0xFF, sizeof all);
+  memset(all, 0xFF, sizeof all);
   const unsigned char* in = all;
   EXPECT_THROW(back.circularDeserialize(all, all + 10, in), exception::DeserializationError);
   EXPECT_THROW(back.circularDeserialize(all, all + 3, in), exception::DeserializationError);
@@ -363,7 +363,7 @@ TEST(AutoBufferRing, LengthAloneAndIncrement) {
   AutoBuffer::circularSerializeLength(0x04030201u, ring, ring + 5, cursor);
   EXPECT_EQ(ring + 2, cursor);
   const unsigned char expected[] = {3, 4, 0, 1, 2};
-  EXPECT_EQ(0, std::memcmp(expected, ring, 5));
+  EXPECT_EQ(0, memcmp(expected, ring, 5));
   AutoBuffer::circularIncrement(ring, ring + 5, cursor);
   EXPECT_EQ(ring + 3, cursor);
   cursor = ring + 4;

@@ -28,9 +28,9 @@ template <class T>
 T ToBigEndian(T value) {
   static_assert(std::is_trivially_copyable_v<T>);
   unsigned char bytes[sizeof(T)];
-  std::memcpy(bytes, &value, sizeof value);
+  memcpy(bytes, &value, sizeof value);
   std::reverse(bytes, bytes + sizeof bytes);
-  std::memcpy(&value, bytes, sizeof value);
+  memcpy(&value, bytes, sizeof value);
   return value;
 }
 template <class T>
@@ -56,8 +56,8 @@ T FromLittleEndian(T value) {
 template <class T>
 void SerializeRaw(const T& value, unsigned char*& cursor, const unsigned char* limit) {
   static_assert(std::is_trivially_copyable_v<T>);
-  if (limit - cursor < static_cast<std::ptrdiff_t>(sizeof(T))) throw exception::BufferOverflow();
-  std::memcpy(cursor, &value, sizeof(T));
+  if (limit - cursor < static_cast<ptrdiff_t>(sizeof(T))) throw exception::BufferOverflow();
+  memcpy(cursor, &value, sizeof(T));
   cursor += sizeof(T);
 }
 
@@ -66,10 +66,10 @@ void SerializeRaw(const T& value, unsigned char*& cursor, const unsigned char* l
 template <class T>
 void DeserializeRaw(T& value, const unsigned char*& cursor, const unsigned char* limit) {
   static_assert(std::is_trivially_copyable_v<T>);
-  if (limit - cursor < static_cast<std::ptrdiff_t>(sizeof(T))) {
+  if (limit - cursor < static_cast<ptrdiff_t>(sizeof(T))) {
     throw exception::DeserializationError();
   }
-  std::memcpy(&value, cursor, sizeof(T));
+  memcpy(&value, cursor, sizeof(T));
   cursor += sizeof(T);
 }
 

@@ -16,7 +16,7 @@ TEST(ByteOrder, BigEndianCopiesReverse) {
   EXPECT_EQ(1, dest[4]);
   unsigned char back[5] = {};
   big_endian::CopyFromBigEndian(5, back, dest);
-  EXPECT_EQ(0, std::memcmp(src, back, 5));
+  EXPECT_EQ(0, memcmp(src, back, 5));
   big_endian::CopyToBigEndian(0, dest, src);
   EXPECT_EQ(5, dest[0]);
 }
@@ -31,28 +31,28 @@ TEST(ByteOrder, ValuesReverseOrStay) {
 TEST(ByteOrder, SerializeRawWritesAndMoves) {
   unsigned char bytes[5] = {9, 9, 9, 9, 9};
   unsigned char* cursor = bytes + 1;  // unaligned on purpose
-  little_endian::SerializeRaw<std::uint32_t>(0x04030201u, cursor, bytes + 5);
+  little_endian::SerializeRaw<uint32_t>(0x04030201u, cursor, bytes + 5);
   EXPECT_EQ(bytes + 5, cursor);
   const unsigned char expected[] = {9, 1, 2, 3, 4};
-  EXPECT_EQ(0, std::memcmp(expected, bytes, 5));
+  EXPECT_EQ(0, memcmp(expected, bytes, 5));
 }
 
 TEST(ByteOrder, SerializeRawWithoutRoomThrowsAndLeavesAll) {
   unsigned char bytes[3] = {9, 9, 9};
   unsigned char* cursor = bytes;
-  EXPECT_THROW(little_endian::SerializeRaw<std::uint32_t>(1, cursor, bytes + 3),
+  EXPECT_THROW(little_endian::SerializeRaw<uint32_t>(1, cursor, bytes + 3),
                exception::BufferOverflow);
   EXPECT_EQ(bytes, cursor);
   EXPECT_EQ(9, bytes[0]);
   cursor = bytes + 2;  // the limit lies before the cursor
-  EXPECT_THROW(little_endian::SerializeRaw<std::uint16_t>(1, cursor, bytes + 1),
+  EXPECT_THROW(little_endian::SerializeRaw<uint16_t>(1, cursor, bytes + 1),
                exception::BufferOverflow);
 }
 
 TEST(ByteOrder, DeserializeRawReadsAndMovesOrThrows) {
   const unsigned char bytes[] = {0, 1, 2, 3, 4};
   const unsigned char* cursor = bytes + 1;
-  std::uint32_t value = 0;
+  uint32_t value = 0;
   little_endian::DeserializeRaw(value, cursor, bytes + 5);
   EXPECT_EQ(0x04030201u, value);
   EXPECT_EQ(bytes + 5, cursor);
@@ -71,7 +71,7 @@ TEST(ByteOrder, BoundsChecksThrowUnstamped) {
   unsigned char byte = 0;
   unsigned char* cursor = &byte;
   try {
-    little_endian::SerializeRaw<std::uint32_t>(1, cursor, &byte + 1);
+    little_endian::SerializeRaw<uint32_t>(1, cursor, &byte + 1);
     FAIL();
   } catch (const exception::BufferOverflow& e) {
     EXPECT_EQ(nullptr, Place::fileOf(e));

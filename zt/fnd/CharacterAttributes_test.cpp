@@ -35,8 +35,8 @@ TEST(CharacterAttributes, UnknownNameRaisesWithTheReason) {
     const CharacterAttributes<char> none("no_SUCH.locale");
     FAIL();
   } catch (const exception::InvalidArgument2& e) {
-    EXPECT_EQ(0, std::strncmp(e.what(), "Invalid argument(s): ", 21));
-    EXPECT_GT(std::strlen(e.what()), 21u);
+    EXPECT_EQ(0, strncmp(e.what(), "Invalid argument(s): ", 21));
+    EXPECT_GT(strlen(e.what()), 21u);
   }
 }
 

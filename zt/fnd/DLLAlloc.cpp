@@ -5,7 +5,7 @@
 
 namespace zt::fnd {
 
-void* DLLMallocNoThrow(unsigned long size) noexcept { return std::malloc(size); }
+void* DLLMallocNoThrow(unsigned long size) noexcept { return malloc(size); }
 
 void* DLLMalloc(unsigned long size) {
   void* block = DLLMallocNoThrow(size);
@@ -15,10 +15,10 @@ void* DLLMalloc(unsigned long size) {
 
 void* DLLReallocNoThrow(void* block, unsigned long size) noexcept {
   if (size == 0 && block) {
-    std::free(block);
+    free(block);
     return nullptr;
   }
-  return std::realloc(block, size);
+  return realloc(block, size);
 }
 
 void* DLLRealloc(void* block, unsigned long size) {
@@ -27,7 +27,7 @@ void* DLLRealloc(void* block, unsigned long size) {
   return moved;
 }
 
-void DLLFree(void* block) noexcept { std::free(block); }
+void DLLFree(void* block) noexcept { free(block); }
 
 bool MakeDLLMallocThrow(bool) noexcept { return false; }
 

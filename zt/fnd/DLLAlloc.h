@@ -24,10 +24,8 @@ bool MakeDLLMallocThrow(bool doThrow) noexcept;
 // Base of objects whose storage comes from DLLMalloc and goes by DLLFree.
 class DLLAlloced {
  public:
-  static void* operator new(std::size_t size) {
-    return DLLMalloc(static_cast<unsigned long>(size));
-  }
-  static void* operator new(std::size_t, void* place) noexcept { return place; }
+  static void* operator new(size_t size) { return DLLMalloc(static_cast<unsigned long>(size)); }
+  static void* operator new(size_t, void* place) noexcept { return place; }
   static void operator delete(void* block) noexcept { DLLFree(block); }
   static void operator delete(void*, void*) noexcept {}
 

@@ -16,7 +16,7 @@ volatile unsigned long g_impossibleSize = ULONG_MAX - 1000;
 TEST(DLLAlloc, MallocGivesABlockThatFreeTakes) {
   void* p = DLLMalloc(100);
   ASSERT_NE(nullptr, p);
-  std::memset(p, 1, 100);
+  memset(p, 1, 100);
   DLLFree(p);
   DLLFree(nullptr);
 }
@@ -41,7 +41,7 @@ TEST(DLLAlloc, ReallocOfNullAllocates) {
 
 TEST(DLLAlloc, ReallocKeepsTheBytes) {
   char* p = static_cast<char*>(DLLMalloc(4));
-  std::memcpy(p, "abc", 4);
+  memcpy(p, "abc", 4);
   p = static_cast<char*>(DLLRealloc(p, 100000));
   EXPECT_STREQ("abc", p);
   DLLFree(p);
@@ -49,7 +49,7 @@ TEST(DLLAlloc, ReallocKeepsTheBytes) {
 
 TEST(DLLAlloc, ReallocThatFailsLeavesTheOldBlock) {
   std::unique_ptr<char, void (*)(void*)> p(static_cast<char*>(DLLMalloc(4)), DLLFree);
-  std::memcpy(p.get(), "abc", 4);
+  memcpy(p.get(), "abc", 4);
   EXPECT_THROW(DLLRealloc(p.get(), g_impossibleSize), std::bad_alloc);
   EXPECT_EQ(nullptr, DLLReallocNoThrow(p.get(), g_impossibleSize));
   EXPECT_STREQ("abc", p.get());

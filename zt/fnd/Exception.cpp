@@ -16,7 +16,7 @@ std::string WithDetail(const char* prefix, const char* detail) {
 #define ZT_FIXED_TEXT(Name, code, text)                    \
   Name::~Name() = default;                                 \
   const char* Name::what() const noexcept { return text; } \
-  std::uint32_t Name::getErrorCode() const noexcept { return code; }
+  uint32_t Name::getErrorCode() const noexcept { return code; }
 
 #define ZT_DETAILED(Name, prefix)                                              \
   Name::Name(const char* detail) : message(WithDetail(prefix ": ", detail)) {} \
@@ -47,7 +47,7 @@ ZT_DETAILED(BoundExceeded2, "A request was made that would exceed the bounds")
 ZT_DETAILED(InvalidArgument2, "Invalid argument(s)")
 ZT_DETAILED(AccessDenied, "Access denied")
 
-std::uint32_t AccessDenied::getErrorCode() const noexcept { return 0x8ABC7019u; }
+uint32_t AccessDenied::getErrorCode() const noexcept { return 0x8ABC7019u; }
 
 }  // namespace exception
 }  // namespace zt::fnd

@@ -42,24 +42,24 @@ class ZT_EXCEPTION_CLASS Exception : public std::exception {
 
   // Never null; lives as long as the object.
   const char* what() const noexcept override;
-  virtual std::uint32_t getErrorCode() const noexcept;
+  virtual uint32_t getErrorCode() const noexcept;
 
  protected:
   friend struct detail::Stamp;
-  std::uint32_t line;  // 0 until stamped
-  const char* file;    // static text; null until stamped
+  uint32_t line;     // 0 until stamped
+  const char* file;  // static text; null until stamped
 };
 
 // A class with a text and a code of its own and no field.
-#define ZT_FIXED_TEXT_EXCEPTION(Name)                     \
-  class ZT_EXCEPTION_CLASS Name : public Exception {      \
-   public:                                                \
-    Name() noexcept = default;                            \
-    Name(const Name&) = default;                          \
-    Name& operator=(const Name&) = default;               \
-    ~Name() override;                                     \
-    const char* what() const noexcept override;           \
-    std::uint32_t getErrorCode() const noexcept override; \
+#define ZT_FIXED_TEXT_EXCEPTION(Name)                \
+  class ZT_EXCEPTION_CLASS Name : public Exception { \
+   public:                                           \
+    Name() noexcept = default;                       \
+    Name(const Name&) = default;                     \
+    Name& operator=(const Name&) = default;          \
+    ~Name() override;                                \
+    const char* what() const noexcept override;      \
+    uint32_t getErrorCode() const noexcept override; \
   }
 
 // A class whose text is that of its base, ": " and a detail; a null detail counts as empty. The
@@ -107,7 +107,7 @@ class ZT_EXCEPTION_CLASS AccessDenied : public Exception {
   AccessDenied& operator=(const AccessDenied&) = default;
   ~AccessDenied() override;
   const char* what() const noexcept override;
-  std::uint32_t getErrorCode() const noexcept override;
+  uint32_t getErrorCode() const noexcept override;
 
  private:
   std::string message;
@@ -119,31 +119,31 @@ class ZT_EXCEPTION_CLASS AccessDenied : public Exception {
 namespace detail {
 
 // A source path without its extension.
-template <std::size_t N>
+template <size_t N>
 struct FileStem {
   char text[N];
 
   constexpr explicit FileStem(const char (&path)[N]) : text() {
-    std::size_t length = N - 1;
-    for (std::size_t i = N - 1; i > 0 && path[i] != '/'; --i) {
+    size_t length = N - 1;
+    for (size_t i = N - 1; i > 0 && path[i] != '/'; --i) {
       if (path[i] == '.') {
         length = i;
         break;
       }
     }
-    for (std::size_t i = 0; i < length; ++i) text[i] = path[i];
+    for (size_t i = 0; i < length; ++i) text[i] = path[i];
   }
 };
 
 struct Stamp {
-  static void set(Exception* e, std::uint32_t line, const char* file) noexcept {
+  static void set(Exception* e, uint32_t line, const char* file) noexcept {
     e->line = line;
     e->file = file;
   }
 };
 
 template <class E>
-[[noreturn]] void Raise(E&& e, std::uint32_t line, const char* file) {
+[[noreturn]] void Raise(E&& e, uint32_t line, const char* file) {
   std::decay_t<E> stamped(e);
   Stamp::set(&stamped, line, file);
   throw std::decay_t<E>(stamped);

@@ -16,13 +16,13 @@ namespace {
 
 // Nothing in the library reads the place of a throw back; a debugger does, and so do we.
 struct Place : Exception {
-  static std::uint32_t lineOf(const Exception& e) { return e.*&Place::line; }
+  static uint32_t lineOf(const Exception& e) { return e.*&Place::line; }
   static const char* fileOf(const Exception& e) { return e.*&Place::file; }
 };
 
 struct Row {
   const Exception& exception;
-  std::uint32_t code;
+  uint32_t code;
   const char* text;
 };
 
@@ -102,7 +102,7 @@ TEST(Exception, UnstampedUntilRaised) {
 }
 
 TEST(Exception, RaiseStampsLineAndSourcePathWithoutExtension) {
-  std::uint32_t line = 0;
+  uint32_t line = 0;
   try {
     line = __LINE__ + 1;
     ZT_RAISE(AccessDenied("/x"));

@@ -15,7 +15,7 @@ constexpr long double kLongTwo64 = 18446744073709551616.0L;
 
 // A number of words of 32 bits, least significant first.
 struct Words {
-  std::uint32_t w[4];
+  uint32_t w[4];
 
   explicit Words(const Fixed& value) { value.Get(w[3], w[2], w[1], w[0]); }
 };
@@ -23,11 +23,11 @@ struct Words {
 // A finite value whose integer part fits.
 Fixed FromMagnitude(double value) {
   const double integer = std::floor(value);
-  const auto high = static_cast<std::uint64_t>(integer);
+  const auto high = static_cast<uint64_t>(integer);
   // Exact: the difference has no more bits than the value, and scaling only moves the exponent.
-  const auto low = static_cast<std::uint64_t>((value - integer) * kTwo64);
-  return Fixed(static_cast<std::uint32_t>(high >> 32), static_cast<std::uint32_t>(high),
-               static_cast<std::uint32_t>(low >> 32), static_cast<std::uint32_t>(low));
+  const auto low = static_cast<uint64_t>((value - integer) * kTwo64);
+  return Fixed(static_cast<uint32_t>(high >> 32), static_cast<uint32_t>(high),
+               static_cast<uint32_t>(low >> 32), static_cast<uint32_t>(low));
 }
 
 }  // namespace
@@ -65,7 +65,7 @@ Fixed::operator double() const noexcept {
 }
 
 void Fixed::LeftShift(int bits, bool fill) noexcept {
-  const std::uint64_t in = fill ? ~std::uint64_t(0) : 0;
+  const uint64_t in = fill ? ~uint64_t(0) : 0;
   for (; bits >= 64; bits -= 64) {
     if (m_high == in && m_low == in) return;
     m_high = m_low;
@@ -77,7 +77,7 @@ void Fixed::LeftShift(int bits, bool fill) noexcept {
 }
 
 void Fixed::RightShift(int bits, bool fill) noexcept {
-  const std::uint64_t in = fill ? ~std::uint64_t(0) : 0;
+  const uint64_t in = fill ? ~uint64_t(0) : 0;
   for (; bits >= 64; bits -= 64) {
     if (m_high == in && m_low == in) return;
     m_low = m_high;
@@ -92,15 +92,15 @@ void Fixed::RightShift(int bits, bool fill) noexcept {
 Fixed& Fixed::operator*=(const tFixedPoint128& other) noexcept {
   const bool negative = IsNegative() != other.IsNegative();
   const Words a(magnitude()), b(other.magnitude());
-  std::uint32_t product[8] = {};
+  uint32_t product[8] = {};
   for (int i = 0; i < 4; ++i) {
-    std::uint64_t carry = 0;
+    uint64_t carry = 0;
     for (int j = 0; j < 4; ++j) {
-      carry += static_cast<std::uint64_t>(a.w[i]) * b.w[j] + product[i + j];
-      product[i + j] = static_cast<std::uint32_t>(carry);
+      carry += static_cast<uint64_t>(a.w[i]) * b.w[j] + product[i + j];
+      product[i + j] = static_cast<uint32_t>(carry);
       carry >>= 32;
     }
-    product[i + 4] = static_cast<std::uint32_t>(carry);
+    product[i + 4] = static_cast<uint32_t>(carry);
   }
   *this = tFixedPoint128(product[5], product[4], product[3], product[2]);
   if (negative) Negate();
@@ -117,12 +117,12 @@ Fixed& Fixed::operator/=(const tFixedPoint128& other) noexcept {
 }
 
 // By a whole number of 32 bits, as all units up to the nanosecond are: word by word.
-void Fixed::DivideByWord(std::uint32_t divisor) noexcept {
+void Fixed::DivideByWord(uint32_t divisor) noexcept {
   Words words(*this);
-  std::uint64_t rest = 0;
+  uint64_t rest = 0;
   for (int i = 3; i >= 0; --i) {
     rest = rest << 32 | words.w[i];
-    words.w[i] = static_cast<std::uint32_t>(rest / divisor);
+    words.w[i] = static_cast<uint32_t>(rest / divisor);
     rest %= divisor;
   }
   *this = tFixedPoint128(words.w[3], words.w[2], words.w[1], words.w[0]);
@@ -132,7 +132,7 @@ void Fixed::DivideByWord(std::uint32_t divisor) noexcept {
 // are kept.
 void Fixed::DivideInternal(const tFixedPoint128& divisor) noexcept {
   if (divisor.m_low == 0 && divisor.m_high <= 0xFFFFFFFFu) {
-    return DivideByWord(static_cast<std::uint32_t>(divisor.m_high));
+    return DivideByWord(static_cast<uint32_t>(divisor.m_high));
   }
   tFixedPoint128 quotient, rest;
   const auto lessUnsigned = [](const tFixedPoint128& a, const tFixedPoint128& b) {

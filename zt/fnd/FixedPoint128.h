@@ -19,8 +19,7 @@ class tFixedPoint128<64, true> {
  public:
   constexpr tFixedPoint128() noexcept : m_high(0), m_low(0) {}
   // Four words, from the most significant down.
-  constexpr tFixedPoint128(std::uint32_t w3, std::uint32_t w2, std::uint32_t w1,
-                           std::uint32_t w0) noexcept
+  constexpr tFixedPoint128(uint32_t w3, uint32_t w2, uint32_t w1, uint32_t w0) noexcept
       : m_high(Join(w3, w2)), m_low(Join(w1, w0)) {}
   // Integer part.
   constexpr tFixedPoint128(int value) noexcept : tFixedPoint128(Whole(), value) {}
@@ -33,16 +32,15 @@ class tFixedPoint128<64, true> {
   // The sum of both.
   tFixedPoint128(double integer, double fraction) noexcept;
 
-  constexpr void Get(std::uint32_t& w3, std::uint32_t& w2, std::uint32_t& w1,
-                     std::uint32_t& w0) const noexcept {
-    w3 = static_cast<std::uint32_t>(m_high >> 32);
-    w2 = static_cast<std::uint32_t>(m_high);
-    w1 = static_cast<std::uint32_t>(m_low >> 32);
-    w0 = static_cast<std::uint32_t>(m_low);
+  constexpr void Get(uint32_t& w3, uint32_t& w2, uint32_t& w1, uint32_t& w0) const noexcept {
+    w3 = static_cast<uint32_t>(m_high >> 32);
+    w2 = static_cast<uint32_t>(m_high);
+    w1 = static_cast<uint32_t>(m_low >> 32);
+    w0 = static_cast<uint32_t>(m_low);
   }
   // The integer part rounded down, and the 64 bits behind the point.
-  constexpr std::int64_t integerPart() const noexcept { return static_cast<std::int64_t>(m_high); }
-  constexpr std::uint64_t fractionBits() const noexcept { return m_low; }
+  constexpr int64_t integerPart() const noexcept { return static_cast<int64_t>(m_high); }
+  constexpr uint64_t fractionBits() const noexcept { return m_low; }
   explicit operator double() const noexcept;
   explicit operator long double() const noexcept;
 
@@ -68,7 +66,7 @@ class tFixedPoint128<64, true> {
   void RightShift(int bits, bool fill) noexcept;
 
   tFixedPoint128& operator+=(const tFixedPoint128& other) noexcept {
-    const std::uint64_t low = m_low + other.m_low;
+    const uint64_t low = m_low + other.m_low;
     m_high += other.m_high + (low < m_low ? 1 : 0);
     m_low = low;
     return *this;
@@ -106,17 +104,17 @@ class tFixedPoint128<64, true> {
 
  private:
   struct Whole {};
-  constexpr tFixedPoint128(Whole, std::int64_t value) noexcept
-      : m_high(static_cast<std::uint64_t>(value)), m_low(0) {}
-  static constexpr std::uint64_t Join(std::uint32_t high, std::uint32_t low) noexcept {
-    return static_cast<std::uint64_t>(high) << 32 | low;
+  constexpr tFixedPoint128(Whole, int64_t value) noexcept
+      : m_high(static_cast<uint64_t>(value)), m_low(0) {}
+  static constexpr uint64_t Join(uint32_t high, uint32_t low) noexcept {
+    return static_cast<uint64_t>(high) << 32 | low;
   }
   tFixedPoint128 magnitude() const noexcept { return IsNegative() ? -*this : *this; }
   // Both operands as unsigned; the divisor is not zero.
   void DivideInternal(const tFixedPoint128& divisor) noexcept;
-  void DivideByWord(std::uint32_t divisor) noexcept;
+  void DivideByWord(uint32_t divisor) noexcept;
 
-  std::uint64_t m_high, m_low;
+  uint64_t m_high, m_low;
 };
 
 }  // namespace nZTSS100

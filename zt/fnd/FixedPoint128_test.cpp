@@ -9,11 +9,10 @@ using Fixed = nZTSS100::tFixedPoint128<64, true>;
 
 namespace {
 
-constexpr std::uint32_t kOnes = 0xFFFFFFFF;
+constexpr uint32_t kOnes = 0xFFFFFFFF;
 
-void ExpectWords(const Fixed& value, std::uint32_t w3, std::uint32_t w2, std::uint32_t w1,
-                 std::uint32_t w0) {
-  std::uint32_t a, b, c, d;
+void ExpectWords(const Fixed& value, uint32_t w3, uint32_t w2, uint32_t w1, uint32_t w0) {
+  uint32_t a, b, c, d;
   value.Get(a, b, c, d);
   EXPECT_EQ(w3, a);
   EXPECT_EQ(w2, b);

@@ -10,12 +10,10 @@ bool operator<(const _GUID& a, const _GUID& b) noexcept {
   if (a.Data1 != b.Data1) return a.Data1 < b.Data1;
   if (a.Data2 != b.Data2) return a.Data2 < b.Data2;
   if (a.Data3 != b.Data3) return a.Data3 < b.Data3;
-  return std::memcmp(a.Data4, b.Data4, sizeof a.Data4) < 0;
+  return memcmp(a.Data4, b.Data4, sizeof a.Data4) < 0;
 }
 
-bool operator==(const _GUID& a, const _GUID& b) noexcept {
-  return std::memcmp(&a, &b, sizeof a) == 0;
-}
+bool operator==(const _GUID& a, const _GUID& b) noexcept { return memcmp(&a, &b, sizeof a) == 0; }
 
 namespace zt::fnd {
 namespace {
@@ -33,7 +31,7 @@ Guid Guid::make() { return Guid(osdep::MakeGUID()); }
 void Guid::toString(String& out) const {
   static constexpr wchar_t kDigits[] = L"0123456789ABCDEF";
   unsigned char bytes[kSize];
-  std::memcpy(bytes, &m_guid, kSize);
+  memcpy(bytes, &m_guid, kSize);
   wchar_t text[kTextLength];
   wchar_t* p = text;
   *p++ = L'{';
@@ -57,18 +55,18 @@ void Guid::fromString(const String& text) {
   const wchar_t* const end = text.end();
   bool ok = true;
   SkipCharacter(cursor, end, L'{', ok);
-  ParseHex<std::uint32_t>(cursor, end, out, ok);
+  ParseHex<uint32_t>(cursor, end, out, ok);
   for (int i = 0; i < 2; ++i) {
     SkipCharacter(cursor, end, L'-', ok);
-    ParseHex<std::uint16_t>(cursor, end, out, ok);
+    ParseHex<uint16_t>(cursor, end, out, ok);
   }
   SkipCharacter(cursor, end, L'-', ok);
-  for (int i = 0; i < 2; ++i) ParseHex<std::uint8_t>(cursor, end, out, ok);
+  for (int i = 0; i < 2; ++i) ParseHex<uint8_t>(cursor, end, out, ok);
   SkipCharacter(cursor, end, L'-', ok);
-  for (int i = 0; i < 6; ++i) ParseHex<std::uint8_t>(cursor, end, out, ok);
+  for (int i = 0; i < 6; ++i) ParseHex<uint8_t>(cursor, end, out, ok);
   SkipCharacter(cursor, end, L'}', ok);
   if (!ok) ZT_RAISE(exception::BadGuidString());
-  std::memcpy(&m_guid, bytes, kSize);
+  memcpy(&m_guid, bytes, kSize);
 }
 
 void Guid::deserialize(const unsigned char*& cursor, const unsigned char* limit) {
@@ -101,18 +99,18 @@ void SkipCharacter(const wchar_t*& cursor, const wchar_t* end, wchar_t expected,
 
 template <class T>
 void ParseHex(const wchar_t*& cursor, const wchar_t* end, unsigned char*& out, bool& ok) {
-  std::uint32_t value = 0;
+  uint32_t value = 0;
   for (unsigned i = 0; i < 2 * sizeof(T); ++i) {
     value = value << 4 | ParseHexNibble(cursor, end, ok);
   }
   if (!ok) return;
   const T field = static_cast<T>(value);
-  std::memcpy(out, &field, sizeof field);
+  memcpy(out, &field, sizeof field);
   out += sizeof field;
 }
 
-template void ParseHex<std::uint8_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
-template void ParseHex<std::uint16_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
-template void ParseHex<std::uint32_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
+template void ParseHex<uint8_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
+template void ParseHex<uint16_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
+template void ParseHex<uint32_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
 
 }  // namespace zt::fnd

@@ -56,11 +56,8 @@ void SkipCharacter(const wchar_t*& cursor, const wchar_t* end, wchar_t expected,
 template <class T>
 void ParseHex(const wchar_t*& cursor, const wchar_t* end, unsigned char*& out, bool& ok);
 
-extern template void ParseHex<std::uint8_t>(const wchar_t*&, const wchar_t*, unsigned char*&,
-                                            bool&);
-extern template void ParseHex<std::uint16_t>(const wchar_t*&, const wchar_t*, unsigned char*&,
-                                             bool&);
-extern template void ParseHex<std::uint32_t>(const wchar_t*&, const wchar_t*, unsigned char*&,
-                                             bool&);
+extern template void ParseHex<uint8_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
+extern template void ParseHex<uint16_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
+extern template void ParseHex<uint32_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);
 
 }  // namespace zt::fnd

@@ -28,7 +28,7 @@ TEST(Guid, IsSixteenBytesThatCopyAsTheyAre) {
   static_assert(sizeof(Guid) == 16 && std::is_trivially_copyable_v<Guid>);
   const Guid guid(kGuid);
   const Guid copy(guid);
-  EXPECT_EQ(0, std::memcmp(&copy, &kGuid, 16));
+  EXPECT_EQ(0, memcmp(&copy, &kGuid, 16));
 }
 
 TEST(Guid, ZerosRoundTrip) {
@@ -42,7 +42,7 @@ TEST(Guid, ParsesItsFields) {
   EXPECT_EQ(0x00112233u, guid.get().Data1);
   EXPECT_EQ(0x4455u, guid.get().Data2);
   EXPECT_EQ(0x6677u, guid.get().Data3);
-  EXPECT_EQ(0, std::memcmp(guid.get().Data4, kGuid.Data4, 8));
+  EXPECT_EQ(0, memcmp(guid.get().Data4, kGuid.Data4, 8));
   EXPECT_EQ(kText, Text(guid));
 }
 
@@ -154,13 +154,13 @@ TEST(Guid, ParsedFieldsAreStoredOnlyWhileAllIsWell) {
   unsigned char bytes[4] = {};
   unsigned char* out = bytes;
   bool ok = true;
-  ParseHex<std::uint32_t>(cursor, text + 8, out, ok);
+  ParseHex<uint32_t>(cursor, text + 8, out, ok);
   EXPECT_TRUE(ok);
   EXPECT_EQ(bytes + 4, out);
   EXPECT_EQ(0x78, bytes[0]) << "the host's byte order";
   cursor = text;
   out = bytes;
-  ParseHex<std::uint16_t>(cursor, text + 3, out, ok);
+  ParseHex<uint16_t>(cursor, text + 3, out, ok);
   EXPECT_FALSE(ok);
   EXPECT_EQ(bytes, out);
   EXPECT_EQ(0x78, bytes[0]);

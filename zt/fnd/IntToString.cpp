@@ -39,7 +39,7 @@ String PrintSigned(Signed value, unsigned int base) {
 
 String UIntToString(unsigned long value, unsigned int base) { return Print(value, base); }
 String IntToString(long value, unsigned int base) { return PrintSigned(value, base); }
-String Int64ToString(std::int64_t value, unsigned int base) { return PrintSigned(value, base); }
+String Int64ToString(int64_t value, unsigned int base) { return PrintSigned(value, base); }
 String Int8ToString(signed char value, unsigned int base) { return PrintSigned(value, base); }
 String UInt8ToString(unsigned char value, unsigned int base) { return Print(value, base); }
 String Int16ToString(short value, unsigned int base) { return PrintSigned(value, base); }

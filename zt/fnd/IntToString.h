@@ -12,7 +12,7 @@ namespace zt::fnd {
 // magnitude in base 10, and its two's-complement bits in any other base, as many as its type has.
 String UIntToString(unsigned long value, unsigned int base);
 String IntToString(long value, unsigned int base);
-String Int64ToString(std::int64_t value, unsigned int base);
+String Int64ToString(int64_t value, unsigned int base);
 String Int8ToString(signed char value, unsigned int base);
 String UInt8ToString(unsigned char value, unsigned int base);
 String Int16ToString(short value, unsigned int base);

@@ -33,8 +33,7 @@ TEST(IntToString, NegativeValuesInBaseTen) {
   EXPECT_EQ(L"-128", Std(Int8ToString(-128, 10)));
   EXPECT_EQ(L"-32768", Std(Int16ToString(-32768, 10)));
   EXPECT_EQ(L"-2147483648", Std(Int32ToString(std::numeric_limits<int>::min(), 10)));
-  EXPECT_EQ(L"-9223372036854775808",
-            Std(Int64ToString(std::numeric_limits<std::int64_t>::min(), 10)));
+  EXPECT_EQ(L"-9223372036854775808", Std(Int64ToString(std::numeric_limits<int64_t>::min(), 10)));
   EXPECT_EQ(L"-7", Std(IntToString(-7, 10)));
 }
 
@@ -69,7 +68,7 @@ TEST(IntToString, BasesOutside2To36Raise) {
 TEST(IntToString, ThreadIdsShowInHexadecimal) {
   const auto id = static_cast<unsigned long>(pthread_self());
   char expected[2 * sizeof id + 1];
-  std::snprintf(expected, sizeof expected, "%lX", id);
+  snprintf(expected, sizeof expected, "%lX", id);
   EXPECT_EQ(0,
             osdep::ThreadID::getCallingID().getDisplayStringHex().exactCompare(String(expected)));
 }

@@ -30,8 +30,8 @@ TEST(NumericCast, NegativeForUnsignedIsOutOfRange) {
 TEST(NumericCast, SignedTargetsHaveBothLimits) {
   EXPECT_EQ(INT_MAX, NumericCast<int>(0x7FFFFFFFu));
   EXPECT_THROW(NumericCast<int>(0x80000000u), exception::OutOfRange);
-  EXPECT_EQ(INT_MIN, NumericCast<int>(std::int64_t(INT_MIN)));
-  EXPECT_THROW(NumericCast<int>(std::int64_t(INT_MIN) - 1), exception::OutOfRange);
+  EXPECT_EQ(INT_MIN, NumericCast<int>(int64_t(INT_MIN)));
+  EXPECT_THROW(NumericCast<int>(int64_t(INT_MIN) - 1), exception::OutOfRange);
 }
 
 }  // namespace

@@ -10,7 +10,7 @@
 namespace zt::fnd {
 
 // What a string does with its block after it became shorter.
-enum class BufferStrategy : std::int32_t {
+enum class BufferStrategy : int32_t {
   Keep = 0,     // the capacity stays
   Release = 1,  // a block used to less than half is cut to the exact size
 };
@@ -55,7 +55,7 @@ class StringBase {
 
  public:
   using value_type = T;
-  using size_type = std::uint32_t;
+  using size_type = uint32_t;
   using iterator = T*;
   using const_iterator = const T*;
   // The string type that converts without a tag.

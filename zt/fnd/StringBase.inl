@@ -20,42 +20,38 @@
 namespace zt::fnd {
 namespace string_detail {
 
-inline constexpr std::uint64_t kMax32 = 0xFFFFFFFFu;
+inline constexpr uint64_t kMax32 = 0xFFFFFFFFu;
 
 // Bytes of a block for n characters and the terminator.
 template <class T>
-std::uint32_t BlockBytes(std::uint32_t n) {
-  const std::uint64_t bytes = (static_cast<std::uint64_t>(n) + 1) * sizeof(T);
+uint32_t BlockBytes(uint32_t n) {
+  const uint64_t bytes = (static_cast<uint64_t>(n) + 1) * sizeof(T);
   if (n == kMax32 || bytes > kMax32) ZT_RAISE(exception::OutOfRange());
-  return static_cast<std::uint32_t>(bytes);
+  return static_cast<uint32_t>(bytes);
 }
 
-inline std::uint32_t Sum(std::uint32_t a, std::uint32_t b) {
-  return SafeInteger<std::uint32_t>::Add(a, b);
-}
+inline uint32_t Sum(uint32_t a, uint32_t b) { return SafeInteger<uint32_t>::Add(a, b); }
 
 // Characters of a range; a null or reversed one is judged here for all callers.
 template <class C>
-std::uint32_t RangeLength(const C* first, const C* last) {
-  return first ? NumericCast<std::uint32_t>(last - first) : 0;
+uint32_t RangeLength(const C* first, const C* last) {
+  return first ? NumericCast<uint32_t>(last - first) : 0;
 }
 
-inline std::size_t RawLength(const wchar_t* s) { return std::wcslen(s); }
-inline std::size_t RawLength(const char* s) { return std::strlen(s); }
-inline std::size_t RawLength(const unsigned char* s) {
-  return std::strlen(reinterpret_cast<const char*>(s));
-}
+inline size_t RawLength(const wchar_t* s) { return wcslen(s); }
+inline size_t RawLength(const char* s) { return strlen(s); }
+inline size_t RawLength(const unsigned char* s) { return strlen(reinterpret_cast<const char*>(s)); }
 
 template <class C>
-std::uint32_t TextLength(const C* s) {
-  return s ? NumericCast<std::uint32_t>(RawLength(s)) : 0;
+uint32_t TextLength(const C* s) {
+  return s ? NumericCast<uint32_t>(RawLength(s)) : 0;
 }
 
 // A fresh block of n characters and the terminator; goes back unless released.
 template <class T>
 class Block {
  public:
-  explicit Block(std::uint32_t n) : m_p(static_cast<T*>(DLLMalloc(BlockBytes<T>(n)))) {}
+  explicit Block(uint32_t n) : m_p(static_cast<T*>(DLLMalloc(BlockBytes<T>(n)))) {}
   ~Block() { DLLFree(m_p); }
   Block(const Block&) = delete;
   Block& operator=(const Block&) = delete;
@@ -69,9 +65,9 @@ class Block {
 // Keeps the block for a new length n when its capacity is at least n and at most 2n; otherwise
 // reallocates to exactly n. Nothing has changed when it throws.
 template <class T>
-void ReallocBuffer(T*& begin, T*& capacityEnd, std::uint32_t n) {
-  const std::uint64_t capacity = static_cast<std::uint64_t>(capacityEnd - begin);
-  if (capacity >= n && capacity <= 2 * static_cast<std::uint64_t>(n)) return;
+void ReallocBuffer(T*& begin, T*& capacityEnd, uint32_t n) {
+  const uint64_t capacity = static_cast<uint64_t>(capacityEnd - begin);
+  if (capacity >= n && capacity <= 2 * static_cast<uint64_t>(n)) return;
   begin = static_cast<T*>(DLLRealloc(begin, BlockBytes<T>(n)));
   capacityEnd = begin + n;
 }
@@ -79,12 +75,12 @@ void ReallocBuffer(T*& begin, T*& capacityEnd, std::uint32_t n) {
 // Twice the required length where that can be had, otherwise the required length alone, so that
 // an append fails only if its result cannot be. Nothing has changed when it throws.
 template <class T>
-void Grow(std::uint32_t required, T*& begin, T*& end, T*& capacityEnd) {
-  const std::ptrdiff_t length = end - begin;
-  std::uint64_t capacity = 2 * static_cast<std::uint64_t>(required);
-  const std::uint64_t bytes = (capacity + 1) * sizeof(T);
+void Grow(uint32_t required, T*& begin, T*& end, T*& capacityEnd) {
+  const ptrdiff_t length = end - begin;
+  uint64_t capacity = 2 * static_cast<uint64_t>(required);
+  const uint64_t bytes = (capacity + 1) * sizeof(T);
   void* block = nullptr;
-  if (bytes <= kMax32) block = DLLReallocNoThrow(begin, static_cast<std::uint32_t>(bytes));
+  if (bytes <= kMax32) block = DLLReallocNoThrow(begin, static_cast<uint32_t>(bytes));
   if (!block) {
     capacity = required;
     block = DLLRealloc(begin, BlockBytes<T>(required));
@@ -95,18 +91,18 @@ void Grow(std::uint32_t required, T*& begin, T*& end, T*& capacityEnd) {
 }
 
 template <class T>
-void CopyChars(T* dest, const T* src, std::uint32_t n) {
-  if (n != 0) std::memcpy(dest, src, static_cast<std::size_t>(n) * sizeof(T));
+void CopyChars(T* dest, const T* src, uint32_t n) {
+  if (n != 0) memcpy(dest, src, static_cast<size_t>(n) * sizeof(T));
 }
 
 template <class T>
-void MoveChars(T* dest, const T* src, std::uint32_t n) {
-  if (n != 0) std::memmove(dest, src, static_cast<std::size_t>(n) * sizeof(T));
+void MoveChars(T* dest, const T* src, uint32_t n) {
+  if (n != 0) memmove(dest, src, static_cast<size_t>(n) * sizeof(T));
 }
 
 // Where s lies inside [begin, end], as an offset; -1 if it does not.
 template <class T>
-std::ptrdiff_t OffsetWithin(const T* s, const T* begin, const T* end) {
+ptrdiff_t OffsetWithin(const T* s, const T* begin, const T* end) {
   const std::less<const T*> before;
   return before(s, begin) || before(end, s) ? -1 : s - begin;
 }
@@ -317,7 +313,7 @@ auto StringBase<T, O, E>::append(const T* s) -> StringBase& {
 template <class T, class O, class E>
 auto StringBase<T, O, E>::append(const T* s, size_type n) -> StringBase& {
   if (!s || n == 0) return *this;
-  const std::ptrdiff_t own = string_detail::OffsetWithin<T>(s, m_begin, m_end);
+  const ptrdiff_t own = string_detail::OffsetWithin<T>(s, m_begin, m_end);
   makeRoom(n);
   if (own >= 0) s = m_begin + own;  // the block may have moved
   string_detail::MoveChars(m_end, s, n);
@@ -414,7 +410,7 @@ auto StringBase<T, O, E>::replace(size_type pos, size_type n, const StringBase& 
   if (&s == this) return replace(pos, n, StringBase(s), pos2, n2);
   n = std::min(n, length() - pos);
   n2 = std::min(n2, s.length() - pos2);
-  const std::uint64_t total = static_cast<std::uint64_t>(length() - n) + n2;
+  const uint64_t total = static_cast<uint64_t>(length() - n) + n2;
   if (total >= npos) ZT_RAISE(exception::BoundExceeded2("Resulting string too large"));
   const size_type size = static_cast<size_type>(total);
   const size_type tail = length() - pos - n;

@@ -19,7 +19,7 @@ inline constexpr char kAscii[] = "US-ASCII";
 
 template <const char* Locale>
 struct FromLocaleText {
-  static std::uint32_t requiredLength(const char* first, const char* last) {
+  static uint32_t requiredLength(const char* first, const char* last) {
     return osdep::GetAnsiToWideRequiredBufferLength(first, last, Locale);
   }
   static wchar_t* convert(const char* first, const char* last, wchar_t* dest, wchar_t* destEnd) {
@@ -30,7 +30,7 @@ struct FromLocaleText {
 
 template <const char* Locale>
 struct ToLocaleText {
-  static std::uint32_t requiredLength(const wchar_t* first, const wchar_t* last) {
+  static uint32_t requiredLength(const wchar_t* first, const wchar_t* last) {
     return osdep::GetWideToAnsiRequiredBufferLength(first, last, Locale);
   }
   static char* convert(const wchar_t* first, const wchar_t* last, char* dest, char* destEnd) {
@@ -53,7 +53,7 @@ struct StringCodec<AsciiString, String> : ToLocaleText<kAscii> {};
 
 template <>
 struct StringCodec<String, Utf8String> {
-  static std::uint32_t requiredLength(const unsigned char* first, const unsigned char* last) {
+  static uint32_t requiredLength(const unsigned char* first, const unsigned char* last) {
     return GetUtf8StringLength(first, last);
   }
   static wchar_t* convert(const unsigned char* first, const unsigned char* last, wchar_t* dest,
@@ -64,7 +64,7 @@ struct StringCodec<String, Utf8String> {
 
 template <>
 struct StringCodec<Utf8String, String> {
-  static std::uint32_t requiredLength(const wchar_t* first, const wchar_t* last) {
+  static uint32_t requiredLength(const wchar_t* first, const wchar_t* last) {
     return GetUtf8EncodingBytes(first, last);
   }
   static unsigned char* convert(const wchar_t* first, const wchar_t* last, unsigned char* dest,
@@ -76,13 +76,13 @@ struct StringCodec<Utf8String, String> {
 // US-ASCII is UTF-8 already.
 template <>
 struct StringCodec<Utf8String, AsciiString> {
-  static std::uint32_t requiredLength(const char* first, const char* last) {
-    return static_cast<std::uint32_t>(last - first);
+  static uint32_t requiredLength(const char* first, const char* last) {
+    return static_cast<uint32_t>(last - first);
   }
   static unsigned char* convert(const char* first, const char* last, unsigned char* dest,
                                 unsigned char*) {
-    const std::size_t n = static_cast<std::size_t>(last - first);
-    std::memcpy(dest, first, n);
+    const size_t n = static_cast<size_t>(last - first);
+    memcpy(dest, first, n);
     return dest + n;
   }
 };

@@ -16,10 +16,10 @@ class Pretended {
  public:
   using T = typename S::value_type;
 
-  explicit Pretended(std::uint32_t length) {
+  explicit Pretended(uint32_t length) {
     T** const fields = reinterpret_cast<T**>(&m_string);
     for (int i = 0; i < 3; ++i) m_saved[i] = fields[i];
-    fields[0] = reinterpret_cast<T*>(std::uintptr_t(0x10000));
+    fields[0] = reinterpret_cast<T*>(uintptr_t(0x10000));
     fields[1] = fields[2] = fields[0] + length;
   }
   ~Pretended() {

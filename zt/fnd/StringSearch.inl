@@ -13,19 +13,18 @@
 namespace zt::fnd {
 namespace string_detail {
 
-inline const wchar_t* FindChar(const wchar_t* s, wchar_t c, std::size_t n) {
-  return n == 0 ? nullptr : std::wmemchr(s, c, n);
+inline const wchar_t* FindChar(const wchar_t* s, wchar_t c, size_t n) {
+  return n == 0 ? nullptr : wmemchr(s, c, n);
 }
 
 template <class Byte>
-const Byte* FindChar(const Byte* s, Byte c, std::size_t n) {
-  return n == 0 ? nullptr
-                : static_cast<const Byte*>(std::memchr(s, static_cast<unsigned char>(c), n));
+const Byte* FindChar(const Byte* s, Byte c, size_t n) {
+  return n == 0 ? nullptr : static_cast<const Byte*>(memchr(s, static_cast<unsigned char>(c), n));
 }
 
 template <class T>
-bool SameChars(const T* a, const T* b, std::size_t n) {
-  return n == 0 || std::memcmp(a, b, n * sizeof(T)) == 0;
+bool SameChars(const T* a, const T* b, size_t n) {
+  return n == 0 || memcmp(a, b, n * sizeof(T)) == 0;
 }
 
 inline int CaseCompare(const wchar_t* a, const wchar_t* b) {
@@ -46,7 +45,7 @@ inline int ExactCompare(const unsigned char* a, const unsigned char* b) {
 
 // First position from `pos` on whose being one of `set` equals `wanted`.
 template <class S>
-std::uint32_t ScanForward(const S& text, const S& set, std::uint32_t pos, bool wanted) {
+uint32_t ScanForward(const S& text, const S& set, uint32_t pos, bool wanted) {
   for (; pos < text.length(); ++pos) {
     if ((set.find(text[pos], 0) != S::npos) == wanted) return pos;
   }
@@ -55,9 +54,9 @@ std::uint32_t ScanForward(const S& text, const S& set, std::uint32_t pos, bool w
 
 // The same, downward from the smaller of `pos` and the last position.
 template <class S>
-std::uint32_t ScanBackward(const S& text, const S& set, std::uint32_t pos, bool wanted) {
+uint32_t ScanBackward(const S& text, const S& set, uint32_t pos, bool wanted) {
   if (text.empty()) return S::npos;
-  for (std::uint32_t i = std::min(text.length() - 1, pos) + 1; i-- > 0;) {
+  for (uint32_t i = std::min(text.length() - 1, pos) + 1; i-- > 0;) {
     if ((set.find(text[i], 0) != S::npos) == wanted) return i;
   }
   return S::npos;

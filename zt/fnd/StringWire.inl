@@ -17,26 +17,25 @@
 namespace zt::fnd {
 namespace string_detail {
 
-inline constexpr std::uint32_t kLengthField = 4;
+inline constexpr uint32_t kLengthField = 4;
 
 // Bytes from the cursor to the limit; a limit before the cursor leaves none.
-inline std::uint64_t Remaining(const unsigned char* cursor, const unsigned char* limit) {
-  return std::less<const unsigned char*>()(cursor, limit)
-             ? static_cast<std::uint64_t>(limit - cursor)
-             : 0;
+inline uint64_t Remaining(const unsigned char* cursor, const unsigned char* limit) {
+  return std::less<const unsigned char*>()(cursor, limit) ? static_cast<uint64_t>(limit - cursor)
+                                                          : 0;
 }
 
 // Reads the length field and checks that so many bytes follow. Moves the cursor behind the field.
-inline std::uint32_t TakeLength(const unsigned char*& cursor, const unsigned char* limit) {
+inline uint32_t TakeLength(const unsigned char*& cursor, const unsigned char* limit) {
   if (Remaining(cursor, limit) < kLengthField) throw exception::DeserializationError();
-  std::uint32_t n = 0;
-  little_endian::DeserializeRaw<std::uint32_t>(n, cursor, limit);
+  uint32_t n = 0;
+  little_endian::DeserializeRaw<uint32_t>(n, cursor, limit);
   if (n > Remaining(cursor, limit)) throw exception::DeserializationError();
   return n;
 }
 
-inline std::uint32_t FitOrAllOnes(std::uint64_t size) {
-  return size > UINT32_MAX ? UINT32_MAX : static_cast<std::uint32_t>(size);
+inline uint32_t FitOrAllOnes(uint64_t size) {
+  return size > UINT32_MAX ? UINT32_MAX : static_cast<uint32_t>(size);
 }
 
 }  // namespace string_detail
@@ -48,7 +47,7 @@ auto StringBase<T, O, E>::serializationSize() const -> size_type {
     // The limit leaves room for the length field below 32 bits.
     return kLengthField + GetUtf8EncodingBytesWithBufferLimit(m_begin, m_end, 0xFFFFFFFBu);
   } else {
-    const std::uint64_t terminator = kIsUtf8 ? 0 : 1;
+    const uint64_t terminator = kIsUtf8 ? 0 : 1;
     return string_detail::FitOrAllOnes(kLengthField + terminator + length());
   }
 }
@@ -57,7 +56,7 @@ auto StringBase<T, O, E>::serializationSize() const -> size_type {
 template <class T, class O, class E>
 void StringBase<T, O, E>::serialize(unsigned char*& cursor, const unsigned char* limit) const {
   using string_detail::kLengthField;
-  const std::uint32_t size = serializationSize();
+  const uint32_t size = serializationSize();
   if (size == npos || size > string_detail::Remaining(cursor, limit)) {
     throw exception::BufferOverflow();
   }
@@ -66,16 +65,16 @@ void StringBase<T, O, E>::serialize(unsigned char*& cursor, const unsigned char*
   if constexpr (kIsWide) {
     WideToUtf8(m_begin, m_end, body, stop);
   } else {
-    std::memcpy(body, m_begin, size - kLengthField);
+    memcpy(body, m_begin, size - kLengthField);
   }
-  little_endian::SerializeRaw<std::uint32_t>(size - kLengthField, cursor, limit);
+  little_endian::SerializeRaw<uint32_t>(size - kLengthField, cursor, limit);
   cursor = stop;
 }
 
 template <class T, class O, class E>
 void StringBase<T, O, E>::deserialize(const unsigned char*& cursor, const unsigned char* limit) {
   const unsigned char* body = cursor;
-  const std::uint32_t n = string_detail::TakeLength(body, limit);
+  const uint32_t n = string_detail::TakeLength(body, limit);
   if constexpr (kIsWide) {
     const size_type count = GetUtf8StringLength(body, body + n);  // raises before anything changes
     fitBuffer(count);

@@ -361,7 +361,7 @@ TEST(String, BlocksGoBackToTheModuleAllocator) {
   wchar_t** const fields = reinterpret_cast<wchar_t**>(&s);
   DLLFree(fields[0]);
   wchar_t* const block = static_cast<wchar_t*>(DLLMalloc(4 * sizeof(wchar_t)));
-  std::wmemcpy(block, L"abc", 4);
+  wmemcpy(block, L"abc", 4);
   fields[0] = block;
   fields[1] = fields[2] = block + 3;
   EXPECT_TRUE(Is(s, L"abc", 3)) << "begin, end, capacityEnd, in that order";
@@ -372,7 +372,7 @@ TEST(String, GrowChecksItsArithmetic) {
   wchar_t* end = begin;
   wchar_t* capacityEnd = begin;
   const wchar_t* const before = begin;
-  for (const std::uint32_t required : {0x3FFFFFFFu, 0x80000000u, 0xFFFFFFFEu, 0xFFFFFFFFu}) {
+  for (const uint32_t required : {0x3FFFFFFFu, 0x80000000u, 0xFFFFFFFEu, 0xFFFFFFFFu}) {
     EXPECT_THROW(string_detail::Grow(required, begin, end, capacityEnd), exception::OutOfRange);
   }
   EXPECT_EQ(before, begin);

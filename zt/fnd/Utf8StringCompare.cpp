@@ -15,7 +15,7 @@ const unsigned char* OrEmpty(const unsigned char* s) {
 }
 
 const unsigned char* EndOf(const unsigned char* s) {
-  return s + std::strlen(reinterpret_cast<const char*>(s));
+  return s + strlen(reinterpret_cast<const char*>(s));
 }
 
 }  // namespace
@@ -32,7 +32,7 @@ int Utf8StringCompareInternal(const unsigned char* a, const unsigned char* aEnd,
       left = attributes.toUpper(left);
       right = attributes.toUpper(right);
     }
-    const int difference = std::wcsncmp(&left, &right, 1);
+    const int difference = wcsncmp(&left, &right, 1);
     if (difference != 0) return difference;
   }
   return osdep::LengthDifference(aEnd - a, bEnd - b);

@@ -28,7 +28,7 @@ constexpr auto kRowOfLead = [] {
   std::array<unsigned char, 0x80> rows{};
   unsigned char row = 0;
   for (unsigned lead = 0x80; lead <= 0xFF; ++lead) {
-    const std::size_t next = row + 1u;
+    const size_t next = row + 1u;
     if (next < std::size(kLeadRules) && kLeadRules[next].lead == lead) ++row;
     rows[lead - 0x80] = row;
   }
@@ -37,12 +37,12 @@ constexpr auto kRowOfLead = [] {
 
 // Decodes the sequence of a lead byte of 0x80 or more; s is below end.
 const unsigned char* DecodeSequence(const unsigned char* s, const unsigned char* end,
-                                    std::uint32_t& value) {
+                                    uint32_t& value) {
   const LeadRule rule = kLeadRules[kRowOfLead[*s - 0x80u]];
   if (rule.length == 0 || end - s < rule.length || s[1] < rule.leastSecond) {
     ZT_RAISE(exception::InvalidSequence());
   }
-  std::uint32_t result = *s++ & rule.valueMask;
+  uint32_t result = *s++ & rule.valueMask;
   unsigned bad = 0;  // one test at the end instead of one a byte
   const auto takeNext = [&] {
     bad |= (*s & 0xC0u) ^ 0x80u;
@@ -68,7 +68,7 @@ const unsigned char* DecodeSequence(const unsigned char* s, const unsigned char*
 }
 
 inline const unsigned char* DecodeOne(const unsigned char* s, const unsigned char* end,
-                                      std::uint32_t& value) {
+                                      uint32_t& value) {
   if (*s >= 0x80) return DecodeSequence(s, end, value);
   value = *s;
   return s + 1;
@@ -80,43 +80,43 @@ bool IsEmpty(const unsigned char* begin, const unsigned char* end) {
 
 }  // namespace
 
-std::uint32_t GetUtf8StringLength(const unsigned char* begin, const unsigned char* end) {
+uint32_t GetUtf8StringLength(const unsigned char* begin, const unsigned char* end) {
   if (IsEmpty(begin, end)) return 0;
-  std::uint64_t count = 0;
-  std::uint32_t ignored;
+  uint64_t count = 0;
+  uint32_t ignored;
   for (; begin != end; ++count) begin = DecodeOne(begin, end, ignored);
   if (count > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
-  return static_cast<std::uint32_t>(count);
+  return static_cast<uint32_t>(count);
 }
 
-std::uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* end,
-                                   wchar_t* dest, wchar_t* destEnd) {
+uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* end, wchar_t* dest,
+                              wchar_t* destEnd) {
   if (!dest || dest > destEnd) ZT_RAISE(exception::InvalidArgument());
   if (IsEmpty(begin, end)) return 0;
   const unsigned char* s = begin;
   wchar_t* out = dest;
-  std::uint32_t value;
+  uint32_t value;
   while (s != end && out != destEnd) {
     s = DecodeOne(s, end, value);
     *out++ = static_cast<wchar_t>(value);
   }
-  if (static_cast<std::uint64_t>(out - dest) > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
+  if (static_cast<uint64_t>(out - dest) > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
   begin = s;
-  return static_cast<std::uint32_t>(out - dest);
+  return static_cast<uint32_t>(out - dest);
 }
 
-std::uint32_t Utf8ToWide(const unsigned char* begin, const unsigned char* end, wchar_t* dest,
-                         wchar_t* destEnd) {
-  const std::uint32_t count = Utf8ToWideNoOverflow(begin, end, dest, destEnd);
+uint32_t Utf8ToWide(const unsigned char* begin, const unsigned char* end, wchar_t* dest,
+                    wchar_t* destEnd) {
+  const uint32_t count = Utf8ToWideNoOverflow(begin, end, dest, destEnd);
   if (!IsEmpty(begin, end)) ZT_RAISE(exception::BufferOverflow());
   return count;
 }
 
-wchar_t* Utf8ToWide(const unsigned char* s, std::uint32_t n) {
+wchar_t* Utf8ToWide(const unsigned char* s, uint32_t n) {
   const unsigned char* const end = s ? s + n : s;
-  const std::uint64_t size = static_cast<std::uint64_t>(GetUtf8StringLength(s, end)) + 1;
+  const uint64_t size = static_cast<uint64_t>(GetUtf8StringLength(s, end)) + 1;
   if (size * sizeof(wchar_t) > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
-  std::unique_ptr<wchar_t[]> text(new wchar_t[static_cast<std::size_t>(size)]);
+  std::unique_ptr<wchar_t[]> text(new wchar_t[static_cast<size_t>(size)]);
   text[Utf8ToWide(s, end, text.get(), text.get() + size - 1)] = L'\0';
   return text.release();
 }
@@ -125,7 +125,7 @@ const unsigned char* ConvertNextUtf8Character(const unsigned char* s, const unsi
                                               wchar_t& out) {
   out = L'\0';
   if (IsEmpty(s, end)) return s;
-  std::uint32_t value;
+  uint32_t value;
   s = DecodeOne(s, end, value);
   out = static_cast<wchar_t>(value);
   return s;

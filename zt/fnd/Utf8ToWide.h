@@ -21,22 +21,22 @@ namespace zt::fnd {
 
 // Wide characters that the bytes decode to; 0 for a null or empty range.
 // Throws InvalidSequence.
-std::uint32_t GetUtf8StringLength(const unsigned char* begin, const unsigned char* end);
+uint32_t GetUtf8StringLength(const unsigned char* begin, const unsigned char* end);
 
 // Decodes all of the range and returns the count. A null source produces nothing.
 // Throws InvalidArgument (dest null or above destEnd; tested first), InvalidSequence,
 // BufferOverflow (the destination ends first; it then holds what fits).
-std::uint32_t Utf8ToWide(const unsigned char* begin, const unsigned char* end, wchar_t* dest,
-                         wchar_t* destEnd);
+uint32_t Utf8ToWide(const unsigned char* begin, const unsigned char* end, wchar_t* dest,
+                    wchar_t* destEnd);
 
 // Decodes what fits, moves `begin` behind it and returns the count. `begin` stays where it was when
 // this throws InvalidArgument or InvalidSequence.
-std::uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* end,
-                                   wchar_t* dest, wchar_t* destEnd);
+uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* end, wchar_t* dest,
+                              wchar_t* destEnd);
 
 // The first n bytes decoded into a terminated block, which the caller frees by delete[]. A null s
 // gives an empty text. Throws InvalidSequence, OutOfRange, std::bad_alloc.
-wchar_t* Utf8ToWide(const unsigned char* s, std::uint32_t n);
+wchar_t* Utf8ToWide(const unsigned char* s, uint32_t n);
 
 // Decodes one character and returns the position behind it. At a null s and at the end `out` is 0
 // and s comes back. Throws InvalidSequence.

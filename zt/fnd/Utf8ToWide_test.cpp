@@ -21,7 +21,7 @@ std::wstring Decode(const Bytes& bytes) {
   const std::unique_ptr<unsigned char[]> exact(new unsigned char[bytes.size()]);
   std::copy(bytes.begin(), bytes.end(), exact.get());
   const unsigned char* const end = exact.get() + bytes.size();
-  const std::uint32_t n = GetUtf8StringLength(exact.get(), end);
+  const uint32_t n = GetUtf8StringLength(exact.get(), end);
   std::vector<wchar_t> out(n + 1, L'#');
   EXPECT_EQ(n, Utf8ToWide(exact.get(), end, out.data(), out.data() + n));
   EXPECT_EQ(L'#', out[n]) << "no terminator is written";
@@ -34,8 +34,7 @@ void ExpectInvalid(const Bytes& bytes) {
   wchar_t out[16];
   EXPECT_THROW(GetUtf8StringLength(begin, end), exception::InvalidSequence);
   EXPECT_THROW(Utf8ToWide(begin, end, out, out + 16), exception::InvalidSequence);
-  EXPECT_THROW(Utf8ToWide(begin, static_cast<std::uint32_t>(bytes.size())),
-               exception::InvalidSequence);
+  EXPECT_THROW(Utf8ToWide(begin, static_cast<uint32_t>(bytes.size())), exception::InvalidSequence);
   const unsigned char* cursor = begin;
   EXPECT_THROW(Utf8ToWideNoOverflow(cursor, end, out, out + 16), exception::InvalidSequence);
   EXPECT_EQ(begin, cursor);
@@ -112,8 +111,8 @@ TEST(Utf8ToWide, SequencesThatPassTheEndAreInvalid) {
                          {0xF0, 0x9F, 0x98, 0x80},
                          {0xFD, 0x80, 0x80, 0x80, 0x80, 0x80}};
   for (const Bytes& bytes : whole) {
-    for (std::size_t n = 1; n < bytes.size(); ++n) {
-      ExpectInvalid(Bytes(bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(n)));
+    for (size_t n = 1; n < bytes.size(); ++n) {
+      ExpectInvalid(Bytes(bytes.begin(), bytes.begin() + static_cast<ptrdiff_t>(n)));
     }
   }
 }
@@ -204,7 +203,7 @@ TEST(Utf8ToWide, EveryEncodableValueOutsideTheFiveByteFormComesBack) {
     if (value > 0x1FFFFF && value <= 0x3FFFFFF) continue;
     const wchar_t c = static_cast<wchar_t>(value);
     unsigned char bytes[6];
-    const std::uint32_t n = WideToUtf8(&c, &c + 1, bytes, bytes + 6);
+    const uint32_t n = WideToUtf8(&c, &c + 1, bytes, bytes + 6);
     wchar_t back;
     ASSERT_EQ(bytes + n, ConvertNextUtf8Character(bytes, bytes + n, back));
     ASSERT_EQ(c, back);

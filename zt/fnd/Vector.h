@@ -39,10 +39,8 @@ class Vector {
   const T* begin() const noexcept { return m_begin; }
   T* end() noexcept { return m_end; }
   const T* end() const noexcept { return m_end; }
-  std::uint32_t size() const noexcept { return static_cast<std::uint32_t>(m_end - m_begin); }
-  std::uint32_t capacity() const noexcept {
-    return static_cast<std::uint32_t>(m_capacityEnd - m_begin);
-  }
+  uint32_t size() const noexcept { return static_cast<uint32_t>(m_end - m_begin); }
+  uint32_t capacity() const noexcept { return static_cast<uint32_t>(m_capacityEnd - m_begin); }
   bool empty() const noexcept { return m_begin == m_end; }
   T& operator[](unsigned int i) noexcept { return m_begin[i]; }  // not checked
   const T& operator[](unsigned int i) const noexcept { return m_begin[i]; }
@@ -60,7 +58,7 @@ class Vector {
   void clear() noexcept;
 
  private:
-  std::uint32_t calculateNewCapacity() const;
+  uint32_t calculateNewCapacity() const;
 
   T* m_begin = nullptr;
   T* m_end = nullptr;
@@ -70,11 +68,11 @@ class Vector {
 namespace vector_detail {
 
 // The capacity that follows c. Throws OutOfRange.
-inline std::uint32_t NextCapacity(std::uint32_t c) {
+inline uint32_t NextCapacity(uint32_t c) {
   bool overflow;
-  SafeInteger<std::uint32_t> doubled(c);
+  SafeInteger<uint32_t> doubled(c);
   doubled.multiplyByTwoNoThrow(overflow);
-  std::uint32_t next = doubled.get() + 1;
+  uint32_t next = doubled.get() + 1;
   if (next == 0xFFFFFFFFu || next < c) ZT_RAISE(exception::OutOfRange());
   return next;
 }
@@ -83,9 +81,9 @@ inline std::uint32_t NextCapacity(std::uint32_t c) {
 template <class T>
 class Builder {
  public:
-  explicit Builder(std::uint32_t capacity)
+  explicit Builder(uint32_t capacity)
       : m_begin(static_cast<T*>(
-            DLLMalloc(SafeInteger<std::uint32_t>::Multiply(capacity, NarrowSize(sizeof(T)))))),
+            DLLMalloc(SafeInteger<uint32_t>::Multiply(capacity, NarrowSize(sizeof(T)))))),
         m_end(m_begin) {}
   ~Builder() {
     std::destroy(m_begin, m_end);
@@ -106,9 +104,7 @@ class Builder {
   }
 
  private:
-  static constexpr std::uint32_t NarrowSize(std::size_t size) {
-    return static_cast<std::uint32_t>(size);
-  }
+  static constexpr uint32_t NarrowSize(size_t size) { return static_cast<uint32_t>(size); }
 
   T* m_begin;
   T* m_end;
@@ -126,7 +122,7 @@ Vector<T>::Vector(const Vector& other) {
 }
 
 template <class T>
-std::uint32_t Vector<T>::calculateNewCapacity() const {
+uint32_t Vector<T>::calculateNewCapacity() const {
   return vector_detail::NextCapacity(capacity());
 }
 
@@ -137,7 +133,7 @@ void Vector<T>::push_back(const T& value) {
     ++m_end;
     return;
   }
-  std::uint32_t newCapacity = calculateNewCapacity();
+  uint32_t newCapacity = calculateNewCapacity();
   vector_detail::Builder<T> block(newCapacity);
   for (const T& old : *this) block.add(old);
   block.add(value);

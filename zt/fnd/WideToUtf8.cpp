@@ -10,13 +10,13 @@ namespace {
 
 bool IsEmpty(const wchar_t* begin, const wchar_t* end) { return !begin || begin >= end; }
 
-const wchar_t* EndOf(const wchar_t* s) { return s ? s + std::wcslen(s) : s; }
+const wchar_t* EndOf(const wchar_t* s) { return s ? s + wcslen(s) : s; }
 
 // Whether wchar_t is signed differs between processors; the bits decide.
-std::uint32_t ValueOf(wchar_t c) { return static_cast<std::uint32_t>(c); }
+uint32_t ValueOf(wchar_t c) { return static_cast<uint32_t>(c); }
 
 // An unencodable value counts as the one byte of its "?".
-unsigned EncodedBytes(std::uint32_t value) {
+unsigned EncodedBytes(uint32_t value) {
   if (value <= 0x7F || value > 0x7FFFFFFF) return 1;
   if (value <= 0x7FF) return 2;
   if (value <= 0xFFFF) return 3;
@@ -25,7 +25,7 @@ unsigned EncodedBytes(std::uint32_t value) {
 }
 
 // Writes the sequence of a value of `count` bytes and returns the place behind it.
-unsigned char* EncodeOne(std::uint32_t value, unsigned count, unsigned char* dest) {
+unsigned char* EncodeOne(uint32_t value, unsigned count, unsigned char* dest) {
   if (count == 1) {
     *dest = value > 0x7F ? '?' : static_cast<unsigned char>(value);
     return dest + 1;
@@ -38,26 +38,26 @@ unsigned char* EncodeOne(std::uint32_t value, unsigned count, unsigned char* des
   return dest + count;
 }
 
-std::uint32_t Checked(std::uint64_t count) {
+uint32_t Checked(uint64_t count) {
   if (count > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
-  return static_cast<std::uint32_t>(count);
+  return static_cast<uint32_t>(count);
 }
 
 }  // namespace
 
-std::uint32_t GetUtf8EncodingBytes(const wchar_t* s) { return GetUtf8EncodingBytes(s, EndOf(s)); }
+uint32_t GetUtf8EncodingBytes(const wchar_t* s) { return GetUtf8EncodingBytes(s, EndOf(s)); }
 
-std::uint32_t GetUtf8EncodingBytes(const wchar_t* begin, const wchar_t* end) {
+uint32_t GetUtf8EncodingBytes(const wchar_t* begin, const wchar_t* end) {
   if (IsEmpty(begin, end)) return 0;
-  std::uint64_t count = 0;
+  uint64_t count = 0;
   for (; begin != end; ++begin) count += EncodedBytes(ValueOf(*begin));
   return Checked(count);
 }
 
-std::uint32_t GetUtf8EncodingBytesWithBufferLimit(const wchar_t* begin, const wchar_t* end,
-                                                  std::uint32_t limit) {
+uint32_t GetUtf8EncodingBytesWithBufferLimit(const wchar_t* begin, const wchar_t* end,
+                                             uint32_t limit) {
   if (IsEmpty(begin, end)) return 0;
-  std::uint32_t count = 0;
+  uint32_t count = 0;
   for (; begin != end; ++begin) {
     const unsigned bytes = EncodedBytes(ValueOf(*begin));
     if (bytes > limit - count) break;
@@ -66,37 +66,37 @@ std::uint32_t GetUtf8EncodingBytesWithBufferLimit(const wchar_t* begin, const wc
   return count;
 }
 
-std::uint32_t WideToUtf8NoOverflow(const wchar_t*& begin, const wchar_t* end, unsigned char* dest,
-                                   unsigned char* destEnd) {
+uint32_t WideToUtf8NoOverflow(const wchar_t*& begin, const wchar_t* end, unsigned char* dest,
+                              unsigned char* destEnd) {
   if (!dest || dest > destEnd) ZT_RAISE(exception::InvalidArgument());
   if (IsEmpty(begin, end)) return 0;
   const wchar_t* s = begin;
   unsigned char* out = dest;
   for (; s != end && out != destEnd; ++s) {
-    const std::uint32_t value = ValueOf(*s);
+    const uint32_t value = ValueOf(*s);
     if (value <= 0x7F) {
       *out++ = static_cast<unsigned char>(value);
       continue;
     }
     const unsigned count = EncodedBytes(value);
-    if (static_cast<std::ptrdiff_t>(count) > destEnd - out) break;
+    if (static_cast<ptrdiff_t>(count) > destEnd - out) break;
     out = EncodeOne(value, count, out);
   }
-  const std::uint32_t written = Checked(static_cast<std::uint64_t>(out - dest));
+  const uint32_t written = Checked(static_cast<uint64_t>(out - dest));
   begin = s;
   return written;
 }
 
-std::uint32_t WideToUtf8(const wchar_t* begin, const wchar_t* end, unsigned char* dest,
-                         unsigned char* destEnd) {
-  const std::uint32_t written = WideToUtf8NoOverflow(begin, end, dest, destEnd);
+uint32_t WideToUtf8(const wchar_t* begin, const wchar_t* end, unsigned char* dest,
+                    unsigned char* destEnd) {
+  const uint32_t written = WideToUtf8NoOverflow(begin, end, dest, destEnd);
   if (!IsEmpty(begin, end)) ZT_RAISE(exception::BufferOverflow());
   return written;
 }
 
 unsigned char* WideToUtf8(const wchar_t* begin, const wchar_t* end) {
-  const std::uint32_t count = GetUtf8EncodingBytes(begin, end);
-  const std::size_t size = Checked(static_cast<std::uint64_t>(count) + 1);
+  const uint32_t count = GetUtf8EncodingBytes(begin, end);
+  const size_t size = Checked(static_cast<uint64_t>(count) + 1);
   std::unique_ptr<unsigned char[]> text(new unsigned char[size]);
   text[WideToUtf8(begin, end, text.get(), text.get() + count)] = 0;
   return text.release();

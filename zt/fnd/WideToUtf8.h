@@ -12,22 +12,22 @@ namespace zt::fnd {
 // Output holds whole sequences only, and is never terminated except in the new[] forms.
 
 // Bytes of the encoding; 0 for null. Throws OutOfRange past 32 bits.
-std::uint32_t GetUtf8EncodingBytes(const wchar_t* s);
-std::uint32_t GetUtf8EncodingBytes(const wchar_t* begin, const wchar_t* end);
+uint32_t GetUtf8EncodingBytes(const wchar_t* s);
+uint32_t GetUtf8EncodingBytes(const wchar_t* begin, const wchar_t* end);
 
 // The same, but counting stops at the first character that would pass `limit`.
-std::uint32_t GetUtf8EncodingBytesWithBufferLimit(const wchar_t* begin, const wchar_t* end,
-                                                  std::uint32_t limit);
+uint32_t GetUtf8EncodingBytesWithBufferLimit(const wchar_t* begin, const wchar_t* end,
+                                             uint32_t limit);
 
 // Encodes all of the range and returns the byte count. A null source produces nothing.
 // Throws InvalidArgument (dest null or above destEnd; tested first), BufferOverflow (the
 // destination ends first; it then holds what fits).
-std::uint32_t WideToUtf8(const wchar_t* begin, const wchar_t* end, unsigned char* dest,
-                         unsigned char* destEnd);
+uint32_t WideToUtf8(const wchar_t* begin, const wchar_t* end, unsigned char* dest,
+                    unsigned char* destEnd);
 
 // Encodes what fits, moves `begin` behind it and returns the byte count. Throws InvalidArgument.
-std::uint32_t WideToUtf8NoOverflow(const wchar_t*& begin, const wchar_t* end, unsigned char* dest,
-                                   unsigned char* destEnd);
+uint32_t WideToUtf8NoOverflow(const wchar_t*& begin, const wchar_t* end, unsigned char* dest,
+                              unsigned char* destEnd);
 
 // A terminated block, which the caller frees by delete[]. Null gives an empty text.
 // Throws OutOfRange, std::bad_alloc.

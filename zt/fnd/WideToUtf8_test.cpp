@@ -14,7 +14,7 @@ namespace {
 
 std::string Encode(const std::wstring& text) {
   const wchar_t* const end = text.data() + text.size();
-  const std::uint32_t n = GetUtf8EncodingBytes(text.data(), end);
+  const uint32_t n = GetUtf8EncodingBytes(text.data(), end);
   std::vector<unsigned char> out(n + 1, '#');
   EXPECT_EQ(n, WideToUtf8(text.data(), end, out.data(), out.data() + n));
   EXPECT_EQ('#', out[n]) << "no terminator is written";

@@ -7,8 +7,8 @@ int AtomicInt::getCount() const { return m_value.load(); }
 namespace {
 
 // Unsigned, as the signed sum could overflow.
-int Sum(std::int32_t value, std::uint32_t n) {
-  return static_cast<std::int32_t>(static_cast<std::uint32_t>(value) + n);
+int Sum(int32_t value, uint32_t n) {
+  return static_cast<int32_t>(static_cast<uint32_t>(value) + n);
 }
 
 }  // namespace

@@ -28,7 +28,7 @@ class AtomicInt {
   bool operator>=(int value) const { return getCount() >= value; }
 
  private:
-  std::atomic<std::int32_t> m_value;
+  std::atomic<int32_t> m_value;
   [[maybe_unused]] void* m_reserved =
       nullptr;  // of the size that objects with a number in them have always had
 };

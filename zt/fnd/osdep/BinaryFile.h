@@ -17,15 +17,9 @@ class BinaryFile {
  public:
   // Bits of open(): exactly these flags of the system together, so that Read with Write is
   // write-only. A file made by Create has mode 0600 under the umask.
-  enum class Mode : std::uint32_t {
-    Read = 1,
-    Write = 2,
-    ReadWrite = 4,
-    Truncate = 8,
-    Create = 0x10
-  };
+  enum class Mode : uint32_t { Read = 1, Write = 2, ReadWrite = 4, Truncate = 8, Create = 0x10 };
   friend constexpr Mode operator|(Mode a, Mode b) {
-    return static_cast<Mode>(static_cast<std::uint32_t>(a) | static_cast<std::uint32_t>(b));
+    return static_cast<Mode>(static_cast<uint32_t>(a) | static_cast<uint32_t>(b));
   }
   enum class Origin : int { Begin = 0, Current = 1, End = 2 };
   enum class Endianness : int { Little = 0, Big = 1 };
@@ -63,17 +57,17 @@ class BinaryFile {
 
   // A 32-bit length, then that many bytes: length plus 4, or -1. Lengths above 0x7FFFFFFF fail, in
   // writing with nothing written. A failed read leaves position and buffer as they were.
-  std::int64_t readByteVector(AutoBuffer& buffer, Endianness order);
-  std::int64_t writeByteVector(const BufferWrapper& bytes, Endianness order);
+  int64_t readByteVector(AutoBuffer& buffer, Endianness order);
+  int64_t writeByteVector(const BufferWrapper& bytes, Endianness order);
 
   // The new position, or -1.
-  std::int64_t seek(std::int64_t offset, Origin origin) const;
+  int64_t seek(int64_t offset, Origin origin) const;
   // Throw PosixError.
-  void resize(std::int64_t size);
+  void resize(int64_t size);
   void sync();
 
  private:
-  std::int32_t m_fd;
+  int32_t m_fd;
 };
 
 }  // namespace zt::fnd::osdep

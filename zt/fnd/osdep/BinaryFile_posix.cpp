@@ -21,7 +21,7 @@ using zt::posix::ScopedFd;
 namespace zt::fnd::osdep {
 namespace {
 
-constexpr std::uint32_t kTopBit = 0x80000000u;
+constexpr uint32_t kTopBit = 0x80000000u;
 constexpr unsigned int kCheckedReadSize = 1u << 20;
 
 static_assert(static_cast<int>(BinaryFile::Origin::Begin) == SEEK_SET);
@@ -39,7 +39,7 @@ int OpenFlags(BinaryFile::Mode mode) {
                 {BinaryFile::Mode::Create, O_CREAT}};
   int flags = O_CLOEXEC;
   for (const auto& entry : kFlags) {
-    if (static_cast<std::uint32_t>(mode) & static_cast<std::uint32_t>(entry.bit)) {
+    if (static_cast<uint32_t>(mode) & static_cast<uint32_t>(entry.bit)) {
       flags |= entry.flag;
     }
   }
@@ -57,7 +57,7 @@ bool EndsBefore(int fd, unsigned int n) {
   struct stat info;
   off_t position = ::lseek(fd, 0, SEEK_CUR);
   return position >= 0 && ::fstat(fd, &info) == 0 && S_ISREG(info.st_mode) &&
-         static_cast<std::int64_t>(info.st_size) - position < static_cast<std::int64_t>(n);
+         static_cast<int64_t>(info.st_size) - position < static_cast<int64_t>(n);
 }
 
 // Makes room behind the buffer's bytes; null if that fails.
@@ -72,7 +72,7 @@ unsigned char* MakeRoom(AutoBuffer& buffer, unsigned int n) {
   return buffer.Data() + length;
 }
 
-std::uint32_t InOrder(std::uint32_t value, BinaryFile::Endianness order) {
+uint32_t InOrder(uint32_t value, BinaryFile::Endianness order) {
   return order == BinaryFile::Endianness::Little ? value : big_endian::ToBigEndian(value);
 }
 
@@ -159,32 +159,32 @@ int BinaryFile::WriteExactSize(int fd, const void* bytes, unsigned long n) {
   return zt::posix::WriteAll(fd, bytes, n) ? FullCount(n) : -1;
 }
 
-std::int64_t BinaryFile::readByteVector(AutoBuffer& buffer, Endianness order) {
-  std::uint32_t length;
+int64_t BinaryFile::readByteVector(AutoBuffer& buffer, Endianness order) {
+  uint32_t length;
   if (readExactSize(&length, sizeof length) < 0) return -1;
   length = InOrder(length, order);
   if ((length & kTopBit) == 0 && readExactSize(buffer, length) >= 0) {
-    return static_cast<std::int64_t>(length) + 4;
+    return static_cast<int64_t>(length) + 4;
   }
   int failure = errno;
-  seek(-static_cast<std::int64_t>(sizeof length), Origin::Current);
+  seek(-static_cast<int64_t>(sizeof length), Origin::Current);
   errno = failure;
   return -1;
 }
 
-std::int64_t BinaryFile::writeByteVector(const BufferWrapper& bytes, Endianness order) {
+int64_t BinaryFile::writeByteVector(const BufferWrapper& bytes, Endianness order) {
   if (bytes.Len() >= kTopBit) return -1;
-  std::uint32_t length = InOrder(bytes.Len(), order);
+  uint32_t length = InOrder(bytes.Len(), order);
   if (writeExactSize(&length, sizeof length) < 0) return -1;
   if (writeExactSize(bytes.Data(), bytes.Len()) < 0) return -1;
-  return static_cast<std::int64_t>(bytes.Len()) + 4;
+  return static_cast<int64_t>(bytes.Len()) + 4;
 }
 
-std::int64_t BinaryFile::seek(std::int64_t offset, Origin origin) const {
+int64_t BinaryFile::seek(int64_t offset, Origin origin) const {
   return ::lseek(m_fd, offset, static_cast<int>(origin));
 }
 
-void BinaryFile::resize(std::int64_t size) {
+void BinaryFile::resize(int64_t size) {
   if (!isOpen()) return;
   if (RetryEintr([&] { return ::ftruncate(m_fd, size); }) != 0) ZT_RAISE(PosixError());
 }

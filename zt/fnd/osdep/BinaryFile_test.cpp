@@ -48,7 +48,7 @@ struct Opened {
     WriteBytes(path, bytes);
     file.open(Wide(path), Mode::ReadWrite);
   }
-  std::int64_t position() const { return file.seek(0, Origin::Current); }
+  int64_t position() const { return file.seek(0, Origin::Current); }
 };
 
 TEST(BinaryFile, ModeBitsHaveTheirValues) {
@@ -176,7 +176,7 @@ TEST(BinaryFile, ExactReadIsAllOrNothing) {
   Opened o("abcdef");
   char bytes[10];
   EXPECT_EQ(4, o.file.readExactSize(bytes, 4));
-  EXPECT_EQ(0, std::memcmp(bytes, "abcd", 4));
+  EXPECT_EQ(0, memcmp(bytes, "abcd", 4));
   EXPECT_EQ(-1, o.file.readExactSize(bytes, 3));
   EXPECT_EQ(4, o.position());
   AutoBuffer buffer(BufferWrapper("xy", 2));
@@ -334,7 +334,7 @@ TEST(BinaryFile, SeekResizeSync) {
   EXPECT_EQ(std::string("ab\0\0", 4), ReadBytes(o.path));
   EXPECT_EQ(EINVAL, PosixErrorOf([&] { o.file.resize(-1); }));
   o.file.sync();
-  const std::int64_t large = 5000000000;
+  const int64_t large = 5000000000;
   o.file.resize(large);
   EXPECT_EQ(large, o.file.seek(0, Origin::End));
   int fds[2];

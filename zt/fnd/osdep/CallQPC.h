@@ -11,13 +11,13 @@ class CallQPC {
 
   // Ticks of `unit` nanoseconds: 1000000 gives milliseconds. Above 1000000000 always 0; 0 is not
   // allowed, and gives 0.
-  std::uint64_t hires(unsigned int unit) const;
+  uint64_t hires(unsigned int unit) const;
 
   // The same for a given reading of the clock; exact, without overflow on the way.
-  std::uint64_t convert(std::uint64_t ticks, unsigned int unit) const;
+  uint64_t convert(uint64_t ticks, unsigned int unit) const;
 
  private:
-  std::uint64_t m_rate;
+  uint64_t m_rate;
 };
 
 }  // namespace zt::fnd::osdep

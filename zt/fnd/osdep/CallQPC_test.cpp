@@ -10,11 +10,11 @@ namespace {
 
 TEST(CallQPC, UnitIsTheTickLengthInNanoseconds) {
   CallQPC clock;
-  const std::uint64_t ticks = 12345678901ull;  // 12.345678901 seconds
+  const uint64_t ticks = 12345678901ull;  // 12.345678901 seconds
   ASSERT_EQ(1000000000u, MonotonicTicksPerSecond());
   const struct {
     unsigned int unit;
-    std::uint64_t count;
+    uint64_t count;
   } rows[] = {{100, 123456789}, {1000, 12345678}, {1000000, 12345},
               {1000000000, 12}, {1, ticks},       {3, 4115226296ull},  // factor 333333333
               {1000000001, 0},  {0xFFFFFFFFu, 0}, {0, 0}};
@@ -23,7 +23,7 @@ TEST(CallQPC, UnitIsTheTickLengthInNanoseconds) {
 
 TEST(CallQPC, LargeReadingsDoNotOverflow) {
   CallQPC clock;
-  const std::uint64_t all = ~std::uint64_t(0);
+  const uint64_t all = ~uint64_t(0);
   EXPECT_EQ(all, clock.convert(all, 1));
   EXPECT_EQ(all / 1000, clock.convert(all, 1000));
   EXPECT_EQ(all / 1000000000, clock.convert(all, 1000000000));
@@ -31,9 +31,9 @@ TEST(CallQPC, LargeReadingsDoNotOverflow) {
 
 TEST(CallQPC, ReadingsGoUpWithTime) {
   CallQPC clock;
-  std::uint64_t before = clock.hires(1000000);
+  uint64_t before = clock.hires(1000000);
   Sleep(30);
-  std::uint64_t passed = clock.hires(1000000) - before;
+  uint64_t passed = clock.hires(1000000) - before;
   EXPECT_GE(passed, 29u);
   EXPECT_LT(passed, 10000u);
 }

@@ -50,7 +50,7 @@ class CloseOnForkFd {
 
  private:
   int m_fd = -1;
-  std::uint64_t m_serial = 0;  // of the opening
+  uint64_t m_serial = 0;  // of the opening
   FileIdentity m_file;
   ProcessMark m_process;
   bool m_kept = false;

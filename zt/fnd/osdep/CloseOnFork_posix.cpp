@@ -22,12 +22,12 @@ namespace {
 pthread_once_t s_once = PTHREAD_ONCE_INIT;
 constinit PosixMutex s_lock;  // innermost of all locks
 struct Mark {
-  std::uint64_t serial = 0;  // of the opening that the number belongs to; 0 for none
-  FileIdentity file;         // which it leads to, unless the host has closed it
+  uint64_t serial = 0;  // of the opening that the number belongs to; 0 for none
+  FileIdentity file;    // which it leads to, unless the host has closed it
   bool closesInChild = false;
 };
 std::vector<Mark>* s_marks GUARDED_BY(s_lock) = nullptr;  // by descriptor number
-std::uint64_t s_serial GUARDED_BY(s_lock) = 0;
+uint64_t s_serial GUARDED_BY(s_lock) = 0;
 unsigned s_forks GUARDED_BY(s_lock) = 0;
 
 void BeforeFork() ACQUIRE(s_lock) {
@@ -39,7 +39,7 @@ void InParent() RELEASE(s_lock) { s_lock.unlock(); }
 
 // Makes system calls only, as other threads may have been anywhere at the fork.
 void InChild() RELEASE(s_lock) {
-  for (std::size_t fd = 0; s_marks && fd < s_marks->size(); ++fd) {
+  for (size_t fd = 0; s_marks && fd < s_marks->size(); ++fd) {
     Mark& mark = (*s_marks)[fd];
     if (!mark.closesInChild) continue;
     if (mark.file.isBehind(static_cast<int>(fd))) ::close(static_cast<int>(fd));
@@ -57,19 +57,19 @@ unsigned ForksSoFar() {
 
 // Marks the descriptor and returns its serial number; 0 if there was a fork since the count was
 // taken, which may have copied it.
-std::uint64_t MarkIfNoFork(int fd, const FileIdentity& file, unsigned forks) {
+uint64_t MarkIfNoFork(int fd, const FileIdentity& file, unsigned forks) {
   Hold hold(s_lock);
   if (s_forks != forks) return 0;
   if (!s_marks) s_marks = new std::vector<Mark>;
-  std::size_t index = static_cast<std::size_t>(fd);
+  size_t index = static_cast<size_t>(fd);
   if (s_marks->size() <= index) s_marks->resize(index + 64);
   (*s_marks)[index] = Mark{++s_serial, file, true};
   return s_serial;
 }
 
 // The mark of this opening; null if another has the number.
-Mark* FindMark(int fd, std::uint64_t serial) noexcept REQUIRES(s_lock) {
-  std::size_t index = static_cast<std::size_t>(fd);
+Mark* FindMark(int fd, uint64_t serial) noexcept REQUIRES(s_lock) {
+  size_t index = static_cast<size_t>(fd);
   if (!s_marks || index >= s_marks->size()) return nullptr;
   Mark& mark = (*s_marks)[index];
   return mark.serial == serial ? &mark : nullptr;

@@ -12,7 +12,7 @@ struct UnixCriticalSection::Block {
   // Atomic, because threads that are not the owner compare it with themselves.
   std::atomic<pthread_t> owner{pthread_t()};
   pthread_mutex_t mutex;
-  std::atomic<std::int32_t> count{0};
+  std::atomic<int32_t> count{0};
 
   void recordOwner() {
     owner.store(pthread_self(), std::memory_order_relaxed);
@@ -49,7 +49,7 @@ bool UnixCriticalSection::tryEnter() const {
 
 void UnixCriticalSection::leave() const {
   if (!inOwningThread()) return;
-  std::int32_t count = m_block->count.load(std::memory_order_relaxed);
+  int32_t count = m_block->count.load(std::memory_order_relaxed);
   if (count > 0) m_block->count.store(--count, std::memory_order_relaxed);
   if (count == 0) m_block->owner.store(pthread_t(), std::memory_order_relaxed);
   pthread_mutex_unlock(&m_block->mutex);

@@ -13,7 +13,7 @@ namespace zt::fnd::osdep {
 namespace {
 
 constexpr unsigned kMostDigits = 3;
-constexpr std::size_t kTextSize = 512;
+constexpr size_t kTextSize = 512;
 constexpr unsigned kPowersOfTen[kMostDigits + 1] = {1, 10, 100, 1000};
 
 const AbsTime::Value kUnixEpoch(static_cast<long long>(AbsTime::kUnixEpoch));
@@ -27,7 +27,7 @@ struct SystemTimes {
 String SeparatorText(int separator) {
   if (separator == 1) return L".";
   if (separator == 2) return L",";
-  return String(std::localeconv()->decimal_point);
+  return String(localeconv()->decimal_point);
 }
 
 // The separator and the decimals of the time, which moves on by a second where they round up to 1.
@@ -63,18 +63,18 @@ String Join(const String& first, const String& second) {
   return first.empty() || second.empty() ? first + second : first + L" " + second;
 }
 
-String Format(const std::tm& fields, const String& format) {
+String Format(const tm& fields, const String& format) {
   char text[kTextSize];
   const AnsiString narrow(format);
   Hold hold(LeakedInstance<SystemTimes>().lock);
-  const std::size_t n = std::strftime(text, sizeof text, narrow.c_str(), &fields);
+  const size_t n = strftime(text, sizeof text, narrow.c_str(), &fields);
   return String(static_cast<const char*>(text), static_cast<String::size_type>(n));
 }
 
 template <class BreakDown>
-std::tm ToFields(const AbsTime& time, bool round, BreakDown breakDown) {
-  const std::time_t seconds = static_cast<std::time_t>(time.toTime_T(round));
-  std::tm fields;
+tm ToFields(const AbsTime& time, bool round, BreakDown breakDown) {
+  const time_t seconds = static_cast<time_t>(time.toTime_T(round));
+  tm fields;
   Hold hold(LeakedInstance<SystemTimes>().lock);
   if (!breakDown(&seconds, &fields)) ZT_RAISE(exception::OutOfRange());
   return fields;
@@ -82,19 +82,19 @@ std::tm ToFields(const AbsTime& time, bool round, BreakDown breakDown) {
 
 String SystemFormat(const wchar_t* format) {
   Hold hold(LeakedInstance<SystemTimes>().lock);
-  std::setlocale(LC_TIME, "");
+  setlocale(LC_TIME, "");
   return String(format);
 }
 
-static_assert(sizeof(std::time_t) == sizeof(std::int64_t), "times pass 2038");
+static_assert(sizeof(time_t) == sizeof(int64_t), "times pass 2038");
 
 }  // namespace
 
 AbsTime TimevalToAbsTime(const timeval& time) {
   // Unsigned, where a clock far outside all calendars wraps instead of trapping.
-  const std::uint64_t micros =
-      static_cast<std::uint64_t>(time.tv_sec) * 1000000 + static_cast<std::uint64_t>(time.tv_usec);
-  AbsTime::Value value(static_cast<std::int64_t>(micros));
+  const uint64_t micros =
+      static_cast<uint64_t>(time.tv_sec) * 1000000 + static_cast<uint64_t>(time.tv_usec);
+  AbsTime::Value value(static_cast<int64_t>(micros));
   tSSTimeValue::_CorrectUnits(tSSTimeValue::kToSeconds, nZTSS100::kTimeUnitMicro, value, nullptr);
   value += kUnixEpoch;
   return AbsTime(value);
@@ -106,13 +106,11 @@ AbsTime CurrentSystemTime() {
   return TimevalToAbsTime(now);
 }
 
-std::tm AbsTimeToLocalDateTime(const AbsTime& time, bool round) {
+tm AbsTimeToLocalDateTime(const AbsTime& time, bool round) {
   return ToFields(time, round, localtime_r);
 }
 
-std::tm AbsTimeToUTCDateTime(const AbsTime& time, bool round) {
-  return ToFields(time, round, gmtime_r);
-}
+tm AbsTimeToUTCDateTime(const AbsTime& time, bool round) { return ToFields(time, round, gmtime_r); }
 
 String AbsTimeToString(AbsTime time, const wchar_t* dateFormat, const wchar_t* timeFormat,
                        unsigned int fractionDigits, TimeStringType type, bool timeFirst,

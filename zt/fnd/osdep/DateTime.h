@@ -15,10 +15,10 @@ AbsTime TimevalToAbsTime(const timeval& time);
 
 // Calendar fields of a time in whole seconds, truncated or rounded as AbsTime::toTime_T does.
 // Throw OutOfRange for a year that the C library cannot hold.
-std::tm AbsTimeToLocalDateTime(const AbsTime& time, bool round);
-std::tm AbsTimeToUTCDateTime(const AbsTime& time, bool round);
+tm AbsTimeToLocalDateTime(const AbsTime& time, bool round);
+tm AbsTimeToUTCDateTime(const AbsTime& time, bool round);
 
-enum TimeStringType : std::int32_t { kTimeUTC = 0, kTimeLocal = 1, kTimeLocal2 = 2 };
+enum TimeStringType : int32_t { kTimeUTC = 0, kTimeLocal = 1, kTimeLocal2 = 2 };
 
 // Text of a time, by two strftime formats with a blank between them.
 //

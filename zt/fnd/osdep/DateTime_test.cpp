@@ -149,8 +149,8 @@ TEST(DateTimeText, SystemFormatsTakeTheTimeLocaleFromTheEnvironment) {
   const ScopedLocale locale(LC_TIME, "C");
   setenv("LC_ALL", "C.UTF-8", 1);
   GetSystemDateFormat();
-  EXPECT_STREQ("C.UTF-8", std::setlocale(LC_TIME, nullptr));
-  EXPECT_STREQ("C", std::setlocale(LC_CTYPE, nullptr)) << "and nothing else";
+  EXPECT_STREQ("C.UTF-8", setlocale(LC_TIME, nullptr));
+  EXPECT_STREQ("C", setlocale(LC_CTYPE, nullptr)) << "and nothing else";
   unsetenv("LC_ALL");
 }
 
@@ -158,7 +158,7 @@ TEST(DateTimeText, ExplicitFormatsLeaveTheLocaleAlone) {
   const ScopedLocale locale(LC_TIME, "C");
   setenv("LC_ALL", "C.UTF-8", 1);
   Text(At(kSeconds), L"%Y", L"%H", 3);
-  EXPECT_STREQ("C", std::setlocale(LC_TIME, nullptr));
+  EXPECT_STREQ("C", setlocale(LC_TIME, nullptr));
   unsetenv("LC_ALL");
 }
 
@@ -181,7 +181,7 @@ TEST(DateTimeFields, RoundOrTruncate) {
   const std::tm fields = AbsTimeToUTCDateTime(At(0), false);
   EXPECT_EQ(70, fields.tm_year);
   EXPECT_EQ(4, fields.tm_wday);
-  const std::tm old = AbsTimeToUTCDateTime(AbsTime(), false);
+  const tm old = AbsTimeToUTCDateTime(AbsTime(), false);
   EXPECT_EQ(4, old.tm_year);
   EXPECT_EQ(1, old.tm_mday);
 }
@@ -213,7 +213,7 @@ TEST(DateTimeClock, TimevalKeepsItsMicroseconds) {
 TEST(DateTimeClock, CurrentTimeIsNow) {
   const std::int64_t before = std::time(nullptr);
   const AbsTime now = CurrentSystemTime();
-  const std::int64_t after = std::time(nullptr);
+  const int64_t after = std::time(nullptr);
   EXPECT_LE(before, now.toTime_T(false));
   EXPECT_GE(after, now.toTime_T(false));
 }

@@ -8,7 +8,7 @@
 namespace zt::fnd::osdep {
 
 // A Unix time.
-AbsTime Time_TtoAbsTime(std::time_t seconds);
+AbsTime Time_TtoAbsTime(time_t seconds);
 
 // When the file was last written to, links followed, in whole seconds: finer parts are dropped,
 // because stored stamps are compared with this one. AbsTime::min if the file cannot be asked.

@@ -10,8 +10,8 @@ using zt::posix::RetryEintr;
 
 namespace zt::fnd::osdep {
 
-AbsTime Time_TtoAbsTime(std::time_t seconds) {
-  AbsTime::Value value(static_cast<std::int64_t>(seconds));
+AbsTime Time_TtoAbsTime(time_t seconds) {
+  AbsTime::Value value(static_cast<int64_t>(seconds));
   value += AbsTime::Value(AbsTime::kUnixEpoch);
   return AbsTime(value);
 }

@@ -15,7 +15,7 @@ namespace zt::fnd::osdep {
 // directory, "/" and the name, in the order in which the system lists them. Threads: any.
 class FindFiles {
  public:
-  enum class FindFlags : std::uint32_t {
+  enum class FindFlags : uint32_t {
     None = 0,
     Hidden = 1,       // names that begin with "." too, but never "." and ".."
     Directories = 2,  // directories only, ending in "/"; a relative mask then finds nothing
@@ -23,7 +23,7 @@ class FindFiles {
     DotEntries = 8,   // directory + "/." and directory + "/.." at the end, whatever the pattern
   };
   friend constexpr FindFlags operator|(FindFlags a, FindFlags b) {
-    return static_cast<FindFlags>(static_cast<std::uint32_t>(a) | static_cast<std::uint32_t>(b));
+    return static_cast<FindFlags>(static_cast<uint32_t>(a) | static_cast<uint32_t>(b));
   }
 
   // Without flags a directory that cannot be listed gives an empty list; with them it throws

@@ -18,7 +18,7 @@ using ScopedDir = std::unique_ptr<DIR, int (*)(DIR*)>;
 enum class Errors { Quiet, Thrown };
 
 bool Has(Flags flags, Flags flag) {
-  return (static_cast<std::uint32_t>(flags) & static_cast<std::uint32_t>(flag)) != 0;
+  return (static_cast<uint32_t>(flags) & static_cast<uint32_t>(flag)) != 0;
 }
 
 bool SameCharacter(wchar_t a, wchar_t b) {

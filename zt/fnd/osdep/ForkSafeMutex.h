@@ -62,7 +62,7 @@ class CAPABILITY("mutex") ForkSafeMutex {
   pthread_mutex_t m_mutex = PTHREAD_MUTEX_INITIALIZER;
   std::atomic<pthread_t> m_owner{};
   std::atomic<bool> m_owned{false};
-  std::uint32_t m_depth = 0;  // the owner's
+  uint32_t m_depth = 0;  // the owner's
   std::atomic<bool> m_interrupted{false};
   const AtFork m_atFork;
   const int m_rank;

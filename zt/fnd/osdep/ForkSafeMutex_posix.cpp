@@ -14,20 +14,20 @@
 namespace zt::fnd::osdep {
 namespace {
 
-constexpr std::int64_t kNanosecondsPerSecond = 1000000000;
-constexpr std::int64_t kPatience = kNanosecondsPerSecond;  // of a fork, in all
-constexpr std::int64_t kTurn = kPatience / 20;             // for one mutex, while others are held
+constexpr int64_t kNanosecondsPerSecond = 1000000000;
+constexpr int64_t kPatience = kNanosecondsPerSecond;  // of a fork, in all
+constexpr int64_t kTurn = kPatience / 20;             // for one mutex, while others are held
 
-std::int64_t Now() {
+int64_t Now() {
   timespec now;
   clock_gettime(CLOCK_MONOTONIC, &now);
-  return std::int64_t{now.tv_sec} * kNanosecondsPerSecond + now.tv_nsec;
+  return int64_t{now.tv_sec} * kNanosecondsPerSecond + now.tv_nsec;
 }
 
 // Takes it if it becomes free before the moment.
-bool TakeUntil(pthread_mutex_t& mutex, std::int64_t moment) {
+bool TakeUntil(pthread_mutex_t& mutex, int64_t moment) {
   timespec end;
-  end.tv_sec = static_cast<std::time_t>(moment / kNanosecondsPerSecond);
+  end.tv_sec = static_cast<time_t>(moment / kNanosecondsPerSecond);
   end.tv_nsec = static_cast<long>(moment % kNanosecondsPerSecond);
   return pthread_mutex_clocklock(&mutex, CLOCK_MONOTONIC, &end) == 0;
 }
@@ -66,7 +66,7 @@ class ForkSafeMutex::Registry {
 
   static void BeforeFork() ACQUIRE(s_lock) {
     s_lock.lock();
-    const std::int64_t end = Now() + kPatience;
+    const int64_t end = Now() + kPatience;
     ForkSafeMutex* missed = TakeAll(nullptr, end);
     while (missed && Now() < end) {
       GiveBack();
@@ -77,7 +77,7 @@ class ForkSafeMutex::Registry {
   // Takes `first`, where one is given, before the others, and waits for it to the end: its holder may
   // have been waiting for one that comes earlier in the order. The others have a short turn each.
   // Returns the first that was missed; once the end has come all that are free are taken.
-  static ForkSafeMutex* TakeAll(ForkSafeMutex* first, std::int64_t end) REQUIRES(s_lock) {
+  static ForkSafeMutex* TakeAll(ForkSafeMutex* first, int64_t end) REQUIRES(s_lock) {
     ForkSafeMutex* missed = nullptr;
     if (first && !Take(*first, end)) missed = first;
     for (ForkSafeMutex* m = s_first; m; m = m->m_next) {
@@ -89,7 +89,7 @@ class ForkSafeMutex::Registry {
     return missed;
   }
 
-  static bool Take(ForkSafeMutex& mutex, std::int64_t moment) {
+  static bool Take(ForkSafeMutex& mutex, int64_t moment) {
     return mutex.m_takenByFork = TakeUntil(mutex.m_mutex, moment);
   }
 

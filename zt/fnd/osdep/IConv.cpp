@@ -36,8 +36,8 @@ class ScopedIconv {
   ScopedIconv& operator=(const ScopedIconv&) = delete;
 
   // False where iconv stopped before the end of the input.
-  bool convert(char*& in, std::size_t& inLeft, char*& out, std::size_t& outLeft) const {
-    return iconv(m_cd, &in, &inLeft, &out, &outLeft) != static_cast<std::size_t>(-1);
+  bool convert(char*& in, size_t& inLeft, char*& out, size_t& outLeft) const {
+    return iconv(m_cd, &in, &inLeft, &out, &outLeft) != static_cast<size_t>(-1);
   }
 
  private:
@@ -49,9 +49,9 @@ void Convert(const In* begin, const In* end, const char* fromCode, Out* dest, Ou
              const char* toCode) {
   const ScopedIconv converter(toCode, fromCode);
   char* in = const_cast<char*>(reinterpret_cast<const char*>(begin));
-  std::size_t inLeft = static_cast<std::size_t>(end - begin) * sizeof(In);
+  size_t inLeft = static_cast<size_t>(end - begin) * sizeof(In);
   char* out = reinterpret_cast<char*>(dest);
-  std::size_t outLeft = static_cast<std::size_t>(destEnd - dest) * sizeof(Out);
+  size_t outLeft = static_cast<size_t>(destEnd - dest) * sizeof(Out);
   while (inLeft != 0 && outLeft >= sizeof(Out)) {
     if (converter.convert(in, inLeft, out, outLeft)) continue;
     if (inLeft == 0 || outLeft < sizeof(Out)) break;

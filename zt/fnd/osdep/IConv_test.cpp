@@ -13,7 +13,7 @@ using namespace zt::fnd::osdep;
 
 namespace {
 
-std::wstring ToWide(const std::string& text, const char* from, std::size_t room = 64) {
+std::wstring ToWide(const std::string& text, const char* from, size_t room = 64) {
   std::vector<wchar_t> out(room + 1, L'#');
   wchar_t* end = out.data() + room;
   IConv(text.data(), text.data() + text.size(), from, out.data(), end, "UTF-32LE");
@@ -21,7 +21,7 @@ std::wstring ToWide(const std::string& text, const char* from, std::size_t room 
   return std::wstring(out.data(), end);
 }
 
-std::string ToNarrow(const std::wstring& text, const char* to, std::size_t room = 64) {
+std::string ToNarrow(const std::wstring& text, const char* to, size_t room = 64) {
   std::vector<char> out(room + 1, '#');
   char* end = out.data() + room;
   IConv(text.data(), text.data() + text.size(), "UTF-32LE", out.data(), end, to);

@@ -13,12 +13,12 @@
 namespace zt::fnd::osdep {
 namespace {
 
-using SafeCount = SafeInteger<std::uint32_t>;
+using SafeCount = SafeInteger<uint32_t>;
 
 constexpr char kWideCode[] = "UTF-32LE";
-constexpr std::uint32_t kMostBytesPerCharacter = 4;
+constexpr uint32_t kMostBytesPerCharacter = 4;
 
-bool Same(const char* a, const char* b) { return std::strcmp(a, b) == 0; }
+bool Same(const char* a, const char* b) { return strcmp(a, b) == 0; }
 
 // The name that iconv gets.
 const char* EncodingOf(const char* locale) {
@@ -44,9 +44,9 @@ ByHand ByHandOf(const char* encoding) {
 }
 
 bool IsAscii(char c) { return static_cast<unsigned char>(c) < 0x80; }
-bool IsAscii(wchar_t c) { return static_cast<std::uint32_t>(c) < 0x80; }
+bool IsAscii(wchar_t c) { return static_cast<uint32_t>(c) < 0x80; }
 bool IsTag(char) { return false; }
-bool IsTag(wchar_t c) { return static_cast<std::uint32_t>(c) >> 7 == 0xE0000 >> 7; }
+bool IsTag(wchar_t c) { return static_cast<uint32_t>(c) >> 7 == 0xE0000 >> 7; }
 
 // Copies as far as there is room, with "?" in the place of what is not ASCII. Returns the end.
 template <class In, class Out>
@@ -58,10 +58,10 @@ Out* CopyAscii(const In* begin, const In* end, Out* dest, Out* destEnd, bool lea
   return dest;
 }
 
-bool IsCharacter(std::uint32_t c) { return c < 0xD800 || (c > 0xDFFF && c <= 0x10FFFF); }
+bool IsCharacter(uint32_t c) { return c < 0xD800 || (c > 0xDFFF && c <= 0x10FFFF); }
 
 // Bytes of the sequence that a byte begins; 0 for one that begins none.
-std::size_t LengthByLead(unsigned char lead) {
+size_t LengthByLead(unsigned char lead) {
   if (lead < 0x80) return 1;
   if (lead < 0xC2) return 0;
   if (lead < 0xE0) return 2;
@@ -70,13 +70,13 @@ std::size_t LengthByLead(unsigned char lead) {
 }
 
 // Reads a character. Returns its bytes; 0, with `c` undefined, where there is no whole and valid one.
-std::size_t ReadUtf8(const char* begin, const char* end, std::uint32_t& c) {
+size_t ReadUtf8(const char* begin, const char* end, uint32_t& c) {
   static constexpr unsigned char kLeadBits[] = {0, 0x7F, 0x1F, 0x0F, 0x07};
-  static constexpr std::uint32_t kLeast[] = {0, 0, 0x80, 0x800, 0x10000};
-  const std::size_t n = LengthByLead(static_cast<unsigned char>(*begin));
-  if (n == 0 || static_cast<std::size_t>(end - begin) < n) return 0;
+  static constexpr uint32_t kLeast[] = {0, 0, 0x80, 0x800, 0x10000};
+  const size_t n = LengthByLead(static_cast<unsigned char>(*begin));
+  if (n == 0 || static_cast<size_t>(end - begin) < n) return 0;
   c = static_cast<unsigned char>(*begin) & kLeadBits[n];
-  for (std::size_t i = 1; i < n; ++i) {
+  for (size_t i = 1; i < n; ++i) {
     const unsigned char next = static_cast<unsigned char>(begin[i]);
     if ((next & 0xC0) != 0x80) return 0;
     c = c << 6 | (next & 0x3F);
@@ -87,32 +87,32 @@ std::size_t ReadUtf8(const char* begin, const char* end, std::uint32_t& c) {
 // Of each malformed sequence every byte becomes a "?" of its own.
 wchar_t* ConvertUtf8(const char* begin, const char* end, wchar_t* dest, wchar_t* destEnd) {
   for (; begin != end && dest != destEnd; ++dest) {
-    std::uint32_t c;
-    const std::size_t n = ReadUtf8(begin, end, c);
+    uint32_t c;
+    const size_t n = ReadUtf8(begin, end, c);
     *dest = n == 0 ? L'?' : static_cast<wchar_t>(c);
     begin += n == 0 ? 1 : n;
   }
   return dest;
 }
 
-std::size_t Utf8Length(std::uint32_t c) {
+size_t Utf8Length(uint32_t c) {
   if (c < 0x80) return 1;
   if (c < 0x800) return 2;
   return c < 0x10000 ? 3 : 4;
 }
 
-void WriteUtf8(std::uint32_t c, std::size_t n, char* dest) {
+void WriteUtf8(uint32_t c, size_t n, char* dest) {
   static constexpr unsigned char kMark[] = {0, 0, 0xC0, 0xE0, 0xF0};
-  for (std::size_t i = n; --i > 0; c >>= 6) dest[i] = static_cast<char>(0x80 | (c & 0x3F));
+  for (size_t i = n; --i > 0; c >>= 6) dest[i] = static_cast<char>(0x80 | (c & 0x3F));
   *dest = static_cast<char>(kMark[n] | c);
 }
 
 // A character that has no room becomes a "?" too, and the next ones may have room again.
 char* ConvertUtf8(const wchar_t* begin, const wchar_t* end, char* dest, char* destEnd) {
   for (; begin != end && dest != destEnd; ++begin) {
-    std::uint32_t c = static_cast<std::uint32_t>(*begin);
-    std::size_t n = Utf8Length(c);
-    if (!IsCharacter(c) || n > static_cast<std::size_t>(destEnd - dest)) {
+    uint32_t c = static_cast<uint32_t>(*begin);
+    size_t n = Utf8Length(c);
+    if (!IsCharacter(c) || n > static_cast<size_t>(destEnd - dest)) {
       c = '?';
       n = 1;
     }
@@ -123,8 +123,8 @@ char* ConvertUtf8(const wchar_t* begin, const wchar_t* end, char* dest, char* de
 }
 
 template <class In, class Out>
-std::uint32_t Convert(const In* begin, const In* end, const char* encoding, Out* dest,
-                      Out*& destEnd, const char* fromCode, const char* toCode) {
+uint32_t Convert(const In* begin, const In* end, const char* encoding, Out* dest, Out*& destEnd,
+                 const char* fromCode, const char* toCode) {
   if (!begin) end = begin;
   switch (const ByHand byHand = ByHandOf(encoding)) {
     case ByHand::Ascii:
@@ -137,50 +137,49 @@ std::uint32_t Convert(const In* begin, const In* end, const char* encoding, Out*
     case ByHand::Nothing:
       IConv(begin, end, fromCode, dest, destEnd, toCode);
   }
-  return NumericCast<std::uint32_t>(destEnd - dest);
+  return NumericCast<uint32_t>(destEnd - dest);
 }
 
 template <class In>
-std::uint32_t CountOf(const In* begin, const In* end) {
-  return begin ? NumericCast<std::uint32_t>(end - begin) : 0;
+uint32_t CountOf(const In* begin, const In* end) {
+  return begin ? NumericCast<uint32_t>(end - begin) : 0;
 }
 
 // Room for `required` characters and the terminator.
 template <class Out>
-std::unique_ptr<Out[]> NewText(std::uint32_t required) {
+std::unique_ptr<Out[]> NewText(uint32_t required) {
   const SafeCount count = SafeCount::Add(required, 1);
   SafeCount::Multiply(count, sizeof(Out));
   return std::unique_ptr<Out[]>(new Out[count]);
 }
 
-const wchar_t* EndOf(const wchar_t* s) { return s ? s + std::wcslen(s) : s; }
+const wchar_t* EndOf(const wchar_t* s) { return s ? s + wcslen(s) : s; }
 
 }  // namespace
 
-std::uint32_t GetAnsiToWideRequiredBufferLength(const char* begin, const char* end, const char*) {
+uint32_t GetAnsiToWideRequiredBufferLength(const char* begin, const char* end, const char*) {
   return CountOf(begin, end);
 }
 
-std::uint32_t GetWideToAnsiRequiredBufferLength(const wchar_t* begin, const wchar_t* end,
-                                                const char*) {
+uint32_t GetWideToAnsiRequiredBufferLength(const wchar_t* begin, const wchar_t* end, const char*) {
   return SafeCount::Multiply(CountOf(begin, end), kMostBytesPerCharacter);
 }
 
-std::uint32_t AnsiToWideNoAlloc(const char* begin, const char* end, const char* locale,
-                                wchar_t* dest, wchar_t*& destEnd) {
+uint32_t AnsiToWideNoAlloc(const char* begin, const char* end, const char* locale, wchar_t* dest,
+                           wchar_t*& destEnd) {
   const char* const encoding = EncodingOf(locale);
   return Convert(begin, end, encoding, dest, destEnd, encoding, kWideCode);
 }
 
-std::uint32_t WideToAnsiNoAlloc(const wchar_t* begin, const wchar_t* end, const char* locale,
-                                char* dest, char*& destEnd) {
+uint32_t WideToAnsiNoAlloc(const wchar_t* begin, const wchar_t* end, const char* locale, char* dest,
+                           char*& destEnd) {
   const char* const encoding = EncodingOf(locale);
   return Convert(begin, end, encoding, dest, destEnd, kWideCode, encoding);
 }
 
 void AnsiToWide(const char* begin, const char* end, const char* locale, wchar_t*& out,
                 wchar_t*& outEnd) {
-  const std::uint32_t required = GetAnsiToWideRequiredBufferLength(begin, end, locale);
+  const uint32_t required = GetAnsiToWideRequiredBufferLength(begin, end, locale);
   std::unique_ptr<wchar_t[]> text = NewText<wchar_t>(required);
   wchar_t* stop = text.get() + required;
   AnsiToWideNoAlloc(begin, end, locale, text.get(), stop);
@@ -191,7 +190,7 @@ void AnsiToWide(const char* begin, const char* end, const char* locale, wchar_t*
 
 void WideToAnsi(const wchar_t* begin, const wchar_t* end, const char* locale, char*& out,
                 char*& outEnd) {
-  const std::uint32_t required = GetWideToAnsiRequiredBufferLength(begin, end, locale);
+  const uint32_t required = GetWideToAnsiRequiredBufferLength(begin, end, locale);
   std::unique_ptr<char[]> text = NewText<char>(required);
   char* stop = text.get() + required;
   WideToAnsiNoAlloc(begin, end, locale, text.get(), stop);

@@ -13,17 +13,16 @@ namespace zt::fnd::osdep {
 // an unknown encoding, OutOfRange where a length passes 32 bits.
 
 // Upper bounds that need no look at the text: the byte count, and four bytes a character.
-std::uint32_t GetAnsiToWideRequiredBufferLength(const char* begin, const char* end,
-                                                const char* locale);
-std::uint32_t GetWideToAnsiRequiredBufferLength(const wchar_t* begin, const wchar_t* end,
-                                                const char* locale);
+uint32_t GetAnsiToWideRequiredBufferLength(const char* begin, const char* end, const char* locale);
+uint32_t GetWideToAnsiRequiredBufferLength(const wchar_t* begin, const wchar_t* end,
+                                           const char* locale);
 
 // Convert into the buffer [dest, destEnd) as far as there is room, without terminator; `destEnd`
 // then tells where the output stopped. Return the count.
-std::uint32_t AnsiToWideNoAlloc(const char* begin, const char* end, const char* locale,
-                                wchar_t* dest, wchar_t*& destEnd);
-std::uint32_t WideToAnsiNoAlloc(const wchar_t* begin, const wchar_t* end, const char* locale,
-                                char* dest, char*& destEnd);
+uint32_t AnsiToWideNoAlloc(const char* begin, const char* end, const char* locale, wchar_t* dest,
+                           wchar_t*& destEnd);
+uint32_t WideToAnsiNoAlloc(const wchar_t* begin, const wchar_t* end, const char* locale, char* dest,
+                           char*& destEnd);
 
 // Convert into a terminated block, which the caller frees by delete[]. `outEnd` is the terminator.
 // `out` and `outEnd` are unchanged when these throw.

@@ -19,33 +19,33 @@ constexpr char kWide[] = "UTF-32LE";
 
 // What is beyond the end shows that nothing was written there.
 template <class Out, class Converter>
-std::basic_string<Out> Converted(std::size_t room, Converter convert) {
+std::basic_string<Out> Converted(size_t room, Converter convert) {
   std::basic_string<Out> out(room + 4, static_cast<Out>('#'));
   Out* end = out.data() + room;
   convert(out.data(), end);
   EXPECT_EQ(std::basic_string<Out>(4, static_cast<Out>('#')), out.substr(room));
-  return out.substr(0, static_cast<std::size_t>(end - out.data()));
+  return out.substr(0, static_cast<size_t>(end - out.data()));
 }
 
-std::wstring WideByHand(const std::string& text, std::size_t room) {
+std::wstring WideByHand(const std::string& text, size_t room) {
   return Converted<wchar_t>(room, [&](wchar_t* dest, wchar_t*& end) {
     AnsiToWideNoAlloc(text.data(), text.data() + text.size(), "", dest, end);
   });
 }
 
-std::wstring WideByIConv(const std::string& text, std::size_t room) {
+std::wstring WideByIConv(const std::string& text, size_t room) {
   return Converted<wchar_t>(room, [&](wchar_t* dest, wchar_t*& end) {
     IConv(text.data(), text.data() + text.size(), "", dest, end, kWide);
   });
 }
 
-std::string NarrowByHand(const std::wstring& text, std::size_t room) {
+std::string NarrowByHand(const std::wstring& text, size_t room) {
   return Converted<char>(room, [&](char* dest, char*& end) {
     WideToAnsiNoAlloc(text.data(), text.data() + text.size(), "", dest, end);
   });
 }
 
-std::string NarrowByIConv(const std::wstring& text, std::size_t room) {
+std::string NarrowByIConv(const std::wstring& text, size_t room) {
   return Converted<char>(room, [&](char* dest, char*& end) {
     IConv(text.data(), text.data() + text.size(), kWide, dest, end, "");
   });
@@ -126,11 +126,9 @@ const std::vector<wchar_t>& HostileCharacters() {
 
 class LocaleTextIConv : public testing::TestWithParam<const char*> {
  protected:
-  std::size_t below(std::size_t n) {
-    return std::uniform_int_distribution<std::size_t>(0, n - 1)(m_random);
-  }
+  size_t below(size_t n) { return std::uniform_int_distribution<size_t>(0, n - 1)(m_random); }
 
-  std::string bytes(std::size_t pieces) {
+  std::string bytes(size_t pieces) {
     std::string text;
     for (; pieces > 0; --pieces) {
       if (below(4) == 0) {
@@ -142,7 +140,7 @@ class LocaleTextIConv : public testing::TestWithParam<const char*> {
     return text;
   }
 
-  std::wstring characters(std::size_t n) {
+  std::wstring characters(size_t n) {
     std::wstring text;
     for (; n > 0; --n) {
       text += below(4) == 0 ? static_cast<wchar_t>(below(0x120000))
@@ -151,12 +149,12 @@ class LocaleTextIConv : public testing::TestWithParam<const char*> {
     return text;
   }
 
-  void compare(const std::string& text, std::size_t room) {
+  void compare(const std::string& text, size_t room) {
     ASSERT_EQ(WideByIConv(text, room), WideByHand(text, room))
         << testing::PrintToString(text) << ", room for " << room;
   }
 
-  void compare(const std::wstring& text, std::size_t room) {
+  void compare(const std::wstring& text, size_t room) {
     ASSERT_EQ(NarrowByIConv(text, room), NarrowByHand(text, room))
         << testing::PrintToString(text) << ", room for " << room;
   }
@@ -179,7 +177,7 @@ TEST_P(LocaleTextIConv, EveryPairOfBytesAndEveryHostilePieceIsTheSame) {
 TEST_P(LocaleTextIConv, EveryPairOfHostileCharactersIsTheSameInAnyRoom) {
   for (wchar_t first : HostileCharacters()) {
     for (wchar_t second : HostileCharacters()) {
-      for (std::size_t room = 0; room <= 9; room += 3) compare(std::wstring{first, second}, room);
+      for (size_t room = 0; room <= 9; room += 3) compare(std::wstring{first, second}, room);
     }
   }
 }

@@ -43,7 +43,7 @@ TEST(LocaleText, LengthsBeyond32BitsAreOutOfRange) {
   if (sizeof(void*) == 4) GTEST_SKIP() << "such ranges do not fit the address space";
   const char* const begin = reinterpret_cast<const char*>(0x10000);
   const wchar_t* const wide = reinterpret_cast<const wchar_t*>(0x10000);
-  const std::uint64_t most = 0xFFFFFFFFu;
+  const uint64_t most = 0xFFFFFFFFu;
   EXPECT_EQ(most, GetAnsiToWideRequiredBufferLength(begin, begin + most, ""));
   EXPECT_THROW(GetAnsiToWideRequiredBufferLength(begin, begin + most + 1, ""),
                exception::OutOfRange);

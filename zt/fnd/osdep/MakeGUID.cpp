@@ -12,7 +12,7 @@ namespace {
 template <class T>
 T BigEndianField(const unsigned char* bytes) {
   T field;
-  std::memcpy(&field, bytes, sizeof field);
+  memcpy(&field, bytes, sizeof field);
   return big_endian::FromBigEndian(field);
 }
 
@@ -24,10 +24,10 @@ _GUID MakeGUID(UuidSource source) {
   unsigned char bytes[16];
   if (!source(bytes)) ZT_RAISE(exception::InitializationFailure());
   _GUID guid;
-  guid.Data1 = BigEndianField<std::uint32_t>(bytes);
-  guid.Data2 = BigEndianField<std::uint16_t>(bytes + 4);
-  guid.Data3 = BigEndianField<std::uint16_t>(bytes + 6);
-  std::memcpy(guid.Data4, bytes + 8, sizeof guid.Data4);
+  guid.Data1 = BigEndianField<uint32_t>(bytes);
+  guid.Data2 = BigEndianField<uint16_t>(bytes + 4);
+  guid.Data3 = BigEndianField<uint16_t>(bytes + 6);
+  memcpy(guid.Data4, bytes + 8, sizeof guid.Data4);
   return guid;
 }
 

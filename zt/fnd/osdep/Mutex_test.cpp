@@ -172,7 +172,7 @@ TEST(Mutex, ProcessesLoseNoStep) {
   }
   for (Child& child : children) EXPECT_EQ(0, child.wait());
   int n;
-  std::memcpy(&n, ReadBytes(place.dir / "count").data(), sizeof n);
+  memcpy(&n, ReadBytes(place.dir / "count").data(), sizeof n);
   EXPECT_EQ(1200, n);
 }
 
@@ -436,7 +436,7 @@ void UseAfterTheStaticsWent() {
 TEST(Mutex, WorksInExitFunctionsThatRunAfterItsOwn) {
   MutexPlace place;
   Child child([]() -> int {
-    std::atexit(UseAfterTheStaticsWent);  // before the first use, so it runs after
+    atexit(UseAfterTheStaticsWent);  // before the first use, so it runs after
     {
       Mutex mutex(L"name");
       mutex.lock();

@@ -6,10 +6,10 @@
 namespace zt::fnd::osdep {
 namespace {
 
-constexpr std::uint32_t kNoError = 0;
-constexpr std::uint32_t kNotFound = 7;
-constexpr std::uint32_t kOther = 42;
-constexpr std::uint32_t kFileNotFoundStatus = 0xFFFFFFD5u;  // -43
+constexpr uint32_t kNoError = 0;
+constexpr uint32_t kNotFound = 7;
+constexpr uint32_t kOther = 42;
+constexpr uint32_t kFileNotFoundStatus = 0xFFFFFFD5u;  // -43
 
 // The C library has either of two strerror_r: one returns the text, one a status.
 [[maybe_unused]] const char* ErrorText(const char* text, const char*) { return text; }
@@ -24,7 +24,7 @@ std::string PosixText(int errnum) {
 
 std::string TextOf(const char* text) { return text ? text : std::string(); }
 
-std::uint32_t SmallCode(std::uint32_t code, std::uint32_t notFound) noexcept {
+uint32_t SmallCode(uint32_t code, uint32_t notFound) noexcept {
   if (code == 0) return kNoError;
   return code == notFound ? kNotFound : kOther;
 }
@@ -36,22 +36,20 @@ OSException::OSException(const char* text, unsigned int number)
     : message(TextOf(text)), code(number) {}
 OSException::~OSException() = default;
 const char* OSException::what() const noexcept { return message.c_str(); }
-std::uint32_t OSException::getErrorCode() const noexcept { return kOther; }
-std::uint32_t OSException::whatcode() const noexcept { return code; }
+uint32_t OSException::getErrorCode() const noexcept { return kOther; }
+uint32_t OSException::whatcode() const noexcept { return code; }
 
 PosixError::PosixError() : PosixError(errno) {}
 PosixError::PosixError(int errnum) : PosixError(PosixText(errnum).c_str(), errnum) {}
 PosixError::PosixError(const char* text, int errnum)
     : OSException(text, static_cast<unsigned int>(errnum)) {}
 PosixError::~PosixError() = default;
-std::uint32_t PosixError::getErrorCode() const noexcept { return SmallCode(code, ENOENT); }
+uint32_t PosixError::getErrorCode() const noexcept { return SmallCode(code, ENOENT); }
 
 CarbonError::CarbonError(short status) : CarbonError("Unknown error code", status) {}
 CarbonError::CarbonError(const char* text, short status)
     : OSException(text, static_cast<unsigned int>(static_cast<int>(status))) {}
 CarbonError::~CarbonError() = default;
-std::uint32_t CarbonError::getErrorCode() const noexcept {
-  return SmallCode(code, kFileNotFoundStatus);
-}
+uint32_t CarbonError::getErrorCode() const noexcept { return SmallCode(code, kFileNotFoundStatus); }
 
 }  // namespace zt::fnd::osdep

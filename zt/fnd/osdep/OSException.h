@@ -18,12 +18,12 @@ class ZT_EXCEPTION_CLASS OSException : public exception::Exception {
   ~OSException() override;
 
   const char* what() const noexcept override;
-  std::uint32_t getErrorCode() const noexcept override;  // 42
-  virtual std::uint32_t whatcode() const noexcept;
+  uint32_t getErrorCode() const noexcept override;  // 42
+  virtual uint32_t whatcode() const noexcept;
 
  protected:
   std::string message;
-  std::uint32_t code;
+  uint32_t code;
 };
 
 // An errno. getErrorCode(): 0 for 0, 7 for ENOENT, 42 for any other.
@@ -36,7 +36,7 @@ class ZT_EXCEPTION_CLASS PosixError : public OSException {
   PosixError& operator=(const PosixError&) = default;
   ~PosixError() override;
 
-  std::uint32_t getErrorCode() const noexcept override;
+  uint32_t getErrorCode() const noexcept override;
 };
 
 // An OSStatus, sign-extended. getErrorCode(): 0 for 0, 7 for -43 (file not found), 42 for any
@@ -49,7 +49,7 @@ class ZT_EXCEPTION_CLASS CarbonError : public OSException {
   CarbonError& operator=(const CarbonError&) = default;
   ~CarbonError() override;
 
-  std::uint32_t getErrorCode() const noexcept override;
+  uint32_t getErrorCode() const noexcept override;
 };
 
 }  // namespace zt::fnd::osdep

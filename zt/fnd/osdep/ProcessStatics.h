@@ -69,7 +69,7 @@ class ProcessStatics {
   static void UnlockAfterFork() RELEASE(s_lock) { s_lock.unlock(); }
   static void Register() {
     pthread_atfork(LockForFork, UnlockAfterFork, UnlockAfterFork);
-    std::atexit(AtExit);
+    atexit(AtExit);
   }
 
   static inline pthread_once_t s_once = PTHREAD_ONCE_INIT;

@@ -11,7 +11,7 @@
 namespace zt::fnd::osdep {
 namespace {
 
-bool IsAscii(wchar_t c) { return static_cast<std::uint32_t>(c) < 0x80; }
+bool IsAscii(wchar_t c) { return static_cast<uint32_t>(c) < 0x80; }
 
 wchar_t Folded(wchar_t c) { return c >= L'a' && c <= L'z' ? static_cast<wchar_t>(c - 32) : c; }
 

@@ -16,15 +16,13 @@ const char* OrEmpty(const char* s) { return s ? s : ""; }
 const wchar_t* OrEmpty(const wchar_t* s) { return s ? s : L""; }
 
 int Upper(char c) { return std::toupper(static_cast<unsigned char>(c)); }
-wchar_t Upper(wchar_t c) {
-  return static_cast<wchar_t>(std::towupper(static_cast<std::wint_t>(c)));
-}
+wchar_t Upper(wchar_t c) { return static_cast<wchar_t>(towupper(static_cast<wint_t>(c))); }
 
 int Raw(char c) { return static_cast<unsigned char>(c); }
 wchar_t Raw(wchar_t c) { return c; }
 
 int Difference(int a, int b) { return a - b; }
-int Difference(wchar_t a, wchar_t b) { return std::wcsncmp(&a, &b, 1); }
+int Difference(wchar_t a, wchar_t b) { return wcsncmp(&a, &b, 1); }
 
 // Equal characters fold to equal ones, whatever the locale: only a raw difference needs the
 // library's tables.
@@ -59,8 +57,8 @@ int CompareRanges(const C* a, const C* aEnd, const C* b, const C* bEnd) {
 
 int LengthDifference(long long a, long long b) {
   const long long difference = a - b;
-  if (difference < std::numeric_limits<std::int32_t>::min() ||
-      difference > std::numeric_limits<std::int32_t>::max()) {
+  if (difference < std::numeric_limits<int32_t>::min() ||
+      difference > std::numeric_limits<int32_t>::max()) {
     ZT_RAISE(exception::OutOfRange());
   }
   return static_cast<int>(difference);
@@ -75,14 +73,14 @@ int StringCaseCompare(const wchar_t* a, const wchar_t* b) {
   b = OrEmpty(b);
   // Against the empty text the characters compare as they are: a locale that folds a character to
   // a smaller one must not change which text is the longer.
-  if (*a == L'\0' || *b == L'\0') return std::wcsncmp(a, b, 1);
+  if (*a == L'\0' || *b == L'\0') return wcsncmp(a, b, 1);
   return CompareFolded(a, b);
 }
 
-int StringExactCompare(const char* a, const char* b) { return std::strcmp(OrEmpty(a), OrEmpty(b)); }
+int StringExactCompare(const char* a, const char* b) { return strcmp(OrEmpty(a), OrEmpty(b)); }
 
 int StringExactCompare(const wchar_t* a, const wchar_t* b) {
-  return std::wcscmp(OrEmpty(a), OrEmpty(b));
+  return wcscmp(OrEmpty(a), OrEmpty(b));
 }
 
 int StringCaseCompare(const char* a, const char* aEnd, const char* b, const char* bEnd) {

@@ -14,12 +14,12 @@ using vlt::test::ScopedLocale;
 
 namespace {
 
-template <class C, std::size_t A, std::size_t B>
+template <class C, size_t A, size_t B>
 int CaseRanges(const C (&a)[A], const C (&b)[B]) {
   return StringCaseCompare(a, a + A - 1, b, b + B - 1);
 }
 
-template <class C, std::size_t A, std::size_t B>
+template <class C, size_t A, size_t B>
 int ExactRanges(const C (&a)[A], const C (&b)[B]) {
   return StringExactCompare(a, a + A - 1, b, b + B - 1);
 }

@@ -10,27 +10,27 @@
 namespace zt::fnd::osdep {
 namespace {
 
-using Count = std::uint32_t;
+using Count = uint32_t;
 
-constexpr std::uint64_t kMax32 = std::numeric_limits<std::uint32_t>::max();
+constexpr uint64_t kMax32 = std::numeric_limits<uint32_t>::max();
 
 }  // namespace
 
 wchar_t* SystemAllocString(const wchar_t* s) {
   if (!s) return nullptr;
-  const std::uint64_t n = std::wcslen(s);
+  const uint64_t n = wcslen(s);
   return n > kMax32 ? nullptr : SystemAllocStringLen(s, static_cast<unsigned int>(n));
 }
 
 wchar_t* SystemAllocStringLen(const wchar_t* s, unsigned int n) {
-  const std::uint64_t bytes = (static_cast<std::uint64_t>(n) + 1) * sizeof(wchar_t) + sizeof(Count);
+  const uint64_t bytes = (static_cast<uint64_t>(n) + 1) * sizeof(wchar_t) + sizeof(Count);
   if (bytes > kMax32) return nullptr;
   char* const block = static_cast<char*>(DLLMallocNoThrow(static_cast<unsigned long>(bytes)));
   if (!block) return nullptr;
   const Count count = n;
-  std::memcpy(block, &count, sizeof count);
+  memcpy(block, &count, sizeof count);
   wchar_t* const text = reinterpret_cast<wchar_t*>(block + sizeof count);
-  if (s && n != 0) std::memcpy(text, s, static_cast<std::size_t>(n) * sizeof(wchar_t));
+  if (s && n != 0) memcpy(text, s, static_cast<size_t>(n) * sizeof(wchar_t));
   text[n] = L'\0';
   return text;
 }

@@ -15,9 +15,9 @@ using namespace zt::fnd::osdep;
 
 namespace {
 
-std::uint32_t CountOf(const wchar_t* s) {
-  std::uint32_t count;
-  std::memcpy(&count, reinterpret_cast<const char*>(s) - 4, 4);
+uint32_t CountOf(const wchar_t* s) {
+  uint32_t count;
+  memcpy(&count, reinterpret_cast<const char*>(s) - 4, 4);
   return count;
 }
 
@@ -35,7 +35,7 @@ TEST(SystemString, TakesForcedLengths) {
   EXPECT_STREQ(L"abc", part);
   SystemFreeString(part);
   wchar_t* const zeros = SystemAllocStringLen(L"a\0b", 3);
-  EXPECT_EQ(0, std::wmemcmp(zeros, L"a\0b", 4));
+  EXPECT_EQ(0, wmemcmp(zeros, L"a\0b", 4));
   EXPECT_EQ(3u, CountOf(zeros));
   SystemFreeString(zeros);
   wchar_t* const empty = SystemAllocStringLen(L"", 0);
@@ -47,7 +47,7 @@ TEST(SystemString, NullTextLeavesRoomToFill) {
   wchar_t* const s = SystemAllocStringLen(nullptr, 5);
   ASSERT_NE(nullptr, s);
   EXPECT_EQ(5u, CountOf(s));
-  std::wmemset(s, L'x', 5);
+  wmemset(s, L'x', 5);
   EXPECT_STREQ(L"xxxxx", s);
   SystemFreeString(s);
 }

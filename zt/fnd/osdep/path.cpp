@@ -45,8 +45,8 @@ std::vector<Component> Split(const String& text) {
 }
 
 bool Equals(const String& text, const Component& component, const wchar_t* literal) {
-  return std::wcslen(literal) == component.second &&
-         std::wmemcmp(text.c_str() + component.first, literal, component.second) == 0;
+  return wcslen(literal) == component.second &&
+         wmemcmp(text.c_str() + component.first, literal, component.second) == 0;
 }
 
 // The components that ".." and "." leave, last first; false if the path has no normal form.

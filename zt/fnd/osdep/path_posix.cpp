@@ -88,7 +88,7 @@ void CreateDirWorker(const wchar_t* path, bool useMode, mode_t mode) {
 
 String path::GetCWD() {
   for (;;) {
-    MallocText text(::getcwd(nullptr, 0), std::free);
+    MallocText text(::getcwd(nullptr, 0), free);
     if (text) return String(text.get());
     if (errno != EINTR) ZT_RAISE(PosixError());
   }
@@ -117,7 +117,7 @@ String path::TempFileName(const String& prefix, const String& dir) {
   DemandAbsolute(where.c_str());
   if (!IsDirectory(where.c_str())) ZT_RAISE(exception::NonexistentException());
   AnsiString narrowDir(where), narrowPrefix(prefix);
-  MallocText name(::tempnam(narrowDir.c_str(), narrowPrefix.c_str()), std::free);
+  MallocText name(::tempnam(narrowDir.c_str(), narrowPrefix.c_str()), free);
   if (!name) ZT_RAISE(PosixError());
   return String(name.get());
 }
@@ -179,7 +179,7 @@ String path::ResolveSymLink(const String& path) {
   AnsiString narrow(path);
   struct stat info;
   if (LStat(narrow.c_str(), &info) != 0) ZT_RAISE(PosixError());
-  std::string text(static_cast<std::size_t>(info.st_size), '\0');
+  std::string text(static_cast<size_t>(info.st_size), '\0');
   ssize_t length = RetryEintr([&] { return ::readlink(narrow.c_str(), text.data(), text.size()); });
   if (length < 0) ZT_RAISE(PosixError());
   return String(text.data(), static_cast<String::size_type>(length));

@@ -92,8 +92,8 @@ class CztSemaphore : public CztSyncObject {
  private:
   bool take() const;
 
-  mutable std::int32_t m_count GUARDED_BY(m_section);
-  const std::int32_t m_maximum;
+  mutable int32_t m_count GUARDED_BY(m_section);
+  const int32_t m_maximum;
   zt::fnd::osdep::PumpEvent m_event;  // set while units are left, once there was a release
   zt::fnd::osdep::CriticalSection m_section;
   zt::fnd::String m_name;

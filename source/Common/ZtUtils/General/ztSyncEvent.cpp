@@ -15,7 +15,7 @@ void WaitFor(const zt::fnd::osdep::PumpEvent& event, int timeoutMs, bool pumpMsg
     event.wait(pumpMsgs);
   } else {
     // Widened without the sign: the event takes no more than 32 bits.
-    event.wait(static_cast<unsigned long>(static_cast<std::uint32_t>(timeoutMs)), pumpMsgs);
+    event.wait(static_cast<unsigned long>(static_cast<uint32_t>(timeoutMs)), pumpMsgs);
   }
 }
 
@@ -67,10 +67,10 @@ bool CztSemaphore::Unlock() {
 
 int CztSemaphore::Release(int n) {
   zt::fnd::osdep::Hold hold(m_section);
-  const std::int32_t before = m_count;
-  const std::int64_t sum = std::max<std::int64_t>(static_cast<std::int64_t>(before) + n,
-                                                  std::numeric_limits<std::int32_t>::min());
-  m_count = static_cast<std::int32_t>(std::min<std::int64_t>(sum, m_maximum));
+  const int32_t before = m_count;
+  const int64_t sum =
+      std::max<int64_t>(static_cast<int64_t>(before) + n, std::numeric_limits<int32_t>::min());
+  m_count = static_cast<int32_t>(std::min<int64_t>(sum, m_maximum));
   // With nothing left a set event would keep the waiters running in circles.
   if (m_count > 0) {
     m_event.set();

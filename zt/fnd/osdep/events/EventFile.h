@@ -49,8 +49,8 @@ class EventFile {
   key_t key() const noexcept { return m_key; }
 
   // One transfer of all the bytes; false for less.
-  bool read(void* bytes, std::size_t n, std::uint64_t offset) const noexcept;
-  bool write(const void* bytes, std::size_t n, std::uint64_t offset) const noexcept;
+  bool read(void* bytes, size_t n, uint64_t offset) const noexcept;
+  bool write(const void* bytes, size_t n, uint64_t offset) const noexcept;
 
   // From alone to shared, without a moment between. False with errno: not locked.
   bool share() noexcept;

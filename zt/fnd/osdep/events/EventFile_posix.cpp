@@ -89,13 +89,13 @@ bool EventFile::identify() {
   return m_fd.identity().isNamedBy(*m_path);
 }
 
-bool EventFile::read(void* bytes, std::size_t n, std::uint64_t offset) const noexcept {
+bool EventFile::read(void* bytes, size_t n, uint64_t offset) const noexcept {
   ssize_t got =
       RetryEintr([&] { return ::pread(m_fd.get(), bytes, n, static_cast<off_t>(offset)); });
-  return got >= 0 && static_cast<std::size_t>(got) == n;
+  return got >= 0 && static_cast<size_t>(got) == n;
 }
 
-bool EventFile::write(const void* bytes, std::size_t n, std::uint64_t offset) const noexcept {
+bool EventFile::write(const void* bytes, size_t n, uint64_t offset) const noexcept {
   return zt::posix::WriteAllAt(m_fd.get(), bytes, n, static_cast<off_t>(offset));
 }
 

@@ -8,13 +8,13 @@ namespace {
 
 template <class Number>
 void Put(unsigned char* to, Number value) {
-  std::memcpy(to, &value, sizeof value);
+  memcpy(to, &value, sizeof value);
 }
 
 template <class Number>
 Number Get(const unsigned char* from) {
   Number value;
-  std::memcpy(&value, from, sizeof value);
+  memcpy(&value, from, sizeof value);
   return value;
 }
 
@@ -29,8 +29,8 @@ EventPlace::Bytes EventPlace::encode() const {
 
 EventPlace EventPlace::Decode(const Bytes& bytes) {
   EventPlace place;
-  place.set = Get<std::uint32_t>(&bytes[1]);
-  place.slot = Get<std::uint32_t>(&bytes[5]);
+  place.set = Get<uint32_t>(&bytes[1]);
+  place.slot = Get<uint32_t>(&bytes[5]);
   return place;
 }
 
@@ -46,11 +46,11 @@ SetHeader::Bytes SetHeader::encode() const {
 
 bool SetHeader::decode(const Bytes& bytes) {
   *this = SetHeader();
-  if (Get<std::uint32_t>(&bytes[0]) != kMagic) return false;
+  if (Get<uint32_t>(&bytes[0]) != kMagic) return false;
   ready = bytes[kReadyOffset] == 1;
-  count = Get<std::uint32_t>(&bytes[6]);
-  freeCount = Get<std::uint32_t>(&bytes[kFreeOffset]);
-  firstFree = Get<std::uint32_t>(&bytes[14]);
+  count = Get<uint32_t>(&bytes[6]);
+  freeCount = Get<uint32_t>(&bytes[kFreeOffset]);
+  firstFree = Get<uint32_t>(&bytes[14]);
   return true;
 }
 
@@ -59,7 +59,7 @@ SlotRecord::Bytes SlotRecord::encode() const {
   bytes[0] = inUse ? 1 : 0;
   bytes[1] = manualReset ? 1 : 0;
   // Widened with the sign, which makes the end of the list all ones.
-  Put(&bytes[2], static_cast<std::int64_t>(keyOrNext));
+  Put(&bytes[2], static_cast<int64_t>(keyOrNext));
   return bytes;
 }
 
@@ -67,7 +67,7 @@ SlotRecord SlotRecord::Decode(const Bytes& bytes) {
   SlotRecord record;
   record.inUse = bytes[0] != 0;
   record.manualReset = bytes[1] != 0;
-  record.keyOrNext = static_cast<std::int32_t>(Get<std::int64_t>(&bytes[2]));
+  record.keyOrNext = static_cast<int32_t>(Get<int64_t>(&bytes[2]));
   return record;
 }
 
@@ -76,9 +76,9 @@ StateFileBytes EncodeEmptySet() {
   SetHeader header;
   header.count = header.freeCount = kSlotsPerSet;
   auto end = std::ranges::copy(header.encode(), bytes.begin()).out;
-  for (std::uint32_t slot = 0; slot < kSlotsPerSet; ++slot) {
+  for (uint32_t slot = 0; slot < kSlotsPerSet; ++slot) {
     SlotRecord record;
-    record.keyOrNext = slot + 1 < kSlotsPerSet ? static_cast<std::int32_t>(slot + 1) : -1;
+    record.keyOrNext = slot + 1 < kSlotsPerSet ? static_cast<int32_t>(slot + 1) : -1;
     end = std::ranges::copy(record.encode(), end).out;
   }
   return bytes;

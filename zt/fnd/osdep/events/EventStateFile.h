@@ -10,18 +10,18 @@
 // 32-bit and 64-bit processes. docs/event-files.md shows them in worked examples.
 namespace zt::fnd::osdep {
 
-constexpr std::uint32_t kSlotsPerSet = 128;
-constexpr std::uint32_t kNoSlot = 0xFFFFFFFFu;  // behind the last free slot
+constexpr uint32_t kSlotsPerSet = 128;
+constexpr uint32_t kNoSlot = 0xFFFFFFFFu;  // behind the last free slot
 
 // Contents of an event's lock file: where the event's semaphore is.
 //
 //   0  1  reserved, 0        1  4  set number        5  4  slot index
 struct EventPlace {
-  static constexpr std::size_t kSize = 9;
+  static constexpr size_t kSize = 9;
   using Bytes = std::array<unsigned char, kSize>;
 
-  std::uint32_t set = 0;
-  std::uint32_t slot = 0;
+  uint32_t set = 0;
+  uint32_t slot = 0;
 
   Bytes encode() const;
   static EventPlace Decode(const Bytes& bytes);
@@ -32,16 +32,16 @@ struct EventPlace {
 //   0  4  magic              5  1  ready: 1 while the semaphore set exists
 //   4  1  reserved, 0        6  4  slots      10  4  free slots      14  4  first free slot
 struct SetHeader {
-  static constexpr std::size_t kSize = 18;
-  static constexpr std::uint32_t kMagic = 0x15E35E31u;
-  static constexpr std::size_t kReadyOffset = 5;
-  static constexpr std::size_t kFreeOffset = 10;  // free count, then first free, to the end
+  static constexpr size_t kSize = 18;
+  static constexpr uint32_t kMagic = 0x15E35E31u;
+  static constexpr size_t kReadyOffset = 5;
+  static constexpr size_t kFreeOffset = 10;  // free count, then first free, to the end
   using Bytes = std::array<unsigned char, kSize>;
 
   bool ready = false;
-  std::uint32_t count = 0;
-  std::uint32_t freeCount = 0;
-  std::uint32_t firstFree = 0;
+  uint32_t count = 0;
+  uint32_t freeCount = 0;
+  uint32_t firstFree = 0;
 
   Bytes encode() const;
 
@@ -55,22 +55,22 @@ struct SetHeader {
 //   2  8  in use: the key of the event's lock file; free: the next free slot, all ones at the end.
 //         Written with its sign; only the low 32 bits are read back.
 struct SlotRecord {
-  static constexpr std::size_t kSize = 10;
+  static constexpr size_t kSize = 10;
   using Bytes = std::array<unsigned char, kSize>;
 
   bool inUse = false;
   bool manualReset = false;
-  std::int32_t keyOrNext = 0;
+  int32_t keyOrNext = 0;
 
   Bytes encode() const;
   static SlotRecord Decode(const Bytes& bytes);
 
-  static constexpr std::uint64_t Offset(std::uint32_t slot) {
-    return SetHeader::kSize + static_cast<std::uint64_t>(slot) * kSize;
+  static constexpr uint64_t Offset(uint32_t slot) {
+    return SetHeader::kSize + static_cast<uint64_t>(slot) * kSize;
   }
 };
 
-constexpr std::size_t kStateFileSize = SetHeader::kSize + kSlotsPerSet * SlotRecord::kSize;
+constexpr size_t kStateFileSize = SetHeader::kSize + kSlotsPerSet * SlotRecord::kSize;
 using StateFileBytes = std::array<unsigned char, kStateFileSize>;
 
 // A state file with all slots free and the ready flag clear.

@@ -90,7 +90,7 @@ TEST(EventStateFile, SlotRecordsWidenWithTheSign) {
 
 TEST(EventStateFile, OnlyTheLowHalfOfALinkIsRead) {
   SlotRecord::Bytes bytes = SlotRecord{true, true, 0x01023C4D}.encode();
-  std::memset(&bytes[6], 0xEE, 4);
+  memset(&bytes[6], 0xEE, 4);
   SlotRecord record = SlotRecord::Decode(bytes);
   EXPECT_TRUE(record.inUse);
   EXPECT_TRUE(record.manualReset);
@@ -111,7 +111,7 @@ TEST(EventStateFile, EmptySetIsAListOfAllSlots) {
       hex.substr(0, 36));
   for (unsigned slot = 0; slot < kSlotsPerSet; ++slot) {
     SlotRecord::Bytes record;
-    std::memcpy(record.data(), &bytes[SlotRecord::Offset(slot)], record.size());
+    memcpy(record.data(), &bytes[SlotRecord::Offset(slot)], record.size());
     EXPECT_FALSE(SlotRecord::Decode(record).inUse);
     EXPECT_FALSE(SlotRecord::Decode(record).manualReset);
     EXPECT_EQ(slot == 127 ? -1 : static_cast<int>(slot + 1), SlotRecord::Decode(record).keyOrNext);

@@ -231,7 +231,7 @@ void OpenAfterTheStaticsWent() {
 TEST(NamedEventClose, EventsWorkInExitFunctionsThatRunAfterTheirOwn) {
   EventPlace place;
   Child child([]() -> int {
-    std::atexit(OpenAfterTheStaticsWent);  // before the first use, so it runs after
+    atexit(OpenAfterTheStaticsWent);  // before the first use, so it runs after
     Open("name");
     exit(0);
   });
@@ -243,7 +243,7 @@ TEST(NamedEventClose, ObjectThatOutlivesTheStaticsCloses) {
   EventPlace place;
   Child child([]() -> int {
     static std::unique_ptr<NamedEvent> late;
-    std::atexit([] { late.reset(); });
+    atexit([] { late.reset(); });
     late = Open("name");
     exit(0);
   });

@@ -255,7 +255,7 @@ TEST(NamedEventFork, ThreadsOfAChildDestroyInheritedObjectsAtOnce) {
     std::vector<std::thread> threads;
     for (int t = 0; t < 4; ++t) {
       threads.emplace_back([&, t] {
-        for (int i = t; i < 64; i += 4) events[static_cast<std::size_t>(i)].reset();
+        for (int i = t; i < 64; i += 4) events[static_cast<size_t>(i)].reset();
       });
     }
     for (auto& thread : threads) thread.join();

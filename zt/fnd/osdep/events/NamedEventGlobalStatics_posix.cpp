@@ -40,7 +40,7 @@ RefPtr<SemaphoreSet> NamedEventGlobalStatics::getOrCreateSemaphoreSet(unsigned n
 RefPtr<EventData> NamedEventGlobalStatics::getOrCreateNamedEvent(const String& name,
                                                                  bool manualReset,
                                                                  bool initialState) {
-  const std::uint64_t end = MonotonicTicks() + MonotonicTicksPerSecond() / 1000 * kJoinPatienceMs;
+  const uint64_t end = MonotonicTicks() + MonotonicTicksPerSecond() / 1000 * kJoinPatienceMs;
   for (unsigned attempt = 1;; ++attempt) {
     RefPtr<EventData> event = openOrFind(name, manualReset, initialState);
     if (event) return event;

@@ -65,14 +65,14 @@ auto Open(const std::string& name, bool manual = kManual, bool initial = kClear)
 }
 
 // Changes bytes in place, as another process would.
-void Patch(const std::string& path, std::size_t at, const std::string& bytes) {
+void Patch(const std::string& path, size_t at, const std::string& bytes) {
   ScopedFd fd(::open(path.c_str(), O_WRONLY | O_CLOEXEC));
   ASSERT_TRUE(fd.valid()) << path;
   ASSERT_EQ(static_cast<ssize_t>(bytes.size()),
             pwrite(fd.get(), bytes.data(), bytes.size(), static_cast<off_t>(at)));
 }
 
-std::string Number(std::uint32_t value) {
+std::string Number(uint32_t value) {
   return std::string(reinterpret_cast<const char*>(&value), sizeof value);
 }
 
@@ -96,7 +96,7 @@ struct Occupied {
 // ---- state files
 
 TEST(NamedEventHostile, BadHeadersMakeTheSetUnusable) {
-  const std::pair<std::size_t, std::string> damages[] = {
+  const std::pair<size_t, std::string> damages[] = {
       {0, std::string("\x30", 1)},  // magic
       {5, std::string("\0", 1)},    // not ready
       {5, std::string("\2", 1)},    // nor is this
@@ -122,7 +122,7 @@ TEST(NamedEventHostile, ShortStateFileInUseMakesTheSetUnusable) {
 }
 
 TEST(NamedEventHostile, UntrustworthyFreeListsAreSkipped) {
-  const std::pair<std::size_t, std::string> damages[] = {
+  const std::pair<size_t, std::string> damages[] = {
       {14, Number(0)},            // in use: a process died between two writes
       {14, Number(128)},          // just outside
       {14, Number(0x01023C4Du)},  // a key
@@ -169,7 +169,7 @@ TEST(NamedEventHostile, StateFileThatNobodyHoldsIsMadeAnewWhateverItSays) {
     auto event = Open("name");
     EXPECT_EQ((Slot{1, 0}), place.slotOf("name"));
     std::string state = ReadBytes(place.file("sem_1"));
-    EXPECT_EQ(std::max<std::size_t>(bytes.size(), 1298), state.size());  // never cut off
+    EXPECT_EQ(std::max<size_t>(bytes.size(), 1298), state.size());  // never cut off
     EXPECT_EQ(Number(127), state.substr(10, 4));
     event.reset();
     EXPECT_EQ(Names(), place.files());

@@ -71,10 +71,10 @@ int SoonErrorOfOpening(const std::string& name) {
   return error == -1 ? 0 : error;
 }
 
-std::size_t CountFiles(const std::string& dir) {
+size_t CountFiles(const std::string& dir) {
   std::error_code failed;
   auto files = std::filesystem::directory_iterator(dir, failed);
-  return failed ? 0 : static_cast<std::size_t>(std::distance(begin(files), end(files)));
+  return failed ? 0 : static_cast<size_t>(std::distance(begin(files), end(files)));
 }
 
 // Checks inside a child: says which one failed.

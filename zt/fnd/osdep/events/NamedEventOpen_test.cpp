@@ -79,7 +79,7 @@ TEST(NamedEventOpen, FirstEventTakesSlotZeroOfSetOne) {
   ASSERT_EQ(1298u, state.size());
   EXPECT_EQ(std::string("\x31\x5E\xE3\x15\0\1\x80\0\0\0\x7F\0\0\0\1\0\0\0", 18),
             state.substr(0, 18));
-  std::int64_t key = ftok(place.file("name").c_str(), 1);
+  int64_t key = ftok(place.file("name").c_str(), 1);
   std::string record = std::string("\1\1") + std::string(reinterpret_cast<char*>(&key), 8);
   EXPECT_EQ(record, state.substr(18, 10));
   EXPECT_EQ(std::string("\0\0\2\0\0\0\0\0\0\0", 10), state.substr(28, 10));
@@ -176,8 +176,8 @@ TEST(NamedEventOpen, EventsOfManySetsAreIndependent) {
   std::vector<std::unique_ptr<NamedEvent>> events;
   for (int i = 0; i < 300; ++i) events.push_back(Open("e" + std::to_string(i), kAutomatic));
   EXPECT_EQ((Slot{3, 43}), place.slotOf("e299"));
-  for (std::size_t i = 0; i < events.size(); i += 7) events[i]->set();
-  for (std::size_t i = 0; i < events.size(); ++i) EXPECT_EQ(i % 7 == 0, events[i]->check()) << i;
+  for (size_t i = 0; i < events.size(); i += 7) events[i]->set();
+  for (size_t i = 0; i < events.size(); ++i) EXPECT_EQ(i % 7 == 0, events[i]->check()) << i;
   events.clear();
   EXPECT_EQ(Names(), place.files());
 }

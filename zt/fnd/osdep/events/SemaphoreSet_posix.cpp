@@ -136,23 +136,23 @@ bool SemaphoreSet::readSlot(unsigned slot, SlotRecord& record) const {
 // Reads and writes the span from the free count to the record as a whole.
 bool SemaphoreSet::updateFreeRecords(int delta, unsigned newFirst, unsigned& oldFirst,
                                      unsigned slot, const SlotRecord* record) {
-  constexpr std::size_t kBase = SetHeader::kFreeOffset;
+  constexpr size_t kBase = SetHeader::kFreeOffset;
   StateFileBytes span;
-  std::size_t size = SetHeader::kSize - kBase;
+  size_t size = SetHeader::kSize - kBase;
   if (record) {
     if (slot >= kSlotsPerSet) return false;
-    size = static_cast<std::size_t>(SlotRecord::Offset(slot + 1)) - kBase;
+    size = static_cast<size_t>(SlotRecord::Offset(slot + 1)) - kBase;
   }
   if (!m_file.read(span.data(), size, kBase)) return false;
-  std::uint32_t freeCount;
-  std::memcpy(&freeCount, &span[0], sizeof freeCount);
-  freeCount += static_cast<std::uint32_t>(delta);
-  std::memcpy(&span[0], &freeCount, sizeof freeCount);
-  std::memcpy(&oldFirst, &span[4], sizeof oldFirst);
-  std::memcpy(&span[4], &newFirst, sizeof newFirst);
+  uint32_t freeCount;
+  memcpy(&freeCount, &span[0], sizeof freeCount);
+  freeCount += static_cast<uint32_t>(delta);
+  memcpy(&span[0], &freeCount, sizeof freeCount);
+  memcpy(&oldFirst, &span[4], sizeof oldFirst);
+  memcpy(&span[4], &newFirst, sizeof newFirst);
   if (record) {
     const SlotRecord::Bytes bytes = record->encode();
-    std::memcpy(&span[size - bytes.size()], bytes.data(), bytes.size());
+    memcpy(&span[size - bytes.size()], bytes.data(), bytes.size());
   }
   return m_file.write(span.data(), size, kBase);
 }
@@ -182,7 +182,7 @@ void SemaphoreSet::giveBack(unsigned slot, key_t key) {
   bool ready;
   unsigned count, freeCount, first;
   if (!readHeader(ready, count, freeCount, first)) return;
-  record = SlotRecord{false, false, static_cast<std::int32_t>(first)};
+  record = SlotRecord{false, false, static_cast<int32_t>(first)};
   updateFreeRecords(+1, slot, first, slot, &record);
 }
 

@@ -30,9 +30,9 @@ struct Set {
   RefPtr<SemaphoreSet> set = statics->getOrCreateSemaphoreSet(1);
   std::string path = place.file("sem_1");
 
-  void patch(std::size_t at, std::uint32_t value) const {
+  void patch(size_t at, uint32_t value) const {
     std::string bytes = ReadBytes(path);
-    std::memcpy(&bytes.at(at), &value, sizeof value);
+    memcpy(&bytes.at(at), &value, sizeof value);
     FILE* file = fopen(path.c_str(), "r+b");
     ASSERT_NE(nullptr, file);
     EXPECT_EQ(bytes.size(), fwrite(bytes.data(), 1, bytes.size(), file));
