@@ -3,8 +3,6 @@
 #include <clocale>
 #include <cstring>
 
-#include <locale.h>
-
 #include "ztini/NameCompare.h"
 
 namespace ztini {

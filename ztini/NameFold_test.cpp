@@ -5,8 +5,6 @@
 #include <clocale>
 #include <string>
 
-#include <locale.h>
-
 #include "ztini/NameCompare.h"
 
 namespace {

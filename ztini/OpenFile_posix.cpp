@@ -1,9 +1,9 @@
 #include "ztini/OpenFile.h"
 
-#include <errno.h>
 #include <fcntl.h>
 #include <sys/stat.h>
 
+#include <cerrno>
 #include <utility>
 
 #include "zt/posix/Files.h"

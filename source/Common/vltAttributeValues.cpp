@@ -1,8 +1,7 @@
 #include "source/Common/vltAttributeValues.h"
 
-#include <stdlib.h>
-
 #include <algorithm>
+#include <cstdlib>
 
 #include "source/Common/vltFailure.h"
 #include "source/Common/vltHookPoints.h"

@@ -1,8 +1,7 @@
 #include "source/Common/vltBindingClasses.h"
 
-#include <string.h>
-#include <wchar.h>
-
+#include <cstring>
+#include <cwchar>
 #include <new>
 #include <vector>
 

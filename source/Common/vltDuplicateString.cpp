@@ -1,6 +1,7 @@
-#include <ctype.h>
-#include <string.h>
-#include <wchar.h>
+
+#include <cctype>
+#include <cstring>
+#include <cwchar>
 
 #include "source/Common/vltFailure.h"
 #include "source/Common/vltHookPoints.h"

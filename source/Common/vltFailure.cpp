@@ -1,8 +1,7 @@
 #include "source/Common/vltFailure.h"
 
-#include <stdarg.h>
-#include <stdio.h>
-
+#include <cstdarg>
+#include <cstdio>
 #include <exception>
 #include <memory>
 

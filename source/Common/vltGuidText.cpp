@@ -1,7 +1,7 @@
-#include <stdio.h>
-#include <string.h>
-#include <wchar.h>
 
+#include <cstdio>
+#include <cstring>
+#include <cwchar>
 #include <tuple>
 
 #include "source/Common/vltFailure.h"

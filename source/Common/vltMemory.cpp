@@ -1,4 +1,5 @@
-#include <stdlib.h>
+
+#include <cstdlib>
 
 #include "source/Common/vltcmn.h"
 

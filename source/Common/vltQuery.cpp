@@ -1,10 +1,9 @@
 #include "source/Common/vltQuery.h"
 
-#include <stdlib.h>
-#include <string.h>
-#include <wchar.h>
-
 #include <algorithm>
+#include <cstdlib>
+#include <cstring>
+#include <cwchar>
 #include <span>
 
 #include "source/Common/vltFailure.h"

@@ -1,8 +1,8 @@
 // Queries and attribute values over a heap that refuses: every allocation of every call in turn.
 #include <gtest/gtest.h>
-#include <stdio.h>
-#include <string.h>
 
+#include <cstdio>
+#include <cstring>
 #include <iterator>
 
 #include "source/Common/vltQuery.h"

@@ -1,9 +1,9 @@
 #include "source/Common/vltQuery.h"
 
 #include <gtest/gtest.h>
-#include <stddef.h>
-#include <string.h>
 
+#include <cstddef>
+#include <cstring>
 #include <deque>
 #include <functional>
 

@@ -1,9 +1,8 @@
 #include "source/Common/vltTestHook.h"
 
-#include <stdlib.h>
-#include <string.h>
-
 #include <atomic>
+#include <cstdlib>
+#include <cstring>
 #include <new>
 #include <set>
 

@@ -2,9 +2,10 @@
 
 #include <dlfcn.h>
 #include <gtest/gtest.h>
-#include <math.h>
-#include <string.h>
-#include <wchar.h>
+
+#include <cmath>
+#include <cstring>
+#include <cwchar>
 
 #include "source/Utilities/vltutils.h"
 #include "tests/support/Child.h"

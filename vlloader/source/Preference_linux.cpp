@@ -1,6 +1,6 @@
-#include <errno.h>
-#include <stdlib.h>
 
+#include <cerrno>
+#include <cstdlib>
 #include <memory>
 #include <new>
 #include <vector>

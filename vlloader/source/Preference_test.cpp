@@ -1,13 +1,13 @@
 #include "vlloader/source/Preference.h"
 
-#include <errno.h>
 #include <gtest/gtest.h>
-#include <stdlib.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <cerrno>
+#include <cstdlib>
 #include <new>
 
 #include "tests/support/FailSystemCall.h"

@@ -1,8 +1,7 @@
 #include "vlloader/source/vlloader.h"
 
-#include <limits.h>
-#include <stdio.h>
-
+#include <climits>
+#include <cstdio>
 #include <memory>
 
 #include "vlloader/source/Preference.h"

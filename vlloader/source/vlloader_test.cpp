@@ -1,9 +1,6 @@
 #include "vlloader/source/vlloader.h"
 
 #include <gtest/gtest.h>
-#include <stdio.h>
-#include <stdlib.h>
-#include <wchar.h>
 
 #include <filesystem>
 #include <thread>

@@ -1,8 +1,9 @@
 #pragma once
 
-#include <stddef.h>
 #include <sys/stat.h>
 #include <sys/types.h>
+
+#include <cstddef>
 
 #include "zt/posix/ScopedFd.h"
 

@@ -1,16 +1,16 @@
 #include "zt/posix/Files.h"
 
-#include <errno.h>
 #include <fcntl.h>
-#include <limits.h>
 #include <linux/openat2.h>
-#include <stdio.h>
-#include <stdlib.h>
-#include <string.h>
 #include <sys/file.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <cerrno>
+#include <climits>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
 #include <memory>
 
 #include "zt/posix/Retry.h"

@@ -1,6 +1,5 @@
 #include "zt/posix/Files.h"
 
-#include <errno.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/file.h>
@@ -8,6 +7,7 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <string>
 
 #include "tests/support/Child.h"

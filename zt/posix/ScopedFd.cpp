@@ -1,7 +1,8 @@
 #include "zt/posix/ScopedFd.h"
 
-#include <errno.h>
 #include <unistd.h>
+
+#include <cerrno>
 
 namespace zt::posix {
 

@@ -1,9 +1,9 @@
 #include "zt/posix/ScopedFd.h"
 
-#include <errno.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
 
+#include <cerrno>
 #include <utility>
 
 #include "tests/support/HostsFile.h"

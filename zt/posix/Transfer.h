@@ -1,11 +1,11 @@
 #pragma once
 
-#include <errno.h>
-#include <limits.h>
-#include <stddef.h>
 #include <sys/types.h>
 
 #include <algorithm>
+#include <cerrno>
+#include <climits>
+#include <cstddef>
 
 #include "zt/posix/Retry.h"
 

@@ -1,6 +1,6 @@
 #include "ztcom/ztcore/ztcom.h"
 
-#include <string.h>
+#include <cstring>
 
 namespace {
 

@@ -7,9 +7,8 @@
 // _GetEntries(). CZTComObject<T> makes it an object. Broken contracts abort the process: a null
 // out-pointer, a release too many, a table without a first interface.
 
-#include <stdlib.h>
-
 #include <cstdint>
+#include <cstdlib>
 #include <new>
 
 #include "ztcom/ztcore/ztlock.h"

@@ -1,8 +1,7 @@
 #include "ztcom/ztcore/ztlock.h"
 
-#include <stdlib.h>
-
 #include <atomic>
+#include <cstdlib>
 
 struct CZTMutex::State {
   // Atomic because IsNesting reads them without the mutex. Only the answer for the calling thread

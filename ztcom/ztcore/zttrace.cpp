@@ -1,8 +1,8 @@
 #include "ztcom/ztcore/zttrace.h"
 
-#include <stdarg.h>
-#include <stdio.h>
-#include <stdlib.h>
+#include <cstdarg>
+#include <cstdio>
+#include <cstdlib>
 
 #include "zt/fnd/osdep/ForkSafeMutex.h"
 #include "zt/fnd/osdep/Hold.h"

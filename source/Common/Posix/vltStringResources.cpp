@@ -1,6 +1,6 @@
-#include <string.h>
 
 #include <algorithm>
+#include <cstring>
 #include <tuple>
 
 #include "source/Common/Posix/vltlinuxos.h"

@@ -1,14 +1,14 @@
 #include "source/Common/Posix/vltlinuxos.h"
 
-#include <errno.h>
 #include <fcntl.h>
 #include <pthread.h>
-#include <stdarg.h>
-#include <stdio.h>
-#include <stdlib.h>
 #include <unistd.h>
 
 #include <atomic>
+#include <cerrno>
+#include <cstdarg>
+#include <cstdio>
+#include <cstdlib>
 #include <memory>
 #include <new>
 

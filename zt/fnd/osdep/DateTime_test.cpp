@@ -1,10 +1,10 @@
 #include "zt/fnd/osdep/DateTime.h"
 
 #include <gtest/gtest.h>
-#include <stdlib.h>
 
 #include <clocale>
 #include <cmath>
+#include <cstdlib>
 #include <ctime>
 #include <string>
 

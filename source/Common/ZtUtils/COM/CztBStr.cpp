@@ -1,7 +1,6 @@
 #include "source/Common/ZtUtils/COM/CztBStr.h"
 
-#include <wchar.h>
-
+#include <cwchar>
 #include <utility>
 
 #include "ztcom/ztcore/ztmemmgr.h"

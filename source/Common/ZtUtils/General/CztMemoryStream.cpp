@@ -1,9 +1,8 @@
 #include "source/Common/ZtUtils/General/CztMemoryStream.h"
 
-#include <stdlib.h>
-#include <string.h>
-
 #include <algorithm>
+#include <cstdlib>
+#include <cstring>
 
 namespace {
 

@@ -1,7 +1,6 @@
 #include "source/Common/ZtUtils/General/CztStreamBaseImp.h"
 
-#include <limits.h>
-
+#include <climits>
 #include <memory>
 #include <new>
 #include <vector>

@@ -1,13 +1,13 @@
 #include "source/Common/ZtUtils/General/vlTracer.h"
 
-#include <errno.h>
 #include <fcntl.h>
-#include <stdio.h>
-#include <string.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
 #include <unistd.h>
 
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
 #include <new>
 #include <optional>
 #include <sstream>

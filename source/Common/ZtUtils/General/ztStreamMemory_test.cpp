@@ -2,8 +2,9 @@
 // input that is cut anywhere leaves nothing in it.
 #include <fcntl.h>
 #include <gtest/gtest.h>
-#include <stdio.h>
 #include <unistd.h>
+
+#include <cstdio>
 
 #include "tests/support/InChild.h"
 #include "tests/support/RefusingMalloc.h"

@@ -1,7 +1,6 @@
 #include "source/Common/ZtUtils/General/ztSubStreamArea.h"
 
-#include <string.h>
-
+#include <cstring>
 #include <new>
 
 namespace {

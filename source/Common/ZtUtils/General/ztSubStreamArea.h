@@ -3,8 +3,7 @@
 // The area behind a stream's own data that holds its sub-streams: typed header, count, each with
 // name and data, then the trailer of marker and offset. docs/stream-format.md has the bytes.
 
-#include <stdlib.h>
-
+#include <cstdlib>
 #include <memory>
 #include <vector>
 
