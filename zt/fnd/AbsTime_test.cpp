@@ -23,8 +23,8 @@ double Rounded(V::tRoundMethod method, double number) {
   Fixed value(number);
   int32_t status = 0;
   V::_RoundAndCheckFit(method, kWholeMax, kWholeMin, value, &status);
-  EXPECT_EQ(0, status);
-  EXPECT_EQ(0u, value.fractionBits());
+  EXPECT_EQ(status, 0);
+  EXPECT_EQ(value.fractionBits(), 0u);
   return static_cast<double>(value);
 }
 
@@ -41,7 +41,7 @@ TEST(AbsTime, LimitsAndSize) {
   EXPECT_EQ(Fixed(0x7FFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF, 0xFFFFFFFF), AbsTime::max.value());
   EXPECT_EQ(Fixed(0x80000000, 0, 0, 0), AbsTime::min.value());
   EXPECT_LT(AbsTime::min, AbsTime::max);
-  EXPECT_EQ(0, AbsTime().getSeconds());
+  EXPECT_EQ(AbsTime().getSeconds(), 0);
 }
 
 TEST(AbsTime, UnixZeroCountsFrom1904) {
@@ -74,14 +74,14 @@ TEST(AbsTime, UnixTimeTruncatesOrRounds) {
 TEST(AbsTime, TicksCountFrom1601) {
   EXPECT_EQ(116444736000000000, Unix(0).toLKTIME(false));
   EXPECT_EQ(116444736000000000 + 15000000, Unix(1.5).toLKTIME(true));
-  EXPECT_EQ(0, AbsTime(-9561628800.0, 0).toLKTIME(true));
-  EXPECT_EQ(95616288000000000, AbsTime().toLKTIME(false));
-  EXPECT_EQ(-10000000, AbsTime(-9561628801.0, 0).toLKTIME(false));
+  EXPECT_EQ(AbsTime(-9561628800.0, 0).toLKTIME(true), 0);
+  EXPECT_EQ(AbsTime().toLKTIME(false), 95616288000000000);
+  EXPECT_EQ(AbsTime(-9561628801.0, 0).toLKTIME(false), -10000000);
   // 0.3 ticks and 0.5 ticks, counted in 2^-64 seconds.
   const AbsTime third(Fixed(3) / Fixed(100000000));
-  EXPECT_EQ(95616288000000000, third.toLKTIME(true));
-  EXPECT_EQ(95616288000000001, AbsTime(Fixed(7) / Fixed(100000000)).toLKTIME(true));
-  EXPECT_EQ(95616288000000000, AbsTime(Fixed(7) / Fixed(100000000)).toLKTIME(false));
+  EXPECT_EQ(third.toLKTIME(true), 95616288000000000);
+  EXPECT_EQ(AbsTime(Fixed(7) / Fixed(100000000)).toLKTIME(true), 95616288000000001);
+  EXPECT_EQ(AbsTime(Fixed(7) / Fixed(100000000)).toLKTIME(false), 95616288000000000);
 }
 
 TEST(AbsTime, WhatDoesNotFitEndsAtTheLimits) {
@@ -98,8 +98,8 @@ TEST(AbsTime, WhatDoesNotFitEndsAtTheLimits) {
 TEST(AbsTime, FarTimesEndAtTheLimitsOfTicks) {
   for (double seconds : {1.9e12, 2e12, 1e13, 1e15, 1e17, 9e18}) {
     for (bool round : {false, true}) {
-      EXPECT_EQ(kMost, AbsTime(seconds, 0).toLKTIME(round)) << seconds;
-      EXPECT_EQ(kLeast, AbsTime(-seconds, 0).toLKTIME(round)) << seconds;
+      EXPECT_EQ(AbsTime(seconds, 0).toLKTIME(round), kMost) << seconds;
+      EXPECT_EQ(AbsTime(-seconds, 0).toLKTIME(round), kLeast) << seconds;
       EXPECT_EQ(static_cast<int64_t>(seconds) - 2082844800, AbsTime(seconds, 0).toTime_T(round));
     }
   }
@@ -111,15 +111,15 @@ TEST(AbsTime, TicksAroundTheLimit) {
     return AbsTime(Fixed(seconds) + Fixed(ticks) / Fixed(10000000));
   };
   EXPECT_EQ(kMost - 1, after(912775574885, 4775806).toLKTIME(true));
-  EXPECT_EQ(kMost, after(912775574885, 4775807).toLKTIME(true));
-  EXPECT_EQ(kMost, after(912775574885, 4775808).toLKTIME(true));
-  EXPECT_EQ(kMost, after(912775574886, 0).toLKTIME(false));
-  EXPECT_EQ(kMost, after(912775574887, 0).toLKTIME(false));
+  EXPECT_EQ(after(912775574885, 4775807).toLKTIME(true), kMost);
+  EXPECT_EQ(after(912775574885, 4775808).toLKTIME(true), kMost);
+  EXPECT_EQ(after(912775574886, 0).toLKTIME(false), kMost);
+  EXPECT_EQ(after(912775574887, 0).toLKTIME(false), kMost);
   EXPECT_EQ(kLeast + 1, after(-931898832485, -4775807).toLKTIME(true));
-  EXPECT_EQ(kLeast, after(-931898832485, -4775808).toLKTIME(true));
-  EXPECT_EQ(kLeast, after(-931898832485, -4775809).toLKTIME(true));
-  EXPECT_EQ(kLeast, after(-931898832486, 0).toLKTIME(false));
-  EXPECT_EQ(kLeast, after(-931898832487, 0).toLKTIME(false));
+  EXPECT_EQ(after(-931898832485, -4775808).toLKTIME(true), kLeast);
+  EXPECT_EQ(after(-931898832485, -4775809).toLKTIME(true), kLeast);
+  EXPECT_EQ(after(-931898832486, 0).toLKTIME(false), kLeast);
+  EXPECT_EQ(after(-931898832487, 0).toLKTIME(false), kLeast);
 }
 
 TEST(AbsTime, SecondsTruncateTowardZero) {
@@ -132,16 +132,16 @@ TEST(AbsTime, SecondsTruncateTowardZero) {
 
 TEST(AbsTime, FractionThatShowsAsOneCarriesOver) {
   const AbsTime almost(Fixed(0, 4, 0xFFFFFFFF, 0xFFFFFFFF));
-  EXPECT_EQ(5, almost.getSeconds());
-  EXPECT_EQ(0.0, almost.getFraction());
+  EXPECT_EQ(almost.getSeconds(), 5);
+  EXPECT_EQ(almost.getFraction(), 0.0);
   AbsTime negative(-Fixed(0, 4, 0xFFFFFFFF, 0xFFFFFFFF));
-  EXPECT_EQ(-5, negative.getSeconds());
+  EXPECT_EQ(negative.getSeconds(), -5);
   const AbsTime below(Fixed(1) - Fixed(std::ldexp(1.0, -51)));
-  EXPECT_EQ(0, below.getSeconds()) << "two steps below 1.0";
+  EXPECT_EQ(below.getSeconds(), 0) << "two steps below 1.0";
   EXPECT_EQ(1 - std::ldexp(1.0, -51), below.getFraction());
   const AbsTime edge(Fixed(1) - Fixed(std::ldexp(1.0, -52)));
-  EXPECT_EQ(1, edge.getSeconds()) << "one step below counts as 1.0";
-  EXPECT_EQ(0.0, edge.getFraction());
+  EXPECT_EQ(edge.getSeconds(), 1) << "one step below counts as 1.0";
+  EXPECT_EQ(edge.getFraction(), 0.0);
 }
 
 TEST(AbsTime, FractionIsTheBitsBehindThePoint) {
@@ -177,7 +177,7 @@ TEST(AbsTimeValue, UnitsMultiplyOrDivide) {
     EXPECT_EQ(row.inSeconds, Corrected(V::kToSeconds, row.unit, row.value, &status));
     EXPECT_EQ(row.value, Corrected(V::kFromSeconds, row.unit, row.inSeconds, &status));
     EXPECT_EQ(-row.inSeconds, Corrected(V::kToSeconds, row.unit, -row.value, &status));
-    EXPECT_EQ(0, status);
+    EXPECT_EQ(status, 0);
   }
 }
 
@@ -190,10 +190,10 @@ TEST(AbsTimeValue, UnknownUnitKeepsTheValue) {
 TEST(AbsTimeValue, SignChangeOfAProductIsTheOverflow) {
   std::int32_t status = 0;
   Corrected(V::kFromSeconds, kTimeUnitTicks, 1e12, &status);
-  EXPECT_EQ(-50175, status);
+  EXPECT_EQ(status, -50175);
   status = 0;
   Corrected(V::kToSeconds, kTimeUnitTicks, 9e18, &status);
-  EXPECT_EQ(0, status);
+  EXPECT_EQ(status, 0);
 }
 
 TEST(AbsTimeValue, FirstErrorStaysAndDoesNotStopTheWork) {
@@ -201,11 +201,11 @@ TEST(AbsTimeValue, FirstErrorStaysAndDoesNotStopTheWork) {
   EXPECT_EQ(60, Corrected(V::kToSeconds, kTimeUnitMinute, 1, &status));
   EXPECT_EQ(-7, status);
   Corrected(V::kToSeconds, 1, 1, &status);
-  EXPECT_EQ(-7, status);
+  EXPECT_EQ(status, -7);
   Corrected(V::kToSeconds, 1, 1, nullptr);
   Fixed value(9.5);
   V::_RoundAndCheckFit(V::kRoundTowardZero, Fixed(5), Fixed(0), value, &status);
-  EXPECT_EQ(-7, status);
+  EXPECT_EQ(status, -7);
   EXPECT_EQ(Fixed(9), value);
 }
 
@@ -239,5 +239,5 @@ TEST(AbsTimeValue, ResultsOutsideTheBoundsDoNotFit) {
   Fixed value(0x7FFFFFFF, 0xFFFFFFFF, 0x80000000, 0);
   int32_t status = 0;
   V::_RoundAndCheckFit(V::kRoundNearest, kWholeMax, kWholeMin, value, &status);
-  EXPECT_EQ(-50175, status) << "rounding passes the largest number";
+  EXPECT_EQ(status, -50175) << "rounding passes the largest number";
 }

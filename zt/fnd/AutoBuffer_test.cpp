@@ -29,35 +29,35 @@ std::string Text(const AutoBuffer& buffer) {
 
 TEST(AutoBuffer, DefaultHasNoBlock) {
   AutoBuffer b;
-  EXPECT_EQ(0u, b.Len());
-  EXPECT_EQ(nullptr, b.Data());
-  EXPECT_EQ(0u, b.Capacity());
+  EXPECT_EQ(b.Len(), 0u);
+  EXPECT_EQ(b.Data(), nullptr);
+  EXPECT_EQ(b.Capacity(), 0u);
   b.Free();
   b.Erase();
   b.UnAppend(5);
   b.Append("x", 0);
-  EXPECT_EQ(nullptr, b.Data());
+  EXPECT_EQ(b.Data(), nullptr);
 }
 
 TEST(AutoBuffer, ConstructionReserves) {
   AutoBuffer b(50u);
-  EXPECT_EQ(0u, b.Len());
-  EXPECT_EQ(50u, b.Capacity());
-  EXPECT_NE(nullptr, b.Data());
+  EXPECT_EQ(b.Len(), 0u);
+  EXPECT_EQ(b.Capacity(), 50u);
+  EXPECT_NE(b.Data(), nullptr);
 }
 
 TEST(AutoBuffer, AppendGrowsByATenthAndAtLeast128) {
   const std::string bytes(2000, 'x');
   AutoBuffer small, large;
   small.Append(bytes.data(), 1000);
-  EXPECT_EQ(1128u, small.Capacity());
+  EXPECT_EQ(small.Capacity(), 1128u);
   large.Append(bytes.data(), 2000);
-  EXPECT_EQ(2200u, large.Capacity());
+  EXPECT_EQ(large.Capacity(), 2200u);
   small.Append(bytes.data(), 128);  // fits exactly
-  EXPECT_EQ(1128u, small.Capacity());
+  EXPECT_EQ(small.Capacity(), 1128u);
   small.Append(bytes.data(), 1);
   EXPECT_EQ(1129u + 128u, small.Capacity());
-  EXPECT_EQ(1129u, small.Len());
+  EXPECT_EQ(small.Len(), 1129u);
 }
 
 TEST(AutoBuffer, AppendedBytesStandInOrderAndReversed) {
@@ -65,7 +65,7 @@ TEST(AutoBuffer, AppendedBytesStandInOrderAndReversed) {
   b.Append("cd", 2);
   b.appendReverseByteOrder("123", 3);
   b.appendReverseByteOrder("", 0);
-  EXPECT_EQ("abcd321", Text(b));
+  EXPECT_EQ(Text(b), "abcd321");
 }
 
 TEST(AutoBuffer, AppendFromInsideItself) {
@@ -76,8 +76,8 @@ TEST(AutoBuffer, AppendFromInsideItself) {
   EXPECT_EQ(expected, Text(b));
   AutoBuffer shared = Of("xyz"), other(shared);
   shared.appendReverseByteOrder(shared.Data() + 1, 2);
-  EXPECT_EQ("xyzzy", Text(shared));
-  EXPECT_EQ("xyz", Text(other));
+  EXPECT_EQ(Text(shared), "xyzzy");
+  EXPECT_EQ(Text(other), "xyz");
 }
 
 TEST(AutoBuffer, CopiesShareUntilOneIsWritten) {
@@ -86,9 +86,9 @@ TEST(AutoBuffer, CopiesShareUntilOneIsWritten) {
   EXPECT_EQ(a.Data(), b.Data());
   EXPECT_EQ(a.Data(), c.Data());
   b.Append("d", 1);
-  EXPECT_EQ("abc", Text(a));
-  EXPECT_EQ("abcd", Text(b));
-  EXPECT_EQ("abc", Text(c));
+  EXPECT_EQ(Text(a), "abc");
+  EXPECT_EQ(Text(b), "abcd");
+  EXPECT_EQ(Text(c), "abc");
   EXPECT_EQ(a.Data(), c.Data());
 }
 
@@ -132,64 +132,64 @@ TEST(AutoBuffer, AssignmentOfItselfOrOfTheSameBlockChangesNothing) {
   AutoBuffer& self = a;
   a = self;
   a = b;
-  EXPECT_EQ("abc", Text(a));
+  EXPECT_EQ(Text(a), "abc");
   EXPECT_EQ(a.Data(), b.Data());
   a = AutoBuffer();
-  EXPECT_EQ(nullptr, a.Data());
-  EXPECT_EQ("abc", Text(b));
+  EXPECT_EQ(a.Data(), nullptr);
+  EXPECT_EQ(Text(b), "abc");
 }
 
 TEST(AutoBuffer, AssignmentFromAViewOfItself) {
   AutoBuffer a = Of("abcdef");
   a = BufferWrapper(a.Data() + 2, 3);
-  EXPECT_EQ("cde", Text(a));
+  EXPECT_EQ(Text(a), "cde");
 }
 
 TEST(AutoBuffer, EraseKeepsAnUnsharedBlockAndDropsASharedOne) {
   AutoBuffer a = Of("abc");
   const unsigned char* block = a.Data();
   a.Erase();
-  EXPECT_EQ(0u, a.Len());
+  EXPECT_EQ(a.Len(), 0u);
   EXPECT_EQ(block, a.Data());
   AutoBuffer b = Of("abc"), c(b);
   b.Erase();
-  EXPECT_EQ(nullptr, b.Data());
-  EXPECT_EQ("abc", Text(c));
+  EXPECT_EQ(b.Data(), nullptr);
+  EXPECT_EQ(Text(c), "abc");
 }
 
 TEST(AutoBuffer, ReserveAndSkipAreExact) {
   AutoBuffer b;
   b.Reserve(10);
-  EXPECT_EQ(10u, b.Capacity());
+  EXPECT_EQ(b.Capacity(), 10u);
   b.Reserve(5);
-  EXPECT_EQ(10u, b.Capacity());
+  EXPECT_EQ(b.Capacity(), 10u);
   b.Append("0123456789", 10);
   b.Skip(3);
-  EXPECT_EQ(13u, b.Len());
-  EXPECT_EQ(13u, b.Capacity());
+  EXPECT_EQ(b.Len(), 13u);
+  EXPECT_EQ(b.Capacity(), 13u);
   memcpy(b.Data() + 10, "abc", 3);
-  EXPECT_EQ("0123456789abc", Text(b));
+  EXPECT_EQ(Text(b), "0123456789abc");
 }
 
 TEST(AutoBuffer, UnAppendShortensAndStopsAtEmpty) {
   AutoBuffer b = Of("abcdef");
   b.UnAppend(2);
-  EXPECT_EQ("abcd", Text(b));
+  EXPECT_EQ(Text(b), "abcd");
   b.UnAppend(100);
-  EXPECT_EQ(0u, b.Len());
+  EXPECT_EQ(b.Len(), 0u);
   b.Append("z", 1);
-  EXPECT_EQ("z", Text(b));
+  EXPECT_EQ(Text(b), "z");
 }
 
 TEST(AutoBuffer, ModifyOverwritesWithoutMovingTheEnd) {
   AutoBuffer b = Of("abcdef");
   b.Modify(2, "XY", 2);
-  EXPECT_EQ("abXYef", Text(b));
+  EXPECT_EQ(Text(b), "abXYef");
   b.Modify(4, "12345678", 8);  // beyond the end: room for 12, the length stays
-  EXPECT_EQ("abXY12", Text(b));
+  EXPECT_EQ(Text(b), "abXY12");
   EXPECT_EQ(12u + 128u, b.Capacity());
   b.Skip(6);
-  EXPECT_EQ("abXY12345678", Text(b));
+  EXPECT_EQ(Text(b), "abXY12345678");
 }
 
 TEST(AutoBuffer, CloneHasAllTheRoomItClaims) {
@@ -197,12 +197,12 @@ TEST(AutoBuffer, CloneHasAllTheRoomItClaims) {
   a.Append("abc", 3);
   AutoBuffer b(a);
   b.Append("d", 1);
-  EXPECT_EQ(4096u, b.Capacity());
+  EXPECT_EQ(b.Capacity(), 4096u);
   const std::string filler(4092, 'x');
   b.Append(filler.data(), 4092);  // into the claimed room; a checker of memory would see it pass
-  EXPECT_EQ(4096u, b.Capacity());
+  EXPECT_EQ(b.Capacity(), 4096u);
   EXPECT_EQ("abcd" + filler, Text(b));
-  EXPECT_EQ("abc", Text(a));
+  EXPECT_EQ(Text(a), "abc");
 }
 
 TEST(AutoBuffer, LengthsBeyondThirtyTwoBitsAreOutOfRange) {
@@ -211,7 +211,7 @@ TEST(AutoBuffer, LengthsBeyondThirtyTwoBitsAreOutOfRange) {
   EXPECT_THROW(b.appendReverseByteOrder("x", 0xFFFFFFFDu), exception::OutOfRange);
   EXPECT_THROW(b.Skip(0xFFFFFFFDu), exception::OutOfRange);
   EXPECT_THROW(b.Modify(0xFFFFFFFFu, "x", 1), exception::OutOfRange);
-  EXPECT_EQ("abc", Text(b));
+  EXPECT_EQ(Text(b), "abc");
 }
 
 TEST(AutoBuffer, FailedAllocationLeavesTheBytes) {
@@ -234,39 +234,39 @@ TEST(AutoBuffer, FailedAllocationLeavesTheBytes) {
     b.Append("d", 1);
     return Text(b) == "abcd" ? 0 : 3;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(AutoBuffer, CompareIsByByteThenByLength) {
   auto compare = [](const std::string& a, const std::string& b) {
     return CompareBuffers(Of(a), Of(b));
   };
-  EXPECT_EQ(-1, compare("ab", "abc"));
-  EXPECT_EQ(0, compare("ab", "ab"));
-  EXPECT_EQ(1, compare("b", "abc"));
-  EXPECT_EQ(1, compare("\xff", "\x01zzz"));
-  EXPECT_EQ(0, CompareBuffers(AutoBuffer(), BufferWrapper()));
-  EXPECT_EQ(-1, CompareBuffers(AutoBuffer(), Of("a")));
+  EXPECT_EQ(compare("ab", "abc"), -1);
+  EXPECT_EQ(compare("ab", "ab"), 0);
+  EXPECT_EQ(compare("b", "abc"), 1);
+  EXPECT_EQ(compare("\xff", "\x01zzz"), 1);
+  EXPECT_EQ(CompareBuffers(AutoBuffer(), BufferWrapper()), 0);
+  EXPECT_EQ(CompareBuffers(AutoBuffer(), Of("a")), -1);
   EXPECT_TRUE(Of("ab") < Of("b"));
   EXPECT_FALSE(Of("b") < Of("b"));
 }
 
 TEST(AutoBuffer, WireFormIsLengthAndBytes) {
   AutoBuffer b = Of("abc");
-  EXPECT_EQ(7u, b.serializationSize());
-  EXPECT_EQ(4u, AutoBuffer().serializationSize());
+  EXPECT_EQ(b.serializationSize(), 7u);
+  EXPECT_EQ(AutoBuffer().serializationSize(), 4u);
   unsigned char form[8] = {};
   unsigned char* cursor = form;
   b.serialize(cursor, form + 7);
   EXPECT_EQ(form + 7, cursor);
   const unsigned char expected[] = {3, 0, 0, 0, 'a', 'b', 'c'};
-  EXPECT_EQ(0, memcmp(expected, form, 7));
+  EXPECT_EQ(memcmp(expected, form, 7), 0);
   AutoBuffer back = Of("something longer");
   const unsigned char* block = back.Data();
   const unsigned char* in = form;
   back.deserialize(in, form + 8);
   EXPECT_EQ(form + 7, in);
-  EXPECT_EQ("abc", Text(back));
+  EXPECT_EQ(Text(back), "abc");
   EXPECT_EQ(block, back.Data());  // reused
 }
 
@@ -277,7 +277,7 @@ TEST(AutoBuffer, WireFormThatDoesNotFitThrowsAndChangesNothing) {
     unsigned char* cursor = form;
     EXPECT_THROW(b.serialize(cursor, form + room), exception::BufferOverflow) << room;
     EXPECT_EQ(form, cursor);
-    EXPECT_EQ(0, form[0]);
+    EXPECT_EQ(form[0], 0);
   }
   unsigned char* out = form;
   b.serialize(out, form + 7);
@@ -286,7 +286,7 @@ TEST(AutoBuffer, WireFormThatDoesNotFitThrowsAndChangesNothing) {
     const unsigned char* in = form;
     EXPECT_THROW(back.deserialize(in, form + room), exception::DeserializationError) << room;
     EXPECT_EQ(form, in);
-    EXPECT_EQ("old", Text(back));
+    EXPECT_EQ(Text(back), "old");
   }
   const unsigned char hostile[] = {0xFF, 0xFF, 0xFF, 0xFF, 1};
   const unsigned char* in = hostile;
@@ -300,15 +300,15 @@ TEST(AutoBufferRing, FormWrapsAtEveryPosition) {
     unsigned char* out = ring + start;
     b.circularSerialize(ring, ring + 11, out);
     EXPECT_EQ(ring + start % 11, out) << "once around";
-    EXPECT_EQ(7, ring[start % 11]);
-    EXPECT_EQ('a', ring[(start + 4) % 11]);
-    EXPECT_EQ('g', ring[(start + 10) % 11]);
+    EXPECT_EQ(ring[start % 11], 7);
+    EXPECT_EQ(ring[(start + 4) % 11], 'a');
+    EXPECT_EQ(ring[(start + 10) % 11], 'g');
     const unsigned char* in = ring + start;
-    EXPECT_EQ(11u, AutoBuffer::GetCircularDeserializationSize(ring, ring + 11, in));
+    EXPECT_EQ(AutoBuffer::GetCircularDeserializationSize(ring, ring + 11, in), 11u);
     EXPECT_EQ(ring + start, in);
     AutoBuffer back;
     back.circularDeserialize(ring, ring + 11, in);
-    EXPECT_EQ("abcdefg", Text(back)) << start;
+    EXPECT_EQ(Text(back), "abcdefg") << start;
     EXPECT_EQ(ring + start % 11, in);
   }
 }
@@ -325,7 +325,7 @@ TEST(AutoBufferRing, CursorThatLandsOnTheEndGoesToTheBegin) {
   AutoBuffer back = Of("old");
   back.circularDeserialize(ring, ring + 10, in);
   EXPECT_EQ(ring, in);
-  EXPECT_EQ(0u, back.Len());
+  EXPECT_EQ(back.Len(), 0u);
 }
 
 TEST(AutoBufferRing, FormLargerThanTheRingThrows) {
@@ -334,7 +334,7 @@ TEST(AutoBufferRing, FormLargerThanTheRingThrows) {
   EXPECT_THROW(Of("abcdefg").circularSerialize(ring, ring + 10, out), exception::BufferOverflow);
   EXPECT_THROW(AutoBuffer().circularSerialize(ring, ring + 3, out), exception::BufferOverflow);
   EXPECT_EQ(ring, out);
-  EXPECT_EQ(0, ring[0]);
+  EXPECT_EQ(ring[0], 0);
   out = ring + 10;
   EXPECT_THROW(Of("a").circularSerialize(ring, ring + 9, out), exception::BufferOverflow);
 }
@@ -354,7 +354,7 @@ TEST(AutoBufferRing, HostileLengthsThrow) {
   EXPECT_THROW(back.circularDeserialize(all, all + 3, in), exception::DeserializationError);
   EXPECT_THROW(AutoBuffer::GetCircularDeserializationSize(all, all + 10, in),
                exception::DeserializationError);
-  EXPECT_EQ("old", Text(back));
+  EXPECT_EQ(Text(back), "old");
 }
 
 TEST(AutoBufferRing, LengthAloneAndIncrement) {
@@ -363,7 +363,7 @@ TEST(AutoBufferRing, LengthAloneAndIncrement) {
   AutoBuffer::circularSerializeLength(0x04030201u, ring, ring + 5, cursor);
   EXPECT_EQ(ring + 2, cursor);
   const unsigned char expected[] = {3, 4, 0, 1, 2};
-  EXPECT_EQ(0, memcmp(expected, ring, 5));
+  EXPECT_EQ(memcmp(expected, ring, 5), 0);
   AutoBuffer::circularIncrement(ring, ring + 5, cursor);
   EXPECT_EQ(ring + 3, cursor);
   cursor = ring + 4;
@@ -386,8 +386,8 @@ TEST(AutoBuffer, CopiesMayLiveInDifferentThreads) {
     });
   }
   for (auto& thread : threads) thread.join();
-  EXPECT_EQ(0, wrong);
-  EXPECT_EQ(1000u, source.Len());
+  EXPECT_EQ(wrong, 0);
+  EXPECT_EQ(source.Len(), 1000u);
 }
 
 }  // namespace

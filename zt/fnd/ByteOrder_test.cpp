@@ -11,14 +11,14 @@ TEST(ByteOrder, BigEndianCopiesReverse) {
   const unsigned char src[] = {1, 2, 3, 4, 5};
   unsigned char dest[5] = {};
   big_endian::CopyToBigEndian(5, dest, src);
-  EXPECT_EQ(5, dest[0]);
-  EXPECT_EQ(3, dest[2]);
-  EXPECT_EQ(1, dest[4]);
+  EXPECT_EQ(dest[0], 5);
+  EXPECT_EQ(dest[2], 3);
+  EXPECT_EQ(dest[4], 1);
   unsigned char back[5] = {};
   big_endian::CopyFromBigEndian(5, back, dest);
-  EXPECT_EQ(0, memcmp(src, back, 5));
+  EXPECT_EQ(memcmp(src, back, 5), 0);
   big_endian::CopyToBigEndian(0, dest, src);
-  EXPECT_EQ(5, dest[0]);
+  EXPECT_EQ(dest[0], 5);
 }
 
 TEST(ByteOrder, ValuesReverseOrStay) {
@@ -34,7 +34,7 @@ TEST(ByteOrder, SerializeRawWritesAndMoves) {
   little_endian::SerializeRaw<uint32_t>(0x04030201u, cursor, bytes + 5);
   EXPECT_EQ(bytes + 5, cursor);
   const unsigned char expected[] = {9, 1, 2, 3, 4};
-  EXPECT_EQ(0, memcmp(expected, bytes, 5));
+  EXPECT_EQ(memcmp(expected, bytes, 5), 0);
 }
 
 TEST(ByteOrder, SerializeRawWithoutRoomThrowsAndLeavesAll) {
@@ -43,7 +43,7 @@ TEST(ByteOrder, SerializeRawWithoutRoomThrowsAndLeavesAll) {
   EXPECT_THROW(little_endian::SerializeRaw<uint32_t>(1, cursor, bytes + 3),
                exception::BufferOverflow);
   EXPECT_EQ(bytes, cursor);
-  EXPECT_EQ(9, bytes[0]);
+  EXPECT_EQ(bytes[0], 9);
   cursor = bytes + 2;  // the limit lies before the cursor
   EXPECT_THROW(little_endian::SerializeRaw<uint16_t>(1, cursor, bytes + 1),
                exception::BufferOverflow);
@@ -54,11 +54,11 @@ TEST(ByteOrder, DeserializeRawReadsAndMovesOrThrows) {
   const unsigned char* cursor = bytes + 1;
   uint32_t value = 0;
   little_endian::DeserializeRaw(value, cursor, bytes + 5);
-  EXPECT_EQ(0x04030201u, value);
+  EXPECT_EQ(value, 0x04030201u);
   EXPECT_EQ(bytes + 5, cursor);
   EXPECT_THROW(little_endian::DeserializeRaw(value, cursor, bytes + 5),
                exception::DeserializationError);
-  EXPECT_EQ(0x04030201u, value);
+  EXPECT_EQ(value, 0x04030201u);
   EXPECT_EQ(bytes + 5, cursor);
 }
 
@@ -74,7 +74,7 @@ TEST(ByteOrder, BoundsChecksThrowUnstamped) {
     little_endian::SerializeRaw<uint32_t>(1, cursor, &byte + 1);
     FAIL();
   } catch (const exception::BufferOverflow& e) {
-    EXPECT_EQ(nullptr, Place::fileOf(e));
+    EXPECT_EQ(Place::fileOf(e), nullptr);
   }
 }
 

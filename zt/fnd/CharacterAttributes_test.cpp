@@ -14,20 +14,20 @@ using namespace zt::fnd;
 TEST(CharacterAttributes, DefaultFoldsAsciiOnly) {
   const vlt::test::ScopedLocale locale(LC_ALL, "C.UTF-8");
   const CharacterAttributes<wchar_t> wide;
-  EXPECT_EQ(L'A', wide.toUpper(L'a'));
-  EXPECT_EQ(L'A', wide.toUpper(L'A'));
-  EXPECT_EQ(L'\xE9', wide.toUpper(L'\xE9'));
+  EXPECT_EQ(wide.toUpper(L'a'), L'A');
+  EXPECT_EQ(wide.toUpper(L'A'), L'A');
+  EXPECT_EQ(wide.toUpper(L'\xE9'), L'\xE9');
   EXPECT_EQ(static_cast<wchar_t>(0x7FFFFFFF), wide.toUpper(static_cast<wchar_t>(0x7FFFFFFF)));
   const CharacterAttributes<char> narrow;
-  EXPECT_EQ('Z', narrow.toUpper('z'));
-  EXPECT_EQ('\xE9', narrow.toUpper('\xE9'));
+  EXPECT_EQ(narrow.toUpper('z'), 'Z');
+  EXPECT_EQ(narrow.toUpper('\xE9'), '\xE9');
 }
 
 TEST(CharacterAttributes, NamedLocale) {
   const CharacterAttributes<wchar_t> wide("C.UTF-8");
-  EXPECT_EQ(L'\xC9', wide.toUpper(L'\xE9'));
+  EXPECT_EQ(wide.toUpper(L'\xE9'), L'\xC9');
   const CharacterAttributes<wchar_t> copy(wide);
-  EXPECT_EQ(L'\xC9', copy.toUpper(L'\xE9'));
+  EXPECT_EQ(copy.toUpper(L'\xE9'), L'\xC9');
 }
 
 TEST(CharacterAttributes, UnknownNameRaisesWithTheReason) {
@@ -35,7 +35,7 @@ TEST(CharacterAttributes, UnknownNameRaisesWithTheReason) {
     const CharacterAttributes<char> none("no_SUCH.locale");
     FAIL();
   } catch (const exception::InvalidArgument2& e) {
-    EXPECT_EQ(0, strncmp(e.what(), "Invalid argument(s): ", 21));
+    EXPECT_EQ(strncmp(e.what(), "Invalid argument(s): ", 21), 0);
     EXPECT_GT(strlen(e.what()), 21u);
   }
 }
@@ -49,5 +49,5 @@ TEST(CharacterAttributes, NullIsNoNameAndEmptyIsTheEnvironments) {
     setenv("LC_ALL", "C.UTF-8", 1);
     return CharacterAttributes<wchar_t>("").toUpper(L'\xE9') == L'\xC9' ? 0 : 1;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }

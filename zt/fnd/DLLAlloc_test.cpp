@@ -15,7 +15,7 @@ volatile unsigned long g_impossibleSize = ULONG_MAX - 1000;
 
 TEST(DLLAlloc, MallocGivesABlockThatFreeTakes) {
   void* p = DLLMalloc(100);
-  ASSERT_NE(nullptr, p);
+  ASSERT_NE(p, nullptr);
   memset(p, 1, 100);
   DLLFree(p);
   DLLFree(nullptr);
@@ -23,7 +23,7 @@ TEST(DLLAlloc, MallocGivesABlockThatFreeTakes) {
 
 TEST(DLLAlloc, MallocThatFailsThrowsOrReturnsNullByItsName) {
   EXPECT_THROW(DLLMalloc(g_impossibleSize), std::bad_alloc);
-  EXPECT_EQ(nullptr, DLLMallocNoThrow(g_impossibleSize));
+  EXPECT_EQ(DLLMallocNoThrow(g_impossibleSize), nullptr);
 }
 
 TEST(DLLAlloc, ReallocToNothingFreesAndReturnsNull) {
@@ -34,7 +34,7 @@ TEST(DLLAlloc, ReallocToNothingFreesAndReturnsNull) {
 TEST(DLLAlloc, ReallocOfNullAllocates) {
   for (unsigned long size : {0ul, 10ul}) {
     void* p = DLLRealloc(nullptr, size);
-    EXPECT_NE(nullptr, p) << size;
+    EXPECT_NE(p, nullptr) << size;
     DLLFree(p);
   }
 }
@@ -43,7 +43,7 @@ TEST(DLLAlloc, ReallocKeepsTheBytes) {
   char* p = static_cast<char*>(DLLMalloc(4));
   memcpy(p, "abc", 4);
   p = static_cast<char*>(DLLRealloc(p, 100000));
-  EXPECT_STREQ("abc", p);
+  EXPECT_STREQ(p, "abc");
   DLLFree(p);
 }
 
@@ -51,13 +51,13 @@ TEST(DLLAlloc, ReallocThatFailsLeavesTheOldBlock) {
   std::unique_ptr<char, void (*)(void*)> p(static_cast<char*>(DLLMalloc(4)), DLLFree);
   memcpy(p.get(), "abc", 4);
   EXPECT_THROW(DLLRealloc(p.get(), g_impossibleSize), std::bad_alloc);
-  EXPECT_EQ(nullptr, DLLReallocNoThrow(p.get(), g_impossibleSize));
-  EXPECT_STREQ("abc", p.get());
+  EXPECT_EQ(DLLReallocNoThrow(p.get(), g_impossibleSize), nullptr);
+  EXPECT_STREQ(p.get(), "abc");
 }
 
 TEST(DLLAlloc, MakeDLLMallocThrowChangesNothing) {
   EXPECT_FALSE(MakeDLLMallocThrow(true));
-  EXPECT_EQ(nullptr, DLLMallocNoThrow(g_impossibleSize));
+  EXPECT_EQ(DLLMallocNoThrow(g_impossibleSize), nullptr);
   EXPECT_FALSE(MakeDLLMallocThrow(false));
   EXPECT_THROW(DLLMalloc(g_impossibleSize), std::bad_alloc);
 }

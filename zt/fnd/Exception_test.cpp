@@ -60,8 +60,8 @@ TEST(Exception, EveryClassHasItsCodeAndText) {
 TEST(Exception, DetailIsAppendedWholeAndNullCountsAsEmpty) {
   std::string detail(100000, 'd');
   EXPECT_EQ("Out of range: " + detail, OutOfRange2(detail.c_str()).what());
-  EXPECT_STREQ("Access denied: ", AccessDenied(nullptr).what());
-  EXPECT_STREQ("Invalid argument(s): ", InvalidArgument2("").what());
+  EXPECT_STREQ(AccessDenied(nullptr).what(), "Access denied: ");
+  EXPECT_STREQ(InvalidArgument2("").what(), "Invalid argument(s): ");
 }
 
 TEST(Exception, DirectBasesAreAsTheHandlersExpect) {
@@ -77,7 +77,7 @@ TEST(Exception, DetailedFormIsCaughtAsItsBase) {
   try {
     ZT_RAISE(OutOfRange2("x"));
   } catch (const OutOfRange& e) {
-    EXPECT_STREQ("Out of range: x", e.what());
+    EXPECT_STREQ(e.what(), "Out of range: x");
   }
   EXPECT_THROW(ZT_RAISE(InvalidArgument2("bad")), InvalidArgument);
 }
@@ -97,8 +97,8 @@ TEST(Exception, BoundExceededIsNotCaughtAsOutOfRangeThoughTheCodesAreEqual) {
 
 TEST(Exception, UnstampedUntilRaised) {
   OutOfRange e;
-  EXPECT_EQ(0u, Place::lineOf(e));
-  EXPECT_EQ(nullptr, Place::fileOf(e));
+  EXPECT_EQ(Place::lineOf(e), 0u);
+  EXPECT_EQ(Place::fileOf(e), nullptr);
 }
 
 TEST(Exception, RaiseStampsLineAndSourcePathWithoutExtension) {
@@ -108,8 +108,8 @@ TEST(Exception, RaiseStampsLineAndSourcePathWithoutExtension) {
     ZT_RAISE(AccessDenied("/x"));
   } catch (const Exception& e) {
     EXPECT_EQ(line, Place::lineOf(e));
-    EXPECT_STREQ("zt/fnd/Exception_test", Place::fileOf(e));
-    EXPECT_STREQ("Access denied: /x", e.what());
+    EXPECT_STREQ(Place::fileOf(e), "zt/fnd/Exception_test");
+    EXPECT_STREQ(e.what(), "Access denied: /x");
   }
 }
 
@@ -118,14 +118,14 @@ TEST(Exception, RaiseFromAHeaderStampsTheHeader) {
     SafeInteger<unsigned int>::Add(0xFFFFFFFFu, 1);
     FAIL();
   } catch (const OutOfRange& e) {
-    EXPECT_STREQ("zt/fnd/SafeInteger", Place::fileOf(e));
-    EXPECT_NE(0u, Place::lineOf(e));
+    EXPECT_STREQ(Place::fileOf(e), "zt/fnd/SafeInteger");
+    EXPECT_NE(Place::lineOf(e), 0u);
   }
   try {
     NumericCast<unsigned int>(-1);
     FAIL();
   } catch (const OutOfRange& e) {
-    EXPECT_STREQ("zt/fnd/NumericCast", Place::fileOf(e));
+    EXPECT_STREQ(Place::fileOf(e), "zt/fnd/NumericCast");
   }
 }
 
@@ -136,7 +136,7 @@ TEST(Exception, RaiseThrowsACopyAndKeepsTheDynamicClass) {
   } catch (const OutOfRange2& e) {
     EXPECT_NE(&original, &e);
   }
-  EXPECT_EQ(0u, Place::lineOf(original));
+  EXPECT_EQ(Place::lineOf(original), 0u);
 }
 
 TEST(Exception, CopyHasAMessageAndAPlaceOfItsOwn) {
@@ -152,13 +152,13 @@ TEST(Exception, CopyHasAMessageAndAPlaceOfItsOwn) {
     EXPECT_EQ(Place::fileOf(e), Place::fileOf(copy));
     copied = &copy;
   }
-  EXPECT_NE(nullptr, copied);
+  EXPECT_NE(copied, nullptr);
 }
 
 TEST(Exception, StemKeepsDotsInDirectories) {
-  EXPECT_STREQ("a.b/c", detail::FileStem("a.b/c").text);
-  EXPECT_STREQ("a/b.c", detail::FileStem("a/b.c.cpp").text);
-  EXPECT_STREQ("a", detail::FileStem("a.h").text);
+  EXPECT_STREQ(detail::FileStem("a.b/c").text, "a.b/c");
+  EXPECT_STREQ(detail::FileStem("a/b.c.cpp").text, "a/b.c");
+  EXPECT_STREQ(detail::FileStem("a.h").text, "a");
 }
 
 TEST(Exception, FailedAllocationOfTheMessageBecomesBadAlloc) {

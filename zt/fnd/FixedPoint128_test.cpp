@@ -65,7 +65,7 @@ TEST(FixedPoint128, BackToFloatingPoint) {
     EXPECT_NEAR(value, static_cast<double>(static_cast<long double>(Fixed(value))),
                 std::ldexp(1.0, -63));
   }
-  EXPECT_EQ(-9223372036854775808.0, D(Fixed(0x80000000, 0, 0, 0)));
+  EXPECT_EQ(D(Fixed(0x80000000, 0, 0, 0)), -9223372036854775808.0);
 }
 
 TEST(FixedPoint128, SumsCarryAndBorrow) {

@@ -28,7 +28,7 @@ TEST(Guid, IsSixteenBytesThatCopyAsTheyAre) {
   static_assert(sizeof(Guid) == 16 && std::is_trivially_copyable_v<Guid>);
   const Guid guid(kGuid);
   const Guid copy(guid);
-  EXPECT_EQ(0, memcmp(&copy, &kGuid, 16));
+  EXPECT_EQ(memcmp(&copy, &kGuid, 16), 0);
 }
 
 TEST(Guid, ZerosRoundTrip) {
@@ -39,16 +39,16 @@ TEST(Guid, ZerosRoundTrip) {
 
 TEST(Guid, ParsesItsFields) {
   const Guid guid(kText);
-  EXPECT_EQ(0x00112233u, guid.get().Data1);
-  EXPECT_EQ(0x4455u, guid.get().Data2);
-  EXPECT_EQ(0x6677u, guid.get().Data3);
-  EXPECT_EQ(0, memcmp(guid.get().Data4, kGuid.Data4, 8));
-  EXPECT_EQ(kText, Text(guid));
+  EXPECT_EQ(guid.get().Data1, 0x00112233u);
+  EXPECT_EQ(guid.get().Data2, 0x4455u);
+  EXPECT_EQ(guid.get().Data3, 0x6677u);
+  EXPECT_EQ(memcmp(guid.get().Data4, kGuid.Data4, 8), 0);
+  EXPECT_EQ(Text(guid), kText);
 }
 
 TEST(Guid, LowerCaseParsesAndPrintsInCapitals) {
-  EXPECT_EQ(kText, Text(Guid(L"{00112233-4455-6677-8899-aabbccddeeff}")));
-  EXPECT_EQ(kText, Text(Guid(L"{00112233-4455-6677-8899-AaBbCcDdEeFf}")));
+  EXPECT_EQ(Text(Guid(L"{00112233-4455-6677-8899-aabbccddeeff}")), kText);
+  EXPECT_EQ(Text(Guid(L"{00112233-4455-6677-8899-AaBbCcDdEeFf}")), kText);
 }
 
 TEST(Guid, WrongLengthsRaise) {
@@ -66,7 +66,7 @@ TEST(Guid, EveryWrongCharacterRaisesAndChangesNothing) {
       String bad(L"{FFFFFFFF-FFFF-FFFF-FFFF-FFFFFFFFFFFF}");
       bad[i] = wrong;
       EXPECT_THROW(guid.fromString(bad), exception::BadGuidString) << i;
-      EXPECT_EQ(kText, Text(guid));
+      EXPECT_EQ(Text(guid), kText);
     }
   }
   String bad(kText);
@@ -98,7 +98,7 @@ TEST(Guid, OrdersByTheFirstDifference) {
   }
   std::map<_GUID, int> map;
   map[table[0]] = 1;
-  EXPECT_EQ(1u, map.count(table[0]));
+  EXPECT_EQ(map.count(table[0]), 1u);
 }
 
 TEST(Guid, DeserializesTheMemoryForm) {
@@ -107,9 +107,9 @@ TEST(Guid, DeserializesTheMemoryForm) {
   Guid guid;
   const unsigned char* cursor = bytes;
   guid.deserialize(cursor, bytes + 17);
-  EXPECT_EQ(kText, Text(guid));
+  EXPECT_EQ(Text(guid), kText);
   EXPECT_EQ(bytes + 16, cursor);
-  EXPECT_EQ(16u, guid.serializationSize());
+  EXPECT_EQ(guid.serializationSize(), 16u);
 }
 
 TEST(Guid, DeserializingFewerThanSixteenBytesRaises) {
@@ -120,13 +120,13 @@ TEST(Guid, DeserializingFewerThanSixteenBytesRaises) {
     EXPECT_THROW(guid.deserialize(cursor, bytes + n), exception::DeserializationError);
     EXPECT_EQ(bytes, cursor);
   }
-  EXPECT_EQ(kText, Text(guid));
+  EXPECT_EQ(Text(guid), kText);
 }
 
 TEST(Guid, MakeGivesFreshVersionFourUuids) {
   const Guid a = Guid::make(), b = Guid::make();
   EXPECT_FALSE(a == b);
-  EXPECT_EQ(L'4', Text(a)[15]);
+  EXPECT_EQ(Text(a)[15], L'4');
   EXPECT_NE(std::wstring::npos, std::wstring(L"89AB").find(Text(a)[20]));
 }
 
@@ -134,9 +134,9 @@ TEST(Guid, ParsingHelpersStopForGood) {
   const wchar_t text[] = L"fFx";
   const wchar_t* cursor = text;
   bool ok = true;
-  EXPECT_EQ(15, ParseHexNibble(cursor, text + 3, ok));
-  EXPECT_EQ(15, ParseHexNibble(cursor, text + 3, ok));
-  EXPECT_EQ(0, ParseHexNibble(cursor, text + 3, ok));
+  EXPECT_EQ(ParseHexNibble(cursor, text + 3, ok), 15);
+  EXPECT_EQ(ParseHexNibble(cursor, text + 3, ok), 15);
+  EXPECT_EQ(ParseHexNibble(cursor, text + 3, ok), 0);
   EXPECT_FALSE(ok);
   EXPECT_EQ(text + 2, cursor);
   SkipCharacter(cursor, text + 3, L'x', ok);
@@ -157,11 +157,11 @@ TEST(Guid, ParsedFieldsAreStoredOnlyWhileAllIsWell) {
   ParseHex<uint32_t>(cursor, text + 8, out, ok);
   EXPECT_TRUE(ok);
   EXPECT_EQ(bytes + 4, out);
-  EXPECT_EQ(0x78, bytes[0]) << "the host's byte order";
+  EXPECT_EQ(bytes[0], 0x78) << "the host's byte order";
   cursor = text;
   out = bytes;
   ParseHex<uint16_t>(cursor, text + 3, out, ok);
   EXPECT_FALSE(ok);
   EXPECT_EQ(bytes, out);
-  EXPECT_EQ(0x78, bytes[0]);
+  EXPECT_EQ(bytes[0], 0x78);
 }

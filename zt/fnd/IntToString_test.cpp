@@ -62,13 +62,13 @@ TEST(IntToString, BasesOutside2To36Raise) {
     EXPECT_THROW(Int32ToString(-5, base), exception::UnableToConvert);
     EXPECT_THROW(Int64ToString(1, base), exception::UnableToConvert);
   }
-  EXPECT_EQ(L"Z", Std(UInt32ToString(35, 36)));
+  EXPECT_EQ(Std(UInt32ToString(35, 36)), L"Z");
 }
 
 TEST(IntToString, ThreadIdsShowInHexadecimal) {
   const auto id = static_cast<unsigned long>(pthread_self());
   char expected[2 * sizeof id + 1];
   snprintf(expected, sizeof expected, "%lX", id);
-  EXPECT_EQ(0,
-            osdep::ThreadID::getCallingID().getDisplayStringHex().exactCompare(String(expected)));
+  EXPECT_EQ(osdep::ThreadID::getCallingID().getDisplayStringHex().exactCompare(String(expected)),
+            0);
 }

@@ -24,13 +24,13 @@ TEST(NumericCast, UnsignedLongAboveThirtyTwoBitsIsOutOfRange) {
 TEST(NumericCast, NegativeForUnsignedIsOutOfRange) {
   EXPECT_THROW((_NumericCast<unsigned int, long>::convert(-1)), exception::OutOfRange);
   EXPECT_THROW((_NumericCast<unsigned int, int>::convert(INT_MIN)), exception::OutOfRange);
-  EXPECT_EQ(5u, (_NumericCast<unsigned int, long>::convert(5)));
+  EXPECT_EQ((_NumericCast<unsigned int, long>::convert(5)), 5u);
 }
 
 TEST(NumericCast, SignedTargetsHaveBothLimits) {
   EXPECT_EQ(INT_MAX, NumericCast<int>(0x7FFFFFFFu));
   EXPECT_THROW(NumericCast<int>(0x80000000u), exception::OutOfRange);
-  EXPECT_EQ(INT_MIN, NumericCast<int>(int64_t(INT_MIN)));
+  EXPECT_EQ(NumericCast<int>(int64_t(INT_MIN)), INT_MIN);
   EXPECT_THROW(NumericCast<int>(int64_t(INT_MIN) - 1), exception::OutOfRange);
 }
 

@@ -28,19 +28,19 @@ TEST(RefCounted, ObjectGoesWithItsLastReference) {
     c = b;
     a = nullptr;
     b = RefPtr<Thing>();
-    EXPECT_EQ(1, Thing::alive);
+    EXPECT_EQ(Thing::alive, 1);
     RefPtr<Thing>& self = c;
     c = self;
-    EXPECT_EQ(1, Thing::alive);
+    EXPECT_EQ(Thing::alive, 1);
   }
-  EXPECT_EQ(0, Thing::alive);
+  EXPECT_EQ(Thing::alive, 0);
 }
 
 TEST(RefCounted, DetachedReferenceIsNotReleased) {
   Thing* raw = RefPtr<Thing>(new Thing).detach();
-  EXPECT_EQ(1, Thing::alive);
+  EXPECT_EQ(Thing::alive, 1);
   raw->release();
-  EXPECT_EQ(0, Thing::alive);
+  EXPECT_EQ(Thing::alive, 0);
 }
 
 struct PlainThing : RefCountedThreadUnsafePolicy {
@@ -53,9 +53,9 @@ TEST(RefCounted, PlainCountWorksTheSameInOneThread) {
   {
     RefPtr<PlainThing> a(new PlainThing), b(a);
     a = nullptr;
-    EXPECT_EQ(1, PlainThing::alive);
+    EXPECT_EQ(PlainThing::alive, 1);
   }
-  EXPECT_EQ(0, PlainThing::alive);
+  EXPECT_EQ(PlainThing::alive, 0);
 }
 
 struct SectionThing : RefCountedCriticalSectionPolicy {
@@ -115,9 +115,9 @@ TEST(RefCounted, SectionCountIsExactAcrossThreads) {
     });
   }
   for (auto& thread : threads) thread.join();
-  EXPECT_EQ(1, alive);
+  EXPECT_EQ(alive, 1);
   shared = nullptr;
-  EXPECT_EQ(0, alive);
+  EXPECT_EQ(alive, 0);
 }
 
 }  // namespace

@@ -26,64 +26,66 @@ constexpr char kUtf8[] = "a\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80";
 
 TEST(StringConvert, LocaleTextUnderUtf8) {
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
-  EXPECT_EQ(kUtf8, Bytes(AnsiString(kText)));
-  EXPECT_EQ(kText, Std(String(kUtf8)));
-  EXPECT_EQ(kUtf8, Bytes(AnsiString(String(kText))));
-  EXPECT_EQ(kText, Std(String(AnsiString(kUtf8))));
+  EXPECT_EQ(Bytes(AnsiString(kText)), kUtf8);
+  EXPECT_EQ(Std(String(kUtf8)), kText);
+  EXPECT_EQ(Bytes(AnsiString(String(kText))), kUtf8);
+  EXPECT_EQ(Std(String(AnsiString(kUtf8))), kText);
 }
 
 TEST(StringConvert, LocaleTextUnderCIsAsciiWithQuestionMarks) {
   const ScopedLocale locale(LC_CTYPE, "C");
-  EXPECT_EQ("a???", Bytes(AnsiString(kText)));
-  EXPECT_EQ(L"a?????????", Std(String(kUtf8))) << "one for each byte";
+  EXPECT_EQ(Bytes(AnsiString(kText)), "a???");
+  EXPECT_EQ(Std(String(kUtf8)), L"a?????????") << "one for each byte";
 }
 
 TEST(StringConvert, BadTextBecomesQuestionMarks) {
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
-  EXPECT_EQ(L"a?b", Std(String("a\xFF"
-                               "b")));
-  EXPECT_EQ(L"a??", Std(String("a\xE2\x82"))) << "a sequence cut at the end";
-  EXPECT_EQ("a?b", Bytes(AnsiString(L"a\xD800"
-                                    L"b")));
-  EXPECT_EQ("?", Bytes(AnsiString(L"\x110000")));
+  EXPECT_EQ(Std(String("a\xFF"
+                       "b")),
+            L"a?b");
+  EXPECT_EQ(Std(String("a\xE2\x82")), L"a??") << "a sequence cut at the end";
+  EXPECT_EQ(Bytes(AnsiString(L"a\xD800"
+                             L"b")),
+            "a?b");
+  EXPECT_EQ(Bytes(AnsiString(L"\x110000")), "?");
 }
 
 TEST(StringConvert, CapacityIsTheUpperBound) {
-  EXPECT_EQ(3u, String("abc").capacity());
-  EXPECT_EQ(12u, AnsiString(L"abc").capacity()) << "four bytes a character";
-  EXPECT_EQ(12u, AsciiString(L"abc").capacity());
-  EXPECT_EQ(3u, Utf8String(L"abc").capacity()) << "counted";
-  EXPECT_EQ(0u, AnsiString(L"").capacity());
-  EXPECT_EQ(0u, String("").capacity());
+  EXPECT_EQ(String("abc").capacity(), 3u);
+  EXPECT_EQ(AnsiString(L"abc").capacity(), 12u) << "four bytes a character";
+  EXPECT_EQ(AsciiString(L"abc").capacity(), 12u);
+  EXPECT_EQ(Utf8String(L"abc").capacity(), 3u) << "counted";
+  EXPECT_EQ(AnsiString(L"").capacity(), 0u);
+  EXPECT_EQ(String("").capacity(), 0u);
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
   const String s(kUtf8);
-  EXPECT_EQ(4u, s.length());
-  EXPECT_EQ(10u, s.capacity());
+  EXPECT_EQ(s.length(), 4u);
+  EXPECT_EQ(s.capacity(), 10u);
 }
 
 TEST(StringConvert, ForcedLengthsAndRanges) {
-  EXPECT_EQ(std::wstring(L"a\0b", 3), Std(String("a\0b", 3u)));
+  EXPECT_EQ(Std(String("a\0b", 3u)), std::wstring(L"a\0b", 3));
   const char text[] = "abcdef";
-  EXPECT_EQ(L"bc", Std(String(text + 1, text + 3)));
-  EXPECT_EQ("ab", Bytes(AnsiString(L"abcdef", 2u)));
+  EXPECT_EQ(Std(String(text + 1, text + 3)), L"bc");
+  EXPECT_EQ(Bytes(AnsiString(L"abcdef", 2u)), "ab");
 }
 
 TEST(StringConvert, AsciiStringsAreAsciiInEveryLocale) {
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
-  EXPECT_EQ("a???", Bytes(AsciiString(kText)));
-  EXPECT_EQ("a???", Bytes(AsciiString(nullptr, String(kText))));
-  EXPECT_EQ(L"a??", Std(String(nullptr, AsciiString("a\xC3\xA9"))));
+  EXPECT_EQ(Bytes(AsciiString(kText)), "a???");
+  EXPECT_EQ(Bytes(AsciiString(nullptr, String(kText))), "a???");
+  EXPECT_EQ(Std(String(nullptr, AsciiString("a\xC3\xA9"))), L"a??");
 }
 
 TEST(StringConvert, TaggedConversions) {
   const String s(kText);
   const Utf8String u(nullptr, s);
-  EXPECT_EQ(kUtf8, Bytes(u));
-  EXPECT_EQ(kText, Std(String(nullptr, u)));
-  EXPECT_EQ(4u, String(nullptr, u).capacity()) << "counted";
+  EXPECT_EQ(Bytes(u), kUtf8);
+  EXPECT_EQ(Std(String(nullptr, u)), kText);
+  EXPECT_EQ(String(nullptr, u).capacity(), 4u) << "counted";
   const AsciiString ascii("a\xC3\xA9");
-  EXPECT_EQ("a\xC3\xA9", Bytes(Utf8String(nullptr, ascii))) << "the bytes as they are";
-  EXPECT_EQ(3u, Utf8String(nullptr, ascii).capacity());
+  EXPECT_EQ(Bytes(Utf8String(nullptr, ascii)), "a\xC3\xA9") << "the bytes as they are";
+  EXPECT_EQ(Utf8String(nullptr, ascii).capacity(), 3u);
   EXPECT_TRUE(String(nullptr, Utf8String()).empty());
   EXPECT_TRUE(Utf8String(nullptr, AsciiString()).empty());
 }
@@ -97,31 +99,31 @@ TEST(StringConvert, MalformedUtf8RaisesOutOfTheConstructor) {
 TEST(StringConvert, AssignmentConvertsIntoANewBlock) {
   AnsiString s("old");
   s = L"abc";
-  EXPECT_EQ("abc", Bytes(s));
-  EXPECT_EQ(12u, s.capacity());
+  EXPECT_EQ(Bytes(s), "abc");
+  EXPECT_EQ(s.capacity(), 12u);
   s.assign(L"xyz", 1);
-  EXPECT_EQ("x", Bytes(s));
-  EXPECT_EQ(4u, s.capacity());
+  EXPECT_EQ(Bytes(s), "x");
+  EXPECT_EQ(s.capacity(), 4u);
   s = String(L"abcd");
-  EXPECT_EQ("abcd", Bytes(s));
+  EXPECT_EQ(Bytes(s), "abcd");
   String w;
   w = AnsiString("wide");
-  EXPECT_EQ(L"wide", Std(w));
+  EXPECT_EQ(Std(w), L"wide");
 }
 
 TEST(StringConvert, AppendConvertsIntoTheTail) {
   AnsiString s("ab");
   s.append(L"cd");
-  EXPECT_EQ("abcd", Bytes(s));
-  EXPECT_EQ(20u, s.capacity()) << "twice the old length and four bytes a character";
+  EXPECT_EQ(Bytes(s), "abcd");
+  EXPECT_EQ(s.capacity(), 20u) << "twice the old length and four bytes a character";
   s.append(L"efgh", 2u).append(String(L"g")).append(String(L"xhix"), 1, 2);
-  EXPECT_EQ("abcdefghi", Bytes(s));
-  EXPECT_EQ(20u, s.capacity()) << "room was there";
+  EXPECT_EQ(Bytes(s), "abcdefghi");
+  EXPECT_EQ(s.capacity(), 20u) << "room was there";
   String w(L"ab");
   w.append("cd").append("ef", 1u).append(AnsiString("f")).append(AnsiString("ghi"), 0, 2);
-  EXPECT_EQ(L"abcdefgh", Std(w));
+  EXPECT_EQ(Std(w), L"abcdefgh");
   w.append(AnsiString("xyz"), 2, 3);
-  EXPECT_EQ(std::wstring(L"abcdefghz\0\0", 11), Std(w));
+  EXPECT_EQ(Std(w), std::wstring(L"abcdefghz\0\0", 11));
 }
 
 TEST(StringConvert, AppendTakesTheRoomThatIsThere) {
@@ -130,20 +132,19 @@ TEST(StringConvert, AppendTakesTheRoomThatIsThere) {
   const char* const block = s.begin();
   s.append(L"bc");
   EXPECT_EQ(block, s.begin());
-  EXPECT_EQ(9u, s.capacity());
+  EXPECT_EQ(s.capacity(), 9u);
   s.append(L"de");
-  EXPECT_EQ(22u, s.capacity()) << "needs 3 + 8";
-  EXPECT_EQ("abcde", Bytes(s));
+  EXPECT_EQ(s.capacity(), 22u) << "needs 3 + 8";
+  EXPECT_EQ(Bytes(s), "abcde");
 }
 
 TEST(StringConvert, Utf8StringsAppendAndCompare) {
   Utf8String s(L"A");
   s.append(L"\xE9").append(String(L"b"));
   s += L"c";
-  EXPECT_EQ(
-      "A\xC3\xA9"
-      "bc",
-      Bytes(s));
+  EXPECT_EQ(Bytes(s),
+            "A\xC3\xA9"
+            "bc");
   EXPECT_TRUE(s ==
               L"a\xE9"
               L"BC");

@@ -16,7 +16,7 @@ std::wstring Std(const String& s) { return std::wstring(s.begin(), s.end()); }
 TEST(StringEdit, EraseAtTheEndRemovesNothing) {
   String s(L"abc");
   s.erase(s.length(), 5);
-  EXPECT_EQ(L"abc", Std(s));
+  EXPECT_EQ(Std(s), L"abc");
 }
 
 TEST(StringEdit, EraseBeyondTheEndRaises) {
@@ -25,64 +25,64 @@ TEST(StringEdit, EraseBeyondTheEndRaises) {
     s.erase(s.length() + 1, 5);
     FAIL();
   } catch (const exception::OutOfRange2& e) {
-    EXPECT_STREQ("Out of range: String offset out of range", e.what());
-    EXPECT_EQ(0x8ABC7007u, e.getErrorCode());
+    EXPECT_STREQ(e.what(), "Out of range: String offset out of range");
+    EXPECT_EQ(e.getErrorCode(), 0x8ABC7007u);
   }
-  EXPECT_EQ(L"abc", Std(s));
+  EXPECT_EQ(Std(s), L"abc");
 }
 
 TEST(StringEdit, EraseCutsItsCount) {
   String s(L"abcdef");
   EXPECT_EQ(&s, &s.erase(2, 2));
-  EXPECT_EQ(L"abef", Std(s));
+  EXPECT_EQ(Std(s), L"abef");
   s.erase(2, 0xFFFFFFFF);
-  EXPECT_EQ(L"ab", Std(s));
+  EXPECT_EQ(Std(s), L"ab");
   s.erase(0, 0);
-  EXPECT_EQ(L"ab", Std(s));
+  EXPECT_EQ(Std(s), L"ab");
   s.erase();
   EXPECT_TRUE(s.empty());
-  EXPECT_EQ(L'\0', *s.c_str());
+  EXPECT_EQ(*s.c_str(), L'\0');
 }
 
 TEST(StringEdit, EraseGivesABlockBackThatIsUsedToLessThanHalf) {
   String s(10, L'x');
   s.erase(5, 5);
-  EXPECT_EQ(10u, s.capacity()) << "half is enough to stay";
+  EXPECT_EQ(s.capacity(), 10u) << "half is enough to stay";
   s.erase(4, 1);
-  EXPECT_EQ(4u, s.capacity());
+  EXPECT_EQ(s.capacity(), 4u);
   String kept(10, L'x');
   kept.erase(1, 9, BufferStrategy::Keep);
-  EXPECT_EQ(10u, kept.capacity());
-  EXPECT_EQ(1u, kept.length());
+  EXPECT_EQ(kept.capacity(), 10u);
+  EXPECT_EQ(kept.length(), 1u);
 }
 
 TEST(StringEdit, EraseByPointersReturnsTheErasedPlaceInTheMovedBlock) {
   String s(L"abcdefghij");
   const wchar_t* const at = s.erase(s.begin() + 1, s.begin() + 8);
-  EXPECT_EQ(L"aij", Std(s));
-  EXPECT_EQ(3u, s.capacity());
+  EXPECT_EQ(Std(s), L"aij");
+  EXPECT_EQ(s.capacity(), 3u);
   EXPECT_EQ(s.begin() + 1, at);
   wchar_t* const end = s.erase(s.begin() + 1, s.end(), BufferStrategy::Keep);
   EXPECT_EQ(s.end(), end);
-  EXPECT_EQ(3u, s.capacity());
+  EXPECT_EQ(s.capacity(), 3u);
 }
 
 TEST(StringEdit, ResizeFillsAndCuts) {
   String s(L"ab");
   s.resize(5, L'x');
-  EXPECT_EQ(L"abxxx", Std(s));
-  EXPECT_EQ(10u, s.capacity());
+  EXPECT_EQ(Std(s), L"abxxx");
+  EXPECT_EQ(s.capacity(), 10u);
   s.resize(5, L'y');
-  EXPECT_EQ(L"abxxx", Std(s));
+  EXPECT_EQ(Std(s), L"abxxx");
   s.resize(2, L'y', BufferStrategy::Keep);
-  EXPECT_EQ(L"ab", Std(s));
-  EXPECT_EQ(10u, s.capacity());
+  EXPECT_EQ(Std(s), L"ab");
+  EXPECT_EQ(s.capacity(), 10u);
   s.resize(1);
-  EXPECT_EQ(1u, s.capacity());
+  EXPECT_EQ(s.capacity(), 1u);
   s.resize(2);
-  EXPECT_EQ(std::wstring(L"a\0", 2), Std(s));
+  EXPECT_EQ(Std(s), std::wstring(L"a\0", 2));
   s.resize(0);
-  EXPECT_EQ(0u, s.capacity());
+  EXPECT_EQ(s.capacity(), 0u);
 }
 
 TEST(StringEdit, ReplaceGrowsAndShrinksTheHole) {
@@ -97,71 +97,71 @@ TEST(StringEdit, ReplaceGrowsAndShrinksTheHole) {
     String s(L"abcdef");
     s.replace(row.pos, row.n, row.with);
     EXPECT_EQ(row.result, Std(s));
-    EXPECT_EQ(L'\0', *s.end());
+    EXPECT_EQ(*s.end(), L'\0');
   }
 }
 
 TEST(StringEdit, ReplaceAppliesTheBufferRule) {
   String s(L"abcdef");
   s.replace(0, 1, L"0123");
-  EXPECT_EQ(9u, s.capacity()) << "growth is exact";
+  EXPECT_EQ(s.capacity(), 9u) << "growth is exact";
   s.replace(0, 6, L"");
-  EXPECT_EQ(L"def", Std(s));
-  EXPECT_EQ(3u, s.capacity());
+  EXPECT_EQ(Std(s), L"def");
+  EXPECT_EQ(s.capacity(), 3u);
   String roomy(L"ab");
   roomy.reserve(100);
   roomy.replace(0, 1, L"xyz");
-  EXPECT_EQ(L"xyzb", Std(roomy));
-  EXPECT_EQ(4u, roomy.capacity()) << "growth can shrink the block";
+  EXPECT_EQ(Std(roomy), L"xyzb");
+  EXPECT_EQ(roomy.capacity(), 4u) << "growth can shrink the block";
 }
 
 TEST(StringEdit, ReplaceTakesAPartOfTheOther) {
   String s(L"abcdef");
   s.replace(1, 2, String(L"0123456"), 2, 3);
-  EXPECT_EQ(L"a234def", Std(s));
+  EXPECT_EQ(Std(s), L"a234def");
   s.replace(0, 1, String(L"xyz"), 1, 99);
-  EXPECT_EQ(L"yz234def", Std(s));
+  EXPECT_EQ(Std(s), L"yz234def");
   s.replace(0, 2, String(L"xyz"), 3, 1);
-  EXPECT_EQ(L"234def", Std(s));
+  EXPECT_EQ(Std(s), L"234def");
 }
 
 TEST(StringEdit, ReplaceFromItself) {
   String s(L"abc");
   s.replace(1, 1, s);
-  EXPECT_EQ(L"aabcc", Std(s));
+  EXPECT_EQ(Std(s), L"aabcc");
   s.replace(0, 3, s, 3, 2);
-  EXPECT_EQ(L"cccc", Std(s)) << "the old text counts";
+  EXPECT_EQ(Std(s), L"cccc") << "the old text counts";
 }
 
 TEST(StringEdit, ReplaceChecksBothPositions) {
   String s(L"abc");
   EXPECT_THROW(s.replace(4, 0, L"x"), exception::OutOfRange2);
   EXPECT_THROW(s.replace(0, 1, String(L"x"), 2, 0), exception::OutOfRange2);
-  EXPECT_EQ(L"abc", Std(s));
+  EXPECT_EQ(Std(s), L"abc");
 }
 
 TEST(StringEdit, CopyWritesNoTerminator) {
   const String s(L"abcdef");
   wchar_t buffer[] = L"########";
-  EXPECT_EQ(3u, s.copy(buffer, 3, 2));
-  EXPECT_STREQ(L"cde#####", buffer);
-  EXPECT_EQ(2u, s.copy(buffer, 99, 4));
-  EXPECT_STREQ(L"efe#####", buffer);
-  EXPECT_EQ(0u, s.copy(buffer, 99, 6));
-  EXPECT_EQ(6u, s.copy(buffer, 8));
+  EXPECT_EQ(s.copy(buffer, 3, 2), 3u);
+  EXPECT_STREQ(buffer, L"cde#####");
+  EXPECT_EQ(s.copy(buffer, 99, 4), 2u);
+  EXPECT_STREQ(buffer, L"efe#####");
+  EXPECT_EQ(s.copy(buffer, 99, 6), 0u);
+  EXPECT_EQ(s.copy(buffer, 8), 6u);
   EXPECT_THROW(s.copy(buffer, 1, 7), exception::OutOfRange2);
 }
 
 TEST(StringEdit, SubstrTakesTheRestAndChecksOnlyItsSum) {
   const String s(L"abcdef");
-  EXPECT_EQ(L"bc", Std(s.substr(1, 2)));
-  EXPECT_EQ(L"bcdef", Std(s.substr(1)));
-  EXPECT_EQ(L"bcdef", Std(s.substr(1, String::npos)));
-  EXPECT_EQ(L"ef", Std(s.substr(4, 99)));
-  EXPECT_EQ(L"abcdef", Std(s.substr()));
-  EXPECT_EQ(L"", Std(s.substr(6, 1)));
-  EXPECT_EQ(L"", Std(s.substr(7, 1)));
-  EXPECT_EQ(L"", Std(s.substr(99)));
+  EXPECT_EQ(Std(s.substr(1, 2)), L"bc");
+  EXPECT_EQ(Std(s.substr(1)), L"bcdef");
+  EXPECT_EQ(Std(s.substr(1, String::npos)), L"bcdef");
+  EXPECT_EQ(Std(s.substr(4, 99)), L"ef");
+  EXPECT_EQ(Std(s.substr()), L"abcdef");
+  EXPECT_EQ(Std(s.substr(6, 1)), L"");
+  EXPECT_EQ(Std(s.substr(7, 1)), L"");
+  EXPECT_EQ(Std(s.substr(99)), L"");
   EXPECT_THROW(s.substr(2, 0xFFFFFFFE), exception::OutOfRange);
-  EXPECT_EQ(2u, s.substr(1, 2).capacity());
+  EXPECT_EQ(s.substr(1, 2).capacity(), 2u);
 }

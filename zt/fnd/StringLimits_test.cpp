@@ -44,9 +44,9 @@ TEST(StringLimits, ReplaceRefusesAResultOfAllOnes) {
     (*s).replace(0, 0, AnsiString("x"));
     FAIL();
   } catch (const exception::BoundExceeded2& e) {
-    EXPECT_STREQ("A request was made that would exceed the bounds: Resulting string too large",
-                 e.what());
-    EXPECT_EQ(0x8ABC7007u, e.getErrorCode());
+    EXPECT_STREQ(e.what(),
+                 "A request was made that would exceed the bounds: Resulting string too large");
+    EXPECT_EQ(e.getErrorCode(), 0x8ABC7007u);
   }
   Pretended<AnsiString> half(0x80000000), other(0x7FFFFFFF);
   EXPECT_THROW((*half).replace(5, 0, *other), exception::BoundExceeded2);
@@ -76,11 +76,11 @@ TEST(StringLimits, ConversionsOfTooMuchTextAreOutOfRange) {
 
 TEST(StringLimits, WireSizesThatDoNotFitAreAllOnes) {
   if (!kWideEnough) GTEST_SKIP() << "such lengths do not fit the address space";
-  EXPECT_EQ(0xFFFFFFFFu, (*Pretended<AnsiString>(0xFFFFFFFA)).serializationSize()) << "exactly";
-  EXPECT_EQ(0xFFFFFFFFu, (*Pretended<AnsiString>(0xFFFFFFFB)).serializationSize());
-  EXPECT_EQ(0xFFFFFFFEu, (*Pretended<AnsiString>(0xFFFFFFF9)).serializationSize());
-  EXPECT_EQ(0xFFFFFFFFu, (*Pretended<Utf8String>(0xFFFFFFFC)).serializationSize());
-  EXPECT_EQ(0xFFFFFFFEu, (*Pretended<Utf8String>(0xFFFFFFFA)).serializationSize());
+  EXPECT_EQ((*Pretended<AnsiString>(0xFFFFFFFA)).serializationSize(), 0xFFFFFFFFu) << "exactly";
+  EXPECT_EQ((*Pretended<AnsiString>(0xFFFFFFFB)).serializationSize(), 0xFFFFFFFFu);
+  EXPECT_EQ((*Pretended<AnsiString>(0xFFFFFFF9)).serializationSize(), 0xFFFFFFFEu);
+  EXPECT_EQ((*Pretended<Utf8String>(0xFFFFFFFC)).serializationSize(), 0xFFFFFFFFu);
+  EXPECT_EQ((*Pretended<Utf8String>(0xFFFFFFFA)).serializationSize(), 0xFFFFFFFEu);
   unsigned char byte;
   unsigned char* cursor = &byte;
   EXPECT_THROW((*Pretended<AsciiString>(0xFFFFFFFE)).serialize(cursor, &byte + 1),

@@ -18,88 +18,88 @@ TEST(StringSearch, NotFoundIsAllOnesOf32Bits) {
 
 TEST(StringSearch, FindsCharacters) {
   const String s(L"abcabc");
-  EXPECT_EQ(1u, s.find(L'b'));
-  EXPECT_EQ(4u, s.find(L'b', 2));
+  EXPECT_EQ(s.find(L'b'), 1u);
+  EXPECT_EQ(s.find(L'b', 2), 4u);
   EXPECT_EQ(npos, s.find(L'b', 5));
   EXPECT_EQ(npos, s.find(L'b', 6));
   EXPECT_EQ(npos, s.find(L'b', npos));
   EXPECT_EQ(npos, s.find(L'B')) << "searches see case";
   EXPECT_EQ(npos, s.find(0, 0));
-  EXPECT_EQ(2u, AnsiString("ab\xE9").find('\xE9'));
+  EXPECT_EQ(AnsiString("ab\xE9").find('\xE9'), 2u);
 }
 
 TEST(StringSearch, FindsTexts) {
   const String s(L"abcabcd");
-  EXPECT_EQ(0u, s.find(L"abc"));
-  EXPECT_EQ(3u, s.find(L"abc", 1));
-  EXPECT_EQ(3u, s.find(L"abcd"));
+  EXPECT_EQ(s.find(L"abc"), 0u);
+  EXPECT_EQ(s.find(L"abc", 1), 3u);
+  EXPECT_EQ(s.find(L"abcd"), 3u);
   EXPECT_EQ(npos, s.find(L"abcde"));
   EXPECT_EQ(npos, s.find(L"ABC"));
-  EXPECT_EQ(0u, s.find(s));
+  EXPECT_EQ(s.find(s), 0u);
   EXPECT_EQ(npos, s.find(L"abcabcde"));
   EXPECT_EQ(npos, s.find(L"d", 7));
-  EXPECT_EQ(5u, s.find(L"cd"));
+  EXPECT_EQ(s.find(L"cd"), 5u);
 }
 
 TEST(StringSearch, EmptyPatternIsFoundAtEveryValidPosition) {
   const String empty, s(L"abc");
-  EXPECT_EQ(0u, s.find(empty, 0));
-  EXPECT_EQ(2u, s.find(empty, 2));
+  EXPECT_EQ(s.find(empty, 0), 0u);
+  EXPECT_EQ(s.find(empty, 2), 2u);
   EXPECT_EQ(npos, s.find(empty, 3));
   EXPECT_EQ(npos, empty.find(empty, 0));
 }
 
 TEST(StringSearch, FindsCharactersBackward) {
   const String s(L"abcabc");
-  EXPECT_EQ(4u, s.rfind(L'b'));
-  EXPECT_EQ(4u, s.rfind(L'b', 4));
-  EXPECT_EQ(1u, s.rfind(L'b', 3));
+  EXPECT_EQ(s.rfind(L'b'), 4u);
+  EXPECT_EQ(s.rfind(L'b', 4), 4u);
+  EXPECT_EQ(s.rfind(L'b', 3), 1u);
   EXPECT_EQ(npos, s.rfind(L'b', 0));
-  EXPECT_EQ(0u, s.rfind(L'a', 0));
+  EXPECT_EQ(s.rfind(L'a', 0), 0u);
   EXPECT_EQ(npos, s.rfind(L'x'));
   EXPECT_EQ(npos, String().rfind(L'a'));
 }
 
 TEST(StringSearch, FindsTextsBackward) {
   const String s(L"abcabc");
-  EXPECT_EQ(3u, s.rfind(L"abc"));
-  EXPECT_EQ(0u, s.rfind(L"abc", 2));
-  EXPECT_EQ(3u, s.rfind(L"abc", 3));
+  EXPECT_EQ(s.rfind(L"abc"), 3u);
+  EXPECT_EQ(s.rfind(L"abc", 2), 0u);
+  EXPECT_EQ(s.rfind(L"abc", 3), 3u);
   EXPECT_EQ(npos, s.rfind(L"abcabcd")) << "longer than the string";
   EXPECT_EQ(npos, String().rfind(L"a"));
   EXPECT_EQ(npos, s.rfind(L"cb"));
-  EXPECT_EQ(6u, s.rfind(String())) << "an empty pattern is at the start of the search";
-  EXPECT_EQ(2u, s.rfind(String(), 2));
-  EXPECT_EQ(0u, String().rfind(String()));
+  EXPECT_EQ(s.rfind(String()), 6u) << "an empty pattern is at the start of the search";
+  EXPECT_EQ(s.rfind(String(), 2), 2u);
+  EXPECT_EQ(String().rfind(String()), 0u);
 }
 
 TEST(StringSearch, FirstOfAndFirstNotOf) {
   const String s(L"aabbcc"), empty;
-  EXPECT_EQ(2u, s.find_first_of(L"cb"));
-  EXPECT_EQ(4u, s.find_first_of(L"c", 3));
+  EXPECT_EQ(s.find_first_of(L"cb"), 2u);
+  EXPECT_EQ(s.find_first_of(L"c", 3), 4u);
   EXPECT_EQ(npos, s.find_first_of(L"xyz"));
   EXPECT_EQ(npos, s.find_first_of(empty));
   EXPECT_EQ(npos, s.find_first_of(L"a", 6));
-  EXPECT_EQ(2u, s.find_first_not_of(L"a"));
+  EXPECT_EQ(s.find_first_not_of(L"a"), 2u);
   EXPECT_EQ(npos, s.find_first_not_of(L"abc"));
-  EXPECT_EQ(3u, s.find_first_not_of(empty, 3));
+  EXPECT_EQ(s.find_first_not_of(empty, 3), 3u);
   EXPECT_EQ(npos, s.find_first_not_of(empty, 6));
   EXPECT_EQ(npos, empty.find_first_not_of(L"a"));
 }
 
 TEST(StringSearch, LastOfAndLastNotOf) {
   const String s(L"aabbcc"), empty;
-  EXPECT_EQ(3u, s.find_last_of(L"ab"));
-  EXPECT_EQ(1u, s.find_last_of(L"ab", 1));
-  EXPECT_EQ(3u, s.find_last_of(L'b'));
-  EXPECT_EQ(2u, s.find_last_of(L'b', 2));
+  EXPECT_EQ(s.find_last_of(L"ab"), 3u);
+  EXPECT_EQ(s.find_last_of(L"ab", 1), 1u);
+  EXPECT_EQ(s.find_last_of(L'b'), 3u);
+  EXPECT_EQ(s.find_last_of(L'b', 2), 2u);
   EXPECT_EQ(npos, s.find_last_of(L'x'));
   EXPECT_EQ(npos, s.find_last_of(empty));
-  EXPECT_EQ(3u, s.find_last_not_of(L'c'));
-  EXPECT_EQ(1u, s.find_last_not_of(L"bc"));
+  EXPECT_EQ(s.find_last_not_of(L'c'), 3u);
+  EXPECT_EQ(s.find_last_not_of(L"bc"), 1u);
   EXPECT_EQ(npos, s.find_last_not_of(L"abc"));
-  EXPECT_EQ(5u, s.find_last_not_of(empty));
-  EXPECT_EQ(0u, s.find_last_not_of(L'x', 0));
+  EXPECT_EQ(s.find_last_not_of(empty), 5u);
+  EXPECT_EQ(s.find_last_not_of(L'x', 0), 0u);
   EXPECT_EQ(npos, empty.find_last_of(L'a'));
   EXPECT_EQ(npos, empty.find_last_not_of(L"a"));
 }

@@ -30,7 +30,7 @@ void Read(S& s, const Bytes& bytes) {
     s.deserialize(cursor, bytes.data() + bytes.size());
   } catch (...) {
     EXPECT_EQ(bytes.data(), cursor);
-    EXPECT_EQ(0, s.exactCompare(before));
+    EXPECT_EQ(s.exactCompare(before), 0);
     throw;
   }
 }
@@ -40,8 +40,8 @@ void Read(S& s, const Bytes& bytes) {
 TEST(StringWire, StringIsUtf8WithoutTerminator) {
   const String s(L"a\xE9");
   EXPECT_EQ((Bytes{3, 0, 0, 0, 'a', 0xC3, 0xA9}), Wire(s));
-  EXPECT_EQ(6u, String(L"\xE9").serializationSize());
-  EXPECT_EQ(4u, String().serializationSize());
+  EXPECT_EQ(String(L"\xE9").serializationSize(), 6u);
+  EXPECT_EQ(String().serializationSize(), 4u);
   EXPECT_EQ((Bytes{0, 0, 0, 0}), Wire(String()));
 }
 
@@ -49,7 +49,7 @@ TEST(StringWire, Utf8StringIsItsBytes) {
   EXPECT_EQ((Bytes{2, 0, 0, 0, 0xC3, 0xA9}), Wire(Utf8String(L"\xE9")));
   Utf8String s;
   Read(s, Bytes{2, 0, 0, 0, 0xC3, 0xA9});
-  EXPECT_EQ(2u, s.length());
+  EXPECT_EQ(s.length(), 2u);
   Read(s, Bytes{0, 0, 0, 0});
   EXPECT_TRUE(s.empty());
 }
@@ -57,10 +57,10 @@ TEST(StringWire, Utf8StringIsItsBytes) {
 TEST(StringWire, NarrowFormsCountTheirTerminator) {
   EXPECT_EQ((Bytes{3, 0, 0, 0, 'a', 'b', 0}), Wire(AnsiString("ab")));
   EXPECT_EQ((Bytes{1, 0, 0, 0, 0}), Wire(AsciiString()));
-  EXPECT_EQ(7u, AnsiString("ab").serializationSize());
+  EXPECT_EQ(AnsiString("ab").serializationSize(), 7u);
   AnsiString s("old");
   Read(s, Bytes{3, 0, 0, 0, 'a', 'b', 0});
-  EXPECT_EQ(0, s.exactCompare("ab"));
+  EXPECT_EQ(s.exactCompare("ab"), 0);
   Read(s, Bytes{1, 0, 0, 0, 0});
   EXPECT_TRUE(s.empty());
 }
@@ -80,20 +80,20 @@ TEST(StringWire, CursorMovesBehindTheForm) {
   s.deserialize(cursor, bytes.data() + bytes.size());
   EXPECT_TRUE(s == L"a");
   s.deserialize(cursor, bytes.data() + bytes.size());
-  EXPECT_EQ(0, s.exactCompare(L"bc"));
-  EXPECT_EQ('x', *cursor);
+  EXPECT_EQ(s.exactCompare(L"bc"), 0);
+  EXPECT_EQ(*cursor, 'x');
 }
 
 TEST(StringWire, ReadingAppliesTheBufferRule) {
   String s(L"x");
   s.reserve(30);
   Read(s, Bytes{2, 0, 0, 0, 'a', 'b'});
-  EXPECT_EQ(2u, s.capacity());
+  EXPECT_EQ(s.capacity(), 2u);
   s.reserve(4);
   Read(s, Bytes{2, 0, 0, 0, 'c', 'd'});
-  EXPECT_EQ(4u, s.capacity());
+  EXPECT_EQ(s.capacity(), 4u);
   Read(s, Bytes{0, 0, 0, 0});
-  EXPECT_EQ(0u, s.capacity());
+  EXPECT_EQ(s.capacity(), 0u);
 }
 
 TEST(StringWire, UnterminatedNarrowFormRaises) {

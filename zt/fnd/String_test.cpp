@@ -41,12 +41,12 @@ std::wstring Std(const String& s) { return std::wstring(s.begin(), s.end()); }
 
 TEST(String, DefaultIsEmptyButOwnsATerminator) {
   const String s;
-  EXPECT_EQ(0u, s.length());
-  EXPECT_EQ(0u, s.size());
-  EXPECT_EQ(0u, s.capacity());
+  EXPECT_EQ(s.length(), 0u);
+  EXPECT_EQ(s.size(), 0u);
+  EXPECT_EQ(s.capacity(), 0u);
   EXPECT_TRUE(s.empty());
-  ASSERT_NE(nullptr, s.c_str());
-  EXPECT_EQ(L'\0', *s.c_str());
+  ASSERT_NE(s.c_str(), nullptr);
+  EXPECT_EQ(*s.c_str(), L'\0');
   EXPECT_EQ(s.begin(), s.c_str());
   EXPECT_EQ(s.begin(), s.end());
   s.checkInvariants();
@@ -82,17 +82,17 @@ TEST(String, NullPointersCountAsEmpty) {
 
 TEST(String, EmbeddedZerosAreKeptByLength) {
   const String s(L"a\0b", 3u);
-  EXPECT_EQ(3u, s.length());
+  EXPECT_EQ(s.length(), 3u);
   EXPECT_TRUE(s.hasEmbeddedNull());
   EXPECT_FALSE(String(L"ab").hasEmbeddedNull());
   EXPECT_FALSE(String().hasEmbeddedNull());
   String copy(s);
   copy += s;
-  EXPECT_EQ(std::wstring(L"a\0ba\0b", 6), Std(copy));
-  EXPECT_EQ(1u, s.find(L'\0'));
+  EXPECT_EQ(Std(copy), std::wstring(L"a\0ba\0b", 6));
+  EXPECT_EQ(s.find(L'\0'), 1u);
   String assigned;
   assigned.assign(s.c_str(), s.length());
-  EXPECT_EQ(3u, assigned.length());
+  EXPECT_EQ(assigned.length(), 3u);
   EXPECT_TRUE(s == L"a") << "comparison stops at the first zero";
 }
 
@@ -200,13 +200,13 @@ TEST(String, AssignmentReplacesTheText) {
 
 TEST(String, GrowthDoublesTheNewLength) {
   String s(L"abcd");
-  ASSERT_EQ(4u, s.capacity());
+  ASSERT_EQ(s.capacity(), 4u);
   s += L'e';
   EXPECT_TRUE(Is(s, L"abcde", 10));
   for (int i = 0; i < 5; ++i) s.append(1, L'x');
-  EXPECT_EQ(10u, s.capacity());
+  EXPECT_EQ(s.capacity(), 10u);
   s += L"x";
-  EXPECT_EQ(22u, s.capacity());
+  EXPECT_EQ(s.capacity(), 22u);
 }
 
 TEST(String, OneCharacterAtATimeFollowsTheDoubling) {
@@ -222,23 +222,23 @@ TEST(String, OneCharacterAtATimeFollowsTheDoubling) {
 TEST(String, AppendForms) {
   String s;
   s.append(L"ab").append(L"cdef", 1u).append(2, L'x').append(String(L"yz"));
-  EXPECT_EQ(L"abcxxyz", Std(s));
+  EXPECT_EQ(Std(s), L"abcxxyz");
   s.append(L'x', 3);
   EXPECT_EQ(std::wstring(L"abcxxyz") + std::wstring(120, wchar_t(3)), Std(s));
   s.append(0, L'x').append(L"", 0u).append(String());
-  EXPECT_EQ(127u, s.length());
+  EXPECT_EQ(s.length(), 127u);
 }
 
 TEST(String, AppendOfAPartIgnoresThePositionInItsCount) {
   const String part(L"abcdef");
   String s;
   s.append(part, 0, 4);
-  EXPECT_EQ(L"abcd", Std(s));
+  EXPECT_EQ(Std(s), L"abcd");
   s.append(part, 2, 3);
-  EXPECT_EQ(L"abcdcde", Std(s));
+  EXPECT_EQ(Std(s), L"abcdcde");
   s = L"";
   s.append(part, 4, 99);
-  EXPECT_EQ(std::wstring(L"ef\0\0\0\0", 6), Std(s)) << "zeros beyond the end";
+  EXPECT_EQ(Std(s), std::wstring(L"ef\0\0\0\0", 6)) << "zeros beyond the end";
   s = L"";
   s.append(part, 1000, 2);
   EXPECT_EQ(std::wstring(2, L'\0'), Std(s));
@@ -256,33 +256,33 @@ TEST(String, AppendOfItselfDoublesTheTextAlsoWhenTheBlockMoves) {
   }
   String t(L"abcd");
   t.append(t.c_str() + 2);
-  EXPECT_EQ(L"abcdcd", Std(t));
+  EXPECT_EQ(Std(t), L"abcdcd");
   String u(L"abcd");
   u.append(u, 1, 3);
-  EXPECT_EQ(L"abcdbcd", Std(u));
+  EXPECT_EQ(Std(u), L"abcdbcd");
   String v(L"abcd");
   v.append(v, 2, 99);
-  EXPECT_EQ(std::wstring(L"abcdcd\0\0", 8), Std(v));
+  EXPECT_EQ(Std(v), std::wstring(L"abcdcd\0\0", 8));
 }
 
 TEST(String, PlusOperators) {
   const String s(L"ab");
-  EXPECT_EQ(L"abc", Std(s + L'c'));
-  EXPECT_EQ(L"abcd", Std(s + L"cd"));
-  EXPECT_EQ(L"abab", Std(s + s));
-  EXPECT_EQ(L"abcd", Std(s + "cd"));
-  EXPECT_EQ(L"abcd", Std(s + AnsiString("cd")));
-  EXPECT_EQ(L"cdab", Std(L"cd" + s));
-  EXPECT_EQ(L"cdab", Std("cd" + s));
-  EXPECT_EQ(0, (AnsiString("ab") + s + L"c" + 'd' + "e").exactCompare("ababcde"));
+  EXPECT_EQ(Std(s + L'c'), L"abc");
+  EXPECT_EQ(Std(s + L"cd"), L"abcd");
+  EXPECT_EQ(Std(s + s), L"abab");
+  EXPECT_EQ(Std(s + "cd"), L"abcd");
+  EXPECT_EQ(Std(s + AnsiString("cd")), L"abcd");
+  EXPECT_EQ(Std(L"cd" + s), L"cdab");
+  EXPECT_EQ(Std("cd" + s), L"cdab");
+  EXPECT_EQ((AnsiString("ab") + s + L"c" + 'd' + "e").exactCompare("ababcde"), 0);
   String t(s);
   t += L'c';
   t += L"d";
   t += s;
   t += "e";
   t += AnsiString("f");
-  EXPECT_EQ(L"abcdabef", Std(t));
-  EXPECT_EQ(4u, (s + s).capacity()) << "one allocation";
+  EXPECT_EQ(Std(t), L"abcdabef");
+  EXPECT_EQ((s + s).capacity(), 4u) << "one allocation";
 }
 
 TEST(String, ReserveIsExactAndNeverShrinks) {
@@ -297,12 +297,12 @@ TEST(String, ReserveIsExactAndNeverShrinks) {
 
 TEST(String, ComparisonFoldsCaseAndExactCompareDoesNot) {
   const String s(L"ABC");
-  EXPECT_EQ(0, s.compare(L"abc"));
-  EXPECT_EQ(0, s.compare(String(L"aBc")));
+  EXPECT_EQ(s.compare(L"abc"), 0);
+  EXPECT_EQ(s.compare(String(L"aBc")), 0);
   EXPECT_TRUE(s == L"abc");
-  EXPECT_NE(0, s.exactCompare(L"abc"));
-  EXPECT_NE(0, s.exactCompare(String(L"abc")));
-  EXPECT_EQ(0, s.exactCompare(L"ABC"));
+  EXPECT_NE(s.exactCompare(L"abc"), 0);
+  EXPECT_NE(s.exactCompare(String(L"abc")), 0);
+  EXPECT_EQ(s.exactCompare(L"ABC"), 0);
   EXPECT_LT(String(L"abc").compare(L"ABD"), 0);
   EXPECT_GT(String(L"abcd").compare(L"ABC"), 0);
   EXPECT_LT(String().compare(L"a"), 0);
@@ -327,11 +327,11 @@ TEST(String, ComparisonOperatorsTakeEveryPairing) {
 
 TEST(String, CompareOfPartsFoldsCase) {
   const String s(L"xxABCyy");
-  EXPECT_EQ(0, s.compare(2, 3, L"abc", String::npos));
-  EXPECT_EQ(0, s.compare(2, 3, L"abcdef", 3));
+  EXPECT_EQ(s.compare(2, 3, L"abc", String::npos), 0);
+  EXPECT_EQ(s.compare(2, 3, L"abcdef", 3), 0);
   EXPECT_LT(s.compare(2, 3, L"abd"), 0);
-  EXPECT_EQ(0, s.compare(2, String::npos, L"abcYY"));
-  EXPECT_EQ(0, s.compare(99, 3, L"")) << "the position is not checked";
+  EXPECT_EQ(s.compare(2, String::npos, L"abcYY"), 0);
+  EXPECT_EQ(s.compare(99, 3, L""), 0) << "the position is not checked";
 }
 
 TEST(String, MapsFoldTheirKeys) {
@@ -339,8 +339,8 @@ TEST(String, MapsFoldTheirKeys) {
   map[L"Name"] = 1;
   map["NAME"] = 2;
   map[AnsiString("other")] = 3;
-  EXPECT_EQ(2u, map.size());
-  EXPECT_EQ(2, map[L"name"]);
+  EXPECT_EQ(map.size(), 2u);
+  EXPECT_EQ(map[L"name"], 2);
 }
 
 TEST(String, SwapExchangesTheBlocks) {
@@ -377,7 +377,7 @@ TEST(String, GrowChecksItsArithmetic) {
   }
   EXPECT_EQ(before, begin);
   string_detail::Grow(5u, begin, end, capacityEnd);
-  EXPECT_EQ(10, capacityEnd - begin);
+  EXPECT_EQ(capacityEnd - begin, 10);
   EXPECT_EQ(begin, end);
   DLLFree(begin);
 }
@@ -441,11 +441,11 @@ int OperationsWithoutMemory() {
 TEST(String, GrowthFallsBackToTheExactSizeWhenMemoryIsShort) {
   if (!vlt::test::kCanLimitMemory) GTEST_SKIP() << "the sanitizer owns the address space";
   vlt::test::Child child(AppendWithLittleMemory);
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(String, WithoutMemoryEveryOperationFailsAndChangesNothing) {
   if (!vlt::test::kCanLimitMemory) GTEST_SKIP() << "the sanitizer owns the address space";
   vlt::test::Child child(OperationsWithoutMemory);
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }

@@ -24,7 +24,7 @@ std::wstring Decode(const Bytes& bytes) {
   const uint32_t n = GetUtf8StringLength(exact.get(), end);
   std::vector<wchar_t> out(n + 1, L'#');
   EXPECT_EQ(n, Utf8ToWide(exact.get(), end, out.data(), out.data() + n));
-  EXPECT_EQ(L'#', out[n]) << "no terminator is written";
+  EXPECT_EQ(out[n], L'#') << "no terminator is written";
   return std::wstring(out.data(), n);
 }
 
@@ -40,7 +40,7 @@ void ExpectInvalid(const Bytes& bytes) {
   EXPECT_EQ(begin, cursor);
   wchar_t c = L'#';
   EXPECT_THROW(ConvertNextUtf8Character(begin, end, c), exception::InvalidSequence);
-  EXPECT_EQ(L'\0', c) << "set before the attempt";
+  EXPECT_EQ(c, L'\0') << "set before the attempt";
 }
 
 }  // namespace
@@ -120,24 +120,24 @@ TEST(Utf8ToWide, SequencesThatPassTheEndAreInvalid) {
 TEST(Utf8ToWide, FiveBytesOfTheEncoderDoNotDecode) {
   const wchar_t text[] = L"\x200000";
   unsigned char out[8];
-  ASSERT_EQ(5u, WideToUtf8(text, text + 1, out, out + 8));
+  ASSERT_EQ(WideToUtf8(text, text + 1, out, out + 8), 5u);
   ExpectInvalid(Bytes(out, out + 5));
 }
 
 TEST(Utf8ToWide, EmptyAndNullRanges) {
   const unsigned char text[] = {'a', 0};
   wchar_t out[4];
-  EXPECT_EQ(0u, GetUtf8StringLength(nullptr, nullptr));
-  EXPECT_EQ(0u, GetUtf8StringLength(nullptr, text));
-  EXPECT_EQ(0u, GetUtf8StringLength(text, text));
-  EXPECT_EQ(0u, Utf8ToWide(nullptr, nullptr, out, out + 4));
-  EXPECT_EQ(0u, Utf8ToWide(text, text, out, out));
+  EXPECT_EQ(GetUtf8StringLength(nullptr, nullptr), 0u);
+  EXPECT_EQ(GetUtf8StringLength(nullptr, text), 0u);
+  EXPECT_EQ(GetUtf8StringLength(text, text), 0u);
+  EXPECT_EQ(Utf8ToWide(nullptr, nullptr, out, out + 4), 0u);
+  EXPECT_EQ(Utf8ToWide(text, text, out, out), 0u);
   wchar_t c = L'#';
-  EXPECT_EQ(nullptr, ConvertNextUtf8Character(nullptr, text, c));
-  EXPECT_EQ(L'\0', c);
+  EXPECT_EQ(ConvertNextUtf8Character(nullptr, text, c), nullptr);
+  EXPECT_EQ(c, L'\0');
   c = L'#';
   EXPECT_EQ(text, ConvertNextUtf8Character(text, text, c));
-  EXPECT_EQ(L'\0', c);
+  EXPECT_EQ(c, L'\0');
 }
 
 TEST(Utf8ToWide, BadDestinationsRaiseBeforeAnythingElse) {
@@ -153,21 +153,21 @@ TEST(Utf8ToWide, DestinationThatEndsFirstOverflows) {
   const unsigned char text[] = {'a', 0xC3, 0xA9, 'b'};
   wchar_t out[] = L"####";
   EXPECT_THROW(Utf8ToWide(text, text + 4, out, out + 2), exception::BufferOverflow);
-  EXPECT_STREQ(L"a\xE9##", out) << "what fits is there";
-  EXPECT_EQ(3u, Utf8ToWide(text, text + 4, out, out + 3));
+  EXPECT_STREQ(out, L"a\xE9##") << "what fits is there";
+  EXPECT_EQ(Utf8ToWide(text, text + 4, out, out + 3), 3u);
 }
 
 TEST(Utf8ToWide, NoOverflowDecodesWhatFits) {
   const unsigned char text[] = {'a', 0xC3, 0xA9, 'b'};
   const unsigned char* cursor = text;
   wchar_t out[] = L"####";
-  EXPECT_EQ(2u, Utf8ToWideNoOverflow(cursor, text + 4, out, out + 2));
+  EXPECT_EQ(Utf8ToWideNoOverflow(cursor, text + 4, out, out + 2), 2u);
   EXPECT_EQ(text + 3, cursor);
-  EXPECT_EQ(1u, Utf8ToWideNoOverflow(cursor, text + 4, out, out + 4));
+  EXPECT_EQ(Utf8ToWideNoOverflow(cursor, text + 4, out, out + 4), 1u);
   EXPECT_EQ(text + 4, cursor);
-  EXPECT_EQ(L'b', out[0]);
+  EXPECT_EQ(out[0], L'b');
   cursor = text;
-  EXPECT_EQ(0u, Utf8ToWideNoOverflow(cursor, text + 4, out, out));
+  EXPECT_EQ(Utf8ToWideNoOverflow(cursor, text + 4, out, out), 0u);
   EXPECT_EQ(text, cursor);
 }
 
@@ -175,13 +175,12 @@ TEST(Utf8ToWide, NewBlockIsTerminated) {
   const unsigned char text[] = {'a', 0xC3, 0xA9, 'b'};
   const std::unique_ptr<wchar_t[]> all(Utf8ToWide(text, 4)), part(Utf8ToWide(text, 1)),
       none(Utf8ToWide(nullptr, 9)), zero(Utf8ToWide(text, 0));
-  EXPECT_STREQ(
-      L"a\xE9"
-      L"b",
-      all.get());
-  EXPECT_STREQ(L"a", part.get());
-  EXPECT_STREQ(L"", none.get());
-  EXPECT_STREQ(L"", zero.get());
+  EXPECT_STREQ(all.get(),
+               L"a\xE9"
+               L"b");
+  EXPECT_STREQ(part.get(), L"a");
+  EXPECT_STREQ(none.get(), L"");
+  EXPECT_STREQ(zero.get(), L"");
 }
 
 TEST(Utf8ToWide, OneCharacterAtATime) {
@@ -190,12 +189,12 @@ TEST(Utf8ToWide, OneCharacterAtATime) {
   wchar_t c;
   const unsigned char* s = ConvertNextUtf8Character(text, end, c);
   EXPECT_EQ(text + 1, s);
-  EXPECT_EQ(L'a', c);
+  EXPECT_EQ(c, L'a');
   s = ConvertNextUtf8Character(s, end, c);
-  EXPECT_EQ(L'\0', c);
+  EXPECT_EQ(c, L'\0');
   s = ConvertNextUtf8Character(s, end, c);
   EXPECT_EQ(end, s);
-  EXPECT_EQ(0x20AC, c);
+  EXPECT_EQ(c, 0x20AC);
 }
 
 TEST(Utf8ToWide, EveryEncodableValueOutsideTheFiveByteFormComesBack) {

@@ -9,9 +9,9 @@ namespace {
 
 TEST(Vector, EmptyHasNoBlock) {
   Vector<int> v;
-  EXPECT_EQ(0u, v.size());
-  EXPECT_EQ(0u, v.capacity());
-  EXPECT_EQ(nullptr, v.begin());
+  EXPECT_EQ(v.size(), 0u);
+  EXPECT_EQ(v.capacity(), 0u);
+  EXPECT_EQ(v.begin(), nullptr);
   EXPECT_EQ(v.begin(), v.end());
 }
 
@@ -30,8 +30,8 @@ TEST(Vector, NextCapacityAtTheEdgesOfThirtyTwoBits) {
   EXPECT_EQ(1u, vector_detail::NextCapacity(0));
   EXPECT_EQ(0xFFFFFFFDu, vector_detail::NextCapacity(0x7FFFFFFEu));
   EXPECT_THROW(vector_detail::NextCapacity(0x7FFFFFFFu), exception::OutOfRange);
-  EXPECT_EQ(0x80000001u, vector_detail::NextCapacity(0x80000000u));
-  EXPECT_EQ(0xFFFFFFFEu, vector_detail::NextCapacity(0xFFFFFFFDu));
+  EXPECT_EQ(vector_detail::NextCapacity(0x80000000u), 0x80000001u);
+  EXPECT_EQ(vector_detail::NextCapacity(0xFFFFFFFDu), 0xFFFFFFFEu);
   EXPECT_THROW(vector_detail::NextCapacity(0xFFFFFFFEu), exception::OutOfRange);
   EXPECT_THROW(vector_detail::NextCapacity(0xFFFFFFFFu), exception::OutOfRange);
 }
@@ -49,10 +49,10 @@ TEST(Vector, CopyHasACapacityOfItsSizeAndItsOwnElements) {
   Vector<std::string> v;
   for (const char* s : {"a", "b", "c", "d"}) v.push_back(s);
   Vector<std::string> copy(v);
-  EXPECT_EQ(4u, copy.capacity());
+  EXPECT_EQ(copy.capacity(), 4u);
   copy[0] = "changed";
-  EXPECT_EQ("a", v[0]);
-  EXPECT_EQ(0u, Vector<std::string>(Vector<std::string>()).capacity());
+  EXPECT_EQ(v[0], "a");
+  EXPECT_EQ(Vector<std::string>(Vector<std::string>()).capacity(), 0u);
 }
 
 TEST(Vector, AssignmentReplacesAndToleratesItself) {
@@ -61,25 +61,25 @@ TEST(Vector, AssignmentReplacesAndToleratesItself) {
   w.push_back("x");
   w.push_back("y");
   v = w;
-  EXPECT_EQ(2u, v.size());
-  EXPECT_EQ("y", v[1]);
+  EXPECT_EQ(v.size(), 2u);
+  EXPECT_EQ(v[1], "y");
   Vector<std::string>& self = v;
   v = self;
-  EXPECT_EQ("x", v[0]);
+  EXPECT_EQ(v[0], "x");
 }
 
 TEST(Vector, SwapExchangesAllAndClearFrees) {
   Vector<int> v, w;
   v.push_back(1);
   v.swap(w);
-  EXPECT_EQ(0u, v.size());
-  ASSERT_EQ(1u, w.size());
-  EXPECT_EQ(1, w[0]);
+  EXPECT_EQ(v.size(), 0u);
+  ASSERT_EQ(w.size(), 1u);
+  EXPECT_EQ(w[0], 1);
   w.clear();
-  EXPECT_EQ(0u, w.capacity());
-  EXPECT_EQ(nullptr, w.begin());
+  EXPECT_EQ(w.capacity(), 0u);
+  EXPECT_EQ(w.begin(), nullptr);
   w.push_back(2);
-  EXPECT_EQ(1u, w.capacity());
+  EXPECT_EQ(w.capacity(), 1u);
 }
 
 TEST(Vector, PushBackOfAnOwnElementSurvivesTheMove) {
@@ -111,16 +111,16 @@ TEST(Vector, FailedPushBackLeavesTheOldBlock) {
     for (int failing = 0; failing < 4; ++failing) {
       Fragile::copiesLeft = failing;
       EXPECT_THROW(v.push_back(Fragile(9)), std::string) << failing;
-      EXPECT_EQ(3, Fragile::alive);
-      EXPECT_EQ(3u, v.size());
-      EXPECT_EQ(3u, v.capacity());
+      EXPECT_EQ(Fragile::alive, 3);
+      EXPECT_EQ(v.size(), 3u);
+      EXPECT_EQ(v.capacity(), 3u);
       EXPECT_EQ(block, v.begin());
     }
     Fragile::copiesLeft = 1;
     EXPECT_THROW(Vector<Fragile>{v}, std::string);
-    EXPECT_EQ(3, Fragile::alive);
+    EXPECT_EQ(Fragile::alive, 3);
   }
-  EXPECT_EQ(0, Fragile::alive);
+  EXPECT_EQ(Fragile::alive, 0);
 }
 
 }  // namespace

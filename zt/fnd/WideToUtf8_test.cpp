@@ -17,7 +17,7 @@ std::string Encode(const std::wstring& text) {
   const uint32_t n = GetUtf8EncodingBytes(text.data(), end);
   std::vector<unsigned char> out(n + 1, '#');
   EXPECT_EQ(n, WideToUtf8(text.data(), end, out.data(), out.data() + n));
-  EXPECT_EQ('#', out[n]) << "no terminator is written";
+  EXPECT_EQ(out[n], '#') << "no terminator is written";
   return std::string(out.begin(), out.begin() + n);
 }
 
@@ -48,7 +48,7 @@ TEST(WideToUtf8, EncodesByTable) {
   for (const auto& row : table) {
     EXPECT_EQ(row.bytes, Encode(std::wstring(1, static_cast<wchar_t>(row.value)))) << row.value;
   }
-  EXPECT_EQ(std::string("a\0b", 3), Encode(std::wstring(L"a\0b", 3)));
+  EXPECT_EQ(Encode(std::wstring(L"a\0b", 3)), std::string("a\0b", 3));
 }
 
 TEST(WideToUtf8, CountsTerminatedAndRangedText) {
@@ -57,7 +57,7 @@ TEST(WideToUtf8, CountsTerminatedAndRangedText) {
   EXPECT_EQ(6u, GetUtf8EncodingBytes(L"a\xE9\x20AC"));
   EXPECT_EQ(0u, GetUtf8EncodingBytes(nullptr, nullptr));
   const wchar_t bad[] = {static_cast<wchar_t>(0x80000000), L'a'};
-  EXPECT_EQ(2u, GetUtf8EncodingBytes(bad, bad + 2));
+  EXPECT_EQ(GetUtf8EncodingBytes(bad, bad + 2), 2u);
 }
 
 TEST(WideToUtf8, CountingStopsBeforeTheLimit) {
@@ -66,8 +66,8 @@ TEST(WideToUtf8, CountingStopsBeforeTheLimit) {
   for (unsigned limit = 0; limit < 9; ++limit) {
     EXPECT_EQ(expected[limit], GetUtf8EncodingBytesWithBufferLimit(text, text + 4, limit)) << limit;
   }
-  EXPECT_EQ(0u, GetUtf8EncodingBytesWithBufferLimit(nullptr, nullptr, 9));
-  EXPECT_EQ(7u, GetUtf8EncodingBytesWithBufferLimit(text, text + 4, 0xFFFFFFFF));
+  EXPECT_EQ(GetUtf8EncodingBytesWithBufferLimit(nullptr, nullptr, 9), 0u);
+  EXPECT_EQ(GetUtf8EncodingBytesWithBufferLimit(text, text + 4, 0xFFFFFFFF), 7u);
 }
 
 TEST(WideToUtf8, BadDestinationsRaiseBeforeAnythingElse) {
@@ -76,7 +76,7 @@ TEST(WideToUtf8, BadDestinationsRaiseBeforeAnythingElse) {
   EXPECT_THROW(WideToUtf8(nullptr, nullptr, out + 1, out), exception::InvalidArgument);
   const wchar_t* none = nullptr;
   EXPECT_THROW(WideToUtf8NoOverflow(none, nullptr, nullptr, out), exception::InvalidArgument);
-  EXPECT_EQ(0u, WideToUtf8(nullptr, nullptr, out, out + 4));
+  EXPECT_EQ(WideToUtf8(nullptr, nullptr, out, out + 4), 0u);
 }
 
 TEST(WideToUtf8, CharacterThatDoesNotFitStopsTheRun) {
@@ -84,16 +84,16 @@ TEST(WideToUtf8, CharacterThatDoesNotFitStopsTheRun) {
   for (unsigned room = 1; room < 4; ++room) {
     unsigned char out[8] = "#######";
     const wchar_t* cursor = text;
-    EXPECT_EQ(1u, WideToUtf8NoOverflow(cursor, text + 3, out, out + room));
+    EXPECT_EQ(WideToUtf8NoOverflow(cursor, text + 3, out, out + room), 1u);
     EXPECT_EQ(text + 1, cursor);
-    EXPECT_STREQ("a######", reinterpret_cast<char*>(out)) << "never a part of a sequence";
+    EXPECT_STREQ(reinterpret_cast<char*>(out), "a######") << "never a part of a sequence";
     EXPECT_THROW(WideToUtf8(text, text + 3, out, out + room), exception::BufferOverflow);
   }
   unsigned char out[8];
   const wchar_t* cursor = text;
-  EXPECT_EQ(4u, WideToUtf8NoOverflow(cursor, text + 3, out, out + 4));
+  EXPECT_EQ(WideToUtf8NoOverflow(cursor, text + 3, out, out + 4), 4u);
   EXPECT_EQ(text + 2, cursor);
-  EXPECT_EQ(5u, WideToUtf8(text, text + 3, out, out + 5));
+  EXPECT_EQ(WideToUtf8(text, text + 3, out, out + 5), 5u);
 }
 
 TEST(WideToUtf8, NewBlockIsTerminated) {
@@ -103,8 +103,8 @@ TEST(WideToUtf8, NewBlockIsTerminated) {
   };
   const std::unique_ptr<unsigned char[]> all(WideToUtf8(text)), range(WideToUtf8(text, text + 1)),
       none(WideToUtf8(nullptr)), nullRange(WideToUtf8(nullptr, nullptr));
-  EXPECT_STREQ("a\xC3\xA9", chars(all));
-  EXPECT_STREQ("a", chars(range));
-  EXPECT_STREQ("", chars(none));
-  EXPECT_STREQ("", chars(nullRange));
+  EXPECT_STREQ(chars(all), "a\xC3\xA9");
+  EXPECT_STREQ(chars(range), "a");
+  EXPECT_STREQ(chars(none), "");
+  EXPECT_STREQ(chars(nullRange), "");
 }

@@ -11,25 +11,25 @@ namespace {
 
 TEST(AtomicInt, StepsReturnTheNewValue) {
   AtomicInt n(5);
-  EXPECT_EQ(5, n.getCount());
-  EXPECT_EQ(6, n.increment());
-  EXPECT_EQ(5, n.decrement());
-  EXPECT_EQ(5, n.getCount());
+  EXPECT_EQ(n.getCount(), 5);
+  EXPECT_EQ(n.increment(), 6);
+  EXPECT_EQ(n.decrement(), 5);
+  EXPECT_EQ(n.getCount(), 5);
 }
 
 TEST(AtomicInt, CompareExchangeReturnsTheOldValueEitherWay) {
   AtomicInt n(5);
-  EXPECT_EQ(5, n.compareExchange(4, 9));
-  EXPECT_EQ(5, n.getCount());
-  EXPECT_EQ(5, n.compareExchange(5, 9));
-  EXPECT_EQ(9, n.getCount());
+  EXPECT_EQ(n.compareExchange(4, 9), 5);
+  EXPECT_EQ(n.getCount(), 5);
+  EXPECT_EQ(n.compareExchange(5, 9), 5);
+  EXPECT_EQ(n.getCount(), 9);
 }
 
 TEST(AtomicInt, ReplaceStoresAndTheOtherReturnsTheOldValue) {
   AtomicInt n(1);
   n.replace(2);
-  EXPECT_EQ(2, n.replaceAndReturn(3));
-  EXPECT_EQ(3, n.getCount());
+  EXPECT_EQ(n.replaceAndReturn(3), 2);
+  EXPECT_EQ(n.getCount(), 3);
 }
 
 TEST(AtomicInt, Comparisons) {
@@ -46,8 +46,8 @@ TEST(AtomicInt, Comparisons) {
 
 TEST(AtomicInt, WrapsAtBothEnds) {
   AtomicInt n(INT_MAX);
-  EXPECT_EQ(INT_MIN, n.increment());
-  EXPECT_EQ(INT_MAX, n.decrement());
+  EXPECT_EQ(n.increment(), INT_MIN);
+  EXPECT_EQ(n.decrement(), INT_MAX);
 }
 
 TEST(AtomicInt, ThreadsLoseNoStep) {
@@ -60,7 +60,7 @@ TEST(AtomicInt, ThreadsLoseNoStep) {
     });
   }
   for (auto& thread : threads) thread.join();
-  EXPECT_EQ(12000, n.getCount());
+  EXPECT_EQ(n.getCount(), 12000);
 }
 
 }  // namespace

@@ -74,7 +74,7 @@ TEST(Bundle, WhatIsNoDirectoryIsNoBundle) {
   dir.makeDir("empty.framework");
   dir.makeDir(".bundle");
   dir.makeDir("pipe.bundle");
-  ASSERT_EQ(0, mkfifo((dir / "pipe.bundle/libpipe.so").c_str(), 0600));
+  ASSERT_EQ(mkfifo((dir / "pipe.bundle/libpipe.so").c_str(), 0600), 0);
   for (const std::string& no :
        {dir / "X.bundle", dir / "missing", dir / "empty.framework", dir / ".bundle", dir / "pipe",
         std::string("libm.so.6"), std::string("X"), std::string()}) {
@@ -86,19 +86,19 @@ TEST(Bundle, WhatIsNoDirectoryIsNoBundle) {
 
 TEST(Bundle, LookUpFailures) {
   Bundle closed{String()};
-  EXPECT_EQ(nullptr, closed.getFunctionPointer(L"cos", true));
+  EXPECT_EQ(closed.getFunctionPointer(L"cos", true), nullptr);
   EXPECT_THROW(closed.getFunctionPointer(L"cos", false), exception::InvalidOperation);
   TempDir dir;
   dir.makeDir("X.bundle");
   MakeModule(dir / "X.bundle/libX.so");
   Bundle bundle(Wide(dir / "X"));
-  EXPECT_EQ(nullptr, bundle.getFunctionPointer(L"no_such_function", true));
+  EXPECT_EQ(bundle.getFunctionPointer(L"no_such_function", true), nullptr);
   try {
     bundle.getFunctionPointer(L"no_such_function", false);
     FAIL();
   } catch (const PosixError& e) {
-    EXPECT_NE(nullptr, strstr(e.what(), "no_such_function"));
-    EXPECT_EQ(42u, e.getErrorCode());
+    EXPECT_NE(strstr(e.what(), "no_such_function"), nullptr);
+    EXPECT_EQ(e.getErrorCode(), 42u);
   }
 }
 

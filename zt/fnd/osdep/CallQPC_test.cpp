@@ -11,7 +11,7 @@ namespace {
 TEST(CallQPC, UnitIsTheTickLengthInNanoseconds) {
   CallQPC clock;
   const uint64_t ticks = 12345678901ull;  // 12.345678901 seconds
-  ASSERT_EQ(1000000000u, MonotonicTicksPerSecond());
+  ASSERT_EQ(MonotonicTicksPerSecond(), 1000000000u);
   const struct {
     unsigned int unit;
     uint64_t count;

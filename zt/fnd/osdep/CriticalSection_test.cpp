@@ -98,7 +98,7 @@ TEST(CriticalSection, GuardedCountIsExact) {
     });
   }
   for (auto& thread : threads) thread.join();
-  EXPECT_EQ(40000, count);
+  EXPECT_EQ(count, 40000);
 }
 
 TEST(CriticalSection, OwnedSectionMayBeDestroyed) {

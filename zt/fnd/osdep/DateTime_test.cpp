@@ -121,9 +121,9 @@ TEST(DateTimeText, SuffixFollowsATimeFormat) {
   const auto text = [](const wchar_t* clock, const wchar_t* suffix) {
     return Std(AbsTimeToString(At(kSeconds), L"%Y", clock, 0, kTimeUTC, false, suffix));
   };
-  EXPECT_EQ(L"2026 13 UTC", text(L"%H", L"UTC"));
-  EXPECT_EQ(L"2026 13", text(L"%H", L""));
-  EXPECT_EQ(L"2026", text(L"", L"UTC"));
+  EXPECT_EQ(text(L"%H", L"UTC"), L"2026 13 UTC");
+  EXPECT_EQ(text(L"%H", L""), L"2026 13");
+  EXPECT_EQ(text(L"", L"UTC"), L"2026");
 }
 
 TEST(DateTimeText, LocalTimeForTypesOneAndTwo) {
@@ -131,15 +131,15 @@ TEST(DateTimeText, LocalTimeForTypesOneAndTwo) {
   const auto text = [](TimeStringType type) {
     return Std(AbsTimeToString(At(kSeconds), L"", L"%H:%M", 0, type));
   };
-  EXPECT_EQ(L"13:34", text(kTimeUTC));
-  EXPECT_EQ(L"15:34", text(kTimeLocal));
-  EXPECT_EQ(L"15:34", text(kTimeLocal2));
+  EXPECT_EQ(text(kTimeUTC), L"13:34");
+  EXPECT_EQ(text(kTimeLocal), L"15:34");
+  EXPECT_EQ(text(kTimeLocal2), L"15:34");
 }
 
 TEST(DateTimeText, NullFormatsAreTheSystemsOwn) {
   const ScopedLocale locale(LC_TIME, "C");
-  EXPECT_EQ(L"%x", Std(GetSystemDateFormat()));
-  EXPECT_EQ(L"%X", Std(GetSystemTimeFormat()));
+  EXPECT_EQ(Std(GetSystemDateFormat()), L"%x");
+  EXPECT_EQ(Std(GetSystemTimeFormat()), L"%X");
   const std::wstring both = Text(At(kSeconds), nullptr, nullptr, 0);
   EXPECT_EQ(Text(At(kSeconds), L"%x", L"%X", 0), both);
   EXPECT_FALSE(both.empty());
@@ -149,8 +149,8 @@ TEST(DateTimeText, SystemFormatsTakeTheTimeLocaleFromTheEnvironment) {
   const ScopedLocale locale(LC_TIME, "C");
   setenv("LC_ALL", "C.UTF-8", 1);
   GetSystemDateFormat();
-  EXPECT_STREQ("C.UTF-8", setlocale(LC_TIME, nullptr));
-  EXPECT_STREQ("C", setlocale(LC_CTYPE, nullptr)) << "and nothing else";
+  EXPECT_STREQ(setlocale(LC_TIME, nullptr), "C.UTF-8");
+  EXPECT_STREQ(setlocale(LC_CTYPE, nullptr), "C") << "and nothing else";
   unsetenv("LC_ALL");
 }
 
@@ -158,15 +158,15 @@ TEST(DateTimeText, ExplicitFormatsLeaveTheLocaleAlone) {
   const ScopedLocale locale(LC_TIME, "C");
   setenv("LC_ALL", "C.UTF-8", 1);
   Text(At(kSeconds), L"%Y", L"%H", 3);
-  EXPECT_STREQ("C", setlocale(LC_TIME, nullptr));
+  EXPECT_STREQ(setlocale(LC_TIME, nullptr), "C");
   unsetenv("LC_ALL");
 }
 
 TEST(DateTimeText, TextBeyondTheBufferIsEmpty) {
   const std::wstring format(511, L'x'), longer(512, L'x'), longest(100000, L'x');
   EXPECT_EQ(format, Text(At(0), format.c_str(), L"", 0));
-  EXPECT_EQ(L"", Text(At(0), longer.c_str(), L"", 0));
-  EXPECT_EQ(L"", Text(At(0), longest.c_str(), longest.c_str(), 0));
+  EXPECT_EQ(Text(At(0), longer.c_str(), L"", 0), L"");
+  EXPECT_EQ(Text(At(0), longest.c_str(), longest.c_str(), 0), L"");
 }
 
 TEST(DateTimeText, YearsBeyondTheCalendarRaise) {
@@ -182,8 +182,8 @@ TEST(DateTimeFields, RoundOrTruncate) {
   EXPECT_EQ(70, fields.tm_year);
   EXPECT_EQ(4, fields.tm_wday);
   const tm old = AbsTimeToUTCDateTime(AbsTime(), false);
-  EXPECT_EQ(4, old.tm_year);
-  EXPECT_EQ(1, old.tm_mday);
+  EXPECT_EQ(old.tm_year, 4);
+  EXPECT_EQ(old.tm_mday, 1);
 }
 
 TEST(DateTimeFields, PassTheYear2038) {
@@ -193,7 +193,7 @@ TEST(DateTimeFields, PassTheYear2038) {
 
 TEST(DateTimeFields, LocalTimeFollowsTheZone) {
   const ScopedZone zone("XYZ5");
-  EXPECT_EQ(8, AbsTimeToLocalDateTime(At(kSeconds), false).tm_hour);
+  EXPECT_EQ(AbsTimeToLocalDateTime(At(kSeconds), false).tm_hour, 8);
 }
 
 TEST(DateTimeClock, TimevalKeepsItsMicroseconds) {
@@ -202,12 +202,12 @@ TEST(DateTimeClock, TimevalKeepsItsMicroseconds) {
   time.tv_usec = 500000;
   const AbsTime t = TimevalToAbsTime(time);
   EXPECT_EQ(2082844800LL + 1794663265, t.getSeconds());
-  EXPECT_EQ(0.5, t.getFraction());
+  EXPECT_EQ(t.getFraction(), 0.5);
   time.tv_usec = 1;
   EXPECT_NEAR(1e-6, TimevalToAbsTime(time).getFraction(), 1e-15);
   time.tv_sec = -1;
   time.tv_usec = 0;
-  EXPECT_EQ(2082844799, TimevalToAbsTime(time).getSeconds());
+  EXPECT_EQ(TimevalToAbsTime(time).getSeconds(), 2082844799);
 }
 
 TEST(DateTimeClock, CurrentTimeIsNow) {

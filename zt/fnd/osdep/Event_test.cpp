@@ -95,7 +95,7 @@ TEST(Event, ManualSetReleasesAllWaitersAutomaticOne) {
     EXPECT_TRUE(vlt::test::Eventually([&] { return released == first; }));
     if (!manual) {
       EXPECT_FALSE(event.check());
-      EXPECT_EQ(1, released);
+      EXPECT_EQ(released, 1);
       for (int i = 2; i <= 3; ++i) {
         event.set();
         EXPECT_TRUE(vlt::test::Eventually([&] { return released == i; }));

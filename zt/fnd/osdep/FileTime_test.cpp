@@ -19,13 +19,13 @@ using vlt::test::Wide;
 
 void SetTime(const std::string& path, time_t seconds, long nanoseconds) {
   timespec times[2] = {{seconds, nanoseconds}, {seconds, nanoseconds}};
-  ASSERT_EQ(0, utimensat(AT_FDCWD, path.c_str(), times, 0));
+  ASSERT_EQ(utimensat(AT_FDCWD, path.c_str(), times, 0), 0);
 }
 
 TEST(FileTime, UnixTimeCountsFrom1904) {
-  EXPECT_EQ(2082844800, Time_TtoAbsTime(0).getSeconds());
-  EXPECT_EQ(0, Time_TtoAbsTime(0).toTime_T(false));
-  EXPECT_EQ(-5, Time_TtoAbsTime(-5).toTime_T(false));
+  EXPECT_EQ(Time_TtoAbsTime(0).getSeconds(), 2082844800);
+  EXPECT_EQ(Time_TtoAbsTime(0).toTime_T(false), 0);
+  EXPECT_EQ(Time_TtoAbsTime(-5).toTime_T(false), -5);
 }
 
 TEST(FileTime, LastWriteIsInWholeSeconds) {
@@ -33,9 +33,9 @@ TEST(FileTime, LastWriteIsInWholeSeconds) {
   vlt::test::WriteBytes(dir / "f", "x");
   SetTime(dir / "f", 1000000000, 999999999);
   AbsTime time = GetFileLastWriteTime(Wide(dir / "f"));
-  EXPECT_EQ(1000000000, time.toTime_T(false));
-  EXPECT_EQ(1000000000, time.toTime_T(true));
-  EXPECT_EQ(0.0, time.getFraction());
+  EXPECT_EQ(time.toTime_T(false), 1000000000);
+  EXPECT_EQ(time.toTime_T(true), 1000000000);
+  EXPECT_EQ(time.getFraction(), 0.0);
   EXPECT_TRUE(time == Time_TtoAbsTime(1000000000));
 }
 
@@ -43,10 +43,10 @@ TEST(FileTime, LinksAreFollowedAndDirectoriesHaveATime) {
   TempDir dir;
   vlt::test::WriteBytes(dir / "f", "x");
   SetTime(dir / "f", 12345, 0);
-  ASSERT_EQ(0, symlink("f", (dir / "link").c_str()));
-  EXPECT_EQ(12345, GetFileLastWriteTime(Wide(dir / "link")).toTime_T(false));
+  ASSERT_EQ(symlink("f", (dir / "link").c_str()), 0);
+  EXPECT_EQ(GetFileLastWriteTime(Wide(dir / "link")).toTime_T(false), 12345);
   SetTime(dir.path(), 54321, 0);
-  EXPECT_EQ(54321, GetFileLastWriteTime(Wide(dir.path())).toTime_T(false));
+  EXPECT_EQ(GetFileLastWriteTime(Wide(dir.path())).toTime_T(false), 54321);
 }
 
 TEST(FileTime, WhatCannotBeAskedHasTheMinimum) {

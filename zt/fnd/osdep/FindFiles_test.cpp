@@ -120,11 +120,11 @@ TEST(FindFiles, LinksAreReplacedByTheirText) {
 TEST(FindFiles, DotEntriesStandAtTheEndWhateverThePattern) {
   Tree t;
   Vector<String> found = FindFiles().getFilenames(Wide(t / "a*"), Flags::DotEntries);
-  ASSERT_EQ(3u, found.size());
+  ASSERT_EQ(found.size(), 3u);
   EXPECT_EQ(t / "a.txt", AnsiString(found[0]).c_str());
   EXPECT_EQ(t / ".", AnsiString(found[1]).c_str());
   EXPECT_EQ(t / "..", AnsiString(found[2]).c_str());
-  EXPECT_EQ(2u, FindFiles().getFilenames(Wide(t / "nothing"), Flags::DotEntries).size());
+  EXPECT_EQ(FindFiles().getFilenames(Wide(t / "nothing"), Flags::DotEntries).size(), 2u);
 }
 
 TEST(FindFiles, RelativeMasks) {
@@ -152,7 +152,7 @@ TEST(FindFiles, LaterSeparatorSplitsTheMask) {
 TEST(FindFiles, ManyEntriesAreAllListed) {
   TempDir dir;
   for (int i = 0; i < 3000; ++i) WriteBytes(dir / ("n" + std::to_string(i)), "");
-  EXPECT_EQ(3000u, Find(dir / "n*").size());
+  EXPECT_EQ(Find(dir / "n*").size(), 3000u);
 }
 
 TEST(FindFilesWildcard, Table) {

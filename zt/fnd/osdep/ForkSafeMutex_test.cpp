@@ -80,7 +80,7 @@ TEST(ForkSafeMutex, ThreadsExcludeEachOther) {
     });
   }
   for (auto& thread : threads) thread.join();
-  EXPECT_EQ(20000, count);
+  EXPECT_EQ(count, 20000);
 }
 
 TEST(ForkSafeMutex, ChildOfAForkInsideAHoldHoldsIt) {
@@ -96,7 +96,7 @@ TEST(ForkSafeMutex, ChildOfAForkInsideAHoldHoldsIt) {
       if (!FreeForOthers(mutex)) return 3;
       return mutex.takeInterrupted() ? 4 : 0;
     });
-    EXPECT_EQ(0, child.wait(kSoonMs));
+    EXPECT_EQ(child.wait(kSoonMs), 0);
     EXPECT_FALSE(FreeForOthers(mutex));
     mutex.unlock();
     mutex.unlock();
@@ -115,7 +115,7 @@ TEST(ForkSafeMutex, RenewedOneIsFreeAndInterruptedInTheChildOnly) {
       mutex.unlock();
       return FreeForOthers(mutex) ? 0 : 3;
     });
-    EXPECT_EQ(0, child.wait(kSoonMs));
+    EXPECT_EQ(child.wait(kSoonMs), 0);
     EXPECT_FALSE(mutex.try_lock());
     EXPECT_FALSE(mutex.takeInterrupted());
   }
@@ -132,7 +132,7 @@ TEST(ForkSafeMutex, ForkDoesNotWaitLongerThanASecondInAll) {
     return first.takeInterrupted() && second.takeInterrupted() ? 0 : 1;
   });
   auto taken = std::chrono::steady_clock::now() - begin;
-  EXPECT_EQ(0, child.wait(kSoonMs));
+  EXPECT_EQ(child.wait(kSoonMs), 0);
   EXPECT_GE(taken, std::chrono::milliseconds(900));
   EXPECT_LT(taken, std::chrono::milliseconds(1900));
 }
@@ -156,7 +156,7 @@ TEST(ForkSafeMutex, ChildNeverSeesAHalfChangeOfAWaitedOne) {
       if (mutex.takeInterrupted()) return 1;
       return first == second ? 0 : 2;
     });
-    EXPECT_EQ(0, child.wait(kSoonMs)) << i;
+    EXPECT_EQ(child.wait(kSoonMs), 0) << i;
   }
   stop = true;
   changer.join();
@@ -180,7 +180,7 @@ TEST(ForkSafeMutex, ForkGivesWayToAHolderWhoWaitsForWhatItHasTaken) {
       ForkSafeHold second(low);
       return high.takeInterrupted() || low.takeInterrupted() ? 1 : 0;
     });
-    EXPECT_EQ(0, child.wait(kSoonMs)) << i;
+    EXPECT_EQ(child.wait(kSoonMs), 0) << i;
   }
   EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(15));
   stop = true;
@@ -210,7 +210,7 @@ TEST(ForkSafeMutex, ForksOfSeveralThreadsWaitInTheOrderOfTheRanks) {
           ForkSafeHold second(inner);
           return outer.takeInterrupted() || inner.takeInterrupted() ? 1 : 0;
         });
-        EXPECT_EQ(0, child.wait(kSoonMs)) << i;
+        EXPECT_EQ(child.wait(kSoonMs), 0) << i;
       }
     });
   }
@@ -237,7 +237,7 @@ TEST(ForkSafeMutex, MayBeMadeAndDestroyedWhileOthersFork) {
       Hold hold(mutex);
       return 0;
     });
-    EXPECT_EQ(0, child.wait(kSoonMs)) << i;
+    EXPECT_EQ(child.wait(kSoonMs), 0) << i;
   }
   stop = true;
   maker.join();
@@ -253,7 +253,7 @@ TEST(ForkSafeMutex, GrandchildFindsItFreeToo) {
     });
     return grandchild.wait(kSoonMs);
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 struct Counted {
@@ -277,8 +277,8 @@ TEST(ForkSafeMutexLeakedInstance, ThreadsThatComeFirstAtOnceGetOneObject) {
     });
   }
   for (auto& thread : threads) thread.join();
-  EXPECT_EQ(0, others);
-  EXPECT_EQ(1, Counted::alive);
+  EXPECT_EQ(others, 0);
+  EXPECT_EQ(Counted::alive, 1);
 }
 
 }  // namespace

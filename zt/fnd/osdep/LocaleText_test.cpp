@@ -32,10 +32,10 @@ TEST(LocaleText, RequiredLengthsAreUpperBounds) {
   const char text[] = "abc";
   const wchar_t wide[] = L"abc";
   for (const char* locale : {"", "carbon", "US-ASCII", "UTF-8"}) {
-    EXPECT_EQ(3u, GetAnsiToWideRequiredBufferLength(text, text + 3, locale));
-    EXPECT_EQ(12u, GetWideToAnsiRequiredBufferLength(wide, wide + 3, locale));
-    EXPECT_EQ(0u, GetAnsiToWideRequiredBufferLength(nullptr, nullptr, locale));
-    EXPECT_EQ(0u, GetWideToAnsiRequiredBufferLength(nullptr, nullptr, locale));
+    EXPECT_EQ(GetAnsiToWideRequiredBufferLength(text, text + 3, locale), 3u);
+    EXPECT_EQ(GetWideToAnsiRequiredBufferLength(wide, wide + 3, locale), 12u);
+    EXPECT_EQ(GetAnsiToWideRequiredBufferLength(nullptr, nullptr, locale), 0u);
+    EXPECT_EQ(GetWideToAnsiRequiredBufferLength(nullptr, nullptr, locale), 0u);
   }
 }
 
@@ -47,7 +47,7 @@ TEST(LocaleText, LengthsBeyond32BitsAreOutOfRange) {
   EXPECT_EQ(most, GetAnsiToWideRequiredBufferLength(begin, begin + most, ""));
   EXPECT_THROW(GetAnsiToWideRequiredBufferLength(begin, begin + most + 1, ""),
                exception::OutOfRange);
-  EXPECT_EQ(0xFFFFFFFCu, GetWideToAnsiRequiredBufferLength(wide, wide + 0x3FFFFFFF, ""));
+  EXPECT_EQ(GetWideToAnsiRequiredBufferLength(wide, wide + 0x3FFFFFFF, ""), 0xFFFFFFFCu);
   EXPECT_THROW(GetWideToAnsiRequiredBufferLength(wide, wide + 0x40000000, ""),
                exception::OutOfRange);
   EXPECT_THROW(AnsiToWide(begin, begin + 0x3FFFFFFF, ""), exception::OutOfRange)
@@ -57,50 +57,52 @@ TEST(LocaleText, LengthsBeyond32BitsAreOutOfRange) {
 
 TEST(LocaleText, ProcessLocaleUnderUtf8) {
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
-  EXPECT_EQ(
-      L"abc\xE9\x20AC"
-      L"d",
-      ToWide("abc\xC3\xA9\xE2\x82\xAC"
-             "d",
-             ""));
-  EXPECT_EQ(
-      "abc\xC3\xA9\xE2\x82\xAC"
-      "d",
-      ToNarrow(L"abc\xE9\x20AC"
-               L"d",
-               ""));
-  EXPECT_EQ(L"ab?d", ToWide("ab\xFF"
-                            "d",
-                            ""));
-  EXPECT_EQ(L"\xE9", ToWide("\xC3\xA9", "carbon"));
-  EXPECT_EQ("\xC3\xA9", ToNarrow(L"\xE9", "carbon"));
-  EXPECT_EQ("\xC3\xA9", ToNarrow(L"\xE9", nullptr));
+  EXPECT_EQ(ToWide("abc\xC3\xA9\xE2\x82\xAC"
+                   "d",
+                   ""),
+            L"abc\xE9\x20AC"
+            L"d");
+  EXPECT_EQ(ToNarrow(L"abc\xE9\x20AC"
+                     L"d",
+                     ""),
+            "abc\xC3\xA9\xE2\x82\xAC"
+            "d");
+  EXPECT_EQ(ToWide("ab\xFF"
+                   "d",
+                   ""),
+            L"ab?d");
+  EXPECT_EQ(ToWide("\xC3\xA9", "carbon"), L"\xE9");
+  EXPECT_EQ(ToNarrow(L"\xE9", "carbon"), "\xC3\xA9");
+  EXPECT_EQ(ToNarrow(L"\xE9", nullptr), "\xC3\xA9");
 }
 
 TEST(LocaleText, ProcessLocaleUnderCIsAscii) {
   const ScopedLocale locale(LC_CTYPE, "C");
-  EXPECT_EQ(L"ab??c", ToWide("ab\xC3\xA9"
-                             "c",
-                             ""));
-  EXPECT_EQ("ab?c", ToNarrow(L"ab\xE9"
-                             L"c",
-                             ""));
-  EXPECT_EQ(L"abc", ToWide("abc", "carbon"));
+  EXPECT_EQ(ToWide("ab\xC3\xA9"
+                   "c",
+                   ""),
+            L"ab??c");
+  EXPECT_EQ(ToNarrow(L"ab\xE9"
+                     L"c",
+                     ""),
+            "ab?c");
+  EXPECT_EQ(ToWide("abc", "carbon"), L"abc");
 }
 
 TEST(LocaleText, FollowsAChangeOfTheHostsLocale) {
   EXPECT_EQ("?", ToNarrow(L"\xE9", ""));
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
-  EXPECT_EQ("\xC3\xA9", ToNarrow(L"\xE9", ""));
+  EXPECT_EQ(ToNarrow(L"\xE9", ""), "\xC3\xA9");
 }
 
 TEST(LocaleText, AsciiIsTheSameInEveryLocale) {
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
-  EXPECT_EQ(L"ab??", ToWide("ab\xC3\xA9", "US-ASCII"));
-  EXPECT_EQ("ab??c", ToNarrow(L"ab\xE9\x20AC"
-                              L"c",
-                              "US-ASCII"));
-  EXPECT_EQ("?", ToNarrow(std::wstring(1, static_cast<wchar_t>(0x80000041)), "US-ASCII"));
+  EXPECT_EQ(ToWide("ab\xC3\xA9", "US-ASCII"), L"ab??");
+  EXPECT_EQ(ToNarrow(L"ab\xE9\x20AC"
+                     L"c",
+                     "US-ASCII"),
+            "ab??c");
+  EXPECT_EQ(ToNarrow(std::wstring(1, static_cast<wchar_t>(0x80000041)), "US-ASCII"), "?");
 }
 
 TEST(LocaleText, OtherEncodingsByName) {
@@ -117,22 +119,22 @@ TEST(LocaleText, ConvertsIntoABufferAsFarAsThereIsRoom) {
     const char text[] = "abcd";
     wchar_t wide[] = L"######";
     wchar_t* wideEnd = wide + 3;
-    EXPECT_EQ(3u, AnsiToWideNoAlloc(text, text + 4, "", wide, wideEnd));
+    EXPECT_EQ(AnsiToWideNoAlloc(text, text + 4, "", wide, wideEnd), 3u);
     EXPECT_EQ(wide + 3, wideEnd);
-    EXPECT_STREQ(L"abc###", wide);
+    EXPECT_STREQ(wide, L"abc###");
     wideEnd = wide + 6;
-    EXPECT_EQ(4u, AnsiToWideNoAlloc(text, text + 4, "", wide, wideEnd));
+    EXPECT_EQ(AnsiToWideNoAlloc(text, text + 4, "", wide, wideEnd), 4u);
     EXPECT_EQ(wide + 4, wideEnd);
     const wchar_t source[] = L"abcd";
     char narrow[] = "######";
     char* narrowEnd = narrow + 2;
-    EXPECT_EQ(2u, WideToAnsiNoAlloc(source, source + 4, "", narrow, narrowEnd));
-    EXPECT_STREQ("ab####", narrow);
+    EXPECT_EQ(WideToAnsiNoAlloc(source, source + 4, "", narrow, narrowEnd), 2u);
+    EXPECT_STREQ(narrow, "ab####");
     narrowEnd = narrow + 6;
-    EXPECT_EQ(0u, WideToAnsiNoAlloc(nullptr, nullptr, "carbon", narrow, narrowEnd));
+    EXPECT_EQ(WideToAnsiNoAlloc(nullptr, nullptr, "carbon", narrow, narrowEnd), 0u);
     EXPECT_EQ(narrow, narrowEnd);
     narrowEnd = narrow;
-    EXPECT_EQ(0u, WideToAnsiNoAlloc(source, source + 4, "", narrow, narrowEnd));
+    EXPECT_EQ(WideToAnsiNoAlloc(source, source + 4, "", narrow, narrowEnd), 0u);
   }
 }
 
@@ -143,11 +145,11 @@ TEST(LocaleText, MixedTextIsTruncatedInItsSecondHalf) {
       L"c";
   char narrow[] = "########";
   char* end = narrow + 5;
-  EXPECT_EQ(5u, WideToAnsiNoAlloc(source, source + 4, "", narrow, end));
-  EXPECT_STREQ("ab\xE2\x82\xAC###", narrow);
+  EXPECT_EQ(WideToAnsiNoAlloc(source, source + 4, "", narrow, end), 5u);
+  EXPECT_STREQ(narrow, "ab\xE2\x82\xAC###");
   end = narrow + 4;
-  EXPECT_EQ(4u, WideToAnsiNoAlloc(source, source + 4, "", narrow, end));
-  EXPECT_EQ("ab?c", std::string(narrow, 4));
+  EXPECT_EQ(WideToAnsiNoAlloc(source, source + 4, "", narrow, end), 4u);
+  EXPECT_EQ(std::string(narrow, 4), "ab?c");
 }
 
 TEST(LocaleText, NewBlocksTellTheirEnd) {
@@ -155,22 +157,22 @@ TEST(LocaleText, NewBlocksTellTheirEnd) {
   wchar_t *wide, *wideEnd;
   AnsiToWide(text, text + 3, "US-ASCII", wide, wideEnd);
   const std::unique_ptr<wchar_t[]> wideOwner(wide);
-  EXPECT_STREQ(L"abc", wide);
+  EXPECT_STREQ(wide, L"abc");
   EXPECT_EQ(wide + 3, wideEnd);
   char *narrow, *narrowEnd;
   WideToAnsi(wide, wideEnd, "US-ASCII", narrow, narrowEnd);
   const std::unique_ptr<char[]> narrowOwner(narrow);
-  EXPECT_STREQ("abc", narrow);
+  EXPECT_STREQ(narrow, "abc");
   EXPECT_EQ(narrow + 3, narrowEnd);
   const std::unique_ptr<char[]> terminated(WideToAnsi(L"xyz", "US-ASCII")),
       null(WideToAnsi(nullptr, "US-ASCII"));
-  EXPECT_STREQ("xyz", terminated.get());
-  EXPECT_STREQ("", null.get());
-  EXPECT_EQ(L"", ToWide("", ""));
+  EXPECT_STREQ(terminated.get(), "xyz");
+  EXPECT_STREQ(null.get(), "");
+  EXPECT_EQ(ToWide("", ""), L"");
 }
 
 TEST(LocaleText, ThrowingOnBadTextCannotBeSwitchedOn) {
   EXPECT_FALSE(MakeWideToAnsiThrow(true));
-  EXPECT_EQ("?", ToNarrow(L"\xE9", "US-ASCII"));
+  EXPECT_EQ(ToNarrow(L"\xE9", "US-ASCII"), "?");
   EXPECT_FALSE(MakeWideToAnsiThrow(false));
 }

@@ -26,14 +26,14 @@ bool NoSource(unsigned char (&)[16]) { return false; }
 
 TEST(MakeGUID, TextReadsAsTheUuid) {
   const _GUID guid = MakeGUID(CountingSource);
-  EXPECT_EQ(0x00112233u, guid.Data1);
-  EXPECT_EQ(0x4455u, guid.Data2);
-  EXPECT_EQ(0x6677u, guid.Data3);
-  EXPECT_EQ(0x88, guid.Data4[0]);
-  EXPECT_EQ(0xFF, guid.Data4[7]);
+  EXPECT_EQ(guid.Data1, 0x00112233u);
+  EXPECT_EQ(guid.Data2, 0x4455u);
+  EXPECT_EQ(guid.Data3, 0x6677u);
+  EXPECT_EQ(guid.Data4[0], 0x88);
+  EXPECT_EQ(guid.Data4[7], 0xFF);
   String text;
   Guid(guid).toString(text);
-  EXPECT_EQ(0, text.exactCompare(L"{00112233-4455-6677-8899-AABBCCDDEEFF}"));
+  EXPECT_EQ(text.exactCompare(L"{00112233-4455-6677-8899-AABBCCDDEEFF}"), 0);
 }
 
 TEST(MakeGUID, WithoutASourceRaises) {
@@ -44,8 +44,8 @@ TEST(MakeGUID, VersionFourAndNeverTheSame) {
   std::set<std::string> seen;
   for (int i = 0; i < 1000; ++i) {
     const _GUID guid = MakeGUID();
-    EXPECT_EQ(4, guid.Data3 >> 12);
-    EXPECT_EQ(0x80, guid.Data4[0] & 0xC0);
+    EXPECT_EQ(guid.Data3 >> 12, 4);
+    EXPECT_EQ(guid.Data4[0] & 0xC0, 0x80);
     EXPECT_TRUE(seen.insert(std::string(reinterpret_cast<const char*>(&guid), 16)).second);
   }
 }
@@ -57,5 +57,5 @@ TEST(MakeGUID, SourceFillsAllBytes) {
     ASSERT_TRUE(NewUuidBytes(bytes));
     for (int b = 0; b < 16; ++b) ones[b] |= bytes[b];
   }
-  for (int b = 0; b < 16; ++b) EXPECT_NE(0, ones[b]) << b;
+  for (int b = 0; b < 16; ++b) EXPECT_NE(ones[b], 0) << b;
 }

@@ -42,7 +42,7 @@ TEST(MutexFork, ChildHoldsNothingAndFreesNothing) {
     mutex.unlock();
     return FileIsFree(place.file("name")) ? 3 : 0;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_FALSE(FileIsFree(place.file("name")));
   mutex.unlock();
   EXPECT_TRUE(FileIsFree(place.file("name")));
@@ -58,7 +58,7 @@ TEST(MutexFork, InheritedObjectMayBeDestroyedWhileTheParentHolds) {
       mutex.reset();
       return FileIsFree(place.file("name")) ? 2 : 0;
     });
-    EXPECT_EQ(0, child.wait());
+    EXPECT_EQ(child.wait(), 0);
     EXPECT_FALSE(FileIsFree(place.file("name")));
   }
 }
@@ -78,7 +78,7 @@ TEST(MutexFork, ChildWaitsForTheParentAndThenHolds) {
   });
   EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }));
   mutex.unlock();
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(MutexFork, ForkWhileAnotherThreadHoldsLeavesAUsableChild) {
@@ -104,7 +104,7 @@ TEST(MutexFork, ForkWhileAnotherThreadHoldsLeavesAUsableChild) {
   EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }));
   finish.set_value();
   holder.join();
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(MutexFork, ForksDuringHeavyUseLeaveUsableChildren) {
@@ -133,7 +133,7 @@ TEST(MutexFork, ForksDuringHeavyUseLeaveUsableChildren) {
       mutex.unlock();
       return 0;
     });
-    EXPECT_EQ(0, child.wait()) << i;
+    EXPECT_EQ(child.wait(), 0) << i;
   }
   stop = true;
   for (auto& thread : threads) thread.join();
@@ -157,7 +157,7 @@ TEST(MutexFork, ThreadsOfAChildRenewAnInheritedObjectOnce) {
     for (auto& thread : threads) thread.join();
     return count == 800 ? 0 : 1;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(MutexFork, GrandchildRenewsAgain) {
@@ -170,7 +170,7 @@ TEST(MutexFork, GrandchildRenewsAgain) {
     mutex.unlock();
     return code;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(MutexFork, LockOfAKilledParentDoesNotLiveOnInTheChild) {
@@ -204,7 +204,7 @@ TEST(MutexFork, ChildDoesNotCloseADescriptorThatIsNoLongerTheMutexs) {
     unused.reset();
     return fcntl(first, F_GETFD) != -1 && fcntl(second, F_GETFD) != -1 ? 0 : 1;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(MutexFork, ReopenedFileIsNotKeptByAChildEither) {

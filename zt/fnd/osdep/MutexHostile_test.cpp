@@ -60,8 +60,8 @@ TEST(MutexHostile, FileInTheDirectorysPlaceFailsForEachProcess) {
   }
   end.notify();
   end.notify();
-  EXPECT_EQ(0, first.wait());
-  EXPECT_EQ(0, second.wait());
+  EXPECT_EQ(first.wait(), 0);
+  EXPECT_EQ(second.wait(), 0);
 }
 
 // ---- the descriptor
@@ -70,13 +70,13 @@ TEST(MutexHostile, ForkLeavesAnothersDescriptorOfTheSameNumberAlone) {
   MutexPlace place;
   Mutex mutex(L"name");
   int ends[2];
-  ASSERT_EQ(0, pipe2(ends, O_CLOEXEC));
+  ASSERT_EQ(pipe2(ends, O_CLOEXEC), 0);
   ScopedFd out(ends[0]);
   int number = DescriptorOf(place.file("name"));
   ASSERT_EQ(number, dup2(ends[1], number));
   ::close(ends[1]);
   Child child([&] { return write(number, "x", 1) == 1 ? 0 : 1; });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   ::close(number);
 }
 
@@ -162,7 +162,7 @@ TEST(MutexHostile, TryLockThatMakesItsFileAnewWithoutMemoryIsFalse) {
     }
     return result;
   });
-  EXPECT_EQ(kDone, child.wait());
+  EXPECT_EQ(child.wait(), kDone);
 }
 
 TEST(MutexHostile, TryLockOfAForkedChildWithoutMemoryIsFalse) {
@@ -174,7 +174,7 @@ TEST(MutexHostile, TryLockOfAForkedChildWithoutMemoryIsFalse) {
     Child child([&] { return TryLockWithout(n, mutex); });
     result = child.wait();
   }
-  EXPECT_EQ(kDone, result);
+  EXPECT_EQ(result, kDone);
 }
 
 }  // namespace

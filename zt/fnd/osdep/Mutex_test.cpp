@@ -72,9 +72,9 @@ TEST(Mutex, LeavesAnEmptyFileOpenToAll) {
     EXPECT_FALSE(FileIsFree(place.file("name")));
     mutex.unlock();
   }
-  EXPECT_EQ(0777, ModeOf(place.dir / "mutex"));
-  EXPECT_EQ(0666, ModeOf(place.file("name")));
-  EXPECT_EQ("", ReadBytes(place.file("name")));
+  EXPECT_EQ(ModeOf(place.dir / "mutex"), 0777);
+  EXPECT_EQ(ModeOf(place.file("name")), 0666);
+  EXPECT_EQ(ReadBytes(place.file("name")), "");
 }
 
 TEST(Mutex, ModesStandUnderARestrictiveUmask) {
@@ -84,9 +84,9 @@ TEST(Mutex, ModesStandUnderARestrictiveUmask) {
     Mutex mutex(L"name");
     return mutex.tryLock() ? 0 : 1;
   });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ(0777, ModeOf(place.dir / "mutex"));
-  EXPECT_EQ(0666, ModeOf(place.file("name")));
+  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(ModeOf(place.dir / "mutex"), 0777);
+  EXPECT_EQ(ModeOf(place.file("name")), 0666);
 }
 
 TEST(Mutex, LockedThreeTimesIsFreeAfterTheThirdUnlock) {
@@ -120,7 +120,7 @@ TEST(Mutex, ThreadsWithObjectsOfTheirOwnExcludeOneAnother) {
     });
   }
   for (auto& thread : threads) thread.join();
-  EXPECT_EQ(2000, count);
+  EXPECT_EQ(count, 2000);
 }
 
 TEST(Mutex, ThreadsThatShareOneObjectExcludeOneAnother) {
@@ -138,7 +138,7 @@ TEST(Mutex, ThreadsThatShareOneObjectExcludeOneAnother) {
     });
   }
   for (auto& thread : threads) thread.join();
-  EXPECT_EQ(2000, count);
+  EXPECT_EQ(count, 2000);
 }
 
 TEST(Mutex, OtherThreadOfTheProcessIsRefusedWhileHeld) {
@@ -170,10 +170,10 @@ TEST(Mutex, ProcessesLoseNoStep) {
       return 0;
     });
   }
-  for (Child& child : children) EXPECT_EQ(0, child.wait());
+  for (Child& child : children) EXPECT_EQ(child.wait(), 0);
   int n;
   memcpy(&n, ReadBytes(place.dir / "count").data(), sizeof n);
-  EXPECT_EQ(1200, n);
+  EXPECT_EQ(n, 1200);
 }
 
 TEST(Mutex, TryLockWhileAnotherProcessHoldsItIsFalseAndLeavesNoTrace) {
@@ -203,7 +203,7 @@ TEST(Mutex, KilledHolderDoesNotBlockTheNext) {
   });
   EXPECT_TRUE(Eventually([&] { return BlockedIn(waiter.pid(), SYS_flock); }));
   holder.kill();
-  EXPECT_EQ(0, waiter.wait());
+  EXPECT_EQ(waiter.wait(), 0);
 }
 
 TEST(Mutex, InterruptedWaitIsResumed) {
@@ -224,7 +224,7 @@ TEST(Mutex, InterruptedWaitIsResumed) {
   }
   EXPECT_TRUE(waiter.running());
   holder.kill();
-  EXPECT_EQ(0, waiter.wait());
+  EXPECT_EQ(waiter.wait(), 0);
 }
 
 TEST(Mutex, NamesThatDifferInCaseShareASectionAndHaveTwoFiles) {
@@ -321,52 +321,52 @@ TEST(Mutex, DescriptorsComeBack) {
 
 TEST(Mutex, FileThatCannotBeMadeIsAPosixErrorWithoutTrace) {
   MutexPlace place;
-  ASSERT_EQ(0, mkdir((place.dir / "mutex").c_str(), 0777));
+  ASSERT_EQ(mkdir((place.dir / "mutex").c_str(), 0777), 0);
   int before = vlt::test::OpenDescriptors();
   auto make = [](const std::string& name) { return PosixErrorOf([&] { Mutex m(Wide(name)); }); };
-  EXPECT_EQ(EISDIR, make(""));
-  EXPECT_EQ(ENAMETOOLONG, make(std::string(256, 'n')));
-  EXPECT_EQ(ENOENT, make("no/such"));
+  EXPECT_EQ(make(""), EISDIR);
+  EXPECT_EQ(make(std::string(256, 'n')), ENAMETOOLONG);
+  EXPECT_EQ(make("no/such"), ENOENT);
   EXPECT_EQ(before, vlt::test::OpenDescriptors());
-  EXPECT_EQ(-1, make(std::string(255, 'n')));
+  EXPECT_EQ(make(std::string(255, 'n')), -1);
 }
 
 TEST(Mutex, WhatIsInThePlaceOfTheFileIsMovedAside) {
   MutexPlace place;
-  ASSERT_EQ(0, mkdir((place.dir / "mutex").c_str(), 0777));
-  ASSERT_EQ(0, mkfifo(place.file("fifo").c_str(), 0666));
-  ASSERT_EQ(0, mkdir(place.file("directory").c_str(), 0777));
+  ASSERT_EQ(mkdir((place.dir / "mutex").c_str(), 0777), 0);
+  ASSERT_EQ(mkfifo(place.file("fifo").c_str(), 0666), 0);
+  ASSERT_EQ(mkdir(place.file("directory").c_str(), 0777), 0);
   WriteBytes(place.dir / "victim", "x");
   chmod((place.dir / "victim").c_str(), 0600);
-  ASSERT_EQ(0, symlink("../victim", place.file("link").c_str()));
-  ASSERT_EQ(0, link((place.dir / "victim").c_str(), place.file("second").c_str()));
+  ASSERT_EQ(symlink("../victim", place.file("link").c_str()), 0);
+  ASSERT_EQ(link((place.dir / "victim").c_str(), place.file("second").c_str()), 0);
   for (const char* name : {"fifo", "directory", "link", "second"}) {
     Mutex mutex(Wide(name));
     mutex.lock();
     EXPECT_FALSE(FileIsFree(place.file(name))) << name;
     mutex.unlock();
   }
-  EXPECT_EQ("x", ReadBytes(place.dir / "victim"));
-  EXPECT_EQ(0600, ModeOf(place.dir / "victim"));
+  EXPECT_EQ(ReadBytes(place.dir / "victim"), "x");
+  EXPECT_EQ(ModeOf(place.dir / "victim"), 0600);
 }
 
 TEST(Mutex, FileInTheDirectorysPlaceIsENOTDIR) {
   MutexPlace place;
   WriteBytes(place.dir / "mutex", "x");
-  EXPECT_EQ(ENOTDIR, PosixErrorOf([] { Mutex m(L"name"); }));
+  EXPECT_EQ(PosixErrorOf([] { Mutex m(L"name"); }), ENOTDIR);
 }
 
 TEST(Mutex, ReplacedFileIsLockedInPlaceOfTheOldOne) {
   MutexPlace place;
   Mutex mutex(L"name");
-  ASSERT_EQ(0, unlink(place.file("name").c_str()));
+  ASSERT_EQ(unlink(place.file("name").c_str()), 0);
   mutex.lock();
-  EXPECT_EQ(0666, ModeOf(place.file("name")));
+  EXPECT_EQ(ModeOf(place.file("name")), 0666);
   EXPECT_FALSE(FileIsFree(place.file("name")));
   mutex.unlock();
   EXPECT_TRUE(FileIsFree(place.file("name")));
   // The same by tryLock, with another process on the new file.
-  ASSERT_EQ(0, unlink(place.file("name").c_str()));
+  ASSERT_EQ(unlink(place.file("name").c_str()), 0);
   Keeper holder = HolderOf("name");
   ASSERT_TRUE(holder.good());
   EXPECT_FALSE(mutex.tryLock());
@@ -380,7 +380,7 @@ TEST(Mutex, RemovedDirectoryIsMadeAgain) {
   Mutex mutex(L"name");
   std::filesystem::remove_all(place.dir / "mutex");
   mutex.lock();
-  EXPECT_EQ(0777, ModeOf(place.dir / "mutex"));
+  EXPECT_EQ(ModeOf(place.dir / "mutex"), 0777);
   EXPECT_FALSE(FileIsFree(place.file("name")));
   mutex.unlock();
 }
@@ -390,7 +390,7 @@ TEST(Mutex, FailedLockLeavesTheSection) {
   Mutex mutex(L"name");
   std::filesystem::remove_all(place.dir / "mutex");
   WriteBytes(place.dir / "mutex", "in the way");
-  EXPECT_EQ(ENOTDIR, PosixErrorOf([&] { mutex.lock(); }));
+  EXPECT_EQ(PosixErrorOf([&] { mutex.lock(); }), ENOTDIR);
   EXPECT_FALSE(mutex.tryLock());
   std::filesystem::remove(place.dir / "mutex");
   EXPECT_TRUE(TryElsewhere(mutex));
@@ -409,7 +409,7 @@ TEST(Mutex, RefusedFileLockIsThrownWithItsErrnoAndLeavesTheSection) {
     std::thread([&] { error = PosixErrorOf([&] { mutex.lock(); }); }).join();
     return error == ENOLCK ? 0 : 4;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(Mutex, UnlockThatTheSystemRefusesThrowsNothing) {
@@ -421,7 +421,7 @@ TEST(Mutex, UnlockThatTheSystemRefusesThrowsNothing) {
     mutex.unlock();
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 // ---- the end of the process
@@ -443,8 +443,8 @@ TEST(Mutex, WorksInExitFunctionsThatRunAfterItsOwn) {
     }
     exit(0);
   });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ("x", ReadBytes(place.dir / "done"));
+  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(ReadBytes(place.dir / "done"), "x");
 }
 
 }  // namespace

@@ -88,16 +88,16 @@ TEST(NamedEvent, SemaphoreValuesByKindAndState) {
   EventPlace place;
   NamedEvent manual(L"manual", kManual, kSet), automatic(L"auto", kAutomatic, kSet);
   int set = place.setOf(1);
-  EXPECT_EQ(0, EventPlace::ValueOf(set, 0));
-  EXPECT_EQ(1, EventPlace::ValueOf(set, 1));
+  EXPECT_EQ(EventPlace::ValueOf(set, 0), 0);
+  EXPECT_EQ(EventPlace::ValueOf(set, 1), 1);
   manual.reset();
   automatic.reset();
-  EXPECT_EQ(1, EventPlace::ValueOf(set, 0));
-  EXPECT_EQ(0, EventPlace::ValueOf(set, 1));
+  EXPECT_EQ(EventPlace::ValueOf(set, 0), 1);
+  EXPECT_EQ(EventPlace::ValueOf(set, 1), 0);
   manual.set();
   automatic.set();
-  EXPECT_EQ(0, EventPlace::ValueOf(set, 0));
-  EXPECT_EQ(1, EventPlace::ValueOf(set, 1));
+  EXPECT_EQ(EventPlace::ValueOf(set, 0), 0);
+  EXPECT_EQ(EventPlace::ValueOf(set, 1), 1);
 }
 
 TEST(NamedEvent, ManualSetReleasesAllWaitersInAllProcessesAndStays) {
@@ -113,7 +113,7 @@ TEST(NamedEvent, ManualSetReleasesAllWaitersInAllProcessesAndStays) {
   for (Child& waiter : waiters) ASSERT_TRUE(Eventually([&] { return Waiting(waiter.pid()); }));
   EXPECT_FALSE(released);
   event.set();
-  for (Child& waiter : waiters) EXPECT_EQ(0, waiter.wait());
+  for (Child& waiter : waiters) EXPECT_EQ(waiter.wait(), 0);
   thread.join();
   EXPECT_TRUE(event.check());
   EXPECT_TRUE(event.check());
@@ -142,7 +142,7 @@ TEST(NamedEvent, AutomaticSetReleasesOneOfThreeWaiters) {
     }
     EXPECT_EQ(left, waiting());
   }
-  for (Child& waiter : waiters) EXPECT_EQ(0, waiter.wait());
+  for (Child& waiter : waiters) EXPECT_EQ(waiter.wait(), 0);
 }
 
 TEST(NamedEvent, CheckConsumesAnAutomaticEvent) {
@@ -195,11 +195,11 @@ TEST(NamedEvent, TimedWaitSleeps50MsAndThenTheRest) {
            })
         .wait();
   };
-  EXPECT_EQ(0, sleepsOf(120, {50, 50, 20}));
-  EXPECT_EQ(0, sleepsOf(50, {50, 0}));
-  EXPECT_EQ(0, sleepsOf(49, {49}));
-  EXPECT_EQ(0, sleepsOf(1, {1}));
-  EXPECT_EQ(0, sleepsOf(0, {}));
+  EXPECT_EQ(sleepsOf(120, {50, 50, 20}), 0);
+  EXPECT_EQ(sleepsOf(50, {50, 0}), 0);
+  EXPECT_EQ(sleepsOf(49, {49}), 0);
+  EXPECT_EQ(sleepsOf(1, {1}), 0);
+  EXPECT_EQ(sleepsOf(0, {}), 0);
 }
 
 TEST(NamedEvent, TimedWaitSeesASignal) {
@@ -240,7 +240,7 @@ TEST(NamedEvent, PulseReleasesThoseWhoWaitWithoutLimit) {
   ASSERT_TRUE(Eventually([&] { return Waiting(waiter.pid()); }));
   event.set();
   event.reset();
-  EXPECT_EQ(0, waiter.wait());
+  EXPECT_EQ(waiter.wait(), 0);
 }
 
 TEST(NamedEvent, WaitOfAllOnesHasNoLimit) {
@@ -249,7 +249,7 @@ TEST(NamedEvent, WaitOfAllOnesHasNoLimit) {
   Child waiter([] { return NamedEvent(L"name", kAutomatic, kClear).wait(kNoLimit) ? 0 : 1; });
   ASSERT_TRUE(Eventually([&] { return Waiting(waiter.pid()); }));  // in the kernel, not polling
   event.set();
-  EXPECT_EQ(0, waiter.wait());
+  EXPECT_EQ(waiter.wait(), 0);
   EXPECT_FALSE(event.checkOnly());
 }
 
@@ -287,7 +287,7 @@ TEST(NamedEvent, KilledWaiterChangesNothingForTheOthers) {
   killed.wait();
   EXPECT_TRUE(other.running());
   event.set();
-  EXPECT_EQ(0, other.wait());
+  EXPECT_EQ(other.wait(), 0);
   EXPECT_FALSE(event.checkOnly());
 }
 
@@ -310,7 +310,7 @@ TEST(NamedEvent, SignalSentBeforeAnyWaiterIsKept) {
     NamedEvent event(L"name", manual, kClear);
     event.set();
     Child waiter = Waiter(manual);
-    EXPECT_EQ(0, waiter.wait());
+    EXPECT_EQ(waiter.wait(), 0);
     EXPECT_EQ(manual, event.checkOnly());
   }
 }
@@ -334,7 +334,7 @@ TEST(NamedEvent, SignalHandlersDoNotEndAWait) {
   }
   EXPECT_TRUE(waiter.running());
   event.set();
-  EXPECT_EQ(0, waiter.wait());
+  EXPECT_EQ(waiter.wait(), 0);
 }
 
 // ---- a set that was removed under the event
@@ -350,18 +350,18 @@ TEST(NamedEvent, RemovalUnderAWaiterAndLaterCallsAreErrors) {
   };
   Child first = waiter(L"name", kAutomatic), second = waiter(L"manual", kManual);
   ASSERT_TRUE(Eventually([&] { return Waiting(first.pid()) && Waiting(second.pid()); }));
-  ASSERT_EQ(0, semctl(place.setOf(1), 0, IPC_RMID));
-  EXPECT_EQ(EIDRM, first.wait());
-  EXPECT_EQ(EIDRM, second.wait());
-  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.wait(); }));
-  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.wait(10); }));
-  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.wait(0); }));
-  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.check(); }));
-  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.checkOnly(); }));
-  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.set(); }));
-  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.reset(); }));
-  EXPECT_EQ(EINVAL, PosixErrorOf([&] { event.resetIfAuto(); }));
-  EXPECT_EQ(-1, PosixErrorOf([&] { manual.resetIfAuto(); }));  // does nothing
+  ASSERT_EQ(semctl(place.setOf(1), 0, IPC_RMID), 0);
+  EXPECT_EQ(first.wait(), EIDRM);
+  EXPECT_EQ(second.wait(), EIDRM);
+  EXPECT_EQ(PosixErrorOf([&] { event.wait(); }), EINVAL);
+  EXPECT_EQ(PosixErrorOf([&] { event.wait(10); }), EINVAL);
+  EXPECT_EQ(PosixErrorOf([&] { event.wait(0); }), EINVAL);
+  EXPECT_EQ(PosixErrorOf([&] { event.check(); }), EINVAL);
+  EXPECT_EQ(PosixErrorOf([&] { event.checkOnly(); }), EINVAL);
+  EXPECT_EQ(PosixErrorOf([&] { event.set(); }), EINVAL);
+  EXPECT_EQ(PosixErrorOf([&] { event.reset(); }), EINVAL);
+  EXPECT_EQ(PosixErrorOf([&] { event.resetIfAuto(); }), EINVAL);
+  EXPECT_EQ(PosixErrorOf([&] { manual.resetIfAuto(); }), -1);  // does nothing
 }
 
 TEST(NamedEvent, ErrorsHaveTheCodeOfTheFamily) {
@@ -372,7 +372,7 @@ TEST(NamedEvent, ErrorsHaveTheCodeOfTheFamily) {
     event.check();
     FAIL();
   } catch (const OSException& e) {
-    EXPECT_EQ(42u, e.getErrorCode());
+    EXPECT_EQ(e.getErrorCode(), 42u);
     EXPECT_EQ(static_cast<unsigned>(EINVAL), e.whatcode());
   }
 }
@@ -415,7 +415,7 @@ TEST(NamedEvent, PingPongBetweenProcessesLosesNothing) {
     ping.set();
     pong.wait();
   }
-  EXPECT_EQ(0, other.wait());
+  EXPECT_EQ(other.wait(), 0);
 }
 
 TEST(NamedEvent, ThreadsOpenAndCloseOneNameAtOnce) {
@@ -432,7 +432,7 @@ TEST(NamedEvent, ThreadsOpenAndCloseOneNameAtOnce) {
     });
   }
   for (auto& thread : threads) thread.join();
-  EXPECT_EQ(0, bad);
+  EXPECT_EQ(bad, 0);
   EXPECT_EQ(std::vector<std::string>(), place.files());
 }
 

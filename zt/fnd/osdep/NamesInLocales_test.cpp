@@ -50,10 +50,10 @@ TEST_F(NamesInLocales, MutexBeyondAsciiExcludesProcessesOfOtherLocales) {
         if (!m_locales.use(second)) return 1;
         return Mutex(L"m\xE9").tryLock() ? 2 : 0;
       });
-      EXPECT_EQ(0, other.wait()) << first << " beside " << second;
+      EXPECT_EQ(other.wait(), 0) << first << " beside " << second;
     }
     end.notify();
-    EXPECT_EQ(0, holder.wait());
+    EXPECT_EQ(holder.wait(), 0);
   }
 }
 
@@ -95,10 +95,10 @@ TEST_F(NamesInLocales, EventBeyondAsciiIsSeenByProcessesOfOtherLocales) {
     NamedEvent(L"m\xE9", true, false).set();
     return 0;
   });
-  EXPECT_EQ(0, sets.wait());
+  EXPECT_EQ(sets.wait(), 0);
   EXPECT_TRUE(vlt::test::Exists(place.file("m\xC3\xA9")));
   set.notify();
-  EXPECT_EQ(0, other.wait());
+  EXPECT_EQ(other.wait(), 0);
 }
 
 }  // namespace

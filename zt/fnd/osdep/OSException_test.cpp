@@ -14,9 +14,9 @@ TEST(OSException, PlainFormsKeepTheirOwnSmallCode) {
   EXPECT_EQ(0u, OSException().whatcode());
   EXPECT_EQ(42u, OSException().getErrorCode());
   OSException e("m", 2);
-  EXPECT_STREQ("m", e.what());
-  EXPECT_EQ(2u, e.whatcode());
-  EXPECT_EQ(42u, e.getErrorCode());  // 7 belongs to the two derived classes
+  EXPECT_STREQ(e.what(), "m");
+  EXPECT_EQ(e.whatcode(), 2u);
+  EXPECT_EQ(e.getErrorCode(), 42u);  // 7 belongs to the two derived classes
 }
 
 TEST(OSException, PosixErrorMapsNothingAndNotFound) {
@@ -34,9 +34,9 @@ TEST(OSException, PosixErrorHasTheSystemsText) {
   EXPECT_STREQ(strerror(ENOENT), PosixError(ENOENT).what());
   EXPECT_STREQ(strerror(0), PosixError(0).what());
   EXPECT_STREQ(strerror(100000), PosixError(100000).what());
-  EXPECT_STREQ("own", PosixError("own", EACCES).what());
+  EXPECT_STREQ(PosixError("own", EACCES).what(), "own");
   EXPECT_EQ(static_cast<unsigned int>(EACCES), PosixError("own", EACCES).whatcode());
-  EXPECT_STREQ("", PosixError(nullptr, 1).what());
+  EXPECT_STREQ(PosixError(nullptr, 1).what(), "");
 }
 
 TEST(OSException, PosixErrorTakesTheErrnoOfTheFailedCall) {

@@ -36,7 +36,7 @@ TEST(ProcessMark, IsCurrentInItsProcessOnly) {
     Child grandchild([&] { return mark.isCurrent() ? 1 : 0; });
     return grandchild.wait() == 0 && mark.isCurrent() ? 0 : 3;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_TRUE(mark.isCurrent());
 }
 
@@ -47,7 +47,7 @@ TEST(ProcessMark, IsNotCurrentInAChildMadeWithoutTheHandlersOfFork) {
   ASSERT_GT(pid, 0);
   int status = -1;
   ASSERT_EQ(pid, waitpid(static_cast<pid_t>(pid), &status, 0));
-  EXPECT_EQ(0, status);
+  EXPECT_EQ(status, 0);
 }
 
 // ---- children with the process id of their parent
@@ -79,7 +79,7 @@ TEST(ProcessMark, IsNotCurrentInAChildThatHasTheSameProcessId) {
   });
   int code = child.wait();
   if (code == kNotAllowed) GTEST_SKIP() << "NOT TESTED: no right to make name spaces";
-  EXPECT_EQ(0, code);
+  EXPECT_EQ(code, 0);
 }
 
 TEST(ProcessMark, MutexOfAParentWithTheSameProcessIdIsNotHeldByTheChild) {
@@ -99,7 +99,7 @@ TEST(ProcessMark, MutexOfAParentWithTheSameProcessIdIsNotHeldByTheChild) {
   });
   int code = child.wait();
   if (code == kNotAllowed) GTEST_SKIP() << "NOT TESTED: no right to make name spaces";
-  EXPECT_EQ(0, code);
+  EXPECT_EQ(code, 0);
 }
 
 }  // namespace

@@ -31,7 +31,7 @@ TEST(SharedLibrary, EmptyNameLoadsNothing) {
   EXPECT_FALSE(none.isLoaded());
   none.load();
   EXPECT_FALSE(none.isLoaded());
-  EXPECT_EQ(nullptr, none.getHandle());
+  EXPECT_EQ(none.getHandle(), nullptr);
   EXPECT_FALSE(SharedLibrary(String(), true, false).isLoaded());
   none.unload();
 }
@@ -45,7 +45,7 @@ TEST(SharedLibrary, RelativeNameInAWorkingDirectoryThatIsGoneLoadsNothing) {
     if (Bundle(L"./foo").isOpened()) return 4;
     return SharedLibrary(Wide("libm.so.6"), true, false).isLoaded() ? 0 : 5;  // needs no directory
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(SharedLibrary, NameWithoutADotIsDecoratedInItsDirectory) {
@@ -128,7 +128,7 @@ TEST(SharedLibrary, FileWithABundlesNameIsLoadedItself) {
 TEST(SharedLibrary, FailedLoadIsQuiet) {
   TempDir dir;
   vlt::test::WriteBytes(dir / "libbroken.so", "no module");
-  ASSERT_EQ(0, mkfifo((dir / "libpipe.so").c_str(), 0600));
+  ASSERT_EQ(mkfifo((dir / "libpipe.so").c_str(), 0600), 0);
   dir.makeDir("libdir.so");
   for (const char* name : {"missing", "broken", "pipe", "dir", "libdir.so", "libpipe.so"}) {
     SharedLibrary library(Wide(dir / name), true, false);
@@ -147,7 +147,7 @@ TEST(SharedLibrary, LoadByNameAfterALoadIsInvalidEvenWhenUnloaded) {
   EXPECT_THROW(library.load(Wide(dir / "foo")), exception::InvalidOperation);
   library.unload();
   EXPECT_FALSE(library.isLoaded());
-  EXPECT_EQ(nullptr, library.getHandle());
+  EXPECT_EQ(library.getHandle(), nullptr);
   EXPECT_THROW(library.load(Wide(dir / "foo")), exception::InvalidOperation);
   library.load();  // the requested name has stayed
   EXPECT_TRUE(library.isLoaded());
@@ -167,15 +167,15 @@ TEST(SharedLibrary, LoadAgainReplacesTheHandle) {
 
 TEST(SharedLibrary, UnloadedLookUp) {
   SharedLibrary library;
-  EXPECT_EQ(nullptr, library.getFunctionPointer(AnsiString("cos"), true));
-  EXPECT_EQ(nullptr, library.getFunctionPointer(String(L"cos"), true));
+  EXPECT_EQ(library.getFunctionPointer(AnsiString("cos"), true), nullptr);
+  EXPECT_EQ(library.getFunctionPointer(String(L"cos"), true), nullptr);
   dlerror();
   try {
     library.getFunctionPointer(AnsiString("cos"), false);
     FAIL();
   } catch (const PosixError& e) {
-    EXPECT_STREQ("", e.what());
-    EXPECT_EQ(42u, e.getErrorCode());
+    EXPECT_STREQ(e.what(), "");
+    EXPECT_EQ(e.getErrorCode(), 42u);
   }
 }
 
@@ -183,12 +183,12 @@ TEST(SharedLibrary, MissingFunctionIsThrownWithTheLoadersText) {
   TempDir dir;
   MakeModule(dir / "libfoo.so");
   SharedLibrary library(AnsiString((dir / "foo").c_str()), true, true);
-  EXPECT_EQ(nullptr, library.getFunctionPointer(AnsiString("no_such_function"), true));
+  EXPECT_EQ(library.getFunctionPointer(AnsiString("no_such_function"), true), nullptr);
   try {
     library.getFunctionPointer(String(L"no_such_function"), false);
     FAIL();
   } catch (const PosixError& e) {
-    EXPECT_NE(nullptr, strstr(e.what(), "no_such_function"));
+    EXPECT_NE(strstr(e.what(), "no_such_function"), nullptr);
   }
 }
 
@@ -270,8 +270,8 @@ TEST(SharedLibraryBare, NameGoesToTheLoaderAsLibNameSo) {
     return vlt::test::RunProgram({"/proc/self/exe"}, {{kNamesOnly, "1"}, {"LD_LIBRARY_PATH", path}})
         .exitCode;
   };
-  EXPECT_EQ(3, run(dir.path()));
-  EXPECT_EQ(0, run(dir / "elsewhere"));
+  EXPECT_EQ(run(dir.path()), 3);
+  EXPECT_EQ(run(dir / "elsewhere"), 0);
 }
 
 TEST(SharedLibraryBare, WorkingDirectoryIsNotSearched) {
@@ -281,7 +281,7 @@ TEST(SharedLibraryBare, WorkingDirectoryIsNotSearched) {
     if (chdir(dir.path().c_str()) != 0) return 1;
     return SharedLibrary(String(L"here"), true, false).isLoaded() ? 2 : 0;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 }  // namespace

@@ -37,8 +37,8 @@ TEST(SharedObjectName, PathIsThatOfTheFileInItsDirectory) {
   const MutexPlace place;
   EXPECT_EQ(place.dir / "mutex/name", SharedObjectPath(L"mutex", L"name").c_str());
   EXPECT_EQ(place.dir / "mutex/m\xC3\xA9", SharedObjectPath(L"mutex", L"m\xE9").c_str());
-  EXPECT_STREQ("/m\xC3\xA9", SharedObjectPath(L"mutex", L"/m\xE9").c_str());
-  EXPECT_STREQ("/m", SharedObjectPath(L"mutex", L"/m").c_str());
+  EXPECT_STREQ(SharedObjectPath(L"mutex", L"/m\xE9").c_str(), "/m\xC3\xA9");
+  EXPECT_STREQ(SharedObjectPath(L"mutex", L"/m").c_str(), "/m");
 }
 
 TEST(SharedObjectName, OrderFoldsTheLettersOfAsciiAlone) {

@@ -66,8 +66,8 @@ TEST(SharedUnixObject, PathIsBaseDirectoryAndNameAndTheDirectoryExists) {
   TempDir dir;
   setenv(kVariable, (dir / "base").c_str(), 1);
   EXPECT_EQ(dir / "base/things/name", BuildSharedUnixFilePath(L"things", L"name").c_str());
-  EXPECT_EQ(0777, ModeOf(dir / "base"));
-  EXPECT_EQ(0777, ModeOf(dir / "base/things"));
+  EXPECT_EQ(ModeOf(dir / "base"), 0777);
+  EXPECT_EQ(ModeOf(dir / "base/things"), 0777);
   EXPECT_FALSE(vlt::test::Exists(dir / "base/things/name"));
   EXPECT_EQ(dir / "base/things/n", BuildSharedUnixFilePath(L"things/", L"n").c_str());
 }
@@ -83,10 +83,10 @@ TEST(SharedUnixObject, ModesStandUnderEveryUmask) {
       Open(dir / "a/b/file");
       return umask(mask) == mask ? 0 : 1;  // and the umask is as it was
     });
-    EXPECT_EQ(0, child.wait());
-    EXPECT_EQ(0777, ModeOf(dir / "a")) << mask;
-    EXPECT_EQ(0777, ModeOf(dir / "a/b")) << mask;
-    EXPECT_EQ(0666, ModeOf(dir / "a/b/file")) << mask;
+    EXPECT_EQ(child.wait(), 0);
+    EXPECT_EQ(ModeOf(dir / "a"), 0777) << mask;
+    EXPECT_EQ(ModeOf(dir / "a/b"), 0777) << mask;
+    EXPECT_EQ(ModeOf(dir / "a/b/file"), 0666) << mask;
   }
 }
 
@@ -97,19 +97,19 @@ TEST(SharedUnixObject, ExistingObjectsAreOpenedToAllAtEachCall) {
   chmod((dir / "d/file").c_str(), 0600);
   CreateSharedUnixDir(Wide(dir / "d/"));
   Open(dir / "d/file");
-  EXPECT_EQ(0777, ModeOf(dir / "d"));
-  EXPECT_EQ(0666, ModeOf(dir / "d/file"));
-  EXPECT_EQ("kept", ReadBytes(dir / "d/file"));
+  EXPECT_EQ(ModeOf(dir / "d"), 0777);
+  EXPECT_EQ(ModeOf(dir / "d/file"), 0666);
+  EXPECT_EQ(ReadBytes(dir / "d/file"), "kept");
 }
 
 TEST(SharedUnixObject, FileInTheDirectorysPlaceIsENOTDIR) {
   TempDir dir;
   WriteBytes(dir / "d", "x");
-  EXPECT_EQ(ENOTDIR, PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/")); }));
-  EXPECT_EQ(ENOTDIR, PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/sub/")); }));
+  EXPECT_EQ(PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/")); }), ENOTDIR);
+  EXPECT_EQ(PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/sub/")); }), ENOTDIR);
   setenv(kVariable, dir.path().c_str(), 1);
-  EXPECT_EQ(ENOTDIR, PosixErrorOf([] { BuildSharedUnixFilePath(L"d", L"name"); }));
-  EXPECT_EQ("x", ReadBytes(dir / "d"));
+  EXPECT_EQ(PosixErrorOf([] { BuildSharedUnixFilePath(L"d", L"name"); }), ENOTDIR);
+  EXPECT_EQ(ReadBytes(dir / "d"), "x");
 }
 
 // The last component of such a path is not made, however often it is asked for.
@@ -123,24 +123,24 @@ TEST(SharedUnixObject, PathThatEndsInNoDirectoryIsENOTDIR) {
     String name(L"f\0g", 3);
     return PosixErrorOf([&] { BuildSharedUnixFilePath(name, L"name"); }) == ENOTDIR ? 0 : 3;
   });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ(0777, ModeOf(dir / "a"));
+  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(ModeOf(dir / "a"), 0777);
   EXPECT_FALSE(vlt::test::Exists(dir / "a/b"));
 }
 
 TEST(SharedUnixObject, DirectoryNeedsNoSlashAtTheEndOnceItIsThere) {
   TempDir dir;
-  ASSERT_EQ(0, mkdir((dir / "d").c_str(), 0700));
+  ASSERT_EQ(mkdir((dir / "d").c_str(), 0700), 0);
   CreateSharedUnixDir(Wide(dir / "d"));
-  EXPECT_EQ(0777, ModeOf(dir / "d"));
+  EXPECT_EQ(ModeOf(dir / "d"), 0777);
 }
 
 TEST(SharedUnixObject, LinkInTheDirectorysPlaceIsNotFollowed) {
   TempDir dir;
-  ASSERT_EQ(0, mkdir((dir / "target").c_str(), 0700));
-  ASSERT_EQ(0, symlink("target", (dir / "d").c_str()));
-  EXPECT_EQ(ENOTDIR, PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/")); }));
-  EXPECT_EQ(0700, ModeOf(dir / "target"));
+  ASSERT_EQ(mkdir((dir / "target").c_str(), 0700), 0);
+  ASSERT_EQ(symlink("target", (dir / "d").c_str()), 0);
+  EXPECT_EQ(PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/")); }), ENOTDIR);
+  EXPECT_EQ(ModeOf(dir / "target"), 0700);
 }
 
 TEST(SharedUnixObject, RefusedDirectoryIsAccessDenied) {
@@ -161,8 +161,8 @@ TEST(SharedUnixObject, SimultaneousStartsAllSucceed) {
       });
     }
     for (int i = 0; i < 6; ++i) go.notify();
-    for (Child& child : children) EXPECT_EQ(0, child.wait());
-    EXPECT_EQ(0777, ModeOf(dir / "a/b/c/d"));
+    for (Child& child : children) EXPECT_EQ(child.wait(), 0);
+    EXPECT_EQ(ModeOf(dir / "a/b/c/d"), 0777);
   }
 }
 
@@ -170,9 +170,9 @@ TEST(SharedUnixObject, DirectoryOfAnotherUserIsUsedAsItIs) {
   if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   chmod(dir.path().c_str(), 0755);
-  ASSERT_EQ(0, mkdir((dir / "d").c_str(), 0755));
+  ASSERT_EQ(mkdir((dir / "d").c_str(), 0755), 0);
   chmod((dir / "d").c_str(), 0755);
-  ASSERT_EQ(0, mkdir((dir / "unreadable").c_str(), 0711));
+  ASSERT_EQ(mkdir((dir / "unreadable").c_str(), 0711), 0);
   chmod((dir / "unreadable").c_str(), 0711);
   Child child([&] {
     if (setresuid(kSomeUser, kSomeUser, kSomeUser) != 0) return 1;
@@ -180,9 +180,9 @@ TEST(SharedUnixObject, DirectoryOfAnotherUserIsUsedAsItIs) {
     CreateSharedUnixDir(Wide(dir / "unreadable/"));
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ(0755, ModeOf(dir / "d"));
-  EXPECT_EQ(0711, ModeOf(dir / "unreadable"));
+  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(ModeOf(dir / "d"), 0755);
+  EXPECT_EQ(ModeOf(dir / "unreadable"), 0711);
 }
 
 TEST(SharedUnixObject, OwnDirectoryThatMayNotBeReadIsOpenedToAll) {
@@ -195,8 +195,8 @@ TEST(SharedUnixObject, OwnDirectoryThatMayNotBeReadIsOpenedToAll) {
     CreateSharedUnixDir(Wide(dir / "d/"));
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ(0777, ModeOf(dir / "d"));
+  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(ModeOf(dir / "d"), 0777);
 }
 
 // ---- files
@@ -206,9 +206,9 @@ TEST(SharedUnixObject, DescriptorReadsWritesAndClosesOnExec) {
   ScopedFd fd(CreateSharedUnixFile(AnsiString((dir / "f").c_str())));
   EXPECT_EQ(O_RDWR, fcntl(fd.get(), F_GETFL) & O_ACCMODE);
   EXPECT_EQ(FD_CLOEXEC, fcntl(fd.get(), F_GETFD));
-  EXPECT_EQ(3, write(fd.get(), "abc", 3));
+  EXPECT_EQ(write(fd.get(), "abc", 3), 3);
   Open(dir / "f");
-  EXPECT_EQ("abc", ReadBytes(dir / "f"));  // opening again cuts nothing
+  EXPECT_EQ(ReadBytes(dir / "f"), "abc");  // opening again cuts nothing
 }
 
 TEST(SharedUnixObject, FileOfAnotherUserIsUsedThoughItsModeCannotBeSet) {
@@ -216,16 +216,16 @@ TEST(SharedUnixObject, FileOfAnotherUserIsUsedThoughItsModeCannotBeSet) {
   TempDir dir;
   chmod(dir.path().c_str(), 0777);
   WriteBytes(dir / "f", "x");
-  ASSERT_EQ(0, chown((dir / "f").c_str(), kSomeUser, kSomeUser));
-  ASSERT_EQ(0, chmod((dir / "f").c_str(), 0667));
+  ASSERT_EQ(chown((dir / "f").c_str(), kSomeUser, kSomeUser), 0);
+  ASSERT_EQ(chmod((dir / "f").c_str(), 0667), 0);
   Child child([&] {
     if (setresuid(kOtherUser, kOtherUser, kOtherUser) != 0) return 1;
     ScopedFd fd(CreateSharedUnixFile(AnsiString((dir / "f").c_str())));
     return write(fd.get(), "y", 1) == 1 ? 0 : 2;
   });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ(0667, ModeOf(dir / "f"));
-  EXPECT_EQ("y", ReadBytes(dir / "f"));
+  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(ModeOf(dir / "f"), 0667);
+  EXPECT_EQ(ReadBytes(dir / "f"), "y");
 }
 
 TEST(SharedUnixObject, RefusedFileIsTriedThreeTimes) {
@@ -233,7 +233,7 @@ TEST(SharedUnixObject, RefusedFileIsTriedThreeTimes) {
   TempDir dir;
   chmod(dir.path().c_str(), 0777);
   WriteBytes(dir / "f", "x");
-  ASSERT_EQ(0, chmod((dir / "f").c_str(), 0600));
+  ASSERT_EQ(chmod((dir / "f").c_str(), 0600), 0);
   Child child([&] {
     if (setresuid(kSomeUser, kSomeUser, kSomeUser) != 0) return 1;
     int before = vlt::test::OpenDescriptors();
@@ -243,18 +243,18 @@ TEST(SharedUnixObject, RefusedFileIsTriedThreeTimes) {
     if (std::chrono::steady_clock::now() - start < std::chrono::milliseconds(2)) return 3;
     return vlt::test::OpenDescriptors() == before ? 0 : 4;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(SharedUnixObject, WhatIsNoFileOfItsOwnIsRefusedOrMovedAside) {
   TempDir dir;
   dir.makeDir("directory/inside");
-  ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0600));
+  ASSERT_EQ(mkfifo((dir / "fifo").c_str(), 0600), 0);
   WriteBytes(dir / "victim", "x");
   chmod((dir / "victim").c_str(), 0600);
-  ASSERT_EQ(0, symlink("victim", (dir / "link").c_str()));
-  ASSERT_EQ(0, symlink("nowhere", (dir / "dangling").c_str()));
-  ASSERT_EQ(0, link((dir / "victim").c_str(), (dir / "hard").c_str()));
+  ASSERT_EQ(symlink("victim", (dir / "link").c_str()), 0);
+  ASSERT_EQ(symlink("nowhere", (dir / "dangling").c_str()), 0);
+  ASSERT_EQ(link((dir / "victim").c_str(), (dir / "hard").c_str()), 0);
   int before = vlt::test::OpenDescriptors();
   const std::pair<const char*, int> rows[] = {{"directory", EISDIR},
                                               {"fifo", ENXIO},
@@ -265,14 +265,14 @@ TEST(SharedUnixObject, WhatIsNoFileOfItsOwnIsRefusedOrMovedAside) {
     EXPECT_EQ(error, PosixErrorOf([&, name = name] { Open(dir / name); })) << name;
     EXPECT_FALSE(vlt::test::Exists(dir / (std::string(name) + ".bad"))) << name;
     ScopedFd moved(CreateSharedUnixFile(AnsiString((dir / name).c_str()), InTheWay::MovedAside));
-    EXPECT_EQ(0666, ModeOf(dir / name)) << name;
+    EXPECT_EQ(ModeOf(dir / name), 0666) << name;
     EXPECT_TRUE(vlt::test::Exists(dir / (std::string(name) + ".bad"))) << name;
   }
-  EXPECT_EQ(ENOENT, PosixErrorOf([&] { Open(dir / "missing/f"); }));
-  EXPECT_EQ(ENAMETOOLONG, PosixErrorOf([&] { Open(dir / std::string(256, 'x')); }));
+  EXPECT_EQ(PosixErrorOf([&] { Open(dir / "missing/f"); }), ENOENT);
+  EXPECT_EQ(PosixErrorOf([&] { Open(dir / std::string(256, 'x')); }), ENAMETOOLONG);
   EXPECT_EQ(before, vlt::test::OpenDescriptors());
-  EXPECT_EQ(0600, ModeOf(dir / "victim"));
-  EXPECT_EQ(0600, ModeOf(dir / "fifo.bad"));
+  EXPECT_EQ(ModeOf(dir / "victim"), 0600);
+  EXPECT_EQ(ModeOf(dir / "fifo.bad"), 0600);
   EXPECT_TRUE(vlt::test::Exists(dir / "directory.bad/inside"));
   EXPECT_FALSE(vlt::test::Exists(dir / "nowhere"));
 }
@@ -281,7 +281,7 @@ TEST(SharedUnixObject, WhatThisUserMayNotMoveIsNamed) {
   if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs two users, so the superuser";
   TempDir dir;
   chmod(dir.path().c_str(), 0755);
-  ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0666));
+  ASSERT_EQ(mkfifo((dir / "fifo").c_str(), 0666), 0);
   Child child([&] {
     if (setresuid(kSomeUser, kSomeUser, kSomeUser) != 0) return 1;
     try {
@@ -292,7 +292,7 @@ TEST(SharedUnixObject, WhatThisUserMayNotMoveIsNamed) {
     }
     return 4;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(SharedUnixObject, FailureToSetTheModeIsAlwaysEPERM) {
@@ -306,7 +306,7 @@ TEST(SharedUnixObject, FailureToSetTheModeIsAlwaysEPERM) {
     // A directory's failure keeps its own number.
     return PosixErrorOf([&] { CreateSharedUnixDir(Wide(dir / "d/")); }) == EIO ? 0 : 4;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(SharedUnixObject, RefusedModeIsAcceptedForFilesAndDirectories) {
@@ -318,7 +318,7 @@ TEST(SharedUnixObject, RefusedModeIsAcceptedForFilesAndDirectories) {
     Open(dir / "d/f");
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 // ---- identity
@@ -329,12 +329,12 @@ TEST(SharedUnixObject, IdentityTellsWhetherThePathStillNamesTheFile) {
   ScopedFd fd(CreateSharedUnixFile(path));
   FileIdentity identity = FileIdentity::Of(fd.get());
   EXPECT_TRUE(identity.isNamedBy(path));
-  ASSERT_EQ(0, unlink(path.c_str()));
+  ASSERT_EQ(unlink(path.c_str()), 0);
   EXPECT_FALSE(identity.isNamedBy(path));
   WriteBytes(path.c_str(), "another");
   EXPECT_FALSE(identity.isNamedBy(path));
-  ASSERT_EQ(0, unlink(path.c_str()));
-  ASSERT_EQ(0, symlink(("/proc/self/fd/" + std::to_string(fd.get())).c_str(), path.c_str()));
+  ASSERT_EQ(unlink(path.c_str()), 0);
+  ASSERT_EQ(symlink(("/proc/self/fd/" + std::to_string(fd.get())).c_str(), path.c_str()), 0);
   EXPECT_FALSE(identity.isNamedBy(path));  // a link to it is not it
   EXPECT_FALSE(identity.isNamedBy(AnsiString((dir / "no/f").c_str())));
 }

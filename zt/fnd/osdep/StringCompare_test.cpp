@@ -50,7 +50,7 @@ TEST(StringCompare, CaseIsFolded) {
 
 TEST(StringCompare, NarrowResultIsTheDifferenceOfTheFoldedCharacters) {
   EXPECT_EQ('A' - 'C', StringCaseCompare("xa", "Xc"));
-  EXPECT_EQ('C', StringCaseCompare("abc", "ab"));
+  EXPECT_EQ(StringCaseCompare("abc", "ab"), 'C');
   EXPECT_EQ(-'C', StringCaseCompare("AB", "abc"));
   EXPECT_EQ('_' - 'Z', StringCaseCompare("_", "z")) << "folding is upward";
   EXPECT_EQ(0xE9 - 'A', StringCaseCompare("\xE9", "a")) << "bytes are unsigned";
@@ -69,21 +69,21 @@ TEST(StringCompare, ExactSeesCase) {
   EXPECT_EQ(0, StringExactCompare("abc", "abc"));
   EXPECT_GT(StringExactCompare("a", "A"), 0);
   EXPECT_LT(StringExactCompare(L"A", L"a"), 0);
-  EXPECT_EQ(0, StringExactCompare(L"a\xE9", L"a\xE9"));
+  EXPECT_EQ(StringExactCompare(L"a\xE9", L"a\xE9"), 0);
 }
 
 TEST(StringCompare, FoldsByTheHostsLocale) {
   const wchar_t lower[] = L"\xE9", upper[] = L"\xC9";
   {
     const ScopedLocale locale(LC_CTYPE, "C");
-    EXPECT_NE(0, StringCaseCompare(lower, upper));
-    EXPECT_NE(0, StringCaseCompare(L"\x131", L"i"));
+    EXPECT_NE(StringCaseCompare(lower, upper), 0);
+    EXPECT_NE(StringCaseCompare(L"\x131", L"i"), 0);
   }
   const ScopedLocale locale(LC_CTYPE, "C.UTF-8");
-  EXPECT_EQ(0, StringCaseCompare(lower, upper));
-  EXPECT_EQ(0, StringCaseCompare(L"\x131", L"i")) << "both fold to I";
-  EXPECT_EQ(0, StringCaseCompare(L"\x17F", L"s"));
-  EXPECT_NE(0, StringExactCompare(lower, upper));
+  EXPECT_EQ(StringCaseCompare(lower, upper), 0);
+  EXPECT_EQ(StringCaseCompare(L"\x131", L"i"), 0) << "both fold to I";
+  EXPECT_EQ(StringCaseCompare(L"\x17F", L"s"), 0);
+  EXPECT_NE(StringExactCompare(lower, upper), 0);
 }
 
 TEST(StringCompare, RangesReturnLengthDifferences) {

@@ -25,45 +25,45 @@ uint32_t CountOf(const wchar_t* s) {
 
 TEST(SystemString, CountStandsInFrontOfTheText) {
   wchar_t* const s = SystemAllocStringLen(L"ab", 2);
-  EXPECT_EQ(2u, CountOf(s));
-  EXPECT_STREQ(L"ab", s);
+  EXPECT_EQ(CountOf(s), 2u);
+  EXPECT_STREQ(s, L"ab");
   DLLFree(reinterpret_cast<char*>(s) - 4);
 }
 
 TEST(SystemString, TakesForcedLengths) {
   wchar_t* const part = SystemAllocStringLen(L"abcdef", 3);
-  EXPECT_STREQ(L"abc", part);
+  EXPECT_STREQ(part, L"abc");
   SystemFreeString(part);
   wchar_t* const zeros = SystemAllocStringLen(L"a\0b", 3);
-  EXPECT_EQ(0, wmemcmp(zeros, L"a\0b", 4));
-  EXPECT_EQ(3u, CountOf(zeros));
+  EXPECT_EQ(wmemcmp(zeros, L"a\0b", 4), 0);
+  EXPECT_EQ(CountOf(zeros), 3u);
   SystemFreeString(zeros);
   wchar_t* const empty = SystemAllocStringLen(L"", 0);
-  EXPECT_STREQ(L"", empty);
+  EXPECT_STREQ(empty, L"");
   SystemFreeString(empty);
 }
 
 TEST(SystemString, NullTextLeavesRoomToFill) {
   wchar_t* const s = SystemAllocStringLen(nullptr, 5);
-  ASSERT_NE(nullptr, s);
-  EXPECT_EQ(5u, CountOf(s));
+  ASSERT_NE(s, nullptr);
+  EXPECT_EQ(CountOf(s), 5u);
   wmemset(s, L'x', 5);
-  EXPECT_STREQ(L"xxxxx", s);
+  EXPECT_STREQ(s, L"xxxxx");
   SystemFreeString(s);
 }
 
 TEST(SystemString, CopiesTerminatedText) {
   wchar_t* const s = SystemAllocString(L"text");
-  EXPECT_STREQ(L"text", s);
-  EXPECT_EQ(4u, CountOf(s));
+  EXPECT_STREQ(s, L"text");
+  EXPECT_EQ(CountOf(s), 4u);
   SystemFreeString(s);
-  EXPECT_EQ(nullptr, SystemAllocString(nullptr));
+  EXPECT_EQ(SystemAllocString(nullptr), nullptr);
   SystemFreeString(nullptr);
 }
 
 TEST(SystemString, SizesBeyond32BitsYieldNull) {
   for (const unsigned n : {0x3FFFFFFEu, 0x3FFFFFFFu, 0x40000000u, 0xFFFFFFFEu, 0xFFFFFFFFu}) {
-    EXPECT_EQ(nullptr, SystemAllocStringLen(nullptr, n)) << n;
+    EXPECT_EQ(SystemAllocStringLen(nullptr, n), nullptr) << n;
   }
 }
 
@@ -79,5 +79,5 @@ int AllocateWithoutMemory() {
 TEST(SystemString, MissingMemoryYieldsNull) {
   if (!vlt::test::kCanLimitMemory) GTEST_SKIP() << "the sanitizer owns the address space";
   vlt::test::Child child(AllocateWithoutMemory);
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }

@@ -45,22 +45,22 @@ TEST(pathTree, RemoveDirForceTakesHiddenEntriesAndLinksButNotTheirTargets) {
   std::string top = dir.makeDir("top");
   WriteBytes(dir.makeDir("top/sub/.deep") + "/f", "x");
   WriteBytes(top + "/.hidden", "x");
-  ASSERT_EQ(0, symlink("../keep", (top + "/link").c_str()));
-  ASSERT_EQ(0, symlink("nowhere", (top + "/dangling").c_str()));
-  ASSERT_EQ(0, mkfifo((top + "/fifo").c_str(), 0600));
+  ASSERT_EQ(symlink("../keep", (top + "/link").c_str()), 0);
+  ASSERT_EQ(symlink("nowhere", (top + "/dangling").c_str()), 0);
+  ASSERT_EQ(mkfifo((top + "/fifo").c_str(), 0600), 0);
   path::RemoveDirForce(Wide(top).c_str());
   EXPECT_FALSE(Exists(top));
-  EXPECT_EQ("kept", ReadBytes(dir / "keep/file"));
+  EXPECT_EQ(ReadBytes(dir / "keep/file"), "kept");
 }
 
 TEST(pathTree, RemoveDirForceOfALinkRemovesTheLinkOnlyWithOrWithoutSlash) {
   TempDir dir;
   WriteBytes(dir.makeDir("target") + "/file", "kept");
   for (const char* name : {"link", "link/", "link//"}) {
-    ASSERT_EQ(0, symlink("target", (dir / "link").c_str()));
+    ASSERT_EQ(symlink("target", (dir / "link").c_str()), 0);
     path::RemoveDirForce(Wide(dir / name).c_str());
     EXPECT_FALSE(Exists(dir / "link")) << name;
-    EXPECT_EQ("kept", ReadBytes(dir / "target/file")) << name;
+    EXPECT_EQ(ReadBytes(dir / "target/file"), "kept") << name;
   }
   path::RemoveDirForce(Wide(dir / "target/").c_str());
   EXPECT_FALSE(Exists(dir / "target"));
@@ -82,7 +82,7 @@ TEST(pathTree, RenameReplacesTheTarget) {
   WriteBytes(dir / "to", "old");
   ino_t inode = InodeOf(dir / "from");
   path::RenameFile(Wide(dir / "from"), Wide(dir / "to"));
-  EXPECT_EQ("new", ReadBytes(dir / "to"));
+  EXPECT_EQ(ReadBytes(dir / "to"), "new");
   EXPECT_EQ(inode, InodeOf(dir / "to"));
   EXPECT_FALSE(Exists(dir / "from"));
 }
@@ -101,10 +101,10 @@ TEST(pathTree, RenameFailures) {
   WriteBytes(dir / "file", "x");
   EXPECT_THROW(path::RenameFile(L"a", Wide(dir / "b")), exception::InvalidArgument);
   EXPECT_THROW(path::RenameFile(Wide(dir / "file"), L"b"), exception::InvalidArgument);
-  EXPECT_EQ(ENOENT, PosixErrorOf([&] { path::RenameFile(Wide(dir / "no"), Wide(dir / "x")); }));
+  EXPECT_EQ(PosixErrorOf([&] { path::RenameFile(Wide(dir / "no"), Wide(dir / "x")); }), ENOENT);
   dir.makeDir("d");
-  EXPECT_EQ(EISDIR, PosixErrorOf([&] { path::RenameFile(Wide(dir / "file"), Wide(dir / "d")); }));
-  EXPECT_EQ("x", ReadBytes(dir / "file"));
+  EXPECT_EQ(PosixErrorOf([&] { path::RenameFile(Wide(dir / "file"), Wide(dir / "d")); }), EISDIR);
+  EXPECT_EQ(ReadBytes(dir / "file"), "x");
 }
 
 constexpr const char* kOneFileSystem =
@@ -143,7 +143,7 @@ TEST(pathTree, RenameBetweenFileSystemsCopiesAndRemoves) {
   WriteBytes(other.path() + "/to", "old and to be replaced");
   path::RenameFile(Wide(dir / "from"), Wide(other.path() + "/to"));
   EXPECT_EQ(bytes, ReadBytes(other.path() + "/to"));
-  EXPECT_EQ(0600, ModeOf(other.path() + "/to"));
+  EXPECT_EQ(ModeOf(other.path() + "/to"), 0600);
   EXPECT_FALSE(Exists(dir / "from"));
 }
 
@@ -173,7 +173,7 @@ TEST(pathTree, RenameThatCannotRemoveTheSourceTakesTheCopyBack) {
         PosixErrorOf([&] { path::RenameFile(Wide(dir / "ro/from"), Wide(other.path() + "/to")); });
     return error == EACCES ? 0 : 2;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_TRUE(Exists(dir / "ro/from"));
   EXPECT_FALSE(Exists(other.path() + "/to"));
 }
@@ -188,8 +188,8 @@ TEST(pathTree, RenameBetweenFileSystemsKeepsTheSourceUntilTheCopyIsOnTheDisk) {
     auto rename = [&] { path::RenameFile(Wide(dir / "from"), Wide(other.path() + "/to")); };
     return PosixErrorOf(rename) == EIO ? 0 : 2;
   });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ("bytes", ReadBytes(dir / "from"));
+  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(ReadBytes(dir / "from"), "bytes");
   EXPECT_FALSE(Exists(other.path() + "/to"));
 }
 
@@ -203,9 +203,9 @@ TEST(pathTree, RenameToAFileSystemWithoutFsyncMovesTheFile) {
     path::RenameFile(Wide(dir / "from"), Wide(other.path() + "/to"));
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_FALSE(Exists(dir / "from"));
-  EXPECT_EQ("bytes", ReadBytes(other.path() + "/to"));
+  EXPECT_EQ(ReadBytes(other.path() + "/to"), "bytes");
 }
 
 TEST(pathTree, RenameOfALinkOntoItsTargetInAnotherFileSystemKeepsTheBytes) {
@@ -214,15 +214,15 @@ TEST(pathTree, RenameOfALinkOntoItsTargetInAnotherFileSystemKeepsTheBytes) {
   if (other.path().empty()) GTEST_SKIP() << kOneFileSystem;
   std::string target = other.path() + "/target";
   WriteBytes(target, "kept");
-  ASSERT_EQ(0, symlink(target.c_str(), (dir / "link").c_str()));
+  ASSERT_EQ(symlink(target.c_str(), (dir / "link").c_str()), 0);
   path::RenameFile(Wide(dir / "link"), Wide(target));
-  EXPECT_EQ("kept", ReadBytes(target));
+  EXPECT_EQ(ReadBytes(target), "kept");
   EXPECT_FALSE(Exists(dir / "link"));
   // The other way round the link is replaced by the bytes.
-  ASSERT_EQ(0, symlink(target.c_str(), (dir / "link").c_str()));
+  ASSERT_EQ(symlink(target.c_str(), (dir / "link").c_str()), 0);
   path::RenameFile(Wide(target), Wide(dir / "link"));
   EXPECT_FALSE(path::IsSymLink(Wide(dir / "link").c_str()));
-  EXPECT_EQ("kept", ReadBytes(dir / "link"));
+  EXPECT_EQ(ReadBytes(dir / "link"), "kept");
   EXPECT_FALSE(Exists(target));
 }
 
@@ -248,7 +248,7 @@ TEST(pathTree, RenameOfAFileOntoItselfThroughAnotherMountKeepsIt) {
       },
       &code);
   if (allowed == vlt::test::Allowed::No) GTEST_SKIP() << "NOT TESTED: no right to mount";
-  EXPECT_EQ(0, code);
+  EXPECT_EQ(code, 0);
 }
 
 TEST(pathTree, CpFileCopiesBytesIntoAPrivateFile) {
@@ -259,10 +259,10 @@ TEST(pathTree, CpFileCopiesBytesIntoAPrivateFile) {
   chmod((dir / "from").c_str(), 0644);
   path::CpFile(Wide(dir / "from"), Wide(dir / "to"), false);
   EXPECT_EQ(bytes, ReadBytes(dir / "to"));
-  EXPECT_EQ(0600, ModeOf(dir / "to"));
+  EXPECT_EQ(ModeOf(dir / "to"), 0600);
   WriteBytes(dir / "empty", "");
   path::CpFile(Wide(dir / "empty"), Wide(dir / "to2"), true);
-  EXPECT_EQ("", ReadBytes(dir / "to2"));
+  EXPECT_EQ(ReadBytes(dir / "to2"), "");
 }
 
 TEST(pathTree, CpFileOverwritesOnlyWhenTold) {
@@ -275,20 +275,20 @@ TEST(pathTree, CpFileOverwritesOnlyWhenTold) {
   // The check for an existing target comes before the one for the same file.
   EXPECT_THROW(path::CpFile(Wide(dir / "to"), Wide(dir / "to"), false),
                exception::FileAlreadyExists);
-  EXPECT_EQ("old, and longer", ReadBytes(dir / "to"));
+  EXPECT_EQ(ReadBytes(dir / "to"), "old, and longer");
   path::CpFile(Wide(dir / "from"), Wide(dir / "to"), true);
-  EXPECT_EQ("new", ReadBytes(dir / "to"));
-  EXPECT_EQ(0640, ModeOf(dir / "to"));
+  EXPECT_EQ(ReadBytes(dir / "to"), "new");
+  EXPECT_EQ(ModeOf(dir / "to"), 0640);
 }
 
 TEST(pathTree, CpFileOntoItselfUnderAnyNameKeepsTheBytes) {
   TempDir dir;
   WriteBytes(dir / "File", "kept");
-  ASSERT_EQ(0, link((dir / "File").c_str(), (dir / "hard").c_str()));
-  ASSERT_EQ(0, symlink("File", (dir / "soft").c_str()));
+  ASSERT_EQ(link((dir / "File").c_str(), (dir / "hard").c_str()), 0);
+  ASSERT_EQ(symlink("File", (dir / "soft").c_str()), 0);
   for (const char* name : {"File", "FILE", "./File", "hard", "soft"}) {
     path::CpFile(Wide(dir / "File"), Wide(dir / name), true);
-    EXPECT_EQ("kept", ReadBytes(dir / "File")) << name;
+    EXPECT_EQ(ReadBytes(dir / "File"), "kept") << name;
   }
   EXPECT_FALSE(Exists(dir / "FILE"));
 }
@@ -302,19 +302,19 @@ TEST(pathTree, CpFileFailures) {
   };
   EXPECT_THROW(path::CpFile(L"file", Wide(dir / "x"), true), exception::InvalidArgument);
   EXPECT_THROW(path::CpFile(Wide(dir / "file"), L"x", true), exception::InvalidArgument);
-  EXPECT_EQ(ENOENT, PosixErrorOf([&] { copy("missing", "file"); }));
-  EXPECT_EQ("x", ReadBytes(dir / "file"));  // not truncated for a source that is not there
-  EXPECT_EQ(EISDIR, PosixErrorOf([&] { copy("file", "d"); }));
-  EXPECT_EQ(EISDIR,
-            PosixErrorOf([&] { path::CpFile(Wide(dir / "file"), Wide(dir / "d"), false); }));
+  EXPECT_EQ(PosixErrorOf([&] { copy("missing", "file"); }), ENOENT);
+  EXPECT_EQ(ReadBytes(dir / "file"), "x");  // not truncated for a source that is not there
+  EXPECT_EQ(PosixErrorOf([&] { copy("file", "d"); }), EISDIR);
+  EXPECT_EQ(PosixErrorOf([&] { path::CpFile(Wide(dir / "file"), Wide(dir / "d"), false); }),
+            EISDIR);
   EXPECT_THROW(copy("d", "y"), exception::FileReadFailed);
-  EXPECT_EQ(ENOENT, PosixErrorOf([&] { copy("file", "no/y"); }));
+  EXPECT_EQ(PosixErrorOf([&] { copy("file", "no/y"); }), ENOENT);
 }
 
 TEST(pathTree, CpFileNeverWaitsForAPipe) {
   TempDir dir;
   WriteBytes(dir / "file", "x");
-  ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0600));
+  ASSERT_EQ(mkfifo((dir / "fifo").c_str(), 0600), 0);
   EXPECT_THROW(path::CpFile(Wide(dir / "fifo"), Wide(dir / "to"), true), exception::FileReadFailed);
   EXPECT_THROW(path::CpFile(Wide(dir / "file"), Wide(dir / "fifo"), true),
                exception::FileWriteFailed);
@@ -336,7 +336,7 @@ TEST(pathTree, CpFileThatCannotWriteAllFails) {
     }
     return 2;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_THROW(path::CpFile(Wide(dir / "file"), L"/dev/full", true), exception::FileWriteFailed);
 }
 
@@ -346,17 +346,17 @@ TEST(pathTree, CpDirCopiesATreeWithoutHiddenEntries) {
   WriteBytes(dir.makeDir("from/sub/deep") + "/b", "B");
   dir.makeDir("from/empty");
   WriteBytes(dir / "from/.hidden", "h");
-  ASSERT_EQ(0, symlink("sub", (dir / "from/link").c_str()));
+  ASSERT_EQ(symlink("sub", (dir / "from/link").c_str()), 0);
   WriteBytes(dir.makeDir("to") + "/a", "old");
   path::CpDir(Wide(dir / "from"), Wide(dir / "to"));
-  EXPECT_EQ("A", ReadBytes(dir / "to/a"));
-  EXPECT_EQ("B", ReadBytes(dir / "to/sub/deep/b"));
-  EXPECT_EQ("B", ReadBytes(dir / "to/link/deep/b"));  // links are followed
+  EXPECT_EQ(ReadBytes(dir / "to/a"), "A");
+  EXPECT_EQ(ReadBytes(dir / "to/sub/deep/b"), "B");
+  EXPECT_EQ(ReadBytes(dir / "to/link/deep/b"), "B");  // links are followed
   EXPECT_TRUE(path::IsDirectory(Wide(dir / "to/empty").c_str()));
   EXPECT_FALSE(Exists(dir / "to/.hidden"));
   path::CpDir(Wide(dir / "from/"), Wide(dir / "new/one/"));
-  EXPECT_EQ("A", ReadBytes(dir / "new/one/a"));
-  EXPECT_EQ(0700, ModeOf(dir / "new/one"));
+  EXPECT_EQ(ReadBytes(dir / "new/one/a"), "A");
+  EXPECT_EQ(ModeOf(dir / "new/one"), 0700);
 }
 
 TEST(pathTree, CpDirFailures) {
@@ -368,7 +368,7 @@ TEST(pathTree, CpDirFailures) {
                exception::NonexistentException);
   EXPECT_FALSE(Exists(dir / "to"));
   // Without a slash at the end only the directory above is made.
-  EXPECT_EQ(ENOENT, PosixErrorOf([&] { path::CpDir(Wide(dir / "from"), Wide(dir / "x/to")); }));
+  EXPECT_EQ(PosixErrorOf([&] { path::CpDir(Wide(dir / "from"), Wide(dir / "x/to")); }), ENOENT);
   EXPECT_TRUE(Exists(dir / "x"));
 }
 
@@ -376,9 +376,9 @@ TEST(pathTree, CpDirThroughALoopOfLinksEnds) {
   TempDir dir;
   dir.makeDir("from/sub");
   // Two loops in one directory would be walked some 2^40 times.
-  ASSERT_EQ(0, symlink("..", (dir / "from/sub/up").c_str()));
-  ASSERT_EQ(0, symlink(".", (dir / "from/sub/self").c_str()));
-  EXPECT_EQ(ELOOP, PosixErrorOf([&] { path::CpDir(Wide(dir / "from"), Wide(dir / "to/")); }));
+  ASSERT_EQ(symlink("..", (dir / "from/sub/up").c_str()), 0);
+  ASSERT_EQ(symlink(".", (dir / "from/sub/self").c_str()), 0);
+  EXPECT_EQ(PosixErrorOf([&] { path::CpDir(Wide(dir / "from"), Wide(dir / "to/")); }), ELOOP);
 }
 
 TEST(pathTree, CpDirIntoItselfDoesNotCopyTheCopy) {
@@ -386,7 +386,7 @@ TEST(pathTree, CpDirIntoItselfDoesNotCopyTheCopy) {
   WriteBytes(dir.makeDir("from") + "/a", "A");
   dir.makeDir("from/to");
   path::CpDir(Wide(dir / "from"), Wide(dir / "from/to"));
-  EXPECT_EQ("A", ReadBytes(dir / "from/to/a"));
+  EXPECT_EQ(ReadBytes(dir / "from/to/a"), "A");
   EXPECT_FALSE(Exists(dir / "from/to/to"));
 }
 

@@ -77,9 +77,9 @@ TEST(path, Join) {
 TEST(path, MakePathEndInSlash) {
   String text(L"/a");
   path::MakePathEndInSlash(text);
-  EXPECT_EQ("/a/", Narrow(text));
+  EXPECT_EQ(Narrow(text), "/a/");
   path::MakePathEndInSlash(text);
-  EXPECT_EQ("/a/", Narrow(text));
+  EXPECT_EQ(Narrow(text), "/a/");
   String empty;
   EXPECT_THROW(path::MakePathEndInSlash(empty), exception::InvalidArgument);
   EXPECT_TRUE(empty.empty());
@@ -108,7 +108,7 @@ TEST(path, NormalizeOfALongPathTakesLittleTime) {
   String text;
   for (int i = 0; i < 200000; ++i) text += L"/a/./b/..";
   String result = path::NormalizePath(text);
-  EXPECT_EQ(400000u, result.length());
+  EXPECT_EQ(result.length(), 400000u);
 }
 
 // ---- the working directory and temporary names
@@ -117,17 +117,17 @@ TEST(path, WorkingDirectory) {
   TempDir dir;
   String before = path::GetCWD();
   String left = path::SetCWD(Wide(dir.path()));
-  EXPECT_EQ(0, before.exactCompare(left));
+  EXPECT_EQ(before.exactCompare(left), 0);
   char real[4096];
-  ASSERT_NE(nullptr, realpath(dir.path().c_str(), real));
+  ASSERT_NE(realpath(dir.path().c_str(), real), nullptr);
   EXPECT_EQ(real, Narrow(path::GetCWD()));
   EXPECT_EQ(real, Narrow(path::AbsPath(L".")));
   EXPECT_EQ(std::string(real) + "/x/y", Narrow(path::AbsPath(L"x/y")));
-  EXPECT_EQ("/abs", Narrow(path::AbsPath(L"/abs")));
+  EXPECT_EQ(Narrow(path::AbsPath(L"/abs")), "/abs");
   // A relative directory exists below the working directory, and still is none.
   mkdir((dir / "relative").c_str(), 0700);
   EXPECT_FALSE(path::IsDirectory(L"relative"));
-  EXPECT_EQ(ENOENT, PosixErrorOf([&] { path::SetCWD(Wide(dir / "missing")); }));
+  EXPECT_EQ(PosixErrorOf([&] { path::SetCWD(Wide(dir / "missing")); }), ENOENT);
   EXPECT_EQ(real, Narrow(path::GetCWD()));
   path::SetCWD(before);
 }
@@ -139,17 +139,17 @@ TEST(path, WorkingDirectoryThatIsGoneIsAnError) {
     if (chdir(gone.c_str()) != 0 || rmdir(gone.c_str()) != 0) return 1;
     return PosixErrorOf([] { path::GetCWD(); }) == ENOENT ? 0 : 2;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
 }
 
 TEST(path, TempDirNameIsTheEnvironmentsOrTheDefault) {
   std::string kept = getenv("TMPDIR");
   setenv("TMPDIR", "/some/where", 1);
-  EXPECT_EQ("/some/where", Narrow(path::TempDirName()));
+  EXPECT_EQ(Narrow(path::TempDirName()), "/some/where");
   setenv("TMPDIR", "", 1);
-  EXPECT_EQ("", Narrow(path::TempDirName()));
+  EXPECT_EQ(Narrow(path::TempDirName()), "");
   unsetenv("TMPDIR");
-  EXPECT_EQ("/var/tmp/", Narrow(path::TempDirName()));
+  EXPECT_EQ(Narrow(path::TempDirName()), "/var/tmp/");
   setenv("TMPDIR", kept.c_str(), 1);
 }
 
@@ -158,7 +158,7 @@ TEST(path, TempFileNameIsFreeAndNothingIsMade) {
   std::string kept = getenv("TMPDIR");
   setenv("TMPDIR", dir.path().c_str(), 1);
   std::string name = Narrow(path::TempFileName(L"pre", String()));
-  EXPECT_EQ(0u, name.find(dir / "pre")) << name;
+  EXPECT_EQ(name.find(dir / "pre"), 0u) << name;
   EXPECT_FALSE(Exists(name));
   EXPECT_THROW(path::TempFileName(String(), String()), exception::InvalidArgument);
   EXPECT_THROW(path::TempFileName(L"p", L"relative"), exception::InvalidArgument);
@@ -168,7 +168,7 @@ TEST(path, TempFileNameIsFreeAndNothingIsMade) {
   // Without the variable the directory given counts.
   unsetenv("TMPDIR");
   name = Narrow(path::TempFileName(L"pre", Wide(dir.path())));
-  EXPECT_EQ(0u, name.find(dir / "pre")) << name;
+  EXPECT_EQ(name.find(dir / "pre"), 0u) << name;
   setenv("TMPDIR", kept.c_str(), 1);
 }
 
@@ -177,8 +177,8 @@ TEST(path, TempFileNameIsFreeAndNothingIsMade) {
 TEST(path, IsDirectoryAndIsSymLinkNeverThrow) {
   TempDir dir;
   vlt::test::WriteBytes(dir / "file", "x");
-  ASSERT_EQ(0, symlink(dir.path().c_str(), (dir / "link").c_str()));
-  ASSERT_EQ(0, symlink("nowhere", (dir / "dangling").c_str()));
+  ASSERT_EQ(symlink(dir.path().c_str(), (dir / "link").c_str()), 0);
+  ASSERT_EQ(symlink("nowhere", (dir / "dangling").c_str()), 0);
   EXPECT_TRUE(path::IsDirectory(Wide(dir.path()).c_str()));
   EXPECT_TRUE(path::IsDirectory(Wide(dir / "link").c_str()));
   for (const char* no : {"file", "file/x", "dangling", "missing"}) {
@@ -199,9 +199,9 @@ TEST(path, IsDirectoryAndIsSymLinkNeverThrow) {
 TEST(path, DoesFileExistIsTrueForRegularFilesOnly) {
   TempDir dir;
   vlt::test::WriteBytes(dir / "file", "x");
-  ASSERT_EQ(0, symlink("file", (dir / "link").c_str()));
-  ASSERT_EQ(0, symlink("nowhere", (dir / "dangling").c_str()));
-  ASSERT_EQ(0, mkfifo((dir / "fifo").c_str(), 0600));
+  ASSERT_EQ(symlink("file", (dir / "link").c_str()), 0);
+  ASSERT_EQ(symlink("nowhere", (dir / "dangling").c_str()), 0);
+  ASSERT_EQ(mkfifo((dir / "fifo").c_str(), 0600), 0);
   EXPECT_TRUE(path::DoesFileExist(Wide(dir / "file")));
   EXPECT_TRUE(path::DoesFileExist(Wide(dir / "link")));
   for (const std::string& no : {dir.path(), dir / "dangling", dir / "fifo", dir / "missing"}) {
@@ -209,9 +209,9 @@ TEST(path, DoesFileExistIsTrueForRegularFilesOnly) {
   }
   EXPECT_THROW(path::DoesFileExist(L"file"), exception::InvalidArgument);
   EXPECT_THROW(path::DoesFileExist(String()), exception::InvalidArgument);
-  EXPECT_EQ(ENOTDIR, PosixErrorOf([&] { path::DoesFileExist(Wide(dir / "file/x")); }));
-  EXPECT_EQ(ENAMETOOLONG,
-            PosixErrorOf([&] { path::DoesFileExist(Wide(dir / std::string(300, 'x'))); }));
+  EXPECT_EQ(PosixErrorOf([&] { path::DoesFileExist(Wide(dir / "file/x")); }), ENOTDIR);
+  EXPECT_EQ(PosixErrorOf([&] { path::DoesFileExist(Wide(dir / std::string(300, 'x'))); }),
+            ENAMETOOLONG);
 }
 
 // ---- making directories
@@ -219,20 +219,20 @@ TEST(path, DoesFileExistIsTrueForRegularFilesOnly) {
 TEST(path, CreateDirMakesTheDirectoriesOfAFilesPath) {
   TempDir dir;
   path::CreateDir(Wide(dir / "a/b/c").c_str());
-  EXPECT_EQ(0700, ModeOf(dir / "a"));
-  EXPECT_EQ(0700, ModeOf(dir / "a/b"));
+  EXPECT_EQ(ModeOf(dir / "a"), 0700);
+  EXPECT_EQ(ModeOf(dir / "a/b"), 0700);
   EXPECT_FALSE(Exists(dir / "a/b/c"));
   path::CreateDir(Wide(dir / "a/b/c/").c_str());
-  EXPECT_EQ(0700, ModeOf(dir / "a/b/c"));
+  EXPECT_EQ(ModeOf(dir / "a/b/c"), 0700);
 }
 
 TEST(path, CreateDirOnAnExistingDirectoryChangesNothing) {
   TempDir dir;
-  ASSERT_EQ(0, mkdir((dir / "x").c_str(), 0711));
-  ASSERT_EQ(0, chmod((dir / "x").c_str(), 0711));
+  ASSERT_EQ(mkdir((dir / "x").c_str(), 0711), 0);
+  ASSERT_EQ(chmod((dir / "x").c_str(), 0711), 0);
   path::CreateDir(Wide(dir / "x/").c_str());
   path::CreateDir(Wide(dir / "x/").c_str(), 0777);
-  EXPECT_EQ(0711, ModeOf(dir / "x"));
+  EXPECT_EQ(ModeOf(dir / "x"), 0711);
   path::CreateDir(L"/x");
   EXPECT_FALSE(Exists("/x"));
 }
@@ -247,11 +247,11 @@ TEST(path, CreateDirWithAModeWinsAgainstTheUmask) {
     path::CreateDir(Wide(dir / "odd/").c_str(), 0x10000 + 01750);
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
-  for (const char* name : {"a", "a/b", "a/b/c"}) EXPECT_EQ(0777, ModeOf(dir / name)) << name;
-  EXPECT_EQ(0700, ModeOf(dir / "plain"));
-  EXPECT_EQ(0700, ModeOf(dir / "plain/x"));
-  EXPECT_EQ(01750, ModeOf(dir / "odd"));  // 16 bits of the mode count
+  EXPECT_EQ(child.wait(), 0);
+  for (const char* name : {"a", "a/b", "a/b/c"}) EXPECT_EQ(ModeOf(dir / name), 0777) << name;
+  EXPECT_EQ(ModeOf(dir / "plain"), 0700);
+  EXPECT_EQ(ModeOf(dir / "plain/x"), 0700);
+  EXPECT_EQ(ModeOf(dir / "odd"), 01750);  // 16 bits of the mode count
 }
 
 TEST(path, CreateDirWithoutAModeObeysTheUmask) {
@@ -261,8 +261,8 @@ TEST(path, CreateDirWithoutAModeObeysTheUmask) {
     path::CreateDir(Wide(dir / "a/").c_str());
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ(0400, ModeOf(dir / "a"));
+  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(ModeOf(dir / "a"), 0400);
 }
 
 TEST(path, CreateDirDemandsAnAbsolutePath) {
@@ -275,19 +275,20 @@ TEST(path, CreateDirDemandsAnAbsolutePath) {
 TEST(path, CreateDirThroughAFileIsRefusedByTheFailingPart) {
   TempDir dir;
   vlt::test::WriteBytes(dir / "file", "x");
-  ASSERT_EQ(0, symlink("nowhere", (dir / "dangling").c_str()));
+  ASSERT_EQ(symlink("nowhere", (dir / "dangling").c_str()), 0);
   EXPECT_THROW(path::CreateDir(Wide(dir / "file/").c_str()), exception::ObjectAlreadyExists);
   EXPECT_THROW(path::CreateDir(Wide(dir / "file/x/").c_str()), exception::ObjectAlreadyExists);
   EXPECT_THROW(path::CreateDir(Wide(dir / "dangling/").c_str()), exception::ObjectAlreadyExists);
-  EXPECT_EQ("x", vlt::test::ReadBytes(dir / "file"));
+  EXPECT_EQ(vlt::test::ReadBytes(dir / "file"), "x");
   std::string longName(300, 'x');
   EXPECT_EQ("Access denied: " + (dir / "a/" + longName), AccessDeniedTextOf([&] {
               path::CreateDir(Wide(dir / "a/" + longName + "/y/").c_str());
             }));
   EXPECT_TRUE(Exists(dir / "a"));  // made before the failing one
-  EXPECT_EQ("Access denied: /proc/nothing", AccessDeniedTextOf([] {
+  EXPECT_EQ(AccessDeniedTextOf([] {
               path::CreateDir(L"/proc/nothing/here/");  // ENOENT is nothing special
-            }));
+            }),
+            "Access denied: /proc/nothing");
 }
 
 TEST(path, CreateDirWhoseModeCannotBeSetTakesTheDirectoryAway) {
@@ -298,7 +299,7 @@ TEST(path, CreateDirWhoseModeCannotBeSetTakesTheDirectoryAway) {
         AccessDeniedTextOf([&] { path::CreateDir(Wide(dir / "a/b/").c_str(), 0777); });
     return text == "Access denied: " + (dir / "a") ? 0 : 2;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_FALSE(Exists(dir / "a"));
 }
 
@@ -309,10 +310,10 @@ TEST(path, RemoveFile) {
   vlt::test::WriteBytes(dir / "file", "x");
   path::RemoveFile(Wide(dir / "file"));
   EXPECT_FALSE(Exists(dir / "file"));
-  EXPECT_EQ(ENOENT, PosixErrorOf([&] { path::RemoveFile(Wide(dir / "file").c_str()); }));
+  EXPECT_EQ(PosixErrorOf([&] { path::RemoveFile(Wide(dir / "file").c_str()); }), ENOENT);
   EXPECT_THROW(path::RemoveFile(L"file"), exception::InvalidArgument);
   EXPECT_THROW(path::RemoveFile(static_cast<const wchar_t*>(nullptr)), exception::InvalidArgument);
-  ASSERT_EQ(0, symlink(dir.path().c_str(), (dir / "link").c_str()));
+  ASSERT_EQ(symlink(dir.path().c_str(), (dir / "link").c_str()), 0);
   path::RemoveFile(Wide(dir / "link"));
   EXPECT_FALSE(Exists(dir / "link"));
 }
@@ -321,7 +322,7 @@ TEST(path, RemoveDir) {
   TempDir dir;
   vlt::test::WriteBytes(dir.makeDir("full") + "/file", "x");
   dir.makeDir("empty");
-  ASSERT_EQ(0, symlink("full", (dir / "link").c_str()));
+  ASSERT_EQ(symlink("full", (dir / "link").c_str()), 0);
   path::RemoveDir(Wide(dir / "empty").c_str());
   EXPECT_FALSE(Exists(dir / "empty"));
   EXPECT_EQ("Access denied: " + (dir / "full"),
@@ -340,15 +341,15 @@ TEST(path, RemoveDir) {
 TEST(path, CreateAndResolveSymLink) {
   TempDir dir;
   path::CreateSymLink(Wide(dir / "link"), L"some/../target");
-  EXPECT_EQ("some/../target", Narrow(path::ResolveSymLink(Wide(dir / "link"))));
-  EXPECT_EQ(EEXIST, PosixErrorOf([&] { path::CreateSymLink(Wide(dir / "link"), L"other"); }));
-  EXPECT_EQ("some/../target", Narrow(path::ResolveSymLink(Wide(dir / "link"))));
+  EXPECT_EQ(Narrow(path::ResolveSymLink(Wide(dir / "link"))), "some/../target");
+  EXPECT_EQ(PosixErrorOf([&] { path::CreateSymLink(Wide(dir / "link"), L"other"); }), EEXIST);
+  EXPECT_EQ(Narrow(path::ResolveSymLink(Wide(dir / "link"))), "some/../target");
   vlt::test::WriteBytes(dir / "file", "x");
   EXPECT_THROW(path::ResolveSymLink(Wide(dir / "file")), exception::InvalidArgument);
   EXPECT_THROW(path::ResolveSymLink(Wide(dir / "missing")), exception::InvalidArgument);
   EXPECT_THROW(path::ResolveSymLink(L"link"), exception::InvalidArgument);
   // Links of the process file system tell no length.
-  EXPECT_EQ(EINVAL, PosixErrorOf([] { path::ResolveSymLink(L"/proc/self/exe"); }));
+  EXPECT_EQ(PosixErrorOf([] { path::ResolveSymLink(L"/proc/self/exe"); }), EINVAL);
 }
 
 }  // namespace

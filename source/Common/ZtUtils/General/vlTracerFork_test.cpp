@@ -63,7 +63,7 @@ TEST(vlTracerFork, ChildrenOfTracingThreadsTrace) {
   std::ifstream log(LogIn(dir / "logs"));
   std::string first, second;
   while (std::getline(log, first)) {
-    ASSERT_EQ("> busy", first);
+    ASSERT_EQ(first, "> busy");
     ASSERT_TRUE(std::getline(log, second));
     ASSERT_TRUE(second.starts_with("  Thread = 0x")) << second;
   }
@@ -139,16 +139,17 @@ TEST_IN_CHILD(vlTracerForkDescriptor, ClosedOneIsOpenedAgain) {
 // What such a host prints later goes to what it opens as its output, or nowhere.
 TEST(vlTracerForkDescriptor, IsNoneOfTheStandardStreams) {
   TempDir dir;
-  EXPECT_EQ(0, Child([&] {
-                 for (int fd = 0; fd <= 2; ++fd) close(fd);
-                 Start(dir.makeDir("logs"));
-                 Say("one");
-                 std::string log = LogIn(dir / "logs");
-                 int number = DescriptorOf(log);
-                 if (number <= 2) return 1;
-                 if ((fcntl(number, F_GETFD) & FD_CLOEXEC) == 0) return 2;
-                 return ReadBytes(log) == "  one\n" ? 0 : 3;
-               }).wait());
+  EXPECT_EQ(Child([&] {
+              for (int fd = 0; fd <= 2; ++fd) close(fd);
+              Start(dir.makeDir("logs"));
+              Say("one");
+              std::string log = LogIn(dir / "logs");
+              int number = DescriptorOf(log);
+              if (number <= 2) return 1;
+              if ((fcntl(number, F_GETFD) & FD_CLOEXEC) == 0) return 2;
+              return ReadBytes(log) == "  one\n" ? 0 : 3;
+            }).wait(),
+            0);
 }
 
 }  // namespace

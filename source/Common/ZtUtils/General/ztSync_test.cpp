@@ -60,9 +60,9 @@ TEST(ztSync, LocksAndUnlocksThroughTheBase) {
   Described object;
   CztSyncObject& lock = object;
   EXPECT_TRUE(lock.Lock(-1));
-  EXPECT_EQ(1, object.locks);
+  EXPECT_EQ(object.locks, 1);
   EXPECT_TRUE(lock.Unlock());
-  EXPECT_EQ(0, object.locks);
+  EXPECT_EQ(object.locks, 0);
 }
 
 // ---- CztCS
@@ -98,7 +98,7 @@ TEST(ztSyncMutex, NullAndEmptyNamesAreOneAcrossProcesses) {
   });
   ASSERT_TRUE(Eventually([&] { return WaitsForFile(other); }));
   null.Unlock();
-  EXPECT_EQ(0, other.wait());
+  EXPECT_EQ(other.wait(), 0);
   named.Lock(-1);
   Child another([] {
     CztMutex mutex(nullptr, true);
@@ -106,7 +106,7 @@ TEST(ztSyncMutex, NullAndEmptyNamesAreOneAcrossProcesses) {
   });
   ASSERT_TRUE(Eventually([&] { return WaitsForFile(another); }));
   named.Unlock();
-  EXPECT_EQ(0, another.wait());
+  EXPECT_EQ(another.wait(), 0);
 }
 
 TEST(ztSyncMutex, LockOfZeroBlocks) {
@@ -115,7 +115,7 @@ TEST(ztSyncMutex, LockOfZeroBlocks) {
   Child other([] { return CztMutex(L"name", false).Lock(0) ? 0 : 1; });
   ASSERT_TRUE(Eventually([&] { return WaitsForFile(other); }));
   EXPECT_TRUE(mutex.Unlock());
-  EXPECT_EQ(0, other.wait());
+  EXPECT_EQ(other.wait(), 0);
 }
 
 TEST(ztSyncMutex, InitiallyOwnedAndRecursive) {
@@ -126,13 +126,13 @@ TEST(ztSyncMutex, InitiallyOwnedAndRecursive) {
   Child other([] { return CztMutex(L"name", true).Unlock() ? 0 : 1; });
   ASSERT_TRUE(Eventually([&] { return WaitsForFile(other); }));
   EXPECT_TRUE(mutex.Unlock());
-  EXPECT_EQ(0, other.wait());
+  EXPECT_EQ(other.wait(), 0);
 }
 
 TEST(ztSyncMutex, FailureOfThePrimitivePassesThrough) {
   EventPlace place;
   const std::string name(256, 'n');
-  EXPECT_EQ(ENAMETOOLONG, PosixErrorOf([&] { CztMutex m(String(name.c_str()).c_str(), true); }));
+  EXPECT_EQ(PosixErrorOf([&] { CztMutex m(String(name.c_str()).c_str(), true); }), ENAMETOOLONG);
 }
 
 // ---- CztEvent
@@ -193,10 +193,10 @@ TEST(ztSyncEvent, OtherNegativeTimeoutsAreLongOnes) {
 
 TEST(ztSyncSemaphore, ReleaseClampsToTheMaximumAndTellsTheOldCount) {
   CztSemaphore semaphore(L"name", 2, 1);
-  EXPECT_EQ(1, semaphore.Release(5));
-  EXPECT_EQ(2, semaphore.Release(0));
-  EXPECT_EQ(2, semaphore.Release(std::numeric_limits<int>::max()));
-  EXPECT_EQ(2, semaphore.Release(1));
+  EXPECT_EQ(semaphore.Release(5), 1);
+  EXPECT_EQ(semaphore.Release(0), 2);
+  EXPECT_EQ(semaphore.Release(std::numeric_limits<int>::max()), 2);
+  EXPECT_EQ(semaphore.Release(1), 2);
 }
 
 TEST(ztSyncSemaphore, FullFromTheBeginDoesNotWait) {
@@ -205,7 +205,7 @@ TEST(ztSyncSemaphore, FullFromTheBeginDoesNotWait) {
   EXPECT_TRUE(semaphore.Lock(20000));
   EXPECT_TRUE(semaphore.Lock(-1));
   EXPECT_LT(MsSince(begin), 15000);
-  EXPECT_EQ(0, semaphore.Release(0));
+  EXPECT_EQ(semaphore.Release(0), 0);
 }
 
 TEST(ztSyncSemaphore, TimeoutLimitsEachWaitAndNotTheCall) {
@@ -221,7 +221,7 @@ TEST(ztSyncSemaphore, TimeoutLimitsEachWaitAndNotTheCall) {
   EXPECT_FALSE(got);
   EXPECT_TRUE(semaphore.Unlock());
   waiter.join();
-  EXPECT_EQ(0, semaphore.Release(0));
+  EXPECT_EQ(semaphore.Release(0), 0);
 }
 
 // A wait of no time at all, again and again, would keep a processor busy.
@@ -231,7 +231,7 @@ TEST(ztSyncSemaphore, TimeoutOfNothingSleepsUntilThereIsAUnit) {
   EXPECT_TRUE(waiter.blocksInLock());
   EXPECT_TRUE(semaphore.Unlock());
   waiter.join();
-  EXPECT_EQ(0, semaphore.Release(0));
+  EXPECT_EQ(semaphore.Release(0), 0);
 }
 
 TEST(ztSyncSemaphore, ReleaseWakesAsManyAsThereAreUnits) {
@@ -245,17 +245,17 @@ TEST(ztSyncSemaphore, ReleaseWakesAsManyAsThereAreUnits) {
     }));
     EXPECT_TRUE(waiters.back()->blocksInLock());
   }
-  EXPECT_EQ(0, semaphore.Release(3));
+  EXPECT_EQ(semaphore.Release(3), 0);
   auto running = [&] {
     return std::ranges::count_if(waiters, [](auto& waiter) { return !waiter->done(); });
   };
   EXPECT_TRUE(Eventually([&] { return running() == 1; }));
-  EXPECT_EQ(3, got);
+  EXPECT_EQ(got, 3);
   for (auto& waiter : waiters) EXPECT_TRUE(waiter->done() || waiter->blocksInLock());
-  EXPECT_EQ(0, semaphore.Release(1));
+  EXPECT_EQ(semaphore.Release(1), 0);
   for (auto& waiter : waiters) waiter->join();
-  EXPECT_EQ(4, got);
-  EXPECT_EQ(0, semaphore.Release(0));
+  EXPECT_EQ(got, 4);
+  EXPECT_EQ(semaphore.Release(0), 0);
 }
 
 // A set event with nothing to take would keep the waiter awake.
@@ -269,7 +269,7 @@ TEST(ztSyncSemaphore, ReleaseOfNothingLeavesWaitersAsleep) {
     semaphore.Lock(-1);
   });
   clockid_t id = clock.get_future().get();
-  EXPECT_EQ(0, semaphore.Release(0));
+  EXPECT_EQ(semaphore.Release(0), 0);
   // Time is the subject here: how much of the processor's the waiter uses of it.
   std::this_thread::sleep_for(std::chrono::milliseconds(200));
   timespec used;
@@ -281,12 +281,12 @@ TEST(ztSyncSemaphore, ReleaseOfNothingLeavesWaitersAsleep) {
 
 TEST(ztSyncSemaphore, NegativeReleasesAreDebts) {
   CztSemaphore semaphore(L"name", 5, 1);
-  EXPECT_EQ(1, semaphore.Release(-3));
-  EXPECT_EQ(-2, semaphore.Release(std::numeric_limits<int>::min()));
+  EXPECT_EQ(semaphore.Release(-3), 1);
+  EXPECT_EQ(semaphore.Release(std::numeric_limits<int>::min()), -2);
   EXPECT_EQ(std::numeric_limits<int>::min(), semaphore.Release(std::numeric_limits<int>::max()));
-  EXPECT_EQ(-1, semaphore.Release(2));
+  EXPECT_EQ(semaphore.Release(2), -1);
   EXPECT_TRUE(semaphore.Lock(-1));
-  EXPECT_EQ(0, semaphore.Release(0));
+  EXPECT_EQ(semaphore.Release(0), 0);
 }
 
 TEST(ztSyncSemaphore, UnitsAreNeitherLostNorMade) {
@@ -308,7 +308,7 @@ TEST(ztSyncSemaphore, UnitsAreNeitherLostNorMade) {
   }
   for (auto& thread : threads) thread.join();
   EXPECT_LE(most, 3);
-  EXPECT_EQ(3, semaphore.Release(0));
+  EXPECT_EQ(semaphore.Release(0), 3);
 }
 
 // ---- CztStatefulMutex
@@ -344,7 +344,7 @@ TEST(ztSyncStatefulMutex, LockWithoutStateLeavesTheEventAlone) {
   EXPECT_TRUE(mutex.LockAndSetState(false, 1));
   EXPECT_FALSE(event.checkOnly());
   Child other([] { return CztStatefulMutex(L"name").LockAndSetState(true, 0) ? 1 : 0; });
-  EXPECT_EQ(0, other.wait());
+  EXPECT_EQ(other.wait(), 0);
   EXPECT_FALSE(event.checkOnly());
   event.set();
   EXPECT_TRUE(mutex.UnlockAndResetState(false));
@@ -360,10 +360,10 @@ TEST(ztSyncStatefulMutex, WaitOfZeroTries) {
     if (mine.LockAndSetState(true, 0)) return 1;
     return mine.Lock(0) ? 2 : 0;
   });
-  EXPECT_EQ(0, other.wait());
+  EXPECT_EQ(other.wait(), 0);
   EXPECT_TRUE(mutex.Unlock());
   Child next([] { return CztStatefulMutex(L"name").Lock(0) ? 0 : 1; });
-  EXPECT_EQ(0, next.wait());
+  EXPECT_EQ(next.wait(), 0);
 }
 
 TEST(ztSyncStatefulMutex, AnyOtherWaitIsWithoutLimit) {
@@ -374,7 +374,7 @@ TEST(ztSyncStatefulMutex, AnyOtherWaitIsWithoutLimit) {
   ASSERT_TRUE(Eventually([&] { return WaitsForFile(other); }));  // the kernel knows of no time
   EXPECT_TRUE(other.running());
   mutex.Unlock();
-  EXPECT_EQ(0, other.wait());
+  EXPECT_EQ(other.wait(), 0);
 }
 
 TEST(ztSyncStatefulMutex, HolderThatDiesLeavesTheLockFreeAndTheEventSet) {
@@ -406,12 +406,12 @@ TEST(ztSyncStatefulMutex, EventThatFailsLeavesNoLockBehind) {
            }).wait() == 0;
   };
   mutex.LockAndSetState(true, 1);
-  ASSERT_EQ(0, semctl(place.setOf(1), 0, IPC_RMID));
-  EXPECT_EQ(EINVAL, PosixErrorOf([&] { mutex.UnlockAndResetState(true); }));
+  ASSERT_EQ(semctl(place.setOf(1), 0, IPC_RMID), 0);
+  EXPECT_EQ(PosixErrorOf([&] { mutex.UnlockAndResetState(true); }), EINVAL);
   EXPECT_TRUE(freeElsewhere());
-  EXPECT_EQ(EINVAL, PosixErrorOf([&] { mutex.LockAndSetState(true, 1); }));
+  EXPECT_EQ(PosixErrorOf([&] { mutex.LockAndSetState(true, 1); }), EINVAL);
   EXPECT_TRUE(freeElsewhere());
-  EXPECT_EQ(EINVAL, PosixErrorOf([&] { mutex.LockAndSetState(true, 0); }));
+  EXPECT_EQ(PosixErrorOf([&] { mutex.LockAndSetState(true, 0); }), EINVAL);
   EXPECT_TRUE(freeElsewhere());
   EXPECT_TRUE(mutex.LockAndSetState(false, 1));
   EXPECT_TRUE(mutex.UnlockAndResetState(false));
@@ -424,7 +424,7 @@ TEST(ztSyncStatefulMutex, ConstructorThatFailsCleansUp) {
   // The mutex can be made, the event not: its name is one of the other kind.
   NamedEvent taken(L"name-event", false, false);
   int with = vlt::test::OpenDescriptors();
-  EXPECT_EQ(EINVAL, PosixErrorOf([] { CztStatefulMutex mutex(L"name"); }));
+  EXPECT_EQ(PosixErrorOf([] { CztStatefulMutex mutex(L"name"); }), EINVAL);
   EXPECT_EQ(with, vlt::test::OpenDescriptors());
   EXPECT_GT(with, descriptors);
 }

@@ -19,18 +19,18 @@ std::string Hex(const Bytes& bytes) {
 }
 
 TEST(EventStateFile, LockFileIsAZeroByteSetAndSlot) {
-  EXPECT_EQ("000100000005000000", Hex(EventPlace{1, 5}.encode()));
-  EXPECT_EQ("0000286bee7f000000", Hex(EventPlace{4000000000u, 127}.encode()));
+  EXPECT_EQ(Hex(EventPlace{1, 5}.encode()), "000100000005000000");
+  EXPECT_EQ(Hex(EventPlace{4000000000u, 127}.encode()), "0000286bee7f000000");
   EventPlace place = EventPlace::Decode(EventPlace{4000000000u, 0xFFFFFFFFu}.encode());
-  EXPECT_EQ(4000000000u, place.set);
-  EXPECT_EQ(0xFFFFFFFFu, place.slot);
+  EXPECT_EQ(place.set, 4000000000u);
+  EXPECT_EQ(place.slot, 0xFFFFFFFFu);
 }
 
 TEST(EventStateFile, ReservedByteOfALockFileIsNotRead) {
   EventPlace::Bytes bytes = EventPlace{2, 3}.encode();
   bytes[0] = 0xAA;
-  EXPECT_EQ(2u, EventPlace::Decode(bytes).set);
-  EXPECT_EQ(3u, EventPlace::Decode(bytes).slot);
+  EXPECT_EQ(EventPlace::Decode(bytes).set, 2u);
+  EXPECT_EQ(EventPlace::Decode(bytes).slot, 3u);
 }
 
 TEST(EventStateFile, HeaderBytes) {
@@ -39,17 +39,16 @@ TEST(EventStateFile, HeaderBytes) {
   header.count = 128;
   header.freeCount = 127;
   header.firstFree = 0xFFFFFFFFu;
-  EXPECT_EQ(
-      "315ee315000180000000"
-      "7f000000"
-      "ffffffff",
-      Hex(header.encode()));
+  EXPECT_EQ(Hex(header.encode()),
+            "315ee315000180000000"
+            "7f000000"
+            "ffffffff");
   SetHeader back;
   ASSERT_TRUE(back.decode(header.encode()));
   EXPECT_TRUE(back.ready);
-  EXPECT_EQ(128u, back.count);
-  EXPECT_EQ(127u, back.freeCount);
-  EXPECT_EQ(0xFFFFFFFFu, back.firstFree);
+  EXPECT_EQ(back.count, 128u);
+  EXPECT_EQ(back.freeCount, 127u);
+  EXPECT_EQ(back.firstFree, 0xFFFFFFFFu);
 }
 
 TEST(EventStateFile, WrongMagicClearsAllFields) {
@@ -60,7 +59,7 @@ TEST(EventStateFile, WrongMagicClearsAllFields) {
   bytes[3] ^= 1;
   EXPECT_FALSE(header.decode(bytes));
   EXPECT_FALSE(header.ready);
-  EXPECT_EQ(0u, header.count + header.freeCount + header.firstFree);
+  EXPECT_EQ(header.count + header.freeCount + header.firstFree, 0u);
 }
 
 TEST(EventStateFile, OnlyOneIsReady) {
@@ -74,18 +73,15 @@ TEST(EventStateFile, OnlyOneIsReady) {
 }
 
 TEST(EventStateFile, SlotRecordsWidenWithTheSign) {
-  EXPECT_EQ(
-      "0101"
-      "4d3c020100000000",
-      Hex(SlotRecord{true, true, 0x01023C4D}.encode()));
-  EXPECT_EQ(
-      "0100"
-      "ffffffffffffffff",
-      Hex(SlotRecord{true, false, -1}.encode()));
-  EXPECT_EQ(
-      "0000"
-      "01000080ffffffff",
-      Hex(SlotRecord{false, false, INT32_MIN + 1}.encode()));
+  EXPECT_EQ(Hex(SlotRecord{true, true, 0x01023C4D}.encode()),
+            "0101"
+            "4d3c020100000000");
+  EXPECT_EQ(Hex(SlotRecord{true, false, -1}.encode()),
+            "0100"
+            "ffffffffffffffff");
+  EXPECT_EQ(Hex(SlotRecord{false, false, INT32_MIN + 1}.encode()),
+            "0000"
+            "01000080ffffffff");
 }
 
 TEST(EventStateFile, OnlyTheLowHalfOfALinkIsRead) {
@@ -94,21 +90,20 @@ TEST(EventStateFile, OnlyTheLowHalfOfALinkIsRead) {
   SlotRecord record = SlotRecord::Decode(bytes);
   EXPECT_TRUE(record.inUse);
   EXPECT_TRUE(record.manualReset);
-  EXPECT_EQ(0x01023C4D, record.keyOrNext);
+  EXPECT_EQ(record.keyOrNext, 0x01023C4D);
 }
 
 TEST(EventStateFile, EmptySetIsAListOfAllSlots) {
   StateFileBytes bytes = EncodeEmptySet();
-  ASSERT_EQ(1298u, bytes.size());
+  ASSERT_EQ(bytes.size(), 1298u);
   std::string hex = Hex(bytes);
-  EXPECT_EQ(
-      "315ee315"
-      "00"
-      "00"
-      "80000000"
-      "80000000"
-      "00000000",
-      hex.substr(0, 36));
+  EXPECT_EQ(hex.substr(0, 36),
+            "315ee315"
+            "00"
+            "00"
+            "80000000"
+            "80000000"
+            "00000000");
   for (unsigned slot = 0; slot < kSlotsPerSet; ++slot) {
     SlotRecord::Bytes record;
     memcpy(record.data(), &bytes[SlotRecord::Offset(slot)], record.size());
@@ -116,14 +111,12 @@ TEST(EventStateFile, EmptySetIsAListOfAllSlots) {
     EXPECT_FALSE(SlotRecord::Decode(record).manualReset);
     EXPECT_EQ(slot == 127 ? -1 : static_cast<int>(slot + 1), SlotRecord::Decode(record).keyOrNext);
   }
-  EXPECT_EQ(
-      "0000"
-      "0100000000000000",
-      hex.substr(36, 20));
-  EXPECT_EQ(
-      "0000"
-      "ffffffffffffffff",
-      hex.substr(2 * 1288));
+  EXPECT_EQ(hex.substr(36, 20),
+            "0000"
+            "0100000000000000");
+  EXPECT_EQ(hex.substr(2 * 1288),
+            "0000"
+            "ffffffffffffffff");
 }
 
 }  // namespace

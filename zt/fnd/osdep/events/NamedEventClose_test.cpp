@@ -76,14 +76,14 @@ TEST(NamedEventClose, KilledProcessLeavesItsSlotToTheNextOpener) {
       Keeper next([&] { return Open("name", manual, initial); });
       ASSERT_TRUE(next.good());
       EXPECT_EQ(slot, place.slotOf("name"));
-      EXPECT_EQ(125u, HeaderOf(place.file("sem_1")).freeCount);
+      EXPECT_EQ(HeaderOf(place.file("sem_1")).freeCount, 125u);
       Child asks([&] { return Open("name", manual, !initial)->checkOnly() == initial ? 0 : 1; });
-      EXPECT_EQ(0, asks.wait());
+      EXPECT_EQ(asks.wait(), 0);
       next.kill();
     }
     Open("name", manual);  // closing takes everything away again
     EXPECT_FALSE(Exists(place.file("name")));
-    EXPECT_EQ(126u, HeaderOf(place.file("sem_1")).freeCount);
+    EXPECT_EQ(HeaderOf(place.file("sem_1")).freeCount, 126u);
   }
 }
 
@@ -103,7 +103,7 @@ TEST(NamedEventClose, SetWhoseUsersAllDiedIsMadeAnew) {
   EXPECT_EQ((Slot{1, 4}), place.slotOf("e4"));
   auto event = Open("e4", kManual, kSet);
   EXPECT_EQ((Slot{1, 0}), place.slotOf("e4"));
-  EXPECT_EQ(127u, HeaderOf(place.file("sem_1")).freeCount);
+  EXPECT_EQ(HeaderOf(place.file("sem_1")).freeCount, 127u);
   EXPECT_EQ(id, place.setOf(1));  // the kernel's set is taken over
   EXPECT_TRUE(event->checkOnly());
   // A name whose file leads to a slot that is another's by now gets one of its own.
@@ -208,7 +208,7 @@ TEST(NamedEventClose, EventsOfAnotherUserAreJoined) {
     Open("name", kAutomatic)->set();
     return 0;
   });
-  EXPECT_EQ(0, third.wait());
+  EXPECT_EQ(third.wait(), 0);
   EXPECT_TRUE(Open("name", kAutomatic)->check());
   EXPECT_TRUE(other.finish());
   EXPECT_EQ(Names(), place.files());
@@ -220,7 +220,7 @@ TEST(NamedEventClose, StaticEventsCloseWhenTheProgramEnds) {
     static NamedEvent event(L"name", kManual, kSet);
     exit(event.checkOnly() ? 0 : 1);
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ(Names(), place.files());
 }
 
@@ -235,7 +235,7 @@ TEST(NamedEventClose, EventsWorkInExitFunctionsThatRunAfterTheirOwn) {
     Open("name");
     exit(0);
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ(Names(), place.files());
 }
 
@@ -247,7 +247,7 @@ TEST(NamedEventClose, ObjectThatOutlivesTheStaticsCloses) {
     late = Open("name");
     exit(0);
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ(Names(), place.files());
 }
 
@@ -257,7 +257,7 @@ TEST(NamedEventClose, EndWithoutClosingLeavesEverythingForTheNext) {
     new NamedEvent(L"name", kManual, kSet);
     return 0;  // _exit
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ((Names{"name", "sem_1"}), place.files());
   Open("name");
   EXPECT_EQ(Names(), place.files());

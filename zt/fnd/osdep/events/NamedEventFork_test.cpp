@@ -55,7 +55,7 @@ TEST(NamedEventFork, ChildUsesTheInheritedObject) {
     event->set();
     return event->check() ? 0 : 1;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_FALSE(event->checkOnly());
 }
 
@@ -72,7 +72,7 @@ TEST(NamedEventFork, ChildThatDestroysTakesNothingFromTheParent) {
     other.reset();
     return OpenDescriptors() == before - 3 ? 0 : 3;  // with the set's file
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ((Names{"name", "other", "sem_1"}), place.files());
   EXPECT_EQ(state, vlt::test::ReadBytes(place.file("sem_1")));
   EXPECT_FALSE(FileIsFree(place.file("name")));
@@ -90,7 +90,7 @@ TEST(NamedEventFork, ChildOpensTheNameItInherited) {
     mine->reset();
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_FALSE(event->checkOnly());
   EXPECT_EQ((Names{"name", "sem_1"}), place.files());
 }
@@ -102,7 +102,7 @@ TEST(NamedEventFork, ChildOpensOtherNamesInTheParentsSet) {
     auto mine = Open("mine");
     return place.slotOf("mine") == EventPlace::Slot{1, 1} ? 0 : 1;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ((Names{"name", "sem_1"}), place.files());
 }
 
@@ -146,7 +146,7 @@ TEST(NamedEventFork, ParentClosesWhileAChildLives) {
   EXPECT_EQ(Names(), place.files());
   event = Open("name", kManual, kSet);  // the next life of the name
   go.notify();
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ((Names{"name", "sem_1"}), place.files());
   EXPECT_FALSE(FileIsFree(place.file("name")));
   EXPECT_TRUE(event->checkOnly());
@@ -192,7 +192,7 @@ TEST(NamedEventFork, OpeningCutOffByForkAndKillBlocksNobody) {
   EXPECT_TRUE(FileIsFree(place.file("name")));
   stateFiles.unlock();
   Child next([] { return Open("name", kManual, kSet)->check() ? 0 : 1; });
-  EXPECT_EQ(0, next.wait());
+  EXPECT_EQ(next.wait(), 0);
   EXPECT_EQ(Names(), place.files());
   heir.end();
 }
@@ -213,7 +213,7 @@ TEST(NamedEventFork, ForkWhileAnotherThreadIsInsideLeavesAUsableChild) {
   EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }));
   stateFiles.unlock();
   opener.join();
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_TRUE(event->checkOnly());
 }
 
@@ -236,7 +236,7 @@ TEST(NamedEventFork, ForksDuringHeavyUseLeaveUsableChildren) {
       other->set();
       return other->check() ? 0 : 2;
     });
-    EXPECT_EQ(0, child.wait()) << i;
+    EXPECT_EQ(child.wait(), 0) << i;
   }
   stop = true;
   for (auto& thread : threads) thread.join();
@@ -261,8 +261,8 @@ TEST(NamedEventFork, ThreadsOfAChildDestroyInheritedObjectsAtOnce) {
     for (auto& thread : threads) thread.join();
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
-  EXPECT_EQ(9u, place.files().size());
+  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(place.files().size(), 9u);
   events.clear();
   EXPECT_EQ(Names(), place.files());
 }
@@ -279,7 +279,7 @@ TEST(NamedEventFork, GrandchildStartsFreshToo) {
     });
     return grandchild.wait();
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_TRUE(event->checkOnly());
   event.reset();
   Open("name");

@@ -115,7 +115,7 @@ TEST(NamedEventHostile, BadHeadersMakeTheSetUnusable) {
 TEST(NamedEventHostile, ShortStateFileInUseMakesTheSetUnusable) {
   for (unsigned size : {0u, 17u, 18u, 30u}) {
     Occupied set;
-    ASSERT_EQ(0, truncate(set.state.c_str(), size));
+    ASSERT_EQ(truncate(set.state.c_str(), size), 0);
     EXPECT_EQ((Slot{2, 0}), set.next()) << size;
     EXPECT_EQ(size, ReadBytes(set.state).size());
   }
@@ -146,7 +146,7 @@ TEST(NamedEventHostile, BrokenLinkSpoilsTheNextAllocationOnly) {
   EXPECT_EQ((Slot{1, 1}), set.place.slotOf("first"));
   EXPECT_EQ((Slot{2, 0}), set.next());
   first.reset();
-  EXPECT_EQ(1298u, ReadBytes(set.state).size());
+  EXPECT_EQ(ReadBytes(set.state).size(), 1298u);
 }
 
 TEST(NamedEventHostile, FullByItsHeaderIsFull) {
@@ -180,7 +180,7 @@ TEST(NamedEventHostile, StateFileLockedByAStrangerIsSkipped) {
   EventPlace place;
   Open("warm up");
   ScopedFd stranger(::open(place.file("sem_1").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666));
-  ASSERT_EQ(0, Flock(stranger.get(), LOCK_EX));
+  ASSERT_EQ(Flock(stranger.get(), LOCK_EX), 0);
   auto event = Open("name");
   EXPECT_EQ((Slot{2, 0}), place.slotOf("name"));
 }
@@ -192,10 +192,10 @@ TEST(NamedEventHostile, SetsLockedByAStrangerDoNotHoldAnOpenerForEver) {
   for (int n = 1; n <= 20; ++n) {
     std::string path = place.file("sem_" + std::to_string(n));
     stranger.emplace_back(::open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666));
-    ASSERT_EQ(0, Flock(stranger.back().get(), LOCK_EX));
+    ASSERT_EQ(Flock(stranger.back().get(), LOCK_EX), 0);
   }
   auto begin = Clock::now();
-  EXPECT_EQ(ENOLCK, PosixErrorOf([] { Open("name"); }));
+  EXPECT_EQ(PosixErrorOf([] { Open("name"); }), ENOLCK);
   EXPECT_LT(Clock::now() - begin, 2 * kSoon);
   EXPECT_FALSE(Exists(place.file("name")));
 }
@@ -205,19 +205,19 @@ TEST(NamedEventHostile, LinksPipesAndDirectoriesInTheStateFilesPlaceAreSkipped) 
   Open("warm up");
   WriteBytes(place.file("victim"), "victim");
   chmod(place.file("victim").c_str(), 0600);
-  ASSERT_EQ(0, symlink("victim", place.file("sem_1").c_str()));
-  ASSERT_EQ(0, mkfifo(place.file("sem_2").c_str(), 0666));
-  ASSERT_EQ(0, mkdir(place.file("sem_3").c_str(), 0777));
+  ASSERT_EQ(symlink("victim", place.file("sem_1").c_str()), 0);
+  ASSERT_EQ(mkfifo(place.file("sem_2").c_str(), 0666), 0);
+  ASSERT_EQ(mkdir(place.file("sem_3").c_str(), 0777), 0);
   WriteBytes(place.file("sem_4"), "");
-  ASSERT_EQ(0, link(place.file("victim").c_str(), place.file("second").c_str()));
+  ASSERT_EQ(link(place.file("victim").c_str(), place.file("second").c_str()), 0);
   auto event = Open("name");
   EXPECT_EQ((Slot{4, 0}), place.slotOf("name"));
-  EXPECT_EQ("victim", ReadBytes(place.file("victim")));
-  EXPECT_EQ(0600, vlt::test::ModeOf(place.file("victim")));
+  EXPECT_EQ(ReadBytes(place.file("victim")), "victim");
+  EXPECT_EQ(vlt::test::ModeOf(place.file("victim")), 0600);
   event.reset();
   EXPECT_FALSE(Exists(place.file("sem_4")));
   EXPECT_TRUE(Exists(place.file("sem_3")));
-  EXPECT_EQ(ELOOP, PosixErrorOf([] { Open("sem_1"); }));
+  EXPECT_EQ(PosixErrorOf([] { Open("sem_1"); }), ELOOP);
 }
 
 // ---- the kernel's sets
@@ -227,10 +227,10 @@ TEST(NamedEventHostile, SmallerSetOfTheSameKeyMakesItUnusable) {
   Open("warm up");
   WriteBytes(place.file("sem_1"), "");
   int small = semget(ftok(place.file("sem_1").c_str(), 1), 5, IPC_CREAT | IPC_EXCL | 0777);
-  ASSERT_NE(-1, small);
+  ASSERT_NE(small, -1);
   auto event = Open("name");
   EXPECT_EQ((Slot{2, 0}), place.slotOf("name"));
-  EXPECT_EQ(0, semctl(small, 0, IPC_RMID));  // it was left alone
+  EXPECT_EQ(semctl(small, 0, IPC_RMID), 0);  // it was left alone
   event.reset();
   EXPECT_EQ(Names{"sem_1"}, place.files());  // keeps its inode, which the next file would get
   Open("name");
@@ -242,26 +242,26 @@ TEST(NamedEventHostile, SetOfAnEarlierLifeIsTakenOver) {
   Open("warm up");
   WriteBytes(place.file("sem_1"), "");
   int old = semget(ftok(place.file("sem_1").c_str(), 1), 128, IPC_CREAT | IPC_EXCL | 0777);
-  ASSERT_NE(-1, old);
+  ASSERT_NE(old, -1);
   union {
     int value;
     void* unused;
   } seventeen = {17};
-  ASSERT_EQ(0, semctl(old, 0, SETVAL, seventeen));
+  ASSERT_EQ(semctl(old, 0, SETVAL, seventeen), 0);
   auto event = Open("name", kAutomatic, kClear);
   EXPECT_EQ(old, place.setOf(1));
   EXPECT_FALSE(event->check());
   event.reset();
-  EXPECT_EQ(-1, EventPlace::ValueOf(old, 0));
+  EXPECT_EQ(EventPlace::ValueOf(old, 0), -1);
 }
 
 TEST(NamedEventHostile, RemovedSetIsAnErrorAtOpeningThatLeavesNothing) {
   Occupied set;
   auto mine = Open("mine");
-  ASSERT_EQ(0, semctl(set.place.setOf(1), 0, IPC_RMID));
+  ASSERT_EQ(semctl(set.place.setOf(1), 0, IPC_RMID), 0);
   std::string before = ReadBytes(set.state);
   int descriptors = OpenDescriptors();
-  EXPECT_EQ(EINVAL, PosixErrorOf([] { Open("next"); }));
+  EXPECT_EQ(PosixErrorOf([] { Open("next"); }), EINVAL);
   EXPECT_EQ(before, ReadBytes(set.state));
   EXPECT_EQ((Names{"keeper", "mine", "sem_1"}), set.place.files());
   EXPECT_EQ(descriptors, OpenDescriptors());
@@ -299,16 +299,16 @@ TEST(NamedEventHostile, PlantedPlacesOfTheEventAreRefused) {
   Open("warm up");
   WriteBytes(place.file("victim"), "victim");
   chmod(place.file("victim").c_str(), 0600);
-  ASSERT_EQ(0, symlink("victim", place.file("link").c_str()));
-  ASSERT_EQ(0, mkfifo(place.file("fifo").c_str(), 0666));
+  ASSERT_EQ(symlink("victim", place.file("link").c_str()), 0);
+  ASSERT_EQ(mkfifo(place.file("fifo").c_str(), 0666), 0);
   WriteBytes(place.file("first"), "x");
-  ASSERT_EQ(0, link(place.file("first").c_str(), place.file("second").c_str()));
+  ASSERT_EQ(link(place.file("first").c_str(), place.file("second").c_str()), 0);
   int descriptors = OpenDescriptors();
-  EXPECT_EQ(ELOOP, PosixErrorOf([] { Open("link"); }));
-  EXPECT_EQ(ENXIO, PosixErrorOf([] { Open("fifo"); }));
-  EXPECT_EQ(EMLINK, PosixErrorOf([] { Open("second"); }));
-  EXPECT_EQ("victim", ReadBytes(place.file("victim")));
-  EXPECT_EQ(0600, vlt::test::ModeOf(place.file("victim")));
+  EXPECT_EQ(PosixErrorOf([] { Open("link"); }), ELOOP);
+  EXPECT_EQ(PosixErrorOf([] { Open("fifo"); }), ENXIO);
+  EXPECT_EQ(PosixErrorOf([] { Open("second"); }), EMLINK);
+  EXPECT_EQ(ReadBytes(place.file("victim")), "victim");
+  EXPECT_EQ(vlt::test::ModeOf(place.file("victim")), 0600);
   EXPECT_EQ(descriptors, OpenDescriptors());
 }
 
@@ -316,9 +316,9 @@ TEST(NamedEventHostile, LockFileHeldAloneForLongIsEAGAIN) {
   EventPlace place;
   Open("warm up");
   ScopedFd stranger(::open(place.file("name").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666));
-  ASSERT_EQ(0, Flock(stranger.get(), LOCK_EX));
+  ASSERT_EQ(Flock(stranger.get(), LOCK_EX), 0);
   auto begin = Clock::now();
-  EXPECT_EQ(EWOULDBLOCK, PosixErrorOf([] { Open("name"); }));
+  EXPECT_EQ(PosixErrorOf([] { Open("name"); }), EWOULDBLOCK);
   EXPECT_GE(Clock::now() - begin, std::chrono::milliseconds(500));
   EXPECT_LT(Clock::now() - begin, kSoon);
   EXPECT_EQ(Names{"name"}, place.files());
@@ -332,7 +332,7 @@ TEST(NamedEventHostile, JoinOfAnEventThatIsBeingClosedBeginsAnew) {
        {std::string(), std::string(1, '\0') + Number(1) + Number(3), std::string(9, '\xFF')}) {
     WriteBytes(place.file("name"), bytes);
     ScopedFd other(::open(place.file("name").c_str(), O_RDWR | O_CLOEXEC));
-    ASSERT_EQ(0, Flock(other.get(), LOCK_SH));
+    ASSERT_EQ(Flock(other.get(), LOCK_SH), 0);
     std::thread letGo([&, opener = gettid()] {
       EXPECT_TRUE(Eventually([&] { return Sleeps(opener); }));  // before it begins anew
       other.reset();
@@ -350,7 +350,7 @@ TEST(NamedEventHostile, JoinOfAKilledHoldersEventBeginsAnew) {
     Keeper killed([] { return Open("name"); });
     ASSERT_TRUE(killed.good());
     sharer.reset(::open(place.file("name").c_str(), O_RDWR | O_CLOEXEC));
-    ASSERT_EQ(0, Flock(sharer.get(), LOCK_SH));
+    ASSERT_EQ(Flock(sharer.get(), LOCK_SH), 0);
     killed.kill();  // the set is nobody's now, and an opener makes it anew
   }
   std::thread letGo([&, opener = gettid()] {
@@ -366,14 +366,14 @@ TEST(NamedEventHostile, LockFileSharedForEverByAStrangerIsENOLCK) {
   EventPlace place;
   Open("warm up");
   ScopedFd stranger(::open(place.file("name").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666));
-  ASSERT_EQ(0, Flock(stranger.get(), LOCK_SH));
+  ASSERT_EQ(Flock(stranger.get(), LOCK_SH), 0);
   int descriptors = OpenDescriptors();
   auto begin = Clock::now();
-  EXPECT_EQ(ENOLCK, PosixErrorOf([] { Open("name"); }));
+  EXPECT_EQ(PosixErrorOf([] { Open("name"); }), ENOLCK);
   EXPECT_LT(Clock::now() - begin, kSoon);
   EXPECT_EQ(descriptors, OpenDescriptors());
   EXPECT_EQ(Names{"name"}, place.files());
-  EXPECT_EQ("", ReadBytes(place.file("name")));
+  EXPECT_EQ(ReadBytes(place.file("name")), "");
 }
 
 TEST(NamedEventHostile, RemovedLockFileSplitsNobodyWhoComesLater) {
@@ -388,7 +388,7 @@ TEST(NamedEventHostile, RemovedLockFileSplitsNobodyWhoComesLater) {
     event->set();
     return 0;
   });
-  EXPECT_EQ(0, third.wait());
+  EXPECT_EQ(third.wait(), 0);
   EXPECT_TRUE(second.finish());
 }
 
@@ -401,7 +401,7 @@ TEST(NamedEventHostile, ReplacedStateFileIsLeftToItsOwners) {
   ASSERT_TRUE(fresh.good());
   EXPECT_EQ((Slot{1, 0}), place.slotOf("fresh"));
   old.reset();
-  EXPECT_EQ(-1, EventPlace::ValueOf(id, 0));
+  EXPECT_EQ(EventPlace::ValueOf(id, 0), -1);
   EXPECT_EQ((Names{"fresh", "sem_1"}), place.files());
   EXPECT_TRUE(fresh.finish());
   EXPECT_EQ(Names(), place.files());
@@ -419,7 +419,7 @@ TEST(NamedEventHostile, DescriptorsThatTheHostHasTakenAreTheHosts) {
   event->set();
   EXPECT_TRUE(event->check());
   Child child([] { return 0; });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   event.reset();
   for (const HostsFile* file : {&lock, &state}) {
     EXPECT_TRUE(file->isOpen() && file->unchanged());
@@ -447,7 +447,7 @@ TEST(NamedEventHostile, CloseWithoutTheMutexThrowsNothingAndLeavesTheFiles) {
     std::filesystem::remove(mutexes);
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ((Names{"name", "sem_1"}), place.files());
   Open("name");
   EXPECT_EQ(Names(), place.files());

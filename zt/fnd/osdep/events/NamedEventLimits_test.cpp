@@ -107,7 +107,7 @@ void RunWithLimits(const char* limits, const std::function<int()>& body) {
       },
       &code);
   SKIP_UNLESS(allowed);
-  EXPECT_EQ(0, code);
+  EXPECT_EQ(code, 0);
 }
 
 TEST(NamedEventLimits, NoSemaphoresAtAllIsENOLCKAndLeavesNoFiles) {
@@ -158,7 +158,7 @@ TEST(NamedEventLimits, KernelWithoutSemaphoresIsENOLCK) {
     REQUIRE(SoonErrorOfOpening("name") == ENOLCK);
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ(Names(), place.files());
 }
 
@@ -181,7 +181,7 @@ TEST(NamedEventLimits, MarkedSetNumbersAreSkipped) {
         return 0;
       },
       &code));
-  EXPECT_EQ(0, code);
+  EXPECT_EQ(code, 0);
 }
 
 // Two state files whose inodes agree in the bits that make a key.
@@ -215,7 +215,7 @@ TEST(NamedEventLimits, SetThatIsAlreadyTheProcesssOwnIsUnusable) {
         return 0;
       },
       &code));
-  EXPECT_EQ(0, code);
+  EXPECT_EQ(code, 0);
 }
 
 // ---- the place
@@ -239,7 +239,7 @@ TEST(NamedEventLimits, ReadOnlyPlaceIsAnErrorAtOnce) {
         return 0;
       },
       &code));
-  EXPECT_EQ(0, code);
+  EXPECT_EQ(code, 0);
 }
 
 TEST(NamedEventLimits, PlaceThatTurnsReadOnlyUnderAnEventLetsItClose) {
@@ -257,7 +257,7 @@ TEST(NamedEventLimits, PlaceThatTurnsReadOnlyUnderAnEventLetsItClose) {
         return 0;
       },
       &code));
-  EXPECT_EQ(0, code);
+  EXPECT_EQ(code, 0);
 }
 
 TEST(NamedEventLimits, PlaceThatMayNotBeWrittenIsEACCES) {
@@ -271,7 +271,7 @@ TEST(NamedEventLimits, PlaceThatMayNotBeWrittenIsEACCES) {
     REQUIRE(SoonErrorOfOpening("name") == EACCES);
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ(Names(), place.files());
 }
 
@@ -289,7 +289,7 @@ TEST(NamedEventLimits, StateFilesThatMayNotBeMadeAreENOLCK) {
     REQUIRE(SoonErrorOfOpening("name") == ENOLCK);
     return 0;
   });
-  EXPECT_EQ(0, child.wait());
+  EXPECT_EQ(child.wait(), 0);
   EXPECT_EQ(Names{"name"}, place.files());
 }
 
@@ -316,7 +316,7 @@ TEST(NamedEventLimits, FullPlaceIsAnErrorThatLeavesNoFiles) {
         return 0;
       },
       &code));
-  EXPECT_EQ(0, code);
+  EXPECT_EQ(code, 0);
 }
 
 // The state file is there already; only the event's own file has no room.
@@ -336,7 +336,7 @@ TEST(NamedEventLimits, FullPlaceBesideALivingSetIsENOLCK) {
         return 0;
       },
       &code));
-  EXPECT_EQ(0, code);
+  EXPECT_EQ(code, 0);
 }
 
 TEST(NamedEventLimits, PlaceWithoutInodesIsAnErrorThatLeavesNoFiles) {
@@ -360,7 +360,7 @@ TEST(NamedEventLimits, PlaceWithoutInodesIsAnErrorThatLeavesNoFiles) {
         return 0;
       },
       &code));
-  EXPECT_EQ(0, code);
+  EXPECT_EQ(code, 0);
 }
 
 // ---- bounds
@@ -369,7 +369,7 @@ TEST(NamedEventLimits, PlaceWithoutInodesIsAnErrorThatLeavesNoFiles) {
 void Spoil(const EventPlace& place, int number) {
   std::string path = place.file("sem_" + std::to_string(number));
   WriteBytes(path, "x");
-  ASSERT_NE(-1, semget(ftok(path.c_str(), 1), 1, IPC_CREAT | IPC_EXCL | 0600));
+  ASSERT_NE(semget(ftok(path.c_str(), 1), 1, IPC_CREAT | IPC_EXCL | 0600), -1);
 }
 
 TEST(NamedEventLimits, ThousandUnusableSetsInARowAreTheEnd) {
@@ -380,7 +380,7 @@ TEST(NamedEventLimits, ThousandUnusableSetsInARowAreTheEnd) {
   EXPECT_EQ((EventPlace::Slot{1024, 0}), place.slotOf("name"));
   event.reset();
   Spoil(place, 1024);
-  EXPECT_EQ(ENOLCK, SoonErrorOfOpening("name"));
+  EXPECT_EQ(SoonErrorOfOpening("name"), ENOLCK);
   EXPECT_FALSE(Exists(place.file("name")));
   EXPECT_FALSE(Exists(place.file("sem_1025")));
   // With a full one among them there are not so many in a row.
@@ -409,7 +409,7 @@ TEST(NamedEventLimits, StateFilesThatCannotBeOpenedCountNothingUpToSomeThousands
   EXPECT_EQ((EventPlace::Slot{4096 + 256, 0}), place.slotOf("name"));
   event.reset();
   obstruct(4096 + 256, 4096 + 256);
-  EXPECT_EQ(ENOLCK, SoonErrorOfOpening("name"));
+  EXPECT_EQ(SoonErrorOfOpening("name"), ENOLCK);
   EXPECT_FALSE(Exists(place.file("name")));
 }
 
@@ -420,13 +420,13 @@ TEST(NamedEventLimits, NoDescriptorsLeftIsAnErrorThatPasses) {
   EventPlace place;
   auto warm = Open("warm up");
   rlimit limit;
-  ASSERT_EQ(0, getrlimit(RLIMIT_NOFILE, &limit));
+  ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &limit), 0);
   const int now = OpenDescriptors();
   for (int spare = 0; spare <= 4; ++spare) {
     rlimit few = limit;
     few.rlim_cur = static_cast<rlim_t>(now + spare);
     std::vector<std::unique_ptr<NamedEvent>> events;
-    ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &few));
+    ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &few), 0);
     int error = 0;
     for (int i = 0; error == 0 && i < 10; ++i) {
       auto begin = Clock::now();
@@ -458,7 +458,7 @@ TEST(NamedEventLimits, FailedAllocationsLeaveNothing) {
     EXPECT_EQ(Names(), place.files()) << nth;
     EXPECT_EQ(descriptors, OpenDescriptors()) << nth;
   }
-  EXPECT_EQ(0, SoonErrorOfOpening("name"));
+  EXPECT_EQ(SoonErrorOfOpening("name"), 0);
 }
 
 }  // namespace

@@ -45,8 +45,8 @@ class NamedEventListing : public testing::Test {
   // "value; holders" of each row.
   std::map<std::string, std::string> list() const {
     auto result = RunProgram({Vltctl(), "events", "--json"});
-    EXPECT_EQ(0, result.exitCode) << result.err;
-    EXPECT_EQ("", result.err);
+    EXPECT_EQ(result.exitCode, 0) << result.err;
+    EXPECT_EQ(result.err, "");
     std::map<std::string, std::string> rows;
     const json listed = json::parse(result.out);
     for (const auto& [name, row] : listed.items()) {
@@ -68,7 +68,7 @@ std::string HeldBy(std::set<pid_t> pids) {
 
 TEST_F(NamedEventListing, NothingIsAnEmptyList) {
   EXPECT_EQ(Rows(), list());
-  EXPECT_EQ("", RunProgram({Vltctl(), "events"}).out);
+  EXPECT_EQ(RunProgram({Vltctl(), "events"}).out, "");
 }
 
 TEST_F(NamedEventListing, NamesSlotsSetsAndHolders) {
@@ -99,7 +99,7 @@ TEST_F(NamedEventListing, SecondSetIsASetToo) {
   std::vector<std::unique_ptr<NamedEvent>> events;
   for (int i = 0; i < 129; ++i) events.push_back(OpenEvent("e" + std::to_string(i)));
   Rows rows = list();
-  EXPECT_EQ(131u, rows.size());
+  EXPECT_EQ(rows.size(), 131u);
   EXPECT_EQ("set 2, slot 0" + HeldBy({getpid()}), rows["e128"]);
   EXPECT_EQ("set of 128 slots, 0 free" + HeldBy({getpid()}), rows["sem_1"]);
   EXPECT_EQ("set of 128 slots, 127 free" + HeldBy({getpid()}), rows["sem_2"]);
@@ -123,7 +123,7 @@ TEST_F(NamedEventListing, HeldFilesThatAreGoneAreNamedAsSuch) {
   EXPECT_EQ("its file is gone" + HeldBy({getpid(), next.pid()}), rows["name (deleted)"]);
   EXPECT_EQ("set 1, slot 2" + HeldBy({next.pid()}), rows["name"]);
   EXPECT_EQ("set 1, slot 1" + HeldBy({getpid(), next.pid()}), rows["odd (deleted)"]);
-  EXPECT_EQ(4u, rows.size());
+  EXPECT_EQ(rows.size(), 4u);
 }
 
 TEST_F(NamedEventListing, DamagedFilesAreToldAsWhatTheyAre) {
@@ -143,28 +143,28 @@ TEST_F(NamedEventListing, DamagedFilesAreToldAsWhatTheyAre) {
   }
   WriteBytes(m_place.file("sem_1"), good);
   WriteBytes(m_place.file("short"), "12345678");
-  EXPECT_EQ("no place yet; held by nobody", list()["short"]);
+  EXPECT_EQ(list()["short"], "no place yet; held by nobody");
 }
 
 TEST_F(NamedEventListing, WhatIsNoFileOfAnEventIsNotWaitedFor) {
   auto event = OpenEvent("name");
-  ASSERT_EQ(0, mkfifo(m_place.file("fifo").c_str(), 0666));
-  ASSERT_EQ(0, mkdir(m_place.file("directory").c_str(), 0777));
-  ASSERT_EQ(0, symlink("/dev/zero", m_place.file("device").c_str()));
-  ASSERT_EQ(0, symlink("/etc/passwd", m_place.file("link").c_str()));
+  ASSERT_EQ(mkfifo(m_place.file("fifo").c_str(), 0666), 0);
+  ASSERT_EQ(mkdir(m_place.file("directory").c_str(), 0777), 0);
+  ASSERT_EQ(symlink("/dev/zero", m_place.file("device").c_str()), 0);
+  ASSERT_EQ(symlink("/etc/passwd", m_place.file("link").c_str()), 0);
   WriteBytes(m_place.file("large"), "");
-  ASSERT_EQ(0, truncate(m_place.file("large").c_str(), off_t{1} << 40));
+  ASSERT_EQ(truncate(m_place.file("large").c_str(), off_t{1} << 40), 0);
   WriteBytes(m_place.file("\x1B[2J\nend"), std::string(9, '\0'));
   auto begin = std::chrono::steady_clock::now();
   Rows rows = list();
   EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(5));
-  EXPECT_EQ("set 0, slot 0; held by nobody", rows["large"]);
-  EXPECT_EQ("set 0, slot 0; held by nobody", rows["\x1B[2J\nend"]);
-  EXPECT_EQ(4u, rows.size());
+  EXPECT_EQ(rows["large"], "set 0, slot 0; held by nobody");
+  EXPECT_EQ(rows["\x1B[2J\nend"], "set 0, slot 0; held by nobody");
+  EXPECT_EQ(rows.size(), 4u);
   std::istringstream text(RunProgram({Vltctl(), "events"}).out);
   std::string first;
   std::getline(text, first);
-  EXPECT_EQ("\\x1B[2J\\x0Aend", first.substr(0, first.find("  ")));
+  EXPECT_EQ(first.substr(0, first.find("  ")), "\\x1B[2J\\x0Aend");
 }
 
 // Calls of a trace that take a lock, change a file or a semaphore, or end somebody's wait.
@@ -187,7 +187,7 @@ TEST_F(NamedEventListing, LookingDisturbsNobody) {
   std::string state = ReadBytes(m_place.file("sem_1")), lock = ReadBytes(m_place.file("name"));
   auto stateTime = std::filesystem::last_write_time(m_place.file("sem_1"));
   auto listing = RunProgram({Vltctl(), "events"});
-  EXPECT_EQ(0, listing.exitCode);
+  EXPECT_EQ(listing.exitCode, 0);
   EXPECT_EQ(state, ReadBytes(m_place.file("sem_1")));
   EXPECT_EQ(lock, ReadBytes(m_place.file("name")));
   EXPECT_EQ(stateTime, std::filesystem::last_write_time(m_place.file("sem_1")));
@@ -200,7 +200,7 @@ TEST_F(NamedEventListing, LookingDisturbsNobody) {
   // The leak checker of the sanitizer's build cannot work on a traced process.
   auto traced = RunProgram({"strace", "-f", "-o", dir / "trace", Vltctl(), "events"},
                            {{"ASAN_OPTIONS", "detect_leaks=0"}});
-  EXPECT_EQ(0, traced.exitCode);
+  EXPECT_EQ(traced.exitCode, 0);
   EXPECT_EQ(listing.out, traced.out);
   EXPECT_NE(std::string::npos, ReadBytes(dir / "trace").find("sem_1"));
   EXPECT_EQ(std::vector<std::string>(), Disturbances(ReadBytes(dir / "trace")));

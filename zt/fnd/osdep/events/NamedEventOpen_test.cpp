@@ -74,16 +74,16 @@ TEST(NamedEventOpen, FirstEventTakesSlotZeroOfSetOne) {
   EventPlace place;
   auto event = Open("name");
   EXPECT_EQ((Names{"name", "sem_1"}), place.files());
-  EXPECT_EQ(std::string("\0\1\0\0\0\0\0\0\0", 9), ReadBytes(place.file("name")));
+  EXPECT_EQ(ReadBytes(place.file("name")), std::string("\0\1\0\0\0\0\0\0\0", 9));
   std::string state = ReadBytes(place.file("sem_1"));
-  ASSERT_EQ(1298u, state.size());
-  EXPECT_EQ(std::string("\x31\x5E\xE3\x15\0\1\x80\0\0\0\x7F\0\0\0\1\0\0\0", 18),
-            state.substr(0, 18));
+  ASSERT_EQ(state.size(), 1298u);
+  EXPECT_EQ(state.substr(0, 18),
+            std::string("\x31\x5E\xE3\x15\0\1\x80\0\0\0\x7F\0\0\0\1\0\0\0", 18));
   int64_t key = ftok(place.file("name").c_str(), 1);
   std::string record = std::string("\1\1") + std::string(reinterpret_cast<char*>(&key), 8);
   EXPECT_EQ(record, state.substr(18, 10));
-  EXPECT_EQ(std::string("\0\0\2\0\0\0\0\0\0\0", 10), state.substr(28, 10));
-  EXPECT_EQ(std::string("\0\0\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF", 10), state.substr(1288));
+  EXPECT_EQ(state.substr(28, 10), std::string("\0\0\2\0\0\0\0\0\0\0", 10));
+  EXPECT_EQ(state.substr(1288), std::string("\0\0\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF", 10));
 }
 
 TEST(NamedEventOpen, KernelSetHas128SemaphoresForEverybody) {
@@ -91,9 +91,9 @@ TEST(NamedEventOpen, KernelSetHas128SemaphoresForEverybody) {
   auto event = Open("name");
   semid_ds info = {};
   int id = EventPlace::SetOfKey(ftok(place.file("sem_1").c_str(), 1));
-  ASSERT_EQ(0, semctl(id, 0, IPC_STAT, &info));
-  EXPECT_EQ(128u, info.sem_nsems);
-  EXPECT_EQ(0777u, info.sem_perm.mode & 0777u);
+  ASSERT_EQ(semctl(id, 0, IPC_STAT, &info), 0);
+  EXPECT_EQ(info.sem_nsems, 128u);
+  EXPECT_EQ(info.sem_perm.mode & 0777u, 0777u);
 }
 
 TEST(NamedEventOpen, FilesAreOpenToAllWhateverTheUmask) {
@@ -103,9 +103,9 @@ TEST(NamedEventOpen, FilesAreOpenToAllWhateverTheUmask) {
     return Open("name");
   });
   ASSERT_TRUE(keeper.good());
-  EXPECT_EQ(0666, ModeOf(place.file("name")));
-  EXPECT_EQ(0666, ModeOf(place.file("sem_1")));
-  EXPECT_EQ(0777, ModeOf(std::filesystem::path(place.file("name")).parent_path()));
+  EXPECT_EQ(ModeOf(place.file("name")), 0666);
+  EXPECT_EQ(ModeOf(place.file("sem_1")), 0666);
+  EXPECT_EQ(ModeOf(std::filesystem::path(place.file("name")).parent_path()), 0777);
   EXPECT_TRUE(keeper.finish());
 }
 
@@ -119,7 +119,7 @@ TEST(NamedEventOpen, LastCloseRemovesFilesAndSet) {
   ASSERT_GE(id, 0);
   event.reset();
   EXPECT_EQ(Names(), place.files());
-  EXPECT_EQ(-1, EventPlace::ValueOf(id, 0));
+  EXPECT_EQ(EventPlace::ValueOf(id, 0), -1);
   EXPECT_EQ(before, EventPlace::CountSets());
   EXPECT_EQ(descriptors, OpenDescriptors());
 }
@@ -131,14 +131,14 @@ TEST(NamedEventOpen, ClosedSlotGoesToTheFrontOfTheFreeList) {
   b.reset();
   EXPECT_FALSE(Exists(place.file("b")));
   SetHeader header = HeaderOf(place.file("sem_1"));
-  EXPECT_EQ(126u, header.freeCount);
-  EXPECT_EQ(1u, header.firstFree);
+  EXPECT_EQ(header.freeCount, 126u);
+  EXPECT_EQ(header.firstFree, 1u);
   SlotRecord record = RecordOf(place.file("sem_1"), 1);
   EXPECT_FALSE(record.inUse);
   EXPECT_FALSE(record.manualReset);
-  EXPECT_EQ(3, record.keyOrNext);
+  EXPECT_EQ(record.keyOrNext, 3);
   a.reset();
-  EXPECT_EQ(0u, HeaderOf(place.file("sem_1")).firstFree);
+  EXPECT_EQ(HeaderOf(place.file("sem_1")).firstFree, 0u);
   // Last in, first out.
   auto d = Open("d"), e = Open("e"), f = Open("f");
   EXPECT_EQ((Slot{1, 0}), place.slotOf("d"));
@@ -152,15 +152,15 @@ TEST(NamedEventOpen, The129thEventGoesToSetTwo) {
   for (int i = 0; i < 128; ++i) events.push_back(Open("e" + std::to_string(i)));
   EXPECT_FALSE(Exists(place.file("sem_2")));
   SetHeader full = HeaderOf(place.file("sem_1"));
-  EXPECT_EQ(0u, full.freeCount);
-  EXPECT_EQ(kNoSlot, full.firstFree);
+  EXPECT_EQ(full.freeCount, 0u);
+  EXPECT_EQ(full.firstFree, kNoSlot);
   auto last = Open("e128");
   EXPECT_EQ((Slot{2, 0}), place.slotOf("e128"));
   EXPECT_NE(place.setOf(1), place.setOf(2));
   // A slot given back to a full set ends its list with eight bytes of ones.
   events[7].reset();
-  EXPECT_EQ(std::string("\0\0\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF", 10),
-            ReadBytes(place.file("sem_1")).substr(18 + 70, 10));
+  EXPECT_EQ(ReadBytes(place.file("sem_1")).substr(18 + 70, 10),
+            std::string("\0\0\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF", 10));
   // The lowest set with room first.
   auto again = Open("again");
   EXPECT_EQ((Slot{1, 7}), place.slotOf("again"));
@@ -201,12 +201,12 @@ TEST(NamedEventOpen, OtherKindInOneProcessIsEINVAL) {
   EventPlace place;
   auto event = Open("name", kManual, kSet);
   std::string before = ReadBytes(place.file("sem_1"));
-  EXPECT_EQ(EINVAL, PosixErrorOf([] { Open("name", kAutomatic); }));
-  EXPECT_EQ(EINVAL, PosixErrorOf([] { Open("NAME", kAutomatic); }));
+  EXPECT_EQ(PosixErrorOf([] { Open("name", kAutomatic); }), EINVAL);
+  EXPECT_EQ(PosixErrorOf([] { Open("NAME", kAutomatic); }), EINVAL);
   EXPECT_TRUE(event->checkOnly());
   EXPECT_EQ(before, ReadBytes(place.file("sem_1")));
   event.reset();
-  EXPECT_EQ(-1, PosixErrorOf([] { Open("name", kAutomatic); }));
+  EXPECT_EQ(PosixErrorOf([] { Open("name", kAutomatic); }), -1);
 }
 
 TEST(NamedEventOpen, NamesFoldInAProcessAndNotInTheFileSystem) {
@@ -227,10 +227,10 @@ TEST(NamedEventOpen, NamesOfTheWrongShape) {
   auto other = Open("other");
   int descriptors = OpenDescriptors();
   std::string before = ReadBytes(place.file("sem_1"));
-  EXPECT_EQ(EISDIR, PosixErrorOf([] { Open(""); }));
-  EXPECT_EQ(ENOENT, PosixErrorOf([] { Open("no/such"); }));
-  EXPECT_EQ(ENAMETOOLONG, PosixErrorOf([] { Open(std::string(256, 'n')); }));
-  EXPECT_EQ(-1, PosixErrorOf([] { Open(std::string(255, 'n')); }));
+  EXPECT_EQ(PosixErrorOf([] { Open(""); }), EISDIR);
+  EXPECT_EQ(PosixErrorOf([] { Open("no/such"); }), ENOENT);
+  EXPECT_EQ(PosixErrorOf([] { Open(std::string(256, 'n')); }), ENAMETOOLONG);
+  EXPECT_EQ(PosixErrorOf([] { Open(std::string(255, 'n')); }), -1);
   EXPECT_EQ(descriptors, OpenDescriptors());
   EXPECT_EQ(before, ReadBytes(place.file("sem_1")));
   EXPECT_EQ((Names{"other", "sem_1"}), place.files());
@@ -259,10 +259,10 @@ TEST(NamedEventOpen, TwoProcessesOpenANewNameAtOnceAndGetOneSlot) {
     ASSERT_TRUE(opened[0].await() && opened[1].await());
     EXPECT_EQ((Names{"name", "sem_1"}), place.files());
     EXPECT_EQ((Slot{1, 0}), place.slotOf("name"));
-    EXPECT_EQ(127u, HeaderOf(place.file("sem_1")).freeCount);
+    EXPECT_EQ(HeaderOf(place.file("sem_1")).freeCount, 127u);
     end.notify();
     end.notify();
-    for (Child& child : children) EXPECT_EQ(0, child.wait());
+    for (Child& child : children) EXPECT_EQ(child.wait(), 0);
     EXPECT_EQ(Names(), place.files());
   }
 }
@@ -272,7 +272,7 @@ TEST(NamedEventOpen, OpenerWaitsWhileAnotherSetsTheFileUp) {
   auto other = Open("other");
   // The exclusive phase of another opener, played with a descriptor of the test.
   ScopedFd busy(::open(place.file("name").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666));
-  ASSERT_EQ(0, Flock(busy.get(), LOCK_EX));
+  ASSERT_EQ(Flock(busy.get(), LOCK_EX), 0);
   vlt::test::Signal begun;
   Child opener([&] {
     begun.notify();
@@ -281,9 +281,9 @@ TEST(NamedEventOpen, OpenerWaitsWhileAnotherSetsTheFileUp) {
   ASSERT_TRUE(begun.await());
   EXPECT_TRUE(vlt::test::Eventually([&] { return vlt::test::Sleeps(opener.pid()); }));
   EXPECT_TRUE(opener.running());
-  EXPECT_EQ("", ReadBytes(place.file("name")));
+  EXPECT_EQ(ReadBytes(place.file("name")), "");
   Flock(busy.get(), LOCK_UN);  // the opener has a copy of the descriptor
-  EXPECT_EQ(0, opener.wait());
+  EXPECT_EQ(opener.wait(), 0);
 }
 
 TEST(NamedEventOpen, OtherKindInAnotherProcessIsENOLCKAndChangesNothing) {
@@ -292,12 +292,12 @@ TEST(NamedEventOpen, OtherKindInAnotherProcessIsENOLCKAndChangesNothing) {
     auto event = Open("name", manual, kSet);
     std::string state = ReadBytes(place.file("sem_1")), lock = ReadBytes(place.file("name"));
     auto begin = std::chrono::steady_clock::now();
-    EXPECT_EQ(ENOLCK, ErrorElsewhere("name", !manual));
+    EXPECT_EQ(ErrorElsewhere("name", !manual), ENOLCK);
     EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::milliseconds(1500));
     EXPECT_EQ(state, ReadBytes(place.file("sem_1")));
     EXPECT_EQ(lock, ReadBytes(place.file("name")));
     EXPECT_TRUE(event->checkOnly());
-    EXPECT_EQ(0, ErrorElsewhere("name", manual));
+    EXPECT_EQ(ErrorElsewhere("name", manual), 0);
   }
 }
 
@@ -307,7 +307,7 @@ TEST(NamedEventOpen, JoiningIgnoresTheInitialState) {
     for (bool initial : {kSet, kClear}) {
       auto event = Open("name", manual, initial);
       Child joiner([&] { return Open("name", manual, !initial)->checkOnly() == initial ? 0 : 1; });
-      EXPECT_EQ(0, joiner.wait());
+      EXPECT_EQ(joiner.wait(), 0);
       EXPECT_EQ(initial, event->checkOnly());
     }
   }
@@ -321,7 +321,7 @@ TEST(NamedEventOpen, EventLivesUntilTheLastProcessCloses) {
   mine->set();
   mine.reset();
   EXPECT_EQ((Names{"name", "sem_1"}), place.files());
-  EXPECT_EQ(127u, HeaderOf(place.file("sem_1")).freeCount);
+  EXPECT_EQ(HeaderOf(place.file("sem_1")).freeCount, 127u);
   mine = Open("name", kManual, kClear);
   EXPECT_TRUE(mine->checkOnly());  // the state has stayed, too
   mine.reset();
@@ -342,7 +342,7 @@ TEST(NamedEventOpen, SetLivesUntilTheLastOfItsEventsGoes) {
   mine->set();
   mine.reset();
   EXPECT_EQ(Names(), place.files());
-  EXPECT_EQ(-1, EventPlace::ValueOf(id, 0));
+  EXPECT_EQ(EventPlace::ValueOf(id, 0), -1);
 }
 
 }  // namespace

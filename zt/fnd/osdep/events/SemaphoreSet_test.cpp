@@ -34,7 +34,7 @@ struct Set {
     std::string bytes = ReadBytes(path);
     memcpy(&bytes.at(at), &value, sizeof value);
     FILE* file = fopen(path.c_str(), "r+b");
-    ASSERT_NE(nullptr, file);
+    ASSERT_NE(file, nullptr);
     EXPECT_EQ(bytes.size(), fwrite(bytes.data(), 1, bytes.size(), file));
     fclose(file);
   }
@@ -47,11 +47,11 @@ TEST(SemaphoreSet, IsBuiltReadyAndAllFree) {
   unsigned count = 0, freeCount = 0, firstFree = 9;
   EXPECT_TRUE(s.set->readHeader(ready, count, freeCount, firstFree));
   EXPECT_TRUE(ready);
-  EXPECT_EQ(128u, count);
-  EXPECT_EQ(128u, freeCount);
-  EXPECT_EQ(0u, firstFree);
+  EXPECT_EQ(count, 128u);
+  EXPECT_EQ(freeCount, 128u);
+  EXPECT_EQ(firstFree, 0u);
   EXPECT_EQ(s.set->id(), s.place.setOf(1));
-  EXPECT_EQ(1u, s.set->number());
+  EXPECT_EQ(s.set->number(), 1u);
   EXPECT_EQ(SemaphoreSet::State::Usable, s.set->state());
 }
 
@@ -63,7 +63,7 @@ TEST(SemaphoreSet, ReadHeaderDoesNotAskForReady) {
   unsigned count, freeCount, firstFree;
   EXPECT_TRUE(s.set->readHeader(ready, count, freeCount, firstFree));
   EXPECT_FALSE(ready);
-  EXPECT_EQ(128u, count);
+  EXPECT_EQ(count, 128u);
 }
 
 TEST(SemaphoreSet, BadHeaderClearsAllOutputs) {
@@ -73,13 +73,13 @@ TEST(SemaphoreSet, BadHeaderClearsAllOutputs) {
   unsigned count = 7, freeCount = 7, firstFree = 7;
   EXPECT_FALSE(s.set->readHeader(ready, count, freeCount, firstFree));
   EXPECT_FALSE(ready);
-  EXPECT_EQ(0u, count + freeCount + firstFree);
-  ASSERT_EQ(0, truncate(s.path.c_str(), 17));
+  EXPECT_EQ(count + freeCount + firstFree, 0u);
+  ASSERT_EQ(truncate(s.path.c_str(), 17), 0);
   ready = true;
   count = freeCount = firstFree = 7;
   EXPECT_FALSE(s.set->readHeader(ready, count, freeCount, firstFree));
   EXPECT_FALSE(ready);
-  EXPECT_EQ(0u, count + freeCount + firstFree);
+  EXPECT_EQ(count + freeCount + firstFree, 0u);
 }
 
 TEST(SemaphoreSet, UpdateChangesCountAndFirstFreeAlone) {
@@ -87,22 +87,22 @@ TEST(SemaphoreSet, UpdateChangesCountAndFirstFreeAlone) {
   std::string before = ReadBytes(s.path);
   unsigned old = 99;
   EXPECT_TRUE(s.set->updateFreeRecords(-1, 0x01020304, old));
-  EXPECT_EQ(0u, old);
+  EXPECT_EQ(old, 0u);
   std::string after = ReadBytes(s.path);
   EXPECT_EQ(before.substr(0, 10), after.substr(0, 10));
-  EXPECT_EQ(std::string("\x7F\0\0\0\4\3\2\1", 8), after.substr(10, 8));
+  EXPECT_EQ(after.substr(10, 8), std::string("\x7F\0\0\0\4\3\2\1", 8));
   EXPECT_EQ(before.substr(18), after.substr(18));
   EXPECT_TRUE(s.set->updateFreeRecords(+1, kNoSlot, old));
-  EXPECT_EQ(0x01020304u, old);
-  EXPECT_EQ(std::string("\x80\0\0\0\xFF\xFF\xFF\xFF", 8), ReadBytes(s.path).substr(10, 8));
+  EXPECT_EQ(old, 0x01020304u);
+  EXPECT_EQ(ReadBytes(s.path).substr(10, 8), std::string("\x80\0\0\0\xFF\xFF\xFF\xFF", 8));
 }
 
 TEST(SemaphoreSet, UpdateOfAShortFileFails) {
   Set s;
   unsigned old;
-  ASSERT_EQ(0, truncate(s.path.c_str(), 17));
+  ASSERT_EQ(truncate(s.path.c_str(), 17), 0);
   EXPECT_FALSE(s.set->updateFreeRecords(-1, 1, old));
-  EXPECT_EQ(17u, ReadBytes(s.path).size());
+  EXPECT_EQ(ReadBytes(s.path).size(), 17u);
 }
 
 TEST(SemaphoreSet, TakeAndGiveBackAreEachOthersReverse) {
@@ -167,14 +167,14 @@ TEST(SemaphoreSet, UnusableSetStaysInTheMapWhileItIsHeld) {
   RefPtr<NamedEventGlobalStatics> statics = NamedEventGlobalStatics::Get();
   Hold hold(statics->section);
   statics->getOrCreateSemaphoreSet(1);  // makes the directory
-  ASSERT_EQ(0, mkdir(place.file("sem_1").c_str(), 0777));
+  ASSERT_EQ(mkdir(place.file("sem_1").c_str(), 0777), 0);
   int descriptors = OpenDescriptors();
   RefPtr<SemaphoreSet> set = statics->getOrCreateSemaphoreSet(1);
   EXPECT_FALSE(set->usable());
   EXPECT_EQ(SemaphoreSet::State::Closed, set->state());
-  EXPECT_EQ(-1, set->id());
+  EXPECT_EQ(set->id(), -1);
   EXPECT_EQ(descriptors, OpenDescriptors());
-  ASSERT_EQ(0, rmdir(place.file("sem_1").c_str()));
+  ASSERT_EQ(rmdir(place.file("sem_1").c_str()), 0);
   EXPECT_EQ(set.get(), statics->getOrCreateSemaphoreSet(1).get());
   set = nullptr;
   EXPECT_TRUE(statics->getOrCreateSemaphoreSet(1)->usable());
