@@ -214,7 +214,8 @@ TEST_IN_CHILD(vltPharlapDictionariesChanged, EveryDictionaryAndNothingElse) {
 }
 
 // What a child prints while `body` runs.
-std::string Printed(const Installation& i, const std::function<void(OpenLinux&)>& body) {
+std::string Printed(const Installation& i,
+                    const std::function<void(AccessibleLinuxRegistrar&)>& body) {
   TempDir out;
   ExpectInChild([&] {
     ASSERT_TRUE(freopen((out / "text").c_str(), "w", stdout));
@@ -225,7 +226,7 @@ std::string Printed(const Installation& i, const std::function<void(OpenLinux&)>
   return ReadBytes(out / "text");
 }
 
-void CompareEmptyDictionaries(OpenLinux& r, const std::string& place) {
+void CompareEmptyDictionaries(AccessibleLinuxRegistrar& r, const std::string& place) {
   WriteBytes(place, "[S]\nSchemaVersion = 3\n");
   CvlIniMgr fragment(place.c_str(), false, nullptr, false, true);
   r.database().SetItem("S", "x", "1", true);
@@ -238,8 +239,9 @@ TEST(vltPharlapDictionariesChanged, WarnsOfWhatIsMissingWhenAskedTo) {
   for (const char* flags : {"0 0", "1 0", "2 0", "3 0"}) {
     Installation i;
     WriteBytes(i.root() + "/vlttrace.txt", flags);
-    std::string text =
-        Printed(i, [&](OpenLinux& r) { CompareEmptyDictionaries(r, place / "fragment.vlr"); });
+    std::string text = Printed(i, [&](AccessibleLinuxRegistrar& r) {
+      CompareEmptyDictionaries(r, place / "fragment.vlr");
+    });
     if (*flags < '2') {
       EXPECT_EQ(text, "") << flags;
       continue;
@@ -399,7 +401,7 @@ TEST(vltPharlapDictionariesPrevious, PortConfigurationOptionsAreRefusedWithAWord
   WriteBytes(LastFolder(i) + "A.framework", "x");
   for (const char* flags : {"0 0", "1 0"}) {
     WriteBytes(i.root() + "/vlttrace.txt", flags);
-    std::string text = Printed(i, [&](OpenLinux& r) {
+    std::string text = Printed(i, [&](AccessibleLinuxRegistrar& r) {
       const unsigned char with[8] = {0, 0, 0, 0, 0x80};
       EXPECT_EQ(r.RemovePreviousDictionaries(reinterpret_cast<const _vltStartupOptions*>(with)),
                 E_FAIL);

@@ -9,7 +9,7 @@
 #include <chrono>
 #include <filesystem>
 
-#include "tests/e2e/Besieged.h"
+#include "tests/e2e/HostileInstallation.h"
 #include "tests/support/MemoryLimit.h"
 
 namespace vlt::test {
@@ -141,7 +141,7 @@ TEST(HostilePlaces, BundleNamesThatAnIniFileCannotHold) {
 
 TEST(HostilePlaces, RootsThatAnIniFileCannotHold) {
   for (const char* name : {"a=b", "[x]", ";x", "x Line0001", " x "}) {
-    Besieged b;
+    HostileInstallation b;
     TempDir place;
     std::string root = place.makeDir(name);
     fs::copy(b.root(), root, fs::copy_options::recursive);
@@ -197,7 +197,7 @@ TEST(HostilePlaces, InvalidTextInNamesUnderAnUtf8Locale) {
 // A full table of descriptors, at each degree: a refusal by result or exception, never a loss.
 TEST(HostilePlaces, AFullDescriptorTableLosesNothing) {
   if (!kCanLimitMemory) GTEST_SKIP() << "a sanitizer opens descriptors for its own checks";
-  Besieged b;
+  HostileInstallation b;
   b.plant(Component("Other", 1, "FileName = \"Other\"\n"));
   ExpectStart("ok");
   std::string good = b.root() + "/Data Dictionaries/Good.framework/Resources/Info.vlr";

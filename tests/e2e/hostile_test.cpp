@@ -9,7 +9,7 @@
 #include <chrono>
 #include <filesystem>
 
-#include "tests/e2e/Besieged.h"
+#include "tests/e2e/HostileInstallation.h"
 
 namespace vlt::test {
 namespace {
@@ -21,7 +21,7 @@ namespace fs = std::filesystem;
 TEST(Hostile, LongValuesAreKeptWholeAndReachTheClient) {
   for (size_t length :
        {255u, 259u, 260u, 261u, 1022u, 1023u, 1024u, 1025u, 4096u, 65535u, 65536u}) {
-    Besieged b;
+    HostileInstallation b;
     std::string value(length, 'v');
     b.plant(Component("Long", 1,
                       "FileName = \"/" + value + "\"\nPnP = \"" + value + "\"\nOther = \"" + value +
@@ -38,7 +38,7 @@ TEST(Hostile, LongValuesAreKeptWholeAndReachTheClient) {
 
 TEST(Hostile, LongNamesOfSectionsAndItems) {
   for (size_t length : {1023u, 1024u, 65536u}) {
-    Besieged b;
+    HostileInstallation b;
     std::string name(length, 'n');
     b.plant(Component(name, 1, name + "i = \"x\"\nFileName = \"f\"\n"));
     b.expectGood([&](IvltRegistrar& r) {
@@ -50,7 +50,7 @@ TEST(Hostile, LongNamesOfSectionsAndItems) {
 }
 
 TEST(Hostile, LongIdentifiersAndNumbersAreNoNumbers) {
-  Besieged b;
+  HostileInstallation b;
   std::string digits(65536, '9');
   b.plant("[KORComponents]\nA = \"A\"\n[A]\nIdentifier = \"" + digits +
           "\"\nSchemaVersion = " + digits + "\nLastInstalledSchemaVersion = -" + digits + "\n");
@@ -64,7 +64,7 @@ TEST(Hostile, LongIdentifiersAndNumbersAreNoNumbers) {
 
 TEST(Hostile, NulBytesEndLinesAndDecodedOnesEndValues) {
   using namespace std::string_literals;
-  Besieged b;
+  HostileInstallation b;
   b.plant(Component("Nul", 1, "FileName = \"a\0b\"\nPnP = \"x\\x00y\"\n"s + "\0\0\0[\0]\0=\0"s));
   b.expectGood([&](IvltRegistrar& r) {
     Received c;
@@ -74,7 +74,7 @@ TEST(Hostile, NulBytesEndLinesAndDecodedOnesEndValues) {
 }
 
 TEST(Hostile, LineEndsInValuesStayValues) {
-  Besieged b;
+  HostileInstallation b;
   b.plant(
       Component("Line", 1, "FileName = \"f\"\nPnP = \"a\\n[KOR]\\nConfigFile = x\\x0d[vltdd]\"\n"));
   b.expectGood([&](IvltRegistrar& r) {
@@ -99,7 +99,7 @@ TEST(Hostile, ListedValuesThatAreNoNamesBringNoLines) {
                                 R"(a\x00b)",
                                 R"(\t)"};
   for (const char* value : values) {
-    Besieged b;
+    HostileInstallation b;
     b.plant("[KORComponents]\nName = \"" + std::string(value) +
             "\"\nConfigFile = \"ConfigFile\"\n[Name]\nIdentifier = \"" + GText(1) + "\"\n");
     SCOPED_TRACE(value);
@@ -116,7 +116,7 @@ TEST(Hostile, ListedValuesThatAreNoNamesBringNoLines) {
 }
 
 TEST(Hostile, EveryByteInNamesAndValues) {
-  Besieged b;
+  HostileInstallation b;
   std::string bytes = "[KORComponents]\nBytes = \"Bytes\"\n[Bytes]\nIdentifier = \"" + GText(1) +
                       "\"\nFileName = \"";
   for (int c = 1; c < 256; ++c) {
@@ -130,7 +130,7 @@ TEST(Hostile, EveryByteInNamesAndValues) {
 
 TEST(Hostile, BrokenEscapesAtTheEndOfValues) {
   for (const char* tail : {"\\", "\\x", "\\x4", "\\xZZ", "\\q", "\\\\\\"}) {
-    Besieged b;
+    HostileInstallation b;
     b.plant(
         Component("Esc", 1, std::string("FileName = \"f") + tail + "\"\nPnP = p" + tail + "\n"));
     b.expectGood([](IvltRegistrar& r) { EXPECT_EQ(Find(r, G(1)), S_OK); });
@@ -149,7 +149,7 @@ TEST(Hostile, RandomBytesAndMarks) {
                                std::string(100000, '"'),
                                "]]]]\n[[[[\n====\n\"\"\"\"\n"};
   for (const std::string& text : texts) {
-    Besieged b;
+    HostileInstallation b;
     std::string file = b.plant(text);
     b.expectGood();
     bool utf16Or32 =
@@ -161,7 +161,7 @@ TEST(Hostile, RandomBytesAndMarks) {
 // ---- Many
 
 TEST(Hostile, AMillionSectionsTakeBoundedTime) {
-  Besieged b;
+  HostileInstallation b;
   std::string text = "[KORComponents]\nLast = \"Last\"\n";
   for (int n = 0; n < 1000000; ++n) text += "[s" + std::to_string(n) + "]\nk=1\n";
   b.plant(text + "[Last]\nIdentifier = \"" + GText(1) + "\"\n");
@@ -172,7 +172,7 @@ TEST(Hostile, AMillionSectionsTakeBoundedTime) {
 }
 
 TEST(Hostile, AHundredThousandComponentsTakeBoundedTime) {
-  Besieged b;
+  HostileInstallation b;
   std::string list = "[KORComponents]\n", sections;
   for (uint32_t n = 0; n < 100000; ++n) {
     std::string name = "c" + std::to_string(n);
@@ -189,7 +189,7 @@ TEST(Hostile, AHundredThousandComponentsTakeBoundedTime) {
 }
 
 TEST(Hostile, AHundredThousandComponentsOfOneFileNameTakeBoundedTime) {
-  Besieged b;
+  HostileInstallation b;
   std::string list = "[KORComponents]\n", sections;
   for (uint32_t n = 0; n < 100000; ++n) {
     std::string name = "c" + std::to_string(n);
@@ -203,7 +203,7 @@ TEST(Hostile, AHundredThousandComponentsOfOneFileNameTakeBoundedTime) {
 
 TEST(Hostile, ACountOfTwoThousandMillionClasses) {
   for (const char* count : {"2000000000", "99999999999999999999", "-1", "2147483648"}) {
-    Besieged b;
+    HostileInstallation b;
     std::string classes = "{" + GText(1) + "}:" + count + ":{" + GText(2) + "}";
     b.plant(Component("Many", 1, "FileName = \"Many\"\nBINDING_CLASSES = \"" + classes + "\"\n"));
     b.expectGood([&](IvltRegistrar& r) {
@@ -218,7 +218,7 @@ TEST(Hostile, ACountOfTwoThousandMillionClasses) {
 
 TEST(Hostile, ComponentsThatBearTheNamesOfTheLists) {
   for (const char* name : {"KOR", "KORComponents", "Registration", "VLRContentsSection"}) {
-    Besieged b;
+    HostileInstallation b;
     SCOPED_TRACE(name);
     b.plant(Component(name, 1));
     for (int start = 0; start < 2; ++start) {
@@ -234,7 +234,7 @@ TEST(Hostile, ComponentsThatBearTheNamesOfTheLists) {
 
 // Each start writes the built-in dictionary first, and merges over it only what has changed.
 TEST(Hostile, AComponentThatBearsTheBuiltInDictionarysNameHasItOnce) {
-  Besieged b;
+  HostileInstallation b;
   b.plant(Component("vltdd", 1));
   ExpectStart([](IvltRegistrar& r) { EXPECT_EQ(Find(r, kVltdd), E_INVALIDARG); });
   ExpectStart([](IvltRegistrar& r) { EXPECT_EQ(Find(r, kVltdd), S_OK); });
@@ -243,7 +243,7 @@ TEST(Hostile, AComponentThatBearsTheBuiltInDictionarysNameHasItOnce) {
 // A start that notices that the file has gone erases the component, not the section of that name.
 TEST(Hostile, RemovingAComponentThatBearsAListsNameLosesNoOtherComponent) {
   for (const char* name : {"KOR", "KORComponents", "Registration", "VLRContentsSection"}) {
-    Besieged b;
+    HostileInstallation b;
     SCOPED_TRACE(name);
     b.plant(Component(name, 1));
     ExpectStart("ok");
@@ -259,7 +259,7 @@ TEST(Hostile, RemovingAComponentThatBearsAListsNameLosesNoOtherComponent) {
 }
 
 TEST(Hostile, AFileThatBringsTheListsThemselves) {
-  Besieged b;
+  HostileInstallation b;
   b.plant("[KOR]\nSchemaVersion = 99\nConfigFile = \"/evil\"\nCacheSize = words\n[Registration]\n" +
           b.root() + "/Data Dictionaries/Good.framework/Resources/Info.vlr = \"1 1\"\n" +
           "[VLRContentsSection]\nvltdd = \"/gone\"\nOther = \"" + b.root() + "/gone/Info.vlr\"\n");
@@ -273,7 +273,7 @@ TEST(Hostile, AFileThatBringsTheListsThemselves) {
 // Raised at each start, with the lock free and the database as it was: a client can put it right.
 // It names no registration file. The component that it was planted for goes, and nothing is raised.
 TEST(Hostile, ARelativePathPlantedInTheContentsGoes) {
-  Besieged b;
+  HostileInstallation b;
   ExpectStart("ok");
   std::string file = b.plant("[VLRContentsSection]\nx = \"relative/path\"\n");
   for (int start = 0; start < 2; ++start) {
@@ -287,7 +287,7 @@ TEST(Hostile, ARelativePathPlantedInTheContentsGoes) {
 // The name of the section that is written without a header: its items must not fall to the list of
 // contents, or to any other section that happens to stand before.
 TEST(Hostile, TheHeaderlessSectionIsLeftOut) {
-  Besieged b;
+  HostileInstallation b;
   b.plant("[KORComponents]\nN = \"N\"\n");
   ExpectStart("ok");
   b.plant("[(null)]\nSchemaVersion = 5\nx = \"relative\"\n[ (null) ]\ny = \"z\"\n" +
@@ -300,7 +300,7 @@ TEST(Hostile, TheHeaderlessSectionIsLeftOut) {
 }
 
 TEST(Hostile, TwoSectionsWithOneIdentifierAndAListWithoutSections) {
-  Besieged b;
+  HostileInstallation b;
   b.plant(
       "[KORComponents]\nA = \"A\"\nB = \"B\"\nNowhere = \"Nowhere\"\nNowhere2 = \"x\"\n[A]\n"
       "Identifier = " +
@@ -316,7 +316,7 @@ TEST(Hostile, TwoSectionsWithOneIdentifierAndAListWithoutSections) {
 }
 
 TEST(Hostile, ANewFileMayTakeTheGoodOnesIdentifierButNotItsPlace) {
-  Besieged b;
+  HostileInstallation b;
   b.plant(Component("Thief", kGood, "FileName = \"Thief\"\n"));
   ExpectStart("ok", [](IvltRegistrar& r) {
     Received c;

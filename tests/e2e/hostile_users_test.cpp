@@ -9,7 +9,7 @@
 #include <chrono>
 #include <filesystem>
 
-#include "tests/e2e/Besieged.h"
+#include "tests/e2e/HostileInstallation.h"
 
 namespace vlt::test {
 namespace {
@@ -38,7 +38,7 @@ class HostileUsers : public testing::Test {
     });
   }
 
-  Besieged b;
+  HostileInstallation b;
 };
 
 TEST_F(HostileUsers, AnUnreadableRegistrationFileIsSkippedAndNotLost) {

@@ -1,7 +1,8 @@
-// What a user without rights plants among the shared files before the superuser's process starts: links to
-// the superuser's or another user's private files and directories, pipes, devices, sockets, further names
-// of private files. After two starts, with saves and calls on the jar, every private file and directory is as
-// it was, what is in them is in no file that others may read, and what is no regular file was not opened.
+// What a user without rights plants among the shared files before the superuser's process starts:
+// links to the superuser's or another user's private files and directories, pipes, devices,
+// sockets, further names of private files. After two starts, with saves and calls on the jar, every
+// private file and directory is as it was, what is in them is in no file that others may read, and
+// what is no regular file was not opened.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/socket.h>
@@ -14,7 +15,7 @@
 #include <filesystem>
 #include <map>
 
-#include "tests/e2e/Besieged.h"
+#include "tests/e2e/HostileInstallation.h"
 #include "tests/e2e/Promises.h"
 #include "tests/support/TracedChild.h"
 
@@ -183,7 +184,7 @@ class Planted : public testing::Test {
 
   // Plants at the place below the root, in a fresh installation that has run once, and starts.
   void attack(const std::string& place, Kind kind, uid_t victim) {
-    Besieged b;
+    HostileInstallation b;
     Secrets secrets(victim);
     chmod(fs::path(b.root()).parent_path().c_str(), 0755);
     ExpectStart("ok");
@@ -214,7 +215,8 @@ class Planted : public testing::Test {
       }
     }
     // A file that has two names is a file: what is read from it is used. A kernel with
-    // fs.protected_hardlinks lets no user make such a name; its mode and bytes are ours to leave alone.
+    // fs.protected_hardlinks lets no user make such a name; its mode and bytes are ours to leave
+    // alone.
     if (kind == Kind::HardLink) {
       shown = shown.empty() ? "" : " (read:" + shown + ")";
     } else {
@@ -372,7 +374,7 @@ TEST_F(Planted, LinksInTheMiddleOfAPath) {
        {"Data/vltjar.ini", "Data/kor.ini", "Data Dictionaries/Last/Old.framework",
         "Experts/Planted.vle/Resources/Info.vlr"}) {
     for (uid_t victim : {uid_t{0}, kVictim}) {
-      Besieged b;
+      HostileInstallation b;
       Secrets secrets(victim);
       chmod(fs::path(b.root()).parent_path().c_str(), 0755);
       ExpectStart("ok");
@@ -389,7 +391,7 @@ TEST_F(Planted, LinksInTheMiddleOfAPath) {
 // The directory of the locks, and the level above it.
 TEST_F(Planted, LinksToPrivateDirectoriesInPlaceOfTheSharedOnes) {
   for (const char* place : {"shared", "shared/mutex"}) {
-    Besieged b;
+    HostileInstallation b;
     Secrets secrets(0);
     TempDir open;
     chmod(open.path().c_str(), 0777);
@@ -406,7 +408,7 @@ TEST_F(Planted, LinksToPrivateDirectoriesInPlaceOfTheSharedOnes) {
 
 // What the administrator has linked on purpose counts.
 TEST_F(Planted, LinksOfTheSuperuserAreFollowed) {
-  Besieged b;
+  HostileInstallation b;
   TempDir elsewhere;
   std::string data = elsewhere.makeDir("Data");
   chmod(data.c_str(), 0777);
@@ -425,7 +427,7 @@ TEST_F(Planted, LinksOfTheSuperuserAreFollowed) {
 TEST_F(Planted, WhatIsNoLockFileInPlaceOfOne) {
   for (Kind kind : {Kind::LinkToFile, Kind::DanglingLink, Kind::HardLink, Kind::Pipe, Kind::Device,
                     Kind::Socket, Kind::Directory}) {
-    Besieged b;
+    HostileInstallation b;
     Secrets secrets(0);
     ExpectStart("ok");
     std::string lock;
@@ -448,7 +450,7 @@ class PlantedBundle : public Planted {
  protected:
   // A bundle of another user's, registered while it was open, and closed after that.
   void expectStartOfNobody(const std::string& closed, mode_t mode) {
-    Besieged b;
+    HostileInstallation b;
     chmod(b.root().c_str(), 0777);
     chmod(fs::path(b.root()).parent_path().c_str(), 0755);
     chmod(getenv("ZTFNDTMPSHAREDFILEDIR"), 0777);

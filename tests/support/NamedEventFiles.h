@@ -8,8 +8,8 @@
 
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
-#include "zt/fnd/osdep/events/EventStateFile.h"
 #include "zt/fnd/osdep/NamedEvent.h"
+#include "zt/fnd/osdep/events/EventStateFile.h"
 
 namespace vlt::test {
 

@@ -12,8 +12,8 @@
 
 namespace vlt::test {
 
-// Opens up what clients do not see.
-class OpenLinux : public CvltLinuxRegistrar {
+// Makes accessible to tests what clients do not see.
+class AccessibleLinuxRegistrar : public CvltLinuxRegistrar {
  public:
   using CvltLinuxRegistrar::CvltLinuxRegistrar;
   using CvltPharlapRegistrar::AddBindingClasses;
@@ -24,7 +24,7 @@ class OpenLinux : public CvltLinuxRegistrar {
 };
 
 // The parent by itself; nothing is opened without `init`.
-class OpenPharlap : public CvltPharlapRegistrar {
+class AccessiblePharlapRegistrar : public CvltPharlapRegistrar {
  public:
   using CvltPharlapRegistrar::CvltPharlapRegistrar;
   using CvltPharlapRegistrar::database;
@@ -51,11 +51,11 @@ class Started {
 
 inline zt::fnd::String S(const std::string& text) { return zt::fnd::String(text.c_str()); }
 
-struct LinuxStart : Started<OpenLinux> {
+struct LinuxStart : Started<AccessibleLinuxRegistrar> {
   explicit LinuxStart(const Installation& i) : Started(S(i.database()), S(i.root())) {}
 };
 
-struct PharlapStart : Started<OpenPharlap> {
+struct PharlapStart : Started<AccessiblePharlapRegistrar> {
   explicit PharlapStart(const Installation& i) : Started(S(i.database()), S(i.root()), true) {}
 };
 

@@ -11,7 +11,7 @@
 #include <vector>
 
 #include "tests/support/Child.h"
-#include "tests/support/Heir.h"
+#include "tests/support/InheritingChild.h"
 #include "tests/support/MutexPlace.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/Sanitizer.h"
@@ -24,9 +24,9 @@ namespace {
 using vlt::test::BlockedIn;
 using vlt::test::Child;
 using vlt::test::Eventually;
-using vlt::test::ExecHeir;
 using vlt::test::FileIsFree;
-using vlt::test::Heir;
+using vlt::test::InheritingChild;
+using vlt::test::InheritingProgram;
 using vlt::test::kCanForkWhileThreadsAllocate;
 using vlt::test::MutexPlace;
 using vlt::test::Wide;
@@ -175,7 +175,7 @@ TEST(MutexFork, GrandchildRenewsAgain) {
 
 TEST(MutexFork, LockOfAKilledParentDoesNotLiveOnInTheChild) {
   MutexPlace place;
-  Heir heir;
+  InheritingChild heir;
   Child holder([&] {
     Mutex mutex(L"name"), other(L"other");
     mutex.lock();
@@ -209,7 +209,7 @@ TEST(MutexFork, ChildDoesNotCloseADescriptorThatIsNoLongerTheMutexs) {
 
 TEST(MutexFork, ReopenedFileIsNotKeptByAChildEither) {
   MutexPlace place;
-  Heir heir;
+  InheritingChild heir;
   Child holder([&] {
     Mutex mutex(L"name");
     unlink(place.file("name").c_str());
@@ -228,7 +228,7 @@ TEST(MutexFork, ReopenedFileIsNotKeptByAChildEither) {
 
 TEST(MutexFork, ProgramStartedByExecKeepsNoLock) {
   MutexPlace place;
-  ExecHeir program;
+  InheritingProgram program;
   Child holder([&] {
     Mutex mutex(L"name");
     mutex.lock();

@@ -13,7 +13,7 @@
 #include "tests/support/Child.h"
 #include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
-#include "tests/support/Heir.h"
+#include "tests/support/InheritingChild.h"
 #include "tests/support/MutexPlace.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/Sanitizer.h"
@@ -29,10 +29,10 @@ using vlt::test::BlockedIn;
 using vlt::test::Child;
 using vlt::test::EventPlace;
 using vlt::test::Eventually;
-using vlt::test::ExecHeir;
 using vlt::test::Exists;
 using vlt::test::FileIsFree;
-using vlt::test::Heir;
+using vlt::test::InheritingChild;
+using vlt::test::InheritingProgram;
 using vlt::test::kAutomatic;
 using vlt::test::kCanForkWhileThreadsAllocate;
 using vlt::test::kClear;
@@ -154,7 +154,7 @@ TEST(NamedEventFork, ParentClosesWhileAChildLives) {
 
 TEST(NamedEventFork, ProgramStartedByExecHoldsNothing) {
   EventPlace place;
-  ExecHeir program;
+  InheritingProgram program;
   Child holder([&] {
     auto event = Open("name");
     program.fork();
@@ -174,7 +174,7 @@ TEST(NamedEventFork, ProgramStartedByExecHoldsNothing) {
 TEST(NamedEventFork, OpeningCutOffByForkAndKillBlocksNobody) {
   EventPlace place;
   Mutex stateFiles{String(kStateFileMutex)};
-  Heir heir;
+  InheritingChild heir;
   stateFiles.lock();
   Child parent([&] {
     std::thread opener([] { Open("name"); });

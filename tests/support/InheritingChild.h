@@ -14,7 +14,7 @@
 namespace vlt::test {
 
 // A plain child of whoever calls fork(): says so, lives until it is told to end, and ends.
-class Heir {
+class InheritingChild {
  public:
   // In the process that is to have it. Returns there only.
   void fork() const {
@@ -31,18 +31,18 @@ class Heir {
 };
 
 // The same, as another program, started by exec.
-class ExecHeir {
+class InheritingProgram {
  public:
-  ExecHeir() {
+  InheritingProgram() {
     if (pipe2(m_feed, O_CLOEXEC) != 0 || pipe2(m_output, O_CLOEXEC) != 0) {
       throw std::system_error(errno, std::generic_category(), "pipe2");
     }
   }
-  ~ExecHeir() {
+  ~InheritingProgram() {
     for (int fd : {m_feed[0], m_feed[1], m_output[0], m_output[1]}) close(fd);
   }
-  ExecHeir(const ExecHeir&) = delete;
-  ExecHeir& operator=(const ExecHeir&) = delete;
+  InheritingProgram(const InheritingProgram&) = delete;
+  InheritingProgram& operator=(const InheritingProgram&) = delete;
 
   void fork() const {
     if (::fork() != 0) return;

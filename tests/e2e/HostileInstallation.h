@@ -5,17 +5,17 @@
 
 #include "tests/e2e/Start.h"
 
-// Registration files and installations as an enemy makes them. Each ends in its proper outcome, or with
-// the component skipped: no crash, no hang, no lost database. What stands beside the hostile file stays
-// available.
+// Registration files and installations as an enemy makes them. Each ends in its proper outcome, or
+// with the component skipped: no crash, no hang, no lost database. What stands beside the hostile
+// file stays available.
 namespace vlt::test {
 
 inline constexpr uint32_t kGood = 0x600D;
 
 // An installation with a component that must come through whatever else is in it.
-class Besieged : public Installation {
+class HostileInstallation : public Installation {
  public:
-  Besieged() { addDictionary("Good", "Good", GText(kGood), 3, "g"); }
+  HostileInstallation() { addDictionary("Good", "Good", GText(kGood), 3, "g"); }
 
   // The hostile file, with the good one twice around it.
   std::string plant(const std::string& bytes, const std::string& bundle = "Hostile.vle") {
