@@ -35,7 +35,7 @@ struct NameLess {
   }
 };
 
-struct Question {
+struct ResourceQuery {
   const char* separator;
   std::string target;  // base name of the component's file
   std::string key;
@@ -57,7 +57,7 @@ struct vltStringResources::Database {
   Database(const Database&) = delete;
   Database& operator=(const Database&) = delete;
 
-  void answer(Question& q);
+  void answer(ResourceQuery& q);
   bool fileNameOf(const char* section, std::string* base);
   bool take(Question& q, const char* section);
   void search(Question& q);
@@ -105,7 +105,7 @@ bool vltStringResources::Database::fileNameOf(const char* section, std::string* 
 }
 
 // Adds the text of one component. True if the search is over.
-bool vltStringResources::Database::take(Question& q, const char* section) {
+bool vltStringResources::Database::appendFrom(ResourceQuery& q, const char* section) {
   if (IniItemExists(document, section, q.key.c_str()) == 1) {
     TaskMem<char> text(static_cast<char*>(q.maxLength ? vltTaskMemAlloc(q.maxLength) : nullptr));
     if (!text && q.maxLength) q.outOfMemory = true;
@@ -138,7 +138,7 @@ const char* vltStringResources::Database::indexNext(std::string* base) {
   return section;
 }
 
-void vltStringResources::Database::answer(Question& q) {
+void vltStringResources::Database::answer(ResourceQuery& q) {
   if (!document) return;
   if (IniSectionExists(document, kComponents) != 1) {
     if (Warns()) {
@@ -216,7 +216,8 @@ HRESULT vltStringResources::get(const char* separator, const wchar_t* file, cons
                                 char** out, unsigned maxLength) {
   if (!out) return E_POINTER;
   std::string narrowFile = zt::fnd::AnsiString(file ? file : L"").c_str();
-  Question q{separator, "", zt::fnd::AnsiString(key ? key : L"").c_str(), maxLength, "", E_FAIL};
+  ResourceQuery q{separator, "", zt::fnd::AnsiString(key ? key : L"").c_str(),
+                  maxLength, "", E_FAIL};
   // Without a slash there is no base name to look for.
   if (narrowFile.find('/') != std::string::npos) q.target = BaseName(narrowFile);
   Database* database = databaseFor(narrowFile);
