@@ -9,8 +9,8 @@
 #include "tools/storm/Process.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/NamedEvent.h"
-#include "zt/fnd/osdep/events/NamedEventGlobalStatics.h"
 #include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/events/NamedEventGlobalStatics.h"
 
 namespace storm {
 namespace {

@@ -12,8 +12,8 @@
 
 #include "tools/vltctl/Reading.h"
 #include "zt/fnd/String.h"
-#include "zt/fnd/osdep/events/EventStateFile.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
+#include "zt/fnd/osdep/events/EventStateFile.h"
 #include "zt/posix/ScopedFd.h"
 
 namespace admin {
