@@ -20,9 +20,9 @@
 #include "fuzz/Bytes.h"
 #include "fuzz/Place.h"
 #include "zt/fnd/String.h"
-#include "zt/fnd/osdep/events/EventStateFile.h"
 #include "zt/fnd/osdep/NamedEvent.h"
 #include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/events/EventStateFile.h"
 
 // Time passes without being waited for, and fast: a sleep moves the clock that deadlines are told by.
 // Otherwise most of the run would be spent in the two seconds that an opening has.

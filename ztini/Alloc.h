@@ -8,6 +8,10 @@
 
 namespace ztini {
 
+// The engine has containers of its own (List, NameList, NameIndex, Arena, TextBuffer) because
+// memory may run out at any call, which is then a status: the standard ones report it by
+// exceptions, and nothing throws here.
+//
 // Every block of the engine comes from this function and goes back through free(), so that texts
 // handed to callers are ordinary malloc blocks. It is realloc; tests put a failing one in its
 // place, before they start threads.

@@ -11,7 +11,8 @@
 #include "ztini/NameList.h"
 #include "ztini/ztini.h"
 
-// The records behind the engine's handles. Callers outside see the functions of ztini.h only.
+// The records that the engine's handles refer to. Callers outside see the functions of ztini.h
+// only.
 //
 // What is read lies in the document's arena and in the text of its file: records, names and values take
 // no malloc block each, and go when the document is emptied. What is put, and a name or value that is changed, has a block of its
@@ -64,7 +65,7 @@ struct IniStructForwardReferenceTag {
   ztini::NameFold fold;
   ztini::NameList sections{&fold};       // of IniSection
   IniSection* currentSection = nullptr;  // the section last found, asked first
-  int32_t sectionFlags = 0;              // copied into new sections, read by nobody
+  int32_t sectionFlags = 0;              // copied into new sections, never read
   int32_t duplicateChecking = 1;
   int32_t caseSensitive = 0;
   int32_t lastItemLine = -1;       // of the item last fetched by IniGet
@@ -100,8 +101,8 @@ IniSection* IniReadSection(IniStructForwardReferenceTag* doc, char* name);
 IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, size_t nameLength,
                        char* value, size_t valueLength);
 
-// Frees the record and what it holds, but for what lies in the arena; it must be in no list. Null is
-// allowed.
+// Frees the record and what it holds, but for what lies in the arena; it must be in no list. Null
+// is allowed.
 void IniDisposeSection(IniSection* section);
 void IniDisposeEntry(IniEntry* entry);
 
@@ -116,7 +117,7 @@ bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section);
 bool IniAppendEntry(IniSection* section, IniEntry* entry);
 
 // IniFindSection and IniFindEntry for those who ask again and again: 0 with the record or null, or
-// kIniOutOfMemory with null where only a scan of many names could tell.
+// kIniOutOfMemory with null where only a scan of many names could find it.
 int32_t IniSeekSection(IniStructForwardReferenceTag* doc, const char* name, IniSection** found);
 int32_t IniSeekEntry(IniStructForwardReferenceTag* doc, IniSection* section, const char* name,
                      IniEntry** found);

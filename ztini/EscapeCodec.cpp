@@ -11,7 +11,7 @@ namespace {
 
 constexpr size_t kLongestSequence = 4;
 
-// The letter behind the backslash, 0 for none, 'x' for a byte in digits.
+// The letter after the backslash, 0 for none, 'x' for a byte in digits.
 char EscapeLetter(char c) {
   switch (c) {
     case '\t':

@@ -11,7 +11,7 @@ namespace ztini {
 
 // Names of the temporary file beside a target; null without memory.
 
-// The target with its extension replaced by "TMP". What has no extension behind its last slash, has
+// The target with its extension replaced by "TMP". What has no extension after its last slash, has
 // no slash, or ends in ".TMP" already, gets ".TMP" appended.
 char* SiblingTemporaryName(const char* target);
 

@@ -23,7 +23,8 @@ constexpr char kExtension[] = "TMP";
 constexpr char kUniqueName[] = "ini$$.TMPXXXXXX";
 constexpr mode_t kUniqueMode = 0644;
 constexpr mode_t kNewFileMode = 0666;  // less the process's mask
-// Without set-user-id and set-group-id, which the owner of the old file may not give a file of ours.
+// Without set-user-id and set-group-id, which the owner of the old file may not give a file of
+// ours.
 constexpr mode_t kModeBits = 01777;
 
 // The first `length` bytes of the head and the tail.
@@ -36,7 +37,7 @@ char* Join(const char* head, size_t length, const char* tail) {
   return text;
 }
 
-// Whether a file could be made at a path where there is none; leaves none behind. Another process's
+// Whether a file could be made at a path where there is none; leaves none. Another process's
 // file, made meanwhile, is neither emptied nor removed.
 bool CanCreate(const char* path) {
   ScopedFd fresh = zt::posix::CreateNew(path, O_WRONLY, kNewFileMode);
@@ -107,7 +108,7 @@ ScopedFd FileReplacement::openUnique() {
   return fd;
 }
 
-// A writer that was killed leaves the sibling behind, perhaps as another user's file that cannot be
+// A writer that was killed leaves the sibling, perhaps as another user's file that cannot be
 // opened; and nothing planted at its name may be written through.
 ScopedFd FileReplacement::openSibling() {
   if (zt::posix::MakeRoom(m_temporary.get()) != 0) return ScopedFd();
@@ -130,8 +131,8 @@ void FileReplacement::inheritFromTarget() {
   }
 }
 
-// Some file systems report at the close what they could not write. An interrupted close has closed the
-// descriptor all the same.
+// Some file systems report at the close what they could not write. An interrupted close has closed
+// the descriptor all the same.
 int32_t FileReplacement::closeFile() {
   return close(m_file.release()) == 0 || errno == EINTR ? 0 : kIniWriteFailed;
 }

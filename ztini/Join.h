@@ -5,8 +5,8 @@
 
 #include "ztini/ztini.h"
 
-// A value that was too long for one line stands in the file as several items, "Name Line0001",
-// "Name Line0002" and so on. Reading puts them together again.
+// A value that was too long for one line is in the file as several items, "Name Line0001",
+// "Name Line0002" and so on. Writer.cpp splits it; reading puts the pieces together again here.
 
 inline constexpr size_t kIniLongestBaseName = 255;
 

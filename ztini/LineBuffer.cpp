@@ -7,7 +7,7 @@ namespace ztini {
 namespace {
 
 constexpr size_t kFirstCapacity = 256;
-// A line function that stores nothing and ends nothing would double the buffer for ever.
+// A line function that stores nothing and ends nothing would double the buffer indefinitely.
 constexpr int kMostIdleCalls = 2;
 
 }  // namespace

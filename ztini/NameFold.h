@@ -8,7 +8,7 @@ namespace ztini {
 // still is that one.
 //
 // Names compare in the process locale, which may change between two calls on a document. An index
-// over names holds only as long as the tables that it was built with; the generation tells.
+// over names holds only as long as the tables that it was built with; the generation shows it.
 class NameFold {
  public:
   NameFold();

@@ -79,7 +79,8 @@ class NameIndex {
     uint32_t hash;
     uint32_t head;  // kNoSequence: free
   };
-  // A node among others of its name. Chains are rings backwards: the first one's `prev` is the last.
+  // A node among others of its name. Chains are rings backwards: the first one's `prev` is the
+  // last.
   struct Twin {
     uint32_t sequence;
     uint32_t next;  // 0 after the last; of an unused record, the next unused one
@@ -102,7 +103,7 @@ class NameIndex {
   size_t m_used = 0;
   Twin* m_twins = nullptr;  // from 1; 0 is no twin
   uint32_t m_twinCapacity = 0;
-  uint32_t m_twinEnd = 1;     // behind the last one ever used
+  uint32_t m_twinEnd = 1;     // after the last one ever used
   uint32_t m_unusedTwin = 0;  // first of the unused ones before that
   uint32_t m_generation = 0;
 };

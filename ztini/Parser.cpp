@@ -59,7 +59,7 @@ class ItemKeys {
   bool m_good = false;
 };
 
-// Where a line stands in the document while it is built. A line's text is cut in place.
+// A line's place in the document while it is built. A line's text is cut in place.
 class DocumentBuilder {
  public:
   DocumentBuilder(IniStructForwardReferenceTag* doc, TextLife life) : m_doc(doc), m_life(life) {}

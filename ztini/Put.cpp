@@ -5,6 +5,8 @@
 #include "ztini/Settled.h"
 #include "ztini/StringTools.h"
 
+// Storing values: everything new is complete before it is appended, so that a call that runs out of
+// memory leaves the document as it was.
 namespace {
 
 using Doc = IniStructForwardReferenceTag;

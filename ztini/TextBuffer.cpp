@@ -12,6 +12,7 @@ bool TextBuffer::fit(size_t length) {
   const size_t capacity = length * 2 < 256 ? 256 : length * 2;
   void* text = Reallocate(m_text.get(), capacity);
   if (!text) return false;
+  // realloc has taken the old block.
   (void)m_text.release();
   m_text.reset(static_cast<char*>(text));
   m_capacity = capacity;

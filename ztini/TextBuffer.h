@@ -8,7 +8,8 @@
 
 namespace ztini {
 
-// Text that grows without throwing. Appending after a failure does nothing; ok() tells at the end.
+// Text that grows without throwing. Appending after a failure does nothing; ok() reports it at the
+// end.
 class TextBuffer {
  public:
   void clear() {

@@ -6,6 +6,9 @@
 #include "ztini/EscapeCodec.h"
 #include "ztini/StringTools.h"
 
+// Reading values. IniGet finds the stored text; what is converted goes to the caller's variable,
+// and text without its escapes into the document's scratch block, where it lasts until the next
+// one.
 namespace {
 
 using Doc = IniStructForwardReferenceTag;

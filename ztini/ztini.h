@@ -99,8 +99,8 @@ IniDurability IniSetDurability(IniStructForwardReferenceTag* doc, IniDurability 
 // ---- Reading. Empties the document first; a failed read leaves what was read so far.
 
 // kIniCannotOpen, kIniUnsupportedEncoding and a failed first allocation leave the document as it
-// was. A named pipe, a device, a file of more than 256 MiB and a symbolic link that another user may
-// have planted (zt/posix/Files.h) cannot be opened; the call never waits.
+// was. A named pipe, a device, a file of more than 256 MiB and a symbolic link that another user
+// may have planted (zt/posix/Files.h) cannot be opened; the call never waits.
 int32_t IniReadFromFile(IniStructForwardReferenceTag* doc, const char* path);
 int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* file);
 int32_t IniRead(IniStructForwardReferenceTag* doc, IniLineInputFunction input, void* context);
@@ -195,8 +195,9 @@ int32_t IniPutDouble(IniStructForwardReferenceTag* doc, const char* section, con
 
 // With kIniWriteSafely a failure leaves the target exactly as it was, and the new file has the old
 // one's mode, owner and group. The exception: with IniDurability::Synced the new file is in place
-// although kIniWriteFailed is returned, where its directory could not be synced. Without it a failed write deletes the target. Never waits for a
-// named pipe; targets other than regular files are refused.
+// although kIniWriteFailed is returned, where its directory could not be synced. Without it a
+// failed write deletes the target. Never waits for a named pipe; targets other than regular files
+// are refused.
 int32_t IniWriteToFile(IniStructForwardReferenceTag* doc, const char* path);
 
 // Tells one state of a file from another without reading it.
@@ -237,9 +238,9 @@ int32_t IniFileOutputFunc(void* file, const char* line);
 // The text as it is; kIniWriteFailed if not all of it could be written.
 int32_t ztini_WriteStringToFile(FILE* file, const char* text);
 
-// Syncs a file that was written without IniDurability::Synced, and its directory, so that many saves
-// can share the wait of one. 0, kIniBadPath or kIniWriteFailed.
+// Syncs a file that was written without IniDurability::Synced, and its directory, so that many
+// saves can share the wait of one. 0, kIniBadPath or kIniWriteFailed.
 int32_t ztini_SyncFile(const char* path);
 
-// Does nothing if there is none; tells nothing.
+// Does nothing if there is none; reports nothing.
 void ztini_RemoveFileIfExists(const char* path);

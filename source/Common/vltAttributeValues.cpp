@@ -19,7 +19,7 @@ template <class T>
 using ArrayGetter = HRESULT (IvltObject::*)(vltAttributeID, uint32_t capacity, T* buffer,
                                             uint32_t* count);
 
-// A step that hands out an interface. A failed one hands out no reference, whatever it wrote.
+// A step that returns an interface. A failed one returns no reference, whatever it wrote.
 template <class I, class Step>
 HRESULT Obtain(CztComPtr<I>* out, Step step) {
   I* found = nullptr;
@@ -37,7 +37,7 @@ GUID IdentityOf(IvltObject* object) {
   return id;
 }
 
-// ---- Array elements. Each appends its text and gives back what the storage handed out.
+// ---- Array elements. Each appends its text and gives back what the storage returned.
 
 void AppendText(String& text, wchar_t* element) {
   TaskMem<wchar_t> owned(element);
@@ -122,7 +122,7 @@ HRESULT ReportOutOfMemory() {
       "zt::fnd::String&)");
 }
 
-// Elements go back as soon as they are told.
+// Elements go back as soon as they are written.
 template <class Kind>
 void AppendElements(ElementBuffer<Kind>& buffer, String& text) {
   for (auto& element : buffer) {

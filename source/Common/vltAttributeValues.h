@@ -4,11 +4,11 @@
 // class; objects, classes and meta attributes are the storage's own (source/Utilities/
 // vltInterfaces.h), and a success of theirs with a null class or meta attribute aborts the process.
 //
-// Every reference and text that the storage hands out is given back, also when an exception leaves:
-// std::bad_alloc or zt::fnd::exception::OutOfRange of the texts, nothing else. Texts handed out are
-// vltTaskMemAlloc blocks. Results beside those told: E_POINTER for a null object or out-pointer, and
-// the storage's as they come. A text that memory does not suffice for is null whatever the result, in
-// a list it is empty: test it. Threads: as the storage allows.
+// Every reference and text that the storage returns is given back, also when an exception leaves:
+// std::bad_alloc or zt::fnd::exception::OutOfRange of the texts, nothing else. Returned texts are
+// vltTaskMemAlloc blocks. Results beside those documented: E_POINTER for a null object or
+// out-pointer, and the storage's as they come. A text that memory does not suffice for is null
+// whatever the result, in a list it is empty: test it. Threads: as the storage allows.
 
 #include "source/Common/vltInterfaces.h"
 #include "zt/fnd/StringFwd.h"

@@ -22,7 +22,7 @@ GUID GuidField(const String& text, unsigned begin, unsigned end) {
 }
 
 // Reads up to n fields from `next`, the separator in front of the first. Leaves `next` at the
-// separator behind the last one, or at npos at the end of the text, which also bounds a count out
+// separator after the last one, or at npos at the end of the text, which also bounds a count out
 // of nowhere.
 Vector<GUID> ClassFields(const String& text, long n, unsigned* next) {
   Vector<GUID> classes;
@@ -60,7 +60,7 @@ Vector<GUID> CvltBindingClasses::GetComponentVector() const {
       components.push_back(component);
     }
   } catch (const std::bad_alloc&) {
-    // Without memory no component of the table can be told; the registrar goes on without it.
+    // Without memory no component of the table can be reported; the registrar goes on without it.
     components.clear();
     vltReportOutOfMemory("zt::fnd::Vector<_GUID> CvltBindingClasses::GetComponentVector() const");
   }
@@ -89,7 +89,7 @@ void vltAddBindingClasses(const _vltComponent2* record, const CvltBindingClasses
       entered.push_back(map->emplace(wanted[i], record->identifier));
     }
   } catch (const std::bad_alloc&) {
-    // All or nothing: half of an expert's classes would send its objects to somebody else.
+    // All or nothing: half of an expert's classes would send its objects to another expert.
     for (auto entry : entered) map->erase(entry);
     vltReportOutOfMemory(
         "void vltAddBindingClasses(const vltComponent2*, const CvltBindingClasses&, "

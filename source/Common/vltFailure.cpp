@@ -27,14 +27,14 @@ std::unique_ptr<NamedEvent> OpenLockdown() {
   try {
     return std::make_unique<NamedEvent>(zt::fnd::String(L"LockdownVLTEvent"), true, true);
   } catch (const std::exception&) {
-    // There is none to be had where memory is really out, or semaphores, or where the place of the
-    // events is closed. The caller's result tells what has failed; this must not take its place.
+    // None is available where memory or semaphores are really out, or where the place of the
+    // events is closed. The caller's result reports what has failed; this must not take its place.
     return nullptr;
   }
 }
 
-// Whoever wants to know holds the event open; without such a process the signal is for nobody, and
-// the event goes again with this object.
+// Whoever wants to know holds the event open; without such a process the signal has no receiver,
+// and the event goes again with this object.
 void SignalLockdown() {
   if (std::unique_ptr<NamedEvent> lockdown = OpenLockdown()) lockdown->set();
 }

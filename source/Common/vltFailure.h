@@ -11,8 +11,8 @@ inline constexpr unsigned kTraceErrors = 2;
 // Never fails: a message that cannot be formed is lost.
 void vltTraceError(const char* format, ...) __attribute__((format(printf, 1, 2)));
 
-// Tells other processes and the log that memory ran out in the function with this signature: signals
-// the named event "LockdownVLTEvent" and traces a line. Returns E_OUTOFMEMORY, so that callers can end
-// with it. May wait for other processes that open or close the event, up to half a second. Where no
-// event can be had nobody is told; throws what NamedEvent::set throws.
+// Reports to other processes and the log that memory ran out in the function with this signature:
+// signals the named event "LockdownVLTEvent" and traces a line. Returns E_OUTOFMEMORY, so that
+// callers can end with it. May wait for other processes that open or close the event, up to half a
+// second. Where no event is available there is no report; throws what NamedEvent::set throws.
 HRESULT vltReportOutOfMemory(const char* signature);

@@ -3,7 +3,7 @@
 // Names of the points where a fault can be injected.
 //
 // The texts are frozen: hook files in the field name them. They look like places in the source, and
-// once were; they do not follow the code any more. TestHookNT stands before an allocation that
+// once were; they do not follow the code any more. TestHookNT is before an allocation that
 // reports failure by a result, TestHook before one that throws.
 namespace vlt::hook {
 

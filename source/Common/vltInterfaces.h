@@ -19,7 +19,7 @@ struct IvltEnumComponent : IUnknown {
   ~IvltEnumComponent() = default;
 };
 
-// Walks texts; each text handed out is freed with vltFree. RemoteNext stands in slot 4.
+// Walks texts; each returned text is freed with vltFree. RemoteNext is slot 4.
 struct IEnumString : IUnknown {
   virtual HRESULT Next(unsigned int count, wchar_t** strings, unsigned int* fetched) = 0;
   virtual HRESULT RemoteNext(unsigned int count, wchar_t** strings, unsigned int* fetched) = 0;
@@ -31,7 +31,7 @@ struct IEnumString : IUnknown {
   ~IEnumString() = default;
 };
 
-// The registrar. Texts handed out are freed with vltFree.
+// The registrar. Returned texts are freed with vltFree.
 struct IvltRegistrar : IUnknown {
   virtual HRESULT GetConfigurationPath(wchar_t** path) = 0;
   virtual HRESULT SetConfigurationPath(const wchar_t* path) = 0;
@@ -74,7 +74,7 @@ struct IvltPharlapRegistrarEx : IUnknown {
 
 struct IvltDynamicRegistrar : IUnknown {
   // Experts of the type that bind to the class; the array is freed with vltFree.
-  // VLT_E_NO_COMPONENT if nobody does, VLT_E_NO_BINDING_CLASSES for other types than experts.
+  // VLT_E_NO_COMPONENT if there is none, VLT_E_NO_BINDING_CLASSES for other types than experts.
   virtual HRESULT GetComponentsForBindingClass(_vltComponentType type, GUID bindingClass,
                                                unsigned int* count, GUID** components) = 0;
 

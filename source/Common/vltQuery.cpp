@@ -24,7 +24,7 @@ void* AllocateZeroed(uint64_t sizeBytes) {
   return calloc(1, std::max<size_t>(static_cast<size_t>(sizeBytes), 1));
 }
 
-// A query whose array could not be had keeps its count.
+// A query whose array could not be allocated keeps its count.
 std::span<_vltQueryTerm> TermsOf(const _vltQuery& query) {
   return {query.terms, query.terms ? query.termCount : 0};
 }
@@ -74,7 +74,7 @@ HRESULT ReadText(IvltInputStream* stream, _vltQueryTerm* term) {
   term->tildeFlag = tilde != 0;
   wchar_t* text = nullptr;
   result = stream->ReadString(&text);
-  // A failed read hands out nothing, whatever it wrote.
+  // A failed read returns nothing, whatever it wrote.
   if (result >= 0) term->value.string = text;
   return result;
 }
@@ -168,7 +168,7 @@ class Line {
 
  private:
   void grow(const wchar_t* part, size_t length) {
-    // The told capacity is raised before memory is asked for, so it counts on success only.
+    // The reported capacity is raised before memory is asked for, so it counts on success only.
     size_t capacity = m_capacity;
     if (vltAppendString2(&m_text, part, &capacity) < 0) return;
     m_length += length;

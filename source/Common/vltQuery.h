@@ -34,12 +34,12 @@ HRESULT vltMarshalQueryToStream(const _vltQuery* query, IvltOutputStream* stream
 
 // Reads what vltMarshalQueryToStream writes. S_OK; a version other than 1 is the success of its
 // read, with the query untouched. tFlag and tildeFlag come as 0 or 1, orFlag as it is.
-// E_OUTOFMEMORY, after its report, leaves termCount set and terms null. A failure behind that
+// E_OUTOFMEMORY, after its report, leaves termCount set and terms null. A failure after that
 // leaves the terms that were not read zeroed: vltFreeQuery may end the query.
 HRESULT vltMarshalQueryFromStream(IvltInputStream* stream, _vltQuery* query);
 
 // One line: "{GUID},t,a,5=42,9=~abc". Ids print as signed numbers do (vltI32ToString2); a value of
-// a type without one is empty. *text is ended with vltFree; E_POINTER for null, E_OUTOFMEMORY after
+// a type without one is empty. *text is freed with vltFree; E_POINTER for null, E_OUTOFMEMORY after
 // its report. What cannot be appended for lack of memory is left out.
 HRESULT vltConvertQueryToString(const _vltQuery* query, wchar_t** text);
 

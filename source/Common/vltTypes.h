@@ -14,11 +14,12 @@
 // vltCreateGuid: the library "ZT-RPC" did not load, or has no entry UuidCreate.
 #define VLT_E_UUID_LIBRARY (static_cast<HRESULT>(0x80040325))
 #define VLT_E_UUID_ENTRY (static_cast<HRESULT>(0x80040326))
-// GetComponentsForBindingClass: nobody serves the class; the component type has no binding classes.
+// GetComponentsForBindingClass: no component serves the class; the component type has no binding
+// classes.
 #define VLT_E_NO_COMPONENT (static_cast<HRESULT>(0x80040301))
 #define VLT_E_NO_BINDING_CLASSES (static_cast<HRESULT>(0x80040306))
 
-// Attribute number, with array bits and a database type tag above it where told.
+// Attribute number, with array bits and a database type tag above it where documented.
 using vltAttributeID = uint32_t;
 
 using vltID = _GUID;
@@ -52,7 +53,7 @@ enum _vltComponentType : int32_t {
   vltComponentType7 = 7
 };
 
-// Defined by the storage. This library reads one bit: the top bit of the byte behind the first
+// Defined by the storage. This library reads one bit: the top bit of the byte after the first
 // 32-bit member, set when port configuration options are given.
 struct _vltStartupOptions;
 
@@ -111,7 +112,7 @@ struct _vltComponent {
   };
 };
 
-// Generation 2.1: without the opaque fields; a dictionary ends behind auxString2.
+// Generation 2.1: without the opaque fields; a dictionary ends after auxString2.
 struct _vltComponent2point1 {
   _vltComponentType type;
   wchar_t* name;

@@ -34,7 +34,7 @@ constexpr TypeRow BlobRow(const wchar_t* userText, const wchar_t* enumerator, co
           kLumBlob, internalBits, externalBits};
 }
 
-// Indexed by _vltAttributeType; row 0 answers for everything out of range. The array bits follow
+// Indexed by _vltAttributeType; row 0 serves everything out of range. The array bits follow
 // the order in which the database learned the types, not the order of the enumerators.
 constexpr std::array<TypeRow, 15> kTypes = {{
     BlobRow(L"unspecified", L"vltUnspecifiedType", L"!!! BAD TYPE", 0, 0),

@@ -1,10 +1,10 @@
 #pragma once
 
-// The implementations behind the exported conversions. The rest of the library calls them by these
-// names, with a digit behind the export's, so that nothing inside goes through the exported
+// The implementations of the exported conversions. The rest of the library calls them by these
+// names, with a digit after the export's, so that nothing inside goes through the exported
 // symbols.
 //
-// Texts handed out are vltTaskMemAlloc blocks. All functions are reentrant.
+// Returned texts are vltTaskMemAlloc blocks. All functions are reentrant.
 
 #include "source/Common/vltInterfaces.h"
 #include "zt/fnd/String.h"
@@ -79,7 +79,7 @@ HRESULT vltDuplicateString(const wchar_t* s, wchar_t** out);
 // The same, with a hook point and a report before E_OUTOFMEMORY.
 HRESULT vltDuplicateString2(const wchar_t* s, wchar_t** out);
 // Appends to a vltTaskMemAlloc text of *capacity characters, and grows it by steps of 360 when less
-// than one is left over. After E_OUTOFMEMORY the text stands and *capacity keeps its raised value.
+// than one is left over. After E_OUTOFMEMORY the text stays and *capacity keeps its raised value.
 HRESULT vltAppendString2(wchar_t** buffer, const wchar_t* tail, size_t* capacity);
 
 // In place; 1 for null or empty, else 0. A character that toupper does not take (above 255) stays.

@@ -2,12 +2,13 @@
 
 // Finds the installed storage and reaches it by name, so that a program need not link it.
 //
-// Two reference counts stand one on the other: KorInitialize and KorFinalize count users; every
-// forwarding call counts a load that nothing takes back, unless KorInitialize came first. So only a
-// program that calls KorInitialize before anything else unloads the storage with KorFinalize.
+// There are two reference counts, one on the other: KorInitialize and KorFinalize count users;
+// every forwarding call counts a load that nothing takes back, unless KorInitialize came first. So
+// only a program that calls KorInitialize before anything else unloads the storage with
+// KorFinalize.
 //
 // A storage that could not be loaded is not looked for again until the clean-up.
-// Threads: all state is behind one recursive lock; forwarded calls run outside it, but for those of
+// Threads: one recursive lock guards all state; forwarded calls run outside it, but for those of
 // KorInitialize and KorFinalize.
 
 #include <string>
@@ -41,7 +42,7 @@ const char* GetCurrentKorVersion();
 HRESULT KorInitialize();
 // E_FAIL without KorInitialize. The last one runs "vltFinalize", gives its result, and unloads.
 HRESULT KorFinalize();
-// Takes one load back; the last one unloads, and the preference is read anew afterwards.
+// Takes one load back; the last one unloads, and the preference is read again afterwards.
 void KorCleanup();
 
 // The storage's configuration object for a URL, or null. *status, which may be null, gets the

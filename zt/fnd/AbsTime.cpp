@@ -142,7 +142,7 @@ int64_t AbsTime::toTime_T(bool round) const noexcept {
 }
 
 int64_t AbsTime::toLKTIME(bool round) const noexcept {
-  // The change of its sign tells a product that is too large, but only up to twice the range.
+  // The change of its sign reveals a product that is too large, but only up to twice the range.
   const bool negative = m_value.IsNegative();
   if (negative ? m_value < -kTicksEnd : m_value > kTicksEnd) return Limit(negative);
   return CountSince(m_value, kLktimeEpoch, nZTSS100::kTimeUnitTicks, round);

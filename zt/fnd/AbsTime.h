@@ -7,7 +7,7 @@
 
 namespace nZTSS100 {
 
-// Units of time, by the codes that stand for them in stored data.
+// Units of time, by their codes in stored data.
 enum tTimeUnit : uint32_t {
   kTimeUnitAtto = 0x36CAD7B7,   // 10^18 a second
   kTimeUnitFemto = 0x36CAD7BA,  // 10^15
@@ -78,7 +78,7 @@ class AbsTime {
   // from zero.
   int64_t getSeconds() const noexcept;
 
-  // The bits behind the point, 0 up to 1; 0 where a double shows 1.0. Before 1904 this is the
+  // The bits after the point, 0 up to 1; 0 where a double shows 1.0. Before 1904 this is the
   // distance from the second below, not from getSeconds().
   double getFraction() const noexcept;
 

@@ -8,7 +8,7 @@ namespace zt::fnd {
 
 class AutoBuffer;
 
-// View of bytes that somebody else owns.
+// View of bytes that it does not own.
 class BufferWrapper {
  public:
   BufferWrapper() noexcept : m_data(nullptr), m_length(0) {}
@@ -60,7 +60,7 @@ class AutoBuffer {
   unsigned int Capacity() const noexcept { return m_guts ? m_guts->capacity : 0; }
 
   void Free() noexcept;  // empty, without a block
-  // Empty. Keeps the block if nobody shares it.
+  // Empty. Keeps the block if it is not shared.
   void Erase() noexcept;
   // Makes the capacity at least n, and exactly n if it has to grow.
   void Reserve(unsigned int n);
@@ -81,7 +81,7 @@ class AutoBuffer {
     return CompareBuffers(*this, other) < 0;
   }
 
-  // Wire form: a 32-bit little-endian length, then the bytes. The cursor moves behind the form.
+  // Wire form: a 32-bit little-endian length, then the bytes. The cursor moves past the form.
   // serialize throws BufferOverflow, deserialize DeserializationError if the form does not fit
   // below `limit`; cursor and buffer are then unchanged. deserialize replaces the bytes.
   unsigned int serializationSize() const;

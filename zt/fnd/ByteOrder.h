@@ -51,7 +51,7 @@ T FromLittleEndian(T value) {
   return value;
 }
 
-// Writes the value at the cursor, which may be unaligned, and moves it behind. Without room below
+// Writes the value at the cursor, which may be unaligned, and moves it on. Without room below
 // `limit` throws BufferOverflow, with nothing written and the cursor unchanged.
 template <class T>
 void SerializeRaw(const T& value, unsigned char*& cursor, const unsigned char* limit) {
@@ -61,7 +61,7 @@ void SerializeRaw(const T& value, unsigned char*& cursor, const unsigned char* l
   cursor += sizeof(T);
 }
 
-// Reads a value from the cursor and moves it behind. With too few bytes below `limit` throws
+// Reads a value from the cursor and moves it on. With too few bytes below `limit` throws
 // DeserializationError; value and cursor are then unchanged.
 template <class T>
 void DeserializeRaw(T& value, const unsigned char*& cursor, const unsigned char* limit) {

@@ -14,6 +14,7 @@ void* DLLMalloc(unsigned long size) {
 }
 
 void* DLLReallocNoThrow(void* block, unsigned long size) noexcept {
+  // By the C standard realloc() may keep or free the block for a size of 0; here it always goes.
   if (size == 0 && block) {
     free(block);
     return nullptr;

@@ -78,7 +78,7 @@ class ZT_EXCEPTION_CLASS Exception : public std::exception {
   }
 
 ZT_FIXED_TEXT_EXCEPTION(OutOfRange);     // 0x8ABC7007
-ZT_FIXED_TEXT_EXCEPTION(BoundExceeded);  // 0x8ABC7007 too: only the class tells them apart
+ZT_FIXED_TEXT_EXCEPTION(BoundExceeded);  // 0x8ABC7007 too: only the class differs
 ZT_FIXED_TEXT_EXCEPTION(ObjectAlreadyExists);
 ZT_FIXED_TEXT_EXCEPTION(NonexistentException);
 ZT_FIXED_TEXT_EXCEPTION(InvalidOperation);

@@ -8,7 +8,7 @@ namespace nZTSS100 {
 template <int IntegerBits, bool Signed>
 class tFixedPoint128;
 
-// Signed 128-bit number in two's complement: 64 bits before the binary point, 64 behind it.
+// Signed 128-bit number in two's complement: 64 bits before the binary point, 64 after it.
 //
 // Arithmetic wraps at 128 bits and never fails; who needs to know compares signs. Products and
 // quotients are truncated toward zero. Division by zero gives the largest or least value by the
@@ -38,7 +38,7 @@ class tFixedPoint128<64, true> {
     w1 = static_cast<uint32_t>(m_low >> 32);
     w0 = static_cast<uint32_t>(m_low);
   }
-  // The integer part rounded down, and the 64 bits behind the point.
+  // The integer part rounded down, and the 64 bits after the point.
   constexpr int64_t integerPart() const noexcept { return static_cast<int64_t>(m_high); }
   constexpr uint64_t fractionBits() const noexcept { return m_low; }
   explicit operator double() const noexcept;

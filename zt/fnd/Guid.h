@@ -34,7 +34,7 @@ class Guid {
   // Throws BadGuidString for anything but the text form; the value is then unchanged.
   void fromString(const String& text);
 
-  // Wire form: the 16 bytes as they stand in memory. Throws DeserializationError if fewer remain
+  // Wire form: the 16 bytes as they are in memory. Throws DeserializationError if fewer remain
   // below `limit`; value and cursor are then unchanged.
   unsigned int serializationSize() const noexcept { return sizeof m_guid; }
   void deserialize(const unsigned char*& cursor, const unsigned char* limit);
@@ -52,7 +52,7 @@ class Guid {
 // One digit of either case; 0 where there is none.
 unsigned char ParseHexNibble(const wchar_t*& cursor, const wchar_t* end, bool& ok);
 void SkipCharacter(const wchar_t*& cursor, const wchar_t* end, wchar_t expected, bool& ok);
-// All digits of a T of 1, 2 or 4 bytes; stores it in the host's byte order and moves `out` behind.
+// All digits of a T of 1, 2 or 4 bytes; stores it in the host's byte order and moves `out` past it.
 template <class T>
 void ParseHex(const wchar_t*& cursor, const wchar_t* end, unsigned char*& out, bool& ok);
 

@@ -44,7 +44,7 @@ class RefCountedThreadUnsafePolicy : public DLLAlloced {
   mutable int m_references = 0;
 };
 
-// Base of objects that are counted, and destroyed, inside a section that belongs to somebody else
+// Base of objects that are counted, and destroyed, inside a section that belongs to another object
 // and has to outlive the last release().
 class RefCountedCriticalSectionPolicy : public RefCountedThreadUnsafePolicy {
  public:

@@ -72,7 +72,7 @@ void ReallocBuffer(T*& begin, T*& capacityEnd, uint32_t n) {
   capacityEnd = begin + n;
 }
 
-// Twice the required length where that can be had, otherwise the required length alone, so that
+// Twice the required length where memory allows, otherwise the required length alone, so that
 // an append fails only if its result cannot be. Nothing has changed when it throws.
 template <class T>
 void Grow(uint32_t required, T*& begin, T*& end, T*& capacityEnd) {

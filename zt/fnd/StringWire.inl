@@ -25,7 +25,7 @@ inline uint64_t Remaining(const unsigned char* cursor, const unsigned char* limi
                                                           : 0;
 }
 
-// Reads the length field and checks that so many bytes follow. Moves the cursor behind the field.
+// Reads the length field and checks that so many bytes follow. Moves the cursor past the field.
 inline uint32_t TakeLength(const unsigned char*& cursor, const unsigned char* limit) {
   if (Remaining(cursor, limit) < kLengthField) throw exception::DeserializationError();
   uint32_t n = 0;

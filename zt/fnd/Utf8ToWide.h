@@ -8,9 +8,9 @@ namespace zt::fnd {
 //
 //   lead 00-7F  1 byte
 //        C2-DF  2 bytes
-//        E0-EF  3 bytes; behind E0 the second byte is at least A0
-//        F0-F7  4 bytes; behind F0 the second byte is at least 90
-//        F8-FD  6 bytes, of whose lead only the lowest bit counts; except behind FD the second byte
+//        E0-EF  3 bytes; after E0 the second byte is at least A0
+//        F0-F7  4 bytes; after F0 the second byte is at least 90
+//        F8-FD  6 bytes, of whose lead only the lowest bit counts; except after FD the second byte
 //               is at least 84
 //
 // Every other lead and every continuation byte outside 80-BF raises InvalidSequence, as does a
@@ -29,7 +29,7 @@ uint32_t GetUtf8StringLength(const unsigned char* begin, const unsigned char* en
 uint32_t Utf8ToWide(const unsigned char* begin, const unsigned char* end, wchar_t* dest,
                     wchar_t* destEnd);
 
-// Decodes what fits, moves `begin` behind it and returns the count. `begin` stays where it was when
+// Decodes what fits, moves `begin` past it and returns the count. `begin` stays where it was when
 // this throws InvalidArgument or InvalidSequence.
 uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* end, wchar_t* dest,
                               wchar_t* destEnd);
@@ -38,7 +38,7 @@ uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* 
 // gives an empty text. Throws InvalidSequence, OutOfRange, std::bad_alloc.
 wchar_t* Utf8ToWide(const unsigned char* s, uint32_t n);
 
-// Decodes one character and returns the position behind it. At a null s and at the end `out` is 0
+// Decodes one character and returns the position after it. At a null s and at the end `out` is 0
 // and s comes back. Throws InvalidSequence.
 const unsigned char* ConvertNextUtf8Character(const unsigned char* s, const unsigned char* end,
                                               wchar_t& out);

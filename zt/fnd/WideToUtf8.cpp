@@ -24,7 +24,7 @@ unsigned EncodedBytes(uint32_t value) {
   return value <= 0x3FFFFFF ? 5 : 6;
 }
 
-// Writes the sequence of a value of `count` bytes and returns the place behind it.
+// Writes the sequence of a value of `count` bytes and returns the place after it.
 unsigned char* EncodeOne(uint32_t value, unsigned count, unsigned char* dest) {
   if (count == 1) {
     *dest = value > 0x7F ? '?' : static_cast<unsigned char>(value);

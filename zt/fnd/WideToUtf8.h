@@ -25,7 +25,7 @@ uint32_t GetUtf8EncodingBytesWithBufferLimit(const wchar_t* begin, const wchar_t
 uint32_t WideToUtf8(const wchar_t* begin, const wchar_t* end, unsigned char* dest,
                     unsigned char* destEnd);
 
-// Encodes what fits, moves `begin` behind it and returns the byte count. Throws InvalidArgument.
+// Encodes what fits, moves `begin` past it and returns the byte count. Throws InvalidArgument.
 uint32_t WideToUtf8NoOverflow(const wchar_t*& begin, const wchar_t* end, unsigned char* dest,
                               unsigned char* destEnd);
 

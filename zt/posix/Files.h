@@ -12,12 +12,13 @@
 // 1. A symbolic link, also in the middle of a path, counts only if root, the caller (the effective
 //    user) or the owner of what it leads to owns it. Any other one is refused with ELOOP. So a user
 //    can lead a privileged process to files of that user only.
-// 2. What is neither a regular file nor, where one is asked for, a directory is never opened, not even
+// 2. What is neither a regular file nor, where one is asked for, a directory is never opened, not
+// even
 //    to look at it: a device may act on being opened, and a pipe may wait.
 // 3. No mode is changed of a file that has a second name, or that neither root nor the caller owns.
 //
-// Every descriptor is close-on-exec, never becomes a controlling terminal, and is 3 or more: a host may
-// have closed its standard streams, and what it prints must not end in a file of ours.
+// Every descriptor is close-on-exec, never becomes a controlling terminal, and is 3 or more: a host
+// may have closed its standard streams, and what it prints must not end in a file of ours.
 //
 // Nothing here throws or allocates through operator new; failures are -1, or an invalid descriptor,
 // with errno. Interrupted calls are made again. Threads: any.
@@ -30,8 +31,8 @@ enum class Kind { File, FileOrDirectory };
 // Whether a link in the last place is judged by rule 1, or refused (ELOOP) whoever owns it.
 enum class LastLink { Judged, Refused };
 
-// An existing file, opened with the access mode and the flags given. EISDIR or ENXIO for what it must
-// not be.
+// An existing file, opened with the access mode and the flags given. EISDIR or ENXIO for what it
+// must not be.
 ScopedFd OpenExisting(const char* path, int flags, Kind kind = Kind::File,
                       LastLink link = LastLink::Judged);
 
@@ -59,8 +60,9 @@ ScopedFd AboveStandardStreams(ScopedFd fd);
 
 // ---- Entries of directories
 
-// The directory that holds an entry, and the entry's name in it: what happens to the entry then happens
-// in this very directory, whoever replaces a part of the path meanwhile. `name` points into the path.
+// The directory that holds an entry, and the entry's name in it: what happens to the entry then
+// happens in this very directory, whoever replaces a part of the path meanwhile. `name` points into
+// the path.
 struct Entry {
   explicit Entry(const char* path);
   bool valid() const { return directory.valid(); }
@@ -77,8 +79,8 @@ int Link(const char* existing, const char* path);
 // rename(2) inside a directory that replaces nothing: EEXIST where `to` is taken.
 int RenameToNew(int directory, const char* from, const char* to);
 
-// Renames what is at the path to path + stamp + ".bad", or path + stamp + ".1.bad" and so on where that
-// is taken: nothing is replaced.
+// Renames what is at the path to path + stamp + ".bad", or path + stamp + ".1.bad" and so on where
+// that is taken: nothing is replaced.
 int MoveAside(const char* path, const char* stamp = "");
 
 // unlink(2) of what is at the path; a directory is moved aside. Nothing there counts as done.
@@ -86,7 +88,7 @@ int MakeRoom(const char* path);
 
 // ---- Modes
 
-// Gives the file or directory behind the descriptor (O_PATH will do) these bits by rule 3: EPERM or
+// Gives the file or directory of the descriptor (O_PATH will do) these bits by rule 3: EPERM or
 // EMLINK for what the rule excludes.
 int SetSharedMode(int fd, mode_t mode);
 
@@ -118,8 +120,8 @@ int Flock(int fd, int operation);
 // fsync. A file system that has no such thing counts as done.
 bool Sync(int fd);
 
-// fsync of a directory, or of the one that holds the path. A directory that may be entered but not read
-// cannot be opened for it, and counts as done.
+// fsync of a directory, or of the one that holds the path. A directory that may be entered but not
+// read cannot be opened for it, and counts as done.
 bool SyncDirectory(const char* path);
 bool SyncDirectoryOf(const char* path);
 

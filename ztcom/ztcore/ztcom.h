@@ -16,7 +16,7 @@
 
 // Row of an interface map. The table ends with a row whose function is 0.
 struct _ZTCOM_INTMAP_ENTRY {
-  const GUID* iid;     // null: the row is asked for every interface
+  const GUID* iid;     // null: the row is used for all interfaces
   uintptr_t offset;    // of the interface from the object's start, or the function's argument
   uintptr_t function;  // kZtComSimpleEntry, 0 at the end, or a ZtComMapFunction
 };
@@ -82,7 +82,7 @@ class CZTComObject : public T {
     return static_cast<uint32_t>(left);
   }
 
-  // The count stands at 1 meanwhile, so that a QueryInterface and Release pair inside T's
+  // The count is 1 meanwhile, so that a QueryInterface and Release pair inside T's
   // destructor does not delete a second time.
   virtual ~CZTComObject() { this->m_refCount = 1; }
 

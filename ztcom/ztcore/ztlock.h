@@ -15,7 +15,7 @@ pthread_t ZTGetThreadId();
 //
 //   state \ call   Lock                 Unlock   IsNesting
 //   free           taken                -        false
-//   held by me     waits for ever       free     true
+//   held by me     waits indefinitely   free     true
 //   held by other  waits, then taken    free     false
 //
 // A Lock that finds the lock taken although the underlying mutex was free aborts the process: the

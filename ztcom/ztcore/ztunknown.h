@@ -25,7 +25,7 @@ using HRESULT = int32_t;
 // Reference-counted object: slot 0 QueryInterface, 1 AddRef, 2 Release. A pointer that a call hands
 // out carries a reference for the caller. The protected destructor forbids delete.
 struct IUnknown {
-  // Hands out the interface `iid` with a reference; otherwise nulls *out and gives E_NOINTERFACE.
+  // Returns the interface `iid` with a reference; otherwise nulls *out and gives E_NOINTERFACE.
   virtual HRESULT QueryInterface(const GUID& iid, void** out) = 0;
   virtual uint32_t AddRef() = 0;   // the new count
   virtual uint32_t Release() = 0;  // the new count; 0 means gone

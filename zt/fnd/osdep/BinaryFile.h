@@ -9,7 +9,7 @@ namespace zt::fnd::osdep {
 
 // Owner of one open file.
 //
-// Operations report by their results, with errno behind a -1, which is 0 where a file ends before
+// Operations report by their results, with errno after a -1, which is 0 where a file ends before
 // an exact read does, and ENOMEM where a buffer cannot grow; only those that say so throw. On a
 // closed object reads, writes and seek() give -1, the others do nothing. Files are opened
 // close-on-exec. Threads: one at a time.

@@ -60,7 +60,7 @@ bool EndsBefore(int fd, unsigned int n) {
          static_cast<int64_t>(info.st_size) - position < static_cast<int64_t>(n);
 }
 
-// Makes room behind the buffer's bytes; null if that fails.
+// Makes space after the buffer's bytes; null if that fails.
 unsigned char* MakeRoom(AutoBuffer& buffer, unsigned int n) {
   unsigned int length = buffer.Len();
   try {

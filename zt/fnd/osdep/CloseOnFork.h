@@ -18,7 +18,7 @@ namespace zt::fnd::osdep {
 //
 // The number of the descriptor is the host's to close, as daemons do with all they find. It is the
 // object's only as long as it leads to the file that was opened, and no other object has got it:
-// after that nobody uses, closes or locks it in this object's name, in this process or in a child.
+// after that it is not used, closed or locked for this object, in this process or in a child.
 // Threads: one at a time; any may fork.
 class CloseOnForkFd {
  public:
@@ -31,8 +31,8 @@ class CloseOnForkFd {
   // that throws, and std::bad_alloc.
   static CloseOnForkFd OpenShared(const AnsiString& path, InTheWay way = InTheWay::Refused);
 
-  // Has fork() know of the descriptors before the first is opened; for those whose own handlers must
-  // run before these.
+  // Has fork() know of the descriptors before the first is opened; for those whose own handlers
+  // must run before these.
   static void RegisterForkHandlers();
 
   // The descriptor; -1 for none, for one that the host has closed, and in a child that has no copy.

@@ -99,7 +99,7 @@ CloseOnForkFd CloseOnForkFd::OpenShared(const AnsiString& path, InTheWay way) {
     CloseOnForkFd result;
     result.m_file = FileIdentity::Of(fd.get());
     result.m_serial = MarkIfNoFork(fd.get(), result.m_file, forks);
-    // The copy in the child is of an open file that nobody locks; this process takes another.
+    // The copy in the child is of an open file that is never locked; this process takes another.
     if (result.m_serial == 0) continue;
     result.m_process = ProcessMark::Current();
     result.m_fd = fd.release();

@@ -44,7 +44,7 @@ String FractionText(AbsTime& time, unsigned digits, int separator) {
   return SeparatorText(separator) + text;
 }
 
-// Puts the text behind every "%S" and "%#S".
+// Puts the text after every "%S" and "%#S".
 String WithFraction(const String& format, const String& fraction) {
   String result;
   String::size_type done = 0;

@@ -24,7 +24,7 @@ enum TimeStringType : int32_t { kTimeUTC = 0, kTimeLocal = 1, kTimeLocal2 = 2 };
 //
 // AbsTime::min is the empty text. A null format is the system's own, an empty one leaves its part
 // and the blank out. With `fractionDigits` the time format gets the separator and that many
-// decimals behind each "%S" and "%#S", rounded half up with carry into the seconds; without, whole
+// decimals after each "%S" and "%#S", rounded half up with carry into the seconds; without, whole
 // seconds are rounded. The separator is "." for 1, "," for 2, otherwise the decimal point of the
 // host's locale. `timeSuffix` follows the time format after a blank. `timeFirst` turns the parts
 // round. A result of more than 511 bytes is empty. Throws InvalidArgument for more than 3 digits,

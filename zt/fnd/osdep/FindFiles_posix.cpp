@@ -59,7 +59,7 @@ bool IsDotOrDotDot(const char* name) {
   return name[0] == '.' && (name[1] == '\0' || (name[1] == '.' && name[2] == '\0'));
 }
 
-// Entries whose type the listing tells need no look of their own.
+// The listing's type settles these without a call of stat.
 bool SurelyNoDirectory(const dirent* entry) {
   return entry->d_type != DT_DIR && entry->d_type != DT_LNK && entry->d_type != DT_UNKNOWN;
 }
@@ -105,7 +105,7 @@ Vector<String> List(const String& text, Flags flags, Errors errors) {
 }  // namespace
 
 bool WildcardFit(const wchar_t* pattern, const wchar_t* name) {
-  // Behind the last "*", and where in the name the run that it stands for ends. Only the last one
+  // After the last "*", and where in the name the run that it matches ends. Only the last one
   // ever has to take more: what an earlier "*" took already led here.
   const wchar_t* star = nullptr;
   const wchar_t* resume = nullptr;

@@ -6,7 +6,7 @@ namespace zt::fnd::osdep {
 
 // The system's loader, for SharedLibrary and Bundle.
 
-// Loads a module with all its symbols, for everybody's use. Null on failure, and for a path that
+// Loads a module with all its symbols, for all modules to use. Null on failure, and for a path that
 // names something other than a regular file: the loader would wait for a pipe.
 void* LoadModule(const String& name);
 void UnloadModule(void* module);                           // null does nothing

@@ -18,7 +18,7 @@ uint32_t GetWideToAnsiRequiredBufferLength(const wchar_t* begin, const wchar_t* 
                                            const char* locale);
 
 // Convert into the buffer [dest, destEnd) as far as there is room, without terminator; `destEnd`
-// then tells where the output stopped. Return the count.
+// then is where the output stopped. Return the count.
 uint32_t AnsiToWideNoAlloc(const char* begin, const char* end, const char* locale, wchar_t* dest,
                            wchar_t*& destEnd);
 uint32_t WideToAnsiNoAlloc(const wchar_t* begin, const wchar_t* end, const char* locale, char* dest,

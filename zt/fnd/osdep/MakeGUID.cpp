@@ -23,6 +23,7 @@ _GUID MakeGUID() { return MakeGUID(NewUuidBytes); }
 _GUID MakeGUID(UuidSource source) {
   unsigned char bytes[16];
   if (!source(bytes)) ZT_RAISE(exception::InitializationFailure());
+  // The bytes of a UUID are big-endian (RFC 4122), the fields of the record in the host's order.
   _GUID guid;
   guid.Data1 = BigEndianField<uint32_t>(bytes);
   guid.Data2 = BigEndianField<uint16_t>(bytes + 4);

@@ -23,7 +23,7 @@ namespace zt::fnd::osdep {
 namespace {
 
 constexpr const wchar_t* kDirectory = L"mutex";
-// Attempts of tryLock on a file that somebody keeps replacing.
+// Attempts of tryLock on a file that another process keeps replacing.
 constexpr int kReplacedFiles = 100;
 
 // Opens the file of a name once more; its directory may have gone meanwhile.
@@ -115,7 +115,7 @@ bool Mutex::Record::addHoldIfHeld() {
 }
 
 // Takes the file lock; false with flock's errno, and not locked when reopen() throws. A lock on a
-// file that the path no longer names excludes nobody who comes later, so the new file is locked
+// file that the path no longer names excludes no later taker, so the new file is locked
 // instead.
 bool Mutex::Record::takeFile(int operation, int attempts) {
   for (int attempt = 1;; ++attempt) {
@@ -171,7 +171,7 @@ bool Mutex::tryLock() const {
     if (!record.takeFile(LOCK_EX | LOCK_NB, kReplacedFiles)) return false;
     record.finishLock(entry);
     return true;
-  } catch (const std::exception&) {  // A file that cannot be made anew, or no memory to do it.
+  } catch (const std::exception&) {  // A file that cannot be made again, or no memory to do it.
     return false;
   }
 }

@@ -24,14 +24,16 @@ class EventData;
 // beyond a parent that was killed; its destroying them takes nothing from the parent.
 //
 // Threads: any may use any object; only construction and destruction take a lock. A failed system
-// call throws PosixError, which also tells a waiter that the event's semaphores were removed.
+// call throws PosixError, which is also how a waiter learns that the event's semaphores were
+// removed.
 class NamedEvent {
  public:
-  // Opens or joins the event; `initialState` counts only where no process has it. Waits up to half a
-  // second for somebody who has its file alone, tries again for up to two seconds where it is closed
-  // while it is joined, and waits for the mutex of the state files. Throws PosixError: EINVAL if this
-  // process has the event with the other kind of reset, ENOLCK if another process has, if it cannot
-  // be joined, or if no semaphore can be had; and what CreateSharedUnixFile and Mutex::lock throw.
+  // Opens or joins the event; `initialState` counts only where no process has it. Waits up to half
+  // a second for a process that has its file alone, tries again for up to two seconds where it is
+  // closed while it is joined, and waits for the mutex of the state files. Throws PosixError:
+  // EINVAL if this process has the event with the other kind of reset, ENOLCK if another process
+  // has, if it cannot be joined, or if no semaphore is available; and what CreateSharedUnixFile and
+  // Mutex::lock throw.
   NamedEvent(const String& name, bool manualReset, bool initialState);
   ~NamedEvent();
   NamedEvent(const NamedEvent&) = delete;
@@ -45,8 +47,8 @@ class NamedEvent {
   void wait() const;
 
   // True if the event was signaled in time. 0 is check(); 0xFFFFFFFF waits without limit. Any other
-  // wait looks every 50 ms, so that it sees a signal up to 50 ms late, and can miss one that is reset
-  // in between.
+  // wait looks every 50 ms, so that it sees a signal up to 50 ms late, and can miss one that is
+  // reset in between.
   bool wait(unsigned int ms) const;
 
   // True if signaled; an automatic event is clear then. Never blocks.

@@ -29,7 +29,7 @@ class ZT_EXCEPTION_CLASS OSException : public exception::Exception {
 // An errno. getErrorCode(): 0 for 0, 7 for ENOENT, 42 for any other.
 class ZT_EXCEPTION_CLASS PosixError : public OSException {
  public:
-  PosixError();  // the calling thread's errno, so build it right behind the failed call
+  PosixError();  // the calling thread's errno, so build it right after the failed call
   explicit PosixError(int errnum);  // the system's text for it
   PosixError(const char* message, int errnum);
   PosixError(const PosixError&) = default;

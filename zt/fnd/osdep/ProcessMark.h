@@ -6,11 +6,11 @@
 
 namespace zt::fnd::osdep {
 
-// Tells the process that an object belongs to from the children that it forks.
+// Distinguishes the process that an object belongs to from the children that it forks.
 //
 // The process id alone does not: the first processes of two name spaces both have 1, and one may
 // be the other's child. So each fork() is counted in the child, before it returns there; the id
-// tells children apart that were made without the handlers of fork().
+// distinguishes children that were made without the handlers of fork().
 // Threads: any may ask while one changes the mark. What was written before a change is seen by
 // whoever finds the mark current for it.
 class ProcessMark {

@@ -15,7 +15,7 @@ namespace zt::fnd::osdep {
 //
 // A forked child starts without. What it inherits, a thread that is not in the child may have been
 // changing at the fork: it is never touched nor released again, but kept in sight of leak checkers.
-// Statics is reference-counted, is told its process by `const ProcessMark process`, and lends the
+// Statics is reference-counted, has its process in `const ProcessMark process`, and lends the
 // list of the inherited ones its `Statics* inherited`. All functions may be called by any thread at
 // any time, before the first initialiser and after the last destructor, too.
 template <class Statics>
@@ -41,8 +41,8 @@ class ProcessStatics {
     return RefPtr<Statics>(s_statics);
   }
 
-  // Has fork() know of the statics before there are any; for those whose own handlers must run before
-  // these.
+  // Has fork() know of the statics before there are any; for those whose own handlers must run
+  // before these.
   static void RegisterForkHandlers() { pthread_once(&s_once, Register); }
 
   // The lock, which no fork comes in between: for counts that a child keeps on what it inherited.

@@ -32,7 +32,7 @@ constexpr int kVanishedOpens = 100;
 constexpr int kClearings = 10;
 
 // Makes the directories. Other processes make the same ones: the loser of a race finds a level that
-// stands already, and one of another user may be seen before its mode is set. Nor is a success the
+// exists already, and one of another user may be seen before its mode is set. Nor is a success the
 // end: a path whose end is no "/" has its last component left out.
 void MakeDirectories(const String& path) {
   int refused = 0;
@@ -47,7 +47,8 @@ void MakeDirectories(const String& path) {
   }
 }
 
-// What may be in the place of a file: a link, a directory, a pipe or a device, a file with a second name.
+// What may be in the place of a file: a link, a directory, a pipe or a device, a file with a second
+// name.
 bool IsInTheWay(int error) {
   return error == ELOOP || error == EISDIR || error == ENXIO || error == EMLINK;
 }
@@ -83,7 +84,7 @@ ScopedFd OpenSharedPatiently(const AnsiString& path, InTheWay way) {
 }  // namespace
 
 String GetSharedUnixBase() {
-  // Not from the environment of somebody who runs a program with more rights than his own.
+  // Not from the environment of a user who runs a program with more rights than their own.
   const char* base = ::secure_getenv(kBaseVariable);
   return base && base[0] == '/' ? String(base) : String(kDefaultBase);
 }

@@ -5,7 +5,7 @@ namespace zt::fnd::osdep {
 // Comparison of texts: below 0, 0, above 0.
 //
 // Case is folded upward, one character at a time, by the C library under the host's C locale: the
-// "C" locale folds ASCII only, and "_" sorts behind the letters. Narrow characters compare as
+// "C" locale folds ASCII only, and "_" sorts after the letters. Narrow characters compare as
 // unsigned bytes, wide ones as wcsncmp does.
 
 // Over terminated text; a null pointer counts as the empty text. Compares up to the first

@@ -27,6 +27,7 @@ wchar_t* SystemAllocStringLen(const wchar_t* s, unsigned int n) {
   if (bytes > kMax32) return nullptr;
   char* const block = static_cast<char*>(DLLMallocNoThrow(static_cast<unsigned long>(bytes)));
   if (!block) return nullptr;
+  // Readers of such a string find its length in front of the text.
   const Count count = n;
   memcpy(block, &count, sizeof count);
   wchar_t* const text = reinterpret_cast<wchar_t*>(block + sizeof count);

@@ -82,7 +82,7 @@ String path::DirName(const String& path) {
   if (root == String::npos) return path;
   size_type slash = path.rfind(L'/');
   if (slash == String::npos || slash < root) return path.substr(0, root);
-  // The run of slashes that ends there; a name stands before it, as root lies behind the leading
+  // The run of slashes that ends there; a name is before it, as root lies after the leading
   // run.
   return path.substr(0, path.find_last_not_of(L'/', slash) + 1);
 }

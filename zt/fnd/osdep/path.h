@@ -22,7 +22,7 @@ class path {
   static bool IsAbs(const String& path);
 
   // The path without its last run of "/" and what follows: "/a/b" and "/a/b/" give "/a" and "/a/b".
-  // Without a "/" behind the leading ones, these: "/a" gives "/", "a" gives "".
+  // Without a "/" after the leading ones, these: "/a" gives "/", "a" gives "".
   static String DirName(const String& path);
   // What follows the last "/".
   static String BaseName(const String& path);
@@ -48,7 +48,7 @@ class path {
   // or a relative dir, NonexistentException where dir is no directory.
   static String TempFileName(const String& prefix, const String& dir);
 
-  // False for a relative path and for every failure. IsDirectory follows links.
+  // False for a relative path and for any failure. IsDirectory follows links.
   static bool IsDirectory(const wchar_t* path);
   static bool IsSymLink(const wchar_t* path);
   // True for a regular file, links followed; false for what is missing or is something else. Every

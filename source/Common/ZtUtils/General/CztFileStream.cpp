@@ -29,7 +29,7 @@ bool Succeeds(Step step) {
     step();
     return true;
   } catch (const zt::fnd::osdep::OSException&) {
-    // Streams tell failures by results; which one the system had is not passed on.
+    // Streams report failures by results; which one the system had is not passed on.
     return false;
   }
 }
@@ -107,21 +107,21 @@ HRESULT CztFileStream::SetSize(uint64_t size) {
   return resized ? S_OK : E_FAIL;
 }
 
-// Not SetSize, which opens the file anew for size 0 and so would leave what is to go.
-void CztFileStream::takeBack(int64_t size) {
+// Not SetSize, which opens the file again for size 0 and so would leave what is to go.
+void CztFileStream::truncateTo(int64_t size) {
   Succeeds([&] { m_file->resize(size); });
 }
 
 HRESULT CztFileStream::openAnew() try {
   zt::fnd::String name(m_fileName);
-  // The arguments stand one place to the left of where one expects them, and files in the field
+  // The arguments are one place to the left of where one expects them, and files in the field
   // depend on it: what was only written keeps its contents, and can be read from here on.
   return Init(name, m_canRead, m_canWrite, true) ? S_OK : E_FAIL;
 } catch (const CztStreamException&) {
   // The contents that were kept end in damaged sub-streams. The file is open.
   return E_FAIL;
 } catch (const std::bad_alloc&) {
-  // Operations of a stream tell this by their result.
+  // Operations of a stream report this by their result.
   return E_OUTOFMEMORY;
 }
 

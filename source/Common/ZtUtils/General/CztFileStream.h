@@ -23,12 +23,12 @@ class CztFileStream : public CztStreamBaseImp {
   bool Init(const zt::fnd::String& name, bool truncate, bool read, bool write);
 
   HRESULT Read(void* buffer, unsigned int count, unsigned int* done) override;
-  // E_FAIL when fewer bytes went out than asked; *done tells how many.
+  // E_FAIL when fewer bytes went out than asked; *done is how many.
   HRESULT Write(const void* buffer, unsigned int count, unsigned int* done) override;
-  // May go beyond the end. An unknown mode leaves the cursor and tells position 0.
+  // May go beyond the end. An unknown mode leaves the cursor and reports position 0.
   HRESULT Seek(int64_t offset, ztSeekMode mode, int64_t* position) override;
-  // Size 0 opens the file anew: one open for reading and writing is emptied. A write-only one keeps
-  // its contents, and may be read from then on.
+  // Size 0 opens the file again: one open for reading and writing is emptied. A write-only one
+  // keeps its contents, and may be read from then on.
   HRESULT SetSize(uint64_t size) override;
   // Waits until the system has the data on disk.
   HRESULT Flush() override;
@@ -36,7 +36,7 @@ class CztFileStream : public CztStreamBaseImp {
  protected:
   CztFileStream() = default;
   ~CztFileStream();
-  void takeBack(int64_t size) override;
+  void truncateTo(int64_t size) override;
   CztSubStream* newSubStream() override;
 
  private:

@@ -59,8 +59,8 @@ HRESULT CztMemoryStream::growTo(uint64_t size) {
 
 HRESULT CztMemoryStream::resizeBlock(uint32_t capacity) {
   void* block = realloc(m_begin, capacity);
-  // A heap may refuse to shrink a block, which is then longer than it is taken for: taking back what was
-  // written does not fail for that.
+  // A heap may refuse to shrink a block, which is then longer than it is taken for: taking back
+  // what was written does not fail for that.
   if (!block && m_begin && capacity <= m_capacity) block = m_begin;
   if (!block) return E_FAIL;
   m_begin = static_cast<unsigned char*>(block);
@@ -94,7 +94,7 @@ HRESULT CztMemoryStream::SetSize(uint64_t size) {
 }
 
 unsigned char* CztMemoryStream::DetachBuffer() {
-  WriteSubStreamInfo();  // A failure leaves the data alone, which is handed out then.
+  WriteSubStreamInfo();  // A failure leaves the data alone, which is returned then.
   unsigned char* block = m_begin;
   takeBlock(nullptr, 0, m_external);
   return block;

@@ -24,7 +24,7 @@ class CztMemoryStream : public CztSubStream {
 
   unsigned char* GetBuffer() const override { return m_begin; }
 
-  // Writes the sub-streams and hands out the block, whose owner frees it with free(). The size is
+  // Writes the sub-streams and returns the block, whose owner frees it with free(). The size is
   // known to who calls WriteSubStreamInfo and seeks to the end before.
   unsigned char* DetachBuffer();
 

@@ -13,7 +13,7 @@ namespace {
 
 using zt::fnd::String;
 
-// Runs a step that throws, for operations that tell by their result.
+// Runs a step that throws, for operations that report by their result.
 template <class Step>
 HRESULT Guarded(Step step) {
   try {
@@ -154,7 +154,7 @@ HRESULT CztStreamBaseImp::cutArea() {
   return result;
 }
 
-void CztStreamBaseImp::takeBack(int64_t size) { SetSize(static_cast<uint64_t>(size)); }
+void CztStreamBaseImp::truncateTo(int64_t size) { SetSize(static_cast<uint64_t>(size)); }
 
 bool CztStreamBaseImp::nestsDeeperThan(unsigned levels) const {
   if (m_subStreams.empty()) return false;
@@ -192,7 +192,7 @@ HRESULT CztStreamBaseImp::WriteSubStreamInfo() {
   if (result < 0) return result;
   result = Guarded([&] { return writeArea(start); });
   if (result < 0) {
-    takeBack(start);
+    truncateTo(start);
     return result;
   }
   m_subStreams.clear();

@@ -12,8 +12,8 @@ class CztSubStream;
 
 using CztSubStreamMap = std::map<zt::fnd::String, CztComPtr<CztSubStream>>;
 
-// The sub-streams of every stream, over the five byte operations of the class derived from it, which
-// also makes them.
+// The sub-streams of every stream, over the five byte operations of the class derived from it,
+// which also makes them.
 //
 // Sub-streams are memory streams, in the order of their names, and may have sub-streams of their
 // own. Areas within areas are read and written up to kDeepestArea levels: reading throws
@@ -47,7 +47,7 @@ class CztStreamBaseImp : public IztStream3, public CZTComObjectRootEx<CZTComMult
   HRESULT loadSubStreams(bool writable, unsigned depth);
 
   // Cuts off what a failed writing has left after the first `size` bytes.
-  virtual void takeBack(int64_t size);
+  virtual void truncateTo(int64_t size);
 
   // New empty stream with one reference; null when memory is out.
   virtual CztSubStream* newSubStream() = 0;

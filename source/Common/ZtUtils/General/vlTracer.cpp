@@ -67,7 +67,7 @@ struct Start {
 
 Start& TheStart() { return LeakedInstance<Start>(); }
 
-// The lock, if it can be had: a line that may stand between another's is better than none.
+// The lock, if it is available: a line that may come between another's is better than none.
 class OutputLock {
  public:
   explicit OutputLock(Toolyard::CztMutex& mutex) : m_mutex(mutex), m_held(Take(mutex)) {}
@@ -82,7 +82,7 @@ class OutputLock {
     try {
       return mutex.Lock(-1);
     } catch (const std::exception&) {
-      return false;  // A lock file that cannot be had must not silence the log.
+      return false;  // A lock file that is not available must not silence the log.
     }
   }
 
@@ -101,8 +101,8 @@ void OpenLog(LogFile& log) {
     log.diskShort = true;
     return;
   }
-  // Others may write to the directory: a link or a pipe under the log's name, or a file with a second
-  // name, is not what was meant.
+  // Others may write to the directory: a link or a pipe under the log's name, or a file with a
+  // second name, is not what was meant.
   ScopedFd file = zt::posix::OpenOrCreate(log.name.c_str(), O_WRONLY | O_APPEND, kLogMode,
                                           zt::posix::LastLink::Refused);
   struct stat info;
@@ -125,8 +125,8 @@ void AppendLine(int fd, const char* line) {
   zt::posix::WriteAll(fd, text, strlen(text));
 }
 
-// Writes the line to the file; on a disk that has become short, the message in the line's place, for
-// all targets, and that is the file's last one.
+// Writes the line to the file; on a disk that has become short, the message in the line's place,
+// for all targets, and that is the file's last one.
 const char* WriteToLog(LogFile& log, const char* line) {
   if (log.fd >= 0 && !log.identity.isBehind(log.fd)) log.fd = -1;
   if (log.fd < 0) OpenLog(log);
@@ -204,7 +204,7 @@ void vlTracer::Initialize(void (*callback)()) { gs_traceInitCallback = callback;
 void vlTracer::Cleanup() {
   Toolyard::CztMutex* sync = gs_traceSync.exchange(nullptr);
   if (!sync) return;
-  // A thread may stand in a write that does not end, to a full pipe. It must not keep the process from
+  // A thread may be in a write that does not end, to a full pipe. It must not keep the process from
   // ending; what is written is in the file already.
   for (int tries = 0; !sync->TryLock(); ++tries) {
     if (tries == kCleanupTries) return;
@@ -236,7 +236,7 @@ void vlt_vlTracer::TraceOutput(char marker, const char* text, bool detail) {
 }
 
 void vlt_vlTracer::TraceArgsHelper() {
-  // The objects behind this call are trace objects: the exported class only lends its name.
+  // The objects of this call are trace objects: the exported class only lends its name.
   auto* object = reinterpret_cast<vlTracer*>(this);
   char text[kArgumentTextSize];
   TraceOutput(object->marker(), object->GetStringContentsA(text, sizeof text), true);

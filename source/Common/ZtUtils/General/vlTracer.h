@@ -20,11 +20,12 @@
 //   stopped by a short disk    writes to the other targets              changes mask, targets, limit
 //
 // Nothing here reports a failure: lines that cannot be written are lost, and the log file is not
-// opened again once the disk was short. Threads: any; the lines of one call stand together.
+// opened again once the disk was short. Threads: any; the lines of one call stay together.
 
 namespace Toolyard {
 
-// An object with a text form. Returns the buffer, with as much of the text as fits and a terminator.
+// An object with a text form. Returns the buffer, with as much of the text as fits and a
+// terminator.
 class IStringObjectA {
  public:
   virtual char* GetStringContentsA(char* buffer, unsigned long sizeBytes) = 0;
@@ -35,7 +36,7 @@ class IStringObjectA {
 
 }  // namespace Toolyard
 
-// A trace object: tells of a call of its function. Components outside build them.
+// A trace object: reports a call of its function. Components outside build them.
 class vlTracer : public Toolyard::IStringObjectA {
  public:
   enum SeverityLevel : uint32_t { kSeverityErrors = 2, kSeverityLoad = 0x20 };
@@ -56,8 +57,8 @@ class vlTracer : public Toolyard::IStringObjectA {
   // Closes the file; nothing is written any more.
   static void Cleanup();
 
-  // The threshold for a number of bytes out of the options. What a long cannot hold, on 32 bits, is its
-  // largest: a limit in any case.
+  // The threshold for a number of bytes out of the options. What a long cannot hold, on 32 bits, is
+  // its largest: a limit in any case.
   static constexpr long Threshold(uint32_t bytes) {
     return std::cmp_greater(bytes, LONG_MAX) ? LONG_MAX : static_cast<long>(bytes);
   }

@@ -10,7 +10,7 @@
 // Where a Seek counts from. Other values may be passed.
 enum ztSeekMode : int32_t { ztSeekBegin = 0, ztSeekCurrent = 1, ztSeekEnd = 2 };
 
-// A row of bytes with a cursor. Counts and positions handed out may be asked for with null.
+// A row of bytes with a cursor. The pointers for counts and positions may be null.
 struct IztStream : IUnknown {
   // 0 when all bytes came, ZT_E_END_OF_STREAM when fewer did. *done is the number that came.
   virtual HRESULT Read(void* buffer, unsigned int count, unsigned int* done) = 0;
@@ -25,19 +25,19 @@ struct IztStream : IUnknown {
 };
 
 // A stream that carries named sub-streams. They live in memory while the stream is open and are
-// written behind its own data by WriteSubStreamInfo. Names ignore case.
+// written after its own data by WriteSubStreamInfo. Names ignore case.
 //
-// Results beside those told: E_POINTER for a null out-pointer, E_OUTOFMEMORY.
+// Results beside those documented: E_POINTER for a null out-pointer, E_OUTOFMEMORY.
 struct IztStream2 : IztStream {
-  // Takes the sub-streams that stand behind the stream's data into memory, once in the object's
+  // Takes the sub-streams that follow the stream's data into memory, once in the object's
   // life: 0 done (or done before), 1 there are none. With `writable` they are cut off the stream,
-  // to be written anew; without, they stay and the stream never writes any.
-  // Throws CztStreamException or CztEndOfStreamException for damaged ones, std::bad_alloc. Its bytes
-  // are then as before; it counts as loaded, without sub-streams, and what stands behind the data is
-  // data from then on.
+  // to be written again; without, they stay and the stream never writes any.
+  // Throws CztStreamException or CztEndOfStreamException for damaged ones, std::bad_alloc. Its
+  // bytes are then as before; it counts as loaded, without sub-streams, and what follows the data
+  // is data from then on.
   virtual HRESULT LoadSubStreamInfo(int writable) = 0;
   // Appends the sub-streams to the stream and forgets them, once in the object's life; later calls
-  // do nothing. A failure leaves the stream's own data alone behind.
+  // do nothing. A failure leaves the stream's own data alone.
   virtual HRESULT WriteSubStreamInfo() = 0;
   // 0 and a reference, or 1 and null. The cursor is where it was left.
   virtual HRESULT OpenSubStream(const wchar_t* name, IztStream** out) = 0;

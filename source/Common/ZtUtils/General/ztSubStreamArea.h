@@ -1,6 +1,6 @@
 #pragma once
 
-// The area behind a stream's own data that holds its sub-streams: typed header, count, each with
+// The area after a stream's own data that holds its sub-streams: typed header, count, each with
 // name and data, then the trailer of marker and offset. docs/stream-format.md has the bytes.
 
 #include <cstdlib>
@@ -22,7 +22,7 @@ struct CztFreeBlock {
 };
 using CztOwnedBlock = std::unique_ptr<unsigned char, CztFreeBlock>;
 
-// One sub-stream as it stands in the area; its data may end with an area of its own.
+// One sub-stream as it is in the area; its data may end with an area of its own.
 struct CztSubStreamBlock {
   zt::fnd::String name;
   CztOwnedBlock data;  // never null

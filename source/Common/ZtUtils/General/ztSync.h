@@ -10,7 +10,7 @@
 #include "zt/fnd/osdep/ThreadAnnotations.h"
 
 // Locks and events of the OS layer in one polymorphic shape, for code that holds a lockable thing
-// without knowing which. Exceptions of the primitive behind pass through.
+// without knowing which. Exceptions of the primitive pass through.
 namespace Toolyard {
 
 // A timeout is in milliseconds, -1 for none.
@@ -99,7 +99,7 @@ class CztSemaphore : public CztSyncObject {
   zt::fnd::String m_name;
 };
 
-// Lock known by name to the machine's processes, with a named event that tells others whether it is
+// Lock known by name to the machine's processes, with a named event that shows others whether it is
 // held, without their touching the lock. The event follows only where the caller says so: it is set
 // after the lock was taken and reset before it is given back.
 //

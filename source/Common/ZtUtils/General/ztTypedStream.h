@@ -9,8 +9,8 @@
 void ztReadStreamBytes(IztStream* stream, void* bytes, unsigned int count);
 void ztWriteStreamBytes(IztStream* stream, const void* bytes, unsigned int count);
 
-// Longest text of a stream, and how much of one is read at a time, so that a length that is not true
-// costs no memory. In bytes.
+// Longest text of a stream, and how much of one is read at a time, so that a length that is not
+// true costs no memory. In bytes.
 inline constexpr uint64_t kLongestStreamText = 0xFFFFFFFF;
 inline constexpr uint64_t kStreamTextPiece = 64 * 1024;
 
@@ -89,7 +89,7 @@ class CztInStream : public CztStreamBase {
   explicit CztInStream(IztStream* stream);
   CztInStream(CztInStream& outer);
 
-  // Text behind a length of long width: 8 bytes on 64-bit builds, although writers give 4. This is
+  // Text after a length of long width: 8 bytes on 64-bit builds, although writers give 4. This is
   // settled; only 32-bit builds read back what was written. Throws CztStreamException for a length
   // beyond 32 bits; takes no more memory than the stream has bytes.
   CztInStream& operator>>(zt::fnd::AnsiString& text);

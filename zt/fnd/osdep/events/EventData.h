@@ -11,17 +11,17 @@ namespace zt::fnd::osdep {
 
 // One open event; one object a name in a process.
 //
-// A slot in a semaphore set, which the event's lock file names. Where nobody else has the event, the
-// slot that a dead process left is taken over, if the set has outlived that process too and the kind
-// of reset is the same; otherwise the first free slot of the lowest set is taken. The last one to
-// close gives the slot back and removes the lock file. Destruction throws nothing.
+// A slot in a semaphore set, which the event's lock file names. Where no other process has the
+// event, the slot that a dead process left is taken over, if the set has outlived that process too
+// and the kind of reset is the same; otherwise the first free slot of the lowest set is taken. The
+// last one to close gives the slot back and removes the lock file. Destruction throws nothing.
 class EventData : public RefCountedCriticalSectionPolicy {
  public:
   EventData(EventRegistry& statics, const String& name, bool manualReset);
   ~EventData() override;
 
   // Opens or joins. False if the event is being closed by others: nothing is held then, and the
-  // caller has to begin again. `initialState` counts only where nobody else has the event. Throws as
+  // caller has to begin again. `initialState` counts only where no other process has it. Throws as
   // getOrCreateNamedEvent; nothing is held then, and a file that this call has made is gone.
   bool open(bool initialState);
 

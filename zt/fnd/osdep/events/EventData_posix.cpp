@@ -15,8 +15,8 @@ namespace {
 // Counts the sets without a slot, up to the number after which the search ends.
 //
 // Some take long to find out, and count for more: a file that cannot be made 2 ms, one that another
-// process keeps locked half a second. Any user may put what cannot be opened under the names of state
-// files, though, so that some thousands of those count nothing.
+// process keeps locked half a second. Any user may put what cannot be opened under the names of
+// state files, though, so that some thousands of those count nothing.
 class Search {
  public:
   // False at the end of the search.
@@ -145,7 +145,7 @@ void EventData::allocate(const EventFile& file) {
   }
 }
 
-// The lock file first: one that names a slot of somebody else's is seen through, while a used slot
+// The lock file first: one that names another event's slot is recognised, while a used slot
 // that no lock file names would be lost.
 bool EventData::allocateIn(SemaphoreSet& set, unsigned slot, const EventFile& file) {
   const EventPlace::Bytes bytes = EventPlace{set.number(), slot}.encode();
@@ -156,8 +156,8 @@ bool EventData::allocateIn(SemaphoreSet& set, unsigned slot, const EventFile& fi
   return true;
 }
 
-// Attaches to an event that others have. False if what the files say is not this event's: then it is
-// being closed, or a process has died with it. The wrong kind of reset is final.
+// Attaches to an event that others have. False if what the files say is not this event's: then it
+// is being closed, or a process has died with it. The wrong kind of reset is final.
 bool EventData::join(const EventFile& file) {
   EventPlace place;
   if (!ReadPlace(file, place)) return false;

@@ -15,18 +15,18 @@ namespace zt::fnd::osdep {
 
 // Locks an open file: true if the caller has it alone, false if beside others who share it.
 //
-// Waits for somebody who has it alone, 500 times a millisecond. Throws PosixError with flock's errno
-// after that; the file is then not locked.
+// Waits for a process that has it alone, 500 times a millisecond. Throws PosixError with flock's
+// errno after that; the file is then not locked.
 bool GetLockAccessToFile(int fd);
 
 // A file of "namedEvent/" in the shared directory, open and locked.
 //
-// The lock tells who is there: everybody who uses the file shares it, so that the last one, and only
-// the last, can have it alone; the kernel drops it when a process dies. A child that is forked while
-// a file is being opened or closed has no copy of it; a copy of a settled file counts as one more
-// user. An object that came through fork() never unlocks what its parent holds. After the host has
-// closed the descriptor everything fails, and nothing touches what has got its number.
-// Threads: one at a time.
+// The lock shows who is there: every user of the file shares it, so that the last one, and only
+// the last, can have it alone; the kernel drops it when a process dies. A child that is forked
+// while a file is being opened or closed has no copy of it; a copy of a settled file counts as one
+// more user. An object that came through fork() never unlocks what its parent holds. After the host
+// has closed the descriptor everything fails, and nothing touches what has got its number. Threads:
+// one at a time.
 class EventFile {
  public:
   EventFile() = default;  // none
@@ -59,11 +59,11 @@ class EventFile {
   void settle() noexcept;
 
   // Whether close() takes the file's name away, if it is still held alone then. So it is after an
-  // opening that found the file empty, so that one that fails leaves nothing behind.
+  // opening that found the file empty, so that one that fails leaves nothing.
   void discardAtClose(bool discard) noexcept { m_discard = discard; }
 
-  // From shared to alone, if nobody else is there. On false the file is not locked at all, so this
-  // is for the last use only.
+  // From shared to alone, if no other user is there. On false the file is not locked at all, so
+  // this is for the last use only.
   bool claim() noexcept;
 
   // Takes the file's name away, unless it names another file by now. For those who have it alone.

@@ -6,12 +6,12 @@
 
 // The bytes of the two kinds of file in "namedEvent/" of the shared directory.
 //
-// All numbers are in the host's byte order, field behind field, without padding, and the same in
+// All numbers are in the host's byte order, field after field, without padding, and the same in
 // 32-bit and 64-bit processes. docs/event-files.md shows them in worked examples.
 namespace zt::fnd::osdep {
 
 constexpr uint32_t kSlotsPerSet = 128;
-constexpr uint32_t kNoSlot = 0xFFFFFFFFu;  // behind the last free slot
+constexpr uint32_t kNoSlot = 0xFFFFFFFFu;  // after the last free slot
 
 // Contents of an event's lock file: where the event's semaphore is.
 //
@@ -49,7 +49,7 @@ struct SetHeader {
   bool decode(const Bytes& bytes);
 };
 
-// Record of one slot, behind the head by index.
+// Record of one slot, after the head by index.
 //
 //   0  1  in use             1  1  manual reset
 //   2  8  in use: the key of the event's lock file; free: the next free slot, all ones at the end.

@@ -28,12 +28,12 @@ class NamedEventGlobalStatics : public EventRegistry {
   void removeNamedEvent(const EventData& event) override;
 
   // The event of this name, opened or joined. Throws PosixError: EINVAL if this process has it with
-  // the other kind of reset, ENOLCK if another has, or if no semaphore can be had; and what opening
-  // the files and locking the mutex throws.
+  // the other kind of reset, ENOLCK if another has, or if no semaphore is available; and what
+  // opening the files and locking the mutex throws.
   RefPtr<EventData> getOrCreateNamedEvent(const String& name, bool manualReset, bool initialState);
 
-  // Takes one reference away, in a forked child too, where the parent's event stays as it is and its
-  // section cannot be entered.
+  // Takes one reference away, in a forked child too, where the parent's event stays as it is and
+  // its section cannot be entered.
   static void Release(EventData& event);
 
   const ProcessMark process;

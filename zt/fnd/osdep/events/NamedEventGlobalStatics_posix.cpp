@@ -35,8 +35,8 @@ RefPtr<SemaphoreSet> NamedEventGlobalStatics::getOrCreateSemaphoreSet(unsigned n
   return set;
 }
 
-// An event can be closing while it is joined: then everything is let go, and the event opened anew.
-// The others must have a chance to do the same, each at its own pace.
+// An event can be closing while it is joined: then everything is let go, and the event opened
+// again. The others must have a chance to do the same, each at its own pace.
 RefPtr<EventData> NamedEventGlobalStatics::getOrCreateNamedEvent(const String& name,
                                                                  bool manualReset,
                                                                  bool initialState) {

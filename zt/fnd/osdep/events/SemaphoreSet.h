@@ -13,7 +13,7 @@ namespace zt::fnd::osdep {
 // process. The set and its file go with the last object of all processes.
 //
 // Construction never fails: an object without a set is unusable, and callers go on to the next
-// number. Whoever has the state file alone makes it anew, whatever is in it; others join it.
+// number. Whoever has the state file alone makes it again, whatever is in it; others join it.
 //
 // Every operation on the file needs the state-file mutex. A change is one transfer, so that a
 // process killed at any moment leaves a file from before it or after it. What the file says is
@@ -39,16 +39,18 @@ class SemaphoreSet : public RefCountedCriticalSectionPolicy {
   // false if it cannot be read.
   bool readSlot(unsigned slot, SlotRecord& record) const;
 
-  // Adds `delta` to the free count, hands out the first free slot and stores `newFirst` in its
-  // place; with `record`, in the same transfer, the new record of `slot`. False if a transfer failed.
+  // Adds `delta` to the free count, returns the first free slot and stores `newFirst` in its
+  // place; with `record`, in the same transfer, the new record of `slot`. False if a transfer
+  // failed.
   bool updateFreeRecords(int delta, unsigned newFirst, unsigned& oldFirst, unsigned slot = 0,
                          const SlotRecord* record = nullptr);
 
   enum class Room { Some, None, Damaged };
-  // The slot that take() would hand out. Damaged: the free list cannot be trusted.
+  // The slot that take() would return. Damaged: the free list cannot be trusted.
   Room firstFree(unsigned& slot) const;
 
-  // Takes the first free slot, as firstFree() told it, for the event whose lock file has this key.
+  // Takes the first free slot, as firstFree() returned it, for the event whose lock file has this
+  // key.
   bool take(unsigned slot, bool manualReset, key_t key);
 
   // Puts a slot back, unless it is not this event's.
@@ -71,7 +73,7 @@ class SemaphoreSet : public RefCountedCriticalSectionPolicy {
   const ProcessMark m_process;
   EventFile m_file;
   int m_id = -1;
-  bool m_made = false;  // the set is this object's own making
+  bool m_made = false;  // this object made the set
   State m_state = State::Missing;
 };
 

@@ -58,7 +58,7 @@ void SemaphoreSet::open() {
       return;
     }
     if (m_made) RemoveSet(m_id);
-  } catch (const PosixError& e) {  // A set that cannot be had is skipped by its users.
+  } catch (const PosixError& e) {  // Callers skip a set that is not available.
     if (e.whatcode() == EWOULDBLOCK) {
       m_state = State::Busy;
     } else if (m_state == State::Missing && EventFile::Exists(name)) {
@@ -210,7 +210,7 @@ void SemaphoreSet::close() {
     if (m_file.claim()) {
       const unsigned char notReady = 0;
       m_file.write(&notReady, 1, SetHeader::kReadyOffset);
-      // The file of a set that belongs to somebody else stays, for the next to take the set over.
+      // The file of a set that belongs to another user stays, for the next to take the set over.
       if (RetryEintr([&] { return ::semctl(m_id, 0, IPC_RMID); }) != -1) m_file.unlink();
     }
     m_file.close();
