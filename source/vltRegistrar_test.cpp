@@ -10,7 +10,7 @@
 
 #include "source/Common/vltcmn.h"
 #include "source/Utilities/vltutils.h"
-#include "tests/support/LiveBlocks.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/Sanitizer.h"
 #include "tests/support/TempDir.h"
 #include "ztcom/ztcore/ztcom.h"

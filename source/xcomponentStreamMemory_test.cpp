@@ -3,8 +3,8 @@
 #include <stdio.h>
 
 #include "source/xcomponentStream.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/InChild.h"
-#include "tests/support/RefusingMalloc.h"
 #include "tests/support/StreamBytes.h"
 #include "tests/support/TempDir.h"
 

@@ -6,7 +6,7 @@
 #include <set>
 
 #include "source/vlrHelpers.h"
-#include "tests/support/AllocFailure.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/InChild.h"
 #include "tests/support/MemoryLimit.h"
 #include "tests/support/ScopedLocale.h"

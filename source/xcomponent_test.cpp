@@ -9,7 +9,7 @@
 
 #include "source/Common/vltcmn.h"
 #include "source/Utilities/vltutils.h"
-#include "tests/support/LiveBlocks.h"
+#include "tests/support/FailingHeap.h"
 #include "zt/fnd/Guid.h"
 
 namespace vlt::test {
@@ -359,7 +359,7 @@ bool FailsAtAndLeavesNothing(const Source& source, long n) {
         }
       },
       n, false);
-  if (outcome != heap::kTold) {
+  if (outcome != heap::kReported) {
     // Of a dictionary's texts the last one's result counts.
     EXPECT_EQ(result, S_OK);
     FreeNarrow(target);
@@ -416,7 +416,7 @@ TEST(xcomponentMemory, AComponentWhoseCopyFailedHoldsNoTexts) {
                     return copy.record().name || copy.record().fileName ? S_OK : E_OUTOFMEMORY;
                   },
                   n, false),
-              heap::kTold);
+              heap::kReported);
     EXPECT_EQ(heap::LiveBlocks(), before) << n;
   }
   vltutilsFreeComponent2(source);

@@ -4,7 +4,7 @@
 #include <malloc.h>
 
 #include "source/Common/vltcmn.h"
-#include "tests/support/AllocFailure.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/InChild.h"
 #include "tests/support/MemoryLimit.h"
 #include "tests/support/RegistrarClient.h"

@@ -5,7 +5,7 @@
 
 #include <filesystem>
 
-#include "tests/support/AllocFailure.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/FileSizeLimit.h"
 #include "tests/support/SaveCounter.h"
 #include "tests/support/TestRegistrar.h"

@@ -8,7 +8,7 @@
 #include "source/Common/ZtUtils/General/vlTracer.h"
 #include "source/Common/vltFailure.h"
 #include "source/Utilities/vltutils.h"
-#include "tests/support/AllocFailure.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
 #include "tests/support/Modules.h"

@@ -194,11 +194,7 @@ inline int WhatIsBroken(const Promises& promises, const std::vector<GUID>& bundl
   IvltRegistrar* r = nullptr;
   if (GetRegistrar(&r) != "ok") return kStartRefused;
   int broken = 0;
-  void* raw = nullptr;
-  unsigned size = 0;
-  if (r->QueryInterface(IID_IvltRegistrar2, &raw) < 0) return kStartRefused;
-  static_cast<IvltRegistrar2*>(raw)->GetStorageServerCacheSize(&size);
-  if (!promises.cacheSize.isKeptBy(size)) broken |= kCacheSizeLost;
+  if (!promises.cacheSize.isKeptBy(CacheSize(*r))) broken |= kCacheSizeLost;
   for (int n = 0; n < promises.components; ++n) {
     if (Find(*r, G(promises.component[n])) != S_OK) broken |= kComponentLost;
   }

@@ -85,23 +85,6 @@ void RegisterAll(IvltRegistrar& r, int worker, const SharedAnswers& answers) {
   }
 }
 
-HRESULT SetCacheSize(IvltRegistrar& r, unsigned size) {
-  void* raw = nullptr;
-  if (r.QueryInterface(IID_IvltRegistrar2, &raw) < 0) return E_NOINTERFACE;
-  HRESULT result = static_cast<IvltRegistrar2*>(raw)->SetStorageServerCacheSize(size);
-  r.Release();
-  return result;
-}
-
-unsigned CacheSize(IvltRegistrar& r) {
-  void* raw = nullptr;
-  unsigned size = 0;
-  if (r.QueryInterface(IID_IvltRegistrar2, &raw) < 0) return 0;
-  static_cast<IvltRegistrar2*>(raw)->GetStorageServerCacheSize(&size);
-  r.Release();
-  return size;
-}
-
 // The lock file of the database: its path in capitals, without separators and dots.
 std::string LockFile() {
   std::string config = ReadBytes(std::string(getenv("XDG_CONFIG_HOME")) + "/com.zentrex.kor.ini");

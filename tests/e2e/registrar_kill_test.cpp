@@ -28,11 +28,9 @@ constexpr char kSaveVariable[] = "VLT_E2E_SAVE";
 int SaveOnce(const char* what) {
   IvltRegistrar* registrar = nullptr;
   if (GetRegistrar(&registrar) != "ok") return 1;
-  void* raw = nullptr;
-  if (registrar->QueryInterface(IID_IvltRegistrar2, &raw) < 0) return 2;
   auto size = static_cast<unsigned>(strtoul(what, nullptr, 10));
   access(kBegin, F_OK);
-  HRESULT result = static_cast<IvltRegistrar2*>(raw)->SetStorageServerCacheSize(size);
+  HRESULT result = SetCacheSize(*registrar, size);
   access(kEnd, F_OK);
   return result == S_OK ? 0 : 3;
 }
@@ -80,15 +78,6 @@ bool HasAll(IvltRegistrar& r, const std::vector<GUID>& all) {
     if (Find(r, id) != S_OK) return false;
   }
   return true;
-}
-
-unsigned CacheSize(IvltRegistrar& r) {
-  void* raw = nullptr;
-  unsigned size = 0;
-  if (r.QueryInterface(IID_IvltRegistrar2, &raw) < 0) return 0;
-  static_cast<IvltRegistrar2*>(raw)->GetStorageServerCacheSize(&size);
-  r.Release();
-  return size;
 }
 
 // A start after a kill: old or new value, and all components.

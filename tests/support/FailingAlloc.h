@@ -9,52 +9,48 @@
 
 namespace ztini::test {
 
-// For tests: while an object lives, the allocation of the given number (from 1) and every later
-// one fails. One object at a time; single-threaded tests only.
-class FailFromAllocation {
+// The INI engine asks for memory through a function of its own, so its tests refuse there, in every
+// build. One object at a time; single-threaded tests only.
+class FailingRealloc {
  public:
-  explicit FailFromAllocation(int number) : m_before(g_realloc) {
-    s_left = number;
-    s_failed = false;
-    g_realloc = [](void* block, size_t size) -> void* {
-      if (--s_left > 0) return std::realloc(block, size);
-      s_left = 0;
-      s_failed = true;
-      return nullptr;
-    };
-  }
-  ~FailFromAllocation() { g_realloc = m_before; }
-  FailFromAllocation(const FailFromAllocation&) = delete;
-  FailFromAllocation& operator=(const FailFromAllocation&) = delete;
+  FailingRealloc(const FailingRealloc&) = delete;
+  FailingRealloc& operator=(const FailingRealloc&) = delete;
 
   // True once an allocation was refused.
   bool failed() const { return s_failed; }
 
+ protected:
+  FailingRealloc(int number, bool withAllThatFollow) : m_before(g_realloc) {
+    s_left = number;
+    s_withAllThatFollow = withAllThatFollow;
+    s_failed = false;
+    g_realloc = [](void* block, size_t size) {
+      return Refuses() ? nullptr : std::realloc(block, size);
+    };
+  }
+  ~FailingRealloc() { g_realloc = m_before; }
+
  private:
+  static bool Refuses() {
+    if (s_failed) return s_withAllThatFollow;
+    return s_failed = --s_left <= 0;
+  }
+
   inline static int s_left = 0;
-  inline static bool s_failed = false;
+  inline static bool s_withAllThatFollow = false, s_failed = false;
   ReallocFunction m_before;
 };
 
-// As FailFromAllocation, but the allocation of that number alone fails.
-class FailOneAllocation {
+// While an object lives, the allocation of the given number (from 1) and every later one fails.
+class FailFromAllocation : public FailingRealloc {
  public:
-  explicit FailOneAllocation(int number) : m_before(g_realloc) {
-    s_left = number;
-    g_realloc = [](void* block, size_t size) -> void* {
-      return s_left > 0 && --s_left == 0 ? nullptr : std::realloc(block, size);
-    };
-  }
-  ~FailOneAllocation() { g_realloc = m_before; }
-  FailOneAllocation(const FailOneAllocation&) = delete;
-  FailOneAllocation& operator=(const FailOneAllocation&) = delete;
+  explicit FailFromAllocation(int number) : FailingRealloc(number, true) {}
+};
 
-  // True once the allocation was refused.
-  bool failed() const { return s_left == 0; }
-
- private:
-  inline static int s_left = 0;
-  ReallocFunction m_before;
+// As FailFromAllocation, but the allocation of that number alone fails.
+class FailOneAllocation : public FailingRealloc {
+ public:
+  explicit FailOneAllocation(int number) : FailingRealloc(number, false) {}
 };
 
 // For tests: counts what the engine allocates while an object lives. What is freed stays counted; a

@@ -1,10 +1,12 @@
 #pragma once
 
-// A heap that refuses: the 1st, 2nd, 3rd ... allocation of a call fails, once and for all that follow,
-// until the call succeeds. No crash; a result or an exception that is told; nothing that grows; and the
-// call works again afterwards.
+// A heap that refuses: the 1st, 2nd, 3rd ... allocation of a call fails, once or with all that follow,
+// until the call succeeds. No crash; a result or an exception that reports it; nothing that grows; and
+// the call works again afterwards.
 //
-// One source of the program includes RefusingMalloc.h as well.
+// Every test program has this malloc, which comes before the C library's for every library of the
+// process. The sanitizers have a malloc of their own: there only FailAllocation refuses, and sweeps are
+// skipped (kCanLimitMemory).
 #include <errno.h>
 
 #include <atomic>
@@ -12,12 +14,13 @@
 #include <new>
 #include <string>
 
+#include "tests/support/Sanitizer.h"
 #include "zt/fnd/Exception.h"
 
 namespace vlt::test::heap {
 
 inline std::atomic<long> g_countdown{-1};  // allocations until the failure; negative: not armed
-inline std::atomic<bool> g_forEver{false};
+inline std::atomic<bool> g_allThatFollow{false};
 inline std::atomic<bool> g_failed{false};
 inline std::atomic<long> g_live{0};
 
@@ -30,7 +33,7 @@ inline bool Refuse() {
     return false;
   }
   g_failed = true;
-  if (!g_forEver) g_countdown = -1;
+  if (!g_allThatFollow) g_countdown = -1;
   errno = ENOMEM;
   return true;
 }
@@ -42,29 +45,29 @@ inline void* Counted(void* block) {
 
 // What is swept. `run` gives a negative result only for a failure; it succeeds with all allocations.
 // `holds`, where there is one, is asked after every attempt, with all allocations: is the state that of
-// after the call, or, where the call told a failure, that of before it?
+// after the call, or, where the call reported a failure, that of before it?
 struct Call {
   std::string name;
   std::function<int32_t()> run;
   std::function<bool(bool succeeded)> holds = {};
 };
 
-enum Outcome { kWorks = 0, kTold = 1, kBadAlloc = 2, kNoFailure = 77 };
+enum Outcome { kWorks = 0, kReported = 1, kBadAlloc = 2, kNoFailure = 77 };
 
 // Runs the call with the n-th allocation, from 0, failing.
-inline Outcome Attempt(const std::function<int32_t()>& run, long n, bool forEver) {
-  g_forEver = forEver;
+inline Outcome Attempt(const std::function<int32_t()>& run, long n, bool allThatFollow) {
+  g_allThatFollow = allThatFollow;
   g_failed = false;
   g_countdown = n;
   Outcome outcome;
   try {
-    outcome = run() < 0 ? kTold : kWorks;
+    outcome = run() < 0 ? kReported : kWorks;
   } catch (const std::bad_alloc&) {
     outcome = kBadAlloc;
   } catch (const zt::fnd::exception::Exception&) {
-    outcome = kTold;  // A system call that failed for want of memory is told by its own exception.
+    outcome = kReported;  // A system call that ran out of memory has an exception of its own.
   } catch (int) {
-    outcome = kTold;
+    outcome = kReported;
   }
   g_countdown = -1;
   return g_failed ? outcome : kNoFailure;
@@ -80,13 +83,13 @@ enum Trouble {
 };
 
 // Every allocation of the call in turn.
-inline Trouble Sweep(const Call& call, bool forEver, long* tried) {
+inline Trouble Sweep(const Call& call, bool allThatFollow, long* tried) {
   for (*tried = 0;; ++*tried) {
     if (call.run() < 0) return *tried == 0 ? kFailsAnyway : kFailsAfterwards;
     // Three times: what is made at a first failure, and kept, is no leak; a leak grows again.
     long afterFirst = 0;
     for (int round = 0; round < 3; ++round) {
-      Outcome outcome = Attempt(call.run, *tried, forEver);
+      Outcome outcome = Attempt(call.run, *tried, allThatFollow);
       if (outcome == kNoFailure) return kNone;
       if (call.holds && !call.holds(outcome == kWorks)) return kStateLost;
       if (call.run() < 0) return kFailsAfterwards;
@@ -96,4 +99,26 @@ inline Trouble Sweep(const Call& call, bool forEver, long* tried) {
   }
 }
 
+// Blocks of the heap that are alive, in every build. Only differences mean something, and only while no
+// other thread allocates.
+long LiveBlocks();
+
 }  // namespace vlt::test::heap
+
+namespace vlt::test {
+
+// Makes the nth allocation by operator new of this thread fail with std::bad_alloc, counted from 1
+// from here on; the ones before and after it succeed, and so does malloc(). Ends with the object. One
+// at a time.
+class FailAllocation {
+ public:
+  explicit FailAllocation(int nth);
+  ~FailAllocation();
+  FailAllocation(const FailAllocation&) = delete;
+  FailAllocation& operator=(const FailAllocation&) = delete;
+
+  // True once the allocation has failed.
+  bool happened() const;
+};
+
+}  // namespace vlt::test

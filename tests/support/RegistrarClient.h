@@ -89,6 +89,23 @@ inline std::vector<std::wstring> Names(IvltRegistrar& registrar, _vltComponentTy
   return names;
 }
 
+inline HRESULT SetCacheSize(IvltRegistrar& r, unsigned size) {
+  void* raw = nullptr;
+  if (r.QueryInterface(IID_IvltRegistrar2, &raw) < 0) return E_NOINTERFACE;
+  HRESULT result = static_cast<IvltRegistrar2*>(raw)->SetStorageServerCacheSize(size);
+  r.Release();
+  return result;
+}
+
+inline unsigned CacheSize(IvltRegistrar& r) {
+  void* raw = nullptr;
+  unsigned size = 0;
+  if (r.QueryInterface(IID_IvltRegistrar2, &raw) < 0) return 0;
+  static_cast<IvltRegistrar2*>(raw)->GetStorageServerCacheSize(&size);
+  r.Release();
+  return size;
+}
+
 inline std::wstring Wide(const std::string& text) { return std::wstring(text.begin(), text.end()); }
 
 // Path that the registrar tells, freed.

@@ -7,7 +7,7 @@
 #include <string>
 #include <type_traits>
 
-#include "tests/support/AllocFailure.h"
+#include "tests/support/FailingHeap.h"
 #include "zt/fnd/NumericCast.h"
 #include "zt/fnd/SafeInteger.h"
 

@@ -8,7 +8,7 @@
 #include <csignal>
 #include <filesystem>
 
-#include "tests/support/AllocFailure.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/InChild.h"
 #include "tests/support/StreamBytes.h"
 #include "tests/support/TempDir.h"

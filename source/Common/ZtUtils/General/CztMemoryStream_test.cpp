@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include "tests/support/AllocFailure.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/InChild.h"
 #include "tests/support/MemoryLimit.h"
 #include "tests/support/StreamBytes.h"

@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include "tests/support/AllocFailure.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/SlotOf.h"
 #include "tests/support/StreamBytes.h"
 #include "ztcom/ztcore/ztmemmgr.h"

@@ -7,7 +7,6 @@
 #include <cstdio>
 
 #include "tests/support/InChild.h"
-#include "tests/support/RefusingMalloc.h"
 #include "tests/support/StreamBytes.h"
 #include "tests/support/TempDir.h"
 #include "ztcom/ztcore/ztmemmgr.h"

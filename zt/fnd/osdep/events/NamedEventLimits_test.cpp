@@ -22,11 +22,11 @@
 #include <system_error>
 #include <vector>
 
-#include "tests/support/AllocFailure.h"
 #include "tests/support/Child.h"
 #include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/FailSystemCall.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/MemoryLimit.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
@@ -49,7 +49,8 @@ using vlt::test::WriteBytes;
 using Clock = std::chrono::steady_clock;
 using Names = std::vector<std::string>;
 
-constexpr auto kSoon = std::chrono::seconds(5);
+// An opening gives up after two seconds. Far more tells a hang from a slow machine.
+constexpr auto kSoon = std::chrono::seconds(20);
 // A 32-bit process has two ways to ask for a set.
 constexpr long kSemget[] = {
     SYS_semget,
