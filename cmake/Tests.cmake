@@ -20,6 +20,14 @@ if(VLT_PCH)
     <thread> <vector>)
 endif()
 
+# Tests that take more than two seconds. They get the label "slow", and ./dev alone leaves them out.
+set(slow_tests "Check.AHang*" "ForkThreads.TextBeyond*" "ForkThreads.MutexWithAName*" "Failures/Oom.EveryCall*"
+  "Hostile.A*Million*" "Hostile.AHundredThousand*" "IniFileLockLocale.Writers*" "Locales.*" "NamesInLocales.*"
+  "NamedEventLimits.StateFilesThatCannot*" "NamedEventLimits.ThousandUnusable*" "NamedEventHostile.LockFileShared*"
+  "Planted.Links*" "Planted.SecondNames*" "Planted.Sockets" "PowerCut*" "FailingCall.*" "Prefork.SlowWrites*"
+  "RegistrarKill.*" "Rendezvous*" "vltSettingsTable.EveryChoice*Server")
+list(JOIN slow_tests ":" slow_tests)
+
 # vlt_tests(name LABELS ... [SOURCES ...] [GLOBS ...] [LINKS ...] [TIMEOUT seconds])
 function(vlt_tests name)
   cmake_parse_arguments(ARG "" "LABELS;TIMEOUT" "SOURCES;GLOBS;LINKS" ${ARGN})
@@ -45,8 +53,10 @@ function(vlt_tests name)
   if(NOT ARG_TIMEOUT)
     set(ARG_TIMEOUT 120)
   endif()
-  gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 60
-    PROPERTIES TIMEOUT ${ARG_TIMEOUT} LABELS "${ARG_LABELS}")
+  gtest_discover_tests(${name} TEST_FILTER "-${slow_tests}" DISCOVERY_MODE PRE_TEST
+    DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT ${ARG_TIMEOUT} LABELS "${ARG_LABELS}")
+  gtest_discover_tests(${name} TEST_FILTER "${slow_tests}" DISCOVERY_MODE PRE_TEST
+    DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT ${ARG_TIMEOUT} LABELS ${ARG_LABELS} LABELS slow)
 endfunction()
 
 vlt_tests(support_tests LABELS unit GLOBS tests/support/*_test.cpp)

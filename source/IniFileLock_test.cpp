@@ -17,6 +17,7 @@
 #include "tests/support/Sanitizer.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/TestIni.h"
+#include "tests/support/ThreadState.h"
 #include "zt/fnd/Exception.h"
 
 namespace {
@@ -57,8 +58,8 @@ TEST(IniFileLock, AnotherThreadWaits) {
     CvlIniMgr mine = CvlIniMgr::LockOnly(file);
     entered.notify();
   });
-  EXPECT_TRUE(started.await());
-  EXPECT_FALSE(entered.await(50));
+  EXPECT_TRUE(other.blocksInLock());
+  EXPECT_FALSE(entered.await(0));
   outer.reset();
   EXPECT_TRUE(entered.await());
   other.join();

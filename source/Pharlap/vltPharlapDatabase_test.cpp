@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 #include <string.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <filesystem>
@@ -187,7 +188,8 @@ TEST(vltPharlapDatabase, IsOpenUntilTheRegistrarGoesAndFreeThen) {
     secondOpen.notify();
     return 0;
   });
-  EXPECT_FALSE(secondOpen.await(200));
+  EXPECT_TRUE(Eventually([&] { return BlockedIn(second.pid(), SYS_flock); }));
+  EXPECT_FALSE(secondOpen.await(0));
   close.notify();
   ASSERT_TRUE(closed.await());
   EXPECT_TRUE(secondOpen.await());

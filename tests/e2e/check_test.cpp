@@ -292,11 +292,9 @@ TEST(Check, AProcessStartedAtLoad) {
         "#include <stdio.h>\n" +
             AtLoad("if (fork() == 0) { " + writePid + "for (;;) pause(); } while (access(\"" +
                    pidFile + "\", F_OK) != 0) usleep(1000);"));
-  auto begin = std::chrono::steady_clock::now();
   Found found = Check(1);
-  std::chrono::duration<double> taken = std::chrono::steady_clock::now() - begin;
   EXPECT_TRUE(found.sound);
-  EXPECT_LT(taken.count(), 9);
+  EXPECT_EQ(found.notes, Messages());  // one that was held up says so after ten seconds
   std::string pid = ReadBytes(pidFile);
   EXPECT_FALSE(pid.empty());
   EXPECT_TRUE(Eventually([&] {

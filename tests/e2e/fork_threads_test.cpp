@@ -81,7 +81,7 @@ TEST_F(ForkThreads, ChildOfAProcessThatIsMakingItsRegistrarMakesItsOwn) {
     auto* maker = new WatchedThread([] { TheRegistrar(); });
     ASSERT_TRUE(maker->blocksIn(SYS_flock));
     Child child([] { return TheRegistrar() ? 0 : 1; });
-    EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }, 5000));
+    EXPECT_TRUE(Eventually([&] { return BlockedIn(child.pid(), SYS_flock); }));
   });
   close(database);
 }

@@ -5,7 +5,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <chrono>
 #include <filesystem>
 
 #include "tests/e2e/CheckTree.h"
@@ -199,9 +198,7 @@ TEST_F(VltctlHostile, PipesAndDevicesAreNotOpened) {
     }
     for (const std::vector<std::string>& command :
          {std::vector<std::string>{"jar"}, {"settings"}, {"verify", trap}, {"hook", "clear"}}) {
-      auto begin = std::chrono::steady_clock::now();
       ProgramResult result = Look(command);
-      EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(5)) << command[0];
       EXPECT_EQ(result.exitCode, kDataUnusable) << command[0] << result.out << result.err;
     }
   }

@@ -24,7 +24,7 @@ struct KernelTime {
   long seconds, nanoseconds;
 };
 
-std::array<long long, 8> s_sleeps;
+std::array<long long, 1000> s_sleeps;
 std::size_t s_count;
 
 void OnSleep(int, siginfo_t*, void* context) {

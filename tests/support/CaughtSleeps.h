@@ -8,7 +8,7 @@ namespace vlt::test {
 // for children only. False if the kernel does not allow it.
 bool CatchSleeps();
 
-// The sleeps so far, in milliseconds, as the kernel was asked for them; at most the first eight.
+// The sleeps so far, in milliseconds, as the kernel was asked for them; at most the first thousand.
 std::vector<long long> CaughtSleeps();
 
 }  // namespace vlt::test

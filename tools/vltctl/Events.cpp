@@ -38,7 +38,7 @@ std::string Bytes(const fs::path& file) {
   return got > 0 ? std::string(block, static_cast<size_t>(got)) : "";
 }
 
-// Files below a directory, by their path as the kernel tells it, and who has them open.
+// Files below a directory, by their path as the kernel reports it, and who has them open.
 using FileHolders = std::map<std::string, std::vector<int>>;
 struct Holders {
   FileHolders named, unlinked;
@@ -71,7 +71,7 @@ Holders HoldersBelow(const std::string& directory) {
 std::string List(const std::vector<int>& pids) {
   std::string out;
   for (int pid : pids) out += (out.empty() ? "" : " ") + std::to_string(pid);
-  return out.empty() ? "nobody" : out;
+  return out.empty() ? "no process" : out;
 }
 
 bool IsSetFile(const std::string& name) {

@@ -6,10 +6,10 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <chrono>
 #include <string>
 #include <vector>
 
+#include "tests/support/InChild.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
@@ -190,13 +190,12 @@ TEST(FindFilesWildcard, Table) {
   }
 }
 
-TEST(FindFilesWildcard, HostilePatternEndsSoon) {
+// One that tried every split of the name would meet the child's deadline.
+TEST_IN_CHILD(FindFilesWildcard, HostilePatternEndsSoon) {
   String pattern, name(5000, L'a');
   for (int i = 0; i < 500; ++i) pattern += L"*a";
   pattern += L"b";
-  auto start = std::chrono::steady_clock::now();
   EXPECT_FALSE(WildcardFit(pattern.c_str(), name.c_str()));
-  EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(10));
 }
 
 }  // namespace

@@ -97,7 +97,7 @@ TEST_IN_CHILD(vlTracerFork, ChildOfAForkDuringAWriteKeepsNoLock) {
   }));
   // The child lives, and the lock is free again.
   WatchedThread next([] { Say("next"); });
-  EXPECT_TRUE(Eventually([&] { return next.done(); }, 5000));
+  EXPECT_TRUE(Eventually([&] { return next.done(); }));
   kill(idle, SIGKILL);
   waitpid(idle, nullptr, 0);
 }

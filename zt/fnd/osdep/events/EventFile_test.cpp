@@ -13,8 +13,8 @@
 #include <filesystem>
 #include <thread>
 
+#include "tests/support/CaughtSleeps.h"
 #include "tests/support/Child.h"
-#include "tests/support/Elapsed.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/FailSystemCall.h"
 #include "tests/support/InChild.h"
@@ -30,13 +30,11 @@ namespace zt::fnd::osdep {
 namespace {
 
 using vlt::test::Child;
-using vlt::test::Clock;
 using vlt::test::EventPlace;
 using vlt::test::Eventually;
 using vlt::test::Exists;
 using vlt::test::Keeper;
 using vlt::test::ModeOf;
-using vlt::test::MsSince;
 using vlt::test::OpenDescriptors;
 using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
@@ -80,7 +78,7 @@ TEST(EventFileLockAccess, WaitsForTheExclusivePhaseOfAnother) {
   finisher.join();
 }
 
-TEST(EventFileLockAccess, GivesUpAfterHalfASecondWithTheErrnoAndNoLock) {
+TEST_IN_CHILD(EventFileLockAccess, GivesUpAfterFiveHundredRoundsOfAMillisecond) {
   Raw raw;
   ScopedFd first = raw.open(), second = raw.open();
   ASSERT_EQ(Flock(first.get(), LOCK_EX), 0);

@@ -8,7 +8,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <chrono>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
@@ -18,10 +17,12 @@
 #include <thread>
 #include <vector>
 
+#include "tests/support/CaughtSleeps.h"
 #include "tests/support/Child.h"
 #include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
 #include "tests/support/HostsFile.h"
+#include "tests/support/InChild.h"
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/ThreadState.h"
@@ -57,8 +58,6 @@ using vlt::test::WriteBytes;
 using Clock = std::chrono::steady_clock;
 using Names = std::vector<std::string>;
 using Slot = EventPlace::Slot;
-
-constexpr auto kSoon = std::chrono::seconds(5);
 
 auto Open(const std::string& name, bool manual = kManual, bool initial = kClear) {
   return std::make_unique<NamedEvent>(Wide(name), manual, initial);
@@ -185,7 +184,8 @@ TEST(NamedEventHostile, StateFileLockedByAStrangerIsSkipped) {
   EXPECT_EQ((Slot{2, 0}), place.slotOf("name"));
 }
 
-TEST(NamedEventHostile, SetsLockedByAStrangerDoNotHoldAnOpenerForEver) {
+// An opening that never gave up would meet the child's deadline.
+TEST_IN_CHILD(NamedEventHostile, SetsLockedByAStrangerDoNotHoldAnOpenerIndefinitely) {
   EventPlace place;
   Open("warm up");
   std::vector<ScopedFd> stranger;
@@ -312,7 +312,7 @@ TEST(NamedEventHostile, PlantedPlacesOfTheEventAreRefused) {
   EXPECT_EQ(descriptors, OpenDescriptors());
 }
 
-TEST(NamedEventHostile, LockFileHeldAloneForLongIsEAGAIN) {
+TEST_IN_CHILD(NamedEventHostile, LockFileHeldAloneForLongIsEAGAIN) {
   EventPlace place;
   Open("warm up");
   ScopedFd stranger(::open(place.file("name").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666));
@@ -362,7 +362,8 @@ TEST(NamedEventHostile, JoinOfAKilledHoldersEventBeginsAnew) {
   EXPECT_EQ(Names(), place.files());
 }
 
-TEST(NamedEventHostile, LockFileSharedForEverByAStrangerIsENOLCK) {
+// An opening that never gave up would meet the child's deadline.
+TEST_IN_CHILD(NamedEventHostile, LockFileSharedIndefinitelyByAStrangerIsENOLCK) {
   EventPlace place;
   Open("warm up");
   ScopedFd stranger(::open(place.file("name").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0666));

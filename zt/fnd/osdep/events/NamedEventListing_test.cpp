@@ -5,7 +5,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <chrono>
 #include <filesystem>
 #include <map>
 #include <memory>
@@ -109,8 +108,8 @@ TEST_F(NamedEventListing, EventsOfTheDeadAreHeldByNobody) {
   Keeper killed([] { return OpenEvent("name"); });
   ASSERT_TRUE(killed.good());
   killed.kill();
-  Rows expected = {{"name", "set 1, slot 0; held by nobody"},
-                   {"sem_1", "set of 128 slots, 127 free; held by nobody"}};
+  Rows expected = {{"name", "set 1, slot 0; held by no process"},
+                   {"sem_1", "set of 128 slots, 127 free; held by no process"}};
   EXPECT_EQ(expected, list());
 }
 

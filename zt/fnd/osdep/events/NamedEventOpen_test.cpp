@@ -9,7 +9,6 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
-#include <chrono>
 #include <cstring>
 #include <filesystem>
 #include <memory>
@@ -17,6 +16,7 @@
 #include <string>
 #include <vector>
 
+#include "tests/support/CaughtSleeps.h"
 #include "tests/support/Child.h"
 #include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
@@ -59,10 +59,12 @@ constexpr auto Open = [](const std::string& name, bool manual = kManual, bool in
   return vlt::test::OpenEvent(name, manual, initial);
 };
 
-// The errno that opening the name fails with in another process; 0 if it does not.
+// The errno that opening the name fails with in another process; 0 if it does not. It does not sleep.
 int ErrorElsewhere(const std::string& name, bool manual) {
   return Child([&] {
+           EXPECT_TRUE(vlt::test::CatchSleeps());
            int error = PosixErrorOf([&] { Open(name, manual); });
+           EXPECT_TRUE(vlt::test::CaughtSleeps().empty());
            return error == -1 ? 0 : error;
          })
       .wait();
