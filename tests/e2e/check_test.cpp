@@ -62,12 +62,12 @@ std::pair<HRESULT, Messages> Checked(GUID id) {
   return {result, messages};
 }
 
-// The library is told by the export, in a fresh process, and by the tool, with these notes.
+// The library is reported by the export, in a fresh process, and by the tool, with these notes.
 void ExpectTold(uint32_t n, const Messages& messages, const Messages& notes) {
   ExpectStart([&](IvltRegistrar&) {
-    auto [result, told] = Checked(G(n));
+    auto [result, reported] = Checked(G(n));
     EXPECT_EQ(result, messages.empty() ? S_OK : E_FAIL);
-    EXPECT_EQ(told, messages);
+    EXPECT_EQ(reported, messages);
   });
   Found found = Check(n);
   EXPECT_EQ(found.exitCode, messages.empty() ? kGood : kDataUnusable);
@@ -184,7 +184,7 @@ TEST(Check, AFileThatMayNotBeRead) {
   });
 }
 
-// The same by the tool, which runs as somebody else from the start.
+// The same by the tool, which runs as another user from the start.
 TEST_IN_CHILD(Check, TheToolToldOfAFileThatMayNotBeRead) {
   Experts e;
   std::string file = e.add(1, "secret");
@@ -212,11 +212,11 @@ TEST(Check, APathThatCannotBeLookedAtHidesNoOther) {
   std::string circle = e.add(1, "circle"), missing = e.add(2, "missing");
   std::filesystem::create_symlink(circle, circle);
   ExpectStart([&](IvltRegistrar&) {
-    auto [result, told] = Checked(GUID_NULL);
+    auto [result, reported] = Checked(GUID_NULL);
     EXPECT_EQ(result, E_FAIL);
     for (const std::string& text :
          {IsNot("is not readable", circle), IsNot("does not exist", missing)}) {
-      EXPECT_EQ(std::count(told.begin(), told.end(), text), 1) << text;
+      EXPECT_EQ(std::count(reported.begin(), reported.end(), text), 1) << text;
     }
   });
 }
@@ -300,7 +300,7 @@ TEST(Check, AProcessStartedAtLoad) {
   EXPECT_TRUE(Eventually([&] {
     std::string state;
     std::ifstream("/proc/" + pid + "/stat") >> state >> state >> state;
-    return state.empty() || state == "Z";  // gone, or nobody has asked for it yet
+    return state.empty() || state == "Z";  // gone, or not reaped yet
   })) << pid;
 }
 
@@ -341,14 +341,15 @@ TEST(Check, AComponentWithoutAnIdentifierIsNotTakenForAll) {
   Build(e.add(1, "crash"), AtLoad("abort();"));
   Build(e.add("unreadable", "nameless", e.file("nameless")), kGoodEntry);
   const char* const kNull = "00000000-0000-0000-0000-000000000000";
-  const std::string told =
+  const std::string reported =
       "object expert nameless: NOT SOUND\n"
       "    it has no identifier of its own, so it cannot be checked alone\n";
   ProgramResult one = Vltctl({"check", kNull});
   EXPECT_EQ(one.exitCode, kDataUnusable);
-  EXPECT_EQ(one.out, told);
+  EXPECT_EQ(one.out, reported);
   ProgramResult all = Vltctl({"check"});
-  EXPECT_NE(all.out.find(told + "object expert crash: NOT SOUND\n"), std::string::npos) << all.out;
+  EXPECT_NE(all.out.find(reported + "object expert crash: NOT SOUND\n"), std::string::npos)
+      << all.out;
   Experts others;
   ProgramResult none = Vltctl({"check", kNull});
   EXPECT_EQ(none.exitCode, kNotFound);

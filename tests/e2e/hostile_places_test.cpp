@@ -17,12 +17,12 @@ namespace {
 
 namespace fs = std::filesystem;
 
-// ---- What stands in a file's place
+// ---- What is in a file's place
 
 void MakePipe(const std::string& path) { ASSERT_EQ(mkfifo(path.c_str(), 0666), 0) << path; }
 
 TEST(HostilePlaces, PipesPlainFilesAndLinksInBundles) {
-  Besieged b;
+  HostileInstallation b;
   std::string experts = b.root() + "/Experts/", dictionaries = b.root() + "/Data Dictionaries/";
   fs::create_directories(experts + "pipe-inside.vle/Resources");
   MakePipe(experts + "pipe-inside.vle/Resources/Info.vlr");
@@ -48,14 +48,14 @@ TEST(HostilePlaces, PipesPlainFilesAndLinksInBundles) {
 }
 
 TEST(HostilePlaces, ALinkToTheDatabaseAsRegistrationFile) {
-  Besieged b;
+  HostileInstallation b;
   fs::create_directories(b.root() + "/Experts/self.vle/Resources");
   fs::create_symlink(b.database(), b.root() + "/Experts/self.vle/Resources/Info.vlr");
   b.expectGood();
 }
 
 TEST(HostilePlaces, APipeInTheDatabasesPlaceIsRefusedAndStays) {
-  Besieged b;
+  HostileInstallation b;
   MakePipe(b.database());
   ExpectStart("int 1");
   ExpectStart("int 1");
@@ -64,7 +64,7 @@ TEST(HostilePlaces, APipeInTheDatabasesPlaceIsRefusedAndStays) {
 }
 
 TEST(HostilePlaces, ADirectoryInTheDatabasesPlaceIsRefusedAndStays) {
-  Besieged b;
+  HostileInstallation b;
   fs::create_directories(b.database() + "/kept");
   ExpectStart("int 1");
   EXPECT_TRUE(Exists(b.database() + "/kept"));
@@ -76,7 +76,7 @@ TEST(HostilePlaces, ADirectoryInTheDatabasesPlaceIsRefusedAndStays) {
 
 // It says nothing about the database, which is taken as it is.
 TEST(HostilePlaces, APipeInTheSidecarsPlaceLosesNothing) {
-  Besieged b;
+  HostileInstallation b;
   ExpectStart("ok");
   unlink(b.sidecar().c_str());
   MakePipe(b.sidecar());
@@ -88,7 +88,7 @@ TEST(HostilePlaces, APipeInTheSidecarsPlaceLosesNothing) {
 
 // A sidecar that opens but is short: one process without components, and the next starts are whole.
 TEST(HostilePlaces, ADirectoryInTheSidecarsPlaceCostsOneStart) {
-  Besieged b;
+  HostileInstallation b;
   ExpectStart("ok");
   std::string contents = ReadBytes(b.database());
   unlink(b.sidecar().c_str());
@@ -109,7 +109,7 @@ TEST(HostilePlaces, ADirectoryInTheSidecarsPlaceCostsOneStart) {
 }
 
 TEST(HostilePlaces, ALinkInTheSidecarsPlaceIsNotWrittenThrough) {
-  Besieged b;
+  HostileInstallation b;
   ExpectStart("ok");
   TempDir elsewhere;
   WriteBytes(elsewhere / "target", "a sixteen bytes!");
@@ -122,7 +122,7 @@ TEST(HostilePlaces, ALinkInTheSidecarsPlaceIsNotWrittenThrough) {
 // ---- Paths
 
 TEST(HostilePlaces, BundleNamesThatAnIniFileCannotHold) {
-  Besieged b;
+  HostileInstallation b;
   uint32_t n = 1;
   for (const char* name : {"a=b", ";x", "[x]", "\"q\"", "tab\there", "back\\slash", "x Line0001",
                            " blank", "\x01\x7F", "Info]", "%s%n", "*", "?"}) {
@@ -159,7 +159,7 @@ TEST(HostilePlaces, RootsThatAnIniFileCannotHold) {
 
 // The lock of a file is named after its path: too long for an entry of a directory.
 TEST(HostilePlaces, AVeryLongRootHasItsLockAndItsComponents) {
-  Besieged b;
+  HostileInstallation b;
   TempDir place;
   std::string root = place.path();
   while (root.size() < 900) root += "/" + std::string(60, 'r');
@@ -174,7 +174,7 @@ TEST(HostilePlaces, AVeryLongRootHasItsLockAndItsComponents) {
 }
 
 TEST(HostilePlaces, InvalidTextInNamesUnderAnUtf8Locale) {
-  Besieged b;
+  HostileInstallation b;
   b.plant(Component("caf\xC3\xA9", 1), "caf\xC3\xA9.vle");
   b.plant(Component("bad\xFF\xFE", 2), "bad\xFF\xFE.vle");
   for (const char* locale : {"C.UTF-8", "C"}) {
@@ -230,7 +230,7 @@ TEST(HostilePlaces, AFullDescriptorTableLosesNothing) {
 
 // A medium that is full: the file size limit stops every write.
 TEST(HostilePlaces, AWriteThatFailsLosesNothing) {
-  Besieged b;
+  HostileInstallation b;
   ExpectStart("ok");
   std::string before = ReadBytes(b.database());
   Installation::touch(b.root() + "/Data Dictionaries/Good.framework/Resources/Info.vlr", 1);

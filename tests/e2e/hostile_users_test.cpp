@@ -91,7 +91,7 @@ TEST_F(HostileUsers, UsersTakeTurnsWithOneDatabase) {
   ExpectWhole(b);
 }
 
-// What another user's killed process leaves beside the database stands in nobody's way.
+// What another user's killed process leaves beside the database is in no other process's way.
 TEST_F(HostileUsers, LeftoversOfAnotherUserDoNotStopASave) {
   chmod(b.root().c_str(), 0777);
   ExpectStart("ok");

@@ -488,7 +488,7 @@ TEST_F(PlantedBundle, OfAnotherUserWithAPrivateRegistrationFile) {
 
 // Never registered before: the other components are there all the same.
 TEST_F(PlantedBundle, MadeUnderAPrivateUmask) {
-  Besieged b;
+  HostileInstallation b;
   chmod(b.root().c_str(), 0777);
   chmod(fs::path(b.root()).parent_path().c_str(), 0755);
   chmod(getenv("ZTFNDTMPSHAREDFILEDIR"), 0777);
@@ -509,7 +509,7 @@ TEST_F(PlantedBundle, MadeUnderAPrivateUmask) {
 }
 
 TEST_F(PlantedBundle, ARelativePathInTheDatabaseIsDropped) {
-  Besieged b;
+  HostileInstallation b;
   ExpectStart("ok");
   std::string bytes = ReadBytes(b.database());
   std::string section = "[VLRContentsSection]\n";

@@ -234,7 +234,7 @@ class Prefork : public testing::Test {
   Installation i;
 };
 
-// The parent has the lock as long as it lives: what a worker cannot save it is told.
+// The parent has the lock as long as it lives: what a worker cannot save is reported to it.
 TEST_F(Prefork, WhatWorkersOfALivingParentAreAnsweredIsOnDisk) {
   run(Parent::Stays, FullSize() ? 12 : 2);
 }

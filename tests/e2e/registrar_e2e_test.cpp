@@ -84,7 +84,7 @@ std::vector<Sample> InScanOrder(const Installation& i, const std::vector<Sample>
 }
 
 // The database put together by hand: its sections in the order of their birth, and which of them
-// are new in the last save, since an empty line stands around those.
+// are new in the last save, since an empty line is around those.
 class Expected {
  public:
   explicit Expected(const Installation& i) : m_root(i.root()) {
@@ -191,7 +191,7 @@ TEST(RegistrarE2e, TheDatabaseByteForByteOverThreeStarts) {
   for (const Sample& s : first) EXPECT_EQ(ModeOf(FileOf(i, s)), 0777);
 
   // ---- Second start: one file touched, one bundle removed, one added. The touched component loses
-  // its places in the lists and comes back behind the others, as does its section.
+  // its places in the lists and comes back after the others, as does its section.
   Installation::touch(FileOf(i, units), Installation::kInstalled + 60);
   i.removeBundle("Experts", "Valve.vle");
   Install(i, late);
@@ -219,7 +219,7 @@ TEST(RegistrarE2e, TheDatabaseByteForByteOverThreeStarts) {
   for (size_t n = 1; n < order.size(); ++n) {
     if (order[n].name != units.name) expected += order[n].section;
   }
-  // What has vanished goes after the last save, and so stands in the file until the next.
+  // What has vanished goes after the last save, and so is in the file until the next.
   expected += units.section + "\n" + late.section + "\n";
   EXPECT_EQ(ReadBytes(i.database()), expected);
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));
@@ -347,9 +347,9 @@ TEST(RegistrarE2e, AnExecutedProgramDoesNotKeepTheDatabase) {
   Child first([&] {
     IvltRegistrar* r = nullptr;
     if (GetRegistrar(&r) != "ok") return 1;
-    // Outlives its parent; ends when it is told, or after a while.
+    // Outlives its parent; ends when it is asked to, or after a while.
     if (fork() == 0) {
-      for (int fd : {0, 1, 2}) close(fd);  // nobody is to wait for its output
+      for (int fd : {0, 1, 2}) close(fd);  // no process is to wait for its output
       execlp("sleep", "sleep", "5", static_cast<char*>(nullptr));
       _exit(127);
     }

@@ -173,7 +173,7 @@ TEST_F(RegistrarKill, AtEveryCallOfAStartWithoutASidecar) {
       [&] { std::filesystem::remove(i.sidecar()); }, [] {});
 }
 
-// What the changed file brought before is erased, merged anew and saved.
+// What the changed file brought before is erased, merged again and saved.
 TEST_F(RegistrarKill, AtEveryCallOfAStartThatMerges) {
   Installation i;
   i.addObjectExpert("Tank", "Tank", GText(2), "{" + GText(2) + "}:1:{" + GText(9) + "}");

@@ -17,7 +17,7 @@ namespace {
 constexpr int kFirstPort = 61901, kPorts = 200;
 constexpr int kLongestMs = 1200000;
 
-// How often each port was handed out, by all processes.
+// How often each port was assigned, by all processes.
 struct Handed {
   std::atomic<int> times[kPorts];
   std::atomic<int> wrong;
@@ -60,14 +60,13 @@ class RendezvousCount : public testing::Test {
     const int total = processes * threads * requests;
     int answered = 0, uneven = 0;
     for (int port = 0; port < kPorts; ++port) {
-      // The ports behind the last full round were handed out once less.
+      // The ports after the last full round were assigned once less.
       int expected = total / kPorts + (port < total % kPorts ? 1 : 0);
       answered += handed->times[port];
       uneven += handed->times[port] != expected;
     }
-    printf(
-        "%s: %d requests in %.1f s, %d answers, %d wrong answers, %d ports handed out unevenly\n",
-        what, total, took.count(), answered, handed->wrong.load(), uneven);
+    printf("%s: %d requests in %.1f s, %d answers, %d wrong answers, %d ports assigned unevenly\n",
+           what, total, took.count(), answered, handed->wrong.load(), uneven);
     EXPECT_EQ(handed->wrong, 0);
     EXPECT_EQ(answered, total);
     EXPECT_EQ(uneven, 0);

@@ -1,5 +1,5 @@
 // Every system call that each writing call of the rendezvous makes about files fails once, with each
-// of five errors, by strace's injection. The call tells a result or throws what callers know, leaves no
+// of five errors, by strace's injection. The call returns a result or throws what callers know, leaves no
 // descriptor open and does not hang; the next process finds the old or the new notes, and the new ones
 // if the call had said that it was done.
 #include <gtest/gtest.h>
@@ -98,8 +98,8 @@ class RendezvousFault : public testing::Test {
     } else {
       Notes old = JarIsThere(before) ? m_jar : Notes(), fresh = old, found = NotesIn(place.jar());
       if (call.item) fresh[call.item] = JarIsThere(before) ? call.value : call.valueInEmpty;
-      bool told = code % 10 != kDone || !call.tellsOfTheJar || hidesTheDirectory(at);
-      bool good = found == fresh || (found == old && told);
+      bool reported = code % 10 != kDone || !call.tellsOfTheJar || hidesTheDirectory(at);
+      bool good = found == fresh || (found == old && reported);
       m_lost += !good;
       m_quiet += found == old && found != fresh && code % 10 == kDone;
       EXPECT_TRUE(good) << what << " ended with " << code;

@@ -1,5 +1,5 @@
 // Processes that write the jar all at once and are killed at random moments. After every batch of kills
-// the jar opens, holds values that somebody wrote, and has everything that was acknowledged.
+// the jar opens, holds values that a writer wrote, and has everything that was acknowledged.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -30,7 +30,7 @@ constexpr int kCookiesOfAWriter = 100000000;
 
 int Kills() { return FullSize() ? 10000 : kCanLimitMemory ? 1000 : 80; }
 
-// What a writer does in turn, and has been told is done.
+// What a writer does in turn, and has been acknowledged.
 enum Kind { kProcessId, kCookie, kEndpoint, kKinds };
 struct Acknowledgement {
   Kind kind;

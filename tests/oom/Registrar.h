@@ -22,7 +22,7 @@ inline constexpr GUID kDictionary = {2, 0, 0, {}};
 inline constexpr GUID kResourceExpert = {3, 0, 0, {}};
 inline constexpr GUID kBindingClass = {0xA, 0, 0, {}};
 
-// A text that was handed out: freed, and a failure if there is none.
+// A returned text: freed, and a failure if there is none.
 inline HRESULT Take(wchar_t* text) {
   if (!text) return E_OUTOFMEMORY;
   vltFree(text);

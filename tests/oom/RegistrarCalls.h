@@ -155,7 +155,7 @@ inline std::vector<Call> EnumeratorCalls() {
   };
 }
 
-// A setter of a number: whoever is told success finds the new one, and whoever is told a failure the new
+// A setter of a number: after a reported success the new one is found, and after a reported failure the new
 // one or the old one.
 template <class Get, class Set>
 Call NumberCall(const std::string& name, Get get, Set set) {

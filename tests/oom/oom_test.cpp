@@ -145,7 +145,7 @@ TEST_P(Oom, EveryCallSurvivesEveryFailedAllocation) {
     ++calls;
   }
   printf("%ld calls, %ld of them without allocations, %ld allocations failed (%s)\n", calls,
-         without, total, GetParam() ? "and all behind them" : "one at a time");
+         without, total, GetParam() ? "and all that follow" : "one at a time");
 }
 
 // Calls that do more the first time in a process: a process for each allocation. Whatever failed, the
@@ -239,8 +239,9 @@ TEST_P(Oom, AFailedLaterStartLosesNothing) {
   EXPECT_GT(tried, 10);
 }
 
-INSTANTIATE_TEST_SUITE_P(Failures, Oom, testing::Bool(),
-                         [](const auto& info) { return info.param ? "ForEver" : "Once"; });
+INSTANTIATE_TEST_SUITE_P(Failures, Oom, testing::Bool(), [](const auto& info) {
+  return info.param ? "WithAllThatFollow" : "Once";
+});
 
 }  // namespace
 }  // namespace vlt::test::oom

@@ -80,7 +80,7 @@ ProgramResult RunProgram(const std::vector<std::string>& argv, const Environment
 // other processes that nothing announces (a child that blocks in a system call, say).
 bool Eventually(const std::function<bool()>& condition, int deadlineMs = kDeadlineMs);
 
-// True if the process sleeps in the system call of this number, as /proc tells it: its first thread,
+// True if the process sleeps in the system call of this number, as /proc reports it: its first thread,
 // or the thread that has this id (tests/support/ThreadState.h).
 bool BlockedIn(pid_t pid, long systemCallNumber);
 

@@ -9,7 +9,7 @@
 
 namespace vlt::test {
 
-// An INI file as it stands on the disk, read by a few lines that know nothing of the engine under
+// An INI file as it is on disk, read by a few lines that know nothing of the engine under
 // test. Values are raw: with their quotes and escapes.
 class DatabaseText {
  public:

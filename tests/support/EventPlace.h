@@ -50,7 +50,7 @@ class EventPlace {
   void clean() const;
 };
 
-// A process that does something, says so, and stays until it is told to end or killed.
+// A process that does something, says so, and stays until it is asked to end or killed.
 class Keeper {
  public:
   // `begin` runs in the child and returns what is to live until the end.

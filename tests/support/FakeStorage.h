@@ -1,6 +1,6 @@
 #pragma once
 
-// A storage object that answers as it is told, and counts the references to it and its parts. For
+// A storage object that answers as configured, and counts the references to it and its parts. For
 // tests of what reads and writes attributes.
 #include <gtest/gtest.h>
 #include <string.h>

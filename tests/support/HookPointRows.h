@@ -17,11 +17,11 @@
 
 namespace vlt::test::points {
 
-// ---- The actions. Each drives the code to its point and tells what came out.
+// ---- The actions. Each drives the code to its point and returns what came out.
 
 enum Outcome {
   Success,
-  OutOfMemory,  // told by the result, with all outputs as they should be then
+  OutOfMemory,  // reported by the result, with all outputs as they should be then
   OtherFailure,
   Broken,  // outputs that do not fit the result
   BadAlloc,
@@ -32,7 +32,7 @@ inline Outcome Of(HRESULT result, bool intact = true) {
   return result == S_OK ? Success : result == E_OUTOFMEMORY ? OutOfMemory : OtherFailure;
 }
 
-// What the result hands out, and nothing without it.
+// What comes with success, and nothing without it.
 template <class T>
 inline Outcome Of(HRESULT result, T* out, void (*free)(T*)) {
   bool fits = (result == S_OK) == (out != nullptr);

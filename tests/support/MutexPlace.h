@@ -19,7 +19,7 @@ struct MutexPlace {
   std::string file(const char* name) const { return dir / ("mutex/" + std::string(name)); }
 };
 
-// Whether the lock on the file is free for others, told by a descriptor of its own.
+// Whether the lock on the file is free for others, tested by a descriptor of its own.
 inline bool FileIsFree(const std::string& path) {
   zt::posix::ScopedFd fd(::open(path.c_str(), O_RDWR | O_CLOEXEC));
   EXPECT_TRUE(fd.valid()) << path;

@@ -108,7 +108,7 @@ inline unsigned CacheSize(IvltRegistrar& r) {
 
 inline std::wstring Wide(const std::string& text) { return std::wstring(text.begin(), text.end()); }
 
-// Path that the registrar tells, freed.
+// Path that the registrar returns, freed.
 inline std::wstring Path(HRESULT result, wchar_t* path, HRESULT expected = S_OK) {
   EXPECT_EQ(result, expected);
   std::wstring text = path ? path : L"(null)";

@@ -38,7 +38,7 @@ inline Notes NotesIn(const std::string& file) {
   return notes;
 }
 
-// What stands in the data directory before a call.
+// What is in the data directory before a call.
 enum class Before {
   Sealed,      // both files, each with its sidecar
   NoSidecars,  // both files alone
@@ -81,7 +81,7 @@ class RendezvousPlace {
     return "";
   }
 
-  // Everything anew.
+  // Everything again.
   void prepare(Before before) const {
     std::filesystem::remove_all(data());
     std::filesystem::remove_all(work());
@@ -130,7 +130,7 @@ class RendezvousPlace {
   Installation m_installation;
 };
 
-// The narrow text of what a call handed out, which is freed.
+// The narrow text of what a call returned, which is freed.
 inline std::string TakeNarrow(wchar_t* text) {
   std::string narrow;
   for (wchar_t* c = text; c && *c; ++c) narrow += static_cast<char>(*c);

@@ -26,7 +26,7 @@ namespace vlt::test {
 inline constexpr bool kCanLimitMemory = !VLT_ADDRESS_SANITIZER && !VLT_THREAD_SANITIZER;
 
 // AddressSanitizer does not hold its allocator while a process forks: a child that is made while
-// another thread allocates may wait for ever at its own first allocation.
+// another thread allocates may wait indefinitely at its own first allocation.
 inline constexpr bool kCanForkWhileThreadsAllocate = !VLT_ADDRESS_SANITIZER;
 
 }  // namespace vlt::test

@@ -11,7 +11,7 @@
 namespace vlt::test {
 
 // Counts how often the file of this name was replaced in the directory, by whatever process, since
-// the object was made. What a forked child has counted is not told to the parent again.
+// the object was made. What a forked child has counted does not reach the parent.
 //
 // (The kernel folds equal events that follow each other into one; those of the
 // temporary name keep them apart.)

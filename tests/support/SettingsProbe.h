@@ -86,7 +86,7 @@ inline constexpr TextRow kServerRows[kServerTexts] = {kAppendRow,
                                                       {"LocalServerEndpoint", "61900"}};
 inline constexpr TextRow kRemoteRows[kClientTexts] = {
     kServerRows[0], kServerRows[1], kServerRows[2], kServerRows[3], kServerRows[4]};
-// A local client is not told an event port: no key can bring it.
+// A local client gets no event port: no key can bring it.
 inline constexpr TextRow kLocalRows[kClientTexts] = {
     kServerRows[0], kServerRows[1], kServerRows[5], kServerRows[6], {nullptr, nullptr}};
 

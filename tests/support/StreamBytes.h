@@ -81,7 +81,7 @@ inline std::string Trailer(int64_t offset) {
   return kMarkerBytes + Number(static_cast<uint64_t>(offset), 8);
 }
 
-// The area of these sub-streams behind `offset` bytes of data.
+// The area of these sub-streams after `offset` bytes of data.
 inline std::string Area(const std::vector<SubStream>& subStreams, int64_t offset,
                         Width width = Width::Reader, Order order = Order::Little) {
   std::string bytes = Header(1, 0, 0, order) + Number(subStreams.size(), 4, order);
@@ -89,7 +89,7 @@ inline std::string Area(const std::vector<SubStream>& subStreams, int64_t offset
   return bytes + Trailer(offset);
 }
 
-// Data with its area behind it.
+// Data with its area after it.
 inline std::string WithArea(const std::string& data, const std::vector<SubStream>& subStreams,
                             Width width = Width::Reader, Order order = Order::Little) {
   return data + Area(subStreams, static_cast<int64_t>(data.size()), width, order);
@@ -200,7 +200,7 @@ Thrown WhatThrows(Body body) {
   }
 }
 
-// A byte stream of somebody else: no sub-streams. Keeps each Write as a piece of its own; the nth
+// A byte stream of another maker: no sub-streams. Keeps each Write as a piece of its own; the nth
 // call of Read or Write, counted from 1, gives a failure. A Read that fails passes over its bytes.
 class ForeignStream : public IztStream {
  public:

@@ -10,8 +10,8 @@
 
 #include "tests/support/Child.h"
 
-// What threads are at in the kernel, as /proc tells it: for states that nothing announces. A thread
-// has its own id there, which gettid() tells; that of a process is its first thread's.
+// What threads are at in the kernel, as /proc reports it: for states that nothing announces. A thread
+// has its own id there, which gettid() returns; that of a process is its first thread's.
 namespace vlt::test {
 
 // True if the thread, of this process or of a child, lets time pass.

@@ -28,10 +28,10 @@ class Tracing {
   // The calls from the first line with `from` to the last with `to`, but for those about memory.
   std::vector<Call> record(const std::string& from, const std::string& to) const;
 
-  // Runs the program anew and kills it on its way into the call. 128 + SIGKILL if it met it.
+  // Runs the program again and kills it on its way into the call. 128 + SIGKILL if it met it.
   int killAt(const Call& call) const;
 
-  // Runs the program anew; the call fails with the error ("EIO") and does nothing. Returns the exit
+  // Runs the program again; the call fails with the error ("EIO") and does nothing. Returns the exit
   // code, or -1, with a failure of the test, past the deadline.
   int failAt(const Call& call, const std::string& error, int deadlineMs) const;
 

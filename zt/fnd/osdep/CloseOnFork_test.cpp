@@ -13,9 +13,9 @@
 #include <vector>
 
 #include "tests/support/Child.h"
-#include "tests/support/HostsFile.h"
 #include "tests/support/InChild.h"
 #include "tests/support/PosixErrorOf.h"
+#include "tests/support/ReusedDescriptor.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
 #include "zt/posix/Files.h"
@@ -27,9 +27,9 @@ namespace zt::fnd::osdep {
 namespace {
 
 using vlt::test::Child;
-using vlt::test::HostsFile;
 using vlt::test::IsOpen;
 using vlt::test::PosixErrorOf;
+using vlt::test::ReusedDescriptor;
 using vlt::test::TempDir;
 
 AnsiString Path(const TempDir& dir, const char* name) { return AnsiString((dir / name).c_str()); }

@@ -11,9 +11,9 @@
 
 #include "tests/support/Child.h"
 #include "tests/support/FailingHeap.h"
-#include "tests/support/HostsFile.h"
 #include "tests/support/MutexPlace.h"
 #include "tests/support/PosixErrorOf.h"
+#include "tests/support/ReusedDescriptor.h"
 #include "tests/support/Sanitizer.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/String.h"
@@ -28,9 +28,9 @@ namespace {
 using vlt::test::Child;
 using vlt::test::DescriptorOf;
 using vlt::test::FileIsFree;
-using vlt::test::HostsFile;
 using vlt::test::MutexPlace;
 using vlt::test::PosixErrorOf;
+using vlt::test::ReusedDescriptor;
 using vlt::test::Signal;
 using vlt::test::WriteBytes;
 
@@ -82,7 +82,7 @@ TEST(MutexHostile, ForkLeavesAnothersDescriptorOfTheSameNumberAlone) {
 TEST(MutexHostile, ExcludesOthersAlsoAfterTheHostHasTakenItsDescriptor) {
   MutexPlace place;
   auto mutex = std::make_unique<Mutex>(L"name");
-  HostsFile hosts(place.dir / "hosts", DescriptorOf(place.file("name")));
+  ReusedDescriptor hosts(place.dir / "hosts", DescriptorOf(place.file("name")));
   mutex->lock();
   EXPECT_FALSE(FileIsFree(place.file("name")));
   EXPECT_TRUE(hosts.free());
@@ -106,7 +106,7 @@ TEST(MutexHostile, NeitherUnlockNorDestructionTouchesTheHostsFile) {
   MutexPlace place;
   auto mutex = std::make_unique<Mutex>(L"name");
   mutex->lock();
-  HostsFile hosts(place.dir / "hosts", DescriptorOf(place.file("name")));
+  ReusedDescriptor hosts(place.dir / "hosts", DescriptorOf(place.file("name")));
   ASSERT_TRUE(hosts.lock());
   mutex->unlock();
   EXPECT_FALSE(hosts.free());

@@ -13,8 +13,8 @@
 
 #include "source/Common/ZtUtils/General/vlTracer.h"
 #include "tests/support/ForkStorm.h"
-#include "tests/support/HostsFile.h"
 #include "tests/support/InChild.h"
+#include "tests/support/ReusedDescriptor.h"
 #include "tests/support/Sanitizer.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/ThreadState.h"
@@ -102,12 +102,12 @@ TEST_IN_CHILD(vlTracerFork, ChildOfAForkDuringAWriteKeepsNoLock) {
   waitpid(idle, nullptr, 0);
 }
 
-TEST_IN_CHILD(vlTracerForkDescriptor, HostsFileUnderItsNumberIsLeftAloneAndTheLogGoesOn) {
+TEST_IN_CHILD(vlTracerForkDescriptor, FileReusingItsNumberIsLeftAloneAndTheLogGoesOn) {
   TempDir dir;
   Start(dir.makeDir("logs"));
   Say("one");
   std::string log = LogIn(dir / "logs");
-  HostsFile hosts(dir / "hosts", DescriptorOf(log));
+  ReusedDescriptor hosts(dir / "hosts", DescriptorOf(log));
   Say("two");
   EXPECT_TRUE(hosts.unchanged());
   EXPECT_EQ("  one\n  two\n", ReadBytes(log));
@@ -116,11 +116,11 @@ TEST_IN_CHILD(vlTracerForkDescriptor, HostsFileUnderItsNumberIsLeftAloneAndTheLo
   EXPECT_TRUE(hosts.unchanged());
 }
 
-TEST_IN_CHILD(vlTracerForkDescriptor, HostsFileUnderItsNumberOutlivesTheEnd) {
+TEST_IN_CHILD(vlTracerForkDescriptor, FileReusingItsNumberOutlivesTheEnd) {
   TempDir dir;
   Start(dir.makeDir("logs"));
   Say("one");
-  HostsFile hosts(dir / "hosts", DescriptorOf(LogIn(dir / "logs")));
+  ReusedDescriptor hosts(dir / "hosts", DescriptorOf(LogIn(dir / "logs")));
   vlTracer::Cleanup();
   EXPECT_TRUE(hosts.isOpen());
   EXPECT_TRUE(hosts.unchanged());

@@ -21,9 +21,9 @@
 #include "tests/support/Child.h"
 #include "tests/support/EventKinds.h"
 #include "tests/support/EventPlace.h"
-#include "tests/support/HostsFile.h"
 #include "tests/support/InChild.h"
 #include "tests/support/PosixErrorOf.h"
+#include "tests/support/ReusedDescriptor.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/ThreadState.h"
 #include "zt/fnd/String.h"
@@ -42,7 +42,6 @@ using vlt::test::DescriptorOf;
 using vlt::test::EventPlace;
 using vlt::test::Eventually;
 using vlt::test::Exists;
-using vlt::test::HostsFile;
 using vlt::test::kAutomatic;
 using vlt::test::kClear;
 using vlt::test::Keeper;
@@ -51,6 +50,7 @@ using vlt::test::kSet;
 using vlt::test::OpenDescriptors;
 using vlt::test::PosixErrorOf;
 using vlt::test::ReadBytes;
+using vlt::test::ReusedDescriptor;
 using vlt::test::Sleeps;
 using vlt::test::TempDir;
 using vlt::test::Wide;
@@ -414,15 +414,15 @@ TEST(NamedEventHostile, DescriptorsThatTheHostHasTakenAreTheHosts) {
   EventPlace place;
   TempDir dir;
   auto event = Open("name");
-  HostsFile lock(dir / "lock", DescriptorOf(place.file("name")));
-  HostsFile state(dir / "state", DescriptorOf(place.file("sem_1")));
+  ReusedDescriptor lock(dir / "lock", DescriptorOf(place.file("name")));
+  ReusedDescriptor state(dir / "state", DescriptorOf(place.file("sem_1")));
   ASSERT_TRUE(lock.lock() && state.lock());
   event->set();
   EXPECT_TRUE(event->check());
   Child child([] { return 0; });
   EXPECT_EQ(child.wait(), 0);
   event.reset();
-  for (const HostsFile* file : {&lock, &state}) {
+  for (const ReusedDescriptor* file : {&lock, &state}) {
     EXPECT_TRUE(file->isOpen() && file->unchanged());
     EXPECT_FALSE(file->free());
   }

@@ -30,16 +30,16 @@ inline int DescriptorOf(const std::string& path) {
 }
 
 // A file of the host's, open under the number of a descriptor that it has closed.
-class HostsFile {
+class ReusedDescriptor {
  public:
-  HostsFile(const std::string& path, int number) : m_path(path), m_number(number) {
+  ReusedDescriptor(const std::string& path, int number) : m_path(path), m_number(number) {
     WriteBytes(path, kBytes);
     zt::posix::ScopedFd fd(::open(path.c_str(), O_RDWR | O_CLOEXEC));
     EXPECT_EQ(number, dup2(fd.get(), number));
   }
-  ~HostsFile() { ::close(m_number); }
-  HostsFile(const HostsFile&) = delete;
-  HostsFile& operator=(const HostsFile&) = delete;
+  ~ReusedDescriptor() { ::close(m_number); }
+  ReusedDescriptor(const ReusedDescriptor&) = delete;
+  ReusedDescriptor& operator=(const ReusedDescriptor&) = delete;
 
   // flock() through the number, and whether others can have it.
   bool lock() const { return zt::posix::Flock(m_number, LOCK_EX | LOCK_NB) == 0; }
