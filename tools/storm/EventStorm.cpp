@@ -69,7 +69,7 @@ class Supervisor {
     m_pong = Spawn([this] { return PongSide(m_state); });
   }
 
-  // One that waits for ever has lost a wake-up.
+  // One that waits indefinitely has lost a wake-up.
   void endPingPong() {
     m_state.stop = true;
     if (Reap(m_ping, Clock::now() + kStall) != 0) ++m_state.lostWakeUps;
@@ -108,7 +108,7 @@ class Supervisor {
       process.lastRounds = rounds;
       process.lastProgress = Clock::now();
     } else if (Clock::now() - process.lastProgress > kStall) {
-      fprintf(stderr, "worker %u stands still in round %u\n", index, rounds);
+      fprintf(stderr, "worker %u makes no progress in round %u\n", index, rounds);
       ++m_state.lostWakeUps;
       ++m_state.workers[index].roundsDone;
       killAndReplace(index);

@@ -14,7 +14,7 @@ struct EventStormSize {
 };
 
 // Processes open, set, wait and close events of common names while some of them are killed at random
-// moments; killed ones are replaced. Two more, which nobody kills, play ping-pong all the time.
+// moments; killed ones are replaced. Two more, which are never killed, play ping-pong all the time.
 // Prints what was seen. True if no wake-up was lost, no name was split over two semaphores, nothing
 // ran out of time or failed, and nothing was left at the end.
 bool RunEventStorm(const EventStormSize& size);

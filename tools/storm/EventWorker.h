@@ -37,7 +37,7 @@ std::string EventName(unsigned name);
 // The rounds of one worker, from where its predecessor was killed.
 int WorkEvents(const EventStormSize& size, StormState& state, unsigned self, std::uint64_t seed);
 
-// Both sides of the ping-pong, until it is told to stop. The first one keeps the events; the second
+// Both sides of the ping-pong, until it is asked to stop. The first one keeps the events; the second
 // one opens and closes them in each round. Neither ever waits with a limit.
 int PingSide(StormState& state);
 int PongSide(StormState& state);

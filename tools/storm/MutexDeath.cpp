@@ -55,7 +55,7 @@ long long NowUs() {
       .count();
 }
 
-// Ids of what a holder left behind.
+// Ids of what a holder has left.
 struct Orphans {
   pid_t forked, executed;
 };

@@ -164,7 +164,7 @@ bool PrepareToLoad(const Component& component, pid_t parent, int* fd) {
 }
 
 // The child: exit code 0 for a sound component, 1 for one with problems. Its last word is kEnd, without
-// which the code is somebody else's: a library may end the process with any code while it is loaded.
+// which the code is foreign: a library may end the process with any code while it is loaded.
 int CheckInside(const Component& component, pid_t parent, int fd) {
   if (!PrepareToLoad(component, parent, &fd)) {
     Send(fd, kEnd, "");
@@ -257,7 +257,7 @@ bool HasIdentifier(const Component& component) { return component.guid != GuidTe
 Finding CheckOne(const Component& component) {
   Finding finding;
   finding.component = component;
-  // To the library the null identifier stands for all components: their problems would be told as
+  // To the library the null identifier means all components: their problems would be reported as
   // this one's.
   if (!HasIdentifier(component)) {
     finding.notes.push_back("it has no identifier of its own, so it cannot be checked alone");
@@ -273,7 +273,7 @@ Finding CheckOne(const Component& component) {
   int status = 0;
   while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
   }
-  kill(-child, SIGKILL);  // what the library has started and left behind
+  kill(-child, SIGKILL);  // what the library has started and left running
   Sort(text, &finding);
   std::string fate = FateOf(status, reading, ended);
   if (!fate.empty()) finding.notes.push_back(fate);

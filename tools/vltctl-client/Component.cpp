@@ -148,7 +148,7 @@ std::vector<Component> Client::classes(const std::string& guid) const {
 }
 
 bool IsGuid(const std::string& text) {
-  // The library reads bad text as the null GUID, so the null GUID itself is the one to be told apart.
+  // The library reads bad text as the null GUID, so the null GUID itself needs a check of its own.
   std::string bare = text.size() == 38 ? text.substr(1, 36) : text;
   if (bare == "00000000-0000-0000-0000-000000000000") return true;
   return bare.size() == 36 && GuidText(ParseGuid(text)) != GuidText(GUID_NULL);

@@ -173,7 +173,7 @@ int Url(bool asJson) {
 int Identity(bool asJson) {
   GUID identity = {};
   if (vltGetServerIdentity(&identity) < 0) {
-    fprintf(stderr, "vltctl: no identity can be had\n");
+    fprintf(stderr, "vltctl: no identity is available\n");
     return kDataUnusable;
   }
   std::string text = vltctl::GuidText(identity);

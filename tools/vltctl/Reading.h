@@ -10,7 +10,7 @@
 #include "zt/posix/ScopedFd.h"
 #include "ztini/ztini.h"
 
-// Reading shared files as an onlooker: without a lock, and without making or changing anything.
+// Reading shared files without taking part: without a lock, and without making or changing anything.
 namespace admin {
 
 // No file of an installation comes near this size; a larger one was made to exhaust the reader.
@@ -21,7 +21,7 @@ inline constexpr size_t kFileLimit = size_t{256} << 20;
 // regular file) and why in *error.
 zt::posix::ScopedFd OpenRegular(const std::string& file, std::string* error);
 
-// A file and its sidecar as they stood together at one moment.
+// A file and its sidecar as they were together at one moment.
 struct GuardedBytes {
   enum class State { Missing, Unreadable, Read };
   State state = State::Missing;

@@ -16,7 +16,7 @@
 
 namespace {
 
-// It stands beside this program, or, once installed, among those that only other programs start.
+// It lies beside this program, or, once installed, among those that only other programs start.
 [[noreturn]] void BecomeClient(char** argv) {
   std::filesystem::path here = std::filesystem::read_symlink("/proc/self/exe").parent_path();
   for (const char* place : {"vltctl-client", "../libexec/vltutils/vltctl-client"}) {
@@ -51,7 +51,7 @@ int Run(int argc, char** argv) {
 
   CLI::App* settings =
       own("settings", [&] { return admin::Settings(a.index, a.client, a.server, a.name, a.json); });
-  settings->add_option("--index", a.index, "Number behind the names of the items")
+  settings->add_option("--index", a.index, "Number after the names of the items")
       ->capture_default_str();
   settings->add_flag("--client", a.client, "What a client reads");
   settings->add_flag("--server", a.server, "What the server reads");
