@@ -13,6 +13,9 @@ using zt::fnd::String;
 
 namespace {
 
+// Its answer does not matter: nothing is allocated here.
+void Pass(const char* hookPoint) { vltTestHook(hookPoint); }
+
 void Trace(const char* message) {
   if (message) vltTraceError("%s", message);
 }
@@ -23,13 +26,13 @@ GuardedIniFile::GuardedIniFile(std::string file, const GuardedIniKind& kind)
     : m_file(std::move(file)), m_sidecar(CvlIniMgr::SidecarName(m_file)), m_kind(kind) {}
 
 // Null where memory is out and that is to be a result.
-std::unique_ptr<CvlIniMgr> GuardedIniFile::create(const char* point,
+std::unique_ptr<CvlIniMgr> GuardedIniFile::create(const char* hookPoint,
                                                   const IniSidecar::Digest* expected) const {
   const unsigned char* digest = expected ? expected->data() : nullptr;
   if (!m_kind.openSignature) {
     return std::make_unique<CvlIniMgr>(m_file.c_str(), false, digest, false, m_kind.useEscapes);
   }
-  if (vltTestHook(point)) return nullptr;
+  if (vltTestHook(hookPoint)) return nullptr;
   return std::unique_ptr<CvlIniMgr>(
       new (std::nothrow) CvlIniMgr(m_file.c_str(), false, digest, false, m_kind.useEscapes));
 }
@@ -60,10 +63,10 @@ HRESULT GuardedIniFile::save(CvlIniMgr& ini) const {
   if (!hasSidecar()) writeSidecar(IniSidecar::kInvalidMark, ini.durability());
   IniSidecar::Digest digest;
   HRESULT result = ini.WriteAndGetDigest(&digest);
-  vltTestHook(m_kind.writtenPoint);
+  Pass(m_kind.writtenPoint);
   if (result < 0) return result;
   result = writeSidecar(digest, ini.durability());
-  vltTestHook(m_kind.sealedPoint);
+  Pass(m_kind.sealedPoint);
   return result;
 }
 

@@ -69,7 +69,8 @@ class GuardedIniFile {
   const std::string& sidecar() const { return m_sidecar; }
 
  private:
-  std::unique_ptr<CvlIniMgr> create(const char* point, const IniSidecar::Digest* expected) const;
+  std::unique_ptr<CvlIniMgr> create(const char* hookPoint,
+                                    const IniSidecar::Digest* expected) const;
 
   const std::string m_file, m_sidecar;
   const GuardedIniKind& m_kind;

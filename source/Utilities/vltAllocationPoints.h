@@ -24,7 +24,8 @@ inline constexpr AllocationPoint kJarPoint = {
 // What `make` returns; null where the hook says so.
 template <class Make>
 auto Allocate(const AllocationPoint& point, Make make) -> decltype(make()) {
-  return vltTestHook(point.hookPoint) ? nullptr : make();
+  const char* hookPoint = point.hookPoint;
+  return vltTestHook(hookPoint) ? nullptr : make();
 }
 
 }  // namespace vlt

@@ -36,7 +36,10 @@ vlt::hook::Faults FaultsOf(const CvlIniMgr& ini) {
   vlt::hook::Faults faults;
   faults.crash = IsTrue(ini, "Crash");
   faults.hang = IsTrue(ini, "Hang");
-  faults.hangTimeInMSecs = HangTime(ini);
+  std::string hangTime;
+  if (ini.GetItem("Hook", "HangTime", &hangTime) >= 0) {
+    faults.hangTimeInMSecs = static_cast<uint32_t>(atol(hangTime.c_str()));
+  }
   faults.simulateMemoryAllocationFailure = IsTrue(ini, "SimulateMemoryAllocationFailure");
   faults.simulateMemoryAllocationFailureAndThrow =
       IsTrue(ini, "SimulateMemoryAllocationFailureAndThrow");
