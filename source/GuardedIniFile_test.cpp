@@ -5,8 +5,8 @@
 
 #include "source/Common/vltFileSecurity.h"
 #include "source/Common/vltTestHook.h"
-#include "tests/support/AllocFailure.h"
 #include "tests/support/FailSystemCall.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
 #include "tests/support/TempDir.h"

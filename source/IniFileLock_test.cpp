@@ -52,9 +52,8 @@ TEST(IniFileLock, AnotherThreadWaits) {
   TempDir dir;
   std::string file = dir / "x.ini";
   std::unique_ptr<CvlIniMgr> outer(new CvlIniMgr(CvlIniMgr::LockOnly(file)));
-  Signal started, entered;
-  std::thread other([&] {
-    started.notify();
+  Signal entered;
+  WatchedThread other([&] {
     CvlIniMgr mine = CvlIniMgr::LockOnly(file);
     entered.notify();
   });

@@ -1,14 +1,14 @@
 // Queries and attribute values over a heap that refuses: every allocation of every call in turn.
 #include <gtest/gtest.h>
+#include <stdio.h>
+#include <string.h>
 
-#include <cstdio>
-#include <cstring>
 #include <iterator>
 
 #include "source/Common/vltQuery.h"
 #include "source/Common/vltcmn.h"
 #include "tests/support/Child.h"
-#include "tests/support/RefusingMalloc.h"
+#include "tests/support/FailingHeap.h"
 #include "tests/support/Sanitizer.h"
 #include "tests/support/TempDir.h"
 

@@ -214,7 +214,7 @@ TEST_IN_CHILD(vltPharlapDatabase, TheParentRunsInitWhenTold) {
   EXPECT_EQ(Find(*r, G(2)), S_OK);
   // Only the subclass fills the maps of binding classes.
   Bound(*r, vltComponentObjectExpert, G(3), VLT_E_NO_COMPONENT);
-  Started<ExposedPharlapRegistrar> idle(S(i.root() + "/other.vlr"), S(i.root()), false);
+  Started<AccessiblePharlapRegistrar> idle(S(i.root() + "/other.vlr"), S(i.root()), false);
   EXPECT_EQ(Find(*idle, kVltdd), E_INVALIDARG);
   EXPECT_EQ(idle->SaveChanges(), S_OK);
   EXPECT_FALSE(Exists(i.root() + "/other.vlr"));

@@ -373,7 +373,7 @@ TEST(vltPharlapRegistrarStart, MissingRightsToMakeDirectoriesAreSwallowed) {
   chmod(place.path().c_str(), 0777);
   ExpectInChild([&] {
     ASSERT_EQ(setresuid(kNobody, kNobody, kNobody), 0);
-    Started<ExposedLinuxRegistrar> r(S(place / "vlt.vlr"), S(i.root()));
+    Started<AccessibleLinuxRegistrar> r(S(place / "vlt.vlr"), S(i.root()));
     EXPECT_EQ(Find(*r, kVltdd), S_OK);
     CvltPharlapRegistrar::RegistrationFiles files;
     EXPECT_EQ(r->FindRegistrationFiles(files), E_FAIL);

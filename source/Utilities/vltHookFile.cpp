@@ -26,12 +26,6 @@ bool IsTrue(const CvlIniMgr& ini, const char* key) {
          zt::fnd::osdep::StringCaseCompare(String(value.c_str()).c_str(), L"true") == 0;
 }
 
-uint32_t HangTime(const CvlIniMgr& ini) {
-  std::string value;
-  return ini.GetItem("Hook", "HangTime", &value) >= 0 ? static_cast<uint32_t>(atol(value.c_str()))
-                                                      : vlt::hook::Faults::kForeverInMSecs;
-}
-
 vlt::hook::Faults FaultsOf(const CvlIniMgr& ini) {
   vlt::hook::Faults faults;
   faults.crash = IsTrue(ini, "Crash");

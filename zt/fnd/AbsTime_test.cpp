@@ -85,13 +85,13 @@ TEST(AbsTime, TicksCountFrom1601) {
 }
 
 TEST(AbsTime, WhatDoesNotFitEndsAtTheLimits) {
-  EXPECT_EQ(k_least, AbsTime::min.toTime_T(true));
-  EXPECT_EQ(k_least, AbsTime::min.toTime_T(false));
-  EXPECT_EQ(k_most - 2082844800 + 1, AbsTime::max.toTime_T(true));
-  EXPECT_EQ(k_least, AbsTime::min.toLKTIME(false));
-  EXPECT_EQ(k_most, AbsTime::max.toLKTIME(true));
-  EXPECT_EQ(k_most, AbsTime(1e12, 0).toLKTIME(true)) << "the product changes its sign";
-  EXPECT_EQ(k_least, AbsTime(-1e12, 0).toLKTIME(true));
+  EXPECT_EQ(kLeast, AbsTime::min.toTime_T(true));
+  EXPECT_EQ(kLeast, AbsTime::min.toTime_T(false));
+  EXPECT_EQ(kMost - 2082844800 + 1, AbsTime::max.toTime_T(true));
+  EXPECT_EQ(kLeast, AbsTime::min.toLKTIME(false));
+  EXPECT_EQ(kMost, AbsTime::max.toLKTIME(true));
+  EXPECT_EQ(kMost, AbsTime(1e12, 0).toLKTIME(true)) << "the product changes its sign";
+  EXPECT_EQ(kLeast, AbsTime(-1e12, 0).toLKTIME(true));
 }
 
 // Products that pass the range more than once come back with the sign that they should have.

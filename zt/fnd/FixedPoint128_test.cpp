@@ -69,7 +69,7 @@ TEST(FixedPoint128, BackToFloatingPoint) {
 }
 
 TEST(FixedPoint128, SumsCarryAndBorrow) {
-  Fixed value(0, 1, k_ones, k_ones);
+  Fixed value(0, 1, kOnes, kOnes);
   value += Fixed(0, 0, 0, 1);
   ExpectWords(value, 0, 2, 0, 0);
   value -= Fixed(0, 0, 0, 1);
@@ -121,7 +121,7 @@ TEST(FixedPoint128, QuotientsTruncateTowardZero) {
 }
 
 TEST(FixedPoint128, DivisionByZeroGivesTheLimits) {
-  ExpectWords(Fixed(1) / Fixed(0), 0x7FFFFFFF, k_ones, k_ones, k_ones);
+  ExpectWords(Fixed(1) / Fixed(0), 0x7FFFFFFF, kOnes, kOnes, kOnes);
   ExpectWords(Fixed(-1) / Fixed(0), 0x80000000, 0, 0, 0);
 }
 

@@ -16,7 +16,7 @@ class SafeInteger {
   static_assert(std::is_unsigned_v<T>, "sizes are unsigned");
 
  public:
-  static constexpr T kHIGH_BIT = static_cast<T>(T(1) << (std::numeric_limits<T>::digits - 1));
+  static constexpr T k_HIGH_BIT = static_cast<T>(T(1) << (std::numeric_limits<T>::digits - 1));
 
   constexpr SafeInteger(T value = 0) noexcept : m_value(value) {}
 
@@ -48,7 +48,7 @@ class SafeInteger {
 
   // Doubles the value. With the top bit set sets `overflow` and changes nothing else.
   SafeInteger& multiplyByTwoNoThrow(bool& overflow) noexcept {
-    overflow = (m_value & kHIGH_BIT) != 0;
+    overflow = (m_value & k_HIGH_BIT) != 0;
     if (!overflow) m_value = static_cast<T>(m_value << 1);
     return *this;
   }

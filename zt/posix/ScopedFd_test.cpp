@@ -6,7 +6,7 @@
 #include <cerrno>
 #include <utility>
 
-#include "tests/support/HostsFile.h"
+#include "tests/support/ReusedDescriptor.h"
 #include "zt/posix/Retry.h"
 
 namespace zt::posix {

@@ -1,6 +1,6 @@
+#include <cstring>
 
 #include <algorithm>
-#include <cstring>
 #include <tuple>
 
 #include "source/Common/Posix/vltlinuxos.h"
@@ -59,8 +59,8 @@ struct vltStringResources::Database {
 
   void answer(ResourceQuery& q);
   bool fileNameOf(const char* section, std::string* base);
-  bool take(Question& q, const char* section);
-  void search(Question& q);
+  bool appendFrom(ResourceQuery& q, const char* section);
+  void search(ResourceQuery& q);
   const char* indexNext(std::string* base);
 
   IniStructForwardReferenceTag* document;
@@ -166,17 +166,17 @@ void vltStringResources::Database::answer(ResourceQuery& q) {
 }
 
 // The index first, and then what follows it in the list.
-void vltStringResources::Database::search(Question& q) {
+void vltStringResources::Database::search(ResourceQuery& q) {
   if (auto found = sectionsOf.find(q.target); found != sectionsOf.end()) {
     for (const std::string& section : found->second) {
-      if (take(q, section.c_str())) return;
+      if (appendFrom(q, section.c_str())) return;
     }
   }
   std::string base;
   while (const char* section = indexNext(&base)) {
     bool matches =
         !base.empty() && zt::fnd::osdep::StringCaseCompare(base.c_str(), q.target.c_str()) == 0;
-    if (matches && take(q, section)) return;
+    if (matches && appendFrom(q, section)) return;
   }
 }
 

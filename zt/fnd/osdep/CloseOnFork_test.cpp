@@ -38,13 +38,13 @@ TEST(CloseOnFork, ChildHasTheDescriptorClosedAndTheParentKeepsItsLock) {
   TempDir dir;
   CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
   const int number = fd.get();
-  ASSERT_EQ(Flock(number, LOCK_EX), 0);
+  ASSERT_EQ(0, Flock(number, LOCK_EX));
   Child child([&] { return IsOpen(number) || fd.get() != -1 ? 1 : 0; });
-  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(0, child.wait());
   EXPECT_TRUE(IsOpen(number));
   EXPECT_EQ(number, fd.get());
   ScopedFd other(::open((dir / "file").c_str(), O_RDWR | O_CLOEXEC));
-  EXPECT_NE(Flock(other.get(), LOCK_EX | LOCK_NB), 0);
+  EXPECT_NE(0, Flock(other.get(), LOCK_EX | LOCK_NB));
 }
 
 TEST(CloseOnFork, LockOfAKilledParentDoesNotOutliveItInTheChild) {
@@ -65,7 +65,7 @@ TEST(CloseOnFork, LockOfAKilledParentDoesNotOutliveItInTheChild) {
   parent.kill(SIGKILL);
   parent.wait();
   ScopedFd other(::open((dir / "file").c_str(), O_RDWR | O_CLOEXEC));
-  EXPECT_EQ(Flock(other.get(), LOCK_EX | LOCK_NB), 0);
+  EXPECT_EQ(0, Flock(other.get(), LOCK_EX | LOCK_NB));
   end.notify();
 }
 
@@ -79,10 +79,10 @@ TEST(CloseOnFork, UnmarkedAndRemarkedDescriptors) {
     fd.reset();
     return IsOpen(number) ? 2 : 0;
   });
-  EXPECT_EQ(keeps.wait(), 0);
+  EXPECT_EQ(0, keeps.wait());
   fd.keepOnFork(false);
   Child closes([&] { return IsOpen(number) ? 1 : 0; });
-  EXPECT_EQ(closes.wait(), 0);
+  EXPECT_EQ(0, closes.wait());
 }
 
 // In a process of its own, where no other object's number is free after a fork.
@@ -107,19 +107,19 @@ TEST(CloseOnFork, NumberThatTheHostHasTakenIsTheHosts) {
   CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
   CloseOnForkFd kept = CloseOnForkFd::OpenShared(Path(dir, "kept"));
   kept.keepOnFork(true);
-  HostsFile one(dir / "one", fd.get()), two(dir / "two", kept.get());
-  EXPECT_EQ(fd.get(), -1);
-  EXPECT_EQ(kept.get(), -1);
+  ReusedDescriptor one(dir / "one", fd.get()), two(dir / "two", kept.get());
+  EXPECT_EQ(-1, fd.get());
+  EXPECT_EQ(-1, kept.get());
   EXPECT_TRUE(fd.valid());
   Child child([&] {
     kept.reset();
     return one.isOpen() && two.isOpen() ? 0 : 1;
   });
-  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(0, child.wait());
   errno = EDOM;
   fd.reset();
   kept.reset();
-  EXPECT_EQ(errno, EDOM);
+  EXPECT_EQ(EDOM, errno);
   EXPECT_TRUE(one.isOpen() && two.isOpen());
 }
 
@@ -130,19 +130,19 @@ TEST(CloseOnFork, NumberThatAnotherObjectHasGotIsTheOthers) {
   ::close(number);
   CloseOnForkFd second = CloseOnForkFd::OpenShared(Path(dir, "file"));
   ASSERT_EQ(number, second.get());
-  EXPECT_EQ(first.get(), -1);
+  EXPECT_EQ(-1, first.get());
   first.keepOnFork(true);
   first.reset();
   EXPECT_EQ(number, second.get());
   Child child([&] { return IsOpen(number) ? 1 : 0; });
-  EXPECT_EQ(child.wait(), 0);
+  EXPECT_EQ(0, child.wait());
 }
 
 TEST(CloseOnFork, FailedOpenMarksNothing) {
   TempDir dir;
   int before = vlt::test::OpenDescriptors();
-  EXPECT_EQ(PosixErrorOf([&] { CloseOnForkFd::OpenShared(AnsiString(dir.path().c_str())); }),
-            EISDIR);
+  EXPECT_EQ(EISDIR,
+            PosixErrorOf([&] { CloseOnForkFd::OpenShared(AnsiString(dir.path().c_str())); }));
   EXPECT_EQ(before, vlt::test::OpenDescriptors());
   CloseOnForkFd none;
   none.keepOnFork(true);
@@ -173,9 +173,9 @@ TEST(CloseOnFork, ForksAtAnyMomentLeaveNoLockBehind) {
   stop = true;
   opener.join();
   ScopedFd other(::open((dir / "file").c_str(), O_RDWR | O_CLOEXEC));
-  EXPECT_EQ(Flock(other.get(), LOCK_EX | LOCK_NB), 0);
+  EXPECT_EQ(0, Flock(other.get(), LOCK_EX | LOCK_NB));
   for (int i = 0; i < 100; ++i) end.notify();
-  for (Child& child : alive) EXPECT_EQ(child.wait(), 0);
+  for (Child& child : alive) EXPECT_EQ(0, child.wait());
 }
 
 }  // namespace

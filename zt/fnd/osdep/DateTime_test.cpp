@@ -48,21 +48,21 @@ class ScopedZone {
 }  // namespace
 
 TEST(DateTimeText, DateAndTimeStandWithABlank) {
-  EXPECT_EQ(L"20261114 133425", Text(At(k_seconds), L"%Y%m%d", L"%H%M%S", 0));
+  EXPECT_EQ(L"20261114 133425", Text(At(kSeconds), L"%Y%m%d", L"%H%M%S", 0));
   EXPECT_EQ(L"13:34:25 14.11.2026",
             Std(AbsTimeToString(At(kSeconds), L"%d.%m.%Y", L"%H:%M:%S", 0, kTimeUTC, true)));
 }
 
 TEST(DateTimeText, UsesOfTheSystem) {
-  EXPECT_EQ(L"_11142026", Text(At(k_seconds), L"_%m%d%Y", L"", 0));
-  EXPECT_EQ(L"20261114 133425.123", Text(At(k_seconds, 0.123), L"%Y%m%d", L"%H%M%S", 3));
+  EXPECT_EQ(L"_11142026", Text(At(kSeconds), L"_%m%d%Y", L"", 0));
+  EXPECT_EQ(L"20261114 133425.123", Text(At(kSeconds, 0.123), L"%Y%m%d", L"%H%M%S", 3));
 }
 
 TEST(DateTimeText, MissingPartsLeaveNoBlank) {
-  EXPECT_EQ(L"13:34", Text(At(k_seconds), L"", L"%H:%M", 0));
-  EXPECT_EQ(L"2026", Text(At(k_seconds), L"%Y", L"", 0));
-  EXPECT_EQ(L"", Text(At(k_seconds), L"", L"", 0));
-  EXPECT_EQ(L"13", Std(AbsTimeToString(At(k_seconds), L"", L"%H", 0, kTimeUTC, true)));
+  EXPECT_EQ(L"13:34", Text(At(kSeconds), L"", L"%H:%M", 0));
+  EXPECT_EQ(L"2026", Text(At(kSeconds), L"%Y", L"", 0));
+  EXPECT_EQ(L"", Text(At(kSeconds), L"", L"", 0));
+  EXPECT_EQ(L"13", Std(AbsTimeToString(At(kSeconds), L"", L"%H", 0, kTimeUTC, true)));
 }
 
 TEST(DateTimeText, NoTimeIsEmptyWhateverTheFormats) {
@@ -91,27 +91,26 @@ TEST(DateTimeText, FractionsAreRoundedHalfUpWithCarry) {
 }
 
 TEST(DateTimeText, WithoutDigitsWholeSecondsAreRoundedHalfToEven) {
-  EXPECT_EQ(L"26", Text(At(k_seconds, 0.5), L"", L"%S", 0));
-  EXPECT_EQ(L"26", Text(At(k_seconds + 1, 0.5), L"", L"%S", 0));
-  EXPECT_EQ(L"25", Text(At(k_seconds, 0.25), L"", L"%S", 0));
+  EXPECT_EQ(L"26", Text(At(kSeconds, 0.5), L"", L"%S", 0));
+  EXPECT_EQ(L"26", Text(At(kSeconds + 1, 0.5), L"", L"%S", 0));
+  EXPECT_EQ(L"25", Text(At(kSeconds, 0.25), L"", L"%S", 0));
 }
 
 TEST(DateTimeText, EmptyTimeFormatIgnoresTheDigits) {
-  EXPECT_EQ(L"2026", Text(At(k_seconds, 0.5), L"%Y", L"", 3));
-  EXPECT_EQ(L"25", Text(At(k_seconds, 0.75), L"%S", L"", 3))
-      << "truncated, as digits are asked for";
-  EXPECT_EQ(L"26", Text(At(k_seconds, 0.75), L"%S", L"", 0));
+  EXPECT_EQ(L"2026", Text(At(kSeconds, 0.5), L"%Y", L"", 3));
+  EXPECT_EQ(L"25", Text(At(kSeconds, 0.75), L"%S", L"", 3)) << "truncated, as digits are asked for";
+  EXPECT_EQ(L"26", Text(At(kSeconds, 0.75), L"%S", L"", 0));
 }
 
 TEST(DateTimeText, FractionStandsBehindEverySecond) {
-  EXPECT_EQ(L"25.5|25.5|34", Text(At(k_seconds, 0.5), L"", L"%S|%#S|%M", 1));
-  EXPECT_EQ(L"%S.5", Text(At(k_seconds, 0.5), L"", L"%%S", 1)) << "found in the text as it stands";
-  EXPECT_EQ(L"25", Text(At(k_seconds, 0.5), L"%S", L"%M", 1).substr(0, 2)) << "not in the date";
+  EXPECT_EQ(L"25.5|25.5|34", Text(At(kSeconds, 0.5), L"", L"%S|%#S|%M", 1));
+  EXPECT_EQ(L"%S.5", Text(At(kSeconds, 0.5), L"", L"%%S", 1)) << "found in the text as it stands";
+  EXPECT_EQ(L"25", Text(At(kSeconds, 0.5), L"%S", L"%M", 1).substr(0, 2)) << "not in the date";
 }
 
 TEST(DateTimeText, SeparatorComesFromTheLastArgument) {
-  EXPECT_EQ(L"25.5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 1));
-  EXPECT_EQ(L"25,5", Text(At(k_seconds, 0.5), L"", L"%S", 1, 2));
+  EXPECT_EQ(L"25.5", Text(At(kSeconds, 0.5), L"", L"%S", 1, 1));
+  EXPECT_EQ(L"25,5", Text(At(kSeconds, 0.5), L"", L"%S", 1, 2));
   const std::wstring point = Std(String(std::localeconv()->decimal_point));
   EXPECT_EQ(L"25" + point + L"5", Text(At(kSeconds, 0.5), L"", L"%S", 1, 0));
   EXPECT_EQ(L"25" + point + L"5", Text(At(kSeconds, 0.5), L"", L"%S", 1, 99));
@@ -176,8 +175,8 @@ TEST(DateTimeText, YearsBeyondTheCalendarRaise) {
 }
 
 TEST(DateTimeFields, RoundOrTruncate) {
-  EXPECT_EQ(25, AbsTimeToUTCDateTime(At(k_seconds, 0.75), false).tm_sec);
-  EXPECT_EQ(26, AbsTimeToUTCDateTime(At(k_seconds, 0.75), true).tm_sec);
+  EXPECT_EQ(25, AbsTimeToUTCDateTime(At(kSeconds, 0.75), false).tm_sec);
+  EXPECT_EQ(26, AbsTimeToUTCDateTime(At(kSeconds, 0.75), true).tm_sec);
   const std::tm fields = AbsTimeToUTCDateTime(At(0), false);
   EXPECT_EQ(70, fields.tm_year);
   EXPECT_EQ(4, fields.tm_wday);

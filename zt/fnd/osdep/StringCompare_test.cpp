@@ -30,15 +30,15 @@ const wchar_t* const kWideNull = nullptr;
 }  // namespace
 
 TEST(StringCompare, NullIsEmpty) {
-  EXPECT_EQ(0, StringCaseCompare(k_null, ""));
-  EXPECT_EQ(0, StringCaseCompare(k_null, k_null));
-  EXPECT_EQ(0, StringCaseCompare(L"", k_wideNull));
-  EXPECT_EQ(0, StringExactCompare(k_null, ""));
-  EXPECT_EQ(0, StringExactCompare(k_wideNull, L""));
-  EXPECT_LT(StringCaseCompare(k_null, "a"), 0);
-  EXPECT_GT(StringCaseCompare(L"a", k_wideNull), 0);
-  EXPECT_GT(StringExactCompare("a", k_null), 0);
-  EXPECT_LT(StringExactCompare(k_wideNull, L"a"), 0);
+  EXPECT_EQ(0, StringCaseCompare(kNull, ""));
+  EXPECT_EQ(0, StringCaseCompare(kNull, kNull));
+  EXPECT_EQ(0, StringCaseCompare(L"", kWideNull));
+  EXPECT_EQ(0, StringExactCompare(kNull, ""));
+  EXPECT_EQ(0, StringExactCompare(kWideNull, L""));
+  EXPECT_LT(StringCaseCompare(kNull, "a"), 0);
+  EXPECT_GT(StringCaseCompare(L"a", kWideNull), 0);
+  EXPECT_GT(StringExactCompare("a", kNull), 0);
+  EXPECT_LT(StringExactCompare(kWideNull, L"a"), 0);
 }
 
 TEST(StringCompare, CaseIsFolded) {

@@ -6,6 +6,7 @@
 
 #include <cstdio>
 
+#include "tests/support/FailingHeap.h"
 #include "tests/support/InChild.h"
 #include "tests/support/StreamBytes.h"
 #include "tests/support/TempDir.h"
