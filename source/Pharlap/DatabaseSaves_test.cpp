@@ -11,7 +11,7 @@ namespace {
 
 using namespace vlt::test;
 
-struct Saves : testing::Test {
+struct DatabaseSavesTest : testing::Test {
   TempDir dir;
   std::string file = dir / "vlt.vlr", second = DurableCopy::NameFor(file);
   CvlIniMgr database = CvlIniMgr::OpenForUpdate(file);
@@ -23,13 +23,13 @@ struct Saves : testing::Test {
   }
 };
 
-TEST_F(Saves, OutsideAScanEachIsDurable) {
+TEST_F(DatabaseSavesTest, OutsideAScanEachIsDurable) {
   EXPECT_TRUE(saves->prepare());
   EXPECT_TRUE(saves->prepare());
   expect(IniDurability::Synced, false);
 }
 
-TEST_F(Saves, OfAScanAreCoveredFromTheSecondOn) {
+TEST_F(DatabaseSavesTest, OfAScanAreCoveredFromTheSecondOn) {
   {
     DatabaseSaves::ScanScope scan(*saves);
     expect(IniDurability::Synced, false);
@@ -43,7 +43,7 @@ TEST_F(Saves, OfAScanAreCoveredFromTheSecondOn) {
   expect(IniDurability::Synced, false);
 }
 
-TEST_F(Saves, AreCoveredFromTheFirstOnAfterAScanThatWasKilled) {
+TEST_F(DatabaseSavesTest, AreCoveredFromTheFirstOnAfterAScanThatWasKilled) {
   WriteBytes(second, "");
   DatabaseSaves::ScanScope scan(*saves);
   expect(IniDurability::None, true);
@@ -51,7 +51,7 @@ TEST_F(Saves, AreCoveredFromTheFirstOnAfterAScanThatWasKilled) {
   expect(IniDurability::None, true);
 }
 
-TEST_F(Saves, WithoutASecondNameEachHasItsContentsOnDisk) {
+TEST_F(DatabaseSavesTest, WithoutASecondNameEachHasItsContentsOnDisk) {
   dir.makeDir("vlt.vlr.durable");
   DatabaseSaves::ScanScope scan(*saves);
   for (int save = 0; save < 3; ++save) {
@@ -60,7 +60,7 @@ TEST_F(Saves, WithoutASecondNameEachHasItsContentsOnDisk) {
   }
 }
 
-TEST_F(Saves, ASecondNameThatWasLeftGoesWithTheNextSave) {
+TEST_F(DatabaseSavesTest, ASecondNameThatWasLeftGoesWithTheNextSave) {
   WriteBytes(second, "");
   EXPECT_TRUE(saves->prepare());
   expect(IniDurability::Synced, false);

@@ -60,12 +60,17 @@ bool Scan::isUpToDate(const std::string& file, const zt::fnd::AbsTime& time) {
 }
 
 void Scan::setStamp(const std::string& file, const zt::fnd::AbsTime& time) {
+  if (m_isIncomplete) {
+    m_database.EraseItem(kRegistrations, file.c_str());
+    return;
+  }
   Stamp stamp(time);
   std::string text = Decimal(stamp.low) + " " + Decimal(stamp.high);
   m_database.SetItem(kRegistrations, file.c_str(), text.c_str(), true);
 }
 
 bool Scan::openFragment(const std::string& file) {
+  m_isIncomplete = false;
   // A file that cannot be parsed has been set aside by its manager already. Any other reason - no
   // memory, no descriptor - says nothing about the file, which stays.
   return vlt::Attempt([&] { m_fragment.reset(new CvlIniMgr(CvlIniMgr::OpenForUpdate(file))); });
@@ -104,10 +109,20 @@ bool Scan::isMerged(const CvlIniMgr& fragment, const std::string& section) {
          fragment.ItemExists(kComponents, section.c_str()) < 0;
 }
 
+void Scan::set(const std::string& section, const std::string& item, const std::string& value,
+               bool quote) {
+  if (m_database.SetItem(section.c_str(), item.c_str(), value.c_str(), quote) < 0) {
+    m_isIncomplete = true;
+  }
+}
+
 bool Scan::mergeItem(const CvlIniMgr& fragment, const String& installDirectory,
                      const std::string& file, const std::string& section, const std::string& item) {
   std::string value;
-  if (fragment.GetItem(section.c_str(), item.c_str(), &value) < 0) return false;
+  if (fragment.GetItem(section.c_str(), item.c_str(), &value) < 0) {
+    m_isIncomplete = true;
+    return false;
+  }
   bool isFileName = SameName(item, kFileName);
   if (isFileName) {
     bool isDictionary = fragment.ItemExists(section.c_str(), kSchemaVersion) >= 0;
@@ -115,11 +130,11 @@ bool Scan::mergeItem(const CvlIniMgr& fragment, const String& installDirectory,
   } else if (SameName(item, kIdentifier)) {
     value = WithoutBraces(value);
   }
-  m_database.SetItem(section.c_str(), item.c_str(), value.c_str(), true);
+  set(section, item, value, true);
   if (ztini_StrICmpWithoutSurrWhiteSpace(section.c_str(), kContents) == 0) m_contentsFiles.forget();
   // A value that is no name would write something else into the database, down to whole lines.
   if (SameName(section, kComponents) && CanBeItemName(value)) {
-    m_database.SetItem(kContents, value.c_str(), file.c_str(), true);
+    set(kContents, value, file, true);
     m_contentsFiles.add(m_database, value);
   }
   return isFileName;
@@ -135,7 +150,7 @@ bool Scan::mergeSection(const CvlIniMgr& fragment, const String& installDirector
     if (mergeItem(fragment, installDirectory, file, section, item)) hasFileName = true;
   }
   if (fragment.ItemExists(section.c_str(), kSchemaVersion) >= 0) {
-    m_database.SetItem(section.c_str(), kFragmentRegistered, changed ? kChangedMark : "0", false);
+    set(section, kFragmentRegistered, changed ? kChangedMark : "0", false);
   }
   return hasFileName;
 }

@@ -16,9 +16,8 @@ namespace registrar {
 // What one comparison of the installation with the database knows, and the changes of the database
 // that it makes. Lives for one CvltPharlapRegistrar::UpdateRegistrationFile, which drives it.
 //
-// Changes the open document only; saving is the caller's. Results of single changes are dropped:
-// what could not be set now is missing in the database, and the file is merged again when it
-// changes.
+// Changes the open document only; saving is the caller's. An item that cannot be set, because memory
+// is out, is left out; its file gets no stamp, so that the next start merges it again.
 // Threads: one.
 class Scan {
  public:
@@ -30,6 +29,7 @@ class Scan {
 
   // Notes that the file is in the installation. True if the database has it with this time.
   bool isUpToDate(const std::string& file, const zt::fnd::AbsTime& time);
+  // Remembers that the file was merged with this time, unless an item of it is missing.
   void setStamp(const std::string& file, const zt::fnd::AbsTime& time);
 
   // Opens the registration file for takeFragment. False if it cannot be used. One that cannot be
@@ -58,6 +58,8 @@ class Scan {
   bool droppedPlanted() const { return m_droppedPlanted; }
 
  private:
+  void set(const std::string& section, const std::string& item, const std::string& value,
+           bool quote);
   bool mergeItem(const CvlIniMgr& fragment, const zt::fnd::String& installDirectory,
                  const std::string& file, const std::string& section, const std::string& item);
 
@@ -66,6 +68,7 @@ class Scan {
   ContentsFiles m_contentsFiles;
   std::unique_ptr<CvlIniMgr> m_fragment;
   bool m_droppedPlanted = false;
+  bool m_isIncomplete = false;  // what was merged since the last file was opened
 };
 
 // Makes the short file name of a registration file a path: adds the extension of its kind to a name

@@ -23,7 +23,7 @@ std::unique_ptr<CvlIniMgr> Open(const std::string& file) {
   return std::unique_ptr<CvlIniMgr>(new CvlIniMgr(CvlIniMgr::OpenForUpdate(file)));
 }
 
-struct RegistrarScan : testing::Test {
+struct ScanTest : testing::Test {
   TempDir dir;
   std::unique_ptr<CvlIniMgr> database = Open(dir / "vlt.vlr");
   std::unique_ptr<Scan> scan = std::make_unique<Scan>(*database);
@@ -48,7 +48,7 @@ struct RegistrarScan : testing::Test {
   }
 };
 
-TEST_F(RegistrarScan, AFileIsUpToDateWithItsStampOnly) {
+TEST_F(ScanTest, AFileIsUpToDateWithItsStampOnly) {
   EXPECT_FALSE(scan->isUpToDate("/a", Seconds(1000000)));
   scan->setStamp("/a", Seconds(1000000));
   EXPECT_TRUE(scan->isUpToDate("/a", Seconds(1000000)));
@@ -56,21 +56,21 @@ TEST_F(RegistrarScan, AFileIsUpToDateWithItsStampOnly) {
   EXPECT_FALSE(scan->isUpToDate("/b", Seconds(1000000)));
 }
 
-TEST_F(RegistrarScan, AFileThatWasSeenIsPresent) {
+TEST_F(ScanTest, AFileThatWasSeenIsPresent) {
   scan->isUpToDate("/seen", Seconds(1));
   EXPECT_TRUE(scan->isPresent("/seen"));
   EXPECT_FALSE(scan->isPresent("/unseen"));
   EXPECT_TRUE(scan->isPresent(addFile("there", "")));
 }
 
-TEST_F(RegistrarScan, AFileOpenedBeforeIsTheOneThatIsTaken) {
+TEST_F(ScanTest, AFileOpenedBeforeIsTheOneThatIsTaken) {
   std::string file = addFile("a.vlr", "[S]\nx = 1\n");
   ASSERT_TRUE(scan->openFragment(file));
   EXPECT_TRUE(scan->takeFragment("/not opened"));
   EXPECT_FALSE(scan->openFragment(dir.makeDir("directory")));
 }
 
-TEST_F(RegistrarScan, MergesWhatAComponentBringsAndErasesItAgain) {
+TEST_F(ScanTest, MergesWhatAComponentBringsAndErasesItAgain) {
   std::string file = addFile("a.vlr",
                              "[KORComponents]\nC = \"C\"\n[C]\nFileName = \"c\"\n"
                              "Identifier = \"{00000000-0000-0000-0000-000000000001}\"\n"
@@ -87,7 +87,7 @@ TEST_F(RegistrarScan, MergesWhatAComponentBringsAndErasesItAgain) {
   EXPECT_EQ(value("VLRContentsSection", "C"), "none");
 }
 
-TEST_F(RegistrarScan, AComponentNamedLikeASectionOfTheDatabaseIsNotMerged) {
+TEST_F(ScanTest, AComponentNamedLikeASectionOfTheDatabaseIsNotMerged) {
   std::string file = addFile("a.vlr",
                              "[KORComponents]\nKOR = \"KOR\"\n[KOR]\nConfigFile = \"mine\"\n"
                              "[Other]\nx = \"1\"\n");
@@ -96,7 +96,7 @@ TEST_F(RegistrarScan, AComponentNamedLikeASectionOfTheDatabaseIsNotMerged) {
   EXPECT_EQ(value("Other", "x"), "1");
 }
 
-TEST_F(RegistrarScan, ErasingByARelativePathIsReported) {
+TEST_F(ScanTest, ErasingByARelativePathIsReported) {
   database->SetItem("Registration", "Info.vlr", "1 2", true);
   scan->erase("C", "/gone/Info.vlr");
   EXPECT_EQ(value("Registration", "Info.vlr"), "none");
@@ -105,7 +105,7 @@ TEST_F(RegistrarScan, ErasingByARelativePathIsReported) {
   EXPECT_TRUE(scan->droppedPlanted());
 }
 
-TEST(RegistrarFileName, IsPutWhereItsKindIs) {
+TEST(ScanFileName, IsPutWhereItsKindIs) {
   struct {
     bool isDictionary;
     const char* name;

@@ -21,7 +21,7 @@ RegistrationFiles Find(const TempDir& dir) {
   return files;
 }
 
-TEST(RegistrationFiles, AreFoundInBundlesOfTheMask) {
+TEST(registrationFiles, AreFoundInBundlesOfTheMask) {
   TempDir dir;
   for (const char* bundle : {"a.vle", "b.framework", "c.vle"}) {
     std::string resources = dir.makeDir(bundle) + "/Resources";
@@ -36,7 +36,7 @@ TEST(RegistrationFiles, AreFoundInBundlesOfTheMask) {
             0);
 }
 
-TEST(RegistrationFiles, APathWithALineEndIsLeftOut) {
+TEST(registrationFiles, APathWithALineEndIsLeftOut) {
   TempDir dir;
   std::string resources = dir.makeDir("a\n.vle") + "/Resources";
   ASSERT_EQ(mkdir(resources.c_str(), 0777), 0);
@@ -44,7 +44,7 @@ TEST(RegistrationFiles, APathWithALineEndIsLeftOut) {
   EXPECT_EQ(Find(dir).size(), 0u);
 }
 
-TEST(RegistrationFiles, OnlyAnAbsolutePathOfARegularFileIsThere) {
+TEST(registrationFiles, OnlyAnAbsolutePathOfARegularFileIsThere) {
   TempDir dir;
   WriteBytes(dir / "file", "");
   ASSERT_EQ(symlink((dir / "loop").c_str(), (dir / "loop").c_str()), 0);

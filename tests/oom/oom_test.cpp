@@ -187,7 +187,7 @@ TEST_P(Oom, AFailedFirstStartLosesNothing) {
   Installation installation;
   MakeInstallation(installation);
   long tried = 0;
-  for (long n = 0;; n += n < 200 ? 7 : 97, ++tried) {
+  for (long n = 0;; n += n < 200 ? 7 : 29, ++tried) {
     std::filesystem::remove(installation.database());
     std::filesystem::remove(installation.sidecar());
     Child first([&] {

@@ -20,7 +20,7 @@ struct Row {
   int error;  // of an early end
 };
 
-TEST(PosixTransfer, MovesUntilAllIsMovedOrACallMovesNothing) {
+TEST(Transfer, MovesUntilAllIsMovedOrACallMovesNothing) {
   const Row rows[] = {
       {"in one call", {{10, 0}}, 10, EDOM},
       {"in parts", {{3, 0}, {6, 0}, {1, 0}}, 10, EDOM},
@@ -45,7 +45,7 @@ TEST(PosixTransfer, MovesUntilAllIsMovedOrACallMovesNothing) {
   }
 }
 
-TEST(PosixTransfer, OfNothingMakesNoCall) {
+TEST(Transfer, OfNothingMakesNoCall) {
   EXPECT_EQ(MoveAll(0, [](size_t, size_t) -> ssize_t { throw 1; }), 0u);
 }
 

@@ -142,7 +142,7 @@ TEST_F(NamedEventListing, DamagedFilesAreToldAsWhatTheyAre) {
   }
   WriteBytes(m_place.file("sem_1"), good);
   WriteBytes(m_place.file("short"), "12345678");
-  EXPECT_EQ(list()["short"], "no place yet; held by nobody");
+  EXPECT_EQ(list()["short"], "no place yet; held by no process");
 }
 
 TEST_F(NamedEventListing, WhatIsNoFileOfAnEventIsNotWaitedFor) {
@@ -157,8 +157,8 @@ TEST_F(NamedEventListing, WhatIsNoFileOfAnEventIsNotWaitedFor) {
   auto begin = std::chrono::steady_clock::now();
   Rows rows = list();
   EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(5));
-  EXPECT_EQ(rows["large"], "set 0, slot 0; held by nobody");
-  EXPECT_EQ(rows["\x1B[2J\nend"], "set 0, slot 0; held by nobody");
+  EXPECT_EQ(rows["large"], "set 0, slot 0; held by no process");
+  EXPECT_EQ(rows["\x1B[2J\nend"], "set 0, slot 0; held by no process");
   EXPECT_EQ(rows.size(), 4u);
   std::istringstream text(RunProgram({Vltctl(), "events"}).out);
   std::string first;
