@@ -5,6 +5,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <memory>
 #include <string>
 
@@ -84,6 +85,46 @@ void CreateDirWorker(const wchar_t* path, bool useMode, mode_t mode) {
   }
 }
 
+// The names that tempnam gives, without its warning to the linker: that another process may take the name
+// first is known to the callers, who open what they make with O_EXCL.
+
+// The environment's directory counts before the caller's, for who is not set-user-id.
+std::string TempDirectory(const char* wanted) {
+  const char* environment = ::secure_getenv("TMPDIR");
+  for (const char* dir : {environment, wanted, P_tmpdir}) {
+    if (dir && *dir && IsDirectoryText(dir)) return dir;
+  }
+  errno = ENOENT;
+  ZT_RAISE(PosixError());
+}
+
+constexpr size_t kPrefixLength = 5, kRandomLength = 6;
+constexpr char kNameCharacters[] = "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789";
+constexpr int kMostNames = 1 << 16;
+
+// A path that names nothing now: the directory, some of the prefix, and characters at random.
+std::string FreeName(const std::string& directory, const char* prefix) {
+  std::string start = directory;
+  while (start.size() > 1 && start.back() == '/') start.pop_back();
+  if (start != "/") start += '/';
+  start.append(prefix, strnlen(prefix, kPrefixLength));
+  for (int i = 0; i < kMostNames; ++i) {
+    uint64_t random;
+    if (::getentropy(&random, sizeof random) != 0) ZT_RAISE(PosixError());
+    std::string name = start;
+    for (size_t n = 0; n < kRandomLength; ++n) {
+      name += kNameCharacters[random % (sizeof kNameCharacters - 1)];
+      random /= sizeof kNameCharacters - 1;
+    }
+    struct stat info;
+    if (LStat(name.c_str(), &info) == 0) continue;
+    if (errno != ENOENT) ZT_RAISE(PosixError());
+    return name;
+  }
+  errno = EEXIST;
+  ZT_RAISE(PosixError());
+}
+
 }  // namespace
 
 String path::GetCWD() {
@@ -117,9 +158,8 @@ String path::TempFileName(const String& prefix, const String& dir) {
   DemandAbsolute(where.c_str());
   if (!IsDirectory(where.c_str())) ZT_RAISE(exception::NonexistentException());
   AnsiString narrowDir(where), narrowPrefix(prefix);
-  MallocText name(::tempnam(narrowDir.c_str(), narrowPrefix.c_str()), free);
-  if (!name) ZT_RAISE(PosixError());
-  return String(name.get());
+  std::string name = FreeName(TempDirectory(narrowDir.c_str()), narrowPrefix.c_str());
+  return String(name.c_str());
 }
 
 bool path::IsDirectory(const wchar_t* path) {

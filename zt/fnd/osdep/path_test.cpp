@@ -6,6 +6,7 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <set>
 #include <string>
 
 #include "tests/support/Child.h"
@@ -169,6 +170,25 @@ TEST(path, TempFileNameIsFreeAndNothingIsMade) {
   unsetenv("TMPDIR");
   name = Narrow(path::TempFileName(L"pre", Wide(dir.path())));
   EXPECT_EQ(name.find(dir / "pre"), 0u) << name;
+  setenv("TMPDIR", kept.c_str(), 1);
+}
+
+TEST(path, TempFileNameIsDirectoryFiveCharactersAndSixAtRandom) {
+  TempDir dir;
+  std::string kept = getenv("TMPDIR");
+  setenv("TMPDIR", (dir.path() + "//").c_str(), 1);
+  std::set<std::string> names;
+  for (int i = 0; i < 100; ++i) {
+    std::string name = Narrow(path::TempFileName(L"prefix", L"/"));  // the variable goes first
+    EXPECT_EQ(name.substr(0, name.size() - 6), dir / "prefi") << name;
+    EXPECT_EQ(
+        name.find_first_not_of("abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789",
+                               name.size() - 6),
+        std::string::npos)
+        << name;
+    names.insert(name);
+  }
+  EXPECT_EQ(names.size(), 100u);
   setenv("TMPDIR", kept.c_str(), 1);
 }
 
