@@ -1,6 +1,7 @@
 #include "zt/fnd/Utf8ToWide.h"
 
 #include <array>
+#include <cstring>
 #include <iterator>
 #include <memory>
 
@@ -74,6 +75,16 @@ inline const unsigned char* DecodeOne(const unsigned char* s, const unsigned cha
   return s + 1;
 }
 
+// Most text is ASCII, and most of that in long runs: bytes at a time of which none has its top bit set.
+constexpr ptrdiff_t kRun = 16;
+
+inline bool StartsWithAsciiRun(const unsigned char* s, const unsigned char* end) {
+  if (end - s < kRun) return false;
+  uint64_t words[kRun / sizeof(uint64_t)];
+  memcpy(words, s, sizeof words);
+  return ((words[0] | words[1]) & 0x8080808080808080u) == 0;
+}
+
 bool IsEmpty(const unsigned char* begin, const unsigned char* end) {
   return !begin || begin >= end;
 }
@@ -84,7 +95,15 @@ uint32_t GetUtf8StringLength(const unsigned char* begin, const unsigned char* en
   if (IsEmpty(begin, end)) return 0;
   uint64_t count = 0;
   uint32_t ignored;
-  for (; begin != end; ++count) begin = DecodeOne(begin, end, ignored);
+  while (begin != end) {
+    if (StartsWithAsciiRun(begin, end)) {
+      begin += kRun;
+      count += kRun;
+    } else {
+      begin = DecodeOne(begin, end, ignored);
+      ++count;
+    }
+  }
   if (count > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
   return static_cast<uint32_t>(count);
 }
@@ -97,8 +116,14 @@ uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* 
   wchar_t* out = dest;
   uint32_t value;
   while (s != end && out != destEnd) {
-    s = DecodeOne(s, end, value);
-    *out++ = static_cast<wchar_t>(value);
+    if (destEnd - out >= kRun && StartsWithAsciiRun(s, end)) {
+      for (ptrdiff_t i = 0; i < kRun; ++i) out[i] = s[i];
+      s += kRun;
+      out += kRun;
+    } else {
+      s = DecodeOne(s, end, value);
+      *out++ = static_cast<wchar_t>(value);
+    }
   }
   if (static_cast<uint64_t>(out - dest) > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
   begin = s;

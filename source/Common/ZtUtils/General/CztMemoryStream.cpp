@@ -40,9 +40,15 @@ HRESULT CztMemoryStream::Write(const void* buffer, unsigned int count, unsigned 
   if (m_external) return E_FAIL;
   if (m_cursor < 0 || (!buffer && count > 0)) return E_INVALIDARG;
   uint64_t end = static_cast<uint64_t>(m_cursor) + count;
-  HRESULT result = growTo(end);
-  if (result < 0) return result;
-  if (count > 0) memcpy(m_begin + m_cursor, buffer, count);
+  if (end > m_capacity) {
+    HRESULT result = growTo(end);
+    if (result < 0) return result;
+  }
+  if (count == sizeof(uint32_t)) {
+    memcpy(m_begin + m_cursor, buffer, sizeof(uint32_t));  // What streams are mostly made of.
+  } else if (count > 0) {
+    memcpy(m_begin + m_cursor, buffer, count);
+  }
   m_cursor = static_cast<int64_t>(end);
   m_size = std::max(m_size, static_cast<uint32_t>(end));
   if (done) *done = count;
