@@ -118,9 +118,10 @@ bool IniAppendEntry(IniSection* section, IniEntry* entry);
 
 // IniFindSection and IniFindEntry for those who ask again and again: 0 with the record or null, or
 // kIniOutOfMemory with null where only a scan of many names could find it.
-int32_t IniSeekSection(IniStructForwardReferenceTag* doc, const char* name, IniSection** found);
+int32_t IniSeekSection(IniStructForwardReferenceTag* doc, const char* name, IniSection** found,
+                       ztini::FoldState fold = ztini::FoldState::Unknown);
 int32_t IniSeekEntry(IniStructForwardReferenceTag* doc, IniSection* section, const char* name,
-                     IniEntry** found);
+                     IniEntry** found, ztini::FoldState fold = ztini::FoldState::Unknown);
 
 // Removes all sections, the last one first.
 void IniEmptyDocument(IniStructForwardReferenceTag* doc);

@@ -1,4 +1,5 @@
 #include "ztini/Document.h"
+#include "ztini/NameCompare.h"
 #include "ztini/StringTools.h"
 
 #include <cstring>
@@ -8,7 +9,9 @@ namespace {
 using Doc = IniStructForwardReferenceTag;
 
 IniEntry* FindItem(Doc* doc, const char* section, const char* item) {
-  return doc ? IniFindEntry(IniFindSection(doc, section), doc->caseSensitive, item) : nullptr;
+  IniSection* found = IniFindSection(doc, section);
+  if (!found) return nullptr;
+  return static_cast<IniEntry*>(found->items.find(item, doc->match(), ztini::FoldState::Fresh));
 }
 
 IniEntry* NthItem(Doc* doc, const char* section, int32_t n) {
@@ -16,10 +19,11 @@ IniEntry* NthItem(Doc* doc, const char* section, int32_t n) {
   return found ? found->item(n) : nullptr;
 }
 
+// The fold is fresh.
 bool IsCurrent(Doc* doc, const char* name) {
   if (!doc->currentSection) return false;
   if (doc->caseSensitive) return strcmp(doc->currentSection->name, name) == 0;
-  return ztini_StrICmpWithoutSurrWhiteSpace(doc->currentSection->name, name) == 0;
+  return ztini::CompareNames(doc->fold, doc->currentSection->name, name) == 0;
 }
 
 int32_t Give(const char* text, const char** out) {
@@ -31,27 +35,30 @@ int32_t Give(const char* text, const char** out) {
 
 IniSection* IniFindSection(Doc* doc, const char* section) {
   if (!doc || !section) return nullptr;
+  doc->fold.refresh();
   if (IsCurrent(doc, section)) return doc->currentSection;
-  ztini::NameNode* found = doc->sections.find(section, doc->match());
+  ztini::NameNode* found = doc->sections.find(section, doc->match(), ztini::FoldState::Fresh);
   if (found) doc->currentSection = static_cast<IniSection*>(found);
   return static_cast<IniSection*>(found);
 }
 
-int32_t IniSeekSection(Doc* doc, const char* name, IniSection** found) {
+int32_t IniSeekSection(Doc* doc, const char* name, IniSection** found, ztini::FoldState fold) {
   *found = nullptr;
+  if (fold == ztini::FoldState::Unknown) doc->fold.refresh();
   ztini::NameNode* node = nullptr;
   if (IsCurrent(doc, name)) {
     node = doc->currentSection;
-  } else if (!doc->sections.seek(name, doc->match(), &node)) {
+  } else if (!doc->sections.seek(name, doc->match(), &node, ztini::FoldState::Fresh)) {
     return kIniOutOfMemory;
   }
   if (node) doc->currentSection = *found = static_cast<IniSection*>(node);
   return 0;
 }
 
-int32_t IniSeekEntry(Doc* doc, IniSection* section, const char* name, IniEntry** found) {
+int32_t IniSeekEntry(Doc* doc, IniSection* section, const char* name, IniEntry** found,
+                     ztini::FoldState fold) {
   ztini::NameNode* node = nullptr;
-  const bool good = section->items.seek(name, doc->match(), &node);
+  const bool good = section->items.seek(name, doc->match(), &node, fold);
   *found = static_cast<IniEntry*>(node);
   return good ? 0 : kIniOutOfMemory;
 }

@@ -36,15 +36,15 @@ NameNode** NameList::nodes() const {
   return static_cast<NameNode**>(ztini_ListItem(&m_list, -1));
 }
 
-NameNode* NameList::find(const char* name, NameMatch match) {
+NameNode* NameList::find(const char* name, NameMatch match, FoldState fold) {
   if (!name) return nullptr;
-  return wayToFind() == Way::Index ? findInIndex(name, match) : scan(name, match);
+  return wayToFind(fold) == Way::Index ? findInIndex(name, match) : scan(name, match);
 }
 
-bool NameList::seek(const char* name, NameMatch match, NameNode** found) {
+bool NameList::seek(const char* name, NameMatch match, NameNode** found, FoldState fold) {
   *found = nullptr;
   if (!name) return true;
-  const Way way = wayToFind();
+  const Way way = wayToFind(fold);
   if (way == Way::OutOfMemory) return false;
   *found = way == Way::Index ? findInIndex(name, match) : scan(name, match);
   return true;
@@ -66,8 +66,8 @@ NameNode* NameList::scan(const char* name, NameMatch match) const {
   return nullptr;
 }
 
-NameList::Way NameList::wayToFind() {
-  m_fold->refresh();
+NameList::Way NameList::wayToFind(FoldState fold) {
+  if (fold == FoldState::Unknown) m_fold->refresh();
   if (m_index && !indexIsCurrent()) dropIndex();
   if (m_index) return Way::Index;
   if (count() < kIndexFrom) return Way::Scan;

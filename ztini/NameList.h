@@ -10,6 +10,10 @@ namespace ztini {
 
 enum class NameMatch { IgnoreCase, Exact };
 
+// Whether the caller has just refreshed the fold of the list: one call on a document then looks at the
+// locale once.
+enum class FoldState { Unknown, Fresh };
+
 // Named records in order, with look-up by name.
 //
 // Holds pointers and owns none of the records. Short lists are scanned; longer ones get an index,
@@ -35,11 +39,12 @@ class NameList {
 
   // First in order with this name, or null. Takes time linear in count() while there is no memory
   // for the index of a long list; each call tries to build it.
-  NameNode* find(const char* name, NameMatch match);
+  NameNode* find(const char* name, NameMatch match, FoldState fold = FoldState::Unknown);
 
   // As find(), into `found`, but never scans a long list: false, with null, without memory for its
   // index.
-  bool seek(const char* name, NameMatch match, NameNode** found);
+  bool seek(const char* name, NameMatch match, NameNode** found,
+            FoldState fold = FoldState::Unknown);
 
   // 1-based position of a record of the list.
   int32_t positionOf(const NameNode* node) const;
@@ -63,7 +68,7 @@ class NameList {
  private:
   enum class Way { Scan, Index, OutOfMemory };
 
-  Way wayToFind();
+  Way wayToFind(FoldState fold);
   bool indexIsCurrent() const { return m_index && m_index->generation() == m_fold->generation(); }
   bool build();
   void dropIndex();

@@ -11,6 +11,7 @@
 
 namespace {
 
+using ztini::FoldState;
 using ztini::NameFold;
 
 // Whether the text of a line stays where it is for the document's life, or only until the next line.
@@ -126,7 +127,8 @@ int32_t DocumentBuilder::takeHeader(char* begin, char* end, int32_t line) {
   char* nameEnd = cutTrailingWhite(name, bracket);
   if (nameEnd == name) return badLine(line);
   IniSection* known = nullptr;
-  if (m_doc->duplicateChecking && IniSeekSection(m_doc, name, &known) < 0) return kIniOutOfMemory;
+  if (m_doc->duplicateChecking && IniSeekSection(m_doc, name, &known, FoldState::Fresh) < 0)
+    return kIniOutOfMemory;
   if (!known) return openSection(name, nameEnd, line);
   known->line = line;
   m_section = known;
@@ -179,7 +181,7 @@ int32_t DocumentBuilder::store(char* name, char* nameEnd, char* value, char* val
   const ItemKeys::Key key = ItemKeys::Of(m_doc->fold, name, nameEnd);
   IniEntry* known = nullptr;
   if (m_doc->duplicateChecking && m_keys.mayHave(key) &&
-      IniSeekEntry(m_doc, m_section, name, &known) < 0) {
+      IniSeekEntry(m_doc, m_section, name, &known, FoldState::Fresh) < 0) {
     return kIniOutOfMemory;
   }
   if (known) return replace(known, value, line);
