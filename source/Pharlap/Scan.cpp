@@ -9,6 +9,7 @@
 #include "source/Pharlap/registrarText.h"
 #include "source/Pharlap/registrationFiles.h"
 #include "source/vlIniMgr.h"
+#include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/osdep/StringCompare.h"
 #include "zt/fnd/osdep/path.h"
 #include "ztini/StringTools.h"
@@ -181,7 +182,8 @@ std::string ProcessFileName(bool isDictionary, const String& installDirectory,
   }
   std::string name = Narrow(whole);
   if (name.find_first_of("\\/") != std::string::npos) return name;
-  String below = installDirectory + (isDictionary ? kDictionaries : kExperts) + L"/";
+  String below = vlt::layout::DirectoryIn(
+      installDirectory, isDictionary ? vlt::layout::kDictionaries : vlt::layout::kExperts);
   return Narrow(below) + name;
 }
 

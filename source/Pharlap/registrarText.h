@@ -45,9 +45,6 @@ inline bool IsReserved(const std::string& section) {
 inline constexpr uint32_t kDictionaryVersion = 2;
 inline constexpr uint32_t kExpertVersion = 3;
 
-inline constexpr const wchar_t* kDictionaries = L"Data Dictionaries";
-inline constexpr const wchar_t* kExperts = L"Experts";
-
 // In the process's locale; null counts as empty.
 inline std::string Narrow(const wchar_t* text) {
   return text ? std::string(zt::fnd::AnsiString(text).c_str()) : std::string();
@@ -95,7 +92,6 @@ inline uint32_t Number(const std::string& text) {
 }  // namespace registrar
 
 // Root of the installation, ending in a slash; empty if there is none.
-zt::fnd::String vlrInstallRoot();
 
 // The directory `name` below the root, ending in a slash, made if it was missing. Its code is that
 // of the mode change, or E_FAIL where the rights to make it are missing. Without a root the text is

@@ -6,6 +6,7 @@
 #include "source/Common/vltcmn.h"
 #include "source/Pharlap/registrarText.h"
 #include "source/Pharlap/vltPharlapRegistrar.h"
+#include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/path.h"
 
@@ -145,10 +146,9 @@ HRESULT CvltPharlapRegistrar::ResetDDUpdatedFlags() {
 }
 
 HRESULT CvltPharlapRegistrar::previousDictionariesFolder(String* folder) {
-  HRESULT result = vlrMakeRootDirectory(kDictionaries, folder);
+  HRESULT result = vlrMakeRootDirectory(vlt::layout::kDictionaries, folder);
   if (result < 0) return result;
-  *folder = path::Join(*folder, String(L"Last"));
-  path::MakePathEndInSlash(*folder);
+  *folder = vlt::layout::DirectoryIn(*folder, vlt::layout::kPreviousDictionaries);
   // A result of the interface, not an error of the caller's program.
   return vlt::ResultOf<zt::fnd::exception::AccessDenied>(
       E_FAIL, [&] { return vltMakeSharedDirectory(*folder); });
@@ -205,6 +205,6 @@ HRESULT CvltPharlapRegistrar::RemovePreviousDictionaries(const _vltStartupOption
   String folder;
   result = previousDictionariesFolder(&folder);
   if (result < 0) return result;
-  remove(folder + L"vlt.vlr");
+  remove(folder + vlt::layout::kDatabase);
   return result;
 }

@@ -7,6 +7,7 @@
 #include "source/Common/vltcmn.h"
 #include "source/Pharlap/registrarText.h"
 #include "source/Pharlap/vltPharlapRegistrar.h"
+#include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/osdep/path.h"
 
 using zt::fnd::osdep::path;
@@ -144,7 +145,7 @@ bool CvltPharlapRegistrar::readExpert(const std::string& section, EmptyFileName 
   if (hasFile) {
     if (file.find_first_of("\\/") == std::string::npos) {
       String experts;
-      vlrMakeRootDirectory(kExperts, &experts);
+      vlrMakeRootDirectory(vlt::layout::kExperts, &experts);
       file = Narrow(experts) + file;
       m_registrationIni->SetItem(section.c_str(), kFileName, file.c_str(), true);
       changed = true;

@@ -7,6 +7,7 @@
 #include "source/Common/vltResultOf.h"
 #include "source/Common/vltcmn.h"
 #include "source/Pharlap/registrarText.h"
+#include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/path.h"
@@ -34,18 +35,10 @@ constexpr GuardedIniKind kDatabase = {.useEscapes = true,
 
 }  // namespace
 
-String vlrInstallRoot() {
-  const char* text = GetCurrentVltPath();
-  String root(text ? text : "");
-  if (!root.empty()) path::MakePathEndInSlash(root);
-  return root;
-}
-
 HRESULT vlrMakeRootDirectory(const wchar_t* name, String* directory) {
-  *directory = vlrInstallRoot();
+  *directory = vlt::layout::InstallRoot();
   if (directory->empty()) return E_FAIL;
-  *directory += name;
-  path::MakePathEndInSlash(*directory);
+  *directory = vlt::layout::DirectoryIn(*directory, name);
   // A client without the rights still reads what another user's process has registered.
   return vlt::ResultOf<zt::fnd::exception::AccessDenied>(
       E_FAIL, [&] { return vltMakeSharedDirectory(*directory); });
@@ -127,7 +120,7 @@ void CvltPharlapRegistrar::initSettings() {
 
 void CvltPharlapRegistrar::registerBuiltInDictionary() {
   String file;
-  vlrMakeRootDirectory(kDictionaries, &file);
+  vlrMakeRootDirectory(vlt::layout::kDictionaries, &file);
   file += L"vltdd.framework";
   String name(L"vltdd"), prefix(L"vl");
   _vltComponent2 record;
@@ -226,7 +219,7 @@ HRESULT CvltPharlapRegistrar::SetStorageServerCacheSize(unsigned int sizeBytes) 
 }
 
 HRESULT CvltPharlapRegistrar::dataDirectory(String* directory) {
-  return vlrMakeRootDirectory(L"Data", directory);
+  return vlrMakeRootDirectory(vlt::layout::kData, directory);
 }
 
 HRESULT CvltPharlapRegistrar::GetConfigurationPath(wchar_t** path) {

@@ -7,6 +7,7 @@
 #include "source/Pharlap/contentsWalk.h"
 #include "source/Pharlap/registrarText.h"
 #include "source/Pharlap/vltPharlapRegistrar.h"
+#include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/osdep/path.h"
 
 using zt::fnd::osdep::path;
@@ -17,10 +18,10 @@ using zt::fnd::Vector;
 HRESULT CvltPharlapRegistrar::FindRegistrationFiles(RegistrationFiles& files) {
   String directory;
   // Unlike elsewhere, a directory that cannot be made ends the search.
-  HRESULT result = vlrMakeRootDirectory(kDictionaries, &directory);
+  HRESULT result = vlrMakeRootDirectory(vlt::layout::kDictionaries, &directory);
   if (result < 0) return result;
   AppendRegistrationFiles(directory, String(L"*.framework"), files);
-  result = vlrMakeRootDirectory(kExperts, &directory);
+  result = vlrMakeRootDirectory(vlt::layout::kExperts, &directory);
   if (result < 0) return result;
   AppendRegistrationFiles(directory, String(L"*.vle"), files);
   return S_OK;

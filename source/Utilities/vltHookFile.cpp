@@ -9,6 +9,7 @@
 #include "source/Common/vltTestHook.h"
 #include "source/Utilities/vltutils.h"
 #include "source/vlIniMgr.h"
+#include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
@@ -44,9 +45,7 @@ vlt::hook::Faults FaultsOf(const CvlIniMgr& ini) {
 void ArmFromFile() {
   const char* directory = GetCurrentVltPath();
   if (!directory) return;
-  String file(directory);
-  zt::fnd::osdep::path::MakePathEndInSlash(file);
-  file += L"VLTHooks.ini";
+  String file = vlt::layout::FileIn(String(directory), vlt::layout::kHookFile);
   if (!zt::fnd::osdep::path::DoesFileExist(file)) return;
   CvlIniMgr ini = CvlIniMgr::OpenRaw(zt::fnd::AnsiString(file).c_str());
   std::string name;

@@ -8,6 +8,7 @@
 #include "source/Common/vltcmn.h"
 #include "source/Utilities/vltjar.h"
 #include "source/Utilities/vltutils.h"
+#include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/path.h"
@@ -30,17 +31,10 @@ constexpr int kFirstEndpoint = 61901;
 constexpr int kEndpointLimit = 62101;
 constexpr int kMostRounds = 400;
 
-String InstallDirectory() {
-  const char* text = GetCurrentVltPath();
-  return String(text ? text : "");
-}
-
 // <install>/Data/, whether it is there or not; empty without an install directory.
 String DataDirectory() {
-  String directory = InstallDirectory();
-  if (directory.empty()) return directory;
-  path::MakePathEndInSlash(directory);
-  return directory + L"Data/";
+  String root = vlt::layout::InstallRoot();
+  return root.empty() ? root : vlt::layout::DirectoryIn(root, vlt::layout::kData);
 }
 
 // Fills in an empty dataDir and makes the directory if it is missing.
@@ -98,7 +92,7 @@ String vltjar::ExistingDataDirectory() {
 wchar_t* GetJarFilePath() {
   String directory = vltjar::ExistingDataDirectory();
   if (directory.empty()) return nullptr;
-  String file = directory + L"vltjar.ini";
+  String file = directory + vlt::layout::kJar;
   auto* copy = new wchar_t[file.length() + 1];
   wcscpy(copy, file.c_str());
   return copy;

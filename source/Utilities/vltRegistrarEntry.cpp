@@ -10,6 +10,7 @@
 #include "source/Utilities/vltAllocationPoints.h"
 #include "source/Utilities/vltCheck.h"
 #include "source/Utilities/vltutils.h"
+#include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
 #include "zt/fnd/osdep/LeakedInstance.h"
@@ -88,9 +89,7 @@ HRESULT vltGetRegistrar(IvltRegistrar** out) {
       !LookUp("Could not get the VLT data path in vltGetRegistrar", &dataDirectory)) {
     return E_FAIL;
   }
-  String file(dataDirectory.c_str());
-  zt::fnd::osdep::path::MakePathEndInSlash(file);
-  file += L"vlt.vlr";
+  String file = vlt::layout::FileIn(String(dataDirectory.c_str()), vlt::layout::kDatabase);
   return vltGetRegistrar2(file.c_str(), String(installDirectory.c_str()).c_str(), out);
 }
 

@@ -7,6 +7,7 @@
 #include "source/Utilities/vltSettingsKeys.h"
 #include "source/Utilities/vltjar.h"
 #include "source/Utilities/vltutils.h"
+#include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/String.h"
 
 using namespace settings;
@@ -22,7 +23,8 @@ class Settings {
   HRESULT open(bool named, const wchar_t* name) {
     m_directory = vltjar::ExistingDataDirectory();
     if (m_directory.empty()) return S_OK;
-    String file = m_directory + (named && name ? String(name) + L".ini" : String(L"kor.ini"));
+    String file =
+        m_directory + (named && name ? String(name) + L".ini" : String(vlt::layout::kSettings));
     m_opened = VltjarOpen(file.c_str(), &m_ini);
     return m_opened;
   }

@@ -8,8 +8,10 @@
 
 #include "source/Common/vltResultOf.h"
 #include "source/Common/vltcmn.h"
+#include "source/Utilities/vltSettingsKeys.h"
 #include "source/Utilities/vltjar.h"
 #include "source/Utilities/vltutils.h"
+#include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/osdep/StringCompare.h"
 #include "zt/fnd/osdep/path.h"
 
@@ -23,7 +25,6 @@ namespace {
 // unlike that of the settings calls.
 constexpr const wchar_t* g_ModulePath = L"vltutils";
 constexpr const wchar_t* kLocalHost = L"127.0.0.1:";
-constexpr const char* kDefaultEndpoint = "61900";
 constexpr const wchar_t* kOfflineMarker = L"VLTOFFLINESTORAGE=";
 
 // The answer of the first call, which stays whatever the file says later; never freed. Without a
@@ -33,11 +34,14 @@ constinit std::atomic<const std::wstring*> s_localServer{nullptr};
 
 // The port of the settings file; empty if the file cannot be opened.
 HRESULT ReadPort(std::string* port) {
-  String file = path::Join(path::DirName(String(g_ModulePath)), String(L"kor.ini"));
+  String file = path::Join(path::DirName(String(g_ModulePath)), String(vlt::layout::kSettings));
   std::unique_ptr<CvlIniMgr> ini;
   // A directory that cannot be written is no reason to fail the caller otherwise.
   HRESULT result = vlt::ResultOf<int>(E_FAIL, [&] { return VltjarOpen(file.c_str(), &ini); });
-  if (ini && ini->GetItem("STORAGE", "LocalServerEndpoint3", port) < 0) *port = kDefaultEndpoint;
+  const std::string key = settings::kLocalEndpoint.key + std::to_string(settings::kDefaultIndex);
+  if (ini && ini->GetItem(settings::kSection, key.c_str(), port) < 0) {
+    *port = zt::fnd::AnsiString(String(settings::kLocalEndpoint.atDefaultIndex)).c_str();
+  }
   return result;
 }
 

@@ -15,6 +15,7 @@
 #include "source/vlIniMgr.h"
 #include "tools/common/Terminal.h"
 #include "tools/vltctl/Reading.h"
+#include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/String.h"
 
@@ -119,10 +120,7 @@ const std::map<std::string, const char*> kFlags = {
     {"throw", "SimulateMemoryAllocationFailureAndThrow"},
     {"exhaust", "MemoryAllocationFailure"}};
 
-std::string HookFile() {
-  std::string directory = vlLookUpInstallDirectory();
-  return directory + (directory.ends_with('/') ? "" : "/") + "VLTHooks.ini";
-}
+std::string HookFile() { return InstalledFile(vlt::layout::kHookFile); }
 
 // The library would wait for a pipe, and read whatever size of file: both end the command.
 void ExpectUsable(const std::string& file) {

@@ -11,6 +11,7 @@
 #include "source/vlIniMgr.h"
 #include "tools/common/Terminal.h"
 #include "tools/vltctl/Reading.h"
+#include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/String.h"
 
 using vltctl::ForTerminal;
@@ -85,7 +86,7 @@ int Settings(unsigned index, bool client, bool server, const std::string& name, 
 }
 
 int Jar(bool json) {
-  std::string file = DataFile("vltjar.ini");
+  std::string file = DataFile(zt::fnd::AnsiString(vlt::layout::kJar).c_str());
   GuardedBytes read = ReadGuarded(file);
   if (read.state != GuardedBytes::State::Read) {
     bool missing = read.state == GuardedBytes::State::Missing;

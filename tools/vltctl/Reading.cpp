@@ -12,6 +12,7 @@
 #include "source/IniSidecar.h"
 #include "source/vlIniMgr.h"
 #include "tools/common/Terminal.h"
+#include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
 
 using vltctl::ForTerminal;
@@ -167,10 +168,14 @@ std::vector<std::pair<std::string, std::string>> Document::items(const std::stri
   return found;
 }
 
-std::string DataFile(const std::string& name) {
+std::string InstalledFile(const wchar_t* name) {
   std::string directory = vlLookUpInstallDirectory();
   if (!directory.ends_with('/')) directory += '/';
-  return directory + "Data/" + name;
+  return directory + zt::fnd::AnsiString(name).c_str();
+}
+
+std::string DataFile(const std::string& name) {
+  return InstalledFile(vlt::layout::kData) + "/" + name;
 }
 
 void PrintJson(const nlohmann::json& value) {

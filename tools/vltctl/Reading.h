@@ -54,6 +54,8 @@ class Document {
 
 // <install>/Data/NAME.
 std::string DataFile(const std::string& name);
+// Path of a file or directory of the installation (vlloader/source/InstallLayout.h).
+std::string InstalledFile(const wchar_t* name);
 
 // Prints rows of one width, safe for a terminal, or the JSON of them.
 struct Row {

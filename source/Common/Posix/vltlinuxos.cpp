@@ -12,6 +12,7 @@
 #include <memory>
 #include <new>
 
+#include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/path.h"
@@ -66,8 +67,8 @@ unsigned vltGetTraceFlagsImpl() {
 
 String vlDiagnosticsIni() {
   // The fixed place on purpose: logging starts before anybody has said where the installation is.
-  String data = path::Join(String(kKorDefaultDirectory), String(L"Data"));
-  return path::Join(data, String(L"vldiag.ini"));
+  String data = vlt::layout::DirectoryIn(String(kKorDefaultDirectory), vlt::layout::kData);
+  return vlt::layout::FileIn(data, vlt::layout::kDiagnostics);
 }
 
 String vlLogDirectory() {
