@@ -83,7 +83,7 @@ void CopyStd(benchmark::State& state) {
 }
 BENCHMARK(CopyStd)->Name("Copy/std::wstring")->Arg(64)->Arg(4096);
 
-// ---- case-insensitive compare of equal texts; the argument tells whether their case differs
+// ---- case-insensitive compare of equal texts; the argument says whether their case differs
 
 std::wstring OtherCase(bool differs) {
   std::wstring text = kWideAscii;

@@ -1,5 +1,5 @@
 // First and second start of the registrar with 10 to 3,000 bundles, and its answers from memory.
-// Beside the starts stands the least that any scan does: opendir, and one stat a bundle.
+// Beside the starts is the least that any scan does: opendir, and one stat a bundle.
 #include <benchmark/benchmark.h>
 #include <dirent.h>
 #include <stdio.h>
@@ -22,7 +22,7 @@ namespace fs = std::filesystem;
 using zt::fnd::String;
 
 // The places of this run, made before anything of the library looks at them. The library reads the
-// install directory once a process, so all sizes share one root and fill it anew.
+// install directory once a process, so all sizes share one root and fill it again.
 struct Places {
   Places() {
     char pattern[] = "/tmp/vltbench.XXXXXX";

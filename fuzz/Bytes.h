@@ -46,7 +46,7 @@ class Cursor {
   size_t m_left;
 };
 
-// A number as it stands in a stream of that byte order: 0 is this machine's, any other the reverse.
+// A number as it is in a stream of that byte order: 0 is this machine's, any other the reverse.
 template <class T>
 std::string InOrder(T value, uint8_t order) {
   std::string bytes(reinterpret_cast<const char*>(&value), sizeof value);
@@ -82,7 +82,7 @@ inline int64_t Position(IztStream* stream) {
   return position;
 }
 
-// All bytes of the stream; the cursor then stands at their end.
+// All bytes of the stream; the cursor is then at their end.
 inline std::string Contents(IztStream* stream) {
   int64_t size = 0;
   stream->Seek(0, ztSeekEnd, &size);

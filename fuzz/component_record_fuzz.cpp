@@ -1,6 +1,6 @@
 // Component records of any bytes, in both byte orders, read, written, and read again.
 //
-// The first byte says what stands in front of the rest: nothing, or a header, or a header and the right
+// The first byte says what is in front of the rest: nothing, or a header, or a header and the right
 // record size; and in which order and which locale.
 #include <locale.h>
 
@@ -64,7 +64,7 @@ std::string Encoded(const _vltComponent2& r, uint8_t order) {
   return e.bytes;
 }
 
-// Components of certain names keep their texts for ever, as some have handed them out.
+// Components of certain names keep their texts indefinitely, as some have returned them.
 struct Component : CvltComponent {
   using CvltComponent::CvltComponent;
   ~Component() { forgetName(); }
@@ -73,7 +73,7 @@ struct Component : CvltComponent {
   }
 };
 
-// True if a whole record was read. Nothing but the exceptions told may come.
+// True if a whole record was read. Nothing but the documented exceptions may come.
 bool Read(const std::string& bytes, CvltComponent& component) {
   fuzz::MemoryPtr stream = fuzz::MemoryOf(bytes);
   try {

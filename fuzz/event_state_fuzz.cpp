@@ -24,7 +24,7 @@
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/events/EventStateFile.h"
 
-// Time passes without being waited for, and fast: a sleep moves the clock that deadlines are told by.
+// Time passes without being waited for, and fast: a sleep moves the clock that deadlines go by.
 // Otherwise most of the run would be spent in the two seconds that an opening has.
 namespace {
 
@@ -63,7 +63,7 @@ namespace {
 using zt::fnd::String;
 using namespace zt::fnd::osdep;
 
-constexpr double kBoundSeconds = 9;  // of one input: two openings of two seconds each, and room
+constexpr double kBoundSeconds = 9;  // of one input: two openings of two seconds each, and space
 
 // Bits of the first byte.
 constexpr uint8_t kManual = 1, kInitial = 2, kFirstOpened = 4, kHeldByOthers = 8,
@@ -95,7 +95,7 @@ struct EventsPlace : fuzz::Place {
   const bool ownIpc;
 };
 
-// A file that somebody else has open, and shares.
+// A file that another process has open, and shares.
 class Holder {
  public:
   explicit Holder(const std::string& file) : m_fd(open(file.c_str(), O_RDWR | O_CLOEXEC)) {
@@ -140,7 +140,7 @@ struct Plan {
         stateFile(input.rest()) {}
   bool has(uint8_t bit) const { return what & bit; }
   bool does(uint8_t bit) const { return how & bit; }
-  // An opening that finds nothing to join begins anew some hundred times, so not each input may ask for
+  // An opening that finds nothing to join begins again some hundred times, so not each input may ask for
   // one.
   bool holdsLockFile() const { return has(kLockFileHeld) && kernelSlots % 16 == 15; }
 };

@@ -1,4 +1,4 @@
-// Opens a guarded file and a sidecar of any bytes: the first byte tells how many belong to the sidecar.
+// Opens a guarded file and a sidecar of any bytes: the first byte says how many belong to the sidecar.
 // Whatever they hold, the file can be opened, changed, saved, and opened again with what was saved.
 #include <stdlib.h>
 #include <string.h>
@@ -21,7 +21,7 @@ struct GuardedPlace : fuzz::Place {
 };
 
 // Damage below a digest that differs is raised once: the digest comes first, and the file is set aside
-// by the second look at it. The next opening begins it anew.
+// by the second check of it. The next opening begins it again.
 std::unique_ptr<CvlIniMgr> Open(const GuardedPlace& place) {
   std::unique_ptr<CvlIniMgr> ini;
   try {

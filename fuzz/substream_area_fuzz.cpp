@@ -1,9 +1,9 @@
-// Sub-streams behind any bytes: of owned and of read-only memory, of files, at any depth; copied, and
+// Sub-streams after any bytes: of owned and of read-only memory, of files, at any depth; copied, and
 // written again in both byte orders. Whatever the bytes are, those that do not load are left as they
 // were.
 //
 // The first byte says what is done; with its bit 0, a trailer that leads to the next two bytes' offset
-// is put behind the rest.
+// is put after the rest.
 #include <map>
 
 #include "fuzz/Bytes.h"
@@ -64,7 +64,7 @@ std::string MarkerBytes() {
 
 std::string Trailer(int64_t offset) { return MarkerBytes() + fuzz::InOrder(offset, 0); }
 
-// Data that would be taken for an area's end if it stood alone.
+// Data that would be taken for an area's end if it were alone.
 bool EndsInMarker(const std::string& bytes) {
   return bytes.size() >= 24 && bytes.compare(bytes.size() - 24, 16, MarkerBytes()) == 0;
 }
@@ -153,7 +153,7 @@ void CopyAndWrite(const Tree& tree, uint8_t order) {
   fuzz::Demand(written.starts_with(tree.contents));
   if (!tree.children.empty()) fuzz::Demand(EndsInMarker(written));
   if (sizeof(unsigned long) == 4 && !tree.children.empty()) {
-    // Data that ends in a marker of its own is an area when it stands alone, so leaves may differ.
+    // Data that ends in a marker of its own is an area when it is alone, so leaves may differ.
     fuzz::Demand(LoadsOwned(written, &again) && again.children.size() == tree.children.size());
   }
   free(target->DetachBuffer());

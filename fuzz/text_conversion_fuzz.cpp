@@ -26,7 +26,7 @@ void Decode(const uint8_t* data, size_t sizeBytes) {
     fuzz::Demand(WideToUtf8(wide.get(), wide.get() + length, again.get(), again.get() + bytes) ==
                  bytes);
   } catch (const exception::InvalidSequence&) {
-    // Bad bytes, told as such.
+    // Bad bytes, reported as such.
   }
 }
 

@@ -79,7 +79,7 @@ void ReadAny(const std::string& kinds, const std::string& bytes) {
     CztInStream in(stream.get());
     for (char kind : kinds) ReadOne(static_cast<uint8_t>(kind), in, bytes);
   } catch (const CztStreamException&) {
-    // The bytes ended, or told a length that cannot be. Nothing else may come.
+    // The bytes ended, or gave a length that cannot be. Nothing else may come.
   }
 }
 

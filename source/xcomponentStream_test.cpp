@@ -156,7 +156,7 @@ TEST(xcomponentStream, OneWriteAField) {
                                         1, 1, 1, 1, 1, 4, 2, 8, 4, 4, 4}));
 }
 
-// The calls of a dictionary's record, behind the header's four, whose results do not matter.
+// The calls of a dictionary's record, after the header's four, whose results do not matter.
 TEST(xcomponentStream, AFailedNumberThrowsAndAFailedTextDoesNot) {
   CvltComponent component;
   Fill(component, vltComponentDataDictionary);

@@ -37,7 +37,7 @@ void ztini_ListClear(ztini_List list);
 
 int32_t ztini_ListNumItems(const ztini_ListRecord* list);
 
-// Makes room for so many more items, so that inserting them cannot fail. 1, or 0 out of memory.
+// Makes space for so many more items, so that inserting them cannot fail. 1, or 0 out of memory.
 int32_t ztini_ListReserve(ztini_List list, uint32_t extra);
 
 // Copies items from `source`, which must not lie in the list; a null source gives zero-filled

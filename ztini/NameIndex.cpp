@@ -115,7 +115,7 @@ bool NameIndex::addTwin(Slot* slot, NodesInOrder nodes, NameNode* node) {
   return true;
 }
 
-// Makes room for two.
+// Makes space for two.
 bool NameIndex::reserveTwins() {
   if (m_twinEnd + 1 < m_twinCapacity) return true;
   if (m_twinCapacity > kMostTwins / 2) return false;

@@ -59,7 +59,7 @@ class NameIndex {
   // Forgets all nodes and frees the table; the nodes are not touched.
   void clear();
 
-  // Makes an empty table with room for so many names. False without memory.
+  // Makes an empty table with space for so many names. False without memory.
   bool create(const NameFold& fold, size_t names);
 
   // Adds a node at its place in the order. False without memory; the index is then cleared.

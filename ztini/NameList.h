@@ -52,7 +52,7 @@ class NameList {
   // Makes sure that the next `records` appends need no memory. False without memory.
   bool reserve(uint32_t records) { return ztini_ListReserve(&m_list, records) != 0; }
 
-  // Adds at the end; room must have been reserved.
+  // Adds at the end; space must have been reserved.
   void append(NameNode* node);
 
   // Takes a record of the list out; it is the caller's afterwards.

@@ -8,7 +8,7 @@
 
 // A document that was read is settled as it is: its names and values were cut out of lines like those
 // that it is written to. What breaks this is known by its looks, and unsettles the document for good:
-// pieces, which may be joined with what comes to stand beside them, and the section without a header.
+// pieces, which may be joined with what comes to be beside them, and the section without a header.
 // What is put has to pass the tests here.
 
 namespace {

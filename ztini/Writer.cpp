@@ -28,7 +28,7 @@ class FunctionLines {
   ztini::TextBuffer m_line;
 };
 
-// Puts lines together in one text, as they stand in a file.
+// Puts lines together in one text, as they are in a file.
 class TextInMemory {
  public:
   TextInMemory(ztini::TextBuffer* text, bool marked) : m_text(text), m_isFirst(!marked) {}

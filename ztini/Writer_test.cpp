@@ -152,11 +152,11 @@ TEST(Writer, PiecesEndAfterTheLastBreakCharacter) {
     const char* value;
     Lines pieces;
   } rows[] = {
-      // Room is 10.
+      // Space is 10.
       {"aa bb cc dd ee ff gg hh", {"aa bb cc ", "dd ee ff ", "gg hh"}},
       {"aaaaaaaaaaaaaaaaaa bb", {"aaaaaaaaaa", "aaaaaaaa ", "bb"}},
       {"aaaa bbbbbbbbbbbbbbbbb", {"aaaa ", "bbbbbbbbbb", "bbbbbbb"}},
-      // Exactly room left: still breaks. Less: all of it.
+      // Exactly space left: still breaks. Less: all of it.
       {"aaaa aaaa bbbb cc dd", {"aaaa aaaa ", "bbbb cc ", "dd"}},
       {"aaaa aaaa aaaaaaaaa bbbb cc d", {"aaaa aaaa ", "aaaaaaaaa ", "bbbb cc d"}},
       {"                    ", {"          ", "          "}},

@@ -28,7 +28,7 @@ struct IniSection;
 struct IniEntry;
 
 enum IniStatus : int32_t {
-  kIniNoRoom = -2,               // the line limit leaves no room beside an item's name
+  kIniNoRoom = -2,               // the line limit leaves no space beside an item's name
   kIniUnsupportedEncoding = -3,  // a UTF-16 or UTF-32 byte order mark
   kIniEmptyPath = -4,            // IniGetFileTimestamp only
   kIniEmptyName = -6,            // IniPut: a name without any character but white space
@@ -126,7 +126,7 @@ const char* IniSectionName(const IniSection* section);
 const char* IniEntryName(const IniEntry* entry);
 int32_t IniSectionWasReadFromFile(const IniSection* section);
 
-// 1 for the section that stands for the items before the first header: its name is "(null)".
+// 1 for the section of the items before the first header: its name is "(null)".
 int32_t IniSectionIsNull(const IniSection* section);
 
 // ---- Enumeration. Names and values stay valid until the item is removed or replaced.

@@ -83,7 +83,7 @@ struct ReferenceElements {
   }
 };
 
-// Zeroed room for the elements, which are given back with it. Pages that the storage does not fill
+// Zeroed space for the elements, which are given back with it. Pages that the storage does not fill
 // cost nothing, so that a count that is not true does no harm.
 template <class Kind>
 class ElementBuffer {

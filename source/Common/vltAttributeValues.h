@@ -35,6 +35,6 @@ HRESULT vltSetAttributeValueFromString2(IvltObject* object, unsigned id, const w
 // escaped: "{a,b}". A null object reads "NULL". Returns the last result of the storage; a failure
 // when asked for the elements does not keep those that came out of the list.
 // E_FAIL and "{}" for a type that is no array. E_OUTOFMEMORY, after its report, and "{" when there
-// is no room for the elements.
+// is no space for the elements.
 HRESULT vltGetArrayValueAsString(IvltObject* object, unsigned id, _vltAttributeType type,
                                  zt::fnd::String& text);

@@ -157,7 +157,7 @@ TEST(vltAttributeValues, TheInnerGetterWritesFailedReferencesAndArrays) {
   for (int type = 8; type <= 13; ++type) {
     answers = Filled(type);
     std::wstring whole = TextOf(answers, S_OK, kInner);
-    answers.result = kFailure;  // of the elements, which are told all the same
+    answers.result = kFailure;  // of the elements, which are reported all the same
     EXPECT_EQ(TextOf(answers, kFailure, kInner), whole) << type;
     answers.sizeResult = kFailure;
     EXPECT_EQ(TextOf(answers, kFailure, kInner), L"{}") << type;

@@ -79,7 +79,7 @@ TEST(vltBindingClasses, TextsAndTheirTables) {
                       {p + ":1:words", {{1, {0}}}},
                       {p + ":1:", {{1, {0}}}},
                       {":0", {{0, {}}}},
-                      // Fewer classes than told.
+                      // Fewer classes than the count says.
                       {p + ":5:" + q + ":" + r, {{1, {2, 3}}}},
                       {p + ":2000000000:" + q, {{1, {2}}}},
                       {p + ":-99999999999999999999:" + q + ":0", {{1, {}}, {2, {}}}},
@@ -201,7 +201,7 @@ TEST(vltBindingClasses, NobodyServesAnUnknownClassAndNothingIsTouched) {
   unsigned count = 7;
   GUID mark;
   GUID* components = &mark;
-  // Before, between and behind the classes of the map.
+  // Before, between and after the classes of the map.
   for (uint32_t n : {1u, 9u}) {
     EXPECT_EQ(vltGetComponentsForBindingClass(G(n), &count, &map, &components), VLT_E_NO_COMPONENT);
   }

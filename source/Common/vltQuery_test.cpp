@@ -394,7 +394,7 @@ TEST(vltQuery, PrintsIdsAndNumbersByTheirPattern) {
 }
 
 TEST(vltQuery, LongTextsGrowTheLine) {
-  // The first block has room for 40 characters and 72 a term.
+  // The first block has space for 40 characters and 72 a term.
   for (size_t length :
        {60u, 61u, 62u, 63u, 64u, 65u, 66u, 67u, 68u, 69u, 70u, 71u, 72u, 430u, 431u, 432u, 5000u}) {
     std::wstring text(length, L'x');

@@ -13,7 +13,7 @@
 
 namespace {
 
-// Owns a text that an export handed out.
+// Owns a text that an export returned.
 std::wstring Take(wchar_t* text) {
   if (!text) return L"(null)";
   std::wstring copy = text;

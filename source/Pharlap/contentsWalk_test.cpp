@@ -68,7 +68,7 @@ TEST(contentsWalk, TheNameOfARunIsExactInCase) {
              {{"name", "/1", 0, 0}, {"Name", "/2", 1, 1}});
 }
 
-// Only the four letters count: neither the blank before them nor the digits behind.
+// Only the four letters count: neither the blank before them nor the digits after them.
 TEST(contentsWalk, AnyFourCharactersMayFollowTheMark) {
   ExpectWalk({{"name_LineABCD", "/1"}, {"name line0002", "/2"}, {"name Line00001", "/3"}},
              {{"name", "/1", 0, 0}, {"name line0002", "/2", 1, 1}, {"name Line00001", "/3", 2, 2}});

@@ -129,7 +129,7 @@ TEST(vltPharlapDatabase, ADifferingDigestKeepsTheContents) {
     LinuxStart r(i);
     EXPECT_EQ(Find(*r, G(1)), S_OK);
   });
-  EXPECT_EQ(saves.count(), 1);  // that of the built-in dictionary: nothing is merged anew
+  EXPECT_EQ(saves.count(), 1);  // that of the built-in dictionary: nothing is merged again
   EXPECT_FALSE(Exists(BadName(i)));
   EXPECT_EQ(DatabaseText(i.database()).raw("Mine", "x"), "1");
   EXPECT_EQ(Hex(ReadBytes(i.sidecar())), Md5Sum(i.database()));

@@ -120,7 +120,7 @@ TEST(vltPharlapUpdate, OfAnItemInPiecesOnlyTheLastPieceGoes) {
   EXPECT_FALSE(db.has("Expert"));
 }
 
-// Items that an earlier file of the same start has brought count for the new files behind it. Dictionaries
+// Items that an earlier file of the same start has brought count for the new files after it. Dictionaries
 // come before experts.
 TEST(vltPharlapUpdate, ANewFileErasesWhatWasEnteredUnderItsNameJustBefore) {
   for (const char* pieces :
@@ -180,7 +180,7 @@ TEST(vltPharlapUpdateRemove,
   EXPECT_TRUE(db.has("Exp"));
 }
 
-// The start itself saves before the removal, never behind it.
+// The start itself saves before the removal, never after it.
 TEST(vltPharlapUpdateRemove, AStartWithNothingElseChangedLeavesItOnTheDiskForGood) {
   Installation i;
   i.addObjectExpert("F", "Gone", GText(3));

@@ -89,7 +89,7 @@ TEST_F(vltSettingsOrder, NumbersAreReadInTheirOrder) {
         EXPECT_EQ(same, second);
       }
     }
-    // Enabled 1, journaling 0, validate 1, create 0, and the cookie, 42, behind them all.
+    // Enabled 1, journaling 0, validate 1, create 0, and the cookie, 42, after them all.
     unsigned same = 99;
     auto ask = [&](bool enabled, bool journaling, bool validate, bool create, bool cookie) {
       EXPECT_EQ(
@@ -157,7 +157,7 @@ TEST_F(vltSettingsOrder, AShortSidecarStaysTheResultButForTheJarsAnswer) {
                                t.at(kProtocol), t.at(kEndpoint), t.at(kEventPort), t.at(kAppend)),
           row.result);
       EXPECT_EQ(t.found(kBootstrap), row.index == 3 ? Text("62602") : std::nullopt);
-      // Only the first opening tells it.
+      // Only the first opening reports it.
       Texts<kClientTexts> again;
       EXPECT_EQ(AskClient(3, 1, again), S_OK);
     });

@@ -6,7 +6,7 @@
 #include "tests/e2e/Start.h"
 
 // Registration files and installations as an enemy makes them. Each ends in its proper outcome, or
-// with the component skipped: no crash, no hang, no lost database. What stands beside the hostile
+// with the component skipped: no crash, no hang, no lost database. What is beside the hostile
 // file stays available.
 namespace vlt::test {
 

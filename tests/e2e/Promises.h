@@ -1,6 +1,6 @@
 #pragma once
 
-// What a client has been promised - every value whose saving was answered with S_OK - and the look for it
+// What a client has been promised - every value whose saving was answered with S_OK - and the check for it
 // in a new process.
 
 #include <dlfcn.h>

@@ -285,7 +285,7 @@ TEST(Hostile, ARelativePathPlantedInTheContentsGoes) {
 }
 
 // The name of the section that is written without a header: its items must not fall to the list of
-// contents, or to any other section that happens to stand before.
+// contents, or to any other section that happens to come before.
 TEST(Hostile, TheHeaderlessSectionIsLeftOut) {
   HostileInstallation b;
   b.plant("[KORComponents]\nN = \"N\"\n");

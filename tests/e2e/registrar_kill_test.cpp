@@ -127,7 +127,7 @@ TEST_F(RegistrarKill, AtEveryCallOfASaveThatAClientAskedFor) {
   ExpectWhole(i);
 }
 
-// Whole starts of the command-line client, each from the same state: from the first look at the
+// Whole starts of the command-line client, each from the same state: from the first check of the
 // sidecar to the last call that has to do with the installation.
 void KillStarts(const char* what, const Installation& i, const std::vector<GUID>& all,
                 size_t atLeast, const std::function<void()>& prepare,

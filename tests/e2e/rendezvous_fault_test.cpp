@@ -23,7 +23,7 @@ int LongestMs() { return FullSize() && kCanLimitMemory ? 5000 : 20000; }
 
 size_t CallsPerFault() { return FullSize() ? 1 : kCanLimitMemory ? 67 : 331; }
 
-// What has to do with no file, and the look that marks the begin and the end.
+// What has to do with no file, and the check that marks the begin and the end.
 bool IsAboutFiles(const Call& call) {
   static const std::set<std::string> others = {
       "getpid",  "gettid",       "getuid",        "geteuid",    "getgid",

@@ -121,7 +121,7 @@ class RendezvousStorm : public testing::Test {
       written[w].endpoints += one.kind == kEndpoint;
       ++acknowledged;
     }
-    // Begun when he was killed: may stand there or not.
+    // Begun when he was killed: may be there or not.
     inFlight[w] = shared->begun[w] > written[w].count;
     written[w].count = std::max(written[w].count, static_cast<int>(shared->begun[w]));
   }

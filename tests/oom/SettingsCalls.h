@@ -59,7 +59,7 @@ inline Call SetCookie() {
           }};
 }
 
-// The text object as a caller builds it who has only its declaration: begin, end and end of the room.
+// The text object as a caller builds it who has only its declaration: begin, end and end of the space.
 struct ForeignText {
   const wchar_t *begin, *end, *capacityEnd;
   explicit ForeignText(const std::wstring& text)

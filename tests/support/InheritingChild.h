@@ -13,7 +13,7 @@
 // Processes that inherit the descriptors of one that is killed, and live on.
 namespace vlt::test {
 
-// A plain child of whoever calls fork(): says so, lives until it is told to end, and ends.
+// A plain child of whoever calls fork(): says so, lives until it is asked to end, and ends.
 class InheritingChild {
  public:
   // In the process that is to have it. Returns there only.

@@ -1,6 +1,6 @@
 #pragma once
 
-// Which sanitizer this build runs under; g++ and clang tell it in two ways.
+// Which sanitizer this build runs under; g++ and clang say it in two ways.
 #if defined(__SANITIZE_ADDRESS__)
 #define VLT_ADDRESS_SANITIZER 1
 #elif defined(__SANITIZE_THREAD__)

@@ -14,7 +14,7 @@ namespace vltctl {
 struct Finding {
   Component component;
   bool sound = false;
-  std::vector<std::string> messages;  // the library's, as they stand
+  std::vector<std::string> messages;  // the library's, as they are
   // The loader's own words, what the check raised, and what became of the child.
   std::vector<std::string> notes;
 };

@@ -128,7 +128,7 @@ void AutoBuffer::makeOwnWithRoom(uint32_t required, Growth growth) {
   ReallocData(m_guts, growth == Growth::Exact ? required : GrownByATenth(required));
 }
 
-// Makes room, and returns where the given bytes lie afterwards: the block may have moved, with them
+// Makes space, and returns where the given bytes lie afterwards: the block may have moved, with them
 // inside.
 const unsigned char* AutoBuffer::prepare(const void* bytes, uint32_t required) {
   const unsigned char* source = static_cast<const unsigned char*>(bytes);

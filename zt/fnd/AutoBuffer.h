@@ -51,7 +51,7 @@ class AutoBuffer {
   AutoBuffer& operator=(const AutoBuffer& other);  // shares
   AutoBuffer& operator=(const BufferWrapper& bytes);
 
-  // Null and 0 without a block. Who writes through Data() has made room by Skip() before, which
+  // Null and 0 without a block. Who writes through Data() has made space by Skip() before, which
   // also unshares; the pointer is good until the next change.
   unsigned char* Data() const noexcept { return m_guts ? m_guts->data : nullptr; }
   unsigned int Len() const noexcept {

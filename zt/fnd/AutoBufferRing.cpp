@@ -73,7 +73,7 @@ void AutoBuffer::circularDeserialize(const unsigned char* ringBegin, const unsig
   const unsigned char* body = cursor;
   uint32_t length = ReadLength(ringBegin, ringEnd, body);
   size_t first = BeforeWrap(body, ringEnd, length);
-  // Room before the old contents go, so that a failed allocation changes nothing.
+  // Space before the old contents go, so that a failed allocation changes nothing.
   if (shared() || Capacity() < length) *this = AutoBuffer(length);
   Erase();
   if (length > 0) {

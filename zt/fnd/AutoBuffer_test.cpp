@@ -199,7 +199,7 @@ TEST(AutoBuffer, CloneHasAllTheRoomItClaims) {
   b.Append("d", 1);
   EXPECT_EQ(b.Capacity(), 4096u);
   const std::string filler(4092, 'x');
-  b.Append(filler.data(), 4092);  // into the claimed room; a checker of memory would see it pass
+  b.Append(filler.data(), 4092);  // into the claimed space; a checker of memory would see it pass
   EXPECT_EQ(b.Capacity(), 4096u);
   EXPECT_EQ("abcd" + filler, Text(b));
   EXPECT_EQ(Text(a), "abc");

@@ -51,7 +51,7 @@ T FromLittleEndian(T value) {
   return value;
 }
 
-// Writes the value at the cursor, which may be unaligned, and moves it on. Without room below
+// Writes the value at the cursor, which may be unaligned, and moves it on. Without space below
 // `limit` throws BufferOverflow, with nothing written and the cursor unchanged.
 template <class T>
 void SerializeRaw(const T& value, unsigned char*& cursor, const unsigned char* limit) {

@@ -113,7 +113,7 @@ class StringBase {
   StringBase& operator=(const T* s);
   StringBase& operator=(const Other* s);
 
-  // Growth. Without room the capacity becomes twice the new length, or exactly the new length where
+  // Growth. Without space the capacity becomes twice the new length, or exactly the new length where
   // doubling is impossible. A string may be appended to itself.
   // With `pos`: takes min(n, s.length()) characters from `pos` on, which is not checked; what lies
   // beyond the end of `s` is taken as zeros.
@@ -179,7 +179,7 @@ class StringBase {
   // Wire form: a 32-bit little-endian length, then the text. String and Utf8String write UTF-8
   // without terminator; the locale and ASCII strings write their bytes with the terminator, which
   // the length counts. The size is 0xFFFFFFFF where it does not fit 32 bits.
-  // Throws BufferOverflow (no room below limit) or DeserializationError (truncated, unterminated);
+  // Throws BufferOverflow (no space below limit) or DeserializationError (truncated, unterminated);
   // the cursor and the string are then unchanged.
   size_type serializationSize() const;
   void serialize(unsigned char*& cursor, const unsigned char* limit) const;

@@ -44,7 +44,7 @@ template <class T, class O, class E>
 auto StringBase<T, O, E>::serializationSize() const -> size_type {
   using string_detail::kLengthField;
   if constexpr (kIsWide) {
-    // The limit leaves room for the length field below 32 bits.
+    // The limit leaves space for the length field below 32 bits.
     return kLengthField + GetUtf8EncodingBytesWithBufferLimit(m_begin, m_end, 0xFFFFFFFBu);
   } else {
     const uint64_t terminator = kIsUtf8 ? 0 : 1;

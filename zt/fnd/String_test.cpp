@@ -412,7 +412,7 @@ int OperationsWithoutMemory() {
   const std::string narrow(kBig, 'x');
   String s(L"abc");
   vlt::test::LimitMemoryTo(8u << 20);
-  // Earlier tests of the process may have left room in the heap, beyond what the limit is about.
+  // Earlier tests of the process may have left space in the heap, beyond what the limit is about.
   while (DLLMallocNoThrow(4u << 20)) {
   }
   int step = 0;

@@ -13,7 +13,7 @@ namespace zt::fnd {
 
 // Growable array in one block from DLLMalloc; 32-bit size.
 //
-// Without room the capacity c becomes 2c + 1 (or c + 1 with c's top bit set). A copy has a capacity
+// Without space the capacity c becomes 2c + 1 (or c + 1 with c's top bit set). A copy has a capacity
 // equal to its size. Throws OutOfRange where a capacity or its byte size passes 32 bits,
 // std::bad_alloc, and what copying an element throws; a failed call changes nothing.
 // Threads: a plain value.

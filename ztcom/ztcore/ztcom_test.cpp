@@ -55,7 +55,7 @@ class Thing : public IThing, public CZTComObjectRootEx<CZTComMultiThreadModelNoC
     --g_alive;
     if (g_queryWhileDying) {
       ++m_refCount;  // What a QueryInterface would do,
-      --m_refCount;  // and the Release behind it; at 0 it would delete again.
+      --m_refCount;  // and the Release after it; at 0 it would delete again.
       EXPECT_EQ(m_refCount, 1);
     }
   }

@@ -162,7 +162,7 @@ TEST(vltlinuxosStringResource, TheDatabaseIsLookedForAnewEachTime) {
 }
 
 TEST(vltlinuxosStringResource, StoredNamesCountUpToTheirLimit) {
-  // 259 bytes are read: what stands behind belongs to no name.
+  // 259 bytes are read: what follows belongs to no name.
   std::string deep = "/" + std::string(250, 'd') + "/";
   Database d("[KORComponents]\nA = \"A\"\n[A]\nFileName = \"" + deep +
              "1234567890\"\nKey = \"k\"\n");

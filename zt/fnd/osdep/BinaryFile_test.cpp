@@ -269,7 +269,7 @@ TEST(BinaryFile, ExactCountBeyondThirtyOneBitsThrowsAfterTheTransfer) {
     int fd = ::open((dir / "sparse").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600);
     const unsigned long n = 0x80000000ul;
     ASSERT_EQ(ftruncate(fd, static_cast<off_t>(n)), 0);
-    // Reads into pages that one small piece of memory stands behind would need as much; the zero
+    // Reads into pages that one small piece of memory backs would need as much; the zero
     // device takes them without.
     int null = ::open("/dev/null", O_WRONLY | O_CLOEXEC);
     void* zeros = mmap(nullptr, n, PROT_READ, MAP_PRIVATE, fd, 0);

@@ -35,7 +35,7 @@ TEST(CriticalSection, EnteredTwiceIsFreeAfterTwoLeaves) {
 
 TEST(CriticalSection, LeaveByAStrangerChangesNothing) {
   UnixCriticalSection section;
-  section.leave();  // nobody owns it
+  section.leave();  // no thread owns it
   section.enter();
   std::thread([&] {
     section.leave();

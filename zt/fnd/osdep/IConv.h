@@ -4,8 +4,8 @@ namespace zt::fnd::osdep {
 
 // Conversion by the platform's iconv, which cannot fail on bad text.
 //
-// Converts the range until input or room runs out and sets `destEnd`, which is the end of the
-// buffer on entry, to where the output stopped. Where iconv stops with input and room left,
+// Converts the range until input or space runs out and sets `destEnd`, which is the end of the
+// buffer on entry, to where the output stopped. Where iconv stops with input and space left,
 // whatever its reason, one unit of input (a byte, a wide character) becomes one "?". Nothing is
 // terminated. The wide side is named "UTF-32LE"; "" is the encoding of the host's C locale. Throws
 // InvalidLocale where iconv knows no such conversion, also for an empty range. Threads: any; each

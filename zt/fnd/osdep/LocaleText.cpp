@@ -48,7 +48,7 @@ bool IsAscii(wchar_t c) { return static_cast<uint32_t>(c) < 0x80; }
 bool IsTag(char) { return false; }
 bool IsTag(wchar_t c) { return static_cast<uint32_t>(c) >> 7 == 0xE0000 >> 7; }
 
-// Copies as far as there is room, with "?" in the place of what is not ASCII. Returns the end.
+// Copies as far as there is space, with "?" in the place of what is not ASCII. Returns the end.
 template <class In, class Out>
 Out* CopyAscii(const In* begin, const In* end, Out* dest, Out* destEnd, bool leaveOutTags) {
   for (; begin != end && dest != destEnd; ++begin) {
@@ -107,7 +107,7 @@ void WriteUtf8(uint32_t c, size_t n, char* dest) {
   *dest = static_cast<char>(kMark[n] | c);
 }
 
-// A character that has no room becomes a "?" too, and the next ones may have room again.
+// A character that has no space becomes a "?" too, and the next ones may have space again.
 char* ConvertUtf8(const wchar_t* begin, const wchar_t* end, char* dest, char* destEnd) {
   for (; begin != end && dest != destEnd; ++begin) {
     uint32_t c = static_cast<uint32_t>(*begin);
@@ -145,7 +145,7 @@ uint32_t CountOf(const In* begin, const In* end) {
   return begin ? NumericCast<uint32_t>(end - begin) : 0;
 }
 
-// Room for `required` characters and the terminator.
+// Space for `required` characters and the terminator.
 template <class Out>
 std::unique_ptr<Out[]> NewText(uint32_t required) {
   const SafeCount count = SafeCount::Add(required, 1);

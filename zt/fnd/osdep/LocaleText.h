@@ -12,12 +12,12 @@ namespace zt::fnd::osdep {
 // its place: bad text is never a failure. A null begin is the empty range. Throws InvalidLocale for
 // an unknown encoding, OutOfRange where a length passes 32 bits.
 
-// Upper bounds that need no look at the text: the byte count, and four bytes a character.
+// Upper bounds that need no scan of the text: the byte count, and four bytes a character.
 uint32_t GetAnsiToWideRequiredBufferLength(const char* begin, const char* end, const char* locale);
 uint32_t GetWideToAnsiRequiredBufferLength(const wchar_t* begin, const wchar_t* end,
                                            const char* locale);
 
-// Convert into the buffer [dest, destEnd) as far as there is room, without terminator; `destEnd`
+// Convert into the buffer [dest, destEnd) as far as there is space, without terminator; `destEnd`
 // then is where the output stopped. Return the count.
 uint32_t AnsiToWideNoAlloc(const char* begin, const char* end, const char* locale, wchar_t* dest,
                            wchar_t*& destEnd);

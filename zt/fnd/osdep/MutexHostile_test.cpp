@@ -1,4 +1,4 @@
-// Mutexes whose file, descriptor or memory somebody takes away.
+// Mutexes whose file, descriptor or memory another process takes away.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -36,7 +36,7 @@ using vlt::test::WriteBytes;
 
 // ---- the directory
 
-// The first to fail must not keep the old file locked: the second would wait for it for ever.
+// The first to fail must not keep the old file locked: the second would wait for it indefinitely.
 TEST(MutexHostile, FileInTheDirectorysPlaceFailsForEachProcess) {
   MutexPlace place;
   Signal ready, go, failed, end;

@@ -399,7 +399,7 @@ TEST(NamedEvent, EveryThreadMayUseAnyObject) {
   EXPECT_FALSE(pong.checkOnly());
 }
 
-// Each round opens and closes its event anew while the other side does the same.
+// Each round opens and closes its event again while the other side does the same.
 TEST(NamedEvent, PingPongBetweenProcessesLosesNothing) {
   EventPlace place;
   constexpr int kRounds = 500;

@@ -368,7 +368,7 @@ TEST(path, CreateAndResolveSymLink) {
   EXPECT_THROW(path::ResolveSymLink(Wide(dir / "file")), exception::InvalidArgument);
   EXPECT_THROW(path::ResolveSymLink(Wide(dir / "missing")), exception::InvalidArgument);
   EXPECT_THROW(path::ResolveSymLink(L"link"), exception::InvalidArgument);
-  // Links of the process file system tell no length.
+  // Links of the process file system have no length.
   EXPECT_EQ(PosixErrorOf([] { path::ResolveSymLink(L"/proc/self/exe"); }), EINVAL);
 }
 

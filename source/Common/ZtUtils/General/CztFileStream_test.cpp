@@ -76,7 +76,7 @@ TEST_F(CztFileStreamTest, AFailedInitKeepsNameAndFlags) {
   EXPECT_EQ(stream->Flush(), E_INVALIDARG);
   EXPECT_EQ(stream->SetSize(0), E_FAIL);
   dir.makeDir("no");
-  EXPECT_EQ(stream->SetSize(0), S_OK);  // opens anew by the name that was kept
+  EXPECT_EQ(stream->SetSize(0), S_OK);  // opens again by the name that was kept
   EXPECT_TRUE(Exists(dir / "no/file"));
 }
 
@@ -136,7 +136,7 @@ TEST_F(CztFileStreamTest, SeekFollowsTheSystem) {
   EXPECT_EQ(position, 3);
   EXPECT_EQ(stream->Seek(-4, ztSeekCurrent, &position), E_FAIL);
   EXPECT_EQ(stream->Seek(9, static_cast<ztSeekMode>(3), &position), S_OK);
-  EXPECT_EQ(position, 0);  // told, not done
+  EXPECT_EQ(position, 0);  // reported, not done
   EXPECT_EQ(Position(stream.get()), 3);
 }
 
@@ -288,7 +288,7 @@ TEST_F(CztFileStreamTest, WrittenSubStreamsReadBackWhereLongIsFourBytes) {
     EXPECT_EQ(ReadBytes(path), bytes);
   } else {
     EXPECT_EQ(ContentsOf(Open(path, Access::Both).get(), L"one"), "1");
-    EXPECT_EQ(ReadBytes(path), bytes);  // written anew at closing
+    EXPECT_EQ(ReadBytes(path), bytes);  // written again at closing
   }
 }
 

@@ -52,7 +52,7 @@ struct LogFile {
   std::string directory, name;
   int fd = -1;
   FileIdentity
-      identity;  // of the file behind the descriptor, which the host may close and use again
+      identity;  // of the file that the descriptor is for; the host may close and use again
   bool diskShort = false;
 };
 

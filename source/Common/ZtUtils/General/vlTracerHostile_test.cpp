@@ -1,4 +1,4 @@
-// The log where others stand in its way: what they put under its name, a reader that does not read.
+// The log where others are in its way: what they put under its name, a reader that does not read.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -74,7 +74,7 @@ std::string Emptied(int end) {
   return text;
 }
 
-// Standard error is a pipe that nobody empties: its writer stands there with the lock.
+// Standard error is a pipe that no one empties: its writer waits there with the lock.
 TEST(vlTracerHostile, TheEndDoesNotWaitForAWriteThatDoesNotEnd) {
   EXPECT_EQ(Child([] {
               int ends[2];

@@ -326,7 +326,7 @@ TEST(vlTracer, AFullSmallFileSystemStopsTheLog) {
   EXPECT_TRUE(lines.ends_with("  there is room again\n"));
 }
 
-// Without a limit nothing is looked at: lines that find no room are lost, and nobody hears of it.
+// Without a limit nothing is looked at: lines that find no space are lost, silently.
 TEST(vlTracer, AFullFileSystemWithoutALimitIsSilent) {
   TempDir dir;
   std::string logs = dir.makeDir("small");

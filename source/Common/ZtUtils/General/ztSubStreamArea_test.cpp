@@ -109,7 +109,7 @@ TEST(ztSubStreamArea, ASubStreamBeyond31BitsIsRefusedAndNothingIsLeft) {
   MemoryPtr stream = MemoryOf("data");
   Made(stream.get(), L"a", "1");
   CztComPtr<IztStream> large = Made(stream.get(), L"b");
-  // Never touched: the pages of a read-only block that nobody reads.
+  // Never touched: the pages of a read-only block that no one reads.
   auto block = std::unique_ptr<unsigned char, CztFreeBlock>(
       static_cast<unsigned char*>(calloc(0x80000000u, 1)));
   ASSERT_TRUE(block);
@@ -262,7 +262,7 @@ TEST_IN_CHILD(ztSubStreamArea, HostileLengthsTakeNoMemory) {
             Thrown::Stream);
 }
 
-// The area cut after each of its bytes, with an intact trailer behind the cut.
+// The area cut after each of its bytes, with an intact trailer after the cut.
 TEST(ztSubStreamArea, EveryTruncationPointThrows) {
   std::string nested = WithArea("n", {{L"deep", "d"}});
   for (Order order : {Order::Little, Order::Big}) {
@@ -284,7 +284,7 @@ TEST(ztSubStreamArea, EveryTruncationPointGivesItsException) {
     area.resize(area.size() - 24);
     ASSERT_EQ(area.size(), nameEnd + 4 + 3);
     for (size_t size = 0; size < area.size(); ++size) {
-      Thrown expected = Thrown::Stream;                     // no room for the header
+      Thrown expected = Thrown::Stream;                     // no space for the header
       if (size >= 13) expected = Thrown::EndOfStream;       // in the count
       if (size >= 17) expected = Thrown::Stream;            // a count beyond the bytes
       if (size >= nameEnd) expected = Thrown::EndOfStream;  // in the length of the data

@@ -1,4 +1,4 @@
-// Files that somebody has damaged, planted or keeps locked.
+// Files that another process has damaged, planted or keeps locked.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/file.h>
@@ -275,7 +275,7 @@ TEST(NamedEventHostile, StaleLockFilesLeadToAFreshSlot) {
       std::string(9, '\0'),
       std::string(9, '\xFF'),
       std::string(1, '\0') + Number(4000000000u) + Number(0),
-      std::string(1, '\0') + Number(1) + Number(0),  // somebody else's slot
+      std::string(1, '\0') + Number(1) + Number(0),  // another process's slot
       std::string(1, '\0') + Number(1) + Number(1),  // a free one
       std::string(1, '\0') + Number(1) + Number(127),
       std::string(1, '\0') + Number(1) + Number(128),
@@ -330,7 +330,7 @@ TEST(NamedEventHostile, JoinOfAnEventThatIsBeingClosedBeginsAnew) {
     ScopedFd other(::open(place.file("name").c_str(), O_RDWR | O_CLOEXEC));
     ASSERT_EQ(0, Flock(other.get(), LOCK_SH));
     std::thread letGo([&, opener = gettid()] {
-      EXPECT_TRUE(Eventually([&] { return Sleeps(opener); }));  // before it begins anew
+      EXPECT_TRUE(Eventually([&] { return Sleeps(opener); }));  // before it begins again
       other.reset();
     });
     EXPECT_TRUE(Open("name", kAutomatic, kSet)->check());
@@ -347,7 +347,7 @@ TEST(NamedEventHostile, JoinOfAKilledHoldersEventBeginsAnew) {
     ASSERT_TRUE(killed.good());
     sharer.reset(::open(place.file("name").c_str(), O_RDWR | O_CLOEXEC));
     ASSERT_EQ(0, Flock(sharer.get(), LOCK_SH));
-    killed.kill();  // the set is nobody's now, and an opener makes it anew
+    killed.kill();  // the set belongs to no process now, and an opener makes it again
   }
   std::thread letGo([&, opener = gettid()] {
     EXPECT_TRUE(Eventually([&] { return Sleeps(opener); }));

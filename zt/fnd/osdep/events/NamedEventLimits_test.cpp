@@ -1,4 +1,4 @@
-// Machines that have no room: no semaphores, a full or read-only place, no descriptors.
+// Machines that have no space: no semaphores, a full or read-only place, no descriptors.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sched.h>
@@ -320,7 +320,7 @@ TEST(NamedEventLimits, FullPlaceIsAnErrorThatLeavesNoFiles) {
   EXPECT_EQ(code, 0);
 }
 
-// The state file is there already; only the event's own file has no room.
+// The state file is there already; only the event's own file has no space.
 TEST(NamedEventLimits, FullPlaceBesideALivingSetIsENOLCK) {
   int code;
   SKIP_UNLESS(vlt::test::RunInOwnTmp(

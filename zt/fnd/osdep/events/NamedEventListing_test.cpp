@@ -1,4 +1,4 @@
-// What an onlooker sees of the events: "vltctl events", which stands beside this program.
+// What an onlooker sees of the events: "vltctl events", which is beside this program.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -166,7 +166,7 @@ TEST_F(NamedEventListing, WhatIsNoFileOfAnEventIsNotWaitedFor) {
   EXPECT_EQ(first.substr(0, first.find("  ")), "\\x1B[2J\\x0Aend");
 }
 
-// Calls of a trace that take a lock, change a file or a semaphore, or end somebody's wait.
+// Calls of a trace that take a lock, change a file or a semaphore, or end another process's wait.
 std::vector<std::string> Disturbances(const std::string& trace) {
   std::vector<std::string> found;
   std::istringstream lines(trace);

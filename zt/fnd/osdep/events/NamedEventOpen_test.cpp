@@ -1,4 +1,4 @@
-// Opening: which slot an event gets, and what stands in the files.
+// Opening: which slot an event gets, and what is in the files.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -163,7 +163,7 @@ TEST(NamedEventOpen, The129thEventGoesToSetTwo) {
   events[7].reset();
   EXPECT_EQ(ReadBytes(place.file("sem_1")).substr(18 + 70, 10),
             std::string("\0\0\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF", 10));
-  // The lowest set with room first.
+  // The lowest set with space first.
   auto again = Open("again");
   EXPECT_EQ((Slot{1, 7}), place.slotOf("again"));
   last.reset();
