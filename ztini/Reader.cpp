@@ -77,8 +77,10 @@ int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* fil
   if (result < 0) return result;
   Bytes bytes;
   const int32_t status = ReadRest(file, &bytes);
-  if (status == kIniReadFailed) ReadWholeLines(doc, std::move(bytes));
-  if (status < 0) return status;
+  if (status < 0) {
+    if (status == kIniReadFailed) ReadWholeLines(doc, std::move(bytes));
+    return status;
+  }
   const int32_t offset = TextOffset(bytes.block.get(), bytes.size < 4 ? bytes.size : 4);
   if (offset < 0) return offset;
   return ztini::IniReadText(doc, std::move(bytes.block), static_cast<size_t>(offset), bytes.size);

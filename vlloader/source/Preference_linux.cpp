@@ -78,8 +78,9 @@ std::optional<std::string> ReadItem(const std::string& file, const std::string& 
 }  // namespace
 
 std::optional<std::string> vlReadPreference(const std::string& domain, const std::string& key) {
+  const std::string file = "/" + domain + ".ini";
   for (const std::string& directory : ConfigDirectories()) {
-    if (auto value = ReadItem(directory + "/" + domain + ".ini", key)) return value;
+    if (auto value = ReadItem(directory + file, key)) return value;
   }
   return std::nullopt;
 }
