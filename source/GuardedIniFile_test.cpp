@@ -5,6 +5,7 @@
 
 #include "source/Common/vltFileSecurity.h"
 #include "source/Common/vltTestHook.h"
+#include "tests/support/ArmedHook.h"
 #include "tests/support/FailSystemCall.h"
 #include "tests/support/FailingHeap.h"
 #include "tests/support/InChild.h"
@@ -32,12 +33,6 @@ struct Place {
     return file + zt::fnd::AnsiString(vlrGetCurrentLocalTime()).c_str() + ".bad";
   }
 };
-
-void Arm(const char* point) {
-  vlt::hook::Faults faults;
-  faults.simulateMemoryAllocationFailure = true;
-  vlt::hook::Arm(point, faults);
-}
 
 TEST(GuardedIniFile, FileAndSidecarAreSavedTogether) {
   for (const GuardedIniKind& kind : {kBare, kPointed}) {
@@ -97,21 +92,23 @@ TEST(GuardedIniFile, AFailedSecondOpeningIsThrownAndLeavesNull) {
 }
 
 TEST(GuardedIniFile, OutOfMemoryIsAResultWithASignatureAndThrownWithout) {
-  Place place;
-  Arm("open");
-  EXPECT_EQ(place.open(kPointed), E_OUTOFMEMORY);
-  EXPECT_FALSE(place.ini);
-  EXPECT_EQ(place.open(kBare), S_OK);  // passes no point
+  ExpectInArmedChild("open", kFailedAllocation, [] {
+    Place place;
+    EXPECT_EQ(place.open(kPointed), E_OUTOFMEMORY);
+    EXPECT_FALSE(place.ini);
+    EXPECT_EQ(place.open(kBare), S_OK);  // passes no point
+  });
 }
 
 TEST(GuardedIniFile, TheSecondOpeningHasAPointOfItsOwn) {
-  Place place;
-  WriteBytes(place.file, "[s]\na=1\n");
-  Arm("retry");
-  EXPECT_EQ(place.open(kPointed), S_OK);
-  WriteBytes(place.sidecar, std::string(16, 'x'));
-  EXPECT_EQ(place.open(kPointed), E_OUTOFMEMORY);
-  EXPECT_FALSE(place.ini);
+  ExpectInArmedChild("retry", kFailedAllocation, [] {
+    Place place;
+    WriteBytes(place.file, "[s]\na=1\n");
+    EXPECT_EQ(place.open(kPointed), S_OK);
+    WriteBytes(place.sidecar, std::string(16, 'x'));
+    EXPECT_EQ(place.open(kPointed), E_OUTOFMEMORY);
+    EXPECT_FALSE(place.ini);
+  });
 }
 
 // Each point ends the process: what is on the disk then is what a crash leaves.
