@@ -208,9 +208,9 @@ VLT_EXPORT _vltAttributeType vltAttributeTypeFromString(const wchar_t* s);
 // "vltUnspecifiedType" for no type.
 VLT_EXPORT const wchar_t* vltAttributeTypeToString(_vltAttributeType t);
 VLT_EXPORT const wchar_t* vltAttributeTypeToString2(_vltAttributeType t);
-// 1 for "kor" and "programmatic", 2 for "spec" and "specification".
+// The client that a word names, 1 or 2; 0 for any other word (the words: vltVocabulary.cpp).
 VLT_EXPORT _vltClient vltClientFromString(const wchar_t* s);
-// "Programmatic" for 1, "Specification" for 2, else "Unknown".
+// The name of a client, which vltClientFromString takes back; "Unknown" for other numbers.
 VLT_EXPORT const wchar_t* vltClientToString(_vltClient c);
 // The type in source code, "i32[]"; "!!! BAD TYPE" for no type.
 VLT_EXPORT const wchar_t* vltAttributeTypeToVltTypeString(_vltAttributeType t);
