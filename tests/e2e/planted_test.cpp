@@ -13,10 +13,10 @@
 
 #include <cstring>
 #include <filesystem>
-#include <map>
 
 #include "tests/e2e/HostileInstallation.h"
 #include "tests/e2e/Promises.h"
+#include "tests/e2e/Secrets.h"
 #include "tests/support/TracedChild.h"
 
 namespace vlt::test {
@@ -25,7 +25,6 @@ namespace {
 namespace fs = std::filesystem;
 
 constexpr uid_t kAttacker = 65534, kVictim = 1234;
-constexpr char kSecretText[] = "HUSH-HUSH-4711";
 constexpr int kDeadlineSeconds = 20;
 
 // Exit code of the start: what did not work in it.
@@ -67,82 +66,6 @@ bool Contains(const std::string& path, const char* text) {
   return ReadBytes(path).find(text) != std::string::npos;
 }
 
-struct Stat {
-  mode_t mode;
-  uid_t owner;
-  bool operator==(const Stat&) const = default;
-};
-
-Stat StatOf(const std::string& path) {
-  struct stat info = {};
-  EXPECT_EQ(lstat(path.c_str(), &info), 0) << path;
-  return {info.st_mode, info.st_uid};
-}
-
-// A private file, and a private directory with a file in it.
-class Secrets {
- public:
-  explicit Secrets(uid_t owner) : m_file(m_dir / "secret"), m_private(m_dir.makeDir("private")) {
-    chmod(m_dir.path().c_str(), 0755);
-    // As every one of the files could be read: registration file, settings, jar, database.
-    m_bytes = Component("Secret", 0x5EC, std::string("Password = \"") + kSecretText + "\"\n") +
-              "[CookieSection]\nLastServerCookie = 4\nPassword = \"" + kSecretText +
-              "\"\n[STORAGE]\nPassword = \"" + kSecretText + "\"\n";
-    WriteBytes(m_file, m_bytes);
-    // As each of the directories could be read.
-    for (const char* bundle : {"/Last/Old.framework", "/Old.framework", "/Old.vle", ""}) {
-      fs::create_directories(m_private + bundle + "/Resources");
-      WriteBytes(m_private + bundle + "/Resources/Info.vlr", m_bytes);
-    }
-    for (const char* file : {"/Info.vlr", "/Flat.framework", "/Last/Flat.framework", "/vlt.vlr"}) {
-      WriteBytes(m_private + file, m_bytes);
-    }
-    WriteBytes(m_private + "/kept", m_bytes);
-    for (const std::string& path : {m_file, m_private, m_private + "/kept", m_private + "/Last"}) {
-      chmod(path.c_str(), fs::is_directory(path) ? 0700 : 0600);
-      EXPECT_EQ(chown(path.c_str(), owner, owner), 0);
-    }
-    m_before = picture();
-  }
-  const std::string& file() const { return m_file; }
-  const std::string& directory() const { return m_private; }
-  // Not there, where only the superuser could make it.
-  std::string missing() const { return m_private + "/made"; }
-
-  // Names, modes, owners and bytes of everything.
-  bool areAsTheyWere(std::string* difference) const {
-    auto now = picture();
-    for (const auto& [path, was] : m_before) {
-      if (!now.count(path)) {
-        *difference += " removed:" + path;
-      } else if (now.at(path) != was) {
-        *difference += " changed:" + path + " (" + now.at(path).substr(0, 12) + ")";
-      }
-    }
-    for (const auto& [path, is] : now) {
-      if (!m_before.count(path)) *difference += " made:" + path;
-    }
-    return now == m_before;
-  }
-
- private:
-  std::map<std::string, std::string> picture() const {
-    std::map<std::string, std::string> all;
-    for (const auto& entry : fs::recursive_directory_iterator(m_dir.path())) {
-      Stat stat = StatOf(entry.path());
-      char head[64];
-      snprintf(head, sizeof head, "%o %u ", stat.mode, stat.owner);
-      all[entry.path().string().substr(m_dir.path().size())] =
-          head + (entry.is_regular_file() ? ReadBytes(entry.path()) : "");
-    }
-    return all;
-  }
-
-  TempDir m_dir;
-  std::string m_file, m_private, m_bytes;
-  std::map<std::string, std::string> m_before;
-};
-
 enum class Kind {
   LinkToFile,
   DanglingLink,
@@ -182,15 +105,22 @@ class Planted : public testing::Test {
     m_missing = TracedChild::Missing();
   }
 
+  // Path of the place below the root of an installation that has run once, in a directory that all users
+  // can write.
+  static std::string openPlace(const std::string& root, const std::string& place) {
+    chmod(fs::path(root).parent_path().c_str(), 0755);
+    ExpectStart("ok");
+    std::string path = root + "/" + place;
+    fs::create_directories(fs::path(path).parent_path());
+    chmod(fs::path(path).parent_path().c_str(), 0777);
+    return path;
+  }
+
   // Plants at the place below the root, in a fresh installation that has run once, and starts.
   void attack(const std::string& place, Kind kind, uid_t victim) {
     HostileInstallation b;
     Secrets secrets(victim);
-    chmod(fs::path(b.root()).parent_path().c_str(), 0755);
-    ExpectStart("ok");
-    std::string path = b.root() + "/" + place;
-    fs::create_directories(fs::path(path).parent_path());
-    chmod(fs::path(path).parent_path().c_str(), 0777);
+    std::string path = openPlace(b.root(), place);
     std::error_code ignored;
     fs::remove_all(path, ignored);
     plant(path, kind, secrets);
@@ -376,11 +306,7 @@ TEST_F(Planted, LinksInTheMiddleOfAPath) {
     for (uid_t victim : {uid_t{0}, kVictim}) {
       HostileInstallation b;
       Secrets secrets(victim);
-      chmod(fs::path(b.root()).parent_path().c_str(), 0755);
-      ExpectStart("ok");
-      std::string path = b.root() + "/" + place;
-      fs::create_directories(fs::path(path).parent_path());
-      chmod(fs::path(path).parent_path().c_str(), 0777);
+      std::string path = openPlace(b.root(), place);
       chmod(fs::path(path).parent_path().parent_path().c_str(), 0777);
       plant(path, Kind::LinkInThePath, secrets);
       finish(b.root(), path, place, Kind::LinkInThePath, victim, secrets);
