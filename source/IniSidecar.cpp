@@ -22,11 +22,9 @@ namespace {
 constexpr mode_t kNewFileMode = 0666;
 
 // The digest, then whatever is too long goes.
-bool Overwrite(int fd, const Digest& digest, bool durable) {
-  struct stat info;
+bool Overwrite(int fd, off_t oldSize, const Digest& digest, bool durable) {
   if (!zt::posix::WriteAllAt(fd, digest.data(), kSizeBytes, 0)) return false;
-  if (fstat(fd, &info) != 0) return false;
-  if (info.st_size > kSizeBytes && RetryEintr([&] { return ftruncate(fd, kSizeBytes); }) != 0) {
+  if (oldSize > kSizeBytes && RetryEintr([&] { return ftruncate(fd, kSizeBytes); }) != 0) {
     return false;
   }
   return !durable || zt::posix::Sync(fd);
@@ -44,7 +42,7 @@ bool Create(const std::string& sidecar, const Digest& digest, bool durable) {
     zt::posix::SetSharedMode(fd.get(), kSharedMode);
     // Always synced: a rename that outlives its file's bytes in a power cut would leave a short
     // one.
-    if (!Overwrite(fd.get(), digest, true) ||
+    if (!Overwrite(fd.get(), 0, digest, true) ||
         zt::posix::Rename(temporary.c_str(), sidecar.c_str()) != 0) {
       zt::posix::Unlink(temporary.c_str());
       return false;
@@ -77,8 +75,8 @@ HRESULT Write(const std::string& sidecar, const Digest& digest, bool durable) {
   // A file that has a second name elsewhere is not overwritten: the new one takes this name from
   // it.
   if (info.st_nlink > 1) return Create(sidecar, digest, durable) ? S_OK : E_FAIL;
-  if (!Overwrite(fd.get(), digest, durable)) return E_FAIL;
-  zt::posix::SetSharedMode(fd.get(), kSharedMode);
+  if (!Overwrite(fd.get(), info.st_size, digest, durable)) return E_FAIL;
+  zt::posix::SetSharedMode(fd.get(), info, kSharedMode);
   return S_OK;
 }
 

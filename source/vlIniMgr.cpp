@@ -116,7 +116,6 @@ void CvlIniMgr::Initialize(unsigned char const* digest) {
   ScopedFd fd = OpenForReading(m_fileName);
   if (fd.valid()) {
     if (!ValidateFile(fd.get(), digest)) CleanupAndThrow(false);
-    fd.reset();
     // By the path, so that what a link leads to keeps its mode.
     zt::posix::SetSharedMode(m_fileName.c_str(), kSharedMode);
   } else if (errno == ENOENT) {
@@ -124,9 +123,10 @@ void CvlIniMgr::Initialize(unsigned char const* digest) {
     // missing descriptors for example, must not be begun again.
     CreateFile();
   }
-  int32_t status = InitializeIniBindings();
+  // What is read is what was validated, also if another file takes the name meanwhile.
+  int32_t status = fd.valid() ? readDocument(fd.get()) : InitializeIniBindings();
   if (status != 0) CleanupAndThrow(ConcernsTheContents(status));
-  m_known = stateOfFile();
+  m_known = fd.valid() ? StateOf(fd.get()) : stateOfFile();
 }
 
 void CvlIniMgr::CreateFile() {
@@ -171,12 +171,17 @@ bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest) const {
 }
 
 int32_t CvlIniMgr::InitializeIniBindings() {
+  ScopedFd fd = OpenForReading(m_fileName);
+  return readDocument(fd.get());
+}
+
+int32_t CvlIniMgr::readDocument(int fd) {
   IniStructForwardReferenceTag* fresh = IniNew(0);
   if (!fresh) return kIniOutOfMemory;
   IniSetReadOptions(fresh, kReadOptions);
   IniSetWriteOptions(fresh, kNoLineLimit, ' ', kWriteOptions);
   IniSetDurability(fresh, m_durability);
-  int32_t status = IniReadFromFile(fresh, m_fileName.c_str());
+  int32_t status = IniReadFromDescriptor(fresh, m_fileName.c_str(), fd);
   // What is held stays, whatever the status: the next save would otherwise replace the file by
   // less.
   if (m_ini && status != 0) {
@@ -226,10 +231,12 @@ void CvlIniMgr::SetAside(const String& fileName) {
 }
 
 CvlIniMgr::FileState CvlIniMgr::stateOfFile() const {
+  return StateOf(zt::posix::LookUp(m_fileName.c_str()).get());
+}
+
+CvlIniMgr::FileState CvlIniMgr::StateOf(int fd) {
   struct stat info;
-  ScopedFd file = zt::posix::LookUp(m_fileName.c_str());
-  if (!file || fstat(file.get(), &info) != 0) return FileState();
-  return IniFileStateOf(info);
+  return fd >= 0 && fstat(fd, &info) == 0 ? IniFileStateOf(info) : FileState();
 }
 
 // Whether others are kept out, at the latest from now on.

@@ -117,6 +117,7 @@ class CvlIniMgr {
   static void GetMD5Checksum(const unsigned char* data, unsigned long lengthBytes,
                              unsigned char* digest);
   int32_t InitializeIniBindings();
+  int32_t readDocument(int fd);
   [[noreturn]] void CleanupAndThrow(bool setAside);
   HRESULT DigestFile(IniSidecar::Digest* digest) const;
   HRESULT writeDocument(IniSidecar::Digest* digest, bool* isInPlace);
@@ -125,6 +126,7 @@ class CvlIniMgr {
 
   using FileState = IniFileState;
   FileState stateOfFile() const;
+  static FileState StateOf(int fd);
   // Whether that is the state in which this object last read or wrote the file.
   bool isUnchanged(const FileState& now) const { return now.isKnown() && now == m_known; }
 

@@ -2,7 +2,9 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 
+#include "zt/posix/Files.h"
 #include "zt/posix/ScopedFd.h"
 #include "ztini/Alloc.h"
 #include "ztini/ztini.h"
@@ -53,14 +55,19 @@ class FileReplacement {
   zt::posix::ScopedFd openSibling();
   int32_t openTemporary();
   int32_t openTarget();
-  void inheritFromTarget();
+  bool statTarget(struct stat* status) const;
+  void inheritFromTarget(const struct stat& own);
   int32_t closeFile();
+  int rename() const;
+  void removeWritten() const;
+  const char* targetName() const;
   const char* written() const { return m_temporary ? m_temporary.get() : m_target; }
   void discard();
 
   const char* m_target;
   int32_t m_options;
-  OwnedText m_temporary;  // null when the target itself is written
+  OwnedText m_temporary;                    // null when the target itself is written
+  std::optional<zt::posix::Entry> m_place;  // of the sibling; its name is in m_temporary
   zt::posix::ScopedFd m_file;
   bool m_pending = false;  // the written file is ours to remove
 };

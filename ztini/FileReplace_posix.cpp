@@ -72,7 +72,7 @@ FileReplacement::~FileReplacement() { discard(); }
 
 void FileReplacement::discard() {
   m_file.reset();
-  if (m_pending) zt::posix::Unlink(written());
+  if (m_pending) removeWritten();
   m_pending = false;
 }
 
@@ -111,22 +111,57 @@ ScopedFd FileReplacement::openUnique() {
 // A writer that was killed leaves the sibling, perhaps as another user's file that cannot be
 // opened; and nothing planted at its name may be written through.
 ScopedFd FileReplacement::openSibling() {
+  m_place.emplace(m_temporary.get());
+  if (!m_place->valid()) return ScopedFd();
+  ScopedFd fresh = zt::posix::CreateNew(*m_place, O_WRONLY, kNewFileMode);
+  if (fresh || errno != EEXIST) return fresh;
   if (zt::posix::MakeRoom(m_temporary.get()) != 0) return ScopedFd();
-  return zt::posix::CreateNew(m_temporary.get(), O_WRONLY, kNewFileMode);
+  return zt::posix::CreateNew(*m_place, O_WRONLY, kNewFileMode);
+}
+
+// The sibling's directory is the target's, and one descriptor of it serves the whole save.
+int FileReplacement::rename() const {
+  if (!m_place) return zt::posix::Rename(written(), m_target);
+  return zt::posix::RenameBeside(*m_place, targetName());
+}
+
+void FileReplacement::removeWritten() const {
+  if (m_place) {
+    zt::posix::Unlink(*m_place);
+  } else {
+    zt::posix::Unlink(written());
+  }
+}
+
+const char* FileReplacement::targetName() const {
+  const char* slash = strrchr(m_target, '/');
+  return slash ? slash + 1 : m_target;
+}
+
+bool FileReplacement::statTarget(struct stat* status) const {
+  if (m_place &&
+      fstatat(m_place->directory.get(), targetName(), status, AT_SYMLINK_NOFOLLOW) == 0 &&
+      !S_ISLNK(status->st_mode)) {
+    return true;
+  }
+  ScopedFd target = zt::posix::LookUp(m_target);
+  return target && fstat(target.get(), status) == 0;
 }
 
 int32_t FileReplacement::write(const char* bytes, size_t size) {
   return zt::posix::WriteAll(m_file.get(), bytes, size) ? 0 : kIniWriteFailed;
 }
 
-// Before the rename, so that a kill right after it leaves no file that others cannot write.
-void FileReplacement::inheritFromTarget() {
+// Before the rename, so that a kill right after it leaves no file that others cannot write. `own`
+// is the state of the written file.
+void FileReplacement::inheritFromTarget(const struct stat& own) {
   struct stat status;
-  ScopedFd target = zt::posix::LookUp(m_target);
-  if (!target || fstat(target.get(), &status) != 0) return;
+  if (!statTarget(&status)) return;
   const int fd = m_file.get();
-  if (fchmod(fd, status.st_mode & kModeBits) != 0 ||
-      fchown(fd, status.st_uid, status.st_gid) != 0) {
+  const mode_t mode = status.st_mode & kModeBits;
+  const bool isOwners = status.st_uid == own.st_uid && status.st_gid == own.st_gid;
+  if (((own.st_mode & kModeBits) != mode && fchmod(fd, mode) != 0) ||
+      (!isOwners && fchown(fd, status.st_uid, status.st_gid) != 0)) {
     // A writer who is not the owner keeps the file for itself; that is no reason not to save.
   }
 }
@@ -139,13 +174,16 @@ int32_t FileReplacement::closeFile() {
 
 int32_t FileReplacement::commit(IniDurability durability, IniFileState* state) {
   const bool synced = durability != IniDurability::None;
-  if (safely()) inheritFromTarget();
+  struct stat own;
+  bool known = fstat(m_file.get(), &own) == 0;
+  if (known && safely()) inheritFromTarget(own);
   int32_t status = synced && !zt::posix::Sync(m_file.get()) ? kIniWriteFailed : 0;
-  struct stat now;
-  if (state && fstat(m_file.get(), &now) == 0) *state = IniFileStateOf(now);
+  // Some file systems set the time of the last write when they write it back.
+  if (synced) known = fstat(m_file.get(), &own) == 0;
+  if (state && known) *state = IniFileStateOf(own);
   const int32_t closed = closeFile();
   if (status == 0) status = closed;
-  if (status == 0 && safely() && zt::posix::Rename(written(), m_target) != 0) {
+  if (status == 0 && safely() && rename() != 0) {
     status = kIniNotReplaceable;
   }
   if (status != 0) {

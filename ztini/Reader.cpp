@@ -1,9 +1,14 @@
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
+#include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <utility>
 
+#include "zt/posix/Files.h"
+#include "zt/posix/Transfer.h"
 #include "ztini/ByteOrderMark.h"
 #include "ztini/Document.h"
 #include "ztini/OpenFile.h"
@@ -25,7 +30,7 @@ int32_t TextOffset(const char* bytes, size_t read) {
   return 0;
 }
 
-// All that is left of a stream, in one block with a byte to spare.
+// What was read, in one block with a byte to spare.
 struct Bytes {
   ztini::OwnedText block;
   size_t size = 0;
@@ -35,24 +40,50 @@ constexpr size_t kLeastBlock = 4096;
 constexpr size_t kMostBytes = static_cast<size_t>(ztini::kLargestFileBytes);
 
 // How many bytes to ask for first: one more than the file has, so that its end is seen at once.
-size_t SizeHint(FILE* file) {
+size_t SizeHint(int fd) {
   struct stat status;
-  if (fstat(fileno(file), &status) != 0 || !S_ISREG(status.st_mode)) return kLeastBlock;
+  if (fstat(fd, &status) != 0 || !S_ISREG(status.st_mode)) return kLeastBlock;
   if (status.st_size < 0 || status.st_size > ztini::kLargestFileBytes) return kLeastBlock;
   return static_cast<size_t>(status.st_size) + 1;
 }
 
-int32_t ReadRest(FILE* file, Bytes* bytes) {
-  size_t capacity = SizeHint(file);
+// The rest of a stream, from where it is.
+struct StreamSource {
+  FILE* file;
+  size_t sizeHint() const { return SizeHint(fileno(file)); }
+  bool read(char* to, size_t wanted, size_t, size_t* got) const {
+    *got = ztini::ReadBytes(to, wanted, file);
+    return !ferror(file);
+  }
+};
+
+// The whole of what a descriptor leads to, wherever its position is.
+struct FileSource {
+  int fd;
+  size_t hint;
+  size_t sizeHint() const { return hint; }
+  bool read(char* to, size_t wanted, size_t offset, size_t* got) const {
+    errno = 0;
+    *got = zt::posix::MoveAll(wanted, [&](size_t done, size_t rest) {
+      return pread(fd, to + done, rest, static_cast<off_t>(offset + done));
+    });
+    return *got == wanted || errno == 0;
+  }
+};
+
+template <class Source>
+int32_t ReadAll(const Source& source, Bytes* bytes) {
+  size_t capacity = source.sizeHint();
   for (;;) {
     void* block = ztini::Reallocate(bytes->block.get(), capacity + 1);
     if (!block) return kIniOutOfMemory;
     (void)bytes->block.release();
     bytes->block.reset(static_cast<char*>(block));
     const size_t wanted = capacity - bytes->size;
-    const size_t got = ztini::ReadBytes(bytes->block.get() + bytes->size, wanted, file);
+    size_t got = 0;
+    const bool good = source.read(bytes->block.get() + bytes->size, wanted, bytes->size, &got);
     bytes->size += got;
-    if (ferror(file)) return kIniReadFailed;
+    if (!good) return kIniReadFailed;
     if (got < wanted) return 0;
     // It grows while it is read.
     if (bytes->size > kMostBytes) return kIniReadFailed;
@@ -69,14 +100,10 @@ void ReadWholeLines(IniStructForwardReferenceTag* doc, Bytes bytes) {
   ztini::IniReadText(doc, std::move(bytes.block), static_cast<size_t>(offset), bytes.size);
 }
 
-}  // namespace
-
-int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* file) {
-  if (!doc || !file) return 0;
-  const int result = fseek(file, 0, SEEK_SET);
-  if (result < 0) return result;
+template <class Source>
+int32_t ReadDocument(IniStructForwardReferenceTag* doc, const Source& source) {
   Bytes bytes;
-  const int32_t status = ReadRest(file, &bytes);
+  const int32_t status = ReadAll(source, &bytes);
   if (status < 0) {
     if (status == kIniReadFailed) ReadWholeLines(doc, std::move(bytes));
     return status;
@@ -86,21 +113,35 @@ int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* fil
   return ztini::IniReadText(doc, std::move(bytes.block), static_cast<size_t>(offset), bytes.size);
 }
 
-int32_t IniReadFromFile(IniStructForwardReferenceTag* doc, const char* path) {
+}  // namespace
+
+int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* file) {
+  if (!doc || !file) return 0;
+  const int result = fseek(file, 0, SEEK_SET);
+  return result < 0 ? result : ReadDocument(doc, StreamSource{file});
+}
+
+int32_t IniReadFromDescriptor(IniStructForwardReferenceTag* doc, const char* path, int fd) {
+  struct stat status;
   if (!doc) return 0;
-  ztini::Stream file = path ? ztini::OpenForReading(path) : nullptr;
-  if (!file) return kIniCannotOpen;
-  // The whole is asked for at once; a buffer would only be copied through.
-  setvbuf(file.get(), nullptr, _IONBF, 0);
+  if (!path || fstat(fd, &status) != 0) return kIniCannotOpen;
+  const bool regular = S_ISREG(status.st_mode);
+  if (regular && status.st_size > ztini::kLargestFileBytes) return kIniCannotOpen;
   ztini::OwnedText name(ztini_StrDup(path));
   if (!name) return kIniOutOfMemory;
-  struct stat status;
-  const bool known = fstat(fileno(file.get()), &status) == 0;
-  const int32_t result = ztini_IniReadFromFileHelper(doc, file.get());
+  const size_t hint = regular ? static_cast<size_t>(status.st_size) + 1 : kLeastBlock;
+  const int32_t result = ReadDocument(doc, FileSource{fd, hint});
   if (result < 0) return result;
   doc->fileName = std::move(name);
-  doc->fileTimestamp = known ? status.st_mtime : 0;
+  doc->fileTimestamp = status.st_mtime;
   return result;
+}
+
+int32_t IniReadFromFile(IniStructForwardReferenceTag* doc, const char* path) {
+  if (!doc) return 0;
+  zt::posix::ScopedFd fd;
+  if (path) fd = zt::posix::OpenExisting(path, O_RDONLY, zt::posix::Kind::FileOrDirectory);
+  return fd ? IniReadFromDescriptor(doc, path, fd.get()) : kIniCannotOpen;
 }
 
 int32_t IniGetFileTimestamp(const char* path, int64_t* seconds) {

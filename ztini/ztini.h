@@ -102,6 +102,10 @@ IniDurability IniSetDurability(IniStructForwardReferenceTag* doc, IniDurability 
 // was. A named pipe, a device, a file of more than 256 MiB and a symbolic link that another user
 // may have planted (zt/posix/Files.h) cannot be opened; the call never waits.
 int32_t IniReadFromFile(IniStructForwardReferenceTag* doc, const char* path);
+
+// The same from a descriptor that the caller has opened for reading and keeps; from the file's beginning,
+// and the descriptor's position stays. The path is the document's file from then on.
+int32_t IniReadFromDescriptor(IniStructForwardReferenceTag* doc, const char* path, int fd);
 int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* file);
 int32_t IniRead(IniStructForwardReferenceTag* doc, IniLineInputFunction input, void* context);
 

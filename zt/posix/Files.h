@@ -71,6 +71,11 @@ struct Entry {
   const char* name;
 };
 
+// As CreateNew, unlink(2), and rename(2) to a name in the same directory.
+ScopedFd CreateNew(const Entry& entry, int flags, mode_t mode);
+int Unlink(const Entry& entry);
+int RenameBeside(const Entry& from, const char* name);
+
 // As rename(2), unlink(2) and link(2).
 int Rename(const char* from, const char* to);
 int Unlink(const char* path);
@@ -88,9 +93,12 @@ int MakeRoom(const char* path);
 
 // ---- Modes
 
-// Gives the file or directory of the descriptor (O_PATH will do) these bits by rule 3: EPERM or
-// EMLINK for what the rule excludes.
+// Gives the file or directory of the descriptor (O_PATH will do) these bits by rule 3, unless it has them:
+// EPERM or EMLINK for what the rule excludes.
 int SetSharedMode(int fd, mode_t mode);
+
+// The same where fstat() of the descriptor is known.
+int SetSharedMode(int fd, const struct stat& info, mode_t mode);
 
 // The same for a path. A link in the last place is left alone and counts as done.
 int SetSharedMode(const char* path, mode_t mode);

@@ -23,6 +23,7 @@ constexpr int kMostLinks = 40;  // as the kernel's own limit
 constexpr int kMostRaces = 100;
 constexpr int kMostSetAside = 10000;
 constexpr int kFirstFreeDescriptor = 3;
+constexpr mode_t kAllModeBits = 07777;
 constexpr int kAlways = O_CLOEXEC | O_NOCTTY | O_NONBLOCK;
 
 struct Free {
@@ -182,7 +183,10 @@ ScopedFd OpenExisting(const char* path, int flags, Kind kind, LastLink link) {
 
 ScopedFd CreateNew(const char* path, int flags, mode_t mode) {
   Entry entry(path);
-  if (!entry.valid()) return ScopedFd();
+  return entry.valid() ? CreateNew(entry, flags, mode) : ScopedFd();
+}
+
+ScopedFd CreateNew(const Entry& entry, int flags, mode_t mode) {
   return AboveStandardStreams(OpenAt(entry.directory.get(), entry.name,
                                      flags | kAlways | O_CREAT | O_EXCL | O_NOFOLLOW, mode));
 }
@@ -240,8 +244,16 @@ int Rename(const char* from, const char* to) {
 
 int Unlink(const char* path) {
   Entry entry(path);
-  if (!entry.valid()) return -1;
+  return entry.valid() ? Unlink(entry) : -1;
+}
+
+int Unlink(const Entry& entry) {
   return RetryEintr([&] { return unlinkat(entry.directory.get(), entry.name, 0); });
+}
+
+int RenameBeside(const Entry& from, const char* name) {
+  int directory = from.directory.get();
+  return RetryEintr([&] { return renameat(directory, from.name, directory, name); });
 }
 
 int Link(const char* existing, const char* path) {
@@ -311,9 +323,7 @@ int ChangeMode(int fd, mode_t mode) {
   return directory ? RetryEintr([&] { return fchmod(directory.get(), mode); }) : -1;
 }
 
-int SetSharedMode(int fd, mode_t mode) {
-  struct stat info;
-  if (fstat(fd, &info) != 0) return -1;
+int SetSharedMode(int fd, const struct stat& info, mode_t mode) {
   if (S_ISREG(info.st_mode) && info.st_nlink > 1) {
     errno = EMLINK;
     return -1;
@@ -322,7 +332,12 @@ int SetSharedMode(int fd, mode_t mode) {
     errno = EPERM;
     return -1;
   }
-  return ChangeMode(fd, mode);
+  return (info.st_mode & kAllModeBits) == mode ? 0 : ChangeMode(fd, mode);
+}
+
+int SetSharedMode(int fd, mode_t mode) {
+  struct stat info;
+  return fstat(fd, &info) == 0 ? SetSharedMode(fd, info, mode) : -1;
 }
 
 int SetSharedMode(const char* path, mode_t mode) {
@@ -330,7 +345,7 @@ int SetSharedMode(const char* path, mode_t mode) {
   struct stat info;
   if (!found || fstat(found.get(), &info) != 0) return -1;
   if (S_ISLNK(info.st_mode)) return 0;
-  return SetSharedMode(found.get(), mode);
+  return SetSharedMode(found.get(), info, mode);
 }
 
 bool IsPassing(int error) {

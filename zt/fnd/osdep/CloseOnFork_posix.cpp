@@ -95,9 +95,8 @@ CloseOnForkFd CloseOnForkFd::OpenShared(const AnsiString& path, InTheWay way) {
   RegisterForkHandlers();
   for (;;) {
     unsigned forks = ForksSoFar();
-    ScopedFd fd(CreateSharedUnixFile(path, way));
     CloseOnForkFd result;
-    result.m_file = FileIdentity::Of(fd.get());
+    ScopedFd fd(CreateSharedUnixFile(path, way, &result.m_file));
     result.m_serial = MarkIfNoFork(fd.get(), result.m_file, forks);
     // The copy in the child is of an open file that is never locked; this process takes another.
     if (result.m_serial == 0) continue;

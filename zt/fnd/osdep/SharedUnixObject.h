@@ -33,20 +33,10 @@ enum class InTheWay {
   MovedAside,  // it becomes NAME.bad where this user may rename it
 };
 
-// Opens the file for reading and writing, made if missing, and gives it mode 0666; one that belongs
-// to another user stays as it is. Returns the descriptor, close-on-exec, which the caller owns.
-// Throws PosixError: refused access (EACCES) after three attempts a millisecond apart, EPERM for
-// any failure to set the mode; ELOOP, EISDIR, ENXIO or EMLINK, with the path in the message, for
-// what is in the way and stays.
-int CreateSharedUnixFile(const AnsiString& path, InTheWay way = InTheWay::Refused);
-
 // Which file a descriptor belongs to.
 struct FileIdentity {
   dev_t device = 0;
   ino_t inode = 0;
-
-  // Throws PosixError.
-  static FileIdentity Of(int fd);
 
   // False if the descriptor leads to another file by now, or is closed. True when the system cannot
   // be asked. Safe in a signal handler; keeps errno.
@@ -55,5 +45,13 @@ struct FileIdentity {
   // False if the path names another file by now, or none. True when it cannot be asked.
   bool isNamedBy(const AnsiString& path) const;
 };
+
+// Opens the file for reading and writing, made if missing, and gives it mode 0666; one that belongs
+// to another user stays as it is. *identity, if asked for, is the file's. Returns the descriptor, close-on-exec, which the caller owns.
+// Throws PosixError: refused access (EACCES) after three attempts a millisecond apart, EPERM for
+// any failure to set the mode; ELOOP, EISDIR, ENXIO or EMLINK, with the path in the message, for
+// what is in the way and stays.
+int CreateSharedUnixFile(const AnsiString& path, InTheWay way = InTheWay::Refused,
+                         FileIdentity* identity = nullptr);
 
 }  // namespace zt::fnd::osdep

@@ -59,16 +59,21 @@ bool IsInTheWay(int error) {
   ZT_RAISE(PosixError(message.c_str(), error));
 }
 
+struct OpenedFile {
+  ScopedFd fd;
+  struct stat info;
+};
+
 // Opens through the moments in which another user's file has not got its mode yet.
-ScopedFd OpenSharedPatiently(const AnsiString& path, InTheWay way) {
+OpenedFile OpenSharedPatiently(const AnsiString& path, InTheWay way) {
   for (int refused = 0, cleared = 0;;) {
-    ScopedFd fd =
+    OpenedFile file;
+    file.fd =
         zt::posix::OpenOrCreate(path.c_str(), O_RDWR, kFileMode, zt::posix::LastLink::Refused);
-    struct stat info;
-    if (fd && ::fstat(fd.get(), &info) != 0) ZT_RAISE(PosixError());
-    if (fd && info.st_nlink <= 1) return fd;
-    int error = fd ? EMLINK : errno;
-    fd.reset();
+    if (file.fd && ::fstat(file.fd.get(), &file.info) != 0) ZT_RAISE(PosixError());
+    if (file.fd && file.info.st_nlink <= 1) return file;
+    int error = file.fd ? EMLINK : errno;
+    file.fd.reset();
     if (IsInTheWay(error)) {
       bool gone = way == InTheWay::MovedAside && ++cleared < kClearings &&
                   (zt::posix::MoveAside(path.c_str()) == 0 || errno == ENOENT);
@@ -78,6 +83,15 @@ ScopedFd OpenSharedPatiently(const AnsiString& path, InTheWay way) {
     } else {
       Sleep(1);
     }
+  }
+}
+
+void ShareDirectory(const ScopedFd& found) {
+  struct stat info;
+  if (!found || ::fstat(found.get(), &info) != 0) ZT_RAISE(PosixError());
+  if (!S_ISDIR(info.st_mode)) ZT_RAISE(PosixError(ENOTDIR));
+  if (zt::posix::SetSharedMode(found.get(), info, kDirMode) != 0 && errno != EPERM) {
+    ZT_RAISE(PosixError());
   }
 }
 
@@ -97,40 +111,29 @@ AnsiString BuildSharedUnixFilePath(const String& dirName, const String& fileName
 }
 
 void CreateSharedUnixDir(const String& path) {
-  MakeDirectories(path);
-  if (!path::IsDirectory(path.c_str())) ZT_RAISE(PosixError(ENOTDIR));
   // With a slash at the end a link would be followed after all.
   String::size_type last = path.find_last_not_of(L'/');
   AnsiString narrow(last == String::npos ? path : path.substr(0, last + 1));
+  // Nearly every call finds the directory there.
   ScopedFd found = zt::posix::LookUp(narrow.c_str(), false);
-  struct stat info;
-  if (!found || ::fstat(found.get(), &info) != 0) ZT_RAISE(PosixError());
-  if (!S_ISDIR(info.st_mode)) ZT_RAISE(PosixError(ENOTDIR));
-  if (zt::posix::SetSharedMode(found.get(), kDirMode) != 0 && errno != EPERM) {
-    ZT_RAISE(PosixError());
+  if (!found) {
+    MakeDirectories(path);
+    if (!path::IsDirectory(path.c_str())) ZT_RAISE(PosixError(ENOTDIR));
+    found = zt::posix::LookUp(narrow.c_str(), false);
   }
+  ShareDirectory(found);
 }
 
-int CreateSharedUnixFile(const AnsiString& path, InTheWay way) {
+int CreateSharedUnixFile(const AnsiString& path, InTheWay way, FileIdentity* identity) {
   for (int vanished = 0;; ++vanished) {
-    ScopedFd fd = OpenSharedPatiently(path, way);
-    struct stat info;
-    if (::fstat(fd.get(), &info) != 0) ZT_RAISE(PosixError());
-    if (info.st_nlink == 0 && vanished < kVanishedOpens) continue;  // removed just now
-    if (zt::posix::SetSharedMode(fd.get(), kFileMode) != 0 && errno != EPERM) {
+    OpenedFile file = OpenSharedPatiently(path, way);
+    if (file.info.st_nlink == 0 && vanished < kVanishedOpens) continue;  // removed just now
+    if (zt::posix::SetSharedMode(file.fd.get(), file.info, kFileMode) != 0 && errno != EPERM) {
       ZT_RAISE(PosixError(EPERM));
     }
-    return fd.release();
+    if (identity) *identity = {file.info.st_dev, file.info.st_ino};
+    return file.fd.release();
   }
-}
-
-FileIdentity FileIdentity::Of(int fd) {
-  struct stat info;
-  if (::fstat(fd, &info) != 0) ZT_RAISE(PosixError());
-  FileIdentity identity;
-  identity.device = info.st_dev;
-  identity.inode = info.st_ino;
-  return identity;
 }
 
 bool FileIdentity::isBehind(int fd) const noexcept {

@@ -326,8 +326,8 @@ TEST(SharedUnixObject, RefusedModeIsAcceptedForFilesAndDirectories) {
 TEST(SharedUnixObject, IdentityTellsWhetherThePathStillNamesTheFile) {
   TempDir dir;
   AnsiString path((dir / "f").c_str());
-  ScopedFd fd(CreateSharedUnixFile(path));
-  FileIdentity identity = FileIdentity::Of(fd.get());
+  FileIdentity identity;
+  ScopedFd fd(CreateSharedUnixFile(path, InTheWay::Refused, &identity));
   EXPECT_TRUE(identity.isNamedBy(path));
   ASSERT_EQ(unlink(path.c_str()), 0);
   EXPECT_FALSE(identity.isNamedBy(path));
