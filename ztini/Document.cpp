@@ -59,6 +59,7 @@ int32_t IniSetWriteOptions(IniStructForwardReferenceTag* doc, int32_t maxLineLen
   doc->maxLineLength = maxLineLength;
   doc->breakCharacter = breakCharacter;
   doc->writeOptions = bits;
+  doc->rendering.reset();
   return 1;
 }
 
@@ -174,6 +175,7 @@ bool IniAppendEntry(IniSection* section, IniEntry* entry) {
     return false;
   }
   section->items.append(entry);
+  section->markChanged();
   return true;
 }
 
@@ -186,5 +188,6 @@ void IniEmptyDocument(IniStructForwardReferenceTag* doc) {
   doc->sections.keepFirst(0);
   doc->arena.clear();
   doc->text.reset();
+  doc->rendering.reset();
   doc->settled = false;
 }

@@ -9,6 +9,7 @@
 #include "ztini/Handle.h"
 #include "ztini/NameFold.h"
 #include "ztini/NameList.h"
+#include "ztini/TextBuffer.h"
 #include "ztini/ztini.h"
 
 // The records that the engine's handles refer to. Callers outside see the functions of ztini.h
@@ -57,6 +58,14 @@ struct IniSection : ztini::NameNode {
   ztini::NameList items;  // of IniEntry
   int32_t flags = 0;
   int32_t line = -1;  // of the header; -1: not from a file
+
+  // Where the header and the items are in the document's last rendering; size 0 where they have changed
+  // since, or were in none.
+  uint32_t renderedAt = 0;
+  uint32_t renderedSize = 0;
+
+  // For each change of a name, an item or a value.
+  void markChanged() { renderedSize = 0; }
 };
 
 struct IniStructForwardReferenceTag {
@@ -82,6 +91,9 @@ struct IniStructForwardReferenceTag {
   // this generation.
   bool settled = false;
   uint32_t settledFold = 0;
+  // The text of the last save, from which the next one copies the sections that have not changed; empty
+  // where there was none under these write options.
+  ztini::TextBuffer rendering;
 
   ztini::NameMatch match() const {
     return caseSensitive ? ztini::NameMatch::Exact : ztini::NameMatch::IgnoreCase;

@@ -139,6 +139,7 @@ int32_t IniRenameSection(Doc* doc, const char* section, const char* name) {
   if (!copy) return kIniOutOfMemory;
   doc->settled = false;
   doc->sections.rename(found, copy);
+  found->markChanged();
   return 1;
 }
 
@@ -156,6 +157,7 @@ int32_t IniRemoveItem(Doc* doc, const char* section, const char* item) {
   IniEntry* found = parent ? IniFindEntry(parent, doc->caseSensitive, item) : nullptr;
   if (!found) return 0;
   parent->items.remove(found);
+  parent->markChanged();
   IniDisposeEntry(found);
   return 1;
 }

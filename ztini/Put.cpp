@@ -22,6 +22,7 @@ bool PutIntoSection(Doc* doc, IniSection* section, const char* item, const char*
     if (!copy) return false;
     IniReplaceValue(known, copy);
     known->quote = IniQuoteField(quote);
+    section->markChanged();
     return true;
   }
   IniEntry* entry = IniNewEntry(item, value, 0);

@@ -8,7 +8,8 @@
 namespace ztini {
 
 // Appends the bytes of the document's file: the byte order mark, if asked for, and the text. 0,
-// kIniOutOfMemory, or what IniWrite returns.
+// kIniOutOfMemory, or what IniWrite returns. Of an empty buffer: whoever makes the result the
+// document's `rendering` has the next one made from it.
 int32_t IniRender(IniStructForwardReferenceTag* doc, TextBuffer* text);
 
 }  // namespace ztini

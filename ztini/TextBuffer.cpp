@@ -6,10 +6,12 @@
 
 namespace ztini {
 
-bool TextBuffer::fit(size_t length) {
+constexpr size_t kLeastBlock = 256;
+
+// Makes space for a text of this length, in a block of `capacity` bytes where it needs a new one.
+bool TextBuffer::fit(size_t length, size_t capacity) {
   if (length < m_capacity) return true;
   if (length > SIZE_MAX / 2) return false;
-  const size_t capacity = length * 2 < 256 ? 256 : length * 2;
   void* text = Reallocate(m_text.get(), capacity);
   if (!text) return false;
   // realloc has taken the old block.
@@ -20,7 +22,10 @@ bool TextBuffer::fit(size_t length) {
 }
 
 TextBuffer& TextBuffer::appendGrowing(std::string_view text) {
-  m_good = m_good && text.size() <= SIZE_MAX - m_length && fit(m_length + text.size());
+  m_good = m_good && text.size() <= SIZE_MAX - m_length;
+  if (!m_good) return *this;
+  const size_t length = m_length + text.size();
+  m_good = fit(length, length < kLeastBlock / 2 ? kLeastBlock : length * 2);
   if (!m_good) return *this;
   memcpy(m_text.get() + m_length, text.data(), text.size());
   m_length += text.size();

@@ -3,6 +3,7 @@
 #include <cstddef>
 #include <cstring>
 #include <string_view>
+#include <utility>
 
 #include "ztini/Alloc.h"
 
@@ -12,6 +13,18 @@ namespace ztini {
 // end.
 class TextBuffer {
  public:
+  TextBuffer() = default;
+  TextBuffer(TextBuffer&& other) noexcept { *this = std::move(other); }
+  TextBuffer& operator=(TextBuffer&& other) noexcept {
+    m_text = std::move(other.m_text);
+    m_length = std::exchange(other.m_length, 0);
+    m_capacity = std::exchange(other.m_capacity, 0);
+    m_good = std::exchange(other.m_good, true);
+    return *this;
+  }
+
+  // Empty again, without its block.
+  void reset() { *this = TextBuffer(); }
   void clear() {
     m_length = 0;
     if (m_text) m_text.get()[0] = 0;
@@ -27,16 +40,22 @@ class TextBuffer {
   // "%04d": four digits, more from 10000.
   TextBuffer& appendNumber(unsigned number);
 
+  // Makes space for a text of so many bytes in all. Without memory for it, appending tries again.
+  void reserve(size_t sizeBytes) {
+    if (m_good) fit(sizeBytes, sizeBytes + 1);
+  }
+
   // False once memory ran out.
   bool ok() const { return m_good; }
 
   // Terminated; valid until the next append.
   const char* text() const { return m_text ? m_text.get() : ""; }
   size_t size() const { return m_length; }
+  std::string_view view() const { return {text(), m_length}; }
 
  private:
   TextBuffer& appendGrowing(std::string_view text);
-  bool fit(size_t length);
+  bool fit(size_t length, size_t capacity);
 
   OwnedText m_text;
   size_t m_length = 0;

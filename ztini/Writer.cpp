@@ -22,35 +22,84 @@ class FunctionLines {
   }
   int32_t end() { return m_line.ok() ? m_output(m_stream, m_line.text()) : kIniOutOfMemory; }
 
+  // Each section is made of its items.
+  bool reuse(IniSection*) { return false; }
+  void note(IniSection*) {}
+
  private:
   IniLineOutputFunction m_output;
   void* m_stream;
   ztini::TextBuffer m_line;
 };
 
-// Puts lines together in one text, as they are in a file.
+// Puts lines together in one text, as they are in a file. Sections that have not changed since the
+// rendering before are copied from there, neighbours at once: a save of a long document that differs in
+// few places costs little more than its bytes.
 class TextInMemory {
  public:
-  TextInMemory(ztini::TextBuffer* text, bool marked) : m_text(text), m_isFirst(!marked) {}
+  TextInMemory(ztini::TextBuffer* text, std::string_view before, bool marked)
+      : m_text(text), m_before(before), m_isFirst(!marked) {}
 
-  ztini::TextBuffer& begin() { return m_isFirst ? m_first : *m_text; }
+  ztini::TextBuffer& begin() {
+    copyReused();
+    return m_isFirst ? m_first : *m_text;
+  }
   int32_t end() {
     if (m_isFirst) endFirst();
     m_text->append('\n');
     return m_text->ok() && m_first.ok() ? 0 : kIniOutOfMemory;
   }
 
+  // Takes the section from the rendering before, if it is there.
+  bool reuse(IniSection* section) {
+    m_sectionAt = size();
+    m_sectionIsFirst = m_isFirst;
+    if (m_isFirst || m_before.empty() || !section->renderedSize) return false;
+    const size_t at = section->renderedAt;
+    if (at != m_reusedEnd) {
+      copyReused();
+      m_reusedBegin = m_reusedEnd = at;
+    }
+    m_reusedEnd += section->renderedSize;
+    section->renderedAt = static_cast<uint32_t>(m_sectionAt);
+    return true;
+  }
+
+  // For the next rendering: the section ends here. The file's first line is made with what is before it.
+  void note(IniSection* section) {
+    const bool fits = size() <= UINT32_MAX && !m_sectionIsFirst;
+    section->renderedAt = fits ? static_cast<uint32_t>(m_sectionAt) : 0;
+    section->renderedSize = fits ? static_cast<uint32_t>(size() - m_sectionAt) : 0;
+  }
+
+  int32_t finish() {
+    copyReused();
+    return m_text->ok() ? 0 : kIniOutOfMemory;
+  }
+
  private:
+  size_t size() const { return m_text->size() + (m_reusedEnd - m_reusedBegin); }
+
+  void copyReused() {
+    if (m_reusedEnd == m_reusedBegin) return;
+    m_text->append(m_before.substr(m_reusedBegin, m_reusedEnd - m_reusedBegin));
+    m_reusedBegin = m_reusedEnd;
+  }
+
   // A name may begin with the bytes of a byte order mark. As the first bytes of the file they would be
   // lost or get the whole file refused, so an empty line goes before them.
   void endFirst() {
     m_isFirst = false;
     const char* line = m_first.text();
     if (ztini::MarkIn(line, strnlen(line, 4)) != ztini::ByteOrderMark::kNone) m_text->append('\n');
-    m_text->append({line, m_first.size()});
+    m_text->append(m_first.view());
   }
 
   ztini::TextBuffer* m_text;
+  std::string_view m_before;
+  size_t m_reusedBegin = 0, m_reusedEnd = 0;  // of m_before, not yet copied
+  size_t m_sectionAt = 0;
+  bool m_sectionIsFirst = false;
   ztini::TextBuffer m_first;
   bool m_isFirst;
 };
@@ -67,7 +116,8 @@ class DocumentWriter {
   int32_t write();
 
  private:
-  int32_t writeSection(const IniSection* section, const IniSection* previous);
+  int32_t writeSection(IniSection* section, const IniSection* previous);
+  int32_t writeHeaderAndItems(IniSection* section);
   int32_t writeHeader(const IniSection* section);
   int32_t writeEmptyLine();
   int32_t writeItem(const IniEntry* entry);
@@ -86,7 +136,7 @@ int32_t DocumentWriter<Lines>::write() {
   const IniSection* previous = nullptr;
   ztini::NameNode** sections = m_doc->sections.nodes();
   for (int32_t n = 0; n < m_doc->sections.count(); ++n) {
-    auto* section = static_cast<const IniSection*>(sections[n]);
+    auto* section = static_cast<IniSection*>(sections[n]);
     const int32_t status = writeSection(section, previous);
     if (status < 0) return status;
     previous = section;
@@ -95,18 +145,25 @@ int32_t DocumentWriter<Lines>::write() {
 }
 
 template <class Lines>
-int32_t DocumentWriter<Lines>::writeSection(const IniSection* section, const IniSection* previous) {
+int32_t DocumentWriter<Lines>::writeSection(IniSection* section, const IniSection* previous) {
   const bool fromFile = IniSectionWasReadFromFile(section);
   const bool isNull = IniSectionIsNull(section);
   int32_t status = 0;
   if (tight() && !fromFile && IniSectionWasReadFromFile(previous)) status = writeEmptyLine();
-  if (status >= 0 && !isNull) status = writeHeader(section);
+  if (status >= 0 && !m_lines.reuse(section)) status = writeHeaderAndItems(section);
+  if (status < 0) return status;
+  return tight() && (fromFile || isNull) ? 0 : writeEmptyLine();
+}
+
+template <class Lines>
+int32_t DocumentWriter<Lines>::writeHeaderAndItems(IniSection* section) {
+  int32_t status = IniSectionIsNull(section) ? 0 : writeHeader(section);
   ztini::NameNode** items = section->items.nodes();
   for (int32_t n = 0; status >= 0 && n < section->items.count(); ++n) {
     status = writeItem(static_cast<const IniEntry*>(items[n]));
   }
-  if (status < 0) return status;
-  return tight() && (fromFile || isNull) ? 0 : writeEmptyLine();
+  if (status >= 0) m_lines.note(section);
+  return status;
 }
 
 template <class Lines>
@@ -190,11 +247,13 @@ int32_t IniFileOutputFunc(void* file, const char* line) {
 
 int32_t ztini::IniRender(IniStructForwardReferenceTag* doc, TextBuffer* text) {
   const bool marked = (doc->writeOptions & kIniWriteMark) != 0;
+  // The sections' places in it are overwritten one by one, so it serves once only.
+  const TextBuffer before = std::move(doc->rendering);
+  text->reserve(before.size() + before.size() / 64);
   if (marked) text->append(kUtf8Mark);
-  TextInMemory lines(text, marked);
+  TextInMemory lines(text, before.view(), marked);
   const int32_t status = DocumentWriter(doc, &lines).write();
-  if (status < 0) return status;
-  return text->ok() ? 0 : kIniOutOfMemory;
+  return status < 0 ? status : lines.finish();
 }
 
 int32_t ztini_IniWriteToFileHelper(IniStructForwardReferenceTag* doc, FILE* file) {

@@ -1,0 +1,105 @@
+// A save copies the sections that have not changed from the save before. The judge is the way that
+// makes each line anew: IniWrite.
+#include <gtest/gtest.h>
+
+#include <cstdlib>
+#include <random>
+#include <string>
+
+#include "tests/support/FailingAlloc.h"
+#include "tests/support/TempDir.h"
+#include "tests/support/TestDocument.h"
+
+namespace {
+
+using vlt::test::ReadBytes;
+using vlt::test::TempDir;
+using ztini::test::Document;
+using ztini::test::FailFromAllocation;
+using ztini::test::NewDocument;
+using ztini::test::WrittenText;
+
+class RandomEdits {
+ public:
+  explicit RandomEdits(unsigned seed) : m_random(seed) {
+    IniSetWriteOptions(m_doc.get(), -1, ' ', options());
+    IniSetReadOptions(m_doc.get(), kIniReadDoubleQuotes | kIniReadSingleQuotes);
+  }
+
+  // One to four edits; afterwards the file holds what IniWrite makes.
+  void step() {
+    for (int n = below(4); n >= 0; --n) edit();
+    std::string expected = WrittenText(m_doc);
+    ASSERT_EQ(IniWriteToFile(m_doc.get(), m_path.c_str()), 0);
+    ASSERT_EQ(ReadBytes(m_path), expected);
+    if (below(2) && IniIsSettled(m_doc.get())) IniTakeAsRead(m_doc.get());
+  }
+
+ private:
+  int below(int limit) { return static_cast<int>(m_random() % static_cast<unsigned>(limit)); }
+  std::string name(const char* head) { return head + std::to_string(below(8)); }
+  int32_t options() {
+    return kIniWriteSafely | (below(2) ? kIniWriteSpaces : 0) | (below(2) ? kIniWriteTight : 0);
+  }
+
+  void edit() {
+    const std::string section = below(12) ? name("s") : kIniNullSectionName, item = name("i");
+    switch (below(16)) {
+      case 0:
+        IniRemoveItem(m_doc.get(), section.c_str(), item.c_str());
+        break;
+      case 1:
+        IniRemoveSection(m_doc.get(), section.c_str());
+        break;
+      case 2:
+        IniRenameSection(m_doc.get(), section.c_str(), name("r").c_str());
+        break;
+      case 3:
+        IniSetWriteOptions(m_doc.get(), below(2) ? -1 : 40, ' ', options());
+        break;
+      case 4:
+        IniReadFromFile(m_doc.get(), m_path.c_str());
+        break;
+      case 5:
+        EXPECT_LT(IniWriteToFile(m_doc.get(), (m_dir / "no/file.ini").c_str()), 0);
+        break;
+      case 6: {
+        FailFromAllocation failing(below(6));
+        IniWriteToFile(m_doc.get(), m_path.c_str());
+        break;
+      }
+      default:
+        IniPut(m_doc.get(), section.c_str(), item.c_str(),
+               std::string(static_cast<size_t>(below(60)), 'v').c_str(), below(2) ? '"' : 0);
+    }
+  }
+
+  std::mt19937 m_random;
+  TempDir m_dir;
+  std::string m_path = m_dir / "a.ini";
+  Document m_doc = NewDocument();
+};
+
+TEST(WriterReuse, EverySaveAfterRandomEditsIsWhatTheLinesAre) {
+  const char* full = getenv("VLT_FULL");
+  const unsigned seeds = full && *full == '1' ? 5000 : 200;
+  for (unsigned seed = 0; seed < seeds && !HasFatalFailure(); ++seed) {
+    SCOPED_TRACE(seed);
+    RandomEdits edits(seed);
+    for (int step = 0; step < 40 && !HasFatalFailure(); ++step) edits.step();
+  }
+}
+
+TEST(WriterReuse, ASaveThatFailedLeavesNothingToCopyFrom) {
+  TempDir dir;
+  const std::string path = dir / "a.ini";
+  Document doc = NewDocument();
+  for (const char* section : {"a", "b", "c"}) IniPut(doc.get(), section, "x", "1", 0);
+  ASSERT_EQ(IniWriteToFile(doc.get(), path.c_str()), 0);
+  IniPut(doc.get(), "b", "x", "longer than before", 0);
+  EXPECT_LT(IniWriteToFile(doc.get(), (dir / "no/a.ini").c_str()), 0);
+  ASSERT_EQ(IniWriteToFile(doc.get(), path.c_str()), 0);
+  EXPECT_EQ(ReadBytes(path), "[a]\nx = 1\n\n[b]\nx = longer than before\n\n[c]\nx = 1\n\n");
+}
+
+}  // namespace
