@@ -8,10 +8,53 @@ namespace {
 
 using Doc = IniStructForwardReferenceTag;
 
+// A name that is looked for. Most names of a section differ in their lengths or last characters, which
+// are compared before the whole.
+class WantedName {
+ public:
+  WantedName(const ztini::NameFold& fold, const char* name)
+      : m_fold(fold), m_name(name), m_begin(ztini::SkipSpace(fold, name)) {
+    m_length = strlen(m_begin);
+    while (m_length > 0 && fold.isSpace(m_begin[m_length - 1])) --m_length;
+  }
+
+  bool is(const IniEntry* entry) const {
+    return !differsAtAGlance(entry) && ztini::CompareNames(m_fold, entry->name, m_name) == 0;
+  }
+
+ private:
+  // Of a name with white space at its ends, which another locale may have seen as letters, nothing is said.
+  bool differsAtAGlance(const IniEntry* entry) const {
+    const size_t length = entry->knownNameLength;
+    if (length == 0 || m_length == 0) return false;
+    const char last = entry->name[length - 1];
+    if (m_fold.isSpace(*entry->name) || m_fold.isSpace(last)) return false;
+    return length != m_length || m_fold.upper(last) != m_fold.upper(m_begin[m_length - 1]);
+  }
+
+  const ztini::NameFold& m_fold;
+  const char* m_name;
+  const char* m_begin;  // without the white space around it
+  size_t m_length;
+};
+
+// The fold is fresh.
+IniEntry* FindInSection(Doc* doc, IniSection* section, const char* item) {
+  if (!item || doc->caseSensitive || !section->items.isScanned()) {
+    return static_cast<IniEntry*>(section->items.find(item, doc->match(), ztini::FoldState::Fresh));
+  }
+  const WantedName wanted(doc->fold, item);
+  ztini::NameNode** node = section->items.nodes();
+  for (ztini::NameNode** end = node + section->items.count(); node < end; ++node) {
+    auto* entry = static_cast<IniEntry*>(*node);
+    if (wanted.is(entry)) return entry;
+  }
+  return nullptr;
+}
+
 IniEntry* FindItem(Doc* doc, const char* section, const char* item) {
   IniSection* found = IniFindSection(doc, section);
-  if (!found) return nullptr;
-  return static_cast<IniEntry*>(found->items.find(item, doc->match(), ztini::FoldState::Fresh));
+  return found ? FindInSection(doc, found, item) : nullptr;
 }
 
 IniEntry* NthItem(Doc* doc, const char* section, int32_t n) {

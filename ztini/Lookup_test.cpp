@@ -2,12 +2,14 @@
 
 #include <clocale>
 #include <cstdlib>
+#include <random>
 #include <string>
 
 #include "tests/support/Child.h"
 #include "tests/support/FailingAlloc.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/TestDocument.h"
+#include "ztini/NameCompare.h"
 
 namespace {
 
@@ -283,6 +285,63 @@ TEST(Lookup, ALocaleChangeBetweenCallsIsFollowed) {
                      "\xe4"
                      "51"),
             "51");
+}
+
+// ---- The quick look-up beside the plain comparison of one name after the other
+
+std::string RandomName(std::mt19937* random) {
+  constexpr char kCharacters[] = "aAbBzZ{@[`09_ \t\xa0\xe4\xc4";
+  std::string name;
+  for (unsigned n = (*random)() % 6 + 1; n > 0; --n) {
+    name += kCharacters[(*random)() % (sizeof kCharacters - 1)];
+  }
+  return name;
+}
+
+// What the comparison of names says, in order.
+const IniEntry* PlainFind(const Document& doc, const std::string& name) {
+  doc->fold.refresh();
+  const IniSection* section = doc->section(1);
+  for (int32_t n = 1; n <= section->items.count(); ++n) {
+    const IniEntry* entry = section->item(n);
+    if (ztini::CompareNames(doc->fold, entry->name, name.c_str()) == 0) return entry;
+  }
+  return nullptr;
+}
+
+void CompareRandomLookups(unsigned seeds, const char* put, const char* look) {
+  int found = 0;
+  for (unsigned seed = 0; seed < seeds; ++seed) {
+    std::mt19937 random(seed);
+    Document doc = NewDocument();
+    setlocale(LC_CTYPE, put);
+    IniPut(doc.get(), "s", "first", "v", 0);
+    for (unsigned n = random() % 30; n > 0; --n) {
+      IniPut(doc.get(), "s", RandomName(&random).c_str(), std::to_string(n).c_str(), 0);
+    }
+    setlocale(LC_CTYPE, look);
+    for (int n = 0; n < 100; ++n) {
+      const std::string name = RandomName(&random);
+      const IniEntry* expected = PlainFind(doc, name);
+      const char* value = nullptr;
+      ASSERT_EQ(IniGet(doc.get(), "s", name.c_str(), &value), expected ? 1 : 0) << seed << name;
+      ASSERT_EQ(value, expected ? expected->value : nullptr) << seed << name;
+      found += expected != nullptr;
+    }
+  }
+  EXPECT_GT(found, 0);
+}
+
+TEST(Lookup, RandomNamesAreFoundAsTheyCompare) { CompareRandomLookups(500, "C", "C"); }
+
+TEST(Lookup, RandomNamesAreFoundAsTheyCompareInEveryPairOfLocales) {
+  vlt::test::TempDir dir;
+  if (!SetLatin1(dir)) GTEST_SKIP() << "no 8-bit locale can be made here";
+  const std::string latin1 = setlocale(LC_CTYPE, nullptr);
+  CompareRandomLookups(300, latin1.c_str(), latin1.c_str());
+  CompareRandomLookups(300, latin1.c_str(), "C");
+  CompareRandomLookups(300, "C", latin1.c_str());
+  setlocale(LC_CTYPE, "C");
 }
 
 }  // namespace

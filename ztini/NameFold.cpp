@@ -32,9 +32,12 @@ void NameFold::refresh() {
 }
 
 void NameFold::take() {
+  m_foldsAsciiOnly = true;
   for (int c = 0; c < 256; ++c) {
     m_upper[c] = LocaleFold::upper(static_cast<char>(c));
     m_space[c] = LocaleFold::isSpace(static_cast<char>(c));
+    const int plain = c >= 'a' && c <= 'z' ? c - 'a' + 'A' : c;
+    m_foldsAsciiOnly = m_foldsAsciiOnly && m_upper[c] == plain;
   }
 }
 

@@ -20,6 +20,9 @@ class NameFold {
   // Grows by 1 whenever the tables changed.
   uint32_t generation() const { return m_generation; }
 
+  // True if upper() changes a to z only, into A to Z: in nearly every locale.
+  bool foldsAsciiOnly() const { return m_foldsAsciiOnly; }
+
   unsigned char upper(char c) const { return m_upper[static_cast<unsigned char>(c)]; }
   bool isSpace(char c) const { return m_space[static_cast<unsigned char>(c)]; }
 
@@ -30,6 +33,7 @@ class NameFold {
 
   unsigned char m_upper[256];
   bool m_space[256];
+  bool m_foldsAsciiOnly = false;
   char m_localeName[64];  // "" while unknown: then the tables are compared each time
   uint32_t m_generation = 0;
 };

@@ -1,5 +1,6 @@
 #include "ztini/NameHash.h"
 
+#include <bit>
 #include <chrono>
 #include <cstring>
 #include <exception>
@@ -69,28 +70,41 @@ struct SipState {
   }
 };
 
+// Eight characters of which those from a to z become A to Z. Each byte is compared on its own: without
+// its top bit, no sum carries into the next.
+uint64_t UpperAscii(uint64_t word) {
+  constexpr uint64_t kOnes = 0x0101010101010101u, kTops = 0x80 * kOnes;
+  const uint64_t low = word & ~kTops;
+  const uint64_t fromA = low + (0x80 - 'a') * kOnes, pastZ = low + (0x7f - 'z') * kOnes;
+  return word ^ ((fromA & ~pastZ & ~word & kTops) >> 2);
+}
+
+// Up to eight characters, folded, the first one in the lowest byte.
+uint64_t FoldedWord(const NameFold& fold, const char* text, size_t length) {
+  uint64_t word = 0;
+  if (fold.foldsAsciiOnly() && std::endian::native == std::endian::little) {
+    memcpy(&word, text, length);
+    return UpperAscii(word);
+  }
+  for (size_t i = 0; i < length; ++i) word |= static_cast<uint64_t>(fold.upper(text[i])) << 8 * i;
+  return word;
+}
+
 }  // namespace
 
 uint64_t HashName(const NameFold& fold, const char* name) {
   static const Key key = DrawKey();
   const Range range = Trimmed(fold, name);
+  const size_t length = static_cast<size_t>(range.end - range.begin);
   SipState state(key);
-  uint64_t word = 0;
-  int shift = 0;
-  for (const char* p = range.begin; p < range.end; ++p) {
-    word |= static_cast<uint64_t>(fold.upper(*p)) << shift;
-    shift += 8;
-    if (shift == 64) {
-      state.take(word);
-      word = 0;
-      shift = 0;
-    }
-  }
-  state.take(word | static_cast<uint64_t>(range.end - range.begin) << 56);
+  const char* at = range.begin;
+  for (size_t left = length / 8; left > 0; --left, at += 8) state.take(FoldedWord(fold, at, 8));
+  state.take(FoldedWord(fold, at, length % 8) | static_cast<uint64_t>(length) << 56);
   return state.finish();
 }
 
 bool SameFoldedName(const NameFold& fold, const char* left, const char* right) {
+  if (strcmp(left, right) == 0) return true;
   const Range l = Trimmed(fold, left), r = Trimmed(fold, right);
   if (l.end - l.begin != r.end - r.begin) return false;
   for (const char *p = l.begin, *q = r.begin; p < l.end; ++p, ++q) {

@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include <cctype>
 #include <set>
 #include <string>
 
@@ -24,6 +25,26 @@ TEST(NameHash, EqualNamesHashEqually) {
   for (const auto& row : rows) {
     EXPECT_EQ(HashName(fold, row.left), HashName(fold, row.right)) << row.left;
     EXPECT_TRUE(SameFoldedName(fold, row.left, row.right)) << row.left;
+  }
+}
+
+// Eight characters are folded at a time.
+TEST(NameHash, EveryCharacterAtEveryPlaceHashesAsItFolds) {
+  NameFold fold;
+  for (int place = 0; place < 17; ++place) {
+    for (int c = 1; c < 256; ++c) {
+      if (isspace(c) || isspace(c ^ 0x20) || c == 0x20)
+        continue;  // not a part of the name at its ends
+      std::string name(17, '\x80'), upper = name;
+      name[static_cast<size_t>(place)] = static_cast<char>(c);
+      upper[static_cast<size_t>(place)] = static_cast<char>(fold.upper(static_cast<char>(c)));
+      EXPECT_EQ(HashName(fold, name.c_str()), HashName(fold, upper.c_str())) << c;
+      std::string other = upper;
+      other[static_cast<size_t>(place)] ^= 0x20;
+      bool same = fold.upper(other[static_cast<size_t>(place)]) ==
+                  static_cast<unsigned char>(upper[static_cast<size_t>(place)]);
+      EXPECT_EQ(HashName(fold, other.c_str()) == HashName(fold, upper.c_str()), same) << c;
+    }
   }
 }
 

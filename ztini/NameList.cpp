@@ -9,12 +9,9 @@
 namespace ztini {
 namespace {
 
-// Below this a scan is as quick as the hash, and most sections have fewer items.
-constexpr int32_t kIndexFrom = 16;
-
 bool Matches(const NameFold& fold, NameMatch match, const char* stored, const char* name) {
-  return match == NameMatch::Exact ? strcmp(stored, name) == 0
-                                   : CompareNames(fold, stored, name) == 0;
+  if (strcmp(stored, name) == 0) return true;
+  return match == NameMatch::IgnoreCase && CompareNames(fold, stored, name) == 0;
 }
 
 }  // namespace

@@ -46,6 +46,9 @@ class NameList {
   bool seek(const char* name, NameMatch match, NameNode** found,
             FoldState fold = FoldState::Unknown);
 
+  // Whether find() compares the names one by one.
+  bool isScanned() const { return !m_index && count() < kIndexFrom; }
+
   // 1-based position of a record of the list.
   int32_t positionOf(const NameNode* node) const;
 
@@ -67,6 +70,9 @@ class NameList {
 
  private:
   enum class Way { Scan, Index, OutOfMemory };
+
+  // Below this a scan is as quick as the hash, and most sections have fewer items.
+  static constexpr int32_t kIndexFrom = 16;
 
   Way wayToFind(FoldState fold);
   bool indexIsCurrent() const { return m_index && m_index->generation() == m_fold->generation(); }
