@@ -7,6 +7,10 @@
 
 #include "zt/fnd/Exception.h"
 
+#ifdef __SSE2__
+#include <emmintrin.h>
+#endif
+
 namespace zt::fnd {
 namespace {
 
@@ -68,11 +72,32 @@ const unsigned char* DecodeSequence(const unsigned char* s, const unsigned char*
   return s;
 }
 
+inline bool IsContinuation(unsigned char byte) { return (byte & 0xC0u) == 0x80; }
+
 inline const unsigned char* DecodeOne(const unsigned char* s, const unsigned char* end,
                                       uint32_t& value) {
-  if (*s >= 0x80) return DecodeSequence(s, end, value);
-  value = *s;
-  return s + 1;
+  const uint32_t lead = *s;
+  if (lead < 0x80) {
+    value = lead;
+    return s + 1;
+  }
+  // Two to four bytes are nearly all of what is not ASCII; what is wrong with them, if anything, is
+  // found by the rules.
+  if (lead - 0xC2u < 0xE0u - 0xC2u && end - s >= 2 && IsContinuation(s[1])) {
+    value = (lead & 0x1Fu) << 6 | (s[1] & 0x3Fu);
+    return s + 2;
+  }
+  if (lead - 0xE1u < 0xF0u - 0xE1u && end - s >= 3 && IsContinuation(s[1]) &&
+      IsContinuation(s[2])) {
+    value = (lead & 0x0Fu) << 12 | (s[1] & 0x3Fu) << 6 | (s[2] & 0x3Fu);
+    return s + 3;
+  }
+  if (lead - 0xF0u < 0xF8u - 0xF0u && end - s >= 4 && IsContinuation(s[1]) &&
+      IsContinuation(s[2]) && IsContinuation(s[3]) && (lead != 0xF0 || s[1] >= 0x90)) {
+    value = (lead & 0x07u) << 18 | (s[1] & 0x3Fu) << 12 | (s[2] & 0x3Fu) << 6 | (s[3] & 0x3Fu);
+    return s + 4;
+  }
+  return DecodeSequence(s, end, value);
 }
 
 // Most text is ASCII, and most of that in long runs: bytes at a time of which none has its top bit set.
@@ -83,6 +108,23 @@ inline bool StartsWithAsciiRun(const unsigned char* s, const unsigned char* end)
   uint64_t words[kRun / sizeof(uint64_t)];
   memcpy(words, s, sizeof words);
   return ((words[0] | words[1]) & 0x8080808080808080u) == 0;
+}
+
+// Writes a run, as StartsWithAsciiRun has found it. Compilers make a move a byte of a loop here.
+inline void WidenAsciiRun(const unsigned char* s, wchar_t* out) {
+#ifdef __SSE2__
+  static_assert(sizeof(wchar_t) == 4 && kRun == 16);
+  const __m128i zero = _mm_setzero_si128();
+  const __m128i bytes = _mm_loadu_si128(reinterpret_cast<const __m128i*>(s));
+  const __m128i low = _mm_unpacklo_epi8(bytes, zero), high = _mm_unpackhi_epi8(bytes, zero);
+  auto* to = reinterpret_cast<__m128i*>(out);
+  _mm_storeu_si128(to, _mm_unpacklo_epi16(low, zero));
+  _mm_storeu_si128(to + 1, _mm_unpackhi_epi16(low, zero));
+  _mm_storeu_si128(to + 2, _mm_unpacklo_epi16(high, zero));
+  _mm_storeu_si128(to + 3, _mm_unpackhi_epi16(high, zero));
+#else
+  for (ptrdiff_t i = 0; i < kRun; ++i) out[i] = s[i];
+#endif
 }
 
 bool IsEmpty(const unsigned char* begin, const unsigned char* end) {
@@ -117,13 +159,16 @@ uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* 
   uint32_t value;
   while (s != end && out != destEnd) {
     if (destEnd - out >= kRun && StartsWithAsciiRun(s, end)) {
-      for (ptrdiff_t i = 0; i < kRun; ++i) out[i] = s[i];
+      WidenAsciiRun(s, out);
       s += kRun;
       out += kRun;
-    } else {
+      continue;
+    }
+    // No run begins here, nor before the next character that is not ASCII or the end is near.
+    do {
       s = DecodeOne(s, end, value);
       *out++ = static_cast<wchar_t>(value);
-    }
+    } while (value < 0x80 && s != end && out != destEnd);
   }
   if (static_cast<uint64_t>(out - dest) > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
   begin = s;

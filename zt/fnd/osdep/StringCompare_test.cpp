@@ -4,7 +4,10 @@
 
 #include <climits>
 #include <clocale>
+#include <cwctype>
 
+#include "tests/support/CompiledLocales.h"
+#include "tests/support/InChild.h"
 #include "tests/support/ScopedLocale.h"
 #include "zt/fnd/Exception.h"
 
@@ -26,6 +29,26 @@ int ExactRanges(const C (&a)[A], const C (&b)[B]) {
 
 const char* const kNull = nullptr;
 const wchar_t* const kWideNull = nullptr;
+
+int Sign(int number) { return (number > 0) - (number < 0); }
+
+// The rule as it is: the locale's upper-case characters compare. The two cases of an ASCII letter have a
+// quicker way, which must not be taken where a locale folds i to another letter.
+int PlainComparison(wchar_t a, wchar_t b) {
+  return static_cast<int>(towupper(static_cast<wint_t>(a))) -
+         static_cast<int>(towupper(static_cast<wint_t>(b)));
+}
+
+bool PairsFoldAsTheLocaleSays() {
+  for (wchar_t a = 1; a < 0x180; ++a) {
+    for (wchar_t b = 1; b < 0x180; ++b) {
+      if (Sign(StringCaseCompare(&a, &a + 1, &b, &b + 1)) == Sign(PlainComparison(a, b))) continue;
+      ADD_FAILURE() << std::hex << "0x" << int{a} << " 0x" << int{b};
+      return false;
+    }
+  }
+  return true;
+}
 
 }  // namespace
 
@@ -121,5 +144,18 @@ TEST(StringCompare, DifferenceBeyond32BitsRaises) {
     const char* const end = reinterpret_cast<const char*>(0x10000 + 0x80000000ull);
     EXPECT_THROW(StringCaseCompare(begin, end, begin, begin), exception::OutOfRange);
     EXPECT_THROW(StringExactCompare(begin, end, begin, begin), exception::OutOfRange);
+  }
+}
+
+TEST(StringCompare, EveryPairOfCharactersFoldsAsTheLocaleSays) {
+  vlt::test::CompiledLocales locales;
+  locales.make("tr_TR", "UTF-8");
+  locales.make("tr_TR", "ISO-8859-9");
+  for (const char* name : {"C", "C.UTF-8", "tr_TR.UTF-8", "tr_TR.ISO-8859-9"}) {
+    SCOPED_TRACE(name);
+    vlt::test::ExpectInChild([&] {
+      ASSERT_TRUE(locales.use(name));
+      EXPECT_TRUE(PairsFoldAsTheLocaleSays());
+    });
   }
 }
