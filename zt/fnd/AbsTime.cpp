@@ -1,3 +1,6 @@
+// The arithmetic of times is that of the 128-bit fixed-point value: 64 bits of seconds, 64 of their
+// fraction. Every conversion has the same three steps: move the epoch, multiply by the units of a
+// second, round. A step that leaves the range is seen by the sign, as the value wraps at 128 bits.
 #include "zt/fnd/AbsTime.h"
 
 #include <algorithm>
@@ -18,6 +21,7 @@ void SetStatus(int32_t* status, int32_t error) {
   if (status && *status == tSSTimeValue::kNoError) *status = error;
 }
 
+// Both kinds have whole factors, so that no conversion divides by a rounded one.
 struct UnitFactor {
   tTimeUnit unit;
   int64_t factor;
@@ -40,6 +44,7 @@ constexpr UnitFactor kUnitFactors[] = {
 // Whether the magnitude, truncated, goes up by one.
 bool RoundsAway(tSSTimeValue::tRoundMethod method, const Value& magnitude, bool negative) {
   const uint64_t fraction = magnitude.fractionBits();
+  // The sign is known to the caller only: the magnitude is what is rounded.
   switch (method) {
     case tSSTimeValue::kRoundNearest:
       return fraction > kHalf || (fraction == kHalf && magnitude.IsOdd());
@@ -56,6 +61,7 @@ bool RoundsAway(tSSTimeValue::tRoundMethod method, const Value& magnitude, bool 
 
 void tSSTimeValue::_CorrectUnits(tUnitConversion conversion, tTimeUnit unit, tValue& value,
                                  int32_t* status) {
+  // Not in the table: dividing by 1 would cost a long division.
   if (unit == nZTSS100::kTimeUnitSecond) return;
   const UnitFactor* const end = std::end(kUnitFactors);
   const UnitFactor* const row = std::find_if(std::begin(kUnitFactors), end,
@@ -80,6 +86,7 @@ void tSSTimeValue::_RoundAndCheckFit(tRoundMethod method, const tValue& maximum,
   const bool away = RoundsAway(method, value, negative);
   value &= tValue(0xFFFFFFFF, 0xFFFFFFFF, 0, 0);
   if (away) value += tValue(1);
+  // Rounding the largest magnitude up carries into the sign bit.
   const bool passed = !negative && value.IsNegative();
   if (negative) value.Negate();
   if (passed || value > maximum || value < minimum) SetStatus(status, kDoesNotFit);
@@ -103,6 +110,8 @@ int64_t Limit(bool negative) {
 int64_t CountSince(Value value, int64_t offset, tTimeUnit unit, bool round) {
   const bool wasNegative = value.IsNegative();
   value += Value(static_cast<long long>(offset));
+  // Two numbers of one sign whose sum has the other: it has wrapped. Numbers of different signs
+  // cannot.
   if (wasNegative == (offset < 0) && value.IsNegative() != wasNegative) return Limit(wasNegative);
   const bool negative = value.IsNegative();
   int32_t status = tSSTimeValue::kNoError;
@@ -128,6 +137,7 @@ int64_t AbsTime::getSeconds() const noexcept {
   Value whole = m_value;
   tSSTimeValue::_RoundAndCheckFit(tSSTimeValue::kRoundTowardZero, kMost, kLeast, whole, nullptr);
   const int64_t seconds = whole.integerPart();
+  // getFraction gives 0 for such a value; without the carry both together would lose a second.
   if (!ShowsAsOne(FractionOf(magnitude)) || seconds == Limit(negative)) return seconds;
   return negative ? seconds - 1 : seconds + 1;
 }

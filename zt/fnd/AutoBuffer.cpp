@@ -1,3 +1,10 @@
+// A buffer is one pointer to a counted block, the guts. Copies share the guts; makeOwn() is called
+// first by every operation that writes, and clones them where they are shared. The count is atomic,
+// so that two threads may hold copies, but nothing else is: a clone reads the block without a lock,
+// which is safe because shared guts are never written.
+//
+// An operation computes the new length first, in arithmetic that throws, then makes space, and only
+// then writes. So a failure leaves the bytes as they were.
 #include "zt/fnd/AutoBuffer.h"
 
 #include <algorithm>
@@ -13,6 +20,7 @@
 namespace zt::fnd {
 namespace {
 
+// Bytes; below it a tenth is so little that small appends would reallocate each time.
 constexpr uint32_t kSmallestGrowth = 128;
 
 using Size = SafeInteger<uint32_t>;
@@ -29,6 +37,7 @@ void FreeGuts(AutoBufferGuts* guts) noexcept {
 }
 
 AutoBufferGuts* NewGuts(uint32_t capacity) {
+  // malloc and not new: the guts may be freed by another module, with another operator delete.
   void* place = malloc(sizeof(AutoBufferGuts));
   if (!place) throw std::bad_alloc();
   AutoBufferGuts* guts = new (place) AutoBufferGuts;
@@ -66,6 +75,7 @@ void ReallocData(AutoBufferGuts* guts, uint32_t capacity) {
 }
 
 uint32_t GrownByATenth(uint32_t required) {
+  // Where the sum wraps, the required length alone may still be allocated.
   uint32_t grown = required + std::max(kSmallestGrowth, required / 10);
   return grown < required ? required : grown;
 }
@@ -91,6 +101,7 @@ AutoBuffer::AutoBuffer(const BufferWrapper& bytes) : AutoBuffer() {
 }
 
 AutoBuffer& AutoBuffer::operator=(const AutoBuffer& other) {
+  // Self-assignment, and copies that share the block already.
   if (m_guts == other.m_guts) return *this;
   if (other.m_guts) other.m_guts->references.increment();
   AutoBufferGuts* old = std::exchange(m_guts, other.m_guts);
@@ -134,6 +145,8 @@ const unsigned char* AutoBuffer::prepare(const void* bytes, uint32_t required) {
   const unsigned char* source = static_cast<const unsigned char*>(bytes);
   const unsigned char* old = Data();
   std::less<const unsigned char*> before;
+  // std::less, as comparing pointers into different objects by < is undefined. The capacity counts
+  // and not the length: Modify leaves bytes beyond the end that a caller may pass.
   bool inside = old && !before(source, old) && before(source, old + Capacity());
   makeOwnWithRoom(required, Growth::ByATenth);
   return inside ? Data() + (source - old) : source;
@@ -187,6 +200,7 @@ unsigned int AutoBuffer::serializationSize() const { return Size::Add(Len(), 4);
 
 // The bounds checks of wire forms throw unstamped.
 void AutoBuffer::serialize(unsigned char*& cursor, const unsigned char* limit) const {
+  // Compared without adding to the cursor: a pointer past its array is undefined.
   ptrdiff_t room = limit - cursor;
   if (room < 4 || static_cast<size_t>(room - 4) < Len()) throw exception::BufferOverflow();
   little_endian::SerializeRaw<uint32_t>(Len(), cursor, limit);

@@ -8,6 +8,9 @@
 namespace zt::fnd {
 namespace {
 
+// The length goes byte by byte, as it may itself be cut by the end of the ring; the body is at most
+// two copies. A cursor at the end of the ring is the same place as one at its beginning, and both
+// are accepted.
 constexpr ptrdiff_t kLengthBytes = 4;
 
 bool FitsRing(const unsigned char* begin, const unsigned char* end, const unsigned char* cursor) {
@@ -40,6 +43,8 @@ uint32_t ReadLength(const unsigned char* begin, const unsigned char* end,
     length |= static_cast<uint32_t>(*cursor) << (8 * i);
     AutoBuffer::circularIncrement(begin, end, cursor);
   }
+  // The length is the other side's word. Without this test the body would be read from beyond the
+  // ring.
   if (!BodyFitsRing(begin, end, length)) throw exception::DeserializationError();
   return length;
 }

@@ -23,6 +23,7 @@ std::string WithDetail(const char* prefix, const char* detail) {
   Name::~Name() = default;                                                     \
   const char* Name::what() const noexcept { return message.c_str(); }
 
+// Codes and texts are part of the surface: they stay as they are when the code changes.
 ZT_FIXED_TEXT(Exception, 0xFFFFFFFFu, "unspecified exception")
 ZT_FIXED_TEXT(OutOfRange, 0x8ABC7007u, "Out of range")
 ZT_FIXED_TEXT(BoundExceeded, 0x8ABC7007u, "A request was made that would exceed the bounds")

@@ -1,3 +1,6 @@
+// Multiplication and division work on magnitudes and put the sign back at the end: truncation
+// toward zero needs no special case then. Wrapping is the contract, so no intermediate result is
+// checked.
 #include "zt/fnd/FixedPoint128.h"
 
 #include <cmath>
@@ -55,6 +58,8 @@ Fixed::tFixedPoint128(double integer, double fraction) noexcept : tFixedPoint128
 
 Fixed::operator long double() const noexcept {
   const tFixedPoint128 m = magnitude();
+  // Sixty-four bits of mantissa hold the integer part whole where long double has them; on other
+  // hosts this rounds once more.
   const long double value =
       static_cast<long double>(m.m_high) + static_cast<long double>(m.m_low) / kLongTwo64;
   return IsNegative() ? -value : value;
@@ -66,6 +71,7 @@ Fixed::operator double() const noexcept {
 
 void Fixed::LeftShift(int bits, bool fill) noexcept {
   const uint64_t in = fill ? ~uint64_t(0) : 0;
+  // Shift counts of 64 and more are undefined in C++. The test ends a count of billions at once.
   for (; bits >= 64; bits -= 64) {
     if (m_high == in && m_low == in) return;
     m_high = m_low;
@@ -96,6 +102,7 @@ Fixed& Fixed::operator*=(const tFixedPoint128& other) noexcept {
   for (int i = 0; i < 4; ++i) {
     uint64_t carry = 0;
     for (int j = 0; j < 4; ++j) {
+      // At most (2^32 - 1)^2 + 2 (2^32 - 1), which is exactly 2^64 - 1: the sum cannot wrap.
       carry += static_cast<uint64_t>(a.w[i]) * b.w[j] + product[i + j];
       product[i + j] = static_cast<uint32_t>(carry);
       carry >>= 32;
@@ -109,6 +116,7 @@ Fixed& Fixed::operator*=(const tFixedPoint128& other) noexcept {
 
 Fixed& Fixed::operator/=(const tFixedPoint128& other) noexcept {
   const bool negative = IsNegative() != other.IsNegative();
+  // The contract for zero; the division by words would trap.
   if (!other) return *this = IsNegative() ? kLeast : kLargest;
   *this = magnitude();
   DivideInternal(other.magnitude());
@@ -138,7 +146,11 @@ void Fixed::DivideInternal(const tFixedPoint128& divisor) noexcept {
   const auto lessUnsigned = [](const tFixedPoint128& a, const tFixedPoint128& b) {
     return a.m_high != b.m_high ? a.m_high < b.m_high : a.m_low < b.m_low;
   };
+  // 128 bits of the dividend and 64 of its scaling, one quotient bit a round. What is shifted out
+  // of the quotient at the top is what the result cannot hold.
   for (int i = 0; i < 192; ++i) {
+    // The rest has 129 bits for a moment; the one that is about to be lost says that the divisor
+    // fits.
     const bool carry = rest.IsNegative();
     rest.LeftShift(1, IsNegative());
     LeftShift(1, false);

@@ -22,6 +22,8 @@ constexpr unsigned kTextLength = 38;
 constexpr unsigned kSize = sizeof(_GUID);
 
 // Which byte in memory each pair of digits shows; -1 is a hyphen.
+// The first three fields are numbers, shown from their most significant digit (RFC 4122, section
+// 3); in memory they are little-endian, so their bytes go in reverse.
 constexpr int kByteOrder[] = {3, 2, 1, 0, -1, 5, 4, -1, 7, 6, -1, 8, 9, -1, 10, 11, 12, 13, 14, 15};
 
 }  // namespace
@@ -48,6 +50,7 @@ void Guid::toString(String& out) const {
 }
 
 void Guid::fromString(const String& text) {
+  // Before the parse, which would accept text after the closing brace.
   if (text.length() != kTextLength) ZT_RAISE(exception::BadGuidString());
   unsigned char bytes[kSize] = {};
   unsigned char* out = bytes;
@@ -65,6 +68,7 @@ void Guid::fromString(const String& text) {
   SkipCharacter(cursor, end, L'-', ok);
   for (int i = 0; i < 6; ++i) ParseHex<uint8_t>(cursor, end, out, ok);
   SkipCharacter(cursor, end, L'}', ok);
+  // Only here: the steps do nothing once one has failed, which keeps the reader a straight line.
   if (!ok) ZT_RAISE(exception::BadGuidString());
   memcpy(&m_guid, bytes, kSize);
 }

@@ -19,6 +19,7 @@ String Print(Unsigned value, unsigned int base, bool minus = false) {
   wchar_t buffer[std::numeric_limits<Unsigned>::digits + 1];  // base 2 has no minus
   wchar_t* const end = buffer + std::numeric_limits<Unsigned>::digits + 1;
   wchar_t* p = end;
+  // A loop that tests at the end: 0 has one digit.
   do {
     *--p = kDigits[value % base];
     value = static_cast<Unsigned>(value / base);
@@ -30,6 +31,7 @@ String Print(Unsigned value, unsigned int base, bool minus = false) {
 template <class Signed>
 String PrintSigned(Signed value, unsigned int base) {
   using Unsigned = std::make_unsigned_t<Signed>;
+  // Of the type's own width: -1 as a signed char is "FF" in base 16, not "FFFFFFFF".
   const Unsigned bits = static_cast<Unsigned>(value);
   if (value >= 0 || base != 10) return Print(bits, base);
   return Print(static_cast<Unsigned>(0u - bits), base, true);  // unsigned: the least value has none

@@ -1,3 +1,7 @@
+// UTF-8 texts compare by their characters, decoded one at a time, so that no wide copy is made.
+// Without folding the order of the bytes would be the same, but malformed text would compare where
+// the folding form raises InvalidSequence. The public forms use the classic locale: the order of a
+// text must not change with the host's.
 #include "zt/fnd/Utf8StringCompare.h"
 
 #include <cstring>
@@ -27,6 +31,7 @@ int Utf8StringCompareInternal(const unsigned char* a, const unsigned char* aEnd,
   while (a != aEnd && b != bEnd) {
     a = ConvertNextUtf8Character(a, aEnd, left);
     b = ConvertNextUtf8Character(b, bEnd, right);
+    // Most characters are equal; the facet's look-up is for the first difference.
     if (left == right) continue;  // folding maps equal characters to equal ones
     if (foldCase) {
       left = attributes.toUpper(left);

@@ -1,3 +1,6 @@
+// Counting and encoding share EncodedBytes, so that a buffer of the counted size always suffices.
+// The scheme of up to six bytes is the older one (RFC 2279): values beyond 0x10FFFF and surrogates
+// are written, where RFC 3629 would refuse them.
 #include "zt/fnd/WideToUtf8.h"
 
 #include <cwchar>
@@ -60,6 +63,7 @@ uint32_t GetUtf8EncodingBytesWithBufferLimit(const wchar_t* begin, const wchar_t
   uint32_t count = 0;
   for (; begin != end; ++begin) {
     const unsigned bytes = EncodedBytes(ValueOf(*begin));
+    // Subtracted and not added: the sum could wrap at a limit near 32 bits.
     if (bytes > limit - count) break;
     count += bytes;
   }
@@ -79,9 +83,11 @@ uint32_t WideToUtf8NoOverflow(const wchar_t*& begin, const wchar_t* end, unsigne
       continue;
     }
     const unsigned count = EncodedBytes(value);
+    // No sequence is ever cut: its rest would read as malformed text.
     if (static_cast<ptrdiff_t>(count) > destEnd - out) break;
     out = EncodeOne(value, count, out);
   }
+  // Before `begin` moves: a count that does not fit throws with the caller's cursor unchanged.
   const uint32_t written = Checked(static_cast<uint64_t>(out - dest));
   begin = s;
   return written;

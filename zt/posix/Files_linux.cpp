@@ -1,3 +1,11 @@
+// How rule 1 is kept without a race. A path is never checked and then opened: it is first turned
+// into an O_PATH descriptor, which fixes the file without opening it, then the descriptor is judged
+// by fstat, and only then is the same file opened for real, through /proc/self/fd. Whoever replaces
+// a part of the path in between changes nothing about the file that was judged.
+//
+// The usual path has no link, and openat2 with RESOLVE_NO_SYMLINKS walks it in one call of the
+// kernel. Only where that reports ELOOP does Walk go component by component, so that the owner of
+// each link can be compared with that of what it leads to.
 #include "zt/posix/Files.h"
 
 #include <fcntl.h>
@@ -20,10 +28,16 @@ namespace zt::posix {
 namespace {
 
 constexpr int kMostLinks = 40;  // as the kernel's own limit
+// A race is lost only if another process makes or removes the file at that very moment. The limit
+// turns a process that does so endlessly into an error instead of a hang.
 constexpr int kMostRaces = 100;
+// Files set aside are never removed, so that a file that is damaged again and again could otherwise
+// keep the search for a free name busy without end.
 constexpr int kMostSetAside = 10000;
 constexpr int kFirstFreeDescriptor = 3;
 constexpr mode_t kAllModeBits = 07777;
+// O_NONBLOCK, because between the judgement and the open by path (without /proc) a pipe can take
+// the file's place, and its open would wait for a writer. Regular files ignore the flag.
 constexpr int kAlways = O_CLOEXEC | O_NOCTTY | O_NONBLOCK;
 
 struct Free {
@@ -40,6 +54,8 @@ ScopedFd Failure(int error) {
   return ScopedFd();
 }
 
+// The third case lets users link among their own files. It is no hole: the owner of the target can
+// change that file anyway.
 bool IsTrusted(const struct stat& link, const struct stat& target) {
   return link.st_uid == 0 || link.st_uid == geteuid() || link.st_uid == target.st_uid;
 }
@@ -67,12 +83,15 @@ ScopedFd Walk::start(int at, const char* path) {
 ScopedFd Walk::followLink(const ScopedFd& directory, const ScopedFd& link,
                           const struct stat& info) {
   if (++m_links > kMostLinks) return Failure(ELOOP);
+  // In the heap: the function is recursive, and host threads may have small stacks.
   Text text(static_cast<char*>(malloc(PATH_MAX)));
   if (!text) return Failure(ENOMEM);
   ssize_t length = RetryEintr([&] { return readlinkat(link.get(), "", text.get(), PATH_MAX); });
   if (length < 0) return ScopedFd();
+  // A full buffer may be a text that was cut.
   if (length == PATH_MAX) return Failure(ENAMETOOLONG);
   text.get()[length] = 0;
+  // Relative to the directory that holds the link, and judged link by link itself.
   ScopedFd target = resolve(directory.get(), text.get(), true);
   struct stat led;
   if (!target || fstat(target.get(), &led) != 0) return ScopedFd();
@@ -95,6 +114,7 @@ ScopedFd Walk::resolve(int at, const char* path, bool follow) {
     if (!*path) break;
     size_t length = strcspn(path, "/");
     if (length > NAME_MAX) return Failure(ENAMETOOLONG);
+    // ".." is a name like any other: openat resolves it in the directory that was really reached.
     memcpy(name, path, length);
     name[length] = 0;
     path += length;
@@ -116,6 +136,8 @@ bool NeedsSlowWalk(int error) {
 }
 
 ScopedFd LookUpWithoutLinks(const char* path, bool follow) {
+  // Zeroed as a whole: the kernel refuses a request with values in fields that the flags do not
+  // use.
   struct open_how how;
   memset(&how, 0, sizeof how);
   how.flags = static_cast<unsigned>(O_PATH | O_CLOEXEC | (follow ? 0 : O_NOFOLLOW));
@@ -172,6 +194,7 @@ ScopedFd OpenExisting(const char* path, int flags, Kind kind, LastLink link) {
   ScopedFd found = LookUp(path, link == LastLink::Judged);
   struct stat info;
   if (!found || fstat(found.get(), &info) != 0) return ScopedFd();
+  // Only with LastLink::Refused: LookUp has followed all others.
   if (S_ISLNK(info.st_mode)) return Failure(ELOOP);
   if (S_ISDIR(info.st_mode)) {
     if (kind != Kind::FileOrDirectory) return Failure(EISDIR);
@@ -187,6 +210,8 @@ ScopedFd CreateNew(const char* path, int flags, mode_t mode) {
 }
 
 ScopedFd CreateNew(const Entry& entry, int flags, mode_t mode) {
+  // O_EXCL with O_CREAT never follows a link in the last place (POSIX); the directory is the one
+  // that was judged, whatever its path names by now.
   return AboveStandardStreams(OpenAt(entry.directory.get(), entry.name,
                                      flags | kAlways | O_CREAT | O_EXCL | O_NOFOLLOW, mode));
 }
@@ -220,6 +245,7 @@ Entry::Entry(const char* path) : name(path) {
   while (end > 0 && path[end - 1] == '/') --end;
   while (end > 0 && path[end - 1] != '/') --end;
   if (end == 0) {
+    // Only slashes, or a name alone; the name is the whole path then.
     directory = LookUp(*path == '/' ? "/" : ".");
     return;
   }
@@ -265,6 +291,8 @@ int Link(const char* existing, const char* path) {
 }
 
 int RenameToNew(int directory, const char* from, const char* to) {
+  // The one call that both renames and refuses to replace: link() and unlink() instead would show
+  // the file under two names for a moment, which SetSharedMode refuses to touch.
   long result = RetryEintr(
       [&] { return syscall(SYS_renameat2, directory, from, directory, to, RENAME_NOREPLACE); });
   if (result == 0 || (errno != ENOSYS && errno != EINVAL && errno != EPERM)) {
@@ -292,6 +320,7 @@ int MoveAside(const char* path, const char* stamp) {
       errno = ENAMETOOLONG;
       return -1;
     }
+    // Tried and not looked up: only the rename itself can say that a name is free.
     if (RenameToNew(entry.directory.get(), entry.name, name) == 0) return 0;
     if (errno != EEXIST) return -1;
   }
@@ -299,6 +328,7 @@ int MoveAside(const char* path, const char* stamp) {
 }
 
 int MakeRoom(const char* path) {
+  // A directory in the place of a file is kept: what it holds is not this library's to remove.
   if (Unlink(path) == 0 || errno == ENOENT) return 0;
   // A directory: EISDIR on Linux, EPERM by POSIX.
   return errno == EISDIR || errno == EPERM ? MoveAside(path) : -1;
@@ -324,6 +354,8 @@ int ChangeMode(int fd, mode_t mode) {
 }
 
 int SetSharedMode(int fd, const struct stat& info, mode_t mode) {
+  // A second name may be one that another user has given to a file of root or of the caller, to
+  // have its mode widened here. Directories have several links by nature.
   if (S_ISREG(info.st_mode) && info.st_nlink > 1) {
     errno = EMLINK;
     return -1;
@@ -350,6 +382,7 @@ int SetSharedMode(const char* path, mode_t mode) {
 
 bool IsPassing(int error) {
   switch (error) {
+    // ENOENT, EACCES, ENOTDIR, ELOOP and the like are answers about the file; these are not.
     case EIO:
     case ESTALE:
     case EINTR:
@@ -383,12 +416,15 @@ int Flock(int fd, int operation) {
 }
 
 bool Sync(int fd) {
+  // EINVAL and ENOSYS: a file system without fsync. EROFS: nothing can be unwritten.
   if (RetryEintr([&] { return fsync(fd); }) == 0) return true;
   return errno == EINVAL || errno == ENOSYS || errno == EROFS;
 }
 
 bool SyncDirectory(const char* path) {
   ScopedFd fd = OpenDirectory(path);
+  // The entry is made durable later by the system; refusing the caller's save for it would help no
+  // user.
   if (!fd) return errno == EACCES;
   return Sync(fd.get());
 }

@@ -1,3 +1,7 @@
+// Every operation that reports by its result keeps errno across its clean-up: closing, seeking back
+// and freeing memory may set it, and the caller is to read that of the transfer. The paths come
+// from callers who may name any file, so that files are opened as they are, links included; what
+// lies in places of other users goes through zt/posix/Files.h instead.
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -22,12 +26,15 @@ namespace zt::fnd::osdep {
 namespace {
 
 constexpr uint32_t kTopBit = 0x80000000u;
+// From this size on a length out of a damaged file is worth a call of fstat before memory is taken.
 constexpr unsigned int kCheckedReadSize = 1u << 20;
 
 static_assert(static_cast<int>(BinaryFile::Origin::Begin) == SEEK_SET);
 static_assert(static_cast<int>(BinaryFile::Origin::Current) == SEEK_CUR);
 static_assert(static_cast<int>(BinaryFile::Origin::End) == SEEK_END);
 
+// The bits are combined as the system's flags are, without a check: O_RDONLY is 0, so that Read
+// says nothing beside Write.
 int OpenFlags(BinaryFile::Mode mode) {
   static constexpr struct {
     BinaryFile::Mode bit;
@@ -100,6 +107,7 @@ int BinaryFile::openNoThrow(const String& path, Mode mode) {
   int failure;
   {
     AnsiString narrow(path);
+    // The string's destructor frees memory, which may set errno: hence the block.
     m_fd = RetryEintr([&] { return ::open(narrow.c_str(), flags, permissions); });
     failure = errno;
   }
@@ -125,6 +133,7 @@ long BinaryFile::read(AutoBuffer& buffer, unsigned int n) const {
   if (!room && n > 0) return -1;
   long got = read(room, n);
   int failure = errno;
+  // Of the space that was made, what the transfer has not filled.
   buffer.UnAppend(got < 0 ? n : n - static_cast<unsigned int>(got));
   errno = failure;
   return got;
@@ -150,6 +159,8 @@ int BinaryFile::ReadExactSize(int fd, void* bytes, unsigned long n) {
   });
   if (got == n) return FullCount(n);
   int failure = errno;
+  // So that the caller may try another form at the same place. On a pipe this fails, and what was
+  // read is lost; the failure is the read's.
   if (got > 0) ::lseek(fd, -static_cast<off_t>(got), SEEK_CUR);
   errno = failure;
   return -1;
@@ -173,6 +184,7 @@ int64_t BinaryFile::readByteVector(AutoBuffer& buffer, Endianness order) {
 }
 
 int64_t BinaryFile::writeByteVector(const BufferWrapper& bytes, Endianness order) {
+  // A reader refuses such a length, so it is never written.
   if (bytes.Len() >= kTopBit) return -1;
   uint32_t length = InOrder(bytes.Len(), order);
   if (writeExactSize(&length, sizeof length) < 0) return -1;

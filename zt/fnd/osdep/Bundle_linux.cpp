@@ -1,3 +1,6 @@
+// The form of bundles on Linux: a directory, named as the module with a suffix, and the module's
+// shared object inside it. The system knows no such thing, so that opening one is a search for a
+// file that dlopen takes.
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/Bundle.h"
@@ -41,6 +44,8 @@ struct Bundle::Module {
 Bundle::Bundle(const String& name) {
   if (name.empty()) return;
   String decorated = decorateName(name);
+  // Without a directory part the working directory would be searched, from which a module must not
+  // come.
   if (decorated.exactCompare(path::BaseName(decorated)) != 0) openFromPath(decorated);
 }
 
@@ -48,9 +53,12 @@ Bundle::~Bundle() = default;
 
 bool Bundle::openFromPath(const String& path) {
   String directory = Absolute(path);
+  // A regular file of this name is not a failed bundle: SharedLibrary loads it as a library in its
+  // next step.
   if (!path::IsDirectory(directory.c_str())) return false;
   String stem = Stem(directory);
   if (stem.empty()) return false;
+  // From the usual name to the bare one, which is how bundles of other systems name their module.
   const String names[] = {String(L"lib") + stem + L".so", stem + L".so", stem};
   for (const String& name : names) {
     if (void* handle = LoadModule(path::Join(directory, name))) {

@@ -1,3 +1,12 @@
+// Linux has close-on-exec but no close-on-fork, so that the library keeps a table of descriptors
+// and closes them itself, in a handler of fork() that runs in the child before fork() returns. The
+// table is indexed by the number and has for each the serial of the opening and the identity of the
+// file; both have to match before a number is used, since the host may close any descriptor and get
+// the number again for a file of its own.
+//
+// s_lock is held across fork(), which makes "opened and in the table" one step for the child:
+// either the mark is there, and the child closes the descriptor, or the counter of forks has moved,
+// and the opening begins again with a file that no child has.
 #include "zt/fnd/osdep/CloseOnFork.h"
 
 #include <pthread.h>
@@ -28,6 +37,7 @@ struct Mark {
 };
 std::vector<Mark>* s_marks GUARDED_BY(s_lock) = nullptr;  // by descriptor number
 uint64_t s_serial GUARDED_BY(s_lock) = 0;
+// Counted before the fork, so that the copy in the child counts it too.
 unsigned s_forks GUARDED_BY(s_lock) = 0;
 
 void BeforeFork() ACQUIRE(s_lock) {
@@ -42,6 +52,8 @@ void InChild() RELEASE(s_lock) {
   for (size_t fd = 0; s_marks && fd < s_marks->size(); ++fd) {
     Mark& mark = (*s_marks)[fd];
     if (!mark.closesInChild) continue;
+    // close() and not ScopedFd: only calls that POSIX allows after a fork in a process of several
+    // threads.
     if (mark.file.isBehind(static_cast<int>(fd))) ::close(static_cast<int>(fd));
     mark = Mark();
   }
@@ -62,6 +74,7 @@ uint64_t MarkIfNoFork(int fd, const FileIdentity& file, unsigned forks) {
   if (s_forks != forks) return 0;
   if (!s_marks) s_marks = new std::vector<Mark>;
   size_t index = static_cast<size_t>(fd);
+  // Ahead of need: a resize for each descriptor would copy the table each time.
   if (s_marks->size() <= index) s_marks->resize(index + 64);
   (*s_marks)[index] = Mark{++s_serial, file, true};
   return s_serial;
@@ -110,6 +123,7 @@ CloseOnForkFd CloseOnForkFd::OpenShared(const AnsiString& path, InTheWay way) {
 // takes after this one.
 int CloseOnForkFd::get() const noexcept {
   if (!valid()) return -1;
+  // A child's copy of a kept descriptor is its own, and has no mark that anyone may remove.
   if (!m_process.isCurrent()) {
     if (!m_kept) return -1;
   } else {

@@ -1,3 +1,7 @@
+// A recursive mutex of the system with the owner and depth beside it, which the system does not
+// reveal. Both are written by the owner only, while it holds the mutex; other threads read the
+// owner merely to see that it is not themselves. For that answer no ordering is needed: a thread
+// always sees its own last store, and a foreign value, however old, is never its own id.
 #include "zt/fnd/osdep/CriticalSection.h"
 
 #include <pthread.h>
@@ -51,6 +55,7 @@ void UnixCriticalSection::leave() const {
   if (!inOwningThread()) return;
   int32_t count = m_block->count.load(std::memory_order_relaxed);
   if (count > 0) m_block->count.store(--count, std::memory_order_relaxed);
+  // Before the unlock: afterwards another thread may already have written itself there.
   if (count == 0) m_block->owner.store(pthread_t(), std::memory_order_relaxed);
   pthread_mutex_unlock(&m_block->mutex);
 }

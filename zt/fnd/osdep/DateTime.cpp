@@ -1,3 +1,7 @@
+// From a time to text in three steps: fractions are put into the format as literal digits, the time
+// is broken down into calendar fields, and strftime prints them. strftime knows no fractions, and a
+// fraction that rounds up to a whole second has to move the time before it is broken down, which is
+// why the format comes first.
 #include "zt/fnd/osdep/DateTime.h"
 
 #include <clocale>
@@ -33,6 +37,7 @@ String SeparatorText(int separator) {
 // The separator and the decimals of the time, which moves on by a second where they round up to 1.
 String FractionText(AbsTime& time, unsigned digits, int separator) {
   const unsigned one = kPowersOfTen[digits];
+  // Half up, by adding a half and cutting.
   double f = time.getFraction() * one + 0.5;
   if (f >= one) {
     time = AbsTime(time.value() + AbsTime::Value(1));
@@ -64,6 +69,8 @@ String Join(const String& first, const String& second) {
 }
 
 String Format(const tm& fields, const String& format) {
+  // strftime gives 0 both for a result that does not fit and for an empty one; both are the empty
+  // text.
   char text[kTextSize];
   const AnsiString narrow(format);
   Hold hold(LeakedInstance<SystemTimes>().lock);
@@ -82,6 +89,8 @@ tm ToFields(const AbsTime& time, bool round, BreakDown breakDown) {
 
 String SystemFormat(const wchar_t* format) {
   Hold hold(LeakedInstance<SystemTimes>().lock);
+  // The host's setting is changed on purpose: "%x" is meant to be the user's own, and strftime has
+  // no other way to get a locale.
   setlocale(LC_TIME, "");
   return String(format);
 }
@@ -126,6 +135,8 @@ String AbsTimeToString(AbsTime time, const wchar_t* dateFormat, const wchar_t* t
     }
   }
   const String format = timeFirst ? Join(timePart, datePart) : Join(datePart, timePart);
+  // With digits the fraction is already in the format, and rounding the seconds as well would count
+  // it twice.
   const bool round = fractionDigits == 0;
   return Format(
       type == kTimeUTC ? AbsTimeToUTCDateTime(time, round) : AbsTimeToLocalDateTime(time, round),

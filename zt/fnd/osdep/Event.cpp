@@ -1,3 +1,7 @@
+// A condition, a mutex and a flag. The waits loop on the flag, as POSIX lets a condition wake
+// without a signal, and since of several waiters of an automatic event one takes the flag before
+// the others look. What a set wakes is therefore a question of efficiency only: a broadcast lets
+// all pass a manual event, a signal is enough for an automatic one.
 #include "zt/fnd/osdep/Event.h"
 
 #include <pthread.h>
@@ -17,9 +21,11 @@ constexpr unsigned int kNoLimit = 0xFFFFFFFFu;
 
 timespec DeadlineIn(unsigned int ms) {
   timeval now;
+  // The clock that an unconfigured condition waits by is that of the wall.
   gettimeofday(&now, nullptr);
   timespec deadline;
   deadline.tv_sec = now.tv_sec + ms / 1000;
+  // Below two seconds in nanoseconds, which fits a long of 32 bits.
   deadline.tv_nsec = now.tv_usec * 1000L + (ms % 1000) * 1000000L;
   if (deadline.tv_nsec >= 1000000000L) {
     deadline.tv_sec += 1;
@@ -87,6 +93,8 @@ bool Event::wait(unsigned int ms) const {
   timespec deadline = DeadlineIn(ms);
   Hold hold(m_block->mutex);
   while (!m_block->signaled) {
+    // Any failure ends the wait, not only ETIMEDOUT: a wait that cannot be made must not become a
+    // loop. The flag decides afterwards, as it may have been set at the last moment.
     if (pthread_cond_timedwait(&m_block->condition, m_block->mutex.native(), &deadline) != 0) break;
   }
   return m_block->take();

@@ -19,6 +19,8 @@ AbsTime Time_TtoAbsTime(time_t seconds) {
 AbsTime GetFileLastWriteTime(const String& path) {
   AnsiString narrow(path);
   struct stat info;
+  // Not st_mtim: a file system that keeps no fractions, or a copy that drops them, would make an
+  // unchanged file look changed.
   if (RetryEintr([&] { return ::stat(narrow.c_str(), &info); }) != 0) return AbsTime::min;
   return Time_TtoAbsTime(info.st_mtime);
 }

@@ -1,3 +1,5 @@
+// One pass over the directory, each entry judged by the cheapest test first: its first character,
+// the mask, the type that the listing gives for nothing, and only then calls of stat.
 #include <dirent.h>
 
 #include <cerrno>
@@ -43,6 +45,7 @@ struct Mask {
 ScopedDir OpenDirectory(const String& directory) {
   AnsiString narrow(directory);
   DIR* dir;
+  // Not RetryEintr, which knows calls that report by -1.
   do {
     dir = ::opendir(narrow.c_str());
   } while (!dir && errno == EINTR);
@@ -51,6 +54,7 @@ ScopedDir OpenDirectory(const String& directory) {
 
 // The next entry; null at the end, or with errno set.
 const dirent* NextEntry(DIR* dir) {
+  // readdir gives null for the end and for a failure; only errno distinguishes them.
   errno = 0;
   return ::readdir(dir);
 }
@@ -65,11 +69,13 @@ bool SurelyNoDirectory(const dirent* entry) {
 }
 
 void AddEntry(const Mask& mask, Flags flags, const dirent* entry, Vector<String>& found) {
+  // Whatever the pattern: a walk that descends into what it finds would never end.
   if (IsDotOrDotDot(entry->d_name)) return;
   if (entry->d_name[0] == '.' && !Has(flags, Flags::Hidden)) return;
   String name(entry->d_name);
   if (!WildcardFit(mask.pattern.c_str(), name.c_str())) return;
   String full(mask.directory);
+  // One allocation an entry; directories of thousands are listed here.
   full.reserve(mask.directory.length() + name.length() + 2);
   full += L'/';
   full += name;
@@ -94,6 +100,8 @@ Vector<String> List(const String& text, Flags flags, Errors errors) {
     return found;
   }
   while (const dirent* entry = NextEntry(dir.get())) AddEntry(mask, flags, entry, found);
+  // Without flags a listing that breaks off returns what it has, as it returns nothing for a
+  // directory that cannot be opened.
   if (errno != 0 && errors == Errors::Thrown) ZT_RAISE(PosixError());
   if (Has(flags, Flags::DotEntries)) {
     found.push_back(mask.directory + L"/.");

@@ -1,3 +1,14 @@
+// A fork copies the mutexes of all threads in the state of that moment, and the child has none of
+// the threads that would unlock them. So before a fork a handler takes every AtFork::Wait mutex
+// that the forking thread does not hold itself: what they guard is whole then, and the child gets
+// them as the forking thread's own, to be unlocked in both processes. What could not be taken in
+// time is made again in the child and marked as interrupted.
+//
+// The handler may not deadlock with threads that hold one mutex and wait for another, in whatever
+// order. It takes the mutexes in the order of ranks and gives each a short turn; where one is
+// missed, it gives back all others, so that the holder can go on, and starts over with the missed
+// one. The patience of a second bounds the whole, since a fork that never returns is worse than an
+// interrupted mutex.
 #include <algorithm>
 #include <cstdint>
 #include <ctime>
@@ -19,6 +30,7 @@ constexpr int64_t kPatience = kNanosecondsPerSecond;  // of a fork, in all
 constexpr int64_t kTurn = kPatience / 20;             // for one mutex, while others are held
 
 int64_t Now() {
+  // The monotonic clock: setting the time of day must not lengthen a fork.
   timespec now;
   clock_gettime(CLOCK_MONOTONIC, &now);
   return int64_t{now.tv_sec} * kNanosecondsPerSecond + now.tv_nsec;
@@ -42,6 +54,7 @@ class ForkSafeMutex::Registry {
     pthread_once(&s_once, Register);
     Hold hold(s_lock);
     ForkSafeMutex** place = &s_first;
+    // Of equal ranks the earlier one stays first.
     while (*place && (*place)->m_rank <= mutex.m_rank) place = &(*place)->m_next;
     mutex.m_next = *place;
     *place = &mutex;
@@ -84,6 +97,8 @@ class ForkSafeMutex::Registry {
       if (m == first || m->m_atFork != AtFork::Wait || m->mine()) continue;
       if (Take(*m, std::min(Now() + kTurn, end))) continue;
       if (!missed) missed = m;
+      // Before the end a missed one means beginning again; after it nothing is gained by that, and
+      // the rest is taken as far as it is free.
       if (Now() < end) break;
     }
     return missed;
@@ -169,6 +184,8 @@ void ForkSafeMutex::renew() noexcept {
   }
   // Held also if the owner has not written itself down yet, or no longer.
   if (pthread_mutex_trylock(&m_mutex) != 0) m_interrupted = true;
+  // A mutex that another thread holds cannot be unlocked or destroyed by this one (POSIX leaves
+  // both undefined); a new one is put in its place.
   const pthread_mutex_t fresh = PTHREAD_MUTEX_INITIALIZER;
   m_mutex = fresh;
   m_owned = false;

@@ -1,3 +1,7 @@
+// iconv stops at the first text that it cannot convert; the callers want all of the rest. The loop
+// therefore replaces one unit and goes on from the next, until input or space runs out. errno is
+// not consulted: bad text, text cut at the end and a character that the target lacks all become
+// "?".
 #include "zt/fnd/osdep/IConv.h"
 
 #include <iconv.h>
@@ -48,12 +52,14 @@ template <class In, class Out>
 void Convert(const In* begin, const In* end, const char* fromCode, Out* dest, Out*& destEnd,
              const char* toCode) {
   const ScopedIconv converter(toCode, fromCode);
+  // iconv takes a pointer to non-const for history's sake; it does not write there.
   char* in = const_cast<char*>(reinterpret_cast<const char*>(begin));
   size_t inLeft = static_cast<size_t>(end - begin) * sizeof(In);
   char* out = reinterpret_cast<char*>(dest);
   size_t outLeft = static_cast<size_t>(destEnd - dest) * sizeof(Out);
   while (inLeft != 0 && outLeft >= sizeof(Out)) {
     if (converter.convert(in, inLeft, out, outLeft)) continue;
+    // A full buffer stops iconv too, and is no bad text.
     if (inLeft == 0 || outLeft < sizeof(Out)) break;
     *reinterpret_cast<Out*>(out) = static_cast<Out>('?');
     out += sizeof(Out);

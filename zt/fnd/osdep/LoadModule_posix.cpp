@@ -35,6 +35,8 @@ void* LoadModule(const String& name) {
     return nullptr;
   }
   Hold hold(LoadingLock());
+  // RTLD_NOW: a module with a missing symbol fails here, where it is reported, and not at its first
+  // call. RTLD_GLOBAL: components use the symbols of those loaded before them.
   return ::dlopen(narrow.c_str(), RTLD_NOW | RTLD_GLOBAL);
 }
 

@@ -1,3 +1,8 @@
+// Conversion between a narrow encoding and wide text. Nearly all text is UTF-8 or ASCII, and those
+// are converted here; iconv does the others. The hand-written converters give what iconv with its
+// "?" rule gives, to the character, so that it makes no difference which way a text takes
+// (LocaleTextIConv_test.cpp compares them). The needed space is an upper bound and not a count:
+// converting twice, once to count, would cost more than a block that is a little too large.
 #include "zt/fnd/osdep/LocaleText.h"
 
 #include <langinfo.h>
@@ -16,12 +21,15 @@ namespace {
 using SafeCount = SafeInteger<uint32_t>;
 
 constexpr char kWideCode[] = "UTF-32LE";
+// Of UTF-8; no encoding of a locale has longer ones.
 constexpr uint32_t kMostBytesPerCharacter = 4;
 
 bool Same(const char* a, const char* b) { return strcmp(a, b) == 0; }
 
 // The name that iconv gets.
 const char* EncodingOf(const char* locale) {
+  // "carbon" is the name of the system's own conversion on another platform; here it is the
+  // locale's.
   return !locale || Same(locale, "carbon") ? "" : locale;
 }
 
@@ -38,6 +46,7 @@ ByHand ByHandOf(const char* encoding) {
   if (Same(encoding, "US-ASCII")) return ByHand::Ascii;
   if (Same(encoding, "UTF-8")) return ByHand::Utf8;
   if (*encoding != '\0') return ByHand::Nothing;
+  // "ANSI_X3.4-1968" is what the C library calls ASCII, the encoding of the "C" locale.
   const char* const codeset = nl_langinfo(CODESET);
   if (Same(codeset, "UTF-8")) return ByHand::Utf8;
   return Same(codeset, "ANSI_X3.4-1968") ? ByHand::LocaleAscii : ByHand::Nothing;
@@ -81,6 +90,8 @@ size_t ReadUtf8(const char* begin, const char* end, uint32_t& c) {
     if ((next & 0xC0) != 0x80) return 0;
     c = c << 6 | (next & 0x3F);
   }
+  // Overlong forms and surrogates are malformed by RFC 3629: accepting them would give one name two
+  // spellings.
   return c >= kLeast[n] && IsCharacter(c) ? n : 0;
 }
 

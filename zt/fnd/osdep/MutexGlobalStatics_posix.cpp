@@ -14,6 +14,8 @@ RefPtr<MutexGlobalStatics> MutexGlobalStatics::Get() {
 MutexGlobalStatics::Map::iterator MutexGlobalStatics::attach(const String& name) {
   Hold hold(section);
   Map::iterator data = m_data.try_emplace(name).first;
+  // Counted inside the section that detach() takes as well: an entry goes with the last object of
+  // its name, and never between the look-up of a new one and its counting.
   ++data->second.objects;
   return data;
 }

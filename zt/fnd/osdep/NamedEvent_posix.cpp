@@ -1,3 +1,7 @@
+// The operations of an open event are one system call each, on one semaphore of a System V set
+// (semop(2)); how an event gets its semaphore, and gives it back, is in events/. The kernel does
+// the waiting, between processes as between threads, so that no lock of this library is held while
+// a caller waits.
 #include <sys/ipc.h>
 #include <sys/sem.h>
 
@@ -18,6 +22,7 @@ namespace zt::fnd::osdep {
 namespace {
 
 constexpr unsigned int kNoLimit = 0xFFFFFFFFu;
+// semop has no timed form by POSIX, and a SIGALRM would belong to the host.
 constexpr unsigned int kPollMs = 50;
 
 }  // namespace
@@ -49,6 +54,7 @@ int NamedEvent::operate(short flags) const {
   operation.sem_num = static_cast<unsigned short>(m_data->slot());
   operation.sem_op = m_data->manualReset() ? 0 : -1;
   operation.sem_flg = flags;
+  // EIDRM, the answer to a set that was removed, is how a waiter learns of it.
   return RetryEintr([&] { return ::semop(m_data->set().id(), &operation, 1); });
 }
 
@@ -77,6 +83,7 @@ bool NamedEvent::wait(unsigned int ms) const {
   }
   for (;; ms -= kPollMs) {
     if (check()) return true;
+    // The last and shortest turn: its sleep ends with the time.
     if (ms < kPollMs) {
       Sleep(ms);
       return check();

@@ -8,6 +8,7 @@ namespace {
 
 constexpr uint32_t kNoError = 0;
 constexpr uint32_t kNotFound = 7;
+// The small codes that clients know: done, not found, anything else.
 constexpr uint32_t kOther = 42;
 constexpr uint32_t kFileNotFoundStatus = 0xFFFFFFD5u;  // -43
 

@@ -12,6 +12,8 @@ static_assert(Number::is_always_lock_free,
               "shared with children of fork(), and asked in its handlers");
 
 // Plain objects, ready before any initialiser and good after every destructor.
+// The handler is registered by the first mark, so that a process that makes none pays nothing at a
+// fork. Forks before it need no count: there was no mark to distinguish.
 pthread_once_t s_once = PTHREAD_ONCE_INIT;
 // This process's number, 0 until it is asked for the first time; null where the kernel wipes nothing.
 Number* s_own = nullptr;

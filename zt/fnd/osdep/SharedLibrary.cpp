@@ -1,3 +1,8 @@
+// A bare name stands for a module in whatever form the installation has it; load() tries the forms
+// in a fixed order and keeps the first that loads. m_handle is the loader's handle for a library
+// and an owned Bundle for a bundle; m_isBundle says which. Nothing here reports why a form did not
+// load: a failure is only that of all three, and the loader's text, asked for by
+// getFunctionPointer, is of the last one.
 #include "zt/fnd/osdep/SharedLibrary.h"
 
 #include <memory>
@@ -47,6 +52,8 @@ SharedLibrary::SharedLibrary(const SharedLibrary& other)
       m_secondFlag(other.m_secondFlag),
       m_requestedName(other.m_requestedName),
       m_isBundle(other.m_isBundle) {
+  // By name again, which raises the system's count: each object then unloads for itself. Qualified,
+  // since in a constructor a virtual call means this class all the same.
   if (other.isLoaded()) SharedLibrary::load();
 }
 
@@ -58,6 +65,7 @@ SharedLibrary& SharedLibrary::operator=(const SharedLibrary& other) {
 
 SharedLibrary::~SharedLibrary() {
   if (!m_unloadOnDestroy && m_isBundle && m_handle) {
+    // A Bundle unloads with its last copy, and this may be it.
     static_cast<Bundle*>(m_handle)->keepLoaded();
     m_unloadOnDestroy = true;  // of the Bundle only its own memory is left to free
   }
@@ -82,6 +90,7 @@ void SharedLibrary::load() {
 }
 
 void SharedLibrary::load(const String& name) {
+  // Also after unload(), which keeps the name.
   if (!m_loadedName.empty()) ZT_RAISE(exception::InvalidOperation());
   m_requestedName = name;
   load();

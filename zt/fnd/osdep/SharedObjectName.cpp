@@ -13,6 +13,8 @@ namespace {
 
 bool IsAscii(wchar_t c) { return static_cast<uint32_t>(c) < 0x80; }
 
+// By hand, and for ASCII only: toupper depends on the locale, which the host may change while the
+// name is a key in a map.
 wchar_t Folded(wchar_t c) { return c >= L'a' && c <= L'z' ? static_cast<wchar_t>(c - 32) : c; }
 
 }  // namespace
@@ -27,9 +29,13 @@ AnsiString SharedObjectFileName(const String& name) {
 
 // What path::Join would make of the two, but for the bytes of the name.
 AnsiString SharedObjectPath(const String& dirName, const String& name) {
+  // The narrow form of ASCII is the same in every locale of a host, so that the common name takes
+  // the common way.
   if (std::all_of(name.begin(), name.end(), IsAscii)) return BuildSharedUnixFilePath(dirName, name);
   const AnsiString directory = BuildSharedUnixFilePath(dirName, String());
   const AnsiString fileName = SharedObjectFileName(name);
+  // An absolute name is its own path, as in path::Join. An empty one cannot come here: all of its
+  // characters are ASCII.
   return fileName[0] == '/' ? fileName : directory + fileName;
 }
 

@@ -1,3 +1,11 @@
+// Several processes, of several users, make the same directories and files at the same time, and
+// each must end with ones that all can use. Between making something and setting its mode it is
+// closed to other users for a moment, and a file may be removed by its last user just as another
+// one opens it. So every step is tried again, a fixed number of times with a pause: races are over
+// in a millisecond, and what fails for good is reported after a few.
+//
+// The modes are set on descriptors, after the opening: the umask of the process that is first must
+// not decide for all others, and umask(2) itself would change the whole process.
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -25,10 +33,14 @@ constexpr const wchar_t* kDefaultBase = L"/var/tmp/zentrex/shared";
 constexpr const char* kBaseVariable = "ZTFNDTMPSHAREDFILEDIR";
 constexpr mode_t kDirMode = 0777;
 constexpr mode_t kFileMode = 0666;
+// Attempts, a millisecond apart: the time for another user's process to set the mode of a directory
+// that it has just made.
 constexpr int kRefusedDirs = 5;
 constexpr int kRounds = 100;  // a race may be lost at each level of a path
 constexpr int kRefusedOpens = 3;
+// So often in a row only by a process that opens and removes the file in a loop.
 constexpr int kVanishedOpens = 100;
+// Of things moved aside for one opening: whoever puts new ones there faster is refused.
 constexpr int kClearings = 10;
 
 // Makes the directories. Other processes make the same ones: the loser of a race finds a level that
@@ -139,6 +151,8 @@ int CreateSharedUnixFile(const AnsiString& path, InTheWay way, FileIdentity* ide
 bool FileIdentity::isBehind(int fd) const noexcept {
   struct stat info;
   int saved = errno;
+  // EBADF is the one failure that answers the question; any other leaves the descriptor the benefit
+  // of the doubt, so that a failing disk does not look like a lost lock.
   bool known = ::fstat(fd, &info) == 0;
   bool open = known || errno != EBADF;
   errno = saved;

@@ -1,3 +1,6 @@
+// All comparisons are one of two loops, over terminated text or over ranges, with a difference of
+// characters as parameter. Narrow characters are compared as unsigned bytes everywhere: whether
+// char is signed differs between processors, and an order that is stored must not.
 #include "zt/fnd/osdep/StringCompare.h"
 
 #include <cctype>

@@ -23,6 +23,7 @@ wchar_t* SystemAllocString(const wchar_t* s) {
 }
 
 wchar_t* SystemAllocStringLen(const wchar_t* s, unsigned int n) {
+  // In 64 bits, where no n can make it wrap.
   const uint64_t bytes = (static_cast<uint64_t>(n) + 1) * sizeof(wchar_t) + sizeof(Count);
   if (bytes > kMax32) return nullptr;
   char* const block = static_cast<char*>(DLLMallocNoThrow(static_cast<unsigned long>(bytes)));
@@ -37,6 +38,7 @@ wchar_t* SystemAllocStringLen(const wchar_t* s, unsigned int n) {
 }
 
 void SystemFreeString(wchar_t* s) {
+  // The block begins at the length, in front of what the caller has.
   if (s) DLLFree(reinterpret_cast<char*>(s) - sizeof(Count));
 }
 

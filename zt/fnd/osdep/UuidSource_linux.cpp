@@ -25,6 +25,8 @@ bool ReadRandomDevice(unsigned char* bytes) {
 
 // Requests of up to 256 bytes come whole from both sources once the pool is ready.
 bool NewUuidBytes(unsigned char (&bytes)[16]) {
+  // Flags 0: waits for the pool after the start of the machine, when two machines of one image
+  // would otherwise make the same identifiers.
   if (RetryEintr([&] { return getrandom(bytes, kSize, 0); }) != kSize && !ReadRandomDevice(bytes)) {
     return false;
   }

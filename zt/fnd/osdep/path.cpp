@@ -51,6 +51,8 @@ bool Equals(const String& text, const Component& component, const wchar_t* liter
 
 // The components that ".." and "." leave, last first; false if the path has no normal form.
 bool KeepComponents(const String& text, std::vector<Component>& kept) {
+  // From the last to the first: a ".." removes what comes before it, which is not known to go until
+  // the ".." has been seen.
   std::vector<Component> components = Split(text);
   size_type skip = 0;
   for (size_type i = static_cast<size_type>(components.size()); i-- > 0;) {
@@ -103,6 +105,7 @@ void path::MakePathEndInSlash(String& path) {
 
 String path::NormalizePath(const String& path) {
   if (!IsAbs(path)) return String();
+  // Most paths: nothing to take out, and no memory needed.
   if (path.find(L'.') == String::npos) return path;
   String text(path);
   bool appended = !EndsInSlash(text);

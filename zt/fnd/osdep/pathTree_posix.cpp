@@ -1,3 +1,7 @@
+// Trees are listed level by level with FindFiles, and the list of a level is complete before its
+// entries are touched, so that what a copy or a removal changes is not met by the listing. A copy
+// follows links, which can lead back up: the chain of source directories, by device and inode, ends
+// such a circle. A removal does not follow them.
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -24,6 +28,7 @@ using zt::posix::RetryEintr;
 namespace zt::fnd::osdep {
 namespace {
 
+// Bytes, on the stack.
 constexpr unsigned long kCopyBlock = 32768;
 
 // Decides whether names that differ in case only are one file in RenameFile and CpFile.
@@ -73,6 +78,7 @@ void CopyBytes(const BinaryFile& from, BinaryFile& to) {
 void CopyInto(BinaryFile& copy, const String& from, const String& to, bool overwrite) {
   DemandAbsolute(from, to);
   if (!overwrite && path::DoesFileExist(to)) ZT_RAISE(exception::FileAlreadyExists());
+  // Before anything is opened: opening the target with Truncate would empty the source.
   if (SameFileByName(from, to)) return;
   Entry source(from), target(to);
   if (source.sameAs(target)) return;

@@ -1,3 +1,6 @@
+// Each operation narrows its path once and makes the system calls on that. Questions answer false
+// where they cannot be answered, but for DoesFileExist, whose callers must not take a failing disk
+// for a missing file.
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -44,6 +47,8 @@ bool IsDirectoryText(const char* path) {
   return Stat(path, &info) == 0 && S_ISDIR(info.st_mode);
 }
 
+// Links are judged on the way (zt/posix/Files.h): nothing is made below a link that another user
+// has put there.
 bool LeadsToDirectory(const char* path) {
   zt::posix::ScopedFd found = zt::posix::LookUp(path);
   struct stat info;
@@ -63,6 +68,8 @@ int MakeOneDir(const char* path, bool useMode, mode_t mode) {
   zt::posix::ScopedFd made = zt::posix::LookUpEntry(parent, entry.name, O_DIRECTORY);
   if (made && zt::posix::ChangeMode(made.get(), mode) == 0) return 0;
   int failure = errno;
+  // A directory with another mode than asked for is not left: the next caller would take it for a
+  // good one.
   RetryEintr([&] { return ::unlinkat(parent, entry.name, AT_REMOVEDIR); });
   return failure;
 }
@@ -74,6 +81,7 @@ void CreateDirWorker(const wchar_t* path, bool useMode, mode_t mode) {
   text.erase(text.rfind('/') + 1);
   if (text.empty()) ZT_RAISE(exception::InvalidArgument());
   if (LeadsToDirectory(text.c_str())) return;
+  // From the top down; levels that are directories are left alone.
   for (std::string::size_type slash = 0; slash != std::string::npos;) {
     slash = text.find('/', slash + 1);
     std::string prefix = text.substr(0, slash);
@@ -113,6 +121,7 @@ std::string FreeName(const std::string& directory, const char* prefix) {
     if (::getentropy(&random, sizeof random) != 0) ZT_RAISE(PosixError());
     std::string name = start;
     for (size_t n = 0; n < kRandomLength; ++n) {
+      // Six digits of base 62 take 36 of the 64 bits.
       name += kNameCharacters[random % (sizeof kNameCharacters - 1)];
       random /= sizeof kNameCharacters - 1;
     }
@@ -129,6 +138,7 @@ std::string FreeName(const std::string& directory, const char* prefix) {
 
 String path::GetCWD() {
   for (;;) {
+    // getcwd allocates what is needed: no length of a path is certain.
     MallocText text(::getcwd(nullptr, 0), free);
     if (text) return String(text.get());
     if (errno != EINTR) ZT_RAISE(PosixError());
@@ -197,6 +207,8 @@ void path::RemoveFile(const String& path) { RemoveFile(path.c_str()); }
 
 void path::RemoveDir(const wchar_t* path) {
   if (!IsDirectory(path)) ZT_RAISE(exception::NonexistentException());
+  // rmdir refuses a link; the link itself is what the caller wants gone, not the directory that it
+  // leads to.
   if (IsSymLink(path)) {
     RemoveFile(path);
     return;
@@ -219,6 +231,7 @@ String path::ResolveSymLink(const String& path) {
   AnsiString narrow(path);
   struct stat info;
   if (LStat(narrow.c_str(), &info) != 0) ZT_RAISE(PosixError());
+  // A link that was replaced by a longer one since is cut; its text was out of date anyway.
   std::string text(static_cast<size_t>(info.st_size), '\0');
   ssize_t length = RetryEintr([&] { return ::readlink(narrow.c_str(), text.data(), text.size()); });
   if (length < 0) ZT_RAISE(PosixError());

@@ -1,3 +1,12 @@
+// How an event gets its semaphore. The lock file of the event's name says which: set number and
+// slot. Whoever finds itself alone with that file (exclusive) decides: it takes over the slot of a
+// dead process where all records still agree, or takes a free one. Everyone else joins what the
+// file says. The state-file mutex is held meanwhile, as the free lists of the sets are shared by
+// all events.
+//
+// The order of writes is what makes a kill harmless: the lock file, then the slot's record, then
+// the semaphore's value, then the shared lock. A process that dies in between leaves a file that
+// names a slot of another key, or a slot that the next opener of the name takes over.
 #include <sys/stat.h>
 
 #include <cerrno>
@@ -21,6 +30,7 @@ class Search {
  public:
   // False at the end of the search.
   bool goesOnAfter(const SemaphoreSet& set, SemaphoreSet::Room room) {
+    // A full set is a sign of life: the free one may be the next.
     if (room == SemaphoreSet::Room::None) {
       m_unusable = 0;
     } else if (set.state() != SemaphoreSet::State::Closed || ++m_closed > kClosedSets) {
@@ -125,6 +135,7 @@ bool EventData::takeOver(const EventFile& file, RefPtr<SemaphoreSet>& seen) {
   seen = m_statics->getOrCreateSemaphoreSet(place.set);
   SlotRecord record;
   if (!seen->usable() || !seen->readSlot(place.slot, record)) return false;
+  // Each field is another way in which the slot can have passed to an event of another name.
   if (!record.inUse || record.manualReset != m_manualReset || record.keyOrNext != file.key()) {
     return false;
   }
@@ -150,6 +161,8 @@ void EventData::allocate(const EventFile& file) {
 bool EventData::allocateIn(SemaphoreSet& set, unsigned slot, const EventFile& file) {
   const EventPlace::Bytes bytes = EventPlace{set.number(), slot}.encode();
   if (!file.write(bytes.data(), bytes.size(), 0)) ZT_RAISE(PosixError(ENOLCK));
+  // A failed transfer: the search goes on with the next set, and the lock file is written again for
+  // it.
   if (!set.take(slot, m_manualReset, file.key())) return false;
   m_set = RefPtr<SemaphoreSet>(&set);
   m_slot = slot;
@@ -165,6 +178,7 @@ bool EventData::join(const EventFile& file) {
   SlotRecord record;
   if (!set->usable() || !set->readSlot(place.slot, record)) return false;
   if (!record.inUse || record.keyOrNext != file.key()) return false;
+  // Not a closing event: waiting for it would not help.
   if (record.manualReset != m_manualReset) ZT_RAISE(PosixError(ENOLCK));
   m_set = set;
   m_slot = place.slot;
@@ -191,6 +205,8 @@ EventData::~EventData() {
 }
 
 void EventData::close() {
+  // Whoever gets the file alone is the last one. A failed attempt gives up the shared lock too, so
+  // that of two that close at once the later one succeeds.
   if (m_file.claim()) {
     try {
       Hold hold(m_statics->stateFileMutex);

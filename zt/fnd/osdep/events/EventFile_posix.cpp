@@ -31,6 +31,8 @@ constexpr int kProject = 1;  // of ftok
 
 bool GetLockAccessToFile(int fd) {
   for (int round = 0;; ++round) {
+    // Alone or shared, whichever is free. Neither is while another process has it alone, for the
+    // moment of its opening or closing.
     if (Flock(fd, LOCK_EX | LOCK_NB) == 0) return true;
     if (Flock(fd, LOCK_SH | LOCK_NB) == 0) return false;
     if (round == kLockRounds) ZT_RAISE(PosixError());
@@ -80,7 +82,10 @@ bool EventFile::Exists(const String& name) noexcept {
 bool EventFile::identify() {
   struct stat info;
   if (::fstat(m_fd.get(), &info) != 0) ZT_RAISE(PosixError());
+  // Empty: this opening has made it, or one that died before its first write.
   m_discard = info.st_size == 0;
+  // ftok makes the key from the device and inode of the path, so that all who open the same file
+  // come to the same semaphores.
   m_key = RetryEintr([&] { return ::ftok(m_path->c_str(), kProject); });
   if (m_key == -1) {
     if (errno != ENOENT) ZT_RAISE(PosixError());
@@ -111,6 +116,8 @@ void EventFile::settle() noexcept {
 }
 
 bool EventFile::claim() noexcept {
+  // A child that is forked from here on has no copy, which would look like one more user that never
+  // leaves.
   m_fd.keepOnFork(false);
   m_exclusive = Flock(m_fd.get(), LOCK_EX | LOCK_NB) == 0;
   return m_exclusive;
@@ -123,6 +130,8 @@ bool EventFile::unlink() const noexcept {
 
 void EventFile::close() noexcept {
   if (!m_fd.valid()) return;
+  // A copy that came through fork shares the open file with the parent: LOCK_UN would free the
+  // parent's lock.
   if (m_process.isCurrent()) {
     int saved = errno;
     if (m_discard && m_exclusive) unlink();

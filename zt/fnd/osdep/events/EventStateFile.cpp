@@ -1,3 +1,6 @@
+// Fields are copied one by one by memcpy, and no structure is laid over the bytes: the records have
+// no padding, so that most fields are unaligned, and compilers of 32 and 64 bits would lay out
+// structures differently.
 #include "zt/fnd/osdep/events/EventStateFile.h"
 
 #include <algorithm>
@@ -47,6 +50,7 @@ SetHeader::Bytes SetHeader::encode() const {
 bool SetHeader::decode(const Bytes& bytes) {
   *this = SetHeader();
   if (Get<uint32_t>(&bytes[0]) != kMagic) return false;
+  // Any other value is none that this code writes, and is not trusted.
   ready = bytes[kReadyOffset] == 1;
   count = Get<uint32_t>(&bytes[6]);
   freeCount = Get<uint32_t>(&bytes[kFreeOffset]);

@@ -27,6 +27,8 @@ RefPtr<NamedEventGlobalStatics> NamedEventGlobalStatics::Get() {
 }
 
 RefPtr<SemaphoreSet> NamedEventGlobalStatics::getOrCreateSemaphoreSet(unsigned number) {
+  // Held across the making of the set, files included: two objects of one number in a process would
+  // lock the same state file against each other.
   Hold hold(section);
   auto found = m_sets.find(number);
   if (found != m_sets.end()) return RefPtr<SemaphoreSet>(found->second);
@@ -73,6 +75,7 @@ void NamedEventGlobalStatics::removeSemaphoreSet(const SemaphoreSet& set) {
 void NamedEventGlobalStatics::removeNamedEvent(const EventData& event) {
   Hold hold(section);
   auto found = m_events.find(event.name());
+  // The entry may be a newer object of the name: this one is removed by identity.
   if (found != m_events.end() && found->second == &event) m_events.erase(found);
 }
 

@@ -1,3 +1,10 @@
+// A set is made by whoever has its state file alone: the bytes of an empty set are written, the
+// kernel's set is made or found by the file's key, and the ready flag is set last. So a file
+// without the flag is one whose maker died, and is made again. The last user to close clears the
+// flag, removes the kernel's set and then the file, in this order, for the same reason.
+//
+// Removing is by IPC_RMID, which wakes every waiter of the set with EIDRM: a process that still
+// waits there has an event whose files are gone, and must not wait indefinitely.
 #include "zt/fnd/osdep/events/SemaphoreSet.h"
 
 #include <sys/ipc.h>
@@ -20,6 +27,7 @@ namespace {
 
 constexpr int kSetMode = 0777;
 
+// semctl(2) leaves the definition to its callers.
 union SemctlArgument {
   int value;
   semid_ds* info;
@@ -57,6 +65,7 @@ void SemaphoreSet::open() {
       m_state = State::Usable;
       return;
     }
+    // A set of the kernel outlives its maker. One that was found stays: it may be another's.
     if (m_made) RemoveSet(m_id);
   } catch (const PosixError& e) {  // Callers skip a set that is not available.
     if (e.whatcode() == EWOULDBLOCK) {
@@ -126,6 +135,7 @@ bool SemaphoreSet::readSlot(unsigned slot, SlotRecord& record) const {
   bool ready;
   unsigned count, freeCount, firstFree;
   if (!readHeader(ready, count, freeCount, firstFree)) return false;
+  // Two limits: the count is what the file says, and any user can write there.
   if (slot >= count || slot >= kSlotsPerSet) return false;
   SlotRecord::Bytes bytes;
   if (!m_file.read(bytes.data(), bytes.size(), SlotRecord::Offset(slot))) return false;
@@ -170,6 +180,7 @@ SemaphoreSet::Room SemaphoreSet::firstFree(unsigned& slot) const {
 bool SemaphoreSet::take(unsigned slot, bool manualReset, key_t key) {
   SlotRecord record;
   if (!readSlot(slot, record)) return false;
+  // Not checked here: a wrong successor is found by firstFree() when it is to be taken.
   const unsigned next = static_cast<unsigned>(record.keyOrNext);
   record = SlotRecord{true, manualReset, key};
   unsigned oldFirst;
