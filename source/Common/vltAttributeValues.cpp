@@ -1,3 +1,11 @@
+// A value becomes text in two steps: the attribute's type is asked of the object's class, and the
+// type selects the getter and the conversion. Arrays differ in their element only, so that they are
+// one template over kinds of elements; each kind says how to get the elements, how to print one and
+// how to give one back.
+//
+// The storage is another module, of which each answer is a risk: it may throw, write something and
+// fail, or report more than it has. So every reference and text is owned from the line after it
+// came, and counts are cut to the space that was made.
 #include "source/Common/vltAttributeValues.h"
 
 #include <algorithm>
@@ -33,6 +41,7 @@ HRESULT Obtain(CztComPtr<I>* out, Step step) {
 
 GUID IdentityOf(IvltObject* object) {
   GUID id = GUID_NULL;
+  // The result is dropped: an object without an id prints as the null GUID.
   object->GetObjectID(&id);
   return id;
 }
@@ -104,6 +113,8 @@ class ElementBuffer {
   HRESULT fill(IvltObject* object, unsigned id) {
     uint32_t count = m_capacity;
     HRESULT result = (object->*Kind::kGet)(id, m_capacity, m_elements, &count);
+    // A storage that sets no count is taken to have filled the space; a number beyond the space is
+    // not believed.
     m_count = std::min(count, m_capacity);
     return result;
   }
@@ -136,6 +147,8 @@ template <class Kind>
 HRESULT AppendArray(IvltObject* object, unsigned id, const char* hookPoint, String& text) {
   uint32_t count = 0;
   HRESULT result = (object->*Kind::kGet)(id, 0, nullptr, &count);
+  // Asked for with a null buffer first. The array may change until the second call, which gets its
+  // own count.
   if (result >= 0 && count > 0) {
     if (vltTestHook(hookPoint)) return ReportOutOfMemory();
     ElementBuffer<Kind> buffer(count);
@@ -170,6 +183,7 @@ HRESULT StringText(IvltObject* object, unsigned id, wchar_t** text) {
 HRESULT ReferenceText(IvltObject* object, unsigned id, wchar_t** text) {
   IvltObject* found = nullptr;
   HRESULT result = object->GetReferenceAttribute(id, &found);
+  // A failed getter returns no reference, and must not be released.
   if (result < 0) found = nullptr;
   auto owned = CztComPtr<IvltObject>::Attach(found);
   *text = vltGuidToString2(found ? IdentityOf(found) : GUID_NULL);
@@ -248,6 +262,8 @@ HRESULT vltGetAttributeValueAsString2(IvltObject* object, unsigned id, wchar_t**
 
 HRESULT vltGetAttributeValueAsStringImpl(IvltObject* object, unsigned id, wchar_t** text) {
   if (!text) return E_POINTER;
+  // An own pointer in between: the inner function writes some texts also with a failure, which this
+  // one promises not to.
   TaskMem<wchar_t> made;
   HRESULT result = vltGetAttributeValueAsString2(object, id, made.out());
   if (result >= 0) *text = made.release();

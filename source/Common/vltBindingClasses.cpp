@@ -1,3 +1,6 @@
+// The text is parsed in one pass from separator to separator. There is no error: files in the field
+// hold texts that were cut or written by hand, and what can be read of them counts. Once built, a
+// table is only read, so that it needs no lock.
 #include "source/Common/vltBindingClasses.h"
 
 #include <cstring>
@@ -40,10 +43,12 @@ CvltBindingClasses::CvltBindingClasses(const String& text) {
   unsigned pos = 0;
   for (;;) {
     unsigned colon = text.find(kSeparator, pos);
+    // An entry without a count is the end, not an entry with no classes.
     if (colon == String::npos || colon + 1 == text.length()) return;
     GUID id = GuidField(text, pos, colon);
     unsigned next = text.find(kSeparator, colon + 1);
     unsigned countEnd = next == String::npos ? text.length() : next;
+    // A count that is no number, or is negative, means no classes.
     long n = wcstol(text.substr(colon + 1, countEnd - colon - 1).c_str(), nullptr, 10);
     Vector<GUID> classes = ClassFields(text, n, &next);
     m_table[id].swap(classes);
@@ -83,6 +88,7 @@ void vltAddBindingClasses(const _vltComponent2* record, const CvltBindingClasses
   std::vector<BindingClassesMap::iterator> entered;
   try {
     classes.GetBindingClassesForComponent(record->identifier, wanted);
+    // Before the first entry: the undo below must not need memory.
     entered.reserve(wanted.size());
     for (unsigned i = 0; i < wanted.size(); ++i) {
       if (i == 1) vltTestHook(vlt::hook::kAddBindingClass);

@@ -27,5 +27,6 @@ HRESULT vltCreateGuid2(GUID* out) {
     HRESULT result = FindGuidCreate();
     if (result < 0) return result;
   }
+  // The entry's own codes mean nothing to callers here; 0 is its success.
   return g_GuidCreate.load()(out) == 0 ? S_OK : E_FAIL;
 }

@@ -10,6 +10,7 @@
 
 namespace {
 
+// Characters. Callers see the capacity that grows by it.
 constexpr size_t kAppendStep = 360;
 
 wchar_t* AllocateText(size_t characters) {
@@ -40,6 +41,7 @@ HRESULT vltDuplicateString2(const wchar_t* s, wchar_t** out) {
 HRESULT vltAppendString2(wchar_t** buffer, const wchar_t* tail, size_t* capacity) {
   if (!buffer || !*buffer || !tail || !capacity) return E_POINTER;
   size_t length = wcslen(*buffer);
+  // Measured before anything moves: the tail may be a part of the buffer.
   size_t tailSizeBytes = (wcslen(tail) + 1) * sizeof(wchar_t);
   size_t needed = length + tailSizeBytes / sizeof(wchar_t);
   if (needed >= *capacity) {
@@ -56,6 +58,7 @@ HRESULT vltAppendString2(wchar_t** buffer, const wchar_t* tail, size_t* capacity
     *buffer = grown;
     return S_OK;
   }
+  // Not wcscat: the tail may be the text itself, whose terminator the copy overwrites.
   memmove(*buffer + length, tail, tailSizeBytes);
   return S_OK;
 }

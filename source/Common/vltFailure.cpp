@@ -10,6 +10,7 @@
 #include "zt/fnd/osdep/NamedEvent.h"
 
 void vltTraceError(const char* format, ...) {
+  // Before the formatting, which most processes never need.
   if (!(vlt_vlTracer::GetTraceMask() & kTraceErrors)) return;
   char message[2048];  // As much as one line of the log takes.
   va_list args;

@@ -1,3 +1,9 @@
+// Files and directories of the installation are shared by all users, and each is given mode 0777 by
+// the process that makes it. Two dangers shape this source. Between making something and opening it
+// a process may be killed, which would leave it closed to all others: directories are therefore
+// made under another name and renamed when they are ready. And in directories that all may write
+// to, another user may put a link where a file was: modes are therefore changed through descriptors
+// (zt/posix/Files.h), never by a path that could lead elsewhere.
 #include "source/Common/vltFileSecurity.h"
 
 #include <dirent.h>
@@ -41,11 +47,15 @@ bool IsDirectoryAt(int parent, const char* name) {
 // above.
 bool MakeOpenDirectory(const String& directory) {
   std::string target = WithoutSlashes(directory);
+  // A relative path, and the root, are left to path::CreateDir, which refuses the one and finds the
+  // other.
   if (target.empty() || target[0] != '/') return false;
   zt::posix::Entry entry(target.c_str());
   if (!entry.valid()) return false;
   int parent = entry.directory.get();
   std::string unfinished = std::string(entry.name) + kUnfinished;
+  // EEXIST: a killed process has left it, or another one is making it now. Whoever renames first
+  // wins.
   if (mkdirat(parent, unfinished.c_str(), kSharedMode) != 0 && errno != EEXIST) return false;
   ScopedFd made = zt::posix::LookUpEntry(parent, unfinished.c_str(), O_DIRECTORY);
   if (made.valid() && zt::posix::SetSharedMode(made.get(), kSharedMode) == 0 &&
@@ -86,6 +96,7 @@ class TreeMode {
  private:
   // Leaves the status alone if there are no entries; else returns that of the last one visited.
   HRESULT changeEntries(int directory, HRESULT status) {
+    // The descriptor of the walk is O_PATH, which cannot be listed.
     ScopedFd fd = zt::posix::OpenDirectory(directory);
     std::unique_ptr<DIR, int (*)(DIR*)> entries(fd.valid() ? fdopendir(fd.get()) : nullptr,
                                                 closedir);

@@ -67,6 +67,8 @@ int vltStringToGUID(const wchar_t* s, GUID* out) {
 GUID vltGuidFromString2(const wchar_t* s) {
   GUID g = GUID_NULL;
   if (!s) return g;
+  // One brace anywhere decides: a text with a brace in the wrong place is bad text, and is not
+  // completed to a good one.
   if (wcschr(s, L'{')) {
     vltStringToGUID(s, &g);
   } else {
@@ -76,6 +78,7 @@ GUID vltGuidFromString2(const wchar_t* s) {
 }
 
 int vltDceGuidCompare2(const GUID& a, const GUID& b) {
+  // memcmp over the whole record would compare the numbers' low bytes first on little-endian hosts.
   auto numbers = [](const GUID& g) { return std::tie(g.Data1, g.Data2, g.Data3); };
   if (numbers(a) != numbers(b)) return numbers(a) > numbers(b) ? 1 : -1;
   int order = memcmp(a.Data4, b.Data4, sizeof a.Data4);

@@ -17,6 +17,7 @@ void FreeTexts(Record& record) {
   vltTaskMemFree(record.name);
   vltTaskMemFree(record.fileName);
   if (record.type == vltComponentDataDictionary) {
+    // By type only: of other types these fields overlay numbers.
     vltTaskMemFree(record.dictionary.prefix);
     vltTaskMemFree(record.dictionary.auxString1);
     vltTaskMemFree(record.dictionary.auxString2);

@@ -40,6 +40,7 @@ wchar_t* vltI32ToString2(int v) {
 
 wchar_t* vltF64ToString2(double v) {
   char text[64];
+  // Fifteen digits, and not the seventeen of a full round trip: 0.1 prints as it was written.
   snprintf(text, sizeof text, "%.15g", v);
   return Dup(text);
 }
@@ -48,6 +49,8 @@ unsigned vltU32FromString2(const wchar_t* s) {
   return s ? static_cast<unsigned>(wcstoul(s, nullptr, 10)) : 0;
 }
 
+// wcstol saturates at the limits of long before the cut, so that on 32 bits too large a number is
+// the largest, and on 64 bits its low half.
 int vltI32FromString2(const wchar_t* s) { return s ? static_cast<int>(wcstol(s, nullptr, 10)) : 0; }
 
 double vltF64FromString2(const wchar_t* s) { return s ? wcstod(s, nullptr) : 0; }

@@ -1,3 +1,8 @@
+// A query crosses processes as a row of values in a fixed order, without marks between them, so
+// that a reader that goes wrong once is wrong to the end: every step stops at the first failure.
+// What comes in is another process's word. A count takes zeroed memory that costs nothing until it
+// is written to, types are stored only once they were read, and texts are owned by the term from
+// that moment, so that vltFreeQuery is right after a failure at any place.
 #include "source/Common/vltQuery.h"
 
 #include <algorithm>
@@ -14,6 +19,7 @@
 namespace {
 
 constexpr int32_t kFormatVersion = 1;
+// Enough for the line of a query of numbers and GUIDs; texts make it grow.
 constexpr uint64_t kCharactersPerTerm = 72;
 constexpr uint64_t kCharactersOfFrame = 40;
 
@@ -41,6 +47,7 @@ HRESULT WriteValue(const _vltQueryTerm& term, IvltOutputStream* stream, HRESULT 
     case vltF64Type:
       return stream->WriteF64(term.value.f64);
     case vltStringType:
+      // Its result is not read: that of the text which follows is the result of the value.
       stream->WriteI32(static_cast<int32_t>(term.tildeFlag));
       return stream->WriteString(term.value.string);
     case vltGuidType:
@@ -239,6 +246,7 @@ HRESULT vltMarshalQueryFromStream(IvltInputStream* stream, _vltQuery* query) {
   if (!stream || !query) return E_POINTER;
   int32_t version = 0;
   HRESULT result = stream->ReadI32(&version);
+  // Another version's fields are not known, so none is touched.
   if (result < 0 || version != kFormatVersion) return result;
   result = ReadFrame(stream, query);
   if (result < 0) return result;
@@ -247,6 +255,7 @@ HRESULT vltMarshalQueryFromStream(IvltInputStream* stream, _vltQuery* query) {
     result = ReadTerm(stream, &term);
     if (result < 0) break;
   }
+  // Successes of the storage's reads may be other than S_OK.
   return result < 0 ? result : S_OK;
 }
 
@@ -265,6 +274,7 @@ HRESULT vltConvertQueryToString(const _vltQuery* query, wchar_t** text) {
 HRESULT vltFreeQuery(_vltQuery* query) {
   if (!query) return S_OK;
   for (const _vltQueryTerm& term : TermsOf(*query)) {
+    // The union has a pointer in this case only.
     if (term.attributeType == vltStringType) vltTaskMemFree(term.value.string);
   }
   vltTaskMemFree(query->terms);

@@ -63,6 +63,8 @@ extern "C" unsigned vltTestHook(const char* name) {
     zt::fnd::osdep::Sleep(hangTimeInMSecs);
     return 1;
   }
+  // exit and not _exit: the process under test ends as one that a host ends, with its exit
+  // handlers.
   if (causeCrash) exit(0);
   if (simulateMemoryAllocationFailure) return 1;
   if (simulateMemoryAllocationFailureAndThrow) throw std::bad_alloc();

@@ -1,3 +1,6 @@
+// The names of types are data: one table has every dialect's name of a type, its tag and its bits,
+// and the functions below are look-ups in it. Words that users may write are a second table, since
+// several of them name one type.
 #include <array>
 
 #include "source/Common/vltcmn.h"
@@ -66,6 +69,7 @@ const TypeRow& Row(_vltAttributeType t) {
   return kTypes[index < kTypes.size() ? index : 0];
 }
 
+// Words are compared in any case; no two of one table are equal, so that their order means nothing.
 struct Word {
   const wchar_t* text;
   int32_t value;
@@ -107,11 +111,13 @@ constexpr Word kClientWords[] = {
 template <size_t N>
 int32_t Find(const Word (&words)[N], const wchar_t* s) {
   for (const Word& word : words) {
+    // A null text compares as an empty one, which is no word.
     if (StringCaseCompare(s, word.text) == 0) return word.value;
   }
   return 0;
 }
 
+// An id: number in bits 0 to 12, array bits in 13 to 15, type tag above.
 constexpr unsigned kNumberMask = 0x1FFF;
 constexpr unsigned kArrayBitsMask = 0xE000;
 constexpr unsigned kArrayBitsShift = 13;
@@ -179,6 +185,7 @@ unsigned vltMakeExternalAttributeID2(unsigned id, _vltAttributeType t) {
 }
 
 unsigned vltAttributeIDExternalToInternal2(unsigned id) {
+  // Only a typed tag of references differs between the sides; ids without a tag have 0 there.
   if (id >> 16 != kLumExternalReferences) return id;
   unsigned low = vltMakeInternalAttributeID2(id & kNumberMask, vltReferenceArrayType);
   return vltLumMakeTypedTag2(kLumBlob, static_cast<unsigned short>(low));

@@ -1,3 +1,11 @@
+// A question names a file and a key, and is answered from the components of the database whose own
+// file has the same base name. Three things keep many questions cheap: the database is read once
+// and kept, an index from file to sections grows with the walk through the list of components, and
+// each answer is kept under all of the question. The index is built no further than needed: a
+// question without a separator ends at its first match.
+//
+// The early-trace warnings are a part of the behaviour: with them switched on every question walks
+// the list from its start again, so that each repeats the warnings that it would give alone.
 #include <cstring>
 
 #include <algorithm>
@@ -22,6 +30,7 @@ enum EarlyTraceLine : long {
 };
 
 constexpr const char* kComponents = "KORComponents";
+// Bytes with the terminator; a longer value is cut, and then names another file or none.
 constexpr size_t kFileNameSize = 260;
 
 bool Warns() { return (vltGetTraceFlagsImpl() & kEarlyTraceMask) >= kEarlyTraceWarnings; }
@@ -161,6 +170,8 @@ void vltStringResources::Database::answer(ResourceQuery& q) {
     return;
   }
   search(q);
+  // The joined text may be longer than any one; what does not fit is never returned, and need not
+  // be kept.
   q.joined.resize(std::min<size_t>(q.joined.size(), q.maxLength));
   if (!q.outOfMemory) known.emplace(q.target, Answer{q.result, q.joined});
 }
@@ -190,6 +201,7 @@ void vltStringResources::forget() {
 
 vltStringResources::Database* vltStringResources::databaseFor(const std::string& file) {
   std::string directory;
+  // A dictionary of the previous version brings its database along, in its own directory.
   if (file.find("/Last/") != std::string::npos) {
     directory = file.substr(0, file.rfind('/'));
   } else {

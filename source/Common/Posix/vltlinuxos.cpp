@@ -1,3 +1,5 @@
+// Helpers that work before, or without, the log: the early trace writes to standard output, and the
+// place of the log is found without asking where the installation is.
 #include "source/Common/Posix/vltlinuxos.h"
 
 #include <fcntl.h>
@@ -25,6 +27,7 @@ using zt::fnd::osdep::path;
 using zt::posix::ScopedFd;
 
 void vltEarlyTrace(const char* sourceName, long line, const char* format, ...) {
+  // A line that is longer is cut; early tracing must not need the heap.
   char message[2048];
   va_list args;
   va_start(args, format);
@@ -46,7 +49,9 @@ unsigned ReadTraceFlags() {
   if (!fd && zt::posix::IsPassing(errno)) throw std::bad_alloc();
   char buffer[256];  // outlives the stream
   std::unique_ptr<FILE, int (*)(FILE*)> in(fd.valid() ? fdopen(fd.get(), "r") : nullptr, fclose);
+  // fdopen fails for memory only: descriptor and mode are good.
   if (fd.valid() && !in) throw std::bad_alloc();
+  // The stream owns the descriptor now, and its fclose is the one close.
   if (in) fd.release();
   if (in) setvbuf(in.get(), buffer, _IOFBF, sizeof buffer);
   unsigned first = 0, second = 0;
@@ -75,6 +80,8 @@ String vlLogDirectory() {
   // Not from the environment of a user who runs a program with more rights than the own.
   const char* home = secure_getenv("HOME");
   String root(L"/tmp/zentrex");
+  // HOME is not asked for: sudo may leave that of another user, in whose directory no log of root
+  // belongs.
   if (geteuid() == 0) {
     root = L"/Library/Logs";
   } else if (home) {
@@ -102,6 +109,8 @@ unsigned ReadOption(IniStructForwardReferenceTag* ini, const char* section, cons
                     unsigned fallback) {
   uint32_t value = 0;
   if (IniGetUInt(ini, section, key, &value) == 1) return value;
+  // A malformed value counts as a missing one, so that a slip in one section does not silence the
+  // log.
   return IniGetUInt(ini, "AllComponents", key, &value) == 1 ? value : fallback;
 }
 

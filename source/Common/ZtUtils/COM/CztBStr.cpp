@@ -22,6 +22,8 @@ CztBStr& CztBStr::operator=(const CztBStr& other) {
 }
 
 CztBStr& CztBStr::operator=(const zt::fnd::String& text) {
+  // Freed first, unlike in the other assignments: without memory the result is a null text, and not
+  // the old one.
   clear();
   m_text = ZtSysAllocString(text.c_str());
   return *this;
@@ -48,5 +50,6 @@ zt::fnd::AnsiString CztBStr::ToFNDAnsiString() const {
 }
 
 bool CztBStr::operator<(const CztBStr& other) const {
+  // Not an order for containers: a null text is equivalent to every other.
   return m_text && other.m_text && wcscmp(m_text, other.m_text) < 0;
 }

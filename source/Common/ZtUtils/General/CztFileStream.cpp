@@ -1,3 +1,8 @@
+// A thin layer over BinaryFile that turns its exceptions into results, and the place where a
+// stream's sub-streams meet its file: they are loaded when the file is opened for reading, and
+// written by the destructor. The order in Init matters: the stream is a closed one until the file
+// is open, and the sub-streams are loaded last, so that damaged ones leave an open file of which
+// every byte is data.
 #include "source/Common/ZtUtils/General/CztFileStream.h"
 
 #include <new>
@@ -44,6 +49,8 @@ CztFileStream* CztFileStream::CreateStream(const zt::fnd::String& name, bool tru
 }
 
 CztFileStream::~CztFileStream() {
+  // A destructor has no result. Who wants it calls WriteSubStreamInfo before, after which this does
+  // nothing.
   if (m_canWrite && m_file) WriteSubStreamInfo();
 }
 
@@ -86,6 +93,8 @@ HRESULT CztFileStream::Write(const void* buffer, unsigned int count, unsigned in
 HRESULT CztFileStream::Seek(int64_t offset, ztSeekMode mode, int64_t* position) {
   if (position) *position = 0;
   if (!m_file) return E_INVALIDARG;
+  // An enumeration with a fixed type may hold any number; lseek knows further modes, which are not
+  // meant.
   if (mode < ztSeekBegin || mode > ztSeekEnd) return S_OK;
   int64_t now = m_file->seek(offset, static_cast<BinaryFile::Origin>(mode));
   if (now < 0) return E_FAIL;
@@ -103,6 +112,7 @@ HRESULT CztFileStream::SetSize(uint64_t size) {
     m_file->seek(end, BinaryFile::Origin::Begin);
     m_file->resize(end);
   });
+  // The cursor is put back where it was, or to the new end if it would lie outside.
   m_file->seek(resized ? std::min(old, end) : old, BinaryFile::Origin::Begin);
   return resized ? S_OK : E_FAIL;
 }

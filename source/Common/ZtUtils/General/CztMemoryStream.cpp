@@ -1,3 +1,6 @@
+// Three numbers describe the block: what is allocated, what is data, and the cursor, which is
+// signed, since a Seek may put it in front of the start. Sizes are 32-bit numbers, as the counts of
+// the interface are; sums of them are made in 64 bits.
 #include "source/Common/ZtUtils/General/CztMemoryStream.h"
 
 #include <algorithm>
@@ -9,6 +12,7 @@ namespace {
 constexpr uint64_t kFirstBlock = 64;
 constexpr uint64_t kLargestBlock = UINT32_MAX;
 
+// A sum that wraps would turn a seek far forward into one in front of the start.
 int64_t SaturatedSum(int64_t a, int64_t b) {
   int64_t sum;
   if (!__builtin_add_overflow(a, b, &sum)) return sum;
@@ -58,6 +62,7 @@ HRESULT CztMemoryStream::Write(const void* buffer, unsigned int count, unsigned 
 HRESULT CztMemoryStream::growTo(uint64_t size) {
   if (size <= m_capacity) return S_OK;
   uint64_t capacity = m_capacity > 0 ? uint64_t{m_capacity} * 2 : kFirstBlock;
+  // In 64 bits: a size below 2^33 cannot make the doubling wrap.
   while (capacity < size) capacity *= 2;
   if (capacity > kLargestBlock) return E_INVALIDARG;
   return resizeBlock(static_cast<uint32_t>(capacity));
@@ -108,6 +113,7 @@ unsigned char* CztMemoryStream::DetachBuffer() {
 
 HRESULT CztMemoryStream::AttachBuffer(unsigned char* buffer, unsigned long size, bool readOnly) {
   if (size > kLargestBlock || (!buffer && size > 0)) return E_INVALIDARG;
+  // A caller may attach the block that the stream has: it must not be freed.
   if (buffer != m_begin) dropBlock();
   takeBlock(buffer, static_cast<uint32_t>(size), readOnly);
   loadSubStreams(!readOnly, 0);

@@ -1,3 +1,12 @@
+// Sub-streams live in an area after the stream's own data: they are taken into memory, and the area
+// cut off, when the stream is loaded; they are appended again when it is written. Between the two
+// the stream is its data alone, and its end is where a user expects it. A stream that may not be
+// changed keeps its area, and then never writes one, or the file would have two.
+//
+// Loading is all or nothing. Everything is read and checked into a map of its own, and only then
+// merged and the area cut, so that a damaged file stays as it was, every byte of it data. The depth
+// of areas within areas is limited, as each costs a frame of the stack and the nesting is the
+// file's word.
 #include "source/Common/ZtUtils/General/CztStreamBaseImp.h"
 
 #include <climits>
@@ -81,6 +90,7 @@ HRESULT CopyContents(IztStream* from, IztStream* to) {
   from->Seek(0, ztSeekEnd, &size);
   from->Seek(0, ztSeekBegin, nullptr);
   if (size == 0) return S_OK;
+  // One Read takes 32 bits; a stream beyond that could not be held in a block either.
   if (size < 0 || size > UINT_MAX) return E_OUTOFMEMORY;
   auto count = static_cast<unsigned int>(size);
   CztOwnedBlock bytes(static_cast<unsigned char*>(malloc(count)));
@@ -110,6 +120,7 @@ HRESULT CztStreamBaseImp::LoadSubStreamInfo(int writable) { return loadSubStream
 
 HRESULT CztStreamBaseImp::loadSubStreams(bool writable, unsigned depth) {
   if (m_subStreamsLoaded) return S_OK;
+  // Before the reading: damaged sub-streams are not tried again.
   m_subStreamsLoaded = true;
   m_subStreamsWritable = writable;
   CursorKeeper cursor(this);
@@ -186,12 +197,14 @@ HRESULT CztStreamBaseImp::WriteSubStreamInfo() {
   if (m_subStreamsWritten) return S_OK;
   m_subStreamsWritten = true;
   if (!m_subStreamsWritable || m_subStreams.empty()) return S_OK;
+  // Before the first byte: such a stream could be written but not read.
   if (nestsDeeperThan(kDeepestArea)) return E_INVALIDARG;
   int64_t start = 0;
   HRESULT result = Seek(0, ztSeekEnd, &start);
   if (result < 0) return result;
   result = Guarded([&] { return writeArea(start); });
   if (result < 0) {
+    // Half of an area would be taken for data by the next reader.
     truncateTo(start);
     return result;
   }
@@ -271,6 +284,7 @@ HRESULT CztStreamBaseImp::Clone(IztStream* target) {
   HRESULT result = CopyContents(this, target);
   for (auto entry = m_subStreams.begin(); result >= 0 && entry != m_subStreams.end(); ++entry) {
     CztComPtr<IztStream> copy;
+    // A sub-stream of the target with this name is appended to, as the target's own contents are.
     result = streams->CreateSubStream(entry->first.c_str(), copy.out());
     if (result >= 0 && copy) result = entry->second->Clone(copy.get());
   }

@@ -1,3 +1,7 @@
+// The reader knows how many bytes the area has and takes each value off that number before it reads
+// it. Counts and lengths come from the file: a count is held against the smallest entry there can
+// be, a length against what is left, and memory is taken only after that, so that no number in a
+// damaged file costs more than the file's own size.
 #include "source/Common/ZtUtils/General/ztSubStreamArea.h"
 
 #include <cstring>
@@ -90,6 +94,7 @@ bool ReadSubStreamTrailer(IztStream* stream, int64_t streamSize, int64_t* offset
   stream->Seek(streamSize - kSubStreamTrailerSize, ztSeekBegin, nullptr);
   ztReadStreamBytes(stream, trailer, sizeof trailer);
   memcpy(offset, trailer + sizeof kSubStreamMarker, sizeof *offset);
+  // -1 is what a stream without an area remembers, and no place.
   return memcmp(trailer, &kSubStreamMarker, sizeof kSubStreamMarker) == 0 && *offset != -1;
 }
 
@@ -105,6 +110,8 @@ std::vector<CztSubStreamBlock> ReadSubStreamArea(IztStream* stream, int64_t offs
 
 CztSubStreamAreaWriter::CztSubStreamAreaWriter(IztStream* stream, size_t count)
     : m_out(stream, 1, 0, 0) {
+  // After the typed header, which the writer's constructor has put at the cursor: that is where the
+  // area begins.
   m_out << static_cast<int32_t>(count);
 }
 

@@ -4,6 +4,8 @@ namespace Toolyard {
 namespace {
 
 zt::fnd::String NameOrDefault(const wchar_t* name) {
+  // All mutexes without a name are one, for every process of the machine: the file system knows no
+  // file without a name.
   return zt::fnd::String(name && *name ? name : L"UNNAMED_MUTEX");
 }
 
@@ -28,6 +30,7 @@ CztMutex::CztMutex(bool pumpMsgs, const wchar_t* name, bool initiallyOwned)
   m_pumpMsgs = pumpMsgs;
 }
 
+// The timeout is part of the common shape; flock has no wait with a limit.
 bool CztMutex::Lock(int) {
   m_mutex.lock();
   return true;

@@ -1,3 +1,7 @@
+// The semaphore is a count and a manual-reset event for those who found none left. Waiters take the
+// section, look at the count, and wait for the event if there is none; a wake is a hint only, since
+// another thread may have taken the unit. Event and count change together inside the section, so
+// that no waiter sleeps while a released unit is left.
 #include <algorithm>
 #include <cstdint>
 #include <limits>
@@ -96,6 +100,7 @@ bool CztStatefulMutex::LockAndSetState(bool setState, int wait) {
     return false;
   }
   zt::fnd::osdep::UnlockUnlessKept release(m_mutex);
+  // Inside the lock: two holders in a row could otherwise set and reset in the wrong order.
   if (setState) m_event.set();
   release.keep();
   return true;

@@ -1,3 +1,6 @@
+// Values have no tags: reader and writer agree on their order, and the header says in which byte
+// order the writer's machine had its numbers. Only the reader ever reverses bytes, so that streams
+// between machines of one kind cost nothing.
 #include "source/Common/ZtUtils/General/ztTypedStream.h"
 
 #include <algorithm>
@@ -56,6 +59,7 @@ CztOutStream::CztOutStream(const CztOutStream& outer, int major, int minor, int 
     : CztOutStream(outer.m_stream, major, minor, sequence) {}
 
 void CztOutStream::writeHeader() {
+  // The byte order first and in one byte, as the rest of the header is already written in it.
   *this << static_cast<unsigned char>(m_byteOrder) << m_majorVersion << m_minorVersion
         << m_sequenceNumber;
 }
@@ -112,6 +116,7 @@ CztInStream& CztInStream::operator>>(zt::fnd::AnsiString& text) {
     ztReadStreamBytes(m_stream, read.begin() + start, piece);
     left -= piece;
   }
+  // Only now: a text that does not come whole leaves the target as it was.
   text = read;
   return *this;
 }
