@@ -1,3 +1,8 @@
+// The second name is a hard link, so that it costs no copy and appears whole. Each step ends with a
+// sync of what the next one relies on: the file's bytes before it gets the second name, the
+// directory before the first save that is not synced, and all of it again before the second name
+// goes. A power cut between any two of them leaves a state that takeUp() can judge by the sidecar
+// alone.
 #include "source/DurableCopy.h"
 
 #include <errno.h>
@@ -50,6 +55,8 @@ Match MatchesSidecar(const std::string& file) {
       return Match::No;
   }
   ScopedFd fd = zt::posix::OpenExisting(file.c_str(), O_RDONLY);
+  // Unknown, and not No: a file that cannot be opened for lack of descriptors must not be replaced
+  // by an older one.
   if (!fd) return errno == ENOENT ? Match::No : Match::Unknown;
   return Compare(fd, expected);
 }
@@ -88,13 +95,18 @@ bool DurableCopy::begin() {
   // One that a process has left which did not finish is older than what the file holds now, but no
   // value has been promised since. It stays what counts until everything is on disk.
   m_pending = isLeft();
+  // The directory is synced all the same: the name may have been made just before the other process
+  // died.
   if (m_pending) {
     syncDirectory();
     return WhatIsLeft(m_copy) == Left::Yes;
   }
   if (ztini_SyncFile(m_file.c_str()) != 0) return false;
+  // File systems without hard links end here, and the contents of each save are then synced
+  // instead.
   if (zt::posix::Link(m_file.c_str(), m_copy.c_str()) != 0) return false;
   m_pending = syncDirectory();
+  // A name that may not outlive a power cut protects nothing.
   if (!m_pending) zt::posix::Unlink(m_copy.c_str());
   return m_pending;
 }
@@ -137,6 +149,7 @@ bool DurableCopy::takeUp(const std::string& file) {
   // Without the right to do it the file is used as it is, like any other whose sidecar does not
   // match.
   if (result != 0) return errno == EACCES || errno == EPERM || errno == EROFS;
+  // Its failure is not reported: until the rename is on disk, the next opening does the same again.
   zt::posix::SyncDirectoryOf(file.c_str());
   return true;
 }

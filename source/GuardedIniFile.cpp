@@ -1,3 +1,9 @@
+// Opening tries twice. The first time with the digest of the sidecar; the second time without,
+// since a file that was edited by hand is to be used all the same. A short sidecar means that the
+// file beside it cannot be trusted, which is then set aside before anything is read.
+//
+// Saving writes the file first and its sidecar after it. In between the sidecar is that of the old
+// file, which differs, and a file that differs is taken as it is: so a crash there costs nothing.
 #include "source/GuardedIniFile.h"
 
 #include <new>
@@ -43,6 +49,8 @@ HRESULT GuardedIniFile::open(std::unique_ptr<CvlIniMgr>* out) const {
   std::unique_ptr<IniFileLock> hold = IniFileLock::ForFile(m_file.c_str());
   IniSidecar::Digest digest;
   IniSidecar::State state = IniSidecar::Read(m_sidecar, &digest);
+  // Once more: the failure of a moment may have passed, and the answer decides whether a file is
+  // set aside.
   if (state == IniSidecar::State::Unreadable) state = IniSidecar::Read(m_sidecar, &digest);
   if (state == IniSidecar::State::Unreadable) return E_FAIL;
   try {

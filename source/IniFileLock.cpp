@@ -1,3 +1,14 @@
+// Two locks in a row: a table of names for the threads of the process, and the named mutex, an
+// flock, for the processes. The table decides which thread may go for the file lock, and counts its
+// depth; only the first hold of a name makes the mutex, and the last one destroys it. The table's
+// own lock is held for look-ups only: waits for other processes are made without it.
+//
+// Threads are known by numbers of this source. The system's ids are given to new threads again, and
+// a new thread must not look like the owner of a hold that its predecessor left behind.
+//
+// After a fork the child has a table of its own from the first use on. Entries of the parent are
+// never changed there: another thread may have been doing so at the fork. A hold that came through
+// the fork belongs to the parent, which the entry's ProcessMark says.
 #include "source/IniFileLock.h"
 
 #include <pthread.h>
@@ -37,6 +48,8 @@ void AppendHex(std::string* text, unsigned char byte) {
 }
 
 void AppendToName(std::string* name, unsigned char byte) {
+  // Separators go, so that the name is one directory entry, and the dot with them, so that it never
+  // is "." or "..".
   if (byte == '\\' || byte == '/' || byte == ':' || byte == '.') return;
   if (byte >= 0x80) {
     *name += '%';
@@ -118,6 +131,7 @@ IniFileLock::Entry* IniFileLock::Table::enter(std::unique_lock<std::mutex>& hold
   Entry* entry = find(name);
   ++entry->users;
   *mine = entry->owner == ThisThread();
+  // users was raised before the wait: the entry outlives it.
   m_ownerGone.wait(hold, [&] { return *mine || entry->owner == kNobody; });
   entry->owner = ThisThread();
   ++entry->depth;
@@ -153,6 +167,8 @@ IniFileLock::Entry* IniFileLock::Table::acquire(const String& name) {
 
 IniFileLock::Entry* IniFileLock::Table::tryAcquire(const String& name) {
   auto mutex = CreateMutex(name);
+  // The mutex was made before the table was locked, as that opens a file. Trying it does not wait,
+  // so that it may be done inside.
   std::lock_guard<std::mutex> hold(m_lock);
   Entry* entry = find(name);
   if (entry->owner == ThisThread()) {
@@ -182,6 +198,8 @@ void IniFileLock::Table::release(Entry* entry) {
   // as all others do.
   entry->owner = kReleasing;
   hold.unlock();
+  // Outside the table: closing a file on a slow disk must not stop the threads that want other
+  // files.
   mutex->unlock();
   // Before the next owner: when the hold ends on another thread than it began on, the section
   // inside stays with the first thread, and only the end of the last Mutex of the name does away
@@ -235,6 +253,7 @@ String IniFileLock::NameForFile(const char* fileName) {
   std::string name;
   for (; fileName && *fileName; ++fileName)
     AppendToName(&name, static_cast<unsigned char>(*fileName));
+  // NAME_MAX bytes; the digest keeps long names apart that begin alike.
   if (name.size() <= kLongestEntry) return String(name.c_str());
   unsigned char digest[16];
   Cmd5vlt md5;

@@ -1,3 +1,7 @@
+// A sidecar is overwritten in place: sixteen bytes are one write inside one block of the disk, and
+// readers see the old digest or the new one, never a shorter file. Only a missing one is made under
+// another name and renamed, since a new file begins empty, and an empty sidecar would mean a torn
+// file.
 #include "source/IniSidecar.h"
 
 #include <errno.h>
@@ -57,6 +61,7 @@ State Read(const std::string& sidecar, Digest* digest) {
   ScopedFd fd =
       zt::posix::OpenExisting(sidecar.c_str(), O_RDONLY, Kind::FileOrDirectory, LastLink::Refused);
   if (!fd) return zt::posix::IsPassing(errno) ? State::Unreadable : State::Missing;
+  // A file that ends early is no failure of the system: errno is still 0 then.
   errno = 0;
   Digest found;
   long read = BinaryFile::ReadExactSize(fd.get(), found.data(), kSizeBytes);
@@ -69,6 +74,7 @@ State Read(const std::string& sidecar, Digest* digest) {
 
 HRESULT Write(const std::string& sidecar, const Digest& digest, bool durable) {
   ScopedFd fd = zt::posix::OpenExisting(sidecar.c_str(), O_WRONLY, Kind::File, LastLink::Refused);
+  // Whatever else is in its place - a directory, a pipe, a link - is not replaced by a save.
   if (!fd) return errno == ENOENT && Create(sidecar, digest, durable) ? S_OK : E_FAIL;
   struct stat info;
   if (fstat(fd.get(), &info) != 0) return E_FAIL;

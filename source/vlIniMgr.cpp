@@ -1,3 +1,14 @@
+// The object's life is one critical section among all processes: the constructor takes the file's
+// lock before it reads anything, and the destructor releases it after the last write. In between
+// the document is in memory, and the file on disk is what the last Write left.
+//
+// Whether the file still is that file is asked in two places only, with the state that fstat gives
+// (m_known): after the lock was lost and taken again, and before a write in that case. Otherwise
+// the lock itself answers it.
+//
+// Two kinds of failure are kept apart while opening. One concerns the contents: such a file is set
+// aside, so that the next opening begins with an empty one. The other concerns the moment - memory,
+// descriptors, rights, a failing disk - and says nothing about the file, which stays as it is.
 #include "source/vlIniMgr.h"
 
 #include <errno.h>
@@ -52,6 +63,7 @@ bool ReadWhole(int fd, int32_t lengthBytes, std::vector<unsigned char>* data) {
 }
 
 HRESULT CopyOut(const char* value, char** out) {
+  // The caller has sized the buffer, by contract.
   strcpy(*out, value);
   return S_OK;
 }
@@ -254,6 +266,7 @@ HRESULT CvlIniMgr::MakeSureOfLock() {
   if (!m_lockWasLost) return S_OK;
   FileState now = stateOfFile();
   if (!isUnchanged(now)) {
+    // m_lockWasLost stays set, so that the next call tries again.
     if (InitializeIniBindings() != 0) return E_FAIL;
     m_known = now;
     m_dirty = false;
@@ -318,6 +331,8 @@ HRESULT CvlIniMgr::WriteAndGetDigest(IniSidecar::Digest* digest) {
       return S_OK;
     }
   }
+  // The digest is of the file as it is, whoever has written it: a sidecar for other bytes would be
+  // a false one.
   HRESULT result = DigestFile(digest);
   if (InitializeIniBindings() != 0 && result >= 0) result = E_FAIL;
   return result;
@@ -351,6 +366,7 @@ HRESULT GetValue(IniStructForwardReferenceTag* document, const char* section, co
                  bool decoded, Out* out) {
   if (!section || !item || IsNull(out)) return E_POINTER;
   const char* value = Value(document, section, item, decoded);
+  // Sections and items that are missing are not distinguished: callers ask for the value.
   return value ? CopyOut(value, out) : E_FAIL;
 }
 

@@ -19,6 +19,7 @@ String vlrGuidToString(GUID guid) {
 
 GUID vlrGuidFromString(const String& text) {
   try {
+    // The database keeps GUIDs without braces, registration files may have either form.
     bool hasBrace = text.find(L'{') != String::npos;
     return zt::fnd::Guid(hasBrace ? text : String(L"{") + text + L"}").get();
   } catch (const zt::fnd::exception::BadGuidString&) {

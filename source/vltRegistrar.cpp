@@ -1,3 +1,10 @@
+// The map of components, and nothing that reads a file. Every operation that answers from it calls
+// Scan() first, where a derived class may bring it up to date; only then is the map's lock taken,
+// for the look-up and the copying of one record. A component is owned by the map; a pointer to one
+// is good only as long as no other thread removes it, so that clients get copies.
+//
+// The enumerator holds identifiers, not pointers: what was removed since its snapshot is passed
+// over, and a walk never holds the lock between two steps.
 #include "source/vltRegistrar.h"
 
 #include <wchar.h>
@@ -98,8 +105,10 @@ HRESULT CvltRegistrar::CopyComponent(GUID identifier, std::optional<_vltComponen
 }
 
 HRESULT CvltRegistrar::AddComponent(CvltComponent* component) {
+  // From the first line: whatever throws below, the component goes.
   std::unique_ptr<CvltComponent> owned(component);
   ComponentMap::Hold map(m_components);
+  // A copy, as the arguments of emplace are evaluated in no certain order.
   GUID identifier = owned->record().identifier;
   removeEntry(*map, identifier);
   map->emplace(identifier, std::move(owned));

@@ -1,3 +1,6 @@
+// Both directions go through the record field by field in one order, which is the format. A number
+// that the stream does not take or give ends the record with an exception; for the bytes of texts
+// and of opaqueQuad the stream's result is not read, and what does not come counts as zeros.
 #include "source/xcomponentStream.h"
 
 #include <string.h>
@@ -129,6 +132,7 @@ CztOutStream& operator<<(CztOutStream& out, const CvltComponent& component) {
 CztInStream& operator>>(CztInStream& in, CvltComponent& component) {
   _vltComponent2& record = component.record();
   in >> record.size;
+  // Before anything else: a build of the other word size has another number here.
   if (record.size != sizeof record) throw CztStreamVersionException();
   in >> record.version;
   ReadType(in, record);

@@ -1,3 +1,7 @@
+// A scan of the first start makes a save for each registration file, and a sync for each would take
+// longer than all the rest. The first save is synced by its contents, as most starts make no other.
+// From the second one on the file on disk gets a second name (source/DurableCopy.h), and no save is
+// synced until the scan ends.
 #include "source/Pharlap/DatabaseSaves.h"
 
 #include <utility>
@@ -43,6 +47,7 @@ bool DatabaseSaves::prepare() {
 
 void DatabaseSaves::finishScan() {
   Scan saves = std::exchange(m_scan, Scan::NotUnderWay);
+  // Before the second name goes: a client's save, which may come next, is on its own again.
   m_database.SetDurability(IniDurability::Synced);
   if (saves == Scan::Covered) finishCopy();
   if (saves == Scan::First || saves == Scan::Synced) m_copy.syncDirectory();

@@ -1,3 +1,11 @@
+// The database remembers which file each component came from, in the list of contents, and with
+// which time each file was merged, in the list of registrations. A scan compares the second list
+// with the directories, and touches the components of changed files only: those are erased first,
+// by the first list, and then merged from the file, section by section.
+//
+// Registration files are written by others and may hold anything. What would change the database's
+// own sections, or write lines of its own into them, is left out; the stamp of a file of which an
+// item could not be set is left out too, so that the next start merges it again.
 #include "source/Pharlap/Scan.h"
 
 #include <stdio.h>
@@ -56,6 +64,8 @@ bool Scan::isUpToDate(const std::string& file, const zt::fnd::AbsTime& time) {
   if (m_database.GetItem(kRegistrations, file.c_str(), &stored) < 0) return false;
   Stamp stamp(time);
   unsigned long low = 0, high = 0;
+  // Any difference counts, not only a later time: a bundle that is replaced by an older one has
+  // changed as well.
   return sscanf(stored.c_str(), "%lu %lu", &low, &high) == 2 && low == stamp.low &&
          high == stamp.high;
 }
@@ -124,6 +134,8 @@ bool Scan::mergeItem(const CvlIniMgr& fragment, const String& installDirectory,
     m_isIncomplete = true;
     return false;
   }
+  // File names become paths and identifiers lose their braces, which is how the database has always
+  // kept them. All else is copied as it is.
   bool isFileName = SameName(item, kFileName);
   if (isFileName) {
     bool isDictionary = fragment.ItemExists(section.c_str(), kSchemaVersion) >= 0;
@@ -161,6 +173,8 @@ bool Scan::isPresent(const std::string& file) const {
 }
 
 void Scan::erase(const std::string& component, const std::string& file) {
+  // No merge writes a relative path: the entry was made by hand, or by a registration file that
+  // named the list as its section.
   if (!path::IsAbs(Widen(file))) m_droppedPlanted = true;
   if (!IsReserved(component)) m_database.EraseSection(component.c_str());
   m_database.EraseItem(kComponents, component.c_str());
@@ -181,6 +195,8 @@ std::string ProcessFileName(bool isDictionary, const String& installDirectory,
     whole = path::Join(path::DirName(whole), base);
   }
   std::string name = Narrow(whole);
+  // A separator of either system makes it a path, which is kept: the component lies outside the
+  // usual directories.
   if (name.find_first_of("\\/") != std::string::npos) return name;
   String below = vlt::layout::DirectoryIn(
       installDirectory, isDictionary ? vlt::layout::kDictionaries : vlt::layout::kExperts);

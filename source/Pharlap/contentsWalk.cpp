@@ -6,6 +6,7 @@
 
 namespace {
 
+// At least two characters in front of the suffix.
 constexpr size_t kShortestPieceName = 11;
 constexpr size_t kPieceSuffixLength = 9;  // " Line0001"
 constexpr size_t kMarkFromEnd = 8;
@@ -32,6 +33,7 @@ std::vector<ContentsItem> ReadContents(const CvlIniMgr& database) {
     database.GetItem(registrar::kContents, name.c_str(), &value);
     bool piece = IsPiece(name);
     std::string component = piece ? BaseOf(name) : name;
+    // Neighbours only: two runs of one name are two items.
     if (piece && inPieces && items.back().component == component) {
       items.back().file += value;
       items.back().last = i;
@@ -50,6 +52,7 @@ bool ContentsFiles::CaseLess::operator()(const std::string& a, const std::string
 void ContentsFiles::learn(const std::vector<ContentsItem>& items) {
   forget();
   for (const ContentsItem& item : items) {
+    // Not known from here on: what a change joins or parts cannot be followed by name.
     if (item.inPieces) return;
     m_files.insert(item.file);
   }

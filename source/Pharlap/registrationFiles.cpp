@@ -38,8 +38,11 @@ bool RegistrationTime(const String& file, zt::fnd::AbsTime* time) {
     if (NamesNothing(error) || MayNotLook(error)) return false;
     ZT_RAISE(zt::fnd::osdep::PosixError(error));
   }
+  // A pipe in this place would be waited for.
   if (!S_ISREG(info.st_mode)) return false;
   timeval changed = {};
+  // Without the fraction, which not every file system keeps: the stamp in the database is compared
+  // for equality.
   changed.tv_sec = info.st_mtime;
   *time = zt::fnd::osdep::TimevalToAbsTime(changed);
   return true;
@@ -68,6 +71,8 @@ bool FileIsThere(const std::string& file) {
     return path::DoesFileExist(Widen(file));
   } catch (const zt::fnd::osdep::PosixError& error) {
     int code = static_cast<int>(error.whatcode());
+    // Kept: this user cannot tell whether it is gone, and dropping its components would take them
+    // from all users.
     if (MayNotLook(code)) return true;
     // The bundle may have been replaced by a file of its name, or by a link to itself.
     if (!NamesNothing(code)) throw;

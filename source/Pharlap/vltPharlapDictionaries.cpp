@@ -48,6 +48,7 @@ HRESULT ReadOrWarn(const CvlIniMgr& ini, const std::string& section, const char*
 bool HasPortConfiguration(const _vltStartupOptions* options) {
   constexpr size_t kFlagsOffset = 4;
   constexpr unsigned char kPortConfigurationBit = 0x80;
+  // The structure is the storage's: of it only this bit is known here, by its place.
   return options &&
          (reinterpret_cast<const unsigned char*>(options)[kFlagsOffset] & kPortConfigurationBit);
 }
@@ -57,12 +58,15 @@ bool HasPortConfiguration(const _vltStartupOptions* options) {
 HRESULT CvltPharlapRegistrar::RegisterDataDictionary(_vltComponent2* record) {
   DatabaseHold hold(*this);
   if (BeginChange() < 0) return E_FAIL;
+  // A dictionary is a section of its name; the list of components has the name as item and as
+  // value.
   std::string section = Narrow(record->name);
   if (IsReserved(section)) return E_FAIL;
   std::string identifier = WithoutBraces(Narrow(vlrGuidToString(record->identifier)));
   const vltDictVariant& variant = record->dictionary;
   HRESULT setResult =
       m_registrationIni->SetItem(kComponents, section.c_str(), section.c_str(), true);
+  // After the first failure nothing more is set, and its result is that of the call.
   auto set = [&](const char* item, const std::string& value, bool quote) {
     if (setResult < 0) return;
     setResult = m_registrationIni->SetItem(section.c_str(), item, value.c_str(), quote);
@@ -77,6 +81,7 @@ HRESULT CvltPharlapRegistrar::RegisterDataDictionary(_vltComponent2* record) {
   if (setResult < 0) return setResult;
   HRESULT result = SaveChanges();
 
+  // After the save, which waits for the disk: the map's lock is never held across that.
   ComponentMap::Hold map(components());
   CvltComponent* component = nullptr;
   if (InternalGetComponentNoScan(record->identifier, component) < 0) return result;
@@ -131,6 +136,7 @@ HRESULT CvltPharlapRegistrar::ResetDDUpdatedFlags() {
     if (m_registrationIni->GetNthSectionName(n, &section) < 0) continue;
     if (m_registrationIni->ItemExists(section.c_str(), kSchemaVersion) < 0) continue;
     result = m_registrationIni->GetItem(section.c_str(), kFragmentRegistered, &flag);
+    // Most flags are clear: without a change nothing is written.
     if (result < 0 || flag.empty() || Number(flag) == 0) continue;
     result = m_registrationIni->SetItem(section.c_str(), kFragmentRegistered, "0", false);
     modified = true;
@@ -174,6 +180,7 @@ HRESULT CvltPharlapRegistrar::GetPreviousDictionaries(const _vltStartupOptions*,
   for (unsigned i = 0; i < names.size(); ++i) {
     texts[i] = Dup(names[i].c_str());
     if (texts[i]) continue;
+    // The caller gets all of the paths or none.
     while (i > 0) vltTaskMemFree(texts[--i]);
     vltTaskMemFree(texts);
     return E_OUTOFMEMORY;
@@ -205,6 +212,7 @@ HRESULT CvltPharlapRegistrar::RemovePreviousDictionaries(const _vltStartupOption
   String folder;
   result = previousDictionariesFolder(&folder);
   if (result < 0) return result;
+  // Last, and only where all dictionaries went: it describes those that are left.
   remove(folder + vlt::layout::kDatabase);
   return result;
 }

@@ -1,5 +1,11 @@
 // Single components: how a record reaches the database, how a section becomes a component, and how
 // a client gets a record out.
+//
+// Registering writes the section first and the list of components with it, saves, and then brings
+// the copy in memory up to date, if there is one: whatever the result of the save, since the open
+// document has the change already. Reading goes the other way, from a section to a record whose
+// type is decided by the items that it has: a schema version makes a dictionary, "PnP" a resource
+// expert, and anything else is an object expert.
 #include <string.h>
 
 #include <memory>
@@ -49,6 +55,7 @@ HRESULT CvltPharlapRegistrar::EnumComponents(_vltComponentType type,
 }
 
 HRESULT CvltPharlapRegistrar::Duplicate(_vltComponent2* target, const _vltComponent2* source) {
+  // The fields without texts, and the size stamp of the registrar's object with them.
   memcpy(target, source, sizeof *target);
   // Each text starts from null, so that a failed copy never returns the registrar's own.
   target->name = CopyOf(source->name);
@@ -143,6 +150,8 @@ bool CvltPharlapRegistrar::readExpert(const std::string& section, EmptyFileName 
   bool hasFile = m_registrationIni->GetItem(section.c_str(), kFileName, &file) >= 0;
   if (isResourceExpert && file.empty() && emptyFileName == EmptyFileName::IsNone) hasFile = false;
   if (hasFile) {
+    // Registered by a bare name (RegisterObjectExpert): the path is completed at the first start
+    // that finds it, and kept.
     if (file.find_first_of("\\/") == std::string::npos) {
       String experts;
       vlrMakeRootDirectory(vlt::layout::kExperts, &experts);
@@ -186,6 +195,8 @@ HRESULT CvltPharlapRegistrar::ReadSection(const wchar_t* wideSection, EmptyFileN
   if (result < 0) result = S_OK;  // An expert without binding classes is an expert.
   AddComponent(component.release());
   if (!changed) return result;
+  // After the component is in the map: a database that cannot be written does not hide a component
+  // that can be used.
   HRESULT saved = SaveChanges();
   return saved < 0 ? saved : result;
 }

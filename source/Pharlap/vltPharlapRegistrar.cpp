@@ -1,3 +1,9 @@
+// The start, in Init: the database is opened under its lock, which stays with the object; its
+// settings and the built-in dictionary are written; the installation is compared with it
+// (vltPharlapScan.cpp); and every section of the list of components becomes a component in the map
+// (vltPharlapExperts.cpp). All of that is one scan for DatabaseSaves, so that it waits for the disk
+// a few times in all. From then on questions are answered from memory, and only what a client
+// changes is written.
 #include "source/Pharlap/vltPharlapRegistrar.h"
 
 #include <string.h>
@@ -89,6 +95,8 @@ void CvltPharlapRegistrar::Init() {
 void CvltPharlapRegistrar::update() {
   initSettings();
   registerBuiltInDictionary();
+  // Its result is dropped, as those of the two before are: a registration that fails does not keep
+  // clients from what is registered already.
   UpdateRegistrationFile();
   readComponents();
   m_resources.forget();
@@ -112,6 +120,7 @@ HRESULT CvltPharlapRegistrar::BeginChange() {
 
 void CvltPharlapRegistrar::initSettings() {
   String configuration;
+  // Without an installation the text is empty, and the bare name is what is stored.
   dataDirectory(&configuration);
   configuration += L"config3.vlt";
   SetConfigurationPath(configuration.c_str());
@@ -160,6 +169,7 @@ HRESULT CvltPharlapRegistrar::OpenIniWithValidation() {
 HRESULT CvltPharlapRegistrar::SaveChanges() {
   if (!m_registrationIni) return S_OK;
   m_resources.forget();
+  // Before the save: a second name that is left would be taken up over it by the next opening.
   if (m_saves && !m_saves->prepare()) return E_FAIL;
   return m_file.save(*m_registrationIni);
 }
@@ -196,6 +206,7 @@ HRESULT CvltPharlapRegistrar::setAndSave(const char* key, const char* value, boo
 
 HRESULT CvltPharlapRegistrar::SetSchemaVersion(unsigned int version) {
   DatabaseHold hold(*this);
+  // Before the comparison: it may read the file again, and the setting with it.
   if (BeginChange() < 0) return E_FAIL;
   std::string present;
   if (m_registrationIni->GetItem(kGlobalSection, kSchemaVersion, &present) >= 0 &&

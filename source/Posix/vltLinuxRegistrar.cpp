@@ -10,6 +10,7 @@ using zt::fnd::Vector;
 
 namespace {
 
+// Bytes with the terminator; classes beyond it are cut off.
 constexpr unsigned kLongestResource = 1024;
 
 }  // namespace
@@ -73,9 +74,11 @@ HRESULT CvltLinuxRegistrar::PopulateBindingClasses(_vltComponent2* record) {
     addIfOwn(record, *found->second);
     return S_OK;
   }
+  // The text is asked for once a file and kept: all experts of one bundle share it.
   TaskMem<char> text;
   HRESULT result =
       m_resources.get(":", file.c_str(), L"BINDING_CLASSES", text.out(), kLongestResource);
+  // S_OK with no text, which the query gives for empty ones, is none either.
   if (result < 0 || !text || !*text.get()) return E_FAIL;
   auto& classes = m_bindingClassesByFile[file];
   classes = std::make_unique<CvltBindingClasses>(String(text.get()));
