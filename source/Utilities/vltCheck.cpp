@@ -1,3 +1,7 @@
+// The check goes on after a failure: its result is the list of messages, and the status only says
+// whether the list is worth reading. What the system refuses is therefore turned into a message
+// where it happens, and no refusal of a single file ends the whole. No lock is held while a library
+// is loaded: its initialisers may call this library, and ask for the registrar.
 #include "source/Utilities/vltCheck.h"
 
 #include <errno.h>
@@ -95,6 +99,7 @@ HRESULT CheckComponent(const _vltComponent2& component, vltErrors& errors) {
   for (const Kind& row : kKinds) {
     if (row.type == component.type) kind = &row;
   }
+  // A type without files, or one that a later build knows: nothing to check.
   if (!kind) return S_OK;
   if (kind->entryPoint) {
     if (!component.fileName) return TellOfFile(errors, kind->word, L"", kMissing);
@@ -191,6 +196,7 @@ uint32_t CEnumErrorString::Release() {
 HRESULT CEnumErrorString::Next(unsigned int count, wchar_t** strings, unsigned int* fetched) {
   unsigned int done = 0;
   while (done < count && m_cursor < m_errors.size()) {
+    // So that a copy that fails leaves no pointer of the caller's to be freed.
     strings[done] = nullptr;
     // Without memory the text is met again by the next call.
     if (vltDuplicateString(m_errors[static_cast<unsigned>(m_cursor)].c_str(), &strings[done]) < 0) {

@@ -1,3 +1,9 @@
+// A fault is asked for by the word "true", in any case; everything else leaves it unarmed.
+//
+// Exhausting memory takes blocks that double while the heap gives them, halves them after each
+// refusal, and ends when even the smallest is refused or, after the first refusal, when enough
+// blocks were taken. Doubling reaches the limit in a few steps, and the small blocks at the end
+// take what lies between the large ones.
 #include "source/Utilities/vltHookFile.h"
 
 #include <stdlib.h>
@@ -46,6 +52,7 @@ void ArmFromFile() {
   const char* directory = GetCurrentVltPath();
   if (!directory) return;
   String file = vlt::layout::FileIn(String(directory), vlt::layout::kHookFile);
+  // Asked for first: opening would make the file.
   if (!zt::fnd::osdep::path::DoesFileExist(file)) return;
   CvlIniMgr ini = CvlIniMgr::OpenRaw(zt::fnd::AnsiString(file).c_str());
   std::string name;

@@ -1,4 +1,12 @@
 // What the jar holds: the server's process, cookie and identity, and the offline endpoints.
+//
+// Every value is one critical section of the jar's lock: opened, read or changed, saved and closed
+// in one call. A reader that finds nothing writes what it returns, so that all processes that ask
+// from then on get the same.
+//
+// Ports of offline storages are given in a circle. Whether one is in use only the offline-storage
+// family could say, which is not part of this library: by its constant failure every candidate
+// counts as free, and the search ends at its first round.
 #include <errno.h>
 #include <stdio.h>
 #include <stdlib.h>
@@ -29,6 +37,7 @@ constexpr const char* kNextEndpoint = "NextEndpt";
 
 constexpr int kFirstEndpoint = 61901;
 constexpr int kEndpointLimit = 62101;
+// Twice around the circle: with a family that answers, every port may be in use.
 constexpr int kMostRounds = 400;
 
 // <install>/Data/, whether it is there or not; empty without an install directory.
@@ -145,6 +154,8 @@ HRESULT vltGetServerIdentityFromFile(GUID* out, String& dataDir) {
       *out = vltGuidFromString2(String(value.c_str()).c_str());
       return result;
     }
+    // The result is that of the look-up, E_FAIL: the export promises no more than that none was
+    // made.
     if (vltCreateGuid2(out) < 0) return result;
     TaskMem<wchar_t> text(vltGuidToString2(*out));
     // Never an empty identity: it could not be read again.

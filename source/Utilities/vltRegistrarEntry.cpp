@@ -1,4 +1,10 @@
 // How a client reaches the one registrar of the process.
+//
+// One registrar a process, made by whichever thread asks first and never destroyed. Two locks guard
+// it: one for vltGetRegistrar, which reads the preference, and one for the creation, which both
+// entries reach. Both are AtFork::Renew: the creation waits for another process's registrar without
+// limit, and a fork must not wait that long. A child that is forked in the meantime finds the
+// creation interrupted and begins with its own.
 #include "source/Utilities/vltRegistrarEntry.h"
 
 #include <new>
@@ -100,6 +106,7 @@ HRESULT vltGetRegistrar2(const wchar_t* registrationFile, const wchar_t* install
   *out = nullptr;
   Creation& creation = LeakedInstance<Creation>();
   CreationHold hold(creation);
+  // The lock is recursive, so that only the creating thread itself comes here.
   if (creation.inProgress) return E_FAIL;
   if (!creation.s_LinuxRegistrar) {
     CvltLinuxRegistrar* created = vlt::Allocate(vlt::kRegistrarPoint, [&] {
@@ -155,6 +162,8 @@ HRESULT vltLoadDataDictionaries2(IvltRegistrar* registrar) {
   for (;;) {
     OwnedRecord record;
     unsigned int fetched = 0;
+    // The end of the walk, or a failure of a foreign registrar: either ends it, and is no failure
+    // of the call.
     if (enumerator->Next(1, &record, &fetched) != S_OK) return result;
     TryToLoad(record.fileName);
   }

@@ -1,4 +1,9 @@
 // Endpoints, ports and cache limits from the settings file, <install>/Data/kor.ini or a named one.
+//
+// One object opens the file and answers for each value; the exports name the values in a fixed
+// order. The order shows: a missing text makes any result E_FAIL, and the jar is opened while the
+// settings file is still held, which is the lock order of the two. A number has a default in every
+// case; a text has one at index 3 only.
 #include <stdlib.h>
 
 #include <algorithm>
@@ -22,6 +27,7 @@ class Settings {
   // `named`: the file is <name>.ini, if there is a name.
   HRESULT open(bool named, const wchar_t* name) {
     m_directory = vltjar::ExistingDataDirectory();
+    // Not an error: a client of a machine without an installation gets the defaults.
     if (m_directory.empty()) return S_OK;
     String file =
         m_directory + (named && name ? String(name) + L".ini" : String(vlt::layout::kSettings));
@@ -136,6 +142,7 @@ void ReadCheckpoints(const Settings& settings, long* numCheckpoints, unsigned* c
 
 void ReadCookie(const Settings& settings, int* lastServerCookie) {
   if (!lastServerCookie) return;
+  // With the directory filled in the call below does not make it.
   String dataDir = settings.directory();
   vltGetServerCookieFromFile(lastServerCookie, dataDir);  // Without a cookie the rest still counts.
 }

@@ -49,6 +49,7 @@ HRESULT ReadPort(std::string* port) {
 const std::wstring* Settled(const std::wstring& answer) {
   auto mine = std::make_unique<const std::wstring>(answer);
   const std::wstring* settled = nullptr;
+  // On failure `settled` is the other thread's answer, which both return.
   if (s_localServer.compare_exchange_strong(settled, mine.get())) settled = mine.release();
   return settled;
 }
@@ -64,6 +65,8 @@ HRESULT vltGetLocalConfigurationURL(wchar_t** url) {
     result = ReadPort(&port);
     endpoint = Settled(kLocalHost + std::wstring(String(port.c_str()).c_str()));
   }
+  // Its result is dropped: *url is untouched where memory is out, and the result says how the file
+  // was.
   vltDuplicateString2(endpoint->c_str(), url);
   return result;
 }
@@ -80,6 +83,7 @@ HRESULT vltIsOfflineStorage(const wchar_t* url, unsigned* isOffline, wchar_t** s
   if (isOffline) *isOffline = found ? 1 : 0;
   if (!found || !storage) return S_OK;
   const wchar_t* name = found + wcslen(kOfflineMarker);
+  // The name ends at the next field of the address, or with it.
   const wchar_t* colon = wcschr(name, L':');
   size_t length = colon ? static_cast<size_t>(colon - name) : wcslen(name);
   auto* copy = static_cast<wchar_t*>(vltTaskMemAlloc((length + 1) * sizeof(wchar_t)));

@@ -1,3 +1,6 @@
+// The jar's opening and saving are those of every guarded file (source/GuardedIniFile.h); what is
+// the jar's own are the results, the messages and the hook points in kJar. The settings files are
+// opened through the same functions, so that they share them.
 #include "source/Utilities/vltjar.h"
 
 #include <algorithm>
@@ -39,6 +42,7 @@ HRESULT VltjarOpenIniWithValidation(const wchar_t* file, CvlIniMgr** out) {
   *out = nullptr;
   std::unique_ptr<CvlIniMgr> opened;
   HRESULT result = VltjarOpen(file, &opened);
+  // Also with a negative result: the caller decides what a file that was begun again is worth.
   *out = opened.release();
   return result;
 }

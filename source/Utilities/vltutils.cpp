@@ -6,6 +6,9 @@
 #include "source/Common/vltFileSecurity.h"
 #include "source/Common/vltcmn.h"
 
+// Nothing here is more than a name: the implementations have names of their own
+// (source/Common/vltcmn.h), and the library calls those, so that no inner call goes through a
+// symbol that a host may interpose.
 void* vltAlloc(size_t size) { return vltTaskMemAlloc(size); }
 void vltFree(void* p) { vltTaskMemFree(p); }
 int vltutilsFreeComponent2(_vltComponent2& c) { return vltFreeComponent2(c), 0; }

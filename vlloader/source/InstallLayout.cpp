@@ -9,6 +9,8 @@ using zt::fnd::osdep::path;
 namespace vlt::layout {
 
 String InstallRoot() {
+  // The directory of the first call, which stays until a clean-up: all paths of a process belong to
+  // one installation.
   const char* text = GetCurrentVltPath();
   String root(text ? text : "");
   if (!root.empty()) path::MakePathEndInSlash(root);

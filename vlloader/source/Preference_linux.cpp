@@ -1,4 +1,6 @@
-
+// The XDG base directory rules: one directory of the user, then those of the system in the order of
+// a list; what is not an absolute path is ignored. The files are plain INI files, read without a
+// lock and without a sidecar: they belong to the administrator, and this library never writes them.
 #include <cerrno>
 #include <cstdlib>
 #include <memory>
@@ -37,6 +39,7 @@ void AddEach(std::vector<std::string>& directories, const std::string& list) {
 std::vector<std::string> ConfigDirectories() {
   std::vector<std::string> directories;
   std::string own = Environment("XDG_CONFIG_HOME");
+  // An empty variable counts as one that is not set, by the same rules.
   if (own.empty()) {
     std::string home = Environment("HOME");
     if (!home.empty()) own = home + "/.config";
@@ -63,10 +66,12 @@ std::optional<std::string> ReadItem(const std::string& file, const std::string& 
   std::unique_ptr<IniStructForwardReferenceTag, Dispose> document(IniNew(0));
   if (!document) throw std::bad_alloc();
   IniSetReadOptions(document.get(), kQuotesOfBothKinds);
+  // The engine reports that a file was not read; why is what the system has left in errno.
   errno = 0;
   int32_t status = IniReadFromFile(document.get(), file.c_str());
   // Not "no value", which would lead a process to another installation for its whole life.
   if (status < 0) RaiseIfUnknown(status, errno);
+  // Missing, or not to be read by this user: the next directory may have the item.
   if (status < 0) return std::nullopt;
   const char* value = nullptr;
   if (IniGetPointerToRawString(document.get(), "Preferences", key.c_str(), &value) != 1) {

@@ -33,6 +33,8 @@ class LibraryModule : public StorageModule {
   zt::fnd::osdep::SharedLibrary m_library;
 };
 
+// Both kinds report a failed load by a question only, so that the choice of a kind and its success
+// stay apart: a directory that does not load is not tried as a library.
 template <class Module>
 std::unique_ptr<StorageModule> IfOpened(std::unique_ptr<Module> module) {
   if (!module->isOpened()) return nullptr;

@@ -1,3 +1,10 @@
+// The storage is reached by names of entries, fetched once when it is loaded. What is loaded is
+// guarded by one lock; forwarded calls take the entry under it and make the call outside, since a
+// storage may take its time and may call back.
+//
+// Loads and users are counted apart. A forwarding call counts a load, since its caller relies on
+// the storage from then on and never says when no longer; only users, who call KorInitialize and
+// KorFinalize, can end it.
 #include "vlloader/source/vlloader.h"
 
 #include <climits>
@@ -110,6 +117,7 @@ void FetchEntries(Loader& l) REQUIRES(l) {
 void Init(Loader& l) REQUIRES(l) {
   if (l.inEffect) return;
   if (l.loadTried) {
+    // The count stops at its limit: a wrapped one would unload under its users.
     if (l.loads < INT_MAX) ++l.loads;
     return;
   }
@@ -142,6 +150,7 @@ void* Configuration(bool present, int* status, Call call) {
   }
   void* configuration = nullptr;
   HRESULT result = call(&configuration);
+  // A success without an object would have the caller use null.
   if (status) *status = result >= 0 && !configuration ? E_FAIL : result;
   return configuration;
 }
@@ -182,6 +191,8 @@ HRESULT KorInitialize() {
   }
   Init(l);
   HRESULT result = l.entries.initialize ? l.entries.initialize(nullptr) : S_OK;
+  // Also where the storage's start has failed: the caller got its result, and owes a KorFinalize
+  // all the same.
   l.inEffect = true;
   l.users = 1;
   return result;
@@ -206,6 +217,7 @@ void KorCleanup() {
   Hold hold(l);
   if (--l.loads != 0) return;
   l.loadTried = false;
+  // The storage before the utilities that it may use to its end.
   l.storage.reset();
   l.utilities.reset();
   l.entries = Entries();
