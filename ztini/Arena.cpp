@@ -15,6 +15,8 @@ constexpr size_t kMallocBytes = 16;
 
 void* Arena::record(size_t sizeBytes) {
   if (sizeBytes > SIZE_MAX - alignof(void*)) return nullptr;
+  // Records only: texts come down from the back and need no alignment, so that none is lost between
+  // them.
   const size_t bytes = (sizeBytes + alignof(void*) - 1) & ~(alignof(void*) - 1);
   if (roomLeft() < bytes) {
     if (needsOwnBlock(bytes)) return addBlock(bytes);
@@ -45,6 +47,8 @@ char* Arena::addBlock(size_t sizeBytes) {
   if (sizeBytes > PTRDIFF_MAX - sizeof(Block)) return nullptr;
   auto* block = static_cast<Block*>(Allocate(sizeof(Block) + sizeBytes));
   if (!block) return nullptr;
+  // The list is for clear() only. A block of its own joins it too, while the present block stays
+  // the present one.
   block->next = m_blocks;
   m_blocks = block;
   return reinterpret_cast<char*>(block + 1);

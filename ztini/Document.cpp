@@ -1,3 +1,7 @@
+// Records come in two kinds, by who owns their memory. Those that were read lie in the arena, over
+// the text of the file, and are given back with the document; those that were put have blocks of
+// their own. Each record says of its name, its value and itself where it lies, so that one function
+// disposes of both.
 #include "ztini/Document.h"
 
 #include <cstring>
@@ -114,6 +118,7 @@ IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, size_t nam
   entry->nameInArena = entry->valueInArena = entry->recordInArena = 1;
   entry->quote = EnclosingQuote(value, valueLength, doc->readOptions);
   if (entry->quote) {
+    // In place, by moving both ends inward: the text belongs to the document.
     value[valueLength - 1] = 0;
     ++entry->value;
     valueLength -= 2;
@@ -130,6 +135,7 @@ void IniDisposeSection(IniSection* section) {
   }
   if (!section->nameInArena) std::free(section->name);
   if (section->recordInArena) {
+    // The record lies in the arena, but its list of items has a block of its own.
     section->~IniSection();
   } else {
     ztini::Delete(section);
@@ -161,6 +167,7 @@ void IniReplaceValue(IniEntry* entry, char* value) {
 }
 
 bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section) {
+  // Before the append, which cannot report.
   if (!doc->sections.reserve(1)) {
     IniDisposeSection(section);
     return false;
@@ -182,6 +189,8 @@ bool IniAppendEntry(IniSection* section, IniEntry* entry) {
 void IniEmptyDocument(IniStructForwardReferenceTag* doc) {
   doc->currentSection = nullptr;
   ztini::NameNode** sections = doc->sections.nodes();
+  // Without removing each from the list: nothing looks names up any more, and the index goes as a
+  // whole.
   for (int32_t n = doc->sections.count(); n >= 1; --n) {
     IniDisposeSection(static_cast<IniSection*>(sections[n - 1]));
   }

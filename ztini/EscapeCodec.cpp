@@ -57,6 +57,7 @@ char UnescapedByte(char letter) { return letter == 'n' ? '\n' : letter == 't' ? 
 char* EncodeEscapes(const char* text) {
   const size_t length = strlen(text);
   if (length > (SIZE_MAX - 1) / kLongestSequence) return nullptr;
+  // The upper bound at once: values are short, and the block is given back when the put is over.
   char* encoded = static_cast<char*>(Allocate(length * kLongestSequence + 1));
   if (!encoded) return nullptr;
   char* out = encoded;
@@ -67,6 +68,7 @@ char* EncodeEscapes(const char* text) {
 
 size_t DecodeEscapes(const char* text, char* out) {
   size_t length = 0;
+  // One walk for counting and for writing, so that both agree on every malformed text.
   const auto emit = [&](char c) {
     if (out) out[length] = c;
     ++length;
@@ -83,6 +85,7 @@ size_t DecodeEscapes(const char* text, char* out) {
       ++text;
       continue;
     }
+    // Before the digits are read: the second would lie beyond the text.
     if (!text[1] || !text[2]) break;
     emit(static_cast<char>(DigitValue(text[1]) * 16 + DigitValue(text[2])));
     text += 3;

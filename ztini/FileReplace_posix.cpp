@@ -1,3 +1,11 @@
+// With kIniWriteSafely the target is never changed in place. The new bytes go to a file beside it,
+// which gets the target's mode and owner, is synced as far as asked, and is then renamed over the
+// target: readers, and a crash, find the old file or the new one. Beside it, because a rename works
+// inside one file system only.
+//
+// Everything that can fail is done before the rename, but for one step: the sync of the directory,
+// which puts the rename itself on disk and so can only follow it. Its failure is reported, although
+// the new file is in place.
 #include "ztini/FileReplace.h"
 
 #include <fcntl.h>
@@ -47,6 +55,8 @@ bool CanCreate(const char* path) {
 }
 
 bool Replaceable(const char* path) {
+  // Opened for writing, although the rename would not need it: a file that the user may not write
+  // to is not to be replaced either, which the directory's rights alone would allow.
   if (zt::posix::OpenExisting(path, O_RDWR)) return true;
   return errno == ENOENT && CanCreate(path);
 }
@@ -103,6 +113,8 @@ int32_t FileReplacement::openTemporary() {
 }
 
 ScopedFd FileReplacement::openUnique() {
+  // mkostemp makes the file with O_EXCL and mode 0600; what others may do with it is set on the
+  // descriptor.
   ScopedFd fd = zt::posix::AboveStandardStreams(ScopedFd(mkostemp(m_temporary.get(), O_CLOEXEC)));
   if (fd) fchmod(fd.get(), kUniqueMode);
   return fd;
@@ -206,6 +218,7 @@ int32_t ztini_SyncFile(const char* path) {
   if (!path) return kIniBadPath;
   ScopedFd file = zt::posix::OpenExisting(path, O_RDONLY);
   if (!file) return kIniBadPath;
+  // A descriptor for reading will do: fsync is about the file.
   const bool synced = zt::posix::Sync(file.get()) && zt::posix::SyncDirectoryOf(path);
   return synced ? 0 : kIniWriteFailed;
 }

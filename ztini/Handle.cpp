@@ -29,6 +29,7 @@ int32_t ztini_PI_SetHandleSize(ztini_Handle handle, size_t size) {
   if (!handle) return 0;
   void* data = ztini::Reallocate(handle->data, size);
   if (!data) return 0;
+  // realloc leaves what it adds as the heap had it.
   if (size > handle->size) memset(static_cast<char*>(data) + handle->size, 0, size - handle->size);
   handle->data = data;
   handle->size = size;

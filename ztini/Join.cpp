@@ -1,3 +1,8 @@
+// One walk a section, from the first item to the last. A piece numbered 1 begins a run, and every
+// piece with another number after it belongs to that run; items that are no pieces end it. The list
+// is compacted while it is walked, since removing each piece by itself would move the rest of the
+// list every time. Without memory the walk goes on without merging, so that the list is whole in
+// either case.
 #include "ztini/Join.h"
 
 #include <cerrno>
@@ -46,6 +51,7 @@ bool SectionJoin::run() {
   for (int32_t next = 0; next < m_count;) {
     bool isFirst = false;
     int32_t end = next + 1;
+    // A run without its first piece stays as it is: nothing says what came before it.
     if (good && IsPiece(item(next), &isFirst) && isFirst) {
       const int32_t pieces = runEnd(next);
       good = merge(next, pieces);
@@ -67,6 +73,7 @@ int32_t SectionJoin::runEnd(int32_t begin) const {
 }
 
 char* JoinedValue(ztini::NameNode** begin, ztini::NameNode** end) {
+  // Two walks, to count and to copy: a long value comes in thousands of pieces.
   size_t length = 0;
   for (auto** at = begin; at < end; ++at) length += strlen(static_cast<IniEntry*>(*at)->value);
   char* joined = static_cast<char*>(ztini::Allocate(length + 1));
@@ -84,6 +91,7 @@ bool SectionJoin::merge(int32_t begin, int32_t end) {
   AnalyzeItemName(first->name, &baseLength, &number);
   char base[kIniLongestBaseName + 1];
   ztini_StringCopyMax(base, first->name, baseLength + 1);
+  // Both texts before anything changes.
   ztini::OwnedText name(ztini_StrDupWithoutSurrWhiteSpace(base));
   ztini::OwnedText value(JoinedValue(m_items + begin, m_items + end));
   if (!name || !value) return false;
@@ -101,7 +109,9 @@ int32_t AnalyzeItemName(const char* name, size_t* baseLength, long* number) {
   if (!mark) return 0;
   const size_t length = static_cast<size_t>(mark - name);
   const char* digits = mark + strlen(kPieceMark);
+  // strtol alone would take a sign and white space.
   if (length > kIniLongestBaseName || !AllDigits(digits)) return 0;
+  // The engine reports by its results, and leaves the host's errno alone.
   const int before = errno;
   errno = 0;
   const long value = strtol(digits, nullptr, 10);

@@ -19,6 +19,7 @@ bool LineBuffer::open() {
 }
 
 bool LineBuffer::grow() {
+  // The function is asked with a 32-bit number.
   if (m_capacity > INT32_MAX / 2) return false;
   void* text = Reallocate(m_text.get(), m_capacity * 2);
   if (!text) return false;
@@ -40,6 +41,7 @@ int32_t LineBuffer::next(IniLineInputFunction input, void* context) {
         input(context, end, static_cast<int32_t>(room), &m_endOfFile, &m_endOfLine, &m_lineNumber);
     if (status < 0) return status;
     if (m_endOfLine || m_endOfFile) return 0;
+    // The function does not say how much it has stored; the buffer was empty there.
     const size_t stored = strnlen(end, room);
     idleCalls = stored ? 0 : idleCalls + 1;
     if (idleCalls == kMostIdleCalls) return kIniOutOfMemory;

@@ -1,3 +1,7 @@
+// Three bytes end a line, CR, LF and NUL, and files mix them. A terminator that comes first in a
+// call and differs from the last one is the second half of a pair and is skipped; one that is the
+// same begins an empty line. That rule has no memory of where a line began, so that it also skips a
+// terminator after a line that filled the caller's buffer (see TextLines.h).
 #include "ztini/LineReader.h"
 
 #include <climits>
@@ -20,6 +24,7 @@ LineState TakeBytes(LineFile* state, char* buffer, int32_t maximum, int32_t* sto
     if (!state->bytesLeft) {
       *status = state->fill(state);
       if (*status < 0) return LineState::Open;
+      // A last line without a terminator is a line, if it has any bytes.
       if (!state->bytesLeft) return *stored ? LineState::Ended : LineState::FileEnded;
     }
     const char c = *state->cursor++;
@@ -76,6 +81,7 @@ int32_t IniLineFileInputFunction(void* lineFile, char* buffer, int32_t maximum, 
   *endOfFile = end == LineState::FileEnded;
   *endOfLine = end == LineState::Ended;
   if (end == LineState::Ended) {
+    // Saturates: the number is for messages.
     if (state->linesCompleted < INT32_MAX) ++state->linesCompleted;
     state->lineOffset = state->totalBytes - state->bytesLeft;
   }

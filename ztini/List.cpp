@@ -1,3 +1,6 @@
+// A block with a gap at its front: item 1 lies at `first`, so that removing from either end moves
+// nothing. The gap is taken back when a reservation needs it. One item that is no larger than a
+// pointer lies in the record itself, in the place of the block's address.
 #include "ztini/List.h"
 
 #include <climits>
@@ -58,6 +61,7 @@ bool Grow(ztini_List list, uint32_t needed) {
   const size_t bytes = static_cast<size_t>(capacity) * list->itemSize;
   void* block = ztini::Reallocate(list->capacity ? list->block : nullptr, bytes);
   if (!block) return false;
+  // Before `block` is set, which lies over the one item.
   if (!list->capacity && list->count) memcpy(block, list->only, list->itemSize);
   list->block = static_cast<char*>(block);
   list->capacity = static_cast<uint32_t>(capacity);
@@ -110,6 +114,7 @@ int32_t ztini_ListInsertItem(ztini_List list, const void* source, int32_t positi
 
 int32_t ztini_ListInsertItems(ztini_List list, const void* source, int32_t position,
                               uint32_t number) {
+  // The position is checked before memory is asked for, and both before anything moves.
   const int32_t at = list ? InsertPosition(list, position) : 0;
   if (!at || !ztini_ListReserve(list, number)) return 0;
   const uint32_t index = static_cast<uint32_t>(at) - 1;

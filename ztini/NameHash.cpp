@@ -1,3 +1,6 @@
+// SipHash-1-3 over the folded and trimmed name: one round for each word of eight bytes, three at
+// the end. The four constants are those of the algorithm. The characters are folded one by one as
+// they go in: a folded copy would take memory, which look-up must not need.
 #include "ztini/NameHash.h"
 
 #include <bit>

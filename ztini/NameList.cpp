@@ -1,3 +1,7 @@
+// The order of a list is its array of pointers; the index finds a record by name and names it by
+// its sequence number, by which the array is searched. The index is an addition that may be dropped
+// at any time: when memory runs out, when the locale has changed, or when the array was changed as
+// a whole. The next look-up then scans or builds it again.
 #include "ztini/NameList.h"
 
 #include <cstdlib>
@@ -65,6 +69,7 @@ NameNode* NameList::scan(const char* name, NameMatch match) const {
 
 NameList::Way NameList::wayToFind(FoldState fold) {
   if (fold == FoldState::Unknown) m_fold->refresh();
+  // Built under another locale, in which other names are equal.
   if (m_index && !indexIsCurrent()) dropIndex();
   if (m_index) return Way::Index;
   if (count() < kIndexFrom) return Way::Scan;
@@ -111,6 +116,8 @@ void NameList::append(NameNode* node) {
     ztini_ListInsertItem(&m_list, &node, 0);
   }
   if (!m_index) return;
+  // Out of memory is no failure here: the record is in the list, and the index is built again when
+  // it is needed.
   if (!indexIsCurrent() || !m_index->insert(*m_fold, inOrder(), node)) dropIndex();
 }
 

@@ -16,6 +16,8 @@ Stream OpenForReading(const char* path) {
   ScopedFd fd = zt::posix::OpenExisting(path, O_RDONLY, zt::posix::Kind::FileOrDirectory);
   struct stat status;
   if (!fd || fstat(fd.get(), &status) != 0) return nullptr;
+  // By the size before a byte is read. A file that grows afterwards is met by the reader, which has
+  // the same limit.
   if (S_ISREG(status.st_mode) && status.st_size > kLargestFileBytes) {
     errno = EFBIG;
     return nullptr;
@@ -35,6 +37,7 @@ size_t ReadBytes(void* buffer, size_t sizeBytes, FILE* stream) {
   for (;;) {
     errno = 0;
     done += fread(bytes + done, 1, sizeBytes - done, stream);
+    // A signal sets the stream's error flag, like a real failure; errno distinguishes them.
     if (done == sizeBytes || !ferror(stream) || errno != EINTR) return done;
     clearerr(stream);
   }

@@ -32,6 +32,7 @@ bool PutIntoSection(Doc* doc, IniSection* section, const char* item, const char*
 }
 
 int32_t OutOfMemory(Doc* doc) {
+  // So that the next look-up does not rely on what a failed call has left there.
   doc->currentSection = nullptr;
   return kIniOutOfMemory;
 }
@@ -44,6 +45,8 @@ int32_t IniPut(Doc* doc, const char* section, const char* item, const char* valu
   if (!ztini_HasNonWhiteSpace(section) || !ztini_HasNonWhiteSpace(item)) return kIniEmptyName;
   if (!value) value = "";
   if (doc->settled) {
+    // Before the put is known to succeed: a document that counts as not settled is only read back
+    // once too often.
     doc->settled = ztini::IniSurvivesFile(section, item, value, quoteCharacter);
   }
   IniSection* known = nullptr;
@@ -51,6 +54,7 @@ int32_t IniPut(Doc* doc, const char* section, const char* item, const char* valu
   if (known) {
     return PutIntoSection(doc, known, item, value, quoteCharacter) ? 1 : OutOfMemory(doc);
   }
+  // Into the document only with its item: a section without items would be written to the file.
   IniSection* fresh = IniNewSection(doc, section);
   if (!fresh) return OutOfMemory(doc);
   if (!PutIntoSection(doc, fresh, item, value, quoteCharacter)) {
@@ -66,6 +70,7 @@ int32_t IniPutStringWithOptions(Doc* doc, const char* section, const char* item,
                                 int32_t quote, int32_t escape) {
   const int32_t quoteCharacter = quote ? '"' : 0;
   if (!doc || !escape || !value) return IniPut(doc, section, item, value, quoteCharacter);
+  // A copy, which also allows a value that lies in the document itself.
   ztini::OwnedText encoded(ztini::EncodeEscapes(value));
   if (!encoded) return OutOfMemory(doc);
   return IniPut(doc, section, item, encoded.get(), quoteCharacter);

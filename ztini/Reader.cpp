@@ -1,4 +1,7 @@
 #include <fcntl.h>
+// The file is taken into one block and cut up there: names and values of the document are places in
+// that block, so that reading makes no block for each. The block has a byte to spare, since the
+// parser terminates the last line in place.
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -87,6 +90,7 @@ int32_t ReadAll(const Source& source, Bytes* bytes) {
     if (got < wanted) return 0;
     // It grows while it is read.
     if (bytes->size > kMostBytes) return kIniReadFailed;
+    // A stream without a size, or a file that has grown.
     capacity = capacity * 2 + kLeastBlock;
   }
 }
@@ -127,6 +131,7 @@ int32_t IniReadFromDescriptor(IniStructForwardReferenceTag* doc, const char* pat
   if (!path || fstat(fd, &status) != 0) return kIniCannotOpen;
   const bool regular = S_ISREG(status.st_mode);
   if (regular && status.st_size > ztini::kLargestFileBytes) return kIniCannotOpen;
+  // Before the document is emptied: without memory for the path it stays as it was.
   ztini::OwnedText name(ztini_StrDup(path));
   if (!name) return kIniOutOfMemory;
   const size_t hint = regular ? static_cast<size_t>(status.st_size) + 1 : kLeastBlock;
@@ -156,5 +161,6 @@ int32_t IniIsFileNewer(IniStructForwardReferenceTag* doc) {
   int64_t seconds = 0;
   const int32_t status = IniGetFileTimestamp(doc ? doc->fileName.get() : nullptr, &seconds);
   if (status < 0) return status;
+  // Any other time: a file that was restored from a copy is older, and not the one that was read.
   return seconds != doc->fileTimestamp ? 1 : 0;
 }

@@ -46,6 +46,7 @@ int32_t ztini_StrICmpWithoutSurrWhiteSpace(const char* left, const char* right) 
 void ztini_StringCopyMax(char* destination, const char* source, size_t size) {
   if (!destination || !size) return;
   const size_t length = source ? strnlen(source, size - 1) : 0;
+  // The source may be a part of the destination.
   if (length) memmove(destination, source, length);
   destination[length] = 0;
 }
@@ -56,6 +57,7 @@ int32_t ztini_StrToUInt(const char* text, uint32_t* value) {
   if (*text == '+') ++text;
   if (!IsDigit(*text)) return 0;
   uint64_t number = 0;
+  // Not strtoul, which takes a minus, and saturates where a number is too large.
   for (; IsDigit(*text); ++text) {
     number = number * 10 + static_cast<uint64_t>(*text - '0');
     if (number > UINT32_MAX) return 0;

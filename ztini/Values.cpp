@@ -18,6 +18,7 @@ constexpr size_t kLeastScratch = 256;
 constexpr size_t kScratchSlack = 1024;
 
 // Sizes the scratch block for `needed` bytes; a block that is far too large shrinks back.
+// Its pointers are given to callers, so that the block never moves but in a call that decodes.
 bool SizeScratch(Doc* doc, size_t needed) {
   const size_t size = ztini_PI_GetHandleSize(doc->scratch);
   if (needed <= size && size - needed <= kScratchSlack) return true;
@@ -55,6 +56,7 @@ bool IsWord(const char* value, const char* word) {
 
 bool ParseDouble(const char* text, double* number) {
   const int before = errno;
+  // strtod reports a number that is too large or too small by errno alone.
   errno = 0;
   char* end;
   *number = strtod(text, &end);
@@ -74,6 +76,7 @@ int32_t IniGetPointerToString(Doc* doc, const char* section, const char* item, c
   if (value) *value = nullptr;
   const char* raw = nullptr;
   if (IniGet(doc, section, item, &raw) != 1) return 0;
+  // Once to count and once to write: the decoded text may be much shorter than the stored one.
   const size_t length = ztini::DecodeEscapes(raw, nullptr);
   if (!SizeScratch(doc, length + 1)) return kIniOutOfMemory;
   char* text = static_cast<char*>(doc->scratch->data);

@@ -22,6 +22,15 @@
 //    nothing.
 // 8. Cost. Look-up takes constant time on average, reading and writing linear time.
 
+// How the folder is built. A file is read whole (Reader.cpp) and cut into lines (TextLines, or
+// LineReader and LineBuffer for a caller's own source); the parser makes records of them
+// (Document.h) and joins split values (Join.h). Records stay in file order in a list, with a hash
+// index over their names once there are many (NameList, NameIndex). Look-up, values and puts work
+// on that. A save renders the document to one text (Writer.cpp) and puts it in the target's place
+// (FileReplace.h).
+//
+// The containers are the engine's own, and not the standard ones, for rule 6 (Alloc.h) and for the
+// size of a record (NameIndex.h).
 struct IniStructForwardReferenceTag;
 struct stat;
 struct IniSection;
@@ -45,6 +54,7 @@ enum IniStatus : int32_t {
   kIniNotBoolean = -5024,
 };
 
+// Bits of IniSetReadOptions; at first kIniReadDoubleQuotes.
 enum IniReadOption : int32_t {
   kIniReadKeepEmpty = 1,     // "key=" is an item with an empty value, not a bad line
   kIniReadDoubleQuotes = 2,  // remove enclosing double quotes
@@ -52,6 +62,8 @@ enum IniReadOption : int32_t {
   kIniReadColons = 8,        // ":" and ":=" separate too; items before the first header are kept
 };
 
+// Bits of IniSetWriteOptions; at first kIniWriteSafely, kIniWriteUniqueTemporary and
+// kIniWriteSpaces.
 enum IniWriteOption : int32_t {
   kIniWriteMark = 1,             // begin with the UTF-8 byte order mark
   kIniWriteSafely = 2,           // through a temporary file that is renamed over the target
@@ -106,7 +118,11 @@ int32_t IniReadFromFile(IniStructForwardReferenceTag* doc, const char* path);
 // The same from a descriptor that the caller has opened for reading and keeps; from the file's beginning,
 // and the descriptor's position stays. The path is the document's file from then on.
 int32_t IniReadFromDescriptor(IniStructForwardReferenceTag* doc, const char* path, int fd);
+// The same of a stream, from its start, which stays the caller's. kIniReadFailed where the stream
+// reports an error: the document then has the lines that were whole.
 int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* file);
+// The same line by line, from the caller's own source; null reads nothing. A negative result of the
+// source ends the reading and is returned.
 int32_t IniRead(IniStructForwardReferenceTag* doc, IniLineInputFunction input, void* context);
 
 // Whole-second modification time; 0, kIniEmptyPath or kIniBadPath.
@@ -117,6 +133,8 @@ int32_t IniIsFileNewer(IniStructForwardReferenceTag* doc);
 
 // ---- Look-up
 
+// 1 or 0. IniFind... return the record, which is valid until it is removed, or null; ...Index its
+// position, or 0.
 int32_t IniSectionExists(IniStructForwardReferenceTag* doc, const char* section);
 int32_t IniItemExists(IniStructForwardReferenceTag* doc, const char* section, const char* item);
 IniSection* IniFindSection(IniStructForwardReferenceTag* doc, const char* section);
@@ -126,8 +144,10 @@ int32_t IniFindEntryIndex(IniSection* section, int32_t caseSensitive, const char
 
 // Line of the header, -1 when absent or not from a file.
 int32_t IniLineOfSection(IniStructForwardReferenceTag* doc, const char* section);
+// The name as stored; null for null.
 const char* IniSectionName(const IniSection* section);
 const char* IniEntryName(const IniEntry* entry);
+// 1 or 0; 0 for null, too.
 int32_t IniSectionWasReadFromFile(const IniSection* section);
 
 // 1 for the section of the items before the first header: its name is "(null)".
@@ -135,10 +155,12 @@ int32_t IniSectionIsNull(const IniSection* section);
 
 // ---- Enumeration. Names and values stay valid until the item is removed or replaced.
 
+// 0 for what is not there.
 int32_t IniNumberOfSections(IniStructForwardReferenceTag* doc);
 int32_t IniNumberOfItems(IniStructForwardReferenceTag* doc, const char* section);
 // Look-ups of that name go to this very section until another one is looked up.
 int32_t IniNthSectionName(IniStructForwardReferenceTag* doc, int32_t n, const char** name);
+// Name and value as stored, by position in the section: 1, or 0 where there is none.
 int32_t IniNthItemName(IniStructForwardReferenceTag* doc, const char* section, int32_t n,
                        const char** name);
 int32_t IniNthItemPointerToString(IniStructForwardReferenceTag* doc, const char* section, int32_t n,
@@ -148,6 +170,7 @@ int32_t IniNthItemPointerToString(IniStructForwardReferenceTag* doc, const char*
 
 // Does not look for another section of the new name.
 int32_t IniRenameSection(IniStructForwardReferenceTag* doc, const char* section, const char* name);
+// With all of its items. 1 or 0.
 int32_t IniRemoveSection(IniStructForwardReferenceTag* doc, const char* section);
 int32_t IniRemoveItem(IniStructForwardReferenceTag* doc, const char* section, const char* item);
 
@@ -188,6 +211,8 @@ int32_t IniGetDouble(IniStructForwardReferenceTag* doc, const char* section, con
 // `quoteCharacter` encloses the value in the file; 0 for none.
 int32_t IniPut(IniStructForwardReferenceTag* doc, const char* section, const char* item,
                const char* value, int32_t quoteCharacter);
+// With `quote` in double quotes; with `escape` the value is encoded first. IniPutRawString quotes
+// and does not encode; IniPutDouble writes "%.14e" without quotes.
 int32_t IniPutStringWithOptions(IniStructForwardReferenceTag* doc, const char* section,
                                 const char* item, const char* value, int32_t quote, int32_t escape);
 int32_t IniPutRawString(IniStructForwardReferenceTag* doc, const char* section, const char* item,
@@ -204,7 +229,8 @@ int32_t IniPutDouble(IniStructForwardReferenceTag* doc, const char* section, con
 // are refused.
 int32_t IniWriteToFile(IniStructForwardReferenceTag* doc, const char* path);
 
-// Tells one state of a file from another without reading it.
+// Distinguishes states of a file without reading it: device, inode, size and time of the last
+// change.
 struct IniFileState {
   uint64_t device = 0, inode = 0;
   int64_t sizeBytes = -1, modifiedSeconds = 0, modifiedNanoseconds = 0;

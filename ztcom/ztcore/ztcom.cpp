@@ -26,8 +26,11 @@ HRESULT HandOut(void* object, uintptr_t offset, void** out) {
 
 HRESULT ZTComInternalQueryInterface(void* object, const _ZTCOM_INTMAP_ENTRY* entries,
                                     const GUID& iid, void** out) {
+  // A broken table is a mistake of the class, which no result could report to anyone who can mend
+  // it.
   if (!object || !out || entries->function != kZtComSimpleEntry) abort();
   *out = nullptr;
+  // Before the rows, and always the first one's interface: one pointer is the object's identity.
   if (IsUnknown(iid)) return HandOut(object, entries->offset, out);
   for (const _ZTCOM_INTMAP_ENTRY* row = entries; row->function != 0; ++row) {
     bool blind = !row->iid;
@@ -38,6 +41,7 @@ HRESULT ZTComInternalQueryInterface(void* object, const _ZTCOM_INTMAP_ENTRY* ent
     }
     HRESULT result =
         reinterpret_cast<ZtComMapFunction>(row->function)(object, iid, out, row->offset);
+    // A row for all interfaces may refuse one, which a later row then answers.
     if (result == S_OK || (result < 0 && !blind)) return result;
   }
   return E_NOINTERFACE;

@@ -32,11 +32,13 @@ HRESULT ZTComInternalQueryInterface(void* object, const _ZTCOM_INTMAP_ENTRY* ent
 // 0 for results from 0 up, else 0x800A0000 with the magnitude.
 HRESULT HResultFromZTResult(int result);
 
+// The count, which CZTComObject changes by the rules of the implementation class's thread model.
 class CZTComObjectRootBase {
  public:
   int32_t m_refCount = 0;
 };
 
+// Atomic counting without a section of the object's own: its data are the class's to guard.
 struct CZTComMultiThreadModelNoCS {
   static int32_t Increment(int32_t* count) { return ZTInterlockedInc(count); }
   static int32_t Decrement(int32_t* count) { return ZTInterlockedDec(count); }

@@ -26,6 +26,7 @@ void CZTMutex::Lock() {
 }
 
 void CZTMutex::Unlock() {
+  // Before the mutex is free: afterwards another thread may already have set both.
   m_state->locked = 0;
   m_state->owner = pthread_t{};
   pthread_mutex_unlock(&m_state->mutex);
@@ -35,6 +36,8 @@ bool CZTMutex::IsNesting() const {
   return m_state->locked && pthread_equal(m_state->owner, pthread_self());
 }
 
+// Sequentially consistent: a thread that takes the last reference away must see what the others
+// wrote.
 int ZTInterlockedInc(int* counter) { return std::atomic_ref<int>(*counter).fetch_add(1) + 1; }
 int ZTInterlockedDec(int* counter) { return std::atomic_ref<int>(*counter).fetch_sub(1) - 1; }
 int ZTInterlockedGet(int* counter) { return std::atomic_ref<int>(*counter).load(); }

@@ -9,6 +9,7 @@ int ZTInterlockedInc(int* counter);
 int ZTInterlockedDec(int* counter);
 // The value that the counter has at some moment of the call.
 int ZTInterlockedGet(int* counter);
+// The calling thread, for comparison by pthread_equal only.
 pthread_t ZTGetThreadId();
 
 // Lock of one process, not recursive, that knows its owner.

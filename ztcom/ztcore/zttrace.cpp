@@ -17,6 +17,8 @@ IZTDebugOutputStream* g_pZTDebugOutputStream = nullptr;
 
 namespace {
 
+// Recursive, so that a nested call of the same thread reaches the test below instead of waiting for
+// itself.
 struct Trace {
   ForkSafeMutex lock{AtFork::Wait, 65};
   bool inProgress GUARDED_BY(lock) = false;

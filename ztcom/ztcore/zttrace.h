@@ -8,6 +8,7 @@ struct IZTDebugOutputStream {
   ~IZTDebugOutputStream() = default;
 };
 
+// Set by the host, before its threads trace; null for none. The host keeps the object alive.
 extern IZTDebugOutputStream* g_pZTDebugOutputStream;
 
 // Hands the message, cut to 1023 bytes, to the sink, one call at a time. A call from inside the
