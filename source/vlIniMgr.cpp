@@ -291,8 +291,8 @@ HRESULT CvlIniMgr::Write() {
   return m_dirty ? writeDocument(nullptr, &isInPlace) : S_OK;
 }
 
-// *digest, if asked for, is that of the bytes that were written; *isInPlace, whether they are still what
-// the path leads to.
+// *digest, if asked for, is that of the bytes that were written; *isInPlace, whether they are still
+// what the path leads to.
 HRESULT CvlIniMgr::writeDocument(IniSidecar::Digest* digest, bool* isInPlace) {
   if (!m_ini || !ownsLock()) return E_FAIL;
   // The changes may have been made to what the file no longer is.

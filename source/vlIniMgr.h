@@ -74,8 +74,8 @@ class CvlIniMgr {
   // also where the lock was lost and another process has it, or has changed the file since.
   HRESULT Write();
   // Write, then the digest of the file as it is, new[]; then the object holds exactly what the file
-  // holds: it is read again, unless it is known to read back as this object. Null on failure. Where the file cannot be read again, for whatever
-  // reason, the object keeps what it held.
+  // holds: it is read again, unless it is known to read back as this object. Null on failure. Where
+  // the file cannot be read again, for whatever reason, the object keeps what it held.
   HRESULT WriteAndGetChecksum(unsigned char** digest);
   // The same into *digest, which is indeterminate on failure.
   HRESULT WriteAndGetDigest(IniSidecar::Digest* digest);

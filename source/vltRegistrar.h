@@ -15,8 +15,8 @@
 #include "zt/fnd/osdep/ForkSafeMutex.h"
 #include "zt/fnd/osdep/ThreadAnnotations.h"
 
-// An ordered map with the lock that guards it, also in a child that is forked during a change. The map
-// can be reached through a hold only:
+// An ordered map with the lock that guards it, also in a child that is forked during a change. The
+// map can be reached through a hold only:
 //
 //   CvlrProtectedMap<GUID, int>::Hold map(protectedMap);
 //   map->erase(key);

@@ -4,11 +4,13 @@
 
 namespace ztini {
 
-// Memory for the records and texts of one document that is read: given piece by piece, freed as one.
+// Memory for the records and texts of one document that is read: given piece by piece, freed as
+// one.
 //
-// Blocks grow from about 512 bytes to 1 MiB, so that a small document takes little and a large one few
-// blocks. In a block, records go up from the front, aligned, and texts come down from the back, with
-// no byte between them; a piece that would fill a quarter of a new block gets a block of its own.
+// Blocks grow from about 512 bytes to 1 MiB, so that a small document takes little and a large one
+// few blocks. In a block, records go up from the front, aligned, and texts come down from the back,
+// with no byte between them; a piece that would fill a quarter of a new block gets a block of its
+// own.
 class Arena {
  public:
   Arena() = default;

@@ -15,17 +15,18 @@
 // The records that the engine's handles refer to. Callers outside see the functions of ztini.h
 // only.
 //
-// What is read lies in the document's arena and in the text of its file: records, names and values take
-// no malloc block each, and go when the document is emptied. What is put, and a name or value that is changed, has a block of its
-// own, so that a document that is edited for months does not grow.
+// What is read lies in the document's arena and in the text of its file: records, names and values
+// take no malloc block each, and go when the document is emptied. What is put, and a name or value
+// that is changed, has a block of its own, so that a document that is edited for months does not
+// grow.
 
 inline constexpr char kIniNullSectionName[] = "(null)";
 
 struct IniEntry : ztini::NameNode {
   char* value = nullptr;  // without surrounding white space and enclosing quotes
   int32_t line = -1;      // -1: not from a file
-  // What encloses the value in the file: 0, 34, 39, or as put. More than a character, because a put of
-  // 256 is not one of 0: it writes the character 0.
+  // What encloses the value in the file: 0, 34, 39, or as put. More than a character, because a put
+  // of 256 is not one of 0: it writes the character 0.
   uint32_t quote : 9 = 0;
   // Lengths of both texts, so that a save does not count them; 0 where that is unknown.
   uint32_t knownNameLength : 11 = 0;
@@ -87,8 +88,8 @@ struct IniStructForwardReferenceTag {
   IniDurability durability = IniDurability::None;
   ztini::OwnedText fileName;  // last read or written successfully; null: none
   int64_t fileTimestamp = 0;
-  // Reading the file that the document would be written to gives this document; as long as the fold has
-  // this generation.
+  // Reading the file that the document would be written to gives this document; as long as the fold
+  // has this generation.
   bool settled = false;
   uint32_t settledFold = 0;
   // The text of the last save, from which the next one copies the sections that have not changed; empty
@@ -107,8 +108,8 @@ struct IniStructForwardReferenceTag {
 IniSection* IniNewSection(IniStructForwardReferenceTag* doc, const char* name);
 IniEntry* IniNewEntry(const char* name, const char* value, int32_t readOptions);
 
-// The same in the document's arena, over texts that live as long and have no surrounding white space. The
-// quotes that enclose the value are cut off in place, where the options ask for it.
+// The same in the document's arena, over texts that live as long and have no surrounding white
+// space. The quotes that enclose the value are cut off in place, where the options ask for it.
 IniSection* IniReadSection(IniStructForwardReferenceTag* doc, char* name);
 IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, size_t nameLength,
                        char* value, size_t valueLength);

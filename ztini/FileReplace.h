@@ -43,10 +43,9 @@ class FileReplacement {
   // All of the bytes, or kIniWriteFailed; interrupted and short writes go on.
   int32_t write(const char* bytes, size_t size);
 
-  // Closes the file and puts it in place. 0, or kIniWriteFailed,
-  // kIniNotReplaceable. kIniWriteFailed after the rename, with the new file in place, if its directory
-  // could not be synced: a power cut may still lose it. Sets *state, if asked for, to that of the
-  // written file.
+  // Closes the file and puts it in place. 0, or kIniWriteFailed, kIniNotReplaceable.
+  // kIniWriteFailed after the rename, with the new file in place, if its directory could not be
+  // synced: a power cut may still lose it. Sets *state, if asked for, to that of the written file.
   int32_t commit(IniDurability durability, IniFileState* state = nullptr);
 
  private:

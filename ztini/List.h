@@ -12,7 +12,8 @@
 // Any other position, and a null list, does nothing (get, remove) or gives 0 (find, insert).
 //
 // Growth is geometric; removal moves the shorter side, so that emptying a list from either end is
-// linear. A list without a block (capacity 0) still holds one item that is no larger than a pointer.
+// linear. A list without a block (capacity 0) still holds one item that is no larger than a
+// pointer.
 struct ztini_ListRecord {
   union {
     char* block = nullptr;

@@ -10,17 +10,17 @@ namespace ztini {
 
 enum class NameMatch { IgnoreCase, Exact };
 
-// Whether the caller has just refreshed the fold of the list: one call on a document then looks at the
-// locale once.
+// Whether the caller has just refreshed the fold of the list: one call on a document then looks at
+// the locale once.
 enum class FoldState { Unknown, Fresh };
 
 // Named records in order, with look-up by name.
 //
 // Holds pointers and owns none of the records. Short lists are scanned; longer ones get an index,
 // built at the first look-up and kept up from then on. Without memory for the index, find() scans,
-// with the same results, and seek() reports it: whoever asks once per line of a file must not pay for
-// the whole list each time. Records are only ever appended, so their sequence numbers ascend, and a
-// record's position is found by bisection.
+// with the same results, and seek() reports it: whoever asks once per line of a file must not pay
+// for the whole list each time. Records are only ever appended, so their sequence numbers ascend,
+// and a record's position is found by bisection.
 class NameList {
  public:
   // The fold is shared by all lists of a document and outlives them.
@@ -61,8 +61,8 @@ class NameList {
   // Takes a record of the list out; it is the caller's afterwards.
   void remove(NameNode* node);
 
-  // Gives a record of the list another name, a malloc block that it takes over; the old one is freed
-  // if it is one, too.
+  // Gives a record of the list another name, a malloc block that it takes over; the old one is
+  // freed if it is one, too.
   void rename(NameNode* node, char* name);
 
   // After the array was compacted in place: keeps the first `count` and looks at all names again.
@@ -88,8 +88,8 @@ class NameList {
   NameFold* m_fold;
 };
 
-// Gives the record another name, a malloc block; the old one is freed if it is one, too. Of a record
-// of a list only when the list's keepFirst() follows.
+// Gives the record another name, a malloc block; the old one is freed if it is one, too. Of a
+// record of a list only when the list's keepFirst() follows.
 void ReplaceName(NameNode* node, char* name);
 
 }  // namespace ztini

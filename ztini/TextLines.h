@@ -7,10 +7,10 @@ namespace ztini {
 
 // Cuts a text in memory into lines: the same ones that IniRead gets of IniLineFileInputFunction.
 //
-// That function is asked for as many bytes as a buffer takes, which begins with 256 and doubles in the
-// middle of a line that does not fit. The next request does not know that it is inside a line: a
-// terminator there that differs from the last line's is skipped, and an end of the text there drops the
-// line. Files with such lines exist, so the same happens here.
+// That function is asked for as many bytes as a buffer takes, which begins with 256 and doubles in
+// the middle of a line that does not fit. The next request does not know that it is inside a line:
+// a terminator there that differs from the last line's is skipped, and an end of the text there
+// drops the line. Files with such lines exist, so the same happens here.
 class TextLines {
  public:
   // *end must be there to be written.

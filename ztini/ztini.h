@@ -242,22 +242,22 @@ IniFileState IniFileStateOf(const struct stat& status);
 // Takes all bytes of a file that is about to be put in place.
 using IniTextFunction = void (*)(void* context, const char* text, size_t sizeBytes);
 
-// IniWriteToFile for a caller who goes on with what was written: passes the bytes on, if `seen` is not
-// null, and sets *written to the state of the file. That stays unknown on a failure, and where the path
-// already leads to another file.
+// IniWriteToFile for a caller who goes on with what was written: passes the bytes on, if `seen` is
+// not null, and sets *written to the state of the file. That stays unknown on a failure, and where
+// the path already leads to another file.
 int32_t IniWriteToFileAndTell(IniStructForwardReferenceTag* doc, const char* path,
                               IniTextFunction seen, void* context, IniFileState* written);
 
 // ---- Settled documents. Reading back a file that was written can change the document: pieces of a
-// value are joined, a line feed in a value breaks the line, an empty value goes. A settled document is
-// one that is known not to change. It need not be read back.
+// value are joined, a line feed in a value breaks the line, an empty value goes. A settled document
+// is one that is known not to change. It need not be read back.
 
-// 1 if the document is settled under the locale in force: all of its names and values come from a file,
-// or were put and survive the way there and back. 0 is always safe to answer.
+// 1 if the document is settled under the locale in force: all of its names and values come from a
+// file, or were put and survive the way there and back. 0 is always safe to answer.
 int32_t IniIsSettled(IniStructForwardReferenceTag* doc);
 
-// After a settled document was written: does what reading the file back would do, that is, gives all
-// sections and items their lines.
+// After a settled document was written: does what reading the file back would do, that is, gives
+// all sections and items their lines.
 void IniTakeAsRead(IniStructForwardReferenceTag* doc);
 
 // The byte order mark, if asked for, and the text; flushes.

@@ -41,10 +41,10 @@ bool IsDirectoryAt(int parent, const char* name) {
   return fstatat(parent, name, &info, AT_SYMLINK_NOFOLLOW) == 0 && S_ISDIR(info.st_mode);
 }
 
-// Makes the directory under another name, with its mode, and gives it its name: a process that is killed
-// between making a directory and changing its mode would leave one that no other user can enter. False,
-// with nothing left, where that cannot be done; the plain way then reports why, or makes the levels
-// above.
+// Makes the directory under another name, with its mode, and gives it its name: a process that is
+// killed between making a directory and changing its mode would leave one that no other user can
+// enter. False, with nothing left, where that cannot be done; the plain way then reports why, or
+// makes the levels above.
 bool MakeOpenDirectory(const String& directory) {
   std::string target = WithoutSlashes(directory);
   // A relative path, and the root, are left to path::CreateDir, which refuses the one and finds the
@@ -77,14 +77,14 @@ void SyncLevels(const String& directory) {
 
 HRESULT ResultOf(int status) { return status == 0 ? S_OK : E_FAIL; }
 
-// Mode changes of a tree by descriptors: whatever is moved or replaced meanwhile, no change goes through
-// a link or leaves the tree.
+// Mode changes of a tree by descriptors: whatever is moved or replaced meanwhile, no change goes
+// through a link or leaves the tree.
 class TreeMode {
  public:
   explicit TreeMode(int mode) : m_mode(static_cast<mode_t>(mode)) {}
 
-  // The thing the descriptor (O_PATH) leads to and all that is in it, without entries whose name begins
-  // with a dot. The first failure ends the walk.
+  // The thing the descriptor (O_PATH) leads to and all that is in it, without entries whose name
+  // begins with a dot. The first failure ends the walk.
   HRESULT change(int found) {
     struct stat info;
     if (fstat(found, &info) != 0) return E_FAIL;

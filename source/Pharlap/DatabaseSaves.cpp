@@ -53,8 +53,8 @@ void DatabaseSaves::finishScan() {
   if (saves == Scan::First || saves == Scan::Synced) m_copy.syncDirectory();
 }
 
-// Without the lock - in a child that was forked in the scan, or after the lock file was removed - the
-// second name may cover another process's saves by now.
+// Without the lock - in a child that was forked in the scan, or after the lock file was removed -
+// the second name may cover another process's saves by now.
 void DatabaseSaves::finishCopy() {
   if (m_database.HoldsLock()) {
     m_copy.finish();

@@ -16,8 +16,8 @@ namespace registrar {
 // What one comparison of the installation with the database knows, and the changes of the database
 // that it makes. Lives for one CvltPharlapRegistrar::UpdateRegistrationFile, which drives it.
 //
-// Changes the open document only; saving is the caller's. An item that cannot be set, because memory
-// is out, is left out; its file gets no stamp, so that the next start merges it again.
+// Changes the open document only; saving is the caller's. An item that cannot be set, because
+// memory is out, is left out; its file gets no stamp, so that the next start merges it again.
 // Threads: one.
 class Scan {
  public:

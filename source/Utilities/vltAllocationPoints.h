@@ -1,7 +1,7 @@
 #pragma once
 
-// Allocations of the exports whose failure is a result: the hook point before each, and the function
-// that reports it.
+// Allocations of the exports whose failure is a result: the hook point before each, and the
+// function that reports it.
 
 #include "source/Common/vltHookPoints.h"
 #include "source/Common/vltTestHook.h"

@@ -51,8 +51,8 @@ struct Entries {
 
 // What is loaded, and its own lock: Hold hold(loader).
 //
-// A child that was forked while another thread was loading or unloading, for longer than a fork waits,
-// starts with nothing loaded. What is half changed is left as it is, out of reach.
+// A child that was forked while another thread was loading or unloading, for longer than a fork
+// waits, starts with nothing loaded. What is half changed is left as it is, out of reach.
 class CAPABILITY("loader") Loader {
  public:
   void lock() ACQUIRE() NO_THREAD_SAFETY_ANALYSIS {

@@ -139,8 +139,8 @@ void AutoBuffer::makeOwnWithRoom(uint32_t required, Growth growth) {
   ReallocData(m_guts, growth == Growth::Exact ? required : GrownByATenth(required));
 }
 
-// Makes space, and returns where the given bytes lie afterwards: the block may have moved, with them
-// inside.
+// Makes space, and returns where the given bytes lie afterwards: the block may have moved, with
+// them inside.
 const unsigned char* AutoBuffer::prepare(const void* bytes, uint32_t required) {
   const unsigned char* source = static_cast<const unsigned char*>(bytes);
   const unsigned char* old = Data();

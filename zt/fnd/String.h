@@ -113,10 +113,10 @@ class StringBase {
   StringBase& operator=(const T* s);
   StringBase& operator=(const Other* s);
 
-  // Growth. Without space the capacity becomes twice the new length, or exactly the new length where
-  // doubling is impossible. A string may be appended to itself.
-  // With `pos`: takes min(n, s.length()) characters from `pos` on, which is not checked; what lies
-  // beyond the end of `s` is taken as zeros.
+  // Growth. Without space the capacity becomes twice the new length, or exactly the new length
+  // where doubling is impossible. A string may be appended to itself. With `pos`: takes min(n,
+  // s.length()) characters from `pos` on, which is not checked; what lies beyond the end of `s` is
+  // taken as zeros.
   StringBase& append(const StringBase& s);
   StringBase& append(const StringBase& s, size_type pos, size_type n);
   StringBase& append(const T* s);

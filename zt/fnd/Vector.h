@@ -13,10 +13,10 @@ namespace zt::fnd {
 
 // Growable array in one block from DLLMalloc; 32-bit size.
 //
-// Without space the capacity c becomes 2c + 1 (or c + 1 with c's top bit set). A copy has a capacity
-// equal to its size. Throws OutOfRange where a capacity or its byte size passes 32 bits,
-// std::bad_alloc, and what copying an element throws; a failed call changes nothing.
-// Threads: a plain value.
+// Without space the capacity c becomes 2c + 1 (or c + 1 with c's top bit set). A copy has a
+// capacity equal to its size. Throws OutOfRange where a capacity or its byte size passes 32 bits,
+// std::bad_alloc, and what copying an element throws; a failed call changes nothing. Threads: a
+// plain value.
 template <class T>
 class Vector {
   static_assert(alignof(T) <= alignof(std::max_align_t), "the block is aligned as malloc aligns");

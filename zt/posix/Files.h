@@ -13,8 +13,7 @@
 //    user) or the owner of what it leads to owns it. Any other one is refused with ELOOP. So a user
 //    can lead a privileged process to files of that user only.
 // 2. What is neither a regular file nor, where one is asked for, a directory is never opened, not
-// even
-//    to look at it: a device may act on being opened, and a pipe may wait.
+//    even to examine it: a device may act on being opened, and a pipe may wait.
 // 3. No mode is changed of a file that has a second name, or that neither root nor the caller owns.
 //
 // Every descriptor is close-on-exec, never becomes a controlling terminal, and is 3 or more: a host

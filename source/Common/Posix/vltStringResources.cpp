@@ -135,8 +135,8 @@ bool vltStringResources::Database::appendFrom(ResourceQuery& q, const char* sect
   return !q.separator;
 }
 
-// Puts the next component of the list into the index. Returns its section and the base name of its file,
-// which is empty if it has none; null at the end of the list.
+// Puts the next component of the list into the index. Returns its section and the base name of its
+// file, which is empty if it has none; null at the end of the list.
 const char* vltStringResources::Database::indexNext(std::string* base) {
   base->clear();
   const char* section = nullptr;

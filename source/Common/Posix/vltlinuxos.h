@@ -59,8 +59,8 @@ HRESULT vltGetStringResourceImpl(const char* separator, const wchar_t* file, con
 zt::fnd::String vlLogDirectory();
 zt::fnd::String vlDiagnosticsIni();
 
-// vlLogDirectory, made with mode 0777 if it was missing; failures to make it are dropped. Sets the path of
-// "vldiag.ini".
+// vlLogDirectory, made with mode 0777 if it was missing; failures to make it are dropped. Sets the
+// path of "vldiag.ini".
 zt::fnd::String vlCreateLogDirIfNeeded(zt::fnd::AnsiString& diagnosticsIni);
 
 // Reads "Severity" (default 1), "Target" (1) and, for a non-null threshold, "LowDiskThreshold" (0)

@@ -87,9 +87,9 @@ class ForkSafeMutex::Registry {
     }
   }
 
-  // Takes `first`, where one is given, before the others, and waits for it to the end: its holder may
-  // have been waiting for one that comes earlier in the order. The others have a short turn each.
-  // Returns the first that was missed; once the end has come all that are free are taken.
+  // Takes `first`, where one is given, before the others, and waits for it to the end: its holder
+  // may have been waiting for one that comes earlier in the order. The others have a short turn
+  // each. Returns the first that was missed; once the end has come all that are free are taken.
   static ForkSafeMutex* TakeAll(ForkSafeMutex* first, int64_t end) REQUIRES(s_lock) {
     ForkSafeMutex* missed = nullptr;
     if (first && !Take(*first, end)) missed = first;

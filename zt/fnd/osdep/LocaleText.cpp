@@ -78,7 +78,8 @@ size_t LengthByLead(unsigned char lead) {
   return lead < 0xF5 ? 4 : 0;
 }
 
-// Reads a character. Returns its bytes; 0, with `c` undefined, where there is no whole and valid one.
+// Reads a character. Returns its bytes; 0, with `c` undefined, where there is no whole and valid
+// one.
 size_t ReadUtf8(const char* begin, const char* end, uint32_t& c) {
   static constexpr unsigned char kLeadBits[] = {0, 0x7F, 0x1F, 0x0F, 0x07};
   static constexpr uint32_t kLeast[] = {0, 0, 0x80, 0x800, 0x10000};

@@ -6,8 +6,8 @@
 
 namespace zt::fnd::osdep {
 
-// A plain POSIX mutex, not recursive: for what a condition waits on, or is taken across fork(). As a
-// static it is ready before any initialiser and good after every destructor.
+// A plain POSIX mutex, not recursive: for what a condition waits on, or is taken across fork(). As
+// a static it is ready before any initialiser and good after every destructor.
 class CAPABILITY("mutex") PosixMutex {
  public:
   constexpr PosixMutex() = default;

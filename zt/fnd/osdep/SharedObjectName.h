@@ -4,8 +4,9 @@
 
 // Names of mutexes and events.
 //
-// One name has one file and one entry in each process, whatever the locales of the processes: nothing
-// here asks the locale, which differs between processes and which a host may change at any time.
+// One name has one file and one entry in each process, whatever the locales of the processes:
+// nothing here asks the locale, which differs between processes and which a host may change at any
+// time.
 namespace zt::fnd::osdep {
 
 // The name as the bytes of a file's name: UTF-8. A value that is no character becomes "?".

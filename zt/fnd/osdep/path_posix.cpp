@@ -55,8 +55,8 @@ bool LeadsToDirectory(const char* path) {
   return found && ::fstat(found.get(), &info) == 0 && S_ISDIR(info.st_mode);
 }
 
-// Makes one directory, in the directory that the path led to when it was looked up; 0, or the errno of
-// the failed step.
+// Makes one directory, in the directory that the path led to when it was looked up; 0, or the errno
+// of the failed step.
 int MakeOneDir(const char* path, bool useMode, mode_t mode) {
   zt::posix::Entry entry(path);
   if (!entry.valid()) return errno;
@@ -93,8 +93,8 @@ void CreateDirWorker(const wchar_t* path, bool useMode, mode_t mode) {
   }
 }
 
-// The names that tempnam gives, without its warning to the linker: that another process may take the name
-// first is known to the callers, who open what they make with O_EXCL.
+// The names that tempnam gives, without its warning to the linker: that another process may take
+// the name first is known to the callers, who open what they make with O_EXCL.
 
 // The environment's directory counts before the caller's, for who is not set-user-id.
 std::string TempDirectory(const char* wanted) {

@@ -10,14 +10,14 @@
 
 // The log of a process.
 //
-// Code tests a bit of the mask and, if it is set, hands a line to vlt_vlTracer::TraceOutput, which
+// Code tests a bit of the mask and, if it is set, gives a line to vlt_vlTracer::TraceOutput, which
 // sends it to the targets: a log file, standard output, standard error. The file appears with the
 // first line that reaches it, so a process that traces nothing leaves none.
 //
-//   state                      TraceOutput                              Initialize
-//   not initialised, cleaned   nothing, not even to standard error      starts
-//   started                    writes to the targets                    changes mask, targets, limit
-//   stopped by a short disk    writes to the other targets              changes mask, targets, limit
+//   state                      TraceOutput                          Initialize
+//   not initialised, cleaned   nothing, not even to standard error  starts
+//   started                    writes to the targets                changes mask, targets, limit
+//   stopped by a short disk    writes to the other targets          changes mask, targets, limit
 //
 // Nothing here reports a failure: lines that cannot be written are lost, and the log file is not
 // opened again once the disk was short. Threads: any; the lines of one call stay together.

@@ -10,8 +10,8 @@ namespace zt::fnd::osdep {
 class EventData;
 class SemaphoreSet;
 
-// What the events and sets of a process need of the statics that count them: the locks, and the maps
-// that they are found in.
+// What the events and sets of a process need of the statics that count them: the locks, and the
+// maps that they are found in.
 class EventRegistry : public RefCountedThreadSafePolicy {
  public:
   // The set of this number, usable or not. For callers inside the section.
