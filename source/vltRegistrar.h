@@ -65,10 +65,12 @@ class CvltRegistrar : public IvltRegistrar2 {
   CvltRegistrar(const CvltRegistrar&) = delete;
   CvltRegistrar& operator=(const CvltRegistrar&) = delete;
 
+  // IUnknown, IvltRegistrar and IvltRegistrar2 are one object, and one pointer.
   HRESULT QueryInterface(const GUID& iid, void** out) override;
   uint32_t AddRef() override;
   uint32_t Release() override;
 
+  // What needs a database is the derived classes': E_NOTIMPL, with the arguments not touched.
   HRESULT GetConfigurationPath(wchar_t**) override { return E_NOTIMPL; }
   HRESULT SetConfigurationPath(const wchar_t*) override { return E_NOTIMPL; }
   HRESULT GetSDKPath(wchar_t**) override { return E_NOTIMPL; }
@@ -150,9 +152,11 @@ class CvltEnumComponentRegistrar : public IvltEnumComponent {
   template <class Record>
   HRESULT step(Record* record);
 
+  // Starts at 0: the creator's QueryInterface takes the first reference.
   uint32_t m_refCount = 0;
   CvltRegistrar* m_registrar;
   _vltComponentType m_type;
   zt::fnd::Vector<GUID> m_identifiers;
+  // The next identifier to be tried; the size of the snapshot at its end.
   unsigned m_cursor = 0;
 };

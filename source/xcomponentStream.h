@@ -6,8 +6,8 @@
 #include "source/xcomponent.h"
 
 // Writes the record's fields one by one, with the variant of its type. Texts go out in the locale's
-// encoding. Throws CztStreamException when the stream takes a number no longer; the fate of a
-// text's bytes and of opaqueQuad is not looked at.
+// encoding. Throws CztStreamException when the stream takes a number no longer; whether a text's
+// bytes and opaqueQuad were taken is not checked.
 CztOutStream& operator<<(CztOutStream& out, const CvltComponent& component);
 
 // Reads a record that a build of the same record size wrote. Texts are new blocks; the ones that

@@ -13,7 +13,7 @@ namespace ztini {
 // exceptions, and nothing throws here.
 //
 // Every block of the engine comes from this function and goes back through free(), so that texts
-// handed to callers are ordinary malloc blocks. It is realloc; tests put a failing one in its
+// returned to callers are ordinary malloc blocks. It is realloc; tests put a failing one in its
 // place, before they start threads.
 using ReallocFunction = void* (*)(void* block, size_t size);
 extern ReallocFunction g_realloc;

@@ -5,6 +5,9 @@
 
 namespace ztini {
 
+// The Unicode byte order marks (the Unicode Standard, chapter 23.8). One of UTF-8 is skipped, the
+// others announce an encoding that the engine does not read. The longer mark is tested first: that
+// of UTF-32 begins with that of UTF-16.
 enum class ByteOrderMark { kNone, kUtf8, kWide };  // kWide: UTF-16 or UTF-32, which are refused
 
 inline constexpr char kUtf8Mark[] = "\xEF\xBB\xBF";

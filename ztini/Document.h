@@ -56,6 +56,7 @@ struct IniSection : ztini::NameNode {
 
   IniEntry* item(int32_t position) const { return static_cast<IniEntry*>(items.at(position)); }
 
+  // Items in file order; the list owns none of them, the section does.
   ztini::NameList items;  // of IniEntry
   int32_t flags = 0;
   int32_t line = -1;  // of the header; -1: not from a file
@@ -77,6 +78,7 @@ struct IniStructForwardReferenceTag {
   IniSection* currentSection = nullptr;  // the section last found, asked first
   int32_t sectionFlags = 0;              // copied into new sections, never read
   int32_t duplicateChecking = 1;
+  // Nonzero: look-ups compare names byte by byte.
   int32_t caseSensitive = 0;
   int32_t lastItemLine = -1;       // of the item last fetched by IniGet
   ztini_Handle scratch = nullptr;  // the value last decoded
@@ -87,6 +89,7 @@ struct IniStructForwardReferenceTag {
   int32_t firstBadLine = -1;  // of the last read; -1: none
   IniDurability durability = IniDurability::None;
   ztini::OwnedText fileName;  // last read or written successfully; null: none
+  // Seconds of the Unix epoch; 0 where the file could not be asked.
   int64_t fileTimestamp = 0;
   // Reading the file that the document would be written to gives this document; as long as the fold
   // has this generation.

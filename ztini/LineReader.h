@@ -14,11 +14,14 @@ struct LineFile;
 using LineFileFillFunction = int32_t (*)(LineFile* state);
 
 struct LineFile {
+  // The caller's.
   FILE* file;
   LineFileFillFunction fill;
   char buffer[kLineFileBufferSize];
+  // The next byte of the buffer, and how many are left from there.
   const char* cursor;
   int32_t bytesLeft;
+  // The number of the present line, from 1; stays at INT32_MAX.
   int32_t linesCompleted;
   int64_t totalBytes;    // taken from the stream
   char lastTerminator;   // 0 before the first line has ended

@@ -10,7 +10,7 @@ namespace ztini {
 
 enum class NameMatch { IgnoreCase, Exact };
 
-// Whether the caller has just refreshed the fold of the list: one call on a document then looks at
+// Whether the caller has just refreshed the fold of the list: one call on a document then asks for
 // the locale once.
 enum class FoldState { Unknown, Fresh };
 
@@ -65,7 +65,8 @@ class NameList {
   // freed if it is one, too.
   void rename(NameNode* node, char* name);
 
-  // After the array was compacted in place: keeps the first `count` and looks at all names again.
+  // After the array was compacted in place: keeps the first `count` and drops the index, as any
+  // name may have changed.
   void keepFirst(int32_t count);
 
  private:

@@ -9,8 +9,9 @@
 
 namespace ztini {
 
-// Text that grows without throwing. Appending after a failure does nothing; ok() reports it at the
-// end.
+// Text that grows without throwing: a failure is remembered, appending after it does nothing, and
+// ok() reports it once at the end. The text may hold zeros; a terminator always follows it.
+// Threads: one.
 class TextBuffer {
  public:
   TextBuffer() = default;
@@ -25,6 +26,7 @@ class TextBuffer {
 
   // Empty again, without its block.
   void reset() { *this = TextBuffer(); }
+  // Empties the text and keeps its block. A failure stays.
   void clear() {
     m_length = 0;
     if (m_text) m_text.get()[0] = 0;

@@ -7,7 +7,7 @@
 // Bit of the trace mask under which error messages go out.
 inline constexpr unsigned kTraceErrors = 2;
 
-// Hands the message to the log if the trace mask has kTraceErrors. `format` is that of printf.
+// Passes the message to the log if the trace mask has kTraceErrors. `format` is that of printf.
 // Never fails: a message that cannot be formed is lost.
 void vltTraceError(const char* format, ...) __attribute__((format(printf, 1, 2)));
 

@@ -33,6 +33,7 @@ inline constexpr const char* kDuplicateString2 =
 inline constexpr const char* kAppendString2 = "TestHookNT\"./source/Common/vltDuplicateString2\"42";
 inline constexpr const char* kStringFromClsid = "TestHookNT\"./source/Common/vltTypeToString2\"77";
 
+// A point and what happens there, for lists that people read.
 struct Point {
   const char* name;
   const char* where;

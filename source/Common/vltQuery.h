@@ -28,7 +28,7 @@ struct _vltQuery {
 };
 
 // Writes, in order: format version 1, GUID, tFlag, orFlag, termCount, and of each term id, type and
-// value; a text is its tildeFlag, whose fate is not looked at, and the text. Stops at the first
+// value; a text is its tildeFlag, whose result is not read, and the text. Stops at the first
 // failure; returns the last result.
 HRESULT vltMarshalQueryToStream(const _vltQuery* query, IvltOutputStream* stream);
 

@@ -16,11 +16,14 @@
 
 namespace registrar {
 
+// Sections of the database itself: settings; the list of components, item and value a section each;
+// the time stamp of each registration file; the file that each component came from.
 inline constexpr const char* kGlobalSection = "KOR";
 inline constexpr const char* kComponents = "KORComponents";
 inline constexpr const char* kRegistrations = "Registration";
 inline constexpr const char* kContents = "VLRContentsSection";
 
+// Items of the settings, and of a component's section.
 inline constexpr const char* kConfigFile = "ConfigFile";
 inline constexpr const char* kSchemaVersion = "SchemaVersion";
 inline constexpr const char* kCacheSize = "CacheSize";
@@ -84,6 +87,7 @@ inline std::string WithoutBraces(std::string text) {
   return text;
 }
 
+// Numbers as the database keeps them: decimal digits; what is no number reads as 0.
 inline std::string Decimal(uint32_t value) { return std::to_string(value); }
 inline uint32_t Number(const std::string& text) {
   return static_cast<uint32_t>(strtoul(text.c_str(), nullptr, 10));

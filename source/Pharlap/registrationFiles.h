@@ -20,7 +20,7 @@ bool HasLineEnd(const std::string& text);
 // Appends the registration files of the bundles in `directory` whose names match `mask`, in the
 // order of the directory listing. A bundle that is no directory, that this user may not enter, or
 // that has no regular file in that place has none; so has one with a line end in its path. Throws
-// zt::fnd::osdep::PosixError for what else keeps the system from looking.
+// zt::fnd::osdep::PosixError for what else keeps the system from answering.
 void AppendRegistrationFiles(const zt::fnd::String& directory, const zt::fnd::String& mask,
                              RegistrationFiles& files);
 

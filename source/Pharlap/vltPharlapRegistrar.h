@@ -20,8 +20,8 @@ class Scan;
 // Keeps the components in one guarded INI file, the registration database, and in memory.
 //
 // Init opens the database, brings it up to date with the registration files of the installation,
-// and reads every component into the map. After that no registration file is looked at again: Scan
-// does nothing. The database's lock is held until the destructor, so a second process that wants a
+// and reads every component into the map. After that no registration file is read again: Scan does
+// nothing. The database's lock is held until the destructor, so a second process that wants a
 // registrar waits for the first one's end.
 //
 // Each changed registration file is saved on its own, so that a start that is killed has done what

@@ -6,7 +6,7 @@
 // text "BINDING_CLASSES" of the database, joined over all components of one file.
 class CvltLinuxRegistrar : public CvltPharlapRegistrar {
  public:
-  // Runs Init; what it throws leaves nothing behind, the database's lock included.
+  // Runs Init; what it throws leaves nothing held, the database's lock included.
   CvltLinuxRegistrar(const zt::fnd::String& registrationFilePath,
                      const zt::fnd::String& installDirectory);
 

@@ -57,7 +57,7 @@ constexpr const char* kMissing = "does not exist";
 constexpr const char* kUnreadable = "is not readable";
 
 // A relative path is nowhere: dictionaries keep their prefix in a field that is checked as a file.
-// Throws what keeps the system from looking.
+// Throws what keeps the system from answering.
 bool IsThere(const wchar_t* file) {
   if (!path::IsPathAbsolute(file)) return false;
   try {

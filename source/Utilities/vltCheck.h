@@ -43,8 +43,8 @@ class CEnumErrorString : public IEnumString {
 };
 
 // S_OK, or E_FAIL and one message more. A relative path, and one below what is no directory, do not
-// exist. Where anything else keeps the system from looking whether the file is there - a directory
-// that may not be entered, a name too long, links in a circle - the file is not readable.
+// exist. Where anything else keeps the system from answering - a directory that may not be entered,
+// a name too long, links in a circle - the file is not readable.
 HRESULT CheckFileExistence(const wchar_t* path, const wchar_t* word, vltErrors& errors);
 HRESULT CheckEntryPoint(const wchar_t* path, const wchar_t* entryPoint, vltErrors& errors);
 // Of a dictionary's files the last one decides the result; all are checked.

@@ -73,7 +73,7 @@ HRESULT WithPreparedJar(String& dataDir, Use use) {
   HRESULT result = PrepareDataDirectory(dataDir);
   if (result < 0) return result;
   std::unique_ptr<wchar_t[]> jar(GetJarFilePath());
-  // The directory stays absent: there is nothing to read or to keep. One that cannot be looked at
+  // The directory stays absent: there is nothing to read or to keep. One that cannot be examined
   // for the moment is not absent, and what it holds must not be reported as missing.
   if (!jar) return DirectoryIsUnknown(dataDir) ? E_FAIL : result;
   return WithJar(jar.get(), [&](CvlIniMgr& ini) { return use(jar.get(), ini); });

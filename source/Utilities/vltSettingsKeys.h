@@ -8,7 +8,8 @@ inline constexpr const char* kSection = "STORAGE";
 // The one index that has defaults.
 inline constexpr unsigned kDefaultIndex = 3;
 
-// An item whose name ends in the index.
+// An item whose name ends in the index in decimal digits, "LocalServerEndpoint3". The text at index
+// 3 is what a plain installation uses.
 struct IndexedText {
   const char* key;
   const wchar_t* atDefaultIndex;
@@ -22,7 +23,9 @@ inline constexpr IndexedText kLocalEndpoint = {"LocalServerEndpoint", L"61900"};
 inline constexpr const char* kRemoteServerEnabled = "RemoteServerEnabled";  // 0 at every index
 inline constexpr const char* kEventNameAppend = "EventNameAppend";          // empty at every index
 
-// An item without an index.
+// An item without an index, with its value where the item is missing. Units: limits in bytes, but
+// for that of objects, which is a count; percentages; the collector's interval in milliseconds; the
+// backup's in seconds.
 struct PlainNumber {
   const char* key;
   long fallback;

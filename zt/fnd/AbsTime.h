@@ -29,6 +29,7 @@ enum tTimeUnit : uint32_t {
 struct tSSTimeValue {
   using tValue = nZTSS100::tFixedPoint128<64, true>;
 
+  // kToSeconds: a count of units becomes seconds. kFromSeconds: the reverse.
   enum tUnitConversion : int32_t { kToSeconds = 1, kFromSeconds = 2 };
   enum tRoundMethod : int32_t {
     kRoundNearest = 1,  // a tie goes to the even value
@@ -37,6 +38,7 @@ struct tSSTimeValue {
     kRoundDown = 4,
   };
 
+  // Values of a status. The caller sets it to kNoError before the first conversion.
   static constexpr int32_t kNoError = 0;
   static constexpr int32_t kInvalidUnit = -50003;
   static constexpr int32_t kDoesNotFit = -50175;
@@ -70,6 +72,7 @@ class AbsTime {
 
   constexpr AbsTime() noexcept = default;  // 1904
   constexpr explicit AbsTime(const Value& value) noexcept : m_value(value) {}
+  // The sum of both, in seconds since 1904.
   AbsTime(double seconds, double fraction) noexcept : m_value(seconds, fraction) {}
 
   constexpr const Value& value() const noexcept { return m_value; }
@@ -98,6 +101,7 @@ class AbsTime {
     return aStart >= bStart && aEnd <= bEnd;
   }
 
+  // By the whole value, to 2^-64 seconds. `min` is before every other time.
   friend constexpr bool operator==(const AbsTime&, const AbsTime&) noexcept = default;
   friend constexpr auto operator<=>(const AbsTime&, const AbsTime&) noexcept = default;
 

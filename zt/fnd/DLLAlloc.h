@@ -10,8 +10,8 @@ namespace zt::fnd {
 void* DLLMalloc(unsigned long size);
 void* DLLMallocNoThrow(unsigned long size) noexcept;
 
-// realloc, except that size 0 with a block frees it and returns null. On failure the old block
-// stands; DLLRealloc then raises std::bad_alloc. A null result for size 0 is no failure.
+// realloc, except that size 0 with a block frees it and returns null. On failure the old block is
+// kept; DLLRealloc then raises std::bad_alloc. A null result for size 0 is no failure.
 void* DLLRealloc(void* block, unsigned long size);
 void* DLLReallocNoThrow(void* block, unsigned long size) noexcept;
 

@@ -33,6 +33,7 @@ namespace detail {
 struct Stamp;
 }
 
+// Root of the family: "unspecified exception", 0xFFFFFFFF.
 class ZT_EXCEPTION_CLASS Exception : public std::exception {
  public:
   Exception() noexcept : line(0), file(nullptr) {}
@@ -77,6 +78,8 @@ class ZT_EXCEPTION_CLASS Exception : public std::exception {
     std::string message;                        \
   }
 
+// Codes are 0x8ABC7000 and a small number, with two exceptions: this class and the next share one,
+// and NotImplemented is E_NOTIMPL. Exception.cpp has them all with their texts.
 ZT_FIXED_TEXT_EXCEPTION(OutOfRange);     // 0x8ABC7007
 ZT_FIXED_TEXT_EXCEPTION(BoundExceeded);  // 0x8ABC7007 too: only the class differs
 ZT_FIXED_TEXT_EXCEPTION(ObjectAlreadyExists);
@@ -136,12 +139,15 @@ struct FileStem {
 };
 
 struct Stamp {
+  // The one writer of the stamp; classes of the family need not know it.
   static void set(Exception* e, uint32_t line, const char* file) noexcept {
     e->line = line;
     e->file = file;
   }
 };
 
+// Throws a copy with the stamp: the expression itself may be a constant, or an lvalue of the
+// caller.
 template <class E>
 [[noreturn]] void Raise(E&& e, uint32_t line, const char* file) {
   std::decay_t<E> stamped(e);

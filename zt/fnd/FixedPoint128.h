@@ -28,8 +28,10 @@ class tFixedPoint128<64, true> {
   constexpr tFixedPoint128(unsigned long value) noexcept : m_high(value), m_low(0) {}
   constexpr tFixedPoint128(long long value) noexcept : tFixedPoint128(Whole(), value) {}
   constexpr tFixedPoint128(unsigned long long value) noexcept : m_high(value), m_low(0) {}
+  // Truncated toward zero to 2^-64 and clamped; not-a-number is 0.
   explicit tFixedPoint128(double value) noexcept;
-  // The sum of both.
+  // The sum of both, each converted by itself, so that a large integer part does not cost the
+  // fraction its low bits. Clamped where the sum leaves the range.
   tFixedPoint128(double integer, double fraction) noexcept;
 
   constexpr void Get(uint32_t& w3, uint32_t& w2, uint32_t& w1, uint32_t& w0) const noexcept {
@@ -44,6 +46,7 @@ class tFixedPoint128<64, true> {
   explicit operator double() const noexcept;
   explicit operator long double() const noexcept;
 
+  // The sign is the top bit; zero is positive.
   constexpr bool IsNegative() const noexcept { return (m_high >> 63) != 0; }
   constexpr bool IsOdd() const noexcept { return (m_high & 1) != 0; }  // of the integer part
   constexpr bool operator!() const noexcept { return m_high == 0 && m_low == 0; }
@@ -75,6 +78,7 @@ class tFixedPoint128<64, true> {
     other.Negate();
     return *this += other;
   }
+  // Truncated toward zero to 2^-64; what passes 128 bits is lost.
   tFixedPoint128& operator*=(const tFixedPoint128& other) noexcept;
   tFixedPoint128& operator/=(const tFixedPoint128& other) noexcept;
   tFixedPoint128& operator&=(const tFixedPoint128& other) noexcept {

@@ -9,8 +9,10 @@
 
 namespace zt::fnd {
 
-// Base of objects with a reference count that any thread may change. The count starts at 0; the
-// object goes with its last reference.
+// Base of objects with a reference count that any thread may change. The count starts at 0: whoever
+// makes the object takes the first reference, by a RefPtr. The object goes with its last reference,
+// in the thread that released it, and by its virtual destructor. Objects come from the module
+// allocator, so that another module may release them.
 class RefCountedThreadSafePolicy : public DLLAlloced {
  public:
   RefCountedThreadSafePolicy() : m_references(0) {}
@@ -69,6 +71,8 @@ class RefCountedCriticalSectionPolicy : public RefCountedThreadUnsafePolicy {
 template <class T>
 class RefPtr {
  public:
+  // Takes a reference of its own; null is allowed. Implicit, so that a function may return a plain
+  // pointer as a RefPtr.
   RefPtr(T* object = nullptr) : m_object(object) {
     if (m_object) m_object->addRef();
   }
@@ -77,17 +81,19 @@ class RefPtr {
   ~RefPtr() {
     if (m_object) m_object->release();
   }
+  // By swap: the old object goes last, when this pointer has its new one already.
   RefPtr& operator=(RefPtr other) noexcept {
     std::swap(m_object, other.m_object);
     return *this;
   }
 
+  // The pointer, which stays this object's; null for none.
   T* get() const noexcept { return m_object; }
   T* operator->() const noexcept { return m_object; }
   T& operator*() const noexcept { return *m_object; }
   explicit operator bool() const noexcept { return m_object != nullptr; }
 
-  // Hands the reference out, or drops the pointer without releasing what it points to.
+  // Returns the pointer and keeps none: the reference is the caller's from here on.
   T* detach() noexcept { return std::exchange(m_object, nullptr); }
 
  private:

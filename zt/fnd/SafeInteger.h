@@ -18,6 +18,7 @@ class SafeInteger {
  public:
   static constexpr T k_HIGH_BIT = static_cast<T>(T(1) << (std::numeric_limits<T>::digits - 1));
 
+  // Converts from and to T implicitly, so that sizes can be passed as they are.
   constexpr SafeInteger(T value = 0) noexcept : m_value(value) {}
 
   constexpr T get() const noexcept { return m_value; }

@@ -17,6 +17,8 @@ namespace zt::fnd {
 inline constexpr char kProcessLocale[] = "";
 inline constexpr char kAscii[] = "US-ASCII";
 
+// Text of a locale, or of US-ASCII, to 32-bit characters: at most one a byte. What is malformed
+// becomes "?".
 template <const char* Locale>
 struct FromLocaleText {
   static uint32_t requiredLength(const char* first, const char* last) {
@@ -28,6 +30,7 @@ struct FromLocaleText {
   }
 };
 
+// The reverse: at most four bytes a character. What the encoding lacks becomes "?".
 template <const char* Locale>
 struct ToLocaleText {
   static uint32_t requiredLength(const wchar_t* first, const wchar_t* last) {
@@ -51,6 +54,7 @@ struct StringCodec<AnsiString, String> : ToLocaleText<kProcessLocale> {};
 template <>
 struct StringCodec<AsciiString, String> : ToLocaleText<kAscii> {};
 
+// Exact counts, and strict: malformed UTF-8 throws InvalidSequence, in the counting already.
 template <>
 struct StringCodec<String, Utf8String> {
   static uint32_t requiredLength(const unsigned char* first, const unsigned char* last) {

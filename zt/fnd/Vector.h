@@ -26,6 +26,7 @@ class Vector {
   using iterator = T*;
   using const_iterator = const T*;
 
+  // Empty, without a block. A move leaves the source as that.
   Vector() noexcept = default;
   Vector(const Vector& other);
   Vector(Vector&& other) noexcept { swap(other); }
@@ -35,6 +36,8 @@ class Vector {
   }
   ~Vector() { clear(); }
 
+  // Access; begin() and end() are null without a block. Pointers stay good until the next
+  // push_back, swap or clear.
   T* begin() noexcept { return m_begin; }
   const T* begin() const noexcept { return m_begin; }
   T* end() noexcept { return m_end; }
@@ -48,6 +51,7 @@ class Vector {
   // Appends a copy. `value` may be an element of this array.
   void push_back(const T& value);
 
+  // Exchanges the blocks; pointers to elements stay good and follow them.
   void swap(Vector& other) noexcept {
     std::swap(m_begin, other.m_begin);
     std::swap(m_end, other.m_end);
@@ -58,6 +62,7 @@ class Vector {
   void clear() noexcept;
 
  private:
+  // Throws OutOfRange.
   uint32_t calculateNewCapacity() const;
 
   T* m_begin = nullptr;
@@ -92,6 +97,7 @@ class Builder {
   Builder(const Builder&) = delete;
   Builder& operator=(const Builder&) = delete;
 
+  // The element counts as built only when its copy is complete.
   void add(const T& value) {
     ::new (static_cast<void*>(m_end)) T(value);
     ++m_end;
@@ -115,6 +121,8 @@ class Builder {
 template <class T>
 Vector<T>::Vector(const Vector& other) {
   if (other.empty()) return;
+  // Complete before it becomes this vector's: an element whose copy throws takes the whole block
+  // with it.
   vector_detail::Builder<T> block(other.size());
   for (const T& value : other) block.add(value);
   block.exchange(m_begin, m_end);
@@ -136,6 +144,7 @@ void Vector<T>::push_back(const T& value) {
   uint32_t newCapacity = calculateNewCapacity();
   vector_detail::Builder<T> block(newCapacity);
   for (const T& old : *this) block.add(old);
+  // Before the old block goes, as `value` may lie in it.
   block.add(value);
   block.exchange(m_begin, m_end);
   m_capacityEnd = m_begin + newCapacity;

@@ -298,8 +298,8 @@ int RenameToNew(int directory, const char* from, const char* to) {
   if (result == 0 || (errno != ENOSYS && errno != EINVAL && errno != EPERM)) {
     return static_cast<int>(result);
   }
-  // Some file systems do not know the flag. Look first; a race here would need two files set aside
-  // at one moment under the file's lock.
+  // Some file systems do not know the flag. The name is examined first; a race here would need two
+  // files set aside at one moment under the file's lock.
   struct stat info;
   if (fstatat(directory, to, &info, AT_SYMLINK_NOFOLLOW) == 0) {
     errno = EEXIST;

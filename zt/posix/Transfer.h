@@ -12,8 +12,12 @@
 namespace zt::posix {
 
 // Moves up to `sizeBytes` bytes by transfer(done, rest), which moves some of the rest as read() and
-// write() do. Ends early where one moves nothing; errno is then that call's, or 0 for one that
-// reported no failure: the end of the file. Returns how many were moved.
+// write() do, with a count or -1 and errno. Short transfers go on where they ended, interrupted
+// ones are made again, and no single one is asked for more than SSIZE_MAX, as POSIX leaves that
+// undefined.
+//
+// Ends early where one moves nothing; errno is then that call's, or 0 for one that reported no
+// failure: the end of the file. Returns how many were moved.
 template <class Transfer>
 size_t MoveAll(size_t sizeBytes, Transfer transfer) {
   size_t done = 0;

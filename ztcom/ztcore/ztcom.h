@@ -77,6 +77,7 @@ class CZTComObject : public T {
     return static_cast<uint32_t>(T::ThreadingModel::Increment(&this->m_refCount));
   }
 
+  // The last reference deletes the object in this thread; one too many aborts.
   uint32_t Release() override {
     if (ZTInterlockedGet(&this->m_refCount) < 1) abort();
     int32_t left = T::ThreadingModel::Decrement(&this->m_refCount);
@@ -121,6 +122,7 @@ template <class T>
 class CztComPtr {
  public:
   CztComPtr() = default;
+  // A reference of its own; null is allowed. Attach takes over the caller's instead.
   explicit CztComPtr(T* p) : m_p(ZtAddRef(p)) {}
   CztComPtr(const CztComPtr& other) : m_p(ZtAddRef(other.m_p)) {}
   ~CztComPtr() {
@@ -145,13 +147,14 @@ class CztComPtr {
     return out;
   }
 
-  // For calls that hand out a reference; drops what was held.
+  // For calls that return a reference; drops what was held.
   T** out() {
     if (m_p) m_p->Release();
     m_p = nullptr;
     return &m_p;
   }
 
+  // The pointer without a reference, good as long as this object holds it.
   T* get() const { return m_p; }
   T* operator->() const { return m_p; }
   explicit operator bool() const { return m_p != nullptr; }

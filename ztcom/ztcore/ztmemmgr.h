@@ -1,6 +1,6 @@
 #pragma once
 
-// Allocators of what interfaces hand across.
+// Allocators of what crosses an interface.
 
 // Length-counted wide text (zt/fnd/osdep/SystemString.h): null for null or when memory is out. The
 // caller frees it with ZtSysFreeString.

@@ -11,6 +11,6 @@ struct IZTDebugOutputStream {
 // Set by the host, before its threads trace; null for none. The host keeps the object alive.
 extern IZTDebugOutputStream* g_pZTDebugOutputStream;
 
-// Hands the message, cut to 1023 bytes, to the sink, one call at a time. A call from inside the
+// Passes the message, cut to 1023 bytes, to the sink, one call at a time. A call from inside the
 // sink is a programming error and aborts the process.
 void ZTTrace(const char* format, ...) __attribute__((format(printf, 1, 2)));

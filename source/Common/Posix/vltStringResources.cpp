@@ -78,7 +78,7 @@ struct vltStringResources::Database {
   std::map<std::string, std::vector<std::string>, NameLess> sectionsOf;
 
   // Answers given, by all of a question but the file: the components of one file all ask the same,
-  // and each answer looks at all of them.
+  // and each answer needs all of them.
   struct Answer {
     HRESULT result;
     std::string text;

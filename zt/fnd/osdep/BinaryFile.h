@@ -21,7 +21,9 @@ class BinaryFile {
   friend constexpr Mode operator|(Mode a, Mode b) {
     return static_cast<Mode>(static_cast<uint32_t>(a) | static_cast<uint32_t>(b));
   }
+  // Where seek() counts from, as lseek does.
   enum class Origin : int { Begin = 0, Current = 1, End = 2 };
+  // Byte order of the length in front of a byte vector.
   enum class Endianness : int { Little = 0, Big = 1 };
 
   BinaryFile() noexcept : m_fd(-1) {}

@@ -1,6 +1,6 @@
 // A condition, a mutex and a flag. The waits loop on the flag, as POSIX lets a condition wake
 // without a signal, and since of several waiters of an automatic event one takes the flag before
-// the others look. What a set wakes is therefore a question of efficiency only: a broadcast lets
+// the others test it. What a set wakes is therefore a question of efficiency only: a broadcast lets
 // all pass a manual event, a signal is enough for an automatic one.
 #include "zt/fnd/osdep/Event.h"
 

@@ -18,8 +18,8 @@ class EventData;
 //
 // The event lives as long as some process has it open; the last one to close removes it, with its
 // file in "namedEvent/" of the shared directory (docs/event-files.md). A process that dies leaves
-// its events behind for the next opener of the name. Objects of one name in one process share one
-// event; names that differ in case only are one in a process, while the file system decides between
+// its events for the next opener of the name. Objects of one name in one process share one event;
+// names that differ in case only are one in a process, while the file system decides between
 // processes. A forked child may go on using the parent's objects until the parent closes them, and
 // beyond a parent that was killed; its destroying them takes nothing from the parent.
 //

@@ -19,6 +19,8 @@ class ZT_EXCEPTION_CLASS OSException : public exception::Exception {
 
   const char* what() const noexcept override;
   uint32_t getErrorCode() const noexcept override;  // 42
+  // The number that the system reported, or that the thrower gave: an errno, an OSStatus, -1 for
+  // the loader.
   virtual uint32_t whatcode() const noexcept;
 
  protected:
@@ -31,6 +33,7 @@ class ZT_EXCEPTION_CLASS PosixError : public OSException {
  public:
   PosixError();  // the calling thread's errno, so build it right after the failed call
   explicit PosixError(int errnum);  // the system's text for it
+  // A text of the thrower's, which names the path or the loader's reason; null counts as empty.
   PosixError(const char* message, int errnum);
   PosixError(const PosixError&) = default;
   PosixError& operator=(const PosixError&) = default;

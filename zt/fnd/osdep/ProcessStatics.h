@@ -49,12 +49,16 @@ class ProcessStatics {
   static PosixMutex& Lock() RETURN_CAPABILITY(s_lock) { return s_lock; }
 
  private:
+  // In the first call of a forked child: the statics that it has inherited become the head of the
+  // list of those that are never used again.
   static void DropInherited() REQUIRES(s_lock) {
     if (!s_statics || s_statics->process.isCurrent()) return;
     s_statics->inherited = std::exchange(s_inherited, s_statics);
     s_statics = nullptr;
   }
 
+  // Outside the lock, as the destructor closes files and may take a while; objects that are alive
+  // then hold references of their own, so that the statics outlive them.
   static void AtExit() {
     Statics* last;
     {

@@ -2,6 +2,13 @@
 
 // Lock annotations that clang checks (-Wthread-safety); nothing elsewhere.
 //
+//   CAPABILITY           the class is a lock
+//   SCOPED_CAPABILITY    its constructor takes a lock, its destructor releases it
+//   GUARDED_BY           the member is used under that lock only; PT_: what it points to
+//   REQUIRES, EXCLUDES   the caller holds the lock, or must not hold it
+//   ACQUIRE, RELEASE     the function ends with the lock held, or without it
+//   RETURN_CAPABILITY    the function returns that very lock
+//
 // The raw enter() and leave() of the primitives carry none, because ownership there crosses
 // functions and is recursive. Checked code takes its locks through Hold (Hold.h).
 #if defined(__clang__)

@@ -2,7 +2,7 @@
 
 #include "zt/fnd/String.h"
 
-// Owner of one system string, the length-counted wide text that interfaces hand across.
+// Owner of one system string, the length-counted wide text that crosses interfaces.
 //
 // A null text is a state of its own: it converts to an empty String and is neither less nor greater
 // than anything.

@@ -59,9 +59,12 @@ class CztStreamBaseImp : public IztStream3, public CZTComObjectRootEx<CZTComMult
   HRESULT cutArea();
   bool nestsDeeperThan(unsigned levels) const;
 
+  // While the stream is open; written and dropped by WriteSubStreamInfo.
   CztSubStreamMap m_subStreams;
+  // Once in the object's life each, until ClearStreams.
   bool m_subStreamsLoaded = false;
   bool m_subStreamsWritten = false;
+  // False: the area stays in the byte stream, and none is ever written.
   bool m_subStreamsWritable = true;
   int64_t m_subStreamInfoOffset = -1;  // of the area's header; -1 for none
 };

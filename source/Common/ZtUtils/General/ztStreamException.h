@@ -9,6 +9,7 @@ class CztStreamException {
   explicit CztStreamException(const zt::fnd::String& message = zt::fnd::String())
       : m_message(message) {}
 
+  // Lives as long as the object; empty for what this library throws.
   const zt::fnd::String& what() const { return m_message; }
 
  private:

@@ -24,7 +24,9 @@ class CztStreamBase {
   // The version that streams of this module get from now on. Not for use beside other threads.
   static void SetModuleStreamVersion(int major, int minor, int sequence);
 
+  // The byte stream, without a reference: for bytes beside the typed values.
   IztStream* GetStream() const { return m_stream; }
+  // Version and byte order of the header; the library itself gives them no meaning.
   int32_t GetMajorVersion() const { return m_majorVersion; }
   int32_t GetMinorVersion() const { return m_minorVersion; }
   int32_t GetSequenceNumber() const { return m_sequenceNumber; }
@@ -55,6 +57,7 @@ class CztOutStream : public CztStreamBase {
 
   // Length in 4 bytes, then the bytes as they are.
   CztOutStream& operator<<(const zt::fnd::AnsiString& text);
+  // Field by field: Data1 in 4 bytes, Data2 and Data3 in 2, the bytes of Data4.
   CztOutStream& operator<<(const GUID& guid);
   CztOutStream& operator<<(int32_t value) { return write(value); }
   CztOutStream& operator<<(uint32_t value) { return write(value); }

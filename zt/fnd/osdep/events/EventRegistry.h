@@ -16,6 +16,7 @@ class EventRegistry : public RefCountedThreadSafePolicy {
  public:
   // The set of this number, usable or not. For callers inside the section.
   virtual RefPtr<SemaphoreSet> getOrCreateSemaphoreSet(unsigned number) = 0;
+  // Whether a set of this process has the kernel's set of this id already.
   virtual bool hasSemaphoreSetOfId(int id) const = 0;
 
   // Take the object out of its map, if it is there.
