@@ -49,6 +49,7 @@ HRESULT CvltRegistrar::UnregisterComponent(GUID identifier) {
   HRESULT result = Scan();
   if (result < 0) return result;
   ComponentMap::Hold map(m_components);
+  // Nothing there is no failure: the result is the scan's.
   return removeEntry(*map, identifier) == S_OK ? S_OK : result;
 }
 
@@ -70,6 +71,7 @@ HRESULT CvltRegistrar::EnumComponents(_vltComponentType type, IvltEnumComponent*
 Vector<GUID> CvltRegistrar::SnapshotIdentifiers() {
   Vector<GUID> identifiers;
   ComponentMap::Hold map(m_components);
+  // Of all types: a component may be replaced by one of another type before the walk comes to it.
   for (const auto& [identifier, component] : *map) identifiers.push_back(identifier);
   return identifiers;
 }

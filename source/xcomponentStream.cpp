@@ -20,6 +20,8 @@ constexpr int32_t kTypesWithVariant = 8;
 void WriteText(CztOutStream& out, const wchar_t* text) {
   zt::fnd::AnsiString narrow(text);
   out << narrow.length();
+  // Past the typed stream, which would throw: the result of these bytes is not part of the format's
+  // contract.
   if (!narrow.empty()) out.GetStream()->Write(narrow.c_str(), narrow.length(), nullptr);
 }
 
@@ -61,6 +63,7 @@ std::string ReadBytes(CztInStream& in, uint64_t length) {
     result = in.GetStream()->Read(piece.data(), static_cast<unsigned int>(piece.size()), nullptr);
     length -= piece.size();
     if (!ended) text.append(piece.c_str());
+    // What follows a zero is read, so that the stream is at the next field, and dropped.
     ended = ended || strlen(piece.c_str()) < piece.size();
   }
   return text;

@@ -46,6 +46,7 @@ void IniDispose(IniStructForwardReferenceTag* doc) {
 
 int32_t IniSetDuplicateChecking(IniStructForwardReferenceTag* doc, int32_t value) {
   if (!doc) return 0;
+  // Reading the document back under another rule may give another one.
   doc->settled = false;
   return std::exchange(doc->duplicateChecking, value);
 }
@@ -92,6 +93,7 @@ IniEntry* IniNewEntry(const char* name, const char* value, int32_t readOptions) 
     IniDisposeEntry(entry);
     return nullptr;
   }
+  // After the copy, which has cut the white space.
   entry->knownNameLength = IniKnownLength(strlen(entry->name));
   IniNewEntryHandleQuotes(entry, readOptions);
   return entry;
@@ -195,6 +197,7 @@ void IniEmptyDocument(IniStructForwardReferenceTag* doc) {
     IniDisposeSection(static_cast<IniSection*>(sections[n - 1]));
   }
   doc->sections.keepFirst(0);
+  // Last: the records that lie there were disposed of above.
   doc->arena.clear();
   doc->text.reset();
   doc->rendering.reset();

@@ -22,6 +22,8 @@ char EscapeLetter(char c) {
     case '\\':
       return c;
     default:
+      // Control characters would end the line, or be white space at its ends. What else the file's
+      // encoding has goes as it is.
       return iscntrl(static_cast<unsigned char>(c)) ? 'x' : 0;
   }
 }

@@ -57,6 +57,7 @@ bool Grow(ztini_List list, uint32_t needed) {
   if (capacity < kFirstCapacity) capacity = kFirstCapacity;
   if (capacity > kMostItems) capacity = kMostItems;
   if (capacity < needed) capacity = needed;
+  // On 32 bits, where a count that fits may still be too many bytes.
   if (capacity > SIZE_MAX / list->itemSize) return false;
   const size_t bytes = static_cast<size_t>(capacity) * list->itemSize;
   void* block = ztini::Reallocate(list->capacity ? list->block : nullptr, bytes);
@@ -160,6 +161,7 @@ int32_t ztini_ListFindItem(const ztini_ListRecord* list, const void* item, int32
   const int32_t begin = ExistingPosition(list, start);
   if (!begin || !item) return 0;
   if (!compare) {
+    // Before each search, as lists of other sizes may have been searched since.
     gListMemBlockCompareSize = list->itemSize;
     compare = MemBlockCompare;
   }

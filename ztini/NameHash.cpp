@@ -96,6 +96,8 @@ uint64_t FoldedWord(const NameFold& fold, const char* text, size_t length) {
 }  // namespace
 
 uint64_t HashName(const NameFold& fold, const char* name) {
+  // One key for the process: an index may outlive the call that made it, and is asked by any later
+  // one.
   static const Key key = DrawKey();
   const Range range = Trimmed(fold, name);
   const size_t length = static_cast<size_t>(range.end - range.begin);

@@ -21,6 +21,7 @@ constexpr size_t kScratchSlack = 1024;
 // Its pointers are given to callers, so that the block never moves but in a call that decodes.
 bool SizeScratch(Doc* doc, size_t needed) {
   const size_t size = ztini_PI_GetHandleSize(doc->scratch);
+  // One huge value must not hold its memory for the document's life.
   if (needed <= size && size - needed <= kScratchSlack) return true;
   return ztini_PI_SetHandleSize(doc->scratch, needed > kLeastScratch ? needed : kLeastScratch) != 0;
 }
@@ -60,6 +61,7 @@ bool ParseDouble(const char* text, double* number) {
   errno = 0;
   char* end;
   *number = strtod(text, &end);
+  // The whole value, or it is no number; white space around it is gone already.
   const bool good = errno == 0 && end != text && *end == 0;
   errno = before;
   return good;

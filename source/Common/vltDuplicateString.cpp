@@ -14,6 +14,7 @@ namespace {
 constexpr size_t kAppendStep = 360;
 
 wchar_t* AllocateText(size_t characters) {
+  // On 32 bits the bytes of a count that fits may not.
   if (characters > SIZE_MAX / sizeof(wchar_t)) return nullptr;
   return static_cast<wchar_t*>(vltTaskMemAlloc(characters * sizeof(wchar_t)));
 }

@@ -50,6 +50,7 @@ wchar_t* vltGuidToStructString2(GUID g) {
 
 int vltCLSIDFromString(const wchar_t* s, GUID* out) {
   try {
+    // The one strict reader of GUIDs; this source only decides what bad text means.
     *out = zt::fnd::Guid(zt::fnd::String(s)).get();
     return 0;
   } catch (const zt::fnd::exception::BadGuidString&) {

@@ -170,6 +170,7 @@ int vltIsLumBlob2(unsigned short tag) { return tag == kLumBlob || tag == kLumUni
 unsigned short vltAttributeTypeToInternalLumDataType2(_vltAttributeType t) { return Row(t).tag; }
 
 unsigned short vltAttributeTypeToExternalLumDataType2(_vltAttributeType t) {
+  // The one type that has another tag outside.
   return t == vltReferenceArrayType ? kLumExternalReferences : Row(t).tag;
 }
 
@@ -177,6 +178,7 @@ unsigned vltInternalBlobArrayTypeToBits2(_vltAttributeType t) { return Row(t).in
 unsigned vltExternalBlobArrayTypeToBits2(_vltAttributeType t) { return Row(t).externalArrayBits; }
 
 unsigned vltMakeInternalAttributeID2(unsigned id, _vltAttributeType t) {
+  // Three bits; an id that has some of them set already keeps them.
   return id | (vltInternalBlobArrayTypeToBits2(t) & 7) << kArrayBitsShift;
 }
 

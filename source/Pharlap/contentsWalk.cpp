@@ -13,6 +13,7 @@ constexpr size_t kMarkFromEnd = 8;
 constexpr size_t kMarkLength = 4;  // "Line"
 
 bool IsPiece(const std::string& name) {
+  // By the mark and its place; what follows it is not checked.
   return name.size() >= kShortestPieceName &&
          name.compare(name.size() - kMarkFromEnd, kMarkLength, "Line") == 0;
 }

@@ -1,3 +1,7 @@
+// Binding classes are the one thing that this class adds. They come from a text of the bundle's
+// components ("BINDING_CLASSES"), parsed once a file and kept in m_bindingClassesByFile. Reading a
+// component enters its classes into the map of its type; registering one writes them back, next to
+// the expert's other items.
 #include "source/Posix/vltLinuxRegistrar.h"
 
 #include "source/Common/vltcmn.h"
@@ -43,6 +47,7 @@ HRESULT CvltLinuxRegistrar::writeBindingClasses(const std::string& section,
       text += ":" + Narrow(vlrGuidToString(classes[k]));
     }
     HRESULT set = database().SetItem(section.c_str(), kBindingClasses, text.c_str(), true);
+    // The first failure counts; the items after it are tried all the same.
     if (result >= 0) result = set;
   }
   return result;

@@ -82,6 +82,7 @@ HRESULT CheckFileExistence(const wchar_t* file, const wchar_t* word, vltErrors& 
 }
 
 HRESULT CheckEntryPoint(const wchar_t* file, const wchar_t* entryPoint, vltErrors& errors) {
+  // Unloaded at the end of the scope, whatever was found.
   zt::fnd::osdep::SharedLibrary library(String(file), true, true);
   if (!library.isLoaded()) {
     return Tell(errors, "failed to load library \"" + Narrow(file) +
@@ -132,6 +133,7 @@ namespace {
 HRESULT CheckAll(IvltRegistrar* registrar, vltErrors& errors) {
   HRESULT status = S_OK;
   for (const Kind& kind : kKinds) {
+    // Every type is checked, also after a failure: the list is to be complete.
     HRESULT result = CheckComponents(registrar, kind.type, errors);
     if (status >= 0) status = result;
   }
@@ -210,6 +212,7 @@ HRESULT CEnumErrorString::Next(unsigned int count, wchar_t** strings, unsigned i
 }
 
 HRESULT CEnumErrorString::Skip(unsigned int count) {
+  // May pass the end; Next() compares before it reads.
   m_cursor += count;
   return S_OK;
 }

@@ -54,6 +54,7 @@ HRESULT VltjarOpen(const wchar_t* file, std::unique_ptr<CvlIniMgr>* out) {
 HRESULT VltjarSaveChanges(const wchar_t* file, CvlIniMgr* ini) { return Guarded(file).save(*ini); }
 
 HRESULT VltjarDeleteIniFile(const wchar_t* file) {
+  // Only the making of the paths can throw here; setAside has results for all else.
   return vlt::ResultOf(E_UNEXPECTED, [&] { return Guarded(file).setAside(); });
 }
 

@@ -19,6 +19,7 @@ String InstallRoot() {
 
 String FileIn(const String& directory, const wchar_t* name) {
   String file(directory);
+  // Callers have directories with and without the slash.
   path::MakePathEndInSlash(file);
   return file + name;
 }

@@ -24,6 +24,7 @@ void* DLLReallocNoThrow(void* block, unsigned long size) noexcept {
 
 void* DLLRealloc(void* block, unsigned long size) {
   void* moved = DLLReallocNoThrow(block, size);
+  // Null is the right answer for a size of 0.
   if (!moved && size > 0) throw std::bad_alloc();
   return moved;
 }

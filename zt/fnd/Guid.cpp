@@ -6,6 +6,7 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/MakeGUID.h"
 
+// The order of the registrar's map, and so of every walk over components.
 bool operator<(const _GUID& a, const _GUID& b) noexcept {
   if (a.Data1 != b.Data1) return a.Data1 < b.Data1;
   if (a.Data2 != b.Data2) return a.Data2 < b.Data2;
@@ -52,6 +53,7 @@ void Guid::toString(String& out) const {
 void Guid::fromString(const String& text) {
   // Before the parse, which would accept text after the closing brace.
   if (text.length() != kTextLength) ZT_RAISE(exception::BadGuidString());
+  // Parsed aside: a text that turns out bad at its end leaves the value as it was.
   unsigned char bytes[kSize] = {};
   unsigned char* out = bytes;
   const wchar_t* cursor = text.begin();
@@ -79,6 +81,7 @@ void Guid::deserialize(const unsigned char*& cursor, const unsigned char* limit)
 
 unsigned char ParseHexNibble(const wchar_t*& cursor, const wchar_t* end, bool& ok) {
   if (!ok) return 0;
+  // The end counts as a character that is no digit.
   const wchar_t c = cursor == end ? L'\0' : *cursor;
   int value;
   if (c >= L'0' && c <= L'9') {

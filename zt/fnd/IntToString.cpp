@@ -15,6 +15,7 @@ constexpr wchar_t kDigits[] = L"0123456789ABCDEFGHIJKLMNOPQRSTUVWXYZ";
 template <class Unsigned>
 String Print(Unsigned value, unsigned int base, bool minus = false) {
   static_assert(std::is_unsigned_v<Unsigned>);
+  // Here, where every form comes by: base 1 would never end, and beyond 36 there are no digits.
   if (base < 2 || base > 36) ZT_RAISE(exception::UnableToConvert());
   wchar_t buffer[std::numeric_limits<Unsigned>::digits + 1];  // base 2 has no minus
   wchar_t* const end = buffer + std::numeric_limits<Unsigned>::digits + 1;

@@ -44,6 +44,7 @@ void ZTTrace(const char* format, ...) {
   if (trace.lock.takeInterrupted()) trace.inProgress = false;
   if (trace.inProgress) abort();  // a nested call of this thread
   InTrace inTrace(trace);
+  // After the test for nested calls, so that one aborts with a sink or without.
   if (!g_pZTDebugOutputStream) return;
   char text[1024];
   va_list args;

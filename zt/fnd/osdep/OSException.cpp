@@ -18,6 +18,7 @@ constexpr uint32_t kFileNotFoundStatus = 0xFFFFFFD5u;  // -43
   return status == 0 ? buffer : "Unknown error";
 }
 
+// strerror_r and not strerror, whose buffer threads share.
 std::string PosixText(int errnum) {
   char buffer[256] = "";
   return ErrorText(strerror_r(errnum, buffer, sizeof buffer), buffer);
@@ -40,6 +41,7 @@ const char* OSException::what() const noexcept { return message.c_str(); }
 uint32_t OSException::getErrorCode() const noexcept { return kOther; }
 uint32_t OSException::whatcode() const noexcept { return code; }
 
+// errno is read first of all: building the text may change it.
 PosixError::PosixError() : PosixError(errno) {}
 PosixError::PosixError(int errnum) : PosixError(PosixText(errnum).c_str(), errnum) {}
 PosixError::PosixError(const char* text, int errnum)

@@ -32,6 +32,7 @@ CztMemoryStream::~CztMemoryStream() { dropBlock(); }
 HRESULT CztMemoryStream::Read(void* buffer, unsigned int count, unsigned int* done) {
   if (done) *done = 0;
   if (!m_begin || m_cursor < 0 || (!buffer && count > 0)) return E_INVALIDARG;
+  // Never negative: a Seek stops at the end of the data, and SetSize moves the cursor with it.
   auto there = static_cast<unsigned int>(std::min<int64_t>(count, m_size - m_cursor));
   if (there > 0) memcpy(buffer, m_begin + m_cursor, there);
   m_cursor += there;

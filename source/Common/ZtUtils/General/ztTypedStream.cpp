@@ -17,6 +17,7 @@ CztComPtr<IztStream2> SubStreamsOf(IztStream* stream) {
 
 void ztReadStreamBytes(IztStream* stream, void* bytes, unsigned int count) {
   HRESULT result = stream->Read(bytes, count, nullptr);
+  // It is negative as well: the more exact class goes first.
   if (result == ZT_E_END_OF_STREAM) throw CztEndOfStreamException();
   if (result < 0) throw CztStreamException();
 }
@@ -88,6 +89,8 @@ CztInStream::CztInStream(CztInStream& outer) : CztInStream(outer.m_stream) {}
 void CztInStream::readHeader() {
   unsigned char order = 0;
   ztReadStreamBytes(m_stream, &order, sizeof order);
+  // From here on numbers are reversed where the writer's order is another one, those of the header
+  // included.
   m_byteOrder = order;
   *this >> m_majorVersion >> m_minorVersion >> m_sequenceNumber;
 }
@@ -110,6 +113,7 @@ CztInStream& CztInStream::operator>>(zt::fnd::AnsiString& text) {
   if (left > kLongestStreamText) throw CztStreamException();
   zt::fnd::AnsiString read;
   while (left > 0) {
+    // The length is the writer's word; memory is taken as the bytes really come.
     auto piece = static_cast<unsigned int>(std::min(left, kStreamTextPiece));
     unsigned int start = read.length();
     read.append(piece, '\0');

@@ -78,6 +78,8 @@ SlotRecord SlotRecord::Decode(const Bytes& bytes) {
 StateFileBytes EncodeEmptySet() {
   StateFileBytes bytes;
   SetHeader header;
+  // All slots in one chain, each naming the next: taking one, and giving it back, changes its
+  // record and the head only.
   header.count = header.freeCount = kSlotsPerSet;
   auto end = std::ranges::copy(header.encode(), bytes.begin()).out;
   for (uint32_t slot = 0; slot < kSlotsPerSet; ++slot) {
