@@ -28,6 +28,7 @@ constexpr mode_t kNewFileMode = 0666;
 // The digest, then whatever is too long goes.
 bool Overwrite(int fd, off_t oldSize, const Digest& digest, bool durable) {
   if (!zt::posix::WriteAllAt(fd, digest.data(), kSizeBytes, 0)) return false;
+  // After the write: cut first, it would be short for a moment.
   if (oldSize > kSizeBytes && RetryEintr([&] { return ftruncate(fd, kSizeBytes); }) != 0) {
     return false;
   }
@@ -82,6 +83,7 @@ HRESULT Write(const std::string& sidecar, const Digest& digest, bool durable) {
   // it.
   if (info.st_nlink > 1) return Create(sidecar, digest, durable) ? S_OK : E_FAIL;
   if (!Overwrite(fd.get(), info.st_size, digest, durable)) return E_FAIL;
+  // A failure is no reason to fail the save: the file may be another user's, who has set its mode.
   zt::posix::SetSharedMode(fd.get(), info, kSharedMode);
   return S_OK;
 }

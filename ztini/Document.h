@@ -61,8 +61,8 @@ struct IniSection : ztini::NameNode {
   int32_t flags = 0;
   int32_t line = -1;  // of the header; -1: not from a file
 
-  // Where the header and the items are in the document's last rendering; size 0 where they have changed
-  // since, or were in none.
+  // Where the header and the items are in the document's last rendering; size 0 where they have
+  // changed since, or were in none.
   uint32_t renderedAt = 0;
   uint32_t renderedSize = 0;
 
@@ -95,8 +95,8 @@ struct IniStructForwardReferenceTag {
   // has this generation.
   bool settled = false;
   uint32_t settledFold = 0;
-  // The text of the last save, from which the next one copies the sections that have not changed; empty
-  // where there was none under these write options.
+  // The text of the last save, from which the next one copies the sections that have not changed;
+  // empty where there was none under these write options.
   ztini::TextBuffer rendering;
 
   ztini::NameMatch match() const {

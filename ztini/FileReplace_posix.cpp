@@ -192,9 +192,12 @@ int32_t FileReplacement::commit(IniDurability durability, IniFileState* state) {
   int32_t status = synced && !zt::posix::Sync(m_file.get()) ? kIniWriteFailed : 0;
   // Some file systems set the time of the last write when they write it back.
   if (synced) known = fstat(m_file.get(), &own) == 0;
+  // Before the close, and by the descriptor: by the path it could be another process's file
+  // already.
   if (state && known) *state = IniFileStateOf(own);
   const int32_t closed = closeFile();
   if (status == 0) status = closed;
+  // After the close, whose failure means that bytes are missing.
   if (status == 0 && safely() && rename() != 0) {
     status = kIniNotReplaceable;
   }

@@ -1,7 +1,7 @@
-#include <fcntl.h>
 // The file is taken into one block and cut up there: names and values of the document are places in
 // that block, so that reading makes no block for each. The block has a byte to spare, since the
 // parser terminates the last line in place.
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 

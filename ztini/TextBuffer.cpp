@@ -25,6 +25,7 @@ TextBuffer& TextBuffer::appendGrowing(std::string_view text) {
   m_good = m_good && text.size() <= SIZE_MAX - m_length;
   if (!m_good) return *this;
   const size_t length = m_length + text.size();
+  // Doubling, as a rendered file is appended in small pieces.
   m_good = fit(length, length < kLeastBlock / 2 ? kLeastBlock : length * 2);
   if (!m_good) return *this;
   memcpy(m_text.get() + m_length, text.data(), text.size());

@@ -115,8 +115,8 @@ IniDurability IniSetDurability(IniStructForwardReferenceTag* doc, IniDurability 
 // may have planted (zt/posix/Files.h) cannot be opened; the call never waits.
 int32_t IniReadFromFile(IniStructForwardReferenceTag* doc, const char* path);
 
-// The same from a descriptor that the caller has opened for reading and keeps; from the file's beginning,
-// and the descriptor's position stays. The path is the document's file from then on.
+// The same from a descriptor that the caller has opened for reading and keeps; from the file's
+// beginning, and the descriptor's position stays. The path is the document's file from then on.
 int32_t IniReadFromDescriptor(IniStructForwardReferenceTag* doc, const char* path, int fd);
 // The same of a stream, from its start, which stays the caller's. kIniReadFailed where the stream
 // reports an error: the document then has the lines that were whole.

@@ -5,9 +5,8 @@
 namespace zt::fnd::osdep {
 
 // Holds a lock for a scope, in the sight of clang's -Wthread-safety. A lock is a CAPABILITY with
-// lock() and unlock(); what lock() throws passes through.
-// One lock, one scope: a hold is neither copied nor moved, so that its scope's end is its own, on an
-// exception's way out too.
+// lock() and unlock(); what lock() throws passes through. One lock, one scope: a hold is neither
+// copied nor moved, so that its scope's end is its own, on an exception's way out too.
 //
 //   Hold hold(m_lock);
 template <class Lock>

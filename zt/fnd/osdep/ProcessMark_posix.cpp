@@ -11,14 +11,14 @@ using Number = std::atomic<uint64_t>;
 static_assert(Number::is_always_lock_free,
               "shared with children of fork(), and asked in its handlers");
 
-// Plain objects, ready before any initialiser and good after every destructor.
-// The handler is registered by the first mark, so that a process that makes none pays nothing at a
-// fork. Forks before it need no count: there was no mark to distinguish.
+// Plain objects, ready before any initialiser and good after every destructor. What a fork needs is
+// set up by the first mark: a process that makes none pays nothing.
 pthread_once_t s_once = PTHREAD_ONCE_INIT;
-// This process's number, 0 until it is asked for the first time; null where the kernel wipes nothing.
+// This process's number, 0 until it is asked for the first time; null where the kernel wipes
+// nothing.
 Number* s_own = nullptr;
-// Counts the processes on the way from the first one with marks to this one. A child goes on from what
-// it inherits, so no process has the number of one that it descends from.
+// Counts the processes on the way from the first one with marks to this one. A child goes on from
+// what it inherits, so no process has the number of one that it descends from.
 std::atomic<uint32_t> s_generation{0};
 
 void CountFork() { s_generation.fetch_add(1, std::memory_order_relaxed); }

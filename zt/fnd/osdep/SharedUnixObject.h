@@ -47,10 +47,10 @@ struct FileIdentity {
 };
 
 // Opens the file for reading and writing, made if missing, and gives it mode 0666; one that belongs
-// to another user stays as it is. *identity, if asked for, is the file's. Returns the descriptor, close-on-exec, which the caller owns.
-// Throws PosixError: refused access (EACCES) after three attempts a millisecond apart, EPERM for
-// any failure to set the mode; ELOOP, EISDIR, ENXIO or EMLINK, with the path in the message, for
-// what is in the way and stays.
+// to another user stays as it is. *identity, if asked for, is the file's. Returns the descriptor,
+// close-on-exec, which the caller owns. Throws PosixError: refused access (EACCES) after three
+// attempts a millisecond apart, EPERM for any failure to set the mode; ELOOP, EISDIR, ENXIO or
+// EMLINK, with the path in the message, for what is in the way and stays.
 int CreateSharedUnixFile(const AnsiString& path, InTheWay way = InTheWay::Refused,
                          FileIdentity* identity = nullptr);
 

@@ -102,6 +102,7 @@ void ShareDirectory(const ScopedFd& found) {
   struct stat info;
   if (!found || ::fstat(found.get(), &info) != 0) ZT_RAISE(PosixError());
   if (!S_ISDIR(info.st_mode)) ZT_RAISE(PosixError(ENOTDIR));
+  // EPERM: it belongs to another user, whose process sets the mode.
   if (zt::posix::SetSharedMode(found.get(), info, kDirMode) != 0 && errno != EPERM) {
     ZT_RAISE(PosixError());
   }
@@ -130,6 +131,7 @@ void CreateSharedUnixDir(const String& path) {
   ScopedFd found = zt::posix::LookUp(narrow.c_str(), false);
   if (!found) {
     MakeDirectories(path);
+    // MakeDirectories leaves the judgement to its caller, as it may end by its rounds.
     if (!path::IsDirectory(path.c_str())) ZT_RAISE(PosixError(ENOTDIR));
     found = zt::posix::LookUp(narrow.c_str(), false);
   }
