@@ -1,3 +1,6 @@
+// MD5 as RFC 1321 gives it, with its 64 steps unrolled by templates: the round, the word and the
+// shift of a step are constants of the compiler, and the four words of the state change places by
+// their order in the call instead of by copying.
 #include "source/Cmd5vlt.h"
 
 #include <string.h>
@@ -27,8 +30,8 @@ constexpr int kShifts[4][4] = {{7, 12, 17, 22}, {5, 9, 14, 20}, {4, 11, 16, 23},
 constexpr unsigned kWordStep[4] = {1, 5, 3, 7};
 constexpr unsigned kWordStart[4] = {0, 1, 5, 0};
 
-// Step i of the 64. Each step waits for the b of the one before, so what does not need b is added first:
-// the auxiliary functions of RFC 1321 are written so that b comes in as late as possible.
+// Step i of the 64. Each step waits for the b of the one before, so what does not need b is added
+// first: the auxiliary functions of RFC 1321 are written so that b comes in as late as possible.
 template <unsigned i>
 inline void Step(uint32_t& a, uint32_t b, uint32_t c, uint32_t d, const uint32_t* words) {
   constexpr unsigned round = i / 16;
@@ -70,6 +73,7 @@ void Cmd5vlt::addString(const unsigned char* data, unsigned int lengthBytes) {
   unsigned used = m_count[0] >> 3 & (kBlock - 1);
   uint32_t bits = lengthBytes << 3;
   m_count[0] += bits;
+  // The length is one number of 64 bits in two words (RFC 1321 section 3.2); this is its carry.
   if (m_count[0] < bits) ++m_count[1];
   m_count[1] += lengthBytes >> 29;
   while (lengthBytes > 0) {
@@ -89,11 +93,13 @@ void Cmd5vlt::addString(const unsigned char* data, unsigned int lengthBytes) {
 void Cmd5vlt::getDigest(unsigned char* digest16) {
   static constexpr unsigned char kPadding[kBlock] = {0x80};
   unsigned char length[8];
+  // Before the padding, which counts as data.
   Encode(length, m_count, sizeof length);
   unsigned used = m_count[0] >> 3 & (kBlock - 1);
   addString(kPadding, used < kLengthOffset ? kLengthOffset - used : kBlock + kLengthOffset - used);
   addString(length, sizeof length);
   Encode(digest16, m_state, sizeof m_state);
+  // As the code in RFC 1321 does: nothing of the message is left in memory.
   memset(static_cast<void*>(this), 0, sizeof *this);
 }
 
@@ -110,6 +116,7 @@ void Cmd5vlt::Transform(unsigned int* state, const unsigned char* block) {
 
 void Cmd5vlt::Encode(unsigned char* out, const unsigned int* in, unsigned int lengthBytes) {
   for (unsigned i = 0; i < lengthBytes; ++i) {
+    // The algorithm is little-endian on every host.
     out[i] = static_cast<unsigned char>(in[i / 4] >> 8 * (i % 4));
   }
 }

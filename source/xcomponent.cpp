@@ -1,3 +1,7 @@
+// The four generations of the record differ in a few fields. One template copies all of them, and
+// asks the compiler which of those a target has, so that a field can be forgotten in no single
+// conversion. Deep copies fill an uninitialised target: every text is null before it is copied, so
+// that a copy that fails half-way leaves pointers that may be freed.
 #include "source/xcomponent.h"
 
 #include <string.h>
@@ -92,6 +96,7 @@ HRESULT CopyFields(Target* target, const Source* source) {
   target->type = source->type;
   target->identifier = source->identifier;
   CopyOpaque(target, source);
+  // After the type, by which TakeBack knows what there is to free.
   HRESULT variantResult = CopyVariant(target, source);
   if (variantResult >= 0) return result;
   TakeBack(target);
@@ -179,6 +184,7 @@ void CvltComponent::Attach2(_vltComponent2* source) {
 
 void CvltComponent::Swap(CvltComponent& other) {
   _vltComponent2 &a = m_record, &b = other.m_record;
+  // Different variants overlay each other: their fields cannot be exchanged.
   if (a.type != b.type) return;
   std::swap(a.name, b.name);
   std::swap(a.fileName, b.fileName);
@@ -197,6 +203,7 @@ void CvltComponent::Swap(CvltComponent& other) {
 }
 
 void CvltComponent::Clear() {
+  // Asked before anything is freed, the name included.
   bool exempt = HandedItsTextsOut(m_record.name);
   if (!exempt) ZtTaskMemFree(m_record.name);
   ZtTaskMemFree(m_record.fileName);

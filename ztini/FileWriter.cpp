@@ -16,6 +16,8 @@ int32_t IniWriteToFileAndTell(IniStructForwardReferenceTag* doc, const char* pat
   // Beforehand: once the file is in place nothing may fail.
   ztini::OwnedText name(ztini_StrDup(path));
   if (!name) return kIniOutOfMemory;
+  // Opened before the text is made: a target that cannot be replaced costs no rendering, and the
+  // text is written in one call.
   ztini::FileReplacement file(path, doc->writeOptions);
   int32_t status = file.open();
   ztini::TextBuffer text;
@@ -30,6 +32,8 @@ int32_t IniWriteToFileAndTell(IniStructForwardReferenceTag* doc, const char* pat
   doc->rendering = std::move(text);
   struct stat now;
   const bool known = stat(path, &now) == 0;
+  // By the path once more: another process, or a link, may have put another file there since the
+  // rename.
   if (known && IniFileStateOf(now) == state) *written = state;
   doc->fileName = std::move(name);
   doc->fileTimestamp = known ? now.st_mtime : 0;

@@ -1,3 +1,11 @@
+// Every look-up by a section's name goes through IniFindSection, which remembers the section that
+// it found: callers ask for item after item of one section, and the second question costs one
+// comparison. The memory has a meaning, too. Of several sections of one name, the one that was
+// enumerated last is found, until another name is asked for.
+//
+// No look-up fails for lack of memory. The index of a long list is built by the first look-up;
+// without memory for it the list is scanned, with the same answer. IniSeek... is for reading and
+// putting, which must not scan once for each line of a file, and reports instead.
 #include "ztini/Document.h"
 #include "ztini/NameCompare.h"
 #include "ztini/StringTools.h"
@@ -8,8 +16,8 @@ namespace {
 
 using Doc = IniStructForwardReferenceTag;
 
-// A name that is looked for. Most names of a section differ in their lengths or last characters, which
-// are compared before the whole.
+// A name that is looked for. Most names of a section differ in their lengths or last characters,
+// which are compared before the whole.
 class WantedName {
  public:
   WantedName(const ztini::NameFold& fold, const char* name)
@@ -23,7 +31,8 @@ class WantedName {
   }
 
  private:
-  // Of a name with white space at its ends, which another locale may have seen as letters, nothing is said.
+  // Of a name with white space at its ends, which another locale may have seen as letters, nothing
+  // is said.
   bool differsAtAGlance(const IniEntry* entry) const {
     const size_t length = entry->knownNameLength;
     if (length == 0 || m_length == 0) return false;
@@ -65,6 +74,7 @@ IniEntry* NthItem(Doc* doc, const char* section, int32_t n) {
 // The fold is fresh.
 bool IsCurrent(Doc* doc, const char* name) {
   if (!doc->currentSection) return false;
+  // Byte by byte, white space included, as names are stored without any.
   if (doc->caseSensitive) return strcmp(doc->currentSection->name, name) == 0;
   return ztini::CompareNames(doc->fold, doc->currentSection->name, name) == 0;
 }
@@ -81,6 +91,8 @@ IniSection* IniFindSection(Doc* doc, const char* section) {
   doc->fold.refresh();
   if (IsCurrent(doc, section)) return doc->currentSection;
   ztini::NameNode* found = doc->sections.find(section, doc->match(), ztini::FoldState::Fresh);
+  // A section that is not there changes nothing: the next question is likely to be about the same
+  // one as before.
   if (found) doc->currentSection = static_cast<IniSection*>(found);
   return static_cast<IniSection*>(found);
 }
@@ -156,6 +168,8 @@ int32_t IniNumberOfItems(Doc* doc, const char* section) {
 
 int32_t IniNthSectionName(Doc* doc, int32_t n, const char** name) {
   IniSection* found = doc ? doc->section(n) : nullptr;
+  // So that the caller's next look-up by this name finds this section, and not an earlier one of
+  // the same name.
   if (found) doc->currentSection = found;
   return Give(IniSectionName(found), name);
 }
@@ -171,6 +185,7 @@ int32_t IniNthItemPointerToString(Doc* doc, const char* section, int32_t n, cons
 
 int32_t IniGet(Doc* doc, const char* section, const char* item, const char** value) {
   const IniEntry* found = FindItem(doc, section, item);
+  // Also of an item that was put, whose line is -1.
   if (found) doc->lastItemLine = found->line;
   return Give(found ? found->value : nullptr, value);
 }
@@ -178,6 +193,7 @@ int32_t IniGet(Doc* doc, const char* section, const char* item, const char** val
 int32_t IniRenameSection(Doc* doc, const char* section, const char* name) {
   IniSection* found = IniFindSection(doc, section);
   if (!found || !name) return 0;
+  // Before the document counts as changed: a failed rename leaves it settled.
   char* copy = ztini_StrDupWithoutSurrWhiteSpace(name);
   if (!copy) return kIniOutOfMemory;
   doc->settled = false;
@@ -190,6 +206,7 @@ int32_t IniRemoveSection(Doc* doc, const char* section) {
   IniSection* found = IniFindSection(doc, section);
   if (!found) return 0;
   doc->sections.remove(found);
+  // Before the record is freed.
   if (doc->currentSection == found) doc->currentSection = nullptr;
   IniDisposeSection(found);
   return 1;

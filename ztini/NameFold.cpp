@@ -23,7 +23,10 @@ NameFold::NameFold() {
 
 void NameFold::refresh() {
   const char* name = GlobalLocaleName();
+  // The C library's name of the global locale changes with its contents, so that equal names mean
+  // equal tables.
   if (name && *m_localeName && strcmp(name, m_localeName) == 0) return;
+  // A locale with another name may fold the same way: indexes then stay good.
   if (!stillRight()) {
     take();
     ++m_generation;

@@ -1,6 +1,6 @@
 // SipHash-1-3 over the folded and trimmed name: one round for each word of eight bytes, three at
-// the end. The four constants are those of the algorithm. The characters are folded one by one as
-// they go in: a folded copy would take memory, which look-up must not need.
+// the end. The four constants are those of the algorithm. The characters are folded as they go in,
+// a word at a time: a folded copy would take memory, which look-up must not need.
 #include "ztini/NameHash.h"
 
 #include <bit>
@@ -73,8 +73,8 @@ struct SipState {
   }
 };
 
-// Eight characters of which those from a to z become A to Z. Each byte is compared on its own: without
-// its top bit, no sum carries into the next.
+// Eight characters of which those from a to z become A to Z. Each byte is compared on its own:
+// without its top bit, no sum carries into the next.
 uint64_t UpperAscii(uint64_t word) {
   constexpr uint64_t kOnes = 0x0101010101010101u, kTops = 0x80 * kOnes;
   const uint64_t low = word & ~kTops;
@@ -104,6 +104,7 @@ uint64_t HashName(const NameFold& fold, const char* name) {
   SipState state(key);
   const char* at = range.begin;
   for (size_t left = length / 8; left > 0; --left, at += 8) state.take(FoldedWord(fold, at, 8));
+  // What is left of the name, at most seven bytes, with the length in the top one.
   state.take(FoldedWord(fold, at, length % 8) | static_cast<uint64_t>(length) << 56);
   return state.finish();
 }

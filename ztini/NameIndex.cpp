@@ -1,3 +1,9 @@
+// Open addressing with linear probing. A slot keeps 32 bits of the hash and the sequence number of
+// the first node with its name, so that most probes are decided without touching a node. Nodes of
+// one name are linked in rings of "twins", which exist only for names that occur more than once:
+// usual files have none.
+//
+// Everything is named by number and not by pointer: half the size, and the list may move its array.
 #include "ztini/NameIndex.h"
 
 #include <algorithm>
@@ -23,6 +29,7 @@ uint32_t NodesInOrder::placeOf(uint32_t sequence) const {
   if (!count || sequence < begin[0]->sequence) return count;
   // Every gap before the node moves it towards the front, nothing moves it the other way.
   const uint32_t last = sequence - begin[0]->sequence;
+  // Without gaps the number is the place.
   if (last < count && begin[last]->sequence == sequence) return last;
   NameNode** end = begin + std::min(last, count);
   NameNode** at = std::lower_bound(begin, end, sequence, [](const NameNode* node, uint32_t wanted) {
@@ -44,6 +51,7 @@ void NameIndex::clear() {
 bool NameIndex::create(const NameFold& fold, size_t names) {
   clear();
   size_t slots = kFewestSlots;
+  // Three quarters full at most when it is made, seven eighths before it grows.
   while (slots - slots / 4 < names) {
     if (slots > SIZE_MAX / 2) return false;
     slots *= 2;
@@ -56,6 +64,7 @@ bool NameIndex::allocateSlots(size_t slots) {
   if (slots > SIZE_MAX / sizeof(Slot)) return false;
   m_slots = static_cast<Slot*>(Allocate(slots * sizeof(Slot)));
   if (!m_slots) return false;
+  // All ones: every head is kNoSequence.
   memset(m_slots, 0xff, slots * sizeof(Slot));
   m_mask = slots - 1;
   return true;
@@ -72,6 +81,7 @@ bool NameIndex::grow() {
     if (old[i].head == kNoSequence) continue;
     size_t at = old[i].hash & m_mask;
     while (m_slots[at].head != kNoSequence) at = (at + 1) & m_mask;
+    // The hash is in the slot, so that no name is read again.
     m_slots[at] = old[i];
   }
   free(old);
@@ -83,6 +93,7 @@ size_t NameIndex::find(const NameFold& fold, NodesInOrder nodes, const char* nam
   size_t at = hash & m_mask;
   for (; m_slots[at].head != kNoSequence; at = (at + 1) & m_mask) {
     const Slot& slot = m_slots[at];
+    // The first node has the name of its whole chain.
     if (slot.hash == hash && SameFoldedName(fold, nodes.bySequence(slot.head)->name, name)) break;
   }
   return at;
@@ -149,6 +160,7 @@ void NameIndex::linkInOrder(Slot* slot, uint32_t first, uint32_t added) {
     slot->head = node.sequence;
     return;
   }
+  // From the end, since nearly every node is appended there; only a renamed one may belong earlier.
   uint32_t before = last;
   while (m_twins[before].sequence > node.sequence) before = m_twins[before].prev;
   node.next = m_twins[before].next;
@@ -193,6 +205,7 @@ void NameIndex::freeSlot(size_t at) {
   for (size_t next = (at + 1) & m_mask; m_slots[next].head != kNoSequence;
        next = (next + 1) & m_mask) {
     const size_t home = m_slots[next].hash & m_mask;
+    // Its home lies after the gap: moved there, it would not be found any more.
     if (((next - home) & m_mask) < ((next - gap) & m_mask)) continue;
     m_slots[gap] = m_slots[next];
     gap = next;

@@ -1,3 +1,11 @@
+// Lines come in from either of two sources and are cut in place: a header opens or finds a section,
+// an item is stored in the present one, anything else is a bad line, of which the first is
+// remembered and none is an error. What is cut out stays where it is when the document owns the
+// text, and is copied into the arena when the line is gone with the next one.
+//
+// A repeated name updates the first one, so that every item asks whether its section has one of its
+// name. Most do not, and ItemKeys answers most of these questions from a word made of the name's
+// ends.
 #include "ztini/Parser.h"
 
 #include <algorithm>
@@ -14,14 +22,16 @@ namespace {
 using ztini::FoldState;
 using ztini::NameFold;
 
-// Whether the text of a line stays where it is for the document's life, or only until the next line.
+// Whether the text of a line stays where it is for the document's life, or only until the next
+// line.
 enum class TextLife { Document, Line };
 
-// Sections of one file resemble each other, but a small one after a large one must not take its memory.
+// Sections of one file resemble each other, but a small one after a large one must not take its
+// memory.
 constexpr int32_t kMostExpected = 16;
 
-// The names of a section's items, as far as a glance at their ends tells them apart. Most sections have
-// too few items for an index, and most names of a section differ in their last characters.
+// The names of a section's items, as far as a glance at their ends tells them apart. Most sections
+// have too few items for an index, and most names of a section differ in their last characters.
 class ItemKeys {
  public:
   using Key = uint64_t;
@@ -111,6 +121,7 @@ char* DocumentBuilder::cutTrailingWhite(char* begin, char* end) const {
 int32_t DocumentBuilder::takeLine(char* begin, char* end, int32_t line) {
   begin = skipWhite(begin, end);
   if (begin == end) return badLine(line);
+  // A comment is no bad line. It is not kept: a save writes sections and items only.
   if (*begin == ';') return 0;
   return *begin == '[' ? takeHeader(begin + 1, end, line) : takeItem(begin, end, line);
 }
@@ -122,6 +133,7 @@ int32_t DocumentBuilder::badLine(int32_t line) {
 
 int32_t DocumentBuilder::takeHeader(char* begin, char* end, int32_t line) {
   char* name = skipWhite(begin, end);
+  // The first one: what follows it on the line is ignored.
   auto* bracket = static_cast<char*>(memchr(name, ']', static_cast<size_t>(end - name)));
   if (!bracket) return badLine(line);
   char* nameEnd = cutTrailingWhite(name, bracket);
@@ -155,6 +167,7 @@ int32_t DocumentBuilder::openNullSection() {
 }
 
 int32_t DocumentBuilder::takeItem(char* begin, char* end, int32_t line) {
+  // The first one: a value may hold more.
   auto* separator = static_cast<char*>(memchr(begin, '=', static_cast<size_t>(end - begin)));
   if (has(kIniReadColons)) {
     char* before = separator ? separator : end;
@@ -174,6 +187,7 @@ int32_t DocumentBuilder::takeItem(char* begin, char* end, int32_t line) {
 int32_t DocumentBuilder::store(char* name, char* nameEnd, char* value, char* valueEnd,
                                int32_t line) {
   if (!m_section) {
+    // Items before the first header are dropped, without counting as bad lines.
     if (!has(kIniReadColons)) return 0;
     const int32_t status = openNullSection();
     if (status < 0) return status;
@@ -222,6 +236,7 @@ int32_t DocumentBuilder::finish() {
   const int32_t status = m_hasPieces ? IniJoinPieces(m_doc) : 0;
   m_doc->settled = status == 0 && !m_hasPieces && !m_hasNullSection && m_doc->duplicateChecking &&
                    !has(kIniReadColons);
+  // Names that were cut under one locale may be equal, or have white space, under another.
   m_doc->settledFold = m_doc->fold.generation();
   return status;
 }
@@ -229,6 +244,7 @@ int32_t DocumentBuilder::finish() {
 void StartRead(IniStructForwardReferenceTag* doc) {
   IniEmptyDocument(doc);
   doc->firstBadLine = -1;
+  // Once for the whole text: the locale in force at the beginning decides for every line.
   doc->fold.refresh();
 }
 

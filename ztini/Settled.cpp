@@ -6,10 +6,10 @@
 #include "ztini/NameCompare.h"
 #include "ztini/StringTools.h"
 
-// A document that was read is settled as it is: its names and values were cut out of lines like those
-// that it is written to. What breaks this is known by its looks, and unsettles the document for good:
-// pieces, which may be joined with what comes to be beside them, and the section without a header.
-// What is put has to pass the tests here.
+// A document that was read is settled as it is: its names and values were cut out of lines like
+// those that it is written to. What breaks this is known by its looks, and unsettles the document
+// for good: pieces, which may be joined with what comes to be beside them, and the section without
+// a header. What is put has to pass the tests here.
 
 namespace {
 
@@ -43,6 +43,8 @@ bool ItemSurvives(Text name) {
 bool ValueSurvives(Text value, int32_t quote) {
   if (value.breaksLine()) return false;
   if (quote) return quote == '"' || quote == '\'';
+  // Without quotes of its own: an empty value makes a bad line, and enclosing quotes would be taken
+  // for the file's.
   return !value.isEmpty() && !value.isEnclosedIn('"') && !value.isEnclosedIn('\'');
 }
 
@@ -56,6 +58,7 @@ bool ztini::IniSurvivesFile(const char* section, const char* item, const char* v
 
 int32_t IniIsSettled(IniStructForwardReferenceTag* doc) {
   if (!doc || !doc->settled) return 0;
+  // A line limit splits values, which the reader joins to what may be another item.
   if (doc->maxLineLength != -1 || (doc->writeOptions & kIniWriteMark)) return 0;
   const int32_t quotes = kIniReadDoubleQuotes | kIniReadSingleQuotes;
   if ((doc->readOptions & quotes) != quotes) return 0;
@@ -78,6 +81,7 @@ void IniTakeAsRead(IniStructForwardReferenceTag* doc) {
     IniSection* section = doc->section(n);
     const bool wasRead = IniSectionWasReadFromFile(section) != 0;
     if (tight && !wasRead && afterRead) skipLine();
+    // The count follows the writer's rule for empty lines, section by section.
     section->line = ++line;
     ztini::NameNode** items = section->items.nodes();
     for (int32_t i = 0; i < section->items.count(); ++i) {

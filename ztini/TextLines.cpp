@@ -1,3 +1,7 @@
+// The common file has line feeds only, which is found out once; its lines are then found by memchr.
+// A short line stays where it is in the text. A line that would not fit the buffer of the
+// line-by-line way is taken byte by byte by nextLong(), which repeats what the requests of that way
+// would skip, and closes the text up in place.
 #include "ztini/TextLines.h"
 
 #include <climits>
@@ -37,9 +41,12 @@ bool TextLines::next() {
   // The second half of a pair.
   if (IsTerminator(*begin) && *begin != m_lastTerminator) ++begin;
   char* end = terminatorFrom(begin);
+  // The buffer never shrinks, so that the capacity is kept from line to line: a long line changes
+  // how later ones are cut.
   if (static_cast<size_t>(end - begin) >= m_capacity - 1) return nextLong();
   if (end == m_textEnd) {
     m_cursor = m_textEnd;
+    // Only the second half of a pair was left.
     if (begin == end) return false;
     m_begin = begin;
     return finishAt(end, end);

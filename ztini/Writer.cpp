@@ -1,3 +1,6 @@
+// One walk over the document serves two ends: a caller's function that takes lines, and a text in
+// memory for a file. The walk is a template over the two, so that both write the same. Values that
+// would make a line too long are split into pieces, which the reader joins (Join.h).
 #include <cstring>
 #include <string_view>
 
@@ -33,8 +36,8 @@ class FunctionLines {
 };
 
 // Puts lines together in one text, as they are in a file. Sections that have not changed since the
-// rendering before are copied from there, neighbours at once: a save of a long document that differs in
-// few places costs little more than its bytes.
+// rendering before are copied from there, neighbours at once: a save of a long document that
+// differs in few places costs little more than its bytes.
 class TextInMemory {
  public:
   TextInMemory(ztini::TextBuffer* text, std::string_view before, bool marked)
@@ -65,7 +68,8 @@ class TextInMemory {
     return true;
   }
 
-  // For the next rendering: the section ends here. The file's first line is made with what is before it.
+  // For the next rendering: the section ends here. The file's first line is made with what is
+  // before it.
   void note(IniSection* section) {
     const bool fits = size() <= UINT32_MAX && !m_sectionIsFirst;
     section->renderedAt = fits ? static_cast<uint32_t>(m_sectionAt) : 0;
@@ -86,8 +90,8 @@ class TextInMemory {
     m_reusedBegin = m_reusedEnd;
   }
 
-  // A name may begin with the bytes of a byte order mark. As the first bytes of the file they would be
-  // lost or get the whole file refused, so an empty line goes before them.
+  // A name may begin with the bytes of a byte order mark. As the first bytes of the file they would
+  // be lost or get the whole file refused, so an empty line goes before them.
   void endFirst() {
     m_isFirst = false;
     const char* line = m_first.text();
@@ -149,6 +153,8 @@ int32_t DocumentWriter<Lines>::writeSection(IniSection* section, const IniSectio
   const bool fromFile = IniSectionWasReadFromFile(section);
   const bool isNull = IniSectionIsNull(section);
   int32_t status = 0;
+  // A section that was added gets an empty line before it, so that it does not run into the file's
+  // own ones.
   if (tight() && !fromFile && IniSectionWasReadFromFile(previous)) status = writeEmptyLine();
   if (status >= 0 && !m_lines.reuse(section)) status = writeHeaderAndItems(section);
   if (status < 0) return status;
@@ -193,6 +199,7 @@ int32_t DocumentWriter<Lines>::writeItem(const IniEntry* entry) {
 
 template <class Lines>
 int32_t DocumentWriter<Lines>::writePieces(const IniEntry* entry, int64_t room) {
+  // A name that leaves no space would be split into pieces without end.
   if (room < 1) return kIniNoRoom;
   std::string_view rest = entry->valueText();
   for (unsigned number = 1; !rest.empty(); ++number) {
@@ -262,5 +269,7 @@ int32_t ztini_IniWriteToFileHelper(IniStructForwardReferenceTag* doc, FILE* file
   const int32_t status = ztini::IniRender(doc, &text);
   if (status < 0) return status;
   const size_t written = fwrite(text.text(), 1, text.size(), file);
+  // Flushed here, where a full disk is still a result: the stream's close comes later and is the
+  // caller's.
   return written == text.size() && fflush(file) == 0 ? 0 : kIniWriteFailed;
 }

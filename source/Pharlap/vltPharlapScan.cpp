@@ -53,6 +53,8 @@ HRESULT CvltPharlapRegistrar::UpdateRegistrationFile() {
   RegistrationFiles files;
   FindRegistrationFiles(files);
   ScanHold scan(*this);
+  // One save for each changed file: a start that is killed has merged what it has merged, and the
+  // next one begins with the rest.
   for (const auto& [wideFile, time] : files) {
     std::string file = Narrow(wideFile);
     if (scan->isUpToDate(file, time)) continue;
@@ -65,7 +67,10 @@ HRESULT CvltPharlapRegistrar::UpdateRegistrationFile() {
     scan->setStamp(file, time);
     SaveChanges();
   }
+  // After the merges: a component that moved from one file to another belongs to the new one by
+  // now.
   HRESULT result = RemoveDeletedComponents();
+  // Otherwise without a save: what has gone from the disk is found gone again at the next start.
   if (scan->droppedPlanted()) SaveChanges();
   return result;
 }
@@ -105,6 +110,7 @@ void CvltPharlapRegistrar::RemoveComponentsIfFileDoesNotExist(char* section, cha
 
 HRESULT CvltPharlapRegistrar::RemoveDeletedComponents() {
   Vector<String> eraseList;
+  // Over a copy: erasing changes the list.
   for (ContentsItem& item : ReadContents(*m_registrationIni)) {
     RemoveComponentsIfFileDoesNotExist(item.component.data(), item.file.data(), eraseList,
                                        item.first, item.last);

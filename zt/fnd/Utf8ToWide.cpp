@@ -1,3 +1,9 @@
+// The rules of the header are a table: the first byte selects how long the sequence is, which of
+// its bits count, and the least second byte, by which forms that are longer than necessary are
+// recognised.
+//
+// Counting decodes like converting, so that malformed text throws before memory is taken for the
+// result.
 #include "zt/fnd/Utf8ToWide.h"
 
 #include <array>
@@ -44,6 +50,7 @@ constexpr auto kRowOfLead = [] {
 const unsigned char* DecodeSequence(const unsigned char* s, const unsigned char* end,
                                     uint32_t& value) {
   const LeadRule rule = kLeadRules[kRowOfLead[*s - 0x80u]];
+  // The length first: only then may the second byte be read.
   if (rule.length == 0 || end - s < rule.length || s[1] < rule.leastSecond) {
     ZT_RAISE(exception::InvalidSequence());
   }
@@ -100,12 +107,14 @@ inline const unsigned char* DecodeOne(const unsigned char* s, const unsigned cha
   return DecodeSequence(s, end, value);
 }
 
-// Most text is ASCII, and most of that in long runs: bytes at a time of which none has its top bit set.
+// Most text is ASCII, and most of that in long runs: bytes at a time of which none has its top bit
+// set.
 constexpr ptrdiff_t kRun = 16;
 
 inline bool StartsWithAsciiRun(const unsigned char* s, const unsigned char* end) {
   if (end - s < kRun) return false;
   uint64_t words[kRun / sizeof(uint64_t)];
+  // The text is not aligned; the compiler makes two loads of it.
   memcpy(words, s, sizeof words);
   return ((words[0] | words[1]) & 0x8080808080808080u) == 0;
 }
@@ -171,6 +180,7 @@ uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* 
     } while (value < 0x80 && s != end && out != destEnd);
   }
   if (static_cast<uint64_t>(out - dest) > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
+  // Only here: a sequence that is malformed leaves the caller's cursor where the call began.
   begin = s;
   return static_cast<uint32_t>(out - dest);
 }

@@ -1,3 +1,12 @@
+// Two locks in a row. Threads of the process meet in a section that all objects of the name share;
+// its owner alone then takes the flock, which keeps other processes out. The section first, since
+// flock knows no threads: two objects of one process are two owners of the file, and would wait for
+// each other's process, which is their own.
+//
+// A file lock may be lost or be worth nothing without a call that says so. The path can come to
+// name another file, which later takers lock; the host can close the descriptor; a fork leaves the
+// child with a copy. So every taking ends with the question whether the path still names what was
+// locked, and begins again if it does not.
 #include <sys/file.h>
 
 #include <cerrno>
@@ -77,6 +86,8 @@ Mutex::Record::~Record() {
     statics.detach();
     return;
   }
+  // The descriptor closes with the object and frees the file lock; the section is shared and has to
+  // be left as often as it was entered.
   for (; entries > 0; --entries) section().leave();
   statics->detach(data);
 }
@@ -86,6 +97,7 @@ void Mutex::Record::renewAfterFork() {
   if (ofThisProcess()) return;
   RefPtr<MutexGlobalStatics> fresh = MutexGlobalStatics::Get();
   Hold hold(fresh->renewal);
+  // Once more under the lock: another thread may have renewed the object meanwhile.
   if (ofThisProcess()) return;
   CloseOnForkFd own = OpenLockFile(file);
   data = fresh->attach(name);
@@ -154,6 +166,7 @@ void Mutex::lock() const {
     entry.keep();
     return;
   }
+  // 0 attempts never match the count: lock() tries without limit.
   if (!record.takeFile(LOCK_EX, 0)) ZT_RAISE(PosixError());
   record.finishLock(entry);
 }
@@ -162,6 +175,7 @@ bool Mutex::tryLock() const {
   Record& record = *m_record;
   try {
     record.renewAfterFork();
+    // Another thread of this process has it, which counts as another process would.
     if (!record.section().tryEnter()) return false;
     ScopedEntry entry(record.section());
     if (record.addHoldIfHeld()) {
@@ -203,6 +217,8 @@ bool Mutex::retake() const {
   try {
     CloseOnForkFd own = OpenLockFile(record.file);
     Hold hold(record.statics->section);
+    // A new descriptor, as the old one may be closed or lead to a file that no other process locks
+    // any more. Its lock goes with it when this fails.
     if (record.holds == 0 || Flock(own.get(), LOCK_EX | LOCK_NB) != 0) return false;
     if (!own.identity().isNamedBy(record.file)) return false;
     record.fd = std::move(own);

@@ -1,3 +1,11 @@
+// What a line needs at any time - mask, targets, threshold - is atomic and read without a lock. The
+// file and its state are guarded by a named mutex, made at the start, which keeps the lines of this
+// process's threads, and of those that it forks, from running into each other. The pointer to that
+// mutex says that the log is started; it is set last and cleared first, and what it points to is
+// never freed, since a thread may have read it just before.
+//
+// Tracing reports nothing and must not fail its caller: what cannot be written is dropped, and a
+// lock that is not available is done without.
 #include "source/Common/ZtUtils/General/vlTracer.h"
 
 #include <fcntl.h>
@@ -92,6 +100,8 @@ class OutputLock {
 
 bool DiskIsShort(const LogFile& log) {
   long threshold = gs_traceLowDiskThreshold;
+  // Asked for each line: a disk that fills up is to keep what others need of it. A file system that
+  // cannot be asked counts as short.
   return threshold != 0 && CalcFreeSpace(log.directory.c_str()) < threshold;
 }
 
@@ -128,6 +138,7 @@ void AppendLine(int fd, const char* line) {
 // Writes the line to the file; on a disk that has become short, the message in the line's place,
 // for all targets, and that is the file's last one.
 const char* WriteToLog(LogFile& log, const char* line) {
+  // The host has closed it, as daemons do; the number is not this log's any more.
   if (log.fd >= 0 && !log.identity.isBehind(log.fd)) log.fd = -1;
   if (log.fd < 0) OpenLog(log);
   if (log.fd < 0) return line;
@@ -190,6 +201,7 @@ void vlTracer::Initialize(SeverityLevel mask, TraceTarget target, const wchar_t*
   gs_traceMask = mask;
   gs_traceTarget = target;
   gs_traceLowDiskThreshold = threshold;
+  // A second start changes the settings only: lines of one process stay in one file.
   if (gs_traceSync) return;
   LogFile& log = Log();  // also for a later start with a file, which may find no memory
   std::string name = NewLogName();
@@ -215,6 +227,7 @@ void vlTracer::Cleanup() {
 }
 
 unsigned vlt_vlTracer::GetTraceMask() {
+  // Asked again under the lock: of two threads that come first one runs the callback.
   if (!gs_traceSync && gs_traceInitCallback) {
     Hold hold(TheStart().lock);
     if (!gs_traceSync) gs_traceInitCallback.load()();
