@@ -122,7 +122,9 @@ class CvltRegistrar : public IvltRegistrar2 {
  private:
   static HRESULT removeEntry(ComponentMap::Map& map, GUID identifier);
 
+  // 0 at first: the creator's QueryInterface takes the first reference.
   zt::fnd::osdep::AtomicInt m_refCount;
+  // Owns the components; the key is the record's identifier.
   ComponentMap m_components;
 };
 

@@ -28,10 +28,12 @@ class TaskMem {
   TaskMem(const TaskMem&) = delete;
   TaskMem& operator=(const TaskMem&) = delete;
 
+  // The block, which stays this object's; null for none.
   T* get() const { return m_p; }
   explicit operator bool() const { return m_p != nullptr; }
   // For functions with an out-parameter; what was owned before is not freed.
   T** out() { return &m_p; }
+  // The block, which is the caller's from here on.
   T* release() {
     T* p = m_p;
     m_p = nullptr;

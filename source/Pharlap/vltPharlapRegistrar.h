@@ -169,9 +169,11 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   void readDictionary(const std::string& section, _vltComponent2* record);
   bool readExpert(const std::string& section, EmptyFileName emptyFileName, _vltComponent2* record);
 
+  // Filled while the components are read, and only read after that.
   BindingClassesMap m_resourceExpertBindings;
   BindingClassesMap m_objectExpertBindings;
   zt::fnd::String m_installDirectory;
+  // The database: how it is opened and saved, and the open document, which holds its lock.
   GuardedIniFile m_file;
   std::unique_ptr<CvlIniMgr> m_registrationIni;
   std::unique_ptr<DatabaseSaves> m_saves;  // null where the opening failed

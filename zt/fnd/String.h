@@ -68,6 +68,7 @@ class StringBase {
   StringBase(const T* s);
   StringBase(const T* s, size_type n);
   StringBase(const T* first, const T* last);
+  // n times the character.
   StringBase(size_type n, T c);
   StringBase(const StringBase& other);  // capacity equals length
   StringBase(StringBase&& other);  // leaves `other` empty; allocates, as no string lacks a block
@@ -90,6 +91,8 @@ class StringBase {
 
   // Access. Pointers stay good until the next change of the string.
   const T* c_str() const noexcept { return m_begin; }
+  // Writing through a pointer or [] changes characters only; a zero written there does not shorten
+  // the text.
   T* begin() noexcept { return m_begin; }
   const T* begin() const noexcept { return m_begin; }
   T* end() noexcept { return m_end; }
@@ -100,7 +103,9 @@ class StringBase {
   size_type size() const noexcept { return length(); }
   size_type capacity() const noexcept { return static_cast<size_type>(m_capacityEnd - m_begin); }
   bool empty() const noexcept { return m_begin == m_end; }
+  // True if a zero comes before the end: comparison then sees a part of the text only.
   bool hasEmbeddedNull() const noexcept;
+  // Kept for callers; nothing is left to check.
   void checkInvariants() const noexcept {}
 
   // Assignment. Keeps the block when the capacity is at least n and at most 2n, else cuts or grows
@@ -150,6 +155,7 @@ class StringBase {
   StringBase& replace(size_type pos, size_type n, const StringBase& s);
   StringBase& replace(size_type pos, size_type n, const StringBase& s, size_type pos2,
                       size_type n2);
+  // Exchanges the blocks: pointers into a text follow it.
   void swap(StringBase& other) noexcept;
   // The position is not checked (beyond the end: empty); pos + n past 32 bits raises OutOfRange.
   StringBase substr(size_type pos = 0, size_type n = npos) const;
@@ -158,6 +164,7 @@ class StringBase {
 
   // Search, exact. The forward searches find nothing from a position at or beyond the end, not even
   // the empty pattern.
+  // Each gives a position from 0, or npos.
   size_type find(T c, size_type pos = 0) const;
   size_type find(const StringBase& s, size_type pos = 0) const;
   size_type rfind(T c, size_type pos = npos) const;
@@ -200,6 +207,7 @@ class StringBase {
     return a.compare(b) > 0;
   }
 
+  // A new string; the second operand is converted where it is of the other kind.
   friend StringBase operator+(const StringBase& a, const StringBase& b) { return StringBase(a, b); }
   friend StringBase operator+(const StringBase& a, const T* b) { return concatenate(a, b); }
   friend StringBase operator+(const StringBase& a, T b) { return concatenate(a, b); }

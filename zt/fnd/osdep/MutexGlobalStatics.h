@@ -13,6 +13,7 @@ namespace zt::fnd::osdep {
 
 // What the Mutex objects of one name in this process share.
 struct MutexData {
+  // Mutex objects of the name; the entry goes with the last one.
   int objects = 0;
   std::unique_ptr<UnixCriticalSection> section = std::make_unique<UnixCriticalSection>();
 };

@@ -39,12 +39,15 @@ class IStringObjectA {
 // A trace object: reports a call of its function. Components outside build them.
 class vlTracer : public Toolyard::IStringObjectA {
  public:
+  // Bits of the mask that this library tests, and of the targets; "vldiag.ini" has the same
+  // numbers.
   enum SeverityLevel : uint32_t { kSeverityErrors = 2, kSeverityLoad = 0x20 };
   enum TraceTarget : uint32_t { kTargetFile = 1, kTargetOutput = 2, kTargetError = 4 };
 
   vlTracer(char marker, const char* functionName)
       : m_marker(marker), m_functionName(functionName) {}
 
+  // The first character of the object's lines.
   char marker() const { return m_marker; }
 
   // Starts the log, or changes mask, targets and limit of a started one. The file's name holds the
@@ -54,7 +57,8 @@ class vlTracer : public Toolyard::IStringObjectA {
                          long threshold);
   // Has the callback start the log when the mask is first asked for.
   static void Initialize(void (*callback)());
-  // Closes the file; nothing is written any more.
+  // Closes the file; nothing is written any more. Waits a second at most for a thread that is
+  // writing, which then keeps the file.
   static void Cleanup();
 
   // The threshold for a number of bytes out of the options. What a long cannot hold, on 32 bits, is
@@ -63,6 +67,7 @@ class vlTracer : public Toolyard::IStringObjectA {
     return std::cmp_greater(bytes, LONG_MAX) ? LONG_MAX : static_cast<long>(bytes);
   }
 
+  // Read without a lock by whoever is about to trace; changed by Initialize only.
   static std::atomic<uint32_t> gs_traceMask;  // 0 until the start
 
  protected:
@@ -82,6 +87,7 @@ class vlTracer0 final : public vlTracer {
 // A call with arguments: "Func: name Args: " and each argument as its printer writes it.
 class vlTracerX final : public vlTracer {
  public:
+  // The value, by address, and the function that knows its type. Both outlive the object.
   struct Argument {
     const void* value;
     void (*print)(std::ostream& out, const Argument& argument);

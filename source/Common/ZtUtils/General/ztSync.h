@@ -20,7 +20,10 @@ class CztSyncObject {
   CztSyncObject(const CztSyncObject&) = delete;
   CztSyncObject& operator=(const CztSyncObject&) = delete;
   virtual ~CztSyncObject() = default;
+  // Whether a wait handles messages meanwhile. There are none on this system: the flag is kept and
+  // passed on.
   virtual void SetPumpMsgs(bool pumpMsgs) { m_pumpMsgs = pumpMsgs; }
+  // What taking and giving back mean is the class's: for an event they are waiting and setting.
   virtual bool Lock(int timeoutMs) = 0;
   virtual bool Unlock() = 0;
 

@@ -32,6 +32,7 @@ class EventData : public RefCountedCriticalSectionPolicy {
 
   const String& name() const { return m_name; }
   bool manualReset() const { return m_manualReset; }
+  // The semaphore; for an event that is open.
   const SemaphoreSet& set() const { return *m_set; }
   unsigned slot() const { return m_slot; }
 
