@@ -4,7 +4,7 @@
 // own lock is held for look-ups only: waits for other processes are made without it.
 //
 // Threads are known by numbers of this source. The system's ids are given to new threads again, and
-// a new thread must not look like the owner of a hold that its predecessor left behind.
+// a new thread must not be taken for the owner of a hold that its predecessor has left.
 //
 // After a fork the child has a table of its own from the first use on. Entries of the parent are
 // never changed there: another thread may have been doing so at the fork. A hold that came through

@@ -71,7 +71,7 @@ bool FileIsThere(const std::string& file) {
     return path::DoesFileExist(Widen(file));
   } catch (const zt::fnd::osdep::PosixError& error) {
     int code = static_cast<int>(error.whatcode());
-    // Kept: this user cannot tell whether it is gone, and dropping its components would take them
+    // Kept: this user cannot see whether it is gone, and dropping its components would take them
     // from all users.
     if (MayNotLook(code)) return true;
     // The bundle may have been replaced by a file of its name, or by a link to itself.

@@ -26,8 +26,7 @@ HRESULT HandOut(void* object, uintptr_t offset, void** out) {
 
 HRESULT ZTComInternalQueryInterface(void* object, const _ZTCOM_INTMAP_ENTRY* entries,
                                     const GUID& iid, void** out) {
-  // A broken table is a mistake of the class, which no result could report to anyone who can mend
-  // it.
+  // A broken table is a mistake of the class, which no result to a caller would mend.
   if (!object || !out || entries->function != kZtComSimpleEntry) abort();
   *out = nullptr;
   // Before the rows, and always the first one's interface: one pointer is the object's identity.

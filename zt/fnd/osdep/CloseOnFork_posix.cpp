@@ -123,7 +123,7 @@ CloseOnForkFd CloseOnForkFd::OpenShared(const AnsiString& path, InTheWay way) {
 // takes after this one.
 int CloseOnForkFd::get() const noexcept {
   if (!valid()) return -1;
-  // A child's copy of a kept descriptor is its own, and has no mark that anyone may remove.
+  // In a child only a kept descriptor is its own.
   if (!m_process.isCurrent()) {
     if (!m_kept) return -1;
   } else {
