@@ -47,6 +47,14 @@ if(TARGET vltctl)
   set_target_properties(vltctl-client PROPERTIES INSTALL_RPATH "$ORIGIN/${library}")
   install(TARGETS vltctl RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
   install(TARGETS vltctl-client RUNTIME DESTINATION libexec/vltutils)
+  install(FILES ${CMAKE_SOURCE_DIR}/tools/vltctl-1.schema.json
+    DESTINATION ${CMAKE_INSTALL_DATADIR}/vltutils)
+  set(completions ${CMAKE_BINARY_DIR}/completion)
+  install(FILES ${completions}/vltctl
+    DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions)
+  install(FILES ${completions}/_vltctl DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/site-functions)
+  install(FILES ${completions}/vltctl.fish
+    DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d)
 endif()
 foreach(section 1 7)
   file(GLOB manuals ${CMAKE_SOURCE_DIR}/man/*.${section})

@@ -70,8 +70,14 @@ foreach(floor ${VLT_FLOORS})
   vlt_tests(${floor}_tests LABELS unit SOURCES ${${floor}_TESTS} LINKS ${linked})
 endforeach()
 
-# Units of the command, compiled into their tests: they use neither form of the library.
-vlt_tests(tools_tests LABELS unit GLOBS tools/common/*.cpp tools/vltctl-client/LibraryTrust*.cpp)
+# Units of the command that use neither form of the library.
+if(TARGET vltctl_common)
+  vlt_tests(tools_tests LABELS unit GLOBS tools/common/*_test.cpp tools/vltctl-client/LibraryTrust*.cpp
+    LINKS vltctl_common)
+  if(TARGET tools_tests)
+    target_compile_definitions(tools_tests PRIVATE VLT_TEST_SOURCE="${CMAKE_SOURCE_DIR}")
+  endif()
+endif()
 if(TARGET vltutils)
   vlt_tests(oom_tests LABELS e2e TIMEOUT 600 GLOBS tests/oom/*_test.cpp LINKS vltutils)
   vlt_tests(e2e_tests LABELS e2e TIMEOUT 300 GLOBS tests/e2e/*_test.cpp tests/power/*.cpp

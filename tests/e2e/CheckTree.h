@@ -4,11 +4,11 @@
 
 #include <gtest/gtest.h>
 
-#include <nlohmann/json.hpp>
 #include <string>
 #include <vector>
 
 #include "tests/e2e/Start.h"
+#include "tests/e2e/Vltctl.h"
 
 namespace vlt::test {
 
@@ -44,11 +44,6 @@ class Experts : public Installation {
   }
 };
 
-inline ProgramResult Vltctl(std::vector<std::string> arguments) {
-  arguments.insert(arguments.begin(), std::string(VLT_TEST_BIN) + "/vltctl");
-  return RunProgram(arguments);
-}
-
 struct Found {
   int exitCode;
   bool sound;
@@ -57,11 +52,10 @@ struct Found {
 
 // What "vltctl check GUID --json" says of one component.
 inline Found Check(uint32_t n) {
-  ProgramResult result = Vltctl({"check", GText(n), "--json"});
-  using nlohmann::json;
-  json out = json::parse(result.out, nullptr, false);
-  if (!out.is_array() || out.size() != 1) {
-    ADD_FAILURE() << result.out << result.err;
+  JsonResult result = VltctlJson({"check", GText(n)});
+  const nlohmann::json& out = result.items;
+  if (out.size() != 1) {
+    ADD_FAILURE() << out << result.err;
     return {result.exitCode, false, {}, {}};
   }
   return {result.exitCode, out[0]["sound"], out[0]["messages"], out[0]["notes"]};

@@ -16,7 +16,6 @@ namespace vlt::test {
 namespace {
 
 constexpr uid_t kNobody = 65534, kOther = 65533;
-constexpr int kGood = 0, kDataUnusable = 3;
 
 // A library whose constructor writes down who it runs as: the user ids, the group ids, the number of
 // groups, whether it can become root again, and how many descriptors beyond the check's own are open.
@@ -58,7 +57,7 @@ class CheckRoot : public testing::Test {
   std::string witnessed() const { return Exists(witness()) ? ReadBytes(witness()) : "not loaded"; }
   void expectRefused(const std::string& note) {
     Found found = Check(1);
-    EXPECT_EQ(found.exitCode, kDataUnusable);
+    EXPECT_EQ(found.exitCode, kNotFound);
     EXPECT_FALSE(found.sound);
     EXPECT_EQ(found.messages, Messages{});
     ASSERT_EQ(found.notes.size(), 1u);

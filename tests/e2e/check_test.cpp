@@ -10,16 +10,12 @@
 #include <chrono>
 #include <filesystem>
 #include <fstream>
-#include <nlohmann/json.hpp>
 
 #include "tests/e2e/CheckTree.h"
 #include "tests/e2e/Start.h"
 
 namespace vlt::test {
 namespace {
-
-using nlohmann::json;
-enum ExitCode { kGood = 0, kNotFound = 1, kDataUnusable = 3 };
 
 // A library for the other word size: by the compiler, or, where it cannot, its head alone.
 void BuildForTheOtherWordSize(const std::string& file) {
@@ -70,7 +66,7 @@ void ExpectTold(uint32_t n, const Messages& messages, const Messages& notes) {
     EXPECT_EQ(reported, messages);
   });
   Found found = Check(n);
-  EXPECT_EQ(found.exitCode, messages.empty() ? kGood : kDataUnusable);
+  EXPECT_EQ(found.exitCode, messages.empty() ? kGood : kNotFound);
   EXPECT_EQ(found.sound, messages.empty());
   EXPECT_EQ(found.messages, messages);
   EXPECT_EQ(found.notes, notes);
@@ -133,7 +129,7 @@ TEST(Check, ALibraryThatIsCutAtAnyPlaceTakesNothingDown) {
   for (size_t size : {size_t{16}, size_t{52}, size_t{64}, size_t{400}, whole.size() / 2}) {
     WriteBytes(file, whole.substr(0, size));
     Found found = Check(1);
-    EXPECT_EQ(found.exitCode, kDataUnusable) << size;
+    EXPECT_EQ(found.exitCode, kNotFound) << size;
     EXPECT_FALSE(found.sound) << size;
     EXPECT_FALSE(found.messages.empty() && found.notes.empty()) << size;
   }
@@ -194,7 +190,7 @@ TEST_IN_CHILD(Check, TheToolToldOfAFileThatMayNotBeRead) {
     ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
   }
   Found found = Check(1);
-  EXPECT_EQ(found.exitCode, kDataUnusable);
+  EXPECT_EQ(found.exitCode, kNotFound);
   EXPECT_EQ(found.messages, Messages{IsNot("is not readable", file)});
 }
 
@@ -250,7 +246,7 @@ void ExpectNote(const std::string& statement, const std::string& note) {
   Experts e;
   Build(e.add(1, "harm"), AtLoad(statement));
   Found found = Check(1);
-  EXPECT_EQ(found.exitCode, kDataUnusable) << statement;
+  EXPECT_EQ(found.exitCode, kNotFound) << statement;
   EXPECT_FALSE(found.sound) << statement;
   EXPECT_EQ(found.messages, Messages{}) << statement;
   EXPECT_EQ(found.notes, Messages{note}) << statement;
@@ -322,7 +318,7 @@ TEST(Check, OneBadLibraryHidesNoOther) {
   Build(e.add(2, "crash"), AtLoad("abort();"));
   std::string missing = e.add(3, "missing");
   ProgramResult result = Vltctl({"check"});
-  EXPECT_EQ(result.exitCode, kDataUnusable);
+  EXPECT_EQ(result.exitCode, kNotFound);
   EXPECT_NE(result.out.find("object expert good: sound\n"
                             "object expert crash: NOT SOUND\n"
                             "    the process that loaded the library died: Aborted\n"
@@ -345,7 +341,7 @@ TEST(Check, AComponentWithoutAnIdentifierIsNotTakenForAll) {
       "object expert nameless: NOT SOUND\n"
       "    it has no identifier of its own, so it cannot be checked alone\n";
   ProgramResult one = Vltctl({"check", kNull});
-  EXPECT_EQ(one.exitCode, kDataUnusable);
+  EXPECT_EQ(one.exitCode, kNotFound);
   EXPECT_EQ(one.out, reported);
   ProgramResult all = Vltctl({"check"});
   EXPECT_NE(all.out.find(reported + "object expert crash: NOT SOUND\n"), std::string::npos)
@@ -361,7 +357,7 @@ TEST(Check, AnUnknownComponentIsNotFound) {
   ProgramResult result = Vltctl({"check", GText(77)});
   EXPECT_EQ(result.exitCode, kNotFound);
   EXPECT_EQ(result.out, "");
-  EXPECT_EQ(result.err, "vltctl: no component " + GText(77) + "\n");
+  EXPECT_EQ(result.err, "vltctl: no component " + GText(77) + "; \"vltctl list\" shows all\n");
   ExpectStart([](IvltRegistrar&) {
     EXPECT_EQ(Checked(G(77)), (std::pair<HRESULT, Messages>{E_INVALIDARG, {}}));
   });

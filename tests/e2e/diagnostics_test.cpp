@@ -5,12 +5,12 @@
 #include <fstream>
 #include <iterator>
 #include <map>
-#include <nlohmann/json.hpp>
 #include <regex>
 #include <set>
 #include <sstream>
 
 #include "source/Utilities/vltutils.h"
+#include "tests/e2e/Vltctl.h"
 #include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
 
@@ -19,13 +19,6 @@ namespace {
 
 namespace fs = std::filesystem;
 using nlohmann::json;
-
-const std::string kVltctl = std::string(VLT_TEST_BIN) + "/vltctl";
-
-ProgramResult Vltctl(std::vector<std::string> arguments) {
-  arguments.insert(arguments.begin(), kVltctl);
-  return RunProgram(arguments);
-}
 
 // The points, as hook files in the field have them.
 const std::set<std::string> kPoints = {"TestHookNT\"./source/Utilities/vltutils\"1215",
@@ -74,10 +67,9 @@ TEST_F(Diagnostics, HookListNamesEachPointOnce) {
   for (std::string line; std::getline(lines, line);) names.insert(line.substr(0, line.find("  ")));
   EXPECT_EQ(names, std::multiset<std::string>(kPoints.begin(), kPoints.end()));
   std::set<std::string> keys;
-  const json listed = json::parse(Vltctl({"hook", "list", "--json"}).out);
-  for (const auto& [name, row] : listed.items()) {
-    keys.insert(name);
-    EXPECT_NE(row["value"], "") << name;
+  for (const json& item : VltctlJson({"hook", "list"}).items) {
+    keys.insert(item["name"]);
+    EXPECT_NE(item["where"], "") << item["name"];
   }
   EXPECT_EQ(keys, kPoints);
 }
@@ -222,9 +214,10 @@ TEST_F(Diagnostics, TraceShowsTheNewestLogsLastLines) {
   EXPECT_EQ(result.exitCode, 0);
   EXPECT_EQ(result.err, "");
   EXPECT_TRUE(result.out.ends_with("\n" + last)) << result.out;
-  json trace = json::parse(Vltctl({"trace", "--json"}).out);
-  EXPECT_EQ(trace["newest log"]["value"], logs + "20260102_000000-vlTracer-00000001.log");
-  EXPECT_EQ(trace["Target"]["origin"], "built-in default");
+  auto rows = VltctlJson({"trace"}).items;
+  EXPECT_EQ(ItemWith(rows, "name", "newest log")["value"],
+            logs + "20260102_000000-vlTracer-00000001.log");
+  EXPECT_EQ(ItemWith(rows, "name", "Target")["origin"], "built-in default");
   EXPECT_EQ(fs::last_write_time(logs), before);  // looking begins no log
   EXPECT_EQ(ReadBytes(logs + "20260102_000000-vlTracer-00000001.log"), lines);
   fs::remove_all(logs);

@@ -6,10 +6,9 @@
 #include <unistd.h>
 
 #include <filesystem>
-#include <nlohmann/json.hpp>
 #include <sstream>
 
-#include "tests/support/Child.h"
+#include "tests/e2e/Vltctl.h"
 #include "tests/support/Installation.h"
 
 namespace {
@@ -17,16 +16,11 @@ namespace {
 using namespace vlt::test;
 using nlohmann::json;
 
-const std::string kVltctl = std::string(VLT_TEST_BIN) + "/vltctl";
-
-ProgramResult Vltctl(std::vector<std::string> arguments) {
-  arguments.insert(arguments.begin(), kVltctl);
-  return RunProgram(arguments);
-}
-
-json VltctlJson(std::vector<std::string> arguments) {
-  arguments.push_back("--json");
-  return json::parse(Vltctl(arguments).out);
+// The rows of a command, by their names.
+std::map<std::string, json> Rows(const std::vector<std::string>& arguments) {
+  std::map<std::string, json> rows;
+  for (const json& item : VltctlJson(arguments).items) rows[item["name"]] = item;
+  return rows;
 }
 
 class VltctlAdmin : public testing::Test {
@@ -40,7 +34,7 @@ class VltctlAdmin : public testing::Test {
 
 TEST_F(VltctlAdmin, SettingsTellTheirOrigin) {
   WriteBytes(data + "/kor.ini", "[STORAGE]\nLocalServerEndpoint3=7\nNumCheckpoints=5\n");
-  json settings = VltctlJson({"settings"});
+  auto settings = Rows({"settings"});
   EXPECT_EQ(settings["LocalServerEndpoint3"]["value"], "7");
   EXPECT_EQ(settings["LocalServerEndpoint3"]["origin"], data + "/kor.ini [STORAGE]");
   EXPECT_EQ(settings["BootstrapEndpoint3"]["value"], "62602");
@@ -51,19 +45,20 @@ TEST_F(VltctlAdmin, SettingsTellTheirOrigin) {
 
 TEST_F(VltctlAdmin, SettingsByIndexNameAndSide) {
   WriteBytes(data + "/other.ini", "[STORAGE]\nLocalServerEndpoint4=9\n");
-  json client = VltctlJson({"settings", "--index", "4", "--name", "other", "--client"});
+  auto client = Rows({"settings", "--index", "4", "--name", "other", "--client"});
   EXPECT_EQ(client["LocalServerEndpoint4"]["value"], "9");
   EXPECT_EQ(client["BootstrapEndpoint4"]["origin"], "not set");
   EXPECT_FALSE(client.contains("NumCheckpoints"));
-  EXPECT_FALSE(VltctlJson({"settings", "--server"}).contains("ClientObjectCacheLimit"));
+  EXPECT_FALSE(Rows({"settings", "--server"}).contains("ClientObjectCacheLimit"));
 }
 
 TEST_F(VltctlAdmin, JarTellsItsSections) {
   EXPECT_EQ(Vltctl({"jar"}).exitCode, 1);
   WriteBytes(jar(), "[CookieSection]\nLastServerCookie=5\n[S]\nServerProcessID=77\n");
-  json sections = VltctlJson({"jar"});
-  EXPECT_EQ(sections["CookieSection"]["LastServerCookie"], "5");
-  EXPECT_EQ(sections["S"]["ServerProcessID"], "77");
+  json items = VltctlJson({"jar"}).items;
+  EXPECT_EQ(items.at(0),
+            (json{{"section", "CookieSection"}, {"name", "LastServerCookie"}, {"value", "5"}}));
+  EXPECT_EQ(items.at(1), (json{{"section", "S"}, {"name", "ServerProcessID"}, {"value", "77"}}));
   EXPECT_NE(Vltctl({"jar"}).out.find("ServerProcessID"), std::string::npos);
 }
 
@@ -91,7 +86,7 @@ TEST_F(VltctlAdmin, VerifyNamesTheRow) {
     WriteBytes(dir / "x.ini", c.bytes);
     std::filesystem::remove(dir / "x.vl5");
     if (!c.sidecar.empty()) WriteBytes(dir / "x.vl5", c.sidecar);
-    EXPECT_EQ(VltctlJson({"verify", dir / "x.ini"})["found"], c.found);
+    EXPECT_EQ(VltctlJson({"verify", dir / "x.ini"}).items.at(0)["found"], c.found);
     EXPECT_EQ(Vltctl({"verify", dir / "x.ini"}).exitCode, c.code) << c.found;
     EXPECT_EQ(ReadBytes(dir / "x.ini"), c.bytes);
   }
@@ -104,7 +99,7 @@ TEST_F(VltctlAdmin, HookIsArmedAndCleared) {
   std::string file = installation.root() + "/VLTHooks.ini";
   std::string point = "TestHookNT\"./source/Common/vltDuplicateString2\"19";
   EXPECT_NE(Vltctl({"hook", "list"}).out.find(point), std::string::npos);
-  EXPECT_EQ(VltctlJson({"hook", "list"}).size(), 21u);
+  EXPECT_EQ(VltctlJson({"hook", "list"}).items.size(), 21u);
   EXPECT_EQ(Vltctl({"hook", "arm", point, "hang=25", "fail"}).exitCode, 0);
   EXPECT_EQ(ReadBytes(file), "[Hook]\nName = " + point +
                                  "\nHang = true\nHangTime = 25\n"
@@ -117,7 +112,7 @@ TEST_F(VltctlAdmin, HookIsArmedAndCleared) {
 }
 
 TEST_F(VltctlAdmin, TraceTellsWhereTheLogGoes) {
-  json trace = VltctlJson({"trace"});
+  auto trace = Rows({"trace"});
   std::string expected =
       geteuid() == 0 ? "/Library/Logs/KOR/" : std::string(getenv("HOME")) + "/Library/Logs/KOR/";
   EXPECT_EQ(trace["directory"]["value"], expected);

@@ -4,22 +4,15 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <nlohmann/json.hpp>
 #include <sstream>
 
 #include "tests/e2e/Start.h"
+#include "tests/e2e/Vltctl.h"
 
 namespace vlt::test {
 namespace {
 
 using nlohmann::json;
-
-enum ExitCode { kGood = 0, kNotFound = 1, kUsage = 2, kDataUnusable = 3 };
-
-ProgramResult Vltctl(std::vector<std::string> arguments) {
-  arguments.insert(arguments.begin(), std::string(VLT_TEST_BIN) + "/vltctl");
-  return RunProgram(arguments);
-}
 
 // Dictionary, object expert and resource expert, the latter two bound to one class.
 class Sample : public Installation {
@@ -107,25 +100,30 @@ TEST(Vltctl, ListShowsATable) {
 
 TEST(Vltctl, ListAsJson) {
   Sample s;
-  ProgramResult result = Vltctl({"list", "--json"});
+  JsonResult result = VltctlJson({"list"});
   EXPECT_EQ(result.exitCode, kGood);
-  json out = json::parse(result.out);
-  EXPECT_GE(out["readyMs"].get<double>(), 0);
-  ASSERT_EQ(out["components"].size(), 4u);
-  EXPECT_EQ(out["components"][0], (json{{"type", "dictionary"},
-                                        {"name", "Core Dictionary"},
-                                        {"guid", B(1)},
-                                        {"file", s.root() + "/Data Dictionaries/Core.framework"},
-                                        {"schemaVersion", 7},
-                                        {"changed", true},
-                                        {"lastInstalledSchemaVersion", 4294967295u},
-                                        {"prefix", "co"}}));
-  EXPECT_EQ(out["components"][2], (json{{"type", "object expert"},
-                                        {"name", "Tank"},
-                                        {"guid", B(2)},
-                                        {"file", s.root() + "/Experts/Tank.vle"}}));
-  EXPECT_EQ(out["components"][3]["name"], "Serial \"Ports\"");
-  EXPECT_EQ(out["components"][3]["pnp"], "PNP0501");
+  json out = result.items;
+  ASSERT_EQ(out.size(), 4u);
+  EXPECT_EQ(out[0], (json{{"type", "dictionary"},
+                          {"name", "Core Dictionary"},
+                          {"guid", B(1)},
+                          {"file", s.root() + "/Data Dictionaries/Core.framework"},
+                          {"schemaVersion", 7},
+                          {"changed", true},
+                          {"lastInstalledSchemaVersion", nullptr},
+                          {"prefix", "co"},
+                          {"pnp", nullptr}}));
+  EXPECT_EQ(out[2], (json{{"type", "object expert"},
+                          {"name", "Tank"},
+                          {"guid", B(2)},
+                          {"file", s.root() + "/Experts/Tank.vle"},
+                          {"schemaVersion", nullptr},
+                          {"changed", nullptr},
+                          {"lastInstalledSchemaVersion", nullptr},
+                          {"prefix", nullptr},
+                          {"pnp", nullptr}}));
+  EXPECT_EQ(out[3]["name"], "Serial \"Ports\"");
+  EXPECT_EQ(out[3]["pnp"], "PNP0501");
 }
 
 TEST(Vltctl, JsonIsValidWhateverTheNames) {
@@ -134,10 +132,9 @@ TEST(Vltctl, JsonIsValidWhateverTheNames) {
               "[KORComponents]\nx = \"x\"\n[x]\nIdentifier = \"" + GText(1) +
                   "\"\nFileName = \"/a\\x01\xFF\xC3\x28\\n\\\"b\"\n");
   for (const char* locale : {"C", "C.UTF-8"}) {
-    ProgramResult result =
-        RunProgram({std::string(VLT_TEST_BIN) + "/vltctl", "list", "--json"}, {{"LC_ALL", locale}});
+    JsonResult result = VltctlJson({"list"}, {{"LC_ALL", locale}});
     EXPECT_EQ(result.exitCode, kGood) << result.err;
-    EXPECT_FALSE(json::parse(result.out, nullptr, false).is_discarded()) << result.out;
+    EXPECT_EQ(result.items.size(), 2u);
   }
 }
 
@@ -153,21 +150,21 @@ TEST(Vltctl, ShowTakesEveryFormOfTheIdentifier) {
       EXPECT_NE(result.out.find(word), std::string::npos) << word;
     }
   }
-  json out = json::parse(Vltctl({"show", "--json", GText(3)}).out);
+  json out = VltctlJson({"show", GText(3)}).items.at(0);
   EXPECT_EQ(out["type"], "resource expert");
   EXPECT_EQ(out["pnp"], "PNP0501");
 }
 
 TEST(Vltctl, ShowOfAnUnknownOneIsNotFound) {
   Sample s;
-  for (const char* option : {"--json", ""}) {
-    std::vector<std::string> arguments = {"show", GText(77)};
-    if (*option) arguments.push_back(option);
-    ProgramResult result = Vltctl(arguments);
-    EXPECT_EQ(result.exitCode, kNotFound);
-    EXPECT_EQ(result.out, "");
-    EXPECT_NE(result.err.find(GText(77)), std::string::npos);
-  }
+  ProgramResult text = Vltctl({"show", GText(77)});
+  EXPECT_EQ(text.exitCode, kNotFound);
+  EXPECT_EQ(text.out, "");
+  EXPECT_EQ(text.err, "vltctl: no component " + GText(77) + "; \"vltctl list\" shows all\n");
+  JsonResult asJson = VltctlJson({"show", GText(77)});
+  EXPECT_EQ(asJson.exitCode, kNotFound);
+  EXPECT_EQ(asJson.problems.at(0)["code"], "no-component");
+  EXPECT_EQ(asJson.items.size(), 0u);
 }
 
 // ---- classes
@@ -179,7 +176,7 @@ TEST(Vltctl, ClassesListsTheExpertsOfBothTypes) {
   EXPECT_NE(table.out.find("Tank"), std::string::npos);
   EXPECT_NE(table.out.find("Serial"), std::string::npos);
   EXPECT_EQ(table.out.find("Core"), std::string::npos);
-  json out = json::parse(Vltctl({"classes", B(9), "--json"}).out);
+  json out = VltctlJson({"classes", B(9)}).items;
   ASSERT_EQ(out.size(), 2u);
   EXPECT_EQ(out[0]["name"], "Tank");
   EXPECT_EQ(out[1]["type"], "resource expert");

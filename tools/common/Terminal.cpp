@@ -48,15 +48,19 @@ std::string ForTerminal(std::string_view text) {
   return out;
 }
 
-std::string LinesForTerminal(std::string_view text) {
-  std::string out;
-  for (;;) {
-    size_t end = text.find('\n');
-    out += ForTerminal(text.substr(0, end));
-    if (end == std::string_view::npos) return out;
-    out += '\n';
-    text.remove_prefix(end + 1);
+size_t DisplayWidth(std::string_view text) {
+  size_t width = 0;
+  mbstate_t state = {};
+  while (!text.empty()) {
+    wchar_t c = 0;
+    size_t size = mbrtowc(&c, text.data(), text.size(), &state);
+    bool isCharacter = size > 0 && size <= text.size();
+    int columns = isCharacter ? wcwidth(c) : 1;
+    width += columns > 0 ? static_cast<size_t>(columns) : 0;
+    if (!isCharacter) state = {};
+    text.remove_prefix(isCharacter ? size : 1);
   }
+  return width;
 }
 
 }  // namespace vltctl

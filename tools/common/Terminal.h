@@ -12,7 +12,8 @@ namespace vltctl {
 // that change the direction of writing as \u{NN}. Other characters, a backslash too, stay as they are.
 std::string ForTerminal(std::string_view text);
 
-// The same for a text of several lines: line feeds stay.
-std::string LinesForTerminal(std::string_view text);
+// Columns that a terminal needs for a text that ForTerminal has returned: two for wide characters, none
+// for those that combine with the one before.
+size_t DisplayWidth(std::string_view text);
 
 }  // namespace vltctl

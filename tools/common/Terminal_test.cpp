@@ -52,10 +52,18 @@ TEST(Terminal, NoControlGetsThroughInTheCLocale) {
   }
 }
 
-TEST(Terminal, LinesKeepTheirEnds) {
-  EXPECT_EQ(LinesForTerminal("a\x1B\n\nb\n"), "a\\x1B\n\nb\n");
-  EXPECT_EQ(LinesForTerminal(""), "");
-  EXPECT_EQ(LinesForTerminal("one"), "one");
+TEST(Terminal, WidthIsThatOfTheTerminal) {
+  vlt::test::ScopedLocale locale(LC_ALL, "C.UTF-8");
+  EXPECT_EQ(DisplayWidth(""), 0u);
+  EXPECT_EQ(DisplayWidth("plain"), 5u);
+  EXPECT_EQ(DisplayWidth("Gr\xC3\xB6\xC3\x9F"
+                         "e"),
+            5u);
+  EXPECT_EQ(DisplayWidth("e\xCC\x81"), 1u);                 // a combining accent
+  EXPECT_EQ(DisplayWidth("\xE6\x97\xA5\xE6\x9C\xAC"), 4u);  // two wide characters
+  EXPECT_EQ(DisplayWidth("a\xFF"
+                         "b"),
+            3u);
 }
 
 }  // namespace

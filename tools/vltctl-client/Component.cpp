@@ -38,6 +38,10 @@ GUID ParseGuid(const std::string& text) {
 
 namespace {
 
+Failure Unusable(const char* what, const char* next) {
+  return {kDataUnusable, {"registrar", "", what, "", next}};
+}
+
 template <class T>
 struct ReleaseInterface {
   void operator()(T* p) const { p->Release(); }
@@ -96,7 +100,7 @@ Client::Client() {
   HRESULT result = vltGetRegistrar(&m_registrar);
   auto taken = std::chrono::steady_clock::now() - start;
   m_timeToReady = std::chrono::duration_cast<std::chrono::microseconds>(taken);
-  if (result < 0 || !m_registrar) throw DataUnusable("the registrar cannot be had");
+  if (result < 0 || !m_registrar) throw Unusable("the registrar cannot be had", "");
 }
 
 Client::~Client() { m_registrar->Release(); }
@@ -106,7 +110,7 @@ std::vector<Component> Client::list() const {
   for (const TypeName& row : kTypes) {
     IvltEnumComponent* raw = nullptr;
     if (m_registrar->EnumComponents(row.type, &raw) < 0) {
-      throw DataUnusable("the components cannot be listed");
+      throw Unusable("the components cannot be listed", "");
     }
     Held<IvltEnumComponent> enumerator(raw);
     for (;;) {
@@ -117,7 +121,7 @@ std::vector<Component> Client::list() const {
     }
   }
   // The library's own dictionary is always among them, unless the database could not be opened.
-  if (components.empty()) throw DataUnusable("the registration database was set aside; try again");
+  if (components.empty()) throw Unusable("the registration database was set aside", "try again");
   return components;
 }
 
@@ -145,13 +149,6 @@ std::vector<Component> Client::classes(const std::string& guid) const {
     }
   }
   return components;
-}
-
-bool IsGuid(const std::string& text) {
-  // The library reads bad text as the null GUID, so the null GUID itself needs a check of its own.
-  std::string bare = text.size() == 38 ? text.substr(1, 36) : text;
-  if (bare == "00000000-0000-0000-0000-000000000000") return true;
-  return bare.size() == 36 && GuidText(ParseGuid(text)) != GuidText(GUID_NULL);
 }
 
 }  // namespace vltctl

@@ -2,19 +2,14 @@
 
 #include <chrono>
 #include <optional>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
 #include "source/Utilities/vltutils.h"
+#include "tools/common/Output.h"
 
 // What vltctl knows of the registrar: components as plain values.
 namespace vltctl {
-
-// The installation's data cannot be used; the text says why.
-struct DataUnusable : std::runtime_error {
-  using std::runtime_error::runtime_error;
-};
 
 struct Component {
   std::string type, name, guid, file;
@@ -28,7 +23,7 @@ struct Component {
 
 class Client {
  public:
-  // Throws DataUnusable.
+  // Throws Failure.
   Client();
   ~Client();
   Client(const Client&) = delete;
@@ -50,8 +45,5 @@ class Client {
 std::string NarrowText(const wchar_t* text);
 std::string GuidText(GUID guid);
 GUID ParseGuid(const std::string& text);
-
-// True for the text form of a GUID, with or without braces.
-bool IsGuid(const std::string& text);
 
 }  // namespace vltctl

@@ -1,254 +1,190 @@
 // The commands of vltctl that are calls of the library: what the registrar of this machine knows.
-#include <locale.h>
 #include <stdio.h>
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
-#include <nlohmann/json.hpp>
 
-#include "tools/common/Commands.h"
-#include "tools/common/Terminal.h"
-#include "tools/common/Usage.h"
+#include "tools/common/Locale.h"
+#include "tools/common/Program.h"
 #include "tools/vltctl-client/Check.h"
 #include "tools/vltctl-client/Component.h"
-#include "zt/fnd/Exception.h"
 
 namespace {
 
-using nlohmann::json;
+using vltctl::Arguments;
 using vltctl::Client;
 using vltctl::Component;
-using vltctl::ForTerminal;
+using vltctl::Failure;
+using vltctl::Json;
 using vltctl::kDataUnusable;
 using vltctl::kGood;
 using vltctl::kNotFound;
 using vltctl::kUsage;
+using vltctl::Output;
 
-json ToJson(const Component& c) {
-  json out = {{"type", c.type}, {"name", c.name}, {"guid", c.guid}, {"file", c.file}};
-  if (c.schemaVersion) {
-    out["schemaVersion"] = *c.schemaVersion;
-    out["changed"] = *c.fragmentRegistered != 0;
-    out["lastInstalledSchemaVersion"] = *c.lastInstalledSchemaVersion;
-    out["prefix"] = *c.prefix;
-  }
-  if (c.pnp) out["pnp"] = *c.pnp;
-  return out;
+template <class T>
+Json OrNull(const std::optional<T>& value) {
+  return value ? Json(*value) : Json();
 }
 
-json ToJson(const std::vector<Component>& components) {
-  json out = json::array();
-  for (const Component& c : components) out.push_back(ToJson(c));
-  return out;
+constexpr uint32_t kNeverInstalled = 0xFFFFFFFF;
+
+Json ToJson(const Component& c) {
+  bool wasInstalled = c.lastInstalledSchemaVersion.value_or(kNeverInstalled) != kNeverInstalled;
+  return {
+      {"type", c.type},
+      {"name", c.name},
+      {"guid", c.guid},
+      {"file", c.file.empty() ? Json() : Json(c.file)},
+      {"schemaVersion", OrNull(c.schemaVersion)},
+      {"changed", c.fragmentRegistered ? Json(*c.fragmentRegistered != 0) : Json()},
+      {"lastInstalledSchemaVersion", wasInstalled ? Json(*c.lastInstalledSchemaVersion) : Json()},
+      {"prefix", OrNull(c.prefix)},
+      {"pnp", OrNull(c.pnp)}};
 }
 
-// JSON demands UTF-8; what a file name holds beyond it is shown as a replacement character.
-void Print(const json& value) {
-  puts(value.dump(2, ' ', false, json::error_handler_t::replace).c_str());
+std::string Or(const std::string& text, const char* otherwise) {
+  return text.empty() ? otherwise : text;
 }
 
-void PrintTable(const std::vector<Component>& components) {
-  std::vector<std::vector<std::string>> rows = {{"TYPE", "NAME", "GUID", "VERSION", "FILE"}};
+void Print(const std::vector<Component>& components, Output& output) {
+  vltctl::Table table({"TYPE", "NAME", "GUID", "VERSION", "FILE"});
   for (const Component& c : components) {
     std::string version = c.schemaVersion ? std::to_string(*c.schemaVersion) : "-";
-    rows.push_back({ForTerminal(c.type), ForTerminal(c.name), ForTerminal(c.guid), version,
-                    c.file.empty() ? "-" : ForTerminal(c.file)});
+    table.add({c.type, c.name, c.guid, version, Or(c.file, "-")});
+    output.item(ToJson(c));
   }
-  std::vector<size_t> widths(rows[0].size());
-  for (const auto& row : rows) {
-    for (size_t i = 0; i < row.size(); ++i) widths[i] = std::max(widths[i], row[i].size());
-  }
-  for (const auto& row : rows) {
-    for (size_t i = 0; i + 1 < row.size(); ++i) {
-      printf("%-*s  ", static_cast<int>(widths[i]), row[i].c_str());
-    }
-    printf("%s\n", row.back().c_str());
-  }
+  output.print(table);
 }
 
-void PrintOne(const Component& c) {
-  auto line = [](const char* name, const std::string& value) {
-    printf("%-26s %s\n", name, ForTerminal(value).c_str());
-  };
-  line("type", c.type);
-  line("name", c.name);
-  line("guid", c.guid);
-  line("file", c.file);
+bool IsAscii(const std::string& text) {
+  return std::all_of(text.begin(), text.end(),
+                     [](char c) { return static_cast<signed char>(c) >= 0; });
+}
+
+// What a program started from here would not see (tools/common/Locale.h).
+void NoteLocale(const std::vector<Component>& components, Output& output) {
+  if (!vltctl::LocaleWasReplaced()) return;
+  std::string names;
+  for (const Component& c : components) {
+    if (!IsAscii(c.name + c.file)) names += (names.empty() ? "" : ", ") + c.name;
+  }
+  if (names.empty()) return;
+  output.note(
+      "the environment has no UTF-8 locale; a program that is started with it does not list: " +
+      names + "; set LANG=C.UTF-8 for it");
+}
+
+void PrintOne(const Component& c, Output& output) {
+  vltctl::Table table;
+  table.add({"type", c.type});
+  table.add({"name", c.name});
+  table.add({"guid", c.guid});
+  table.add({"file", c.file});
   if (c.schemaVersion) {
-    line("schema version", std::to_string(*c.schemaVersion));
-    line("changed since reset", *c.fragmentRegistered ? "yes" : "no");
-    line("last installed version", *c.lastInstalledSchemaVersion == 0xFFFFFFFF
-                                       ? "none"
-                                       : std::to_string(*c.lastInstalledSchemaVersion));
-    line("prefix", *c.prefix);
+    table.add({"schema version", std::to_string(*c.schemaVersion)});
+    table.add({"changed since reset", *c.fragmentRegistered ? "yes" : "no"});
+    table.add({"last installed version", *c.lastInstalledSchemaVersion == kNeverInstalled
+                                             ? "none"
+                                             : std::to_string(*c.lastInstalledSchemaVersion)});
+    table.add({"prefix", *c.prefix});
   }
-  if (c.pnp) line("pnp", *c.pnp);
+  if (c.pnp) table.add({"pnp", *c.pnp});
+  output.print(table);
+  output.item(ToJson(c));
 }
 
-int List(bool asJson) {
+Failure NoComponent(const std::string& guid) {
+  return {kNotFound, {"no-component", "", "no component " + guid, "", "\"vltctl list\" shows all"}};
+}
+
+int List(const Arguments&, Output& output) {
   Client client;
   auto components = client.list();
   double readyMs = static_cast<double>(client.timeToReady().count()) / 1000;
-  if (asJson) {
-    Print({{"components", ToJson(components)}, {"readyMs", readyMs}});
-  } else {
-    PrintTable(components);
-    printf("%zu components; scanned in %.1f ms\n", components.size(), readyMs);
-  }
+  Print(components, output);
+  char summary[80];
+  snprintf(summary, sizeof summary, "%zu components; scanned in %.1f ms", components.size(),
+           readyMs);
+  output.line(summary);
+  NoteLocale(components, output);
   return kGood;
 }
 
-int Show(const std::string& guid, bool asJson) {
+int Show(const Arguments& arguments, Output& output) {
+  const std::string guid = arguments.text("GUID");
   auto component = Client().find(guid);
-  if (!component) {
-    fprintf(stderr, "vltctl: no component %s\n", ForTerminal(guid).c_str());
-    return kNotFound;
-  }
-  if (asJson) {
-    Print(ToJson(*component));
-  } else {
-    PrintOne(*component);
-  }
+  if (!component) throw NoComponent(guid);
+  PrintOne(*component, output);
   return kGood;
 }
 
-int Classes(const std::string& guid, bool asJson) {
+int Classes(const Arguments& arguments, Output& output) {
+  const std::string guid = arguments.text("GUID");
   auto components = Client().classes(guid);
   if (components.empty()) {
-    fprintf(stderr, "vltctl: no component binds to %s\n", ForTerminal(guid).c_str());
-    return kNotFound;
+    throw Failure(kNotFound, {"no-class", "", "no component binds to " + guid, "", ""});
   }
-  if (asJson) {
-    Print(ToJson(components));
-  } else {
-    PrintTable(components);
-  }
+  Print(components, output);
   return kGood;
 }
 
-json ToJson(const vltctl::Finding& finding) {
-  json out = ToJson(finding.component);
-  out["sound"] = finding.sound;
-  out["messages"] = finding.messages;
-  out["notes"] = finding.notes;
-  return out;
-}
-
-int Check(const std::string& guid, bool asJson) {
+int Check(const Arguments& arguments, Output& output) {
+  const std::string guid = arguments.text("GUID");
   Client client;
   auto findings = vltctl::CheckComponents(
       client, guid.empty() ? std::nullopt : std::optional<std::string>(guid));
-  if (findings.empty()) {
-    fprintf(stderr, "vltctl: no component %s\n", ForTerminal(guid).c_str());
-    return kNotFound;
-  }
+  if (findings.empty()) throw NoComponent(guid);
   bool sound = true;
-  json all = json::array();
   for (const vltctl::Finding& finding : findings) {
     sound = sound && finding.sound;
-    all.push_back(ToJson(finding));
-    if (asJson) continue;
-    printf("%s %s: %s\n", finding.component.type.c_str(),
-           ForTerminal(finding.component.name).c_str(), finding.sound ? "sound" : "NOT SOUND");
-    for (const std::string& text : finding.messages) printf("  %s\n", ForTerminal(text).c_str());
-    for (const std::string& text : finding.notes) printf("    %s\n", ForTerminal(text).c_str());
+    Json item = ToJson(finding.component);
+    item["sound"] = finding.sound;
+    item["messages"] = finding.messages;
+    item["notes"] = finding.notes;
+    output.item(item);
+    output.line(finding.component.type + " " + finding.component.name + ": " +
+                (finding.sound ? "sound" : "NOT SOUND"));
+    for (const std::string& text : finding.messages) output.line("  " + text);
+    for (const std::string& text : finding.notes) output.line("    " + text);
   }
-  if (asJson) Print(all);
-  return sound ? kGood : kDataUnusable;
+  return sound ? kGood : kNotFound;
 }
 
-int Url(bool asJson) {
+int Url(const Arguments&, Output& output) {
   wchar_t* url = nullptr;
   HRESULT result = vltGetLocalConfigurationURL(&url);
   std::string text = vltctl::NarrowText(url);
   vltFree(url);
-  if (asJson) {
-    Print({{"url", text}});
-  } else {
-    printf("%s\n", ForTerminal(text).c_str());
-  }
+  output.item({{"url", text}});
+  output.line(text);
   return result < 0 ? kDataUnusable : kGood;
 }
 
-int Identity(bool asJson) {
+int Identity(const Arguments&, Output& output) {
   GUID identity = {};
   if (vltGetServerIdentity(&identity) < 0) {
-    fprintf(stderr, "vltctl: no identity is available\n");
-    return kDataUnusable;
+    throw Failure(kDataUnusable, {"no-identity", "", "no identity is available", "", ""});
   }
   std::string text = vltctl::GuidText(identity);
-  if (asJson) {
-    Print({{"identity", text}});
-  } else {
-    printf("%s\n", text.c_str());
-  }
+  output.item({{"identity", text}});
+  output.line(text);
   return kGood;
 }
 
-struct Arguments {
-  bool json = false;
-  std::string guid;
-};
-
-int Run(int argc, char** argv) {
-  Arguments arguments;
-  CLI::App app("Shows what the component registrar of this machine knows.", "vltctl");
-  app.set_version_flag("--version", VLTCTL_VERSION);
-  app.require_subcommand(1);
-  CLI::Validator guid(
-      [](const std::string& text) {
-        return vltctl::IsGuid(text) ? std::string() : "not a GUID: " + text;
-      },
-      "GUID");
-  auto command = [&](const char* name, const char* description) {
-    CLI::App* sub = app.add_subcommand(name, description);
-    sub->add_flag("--json", arguments.json, "Print JSON");
-    return sub;
-  };
-  CLI::App* list = command("list", "All components");
-  CLI::App* show = command("show", "One component");
-  show->add_option("guid", arguments.guid, "Identifier, with or without braces")
-      ->required()
-      ->check(guid);
-  CLI::App* classes = command("classes", "The experts that bind to a class of objects");
-  classes->add_option("guid", arguments.guid, "Identifier of the class")->required()->check(guid);
-  CLI::App* check = command("check", "Do the components' files and entry points stand?");
-  check->add_option("guid", arguments.guid, "One component; all without")->check(guid);
-  CLI::App* url = command("url", "Where the local server listens");
-  CLI::App* identity = command("identity", "Identity of this machine's server");
-  // Listed for the help; the command itself has done them before this program is asked.
-  for (const auto& [name, summary] : vltctl::kFileCommands) command(name, summary);
-  app.footer("Exit codes: 0 good, 1 not found, 2 usage, 3 the installation's data cannot be used.");
-  try {
-    app.parse(argc, argv);
-  } catch (const CLI::ParseError& error) {
-    // CLI11's own codes are many; a usage error has one here, and --help and --version are none.
-    return vltctl::ExitOf(app, error) == 0 ? kGood : kUsage;
-  }
-  if (list->parsed()) return List(arguments.json);
-  if (check->parsed()) return Check(arguments.guid, arguments.json);
-  if (url->parsed()) return Url(arguments.json);
-  if (identity->parsed()) return Identity(arguments.json);
-  if (show->parsed()) return Show(arguments.guid, arguments.json);
-  if (classes->parsed()) return Classes(arguments.guid, arguments.json);
-  return kUsage;
+// Commands of the table that neither program knows.
+int Unknown(char** argv, Output&) {
+  throw Failure(kUsage, {"usage", "", std::string("no such command: ") + argv[1], "", ""});
 }
 
 }  // namespace
 
 int main(int argc, char** argv) {
-  setlocale(LC_ALL, "");
+  const vltctl::Handler handlers[] = {{"list", List},   {"show", Show}, {"classes", Classes},
+                                      {"check", Check}, {"url", Url},   {"identity", Identity}};
   try {
-    return Run(argc, argv);
-  } catch (const zt::fnd::exception::Exception& error) {
-    // What the library throws says that files are not as they should be.
-    fprintf(stderr, "vltctl: %s\n", ForTerminal(error.what()).c_str());
-  } catch (const vltctl::DataUnusable& error) {
-    fprintf(stderr, "vltctl: %s\n", ForTerminal(error.what()).c_str());
+    return vltctl::Run(argc, argv, handlers, Unknown);
   } catch (int) {
     fprintf(stderr, "vltctl: the registration database cannot be opened\n");
-  } catch (const std::exception& error) {
-    fprintf(stderr, "vltctl: %s\n", ForTerminal(error.what()).c_str());
   }
-  return kDataUnusable;
+  return vltctl::kDataUnusable;
 }

@@ -1,19 +1,17 @@
 // trace and hook: where the log goes, and which fault is armed.
-#include <stdio.h>
+#include <errno.h>
+#include <string.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <filesystem>
-#include <iterator>
 #include <map>
 #include <sstream>
-#include <stdexcept>
 #include <system_error>
 
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/Common/vltHookPoints.h"
 #include "source/vlIniMgr.h"
-#include "tools/common/Terminal.h"
 #include "tools/vltctl/Reading.h"
 #include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
@@ -24,7 +22,7 @@ namespace {
 
 namespace fs = std::filesystem;
 
-using vltctl::ForTerminal;
+using vltctl::ExitCode;
 using zt::posix::ScopedFd;
 
 constexpr size_t kLastLines = 10;
@@ -82,7 +80,7 @@ std::vector<std::string> LastLines(const std::string& file) {
 
 }  // namespace
 
-int Trace(bool json) {
+int Trace(const Arguments&, Output& output) {
   std::string directory = Narrow(vlLogDirectory()), options = Narrow(vlDiagnosticsIni());
   Document document(ReadGuarded(options).bytes);
   std::vector<Row> rows = {{"directory", directory, ""},
@@ -92,22 +90,19 @@ int Trace(bool json) {
                            Option(document, "LowDiskThreshold", "0")};
   std::string newest = NewestLog(directory);
   if (!newest.empty()) rows.push_back({"newest log", directory + newest, ""});
-  if (json) {
-    Print(rows, true);
-    return vltctl::kGood;
-  }
-  Print(rows, false);
-  if (newest.empty()) return vltctl::kGood;
-  for (const std::string& line : LastLines(directory + newest)) {
-    printf("| %s\n", ForTerminal(line).c_str());
-  }
+  Print(rows, output);
+  if (newest.empty() || output.json()) return vltctl::kGood;
+  for (const std::string& line : LastLines(directory + newest)) output.line("| " + line);
   return vltctl::kGood;
 }
 
-int HookList(bool json) {
-  std::vector<Row> rows;
-  for (const auto& point : vlt::hook::kPoints) rows.push_back({point.name, point.where, ""});
-  Print(rows, json);
+int HookList(const Arguments&, Output& output) {
+  vltctl::Table table;
+  for (const auto& point : vlt::hook::kPoints) {
+    table.add({point.name, point.where});
+    output.item({{"name", point.name}, {"where", point.where}});
+  }
+  output.print(table);
   return vltctl::kGood;
 }
 
@@ -125,9 +120,7 @@ std::string HookFile() { return InstalledFile(vlt::layout::kHookFile); }
 // The library would wait for a pipe, and read whatever size of file: both end the command.
 void ExpectUsable(const std::string& file) {
   GuardedBytes read = ReadGuarded(file);
-  if (read.state == GuardedBytes::State::Unreadable) {
-    throw std::runtime_error(file + ": " + read.error);
-  }
+  if (read.state == GuardedBytes::State::Unreadable) throw Unusable(file, read.error);
 }
 
 // "hang=250" arms a hang of so many milliseconds.
@@ -142,37 +135,56 @@ bool SetFlag(CvlIniMgr& ini, const std::string& flag) {
   return true;
 }
 
-bool IsPoint(const std::string& name) {
-  return std::any_of(std::begin(vlt::hook::kPoints), std::end(vlt::hook::kPoints),
-                     [&](const auto& point) { return name == point.name; });
+std::vector<std::string> PointNames() {
+  std::vector<std::string> names;
+  for (const auto& point : vlt::hook::kPoints) names.push_back(point.name);
+  return names;
+}
+
+vltctl::Failure NoSuch(ExitCode code, const std::string& what, const std::string& word,
+                       const std::vector<std::string>& candidates, const std::string& otherwise) {
+  std::string guess = vltctl::DidYouMean(word, candidates);
+  return {code,
+          {"no-such-" + what, "", "no such " + what + ": " + word, "",
+           guess.empty() ? otherwise : guess}};
+}
+
+int Save(CvlIniMgr& ini, const std::string& file) {
+  errno = 0;
+  if (ini.Write() >= 0) return vltctl::kGood;
+  throw vltctl::Failure(vltctl::kCannotWrite,
+                        {"cannot-write", file, "cannot be written", errno ? strerror(errno) : "",
+                         "check the rights to its directory and the space on the disk"});
 }
 
 }  // namespace
 
-int HookArm(const std::string& name, const std::vector<std::string>& flags) {
-  if (!IsPoint(name)) {
-    fprintf(stderr, "vltctl: no such point: %s\n", ForTerminal(name).c_str());
-    return vltctl::kNotFound;
+int HookArm(const Arguments& arguments, Output& output) {
+  const std::string name = arguments.text("POINT");
+  std::vector<std::string> points = PointNames();
+  if (std::find(points.begin(), points.end(), name) == points.end()) {
+    throw NoSuch(vltctl::kNotFound, "point", name, points, "\"vltctl hook list\" shows all");
   }
   ExpectUsable(HookFile());
   CvlIniMgr ini = CvlIniMgr::OpenRaw(HookFile());
   ini.EraseSection("Hook");
   ini.SetItem("Hook", "Name", name.c_str(), false);
-  for (const std::string& flag : flags) {
+  for (const std::string& flag : arguments.list("FLAG")) {
     if (SetFlag(ini, flag)) continue;
-    fprintf(stderr, "vltctl: no such flag: %s (hang[=MS], crash, fail, throw, exhaust)\n",
-            ForTerminal(flag).c_str());
-    return vltctl::kUsage;
+    throw NoSuch(vltctl::kUsage, "flag", flag, {}, "give hang[=MS], crash, fail, throw or exhaust");
   }
-  return ini.Write() < 0 ? vltctl::kDataUnusable : vltctl::kGood;
+  int code = Save(ini, HookFile());
+  output.item({{"file", HookFile()}, {"armed", name}, {"flags", arguments.list("FLAG")}});
+  return code;
 }
 
-int HookClear() {
+int HookClear(const Arguments&, Output& output) {
+  output.item({{"file", HookFile()}, {"armed", nullptr}, {"flags", vltctl::Json::array()}});
   if (!fs::exists(HookFile())) return vltctl::kGood;
   ExpectUsable(HookFile());
   CvlIniMgr ini = CvlIniMgr::OpenRaw(HookFile());
   ini.EraseSection("Hook");
-  return ini.Write() < 0 ? vltctl::kDataUnusable : vltctl::kGood;
+  return Save(ini, HookFile());
 }
 
 }  // namespace admin

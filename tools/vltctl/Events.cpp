@@ -74,6 +74,11 @@ std::string List(const std::vector<int>& pids) {
   return out.empty() ? "no process" : out;
 }
 
+struct Shown {
+  std::string name, state;
+  std::vector<int> holders;
+};
+
 bool IsSetFile(const std::string& name) {
   return name.starts_with("sem_") && name.find_first_not_of("0123456789", 4) == std::string::npos;
 }
@@ -102,11 +107,11 @@ std::string DescribeEvent(const std::string& bytes) {
 
 }  // namespace
 
-int Events(bool json) {
+int Events(const Arguments&, Output& output) {
   std::string base = zt::fnd::AnsiString(zt::fnd::osdep::GetSharedUnixBase()).c_str();
   std::string directory = base + "/namedEvent/";
   Holders holders = HoldersBelow(directory);
-  std::vector<Row> rows;
+  std::vector<Shown> shown;
   std::error_code missing;
   for (fs::directory_iterator entry(directory, missing), end; !missing && entry != end;
        entry.increment(missing)) {
@@ -114,16 +119,22 @@ int Events(bool json) {
     std::string name = entry->path().filename();
     if (!fs::is_regular_file(entry->symlink_status(gone))) continue;
     std::string bytes = Bytes(entry->path());
-    rows.push_back({name, IsSetFile(name) ? DescribeSet(bytes) : DescribeEvent(bytes),
-                    "held by " + List(holders.named[directory + name])});
+    shown.push_back({name, IsSetFile(name) ? DescribeSet(bytes) : DescribeEvent(bytes),
+                     holders.named[directory + name]});
   }
   for (const auto& [path, pids] : holders.unlinked) {
     std::string name = path.substr(directory.size());
     if (!name.ends_with(kUnlinked)) name += kUnlinked;  // the kernel says so itself
-    rows.push_back({name, "its file is gone", "held by " + List(pids)});
+    shown.push_back({name, "its file is gone", pids});
   }
-  std::sort(rows.begin(), rows.end(), [](const Row& a, const Row& b) { return a.name < b.name; });
-  Print(rows, json);
+  std::sort(shown.begin(), shown.end(),
+            [](const Shown& a, const Shown& b) { return a.name < b.name; });
+  vltctl::Table table;
+  for (const Shown& event : shown) {
+    table.add({event.name, event.state, "held by " + List(event.holders)});
+    output.item({{"name", event.name}, {"state", event.state}, {"holders", event.holders}});
+  }
+  output.print(table);
   return vltctl::kGood;
 }
 

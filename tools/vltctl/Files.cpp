@@ -1,7 +1,4 @@
 // settings, jar, verify: what the guarded files say.
-#include <stdio.h>
-#include <string.h>
-
 #include <algorithm>
 
 #include "source/Cmd5vlt.h"
@@ -9,12 +6,9 @@
 #include "source/IniSidecar.h"
 #include "source/Utilities/vltSettingsKeys.h"
 #include "source/vlIniMgr.h"
-#include "tools/common/Terminal.h"
 #include "tools/vltctl/Reading.h"
 #include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/String.h"
-
-using vltctl::ForTerminal;
 
 namespace admin {
 namespace {
@@ -51,14 +45,14 @@ class SettingRows {
 
 }  // namespace
 
-int Settings(unsigned index, bool client, bool server, const std::string& name, bool json) {
+int Settings(const Arguments& arguments, Output& output) {
   using namespace settings;
-  std::string file = DataFile((name.empty() ? "kor" : name) + ".ini");
+  unsigned index = arguments.number("--index", kDefaultIndex);
+  bool client = arguments.has("--client"), server = arguments.has("--server");
+  std::string name = arguments.has("--name") ? arguments.text("--name") : "kor";
+  std::string file = DataFile(name + ".ini");
   GuardedBytes read = ReadGuarded(file);
-  if (read.state == GuardedBytes::State::Unreadable) {
-    fprintf(stderr, "vltctl: %s: %s\n", ForTerminal(file).c_str(), read.error.c_str());
-    return vltctl::kDataUnusable;
-  }
+  if (read.state == GuardedBytes::State::Unreadable) throw Unusable(file, read.error);
   Document document(read.bytes);
   SettingRows out(file, document);
   bool both = client == server;
@@ -81,34 +75,27 @@ int Settings(unsigned index, bool client, bool server, const std::string& name, 
       out.add(row);
     }
   }
-  Print(out.rows, json);
+  Print(out.rows, output);
   return vltctl::kGood;
 }
 
-int Jar(bool json) {
+int Jar(const Arguments&, Output& output) {
   std::string file = DataFile(zt::fnd::AnsiString(vlt::layout::kJar).c_str());
   GuardedBytes read = ReadGuarded(file);
-  if (read.state != GuardedBytes::State::Read) {
-    bool missing = read.state == GuardedBytes::State::Missing;
-    fprintf(stderr, "vltctl: %s: %s\n", ForTerminal(file).c_str(),
-            missing ? "no jar" : read.error.c_str());
-    return missing ? vltctl::kNotFound : vltctl::kDataUnusable;
+  if (read.state == GuardedBytes::State::Unreadable) throw Unusable(file, read.error);
+  if (read.state == GuardedBytes::State::Missing) {
+    throw vltctl::Failure(vltctl::kNotFound, {"no-jar", file, "there is no jar", "",
+                                              "a server makes it when it starts"});
   }
   Document document(read.bytes);
-  std::vector<Row> rows;
+  vltctl::Table table;
   for (const std::string& section : document.sections()) {
     for (const auto& [item, value] : document.items(section)) {
-      rows.push_back({item, value, "[" + section + "]"});
+      table.add({item, value, "[" + section + "]"});
+      output.item({{"section", section}, {"name", item}, {"value", value}});
     }
   }
-  if (!json) {
-    Print(rows, false);
-  } else {
-    nlohmann::json out = nlohmann::json::object();
-    for (const Row& row : rows)
-      out[row.origin.substr(1, row.origin.size() - 2)][row.name] = row.value;
-    PrintJson(out);
-  }
+  output.print(table);
   return document.status() < 0 ? vltctl::kDataUnusable : vltctl::kGood;
 }
 
@@ -117,7 +104,7 @@ namespace {
 struct Verdict {
   const char* found;
   const char* nextOpen;
-  ExitCode code;
+  vltctl::ExitCode code;
 };
 
 std::string Md5(const std::string& bytes) {
@@ -156,14 +143,11 @@ Verdict Judge(const GuardedBytes& read) {
 
 }  // namespace
 
-int Verify(const std::string& file, bool json) {
+int Verify(const Arguments& arguments, Output& output) {
+  std::string file = arguments.text("FILE");
   Verdict verdict = Judge(ReadGuarded(file));
-  if (json) {
-    PrintJson({{"file", file}, {"found", verdict.found}, {"nextOpen", verdict.nextOpen}});
-  } else {
-    printf("%s: %s; the next open %s\n", ForTerminal(file).c_str(), verdict.found,
-           verdict.nextOpen);
-  }
+  output.item({{"file", file}, {"found", verdict.found}, {"nextOpen", verdict.nextOpen}});
+  output.line(file + ": " + verdict.found + "; the next open " + verdict.nextOpen);
   return verdict.code;
 }
 

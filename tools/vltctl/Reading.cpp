@@ -11,11 +11,9 @@
 
 #include "source/IniSidecar.h"
 #include "source/vlIniMgr.h"
-#include "tools/common/Terminal.h"
 #include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
 
-using vltctl::ForTerminal;
 using zt::posix::ScopedFd;
 
 namespace admin {
@@ -178,26 +176,19 @@ std::string DataFile(const std::string& name) {
   return InstalledFile(vlt::layout::kData) + "/" + name;
 }
 
-void PrintJson(const nlohmann::json& value) {
-  puts(value.dump(2, ' ', false, nlohmann::json::error_handler_t::replace).c_str());
+void Print(const std::vector<Row>& rows, vltctl::Output& output) {
+  vltctl::Table table;
+  for (const Row& row : rows) {
+    table.add({row.name, row.value, row.origin});
+    output.item({{"name", row.name},
+                 {"value", row.value},
+                 {"origin", row.origin.empty() ? vltctl::Json() : vltctl::Json(row.origin)}});
+  }
+  output.print(table);
 }
 
-void Print(const std::vector<Row>& rows, bool json) {
-  if (json) {
-    nlohmann::json out = nlohmann::json::object();
-    for (const Row& row : rows) out[row.name] = {{"value", row.value}, {"origin", row.origin}};
-    return PrintJson(out);
-  }
-  size_t names = 0, values = 0;
-  for (const Row& row : rows) {
-    names = std::max(names, ForTerminal(row.name).size());
-    values = std::max(values, ForTerminal(row.value).size());
-  }
-  for (const Row& row : rows) {
-    printf("%-*s  %-*s  %s\n", static_cast<int>(names), ForTerminal(row.name).c_str(),
-           static_cast<int>(values), ForTerminal(row.value).c_str(),
-           ForTerminal(row.origin).c_str());
-  }
+vltctl::Failure Unusable(const std::string& file, const std::string& why) {
+  return {vltctl::kDataUnusable, {"unreadable", file, "cannot be read", why, ""}};
 }
 
 }  // namespace admin

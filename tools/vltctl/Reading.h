@@ -1,12 +1,12 @@
 #pragma once
 
-#include <nlohmann/json.hpp>
 #include <optional>
 #include <string>
 #include <utility>
 #include <vector>
 
-#include "tools/common/Commands.h"
+#include "tools/common/Arguments.h"
+#include "tools/common/Output.h"
 #include "zt/posix/ScopedFd.h"
 #include "ztini/ztini.h"
 
@@ -57,23 +57,28 @@ std::string DataFile(const std::string& name);
 // Path of a file or directory of the installation (vlloader/source/InstallLayout.h).
 std::string InstalledFile(const wchar_t* name);
 
-// Prints rows of one width, safe for a terminal, or the JSON of them.
+// A name with its value and where that comes from.
 struct Row {
   std::string name, value, origin;
 };
-void Print(const std::vector<Row>& rows, bool json);
-void PrintJson(const nlohmann::json& value);
+// Prints them as a table, and as items {"name", "value", "origin"}.
+void Print(const std::vector<Row>& rows, vltctl::Output& output);
 
-using vltctl::ExitCode;
+// The file cannot be used, for the reason that reading it gave.
+vltctl::Failure Unusable(const std::string& file, const std::string& why);
+
+using vltctl::Arguments;
+using vltctl::Output;
 
 // ---- The commands.
-int Settings(unsigned index, bool client, bool server, const std::string& name, bool json);
-int Jar(bool json);
-int Verify(const std::string& file, bool json);
-int Trace(bool json);
-int Events(bool json);
-int HookList(bool json);
-int HookArm(const std::string& name, const std::vector<std::string>& flags);
-int HookClear();
+int Settings(const Arguments& arguments, Output& output);
+int Jar(const Arguments& arguments, Output& output);
+int Verify(const Arguments& arguments, Output& output);
+int Trace(const Arguments& arguments, Output& output);
+int Events(const Arguments& arguments, Output& output);
+int HookList(const Arguments& arguments, Output& output);
+int HookArm(const Arguments& arguments, Output& output);
+int HookClear(const Arguments& arguments, Output& output);
+int Completion(const Arguments& arguments, Output& output);
 
 }  // namespace admin

@@ -48,8 +48,11 @@ class NamedEventListing : public testing::Test {
     EXPECT_EQ(result.err, "");
     std::map<std::string, std::string> rows;
     const json listed = json::parse(result.out);
-    for (const auto& [name, row] : listed.items()) {
-      rows[name] = row["value"].get<std::string>() + "; " + row["origin"].get<std::string>();
+    for (const json& event : listed["items"]) {
+      std::string holders;
+      for (int pid : event["holders"]) holders += " " + std::to_string(pid);
+      if (holders.empty()) holders = " no process";
+      rows[event["name"]] = event["state"].get<std::string>() + "; held by" + holders;
     }
     return rows;
   }

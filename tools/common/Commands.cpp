@@ -1,0 +1,95 @@
+#include "tools/common/Commands.h"
+
+#include <algorithm>
+
+namespace vltctl {
+namespace {
+
+constexpr const char* kComponents = "Components";
+constexpr const char* kRendezvous = "Rendezvous";
+constexpr const char* kDiagnostics = "Diagnostics";
+constexpr const char* kTool = "The command itself";
+
+constexpr Argument kShow[] = {{"GUID", nullptr, "Identifier, with or without braces", true}};
+constexpr Argument kClasses[] = {{"GUID", nullptr, "Identifier of the class", true}};
+constexpr Argument kCheck[] = {{"GUID", nullptr, "One component; all without"}};
+
+constexpr Argument kSettings[] = {
+    {"--index", "N", "Number after the names of the items; 3 without it"},
+    {"--client", nullptr, "What a client reads"},
+    {"--server", nullptr, "What the server reads"},
+    {"--name", "NAME", "NAME.ini instead of kor.ini"}};
+constexpr Argument kVerify[] = {{"FILE", nullptr, "The INI file", true, false, kFiles}};
+
+constexpr Argument kHookArm[] = {
+    {"POINT", nullptr, "Name of a point, as \"hook list\" shows it", true},
+    {"FLAG", nullptr, "hang[=MS], crash, fail, throw, exhaust", true, true,
+     "hang crash fail throw exhaust"}};
+
+constexpr Argument kCompletion[] = {{"SHELL", nullptr,
+                                     "bash, zsh or fish; \"man\" is the list of the manual", true,
+                                     false, "bash zsh fish man"}};
+
+constexpr Command kCommands[] = {
+    {kComponents, "list", "All components: type, name, GUID, schema version, file", {}},
+    {kComponents, "show", "One component", kShow},
+    {kComponents, "classes", "The experts that bind to a class of objects", kClasses},
+    {kComponents, "check", "Whether the components' files load and offer their entry points",
+     kCheck},
+    {kRendezvous, "settings", "Each setting and where it comes from", kSettings},
+    {kRendezvous, "jar", "What server and clients have left each other", {}},
+    {kRendezvous, "url", "Where the local server listens", {}},
+    {kRendezvous, "identity", "Identity of this machine's server; made if there is none", {}},
+    {kRendezvous, "verify", "A guarded INI file and its sidecar, and what the next opening does",
+     kVerify},
+    {kDiagnostics, "trace", "Where the log of this user goes, its options and last lines", {}},
+    {kDiagnostics, "events", "Named events of the machine and who holds them", {}},
+    {kDiagnostics, "hook list", "Points of fault injection", {}},
+    {kDiagnostics, "hook arm", "Arms one point for processes that refresh their hooks", kHookArm},
+    {kDiagnostics, "hook clear", "Disarms", {}},
+    {kTool, "completion", "Completion of this command for a shell", kCompletion},
+};
+
+}  // namespace
+
+std::span<const Command> Commands() { return kCommands; }
+
+const Command* FindCommand(std::string_view name) {
+  for (const Command& command : kCommands) {
+    if (name == command.name) return &command;
+  }
+  return nullptr;
+}
+
+std::vector<std::string> CommandWords() {
+  std::vector<std::string> words;
+  for (const Command& command : kCommands) {
+    std::string_view name = command.name;
+    std::string word(name.substr(0, name.find(' ')));
+    if (std::find(words.begin(), words.end(), word) == words.end()) words.push_back(word);
+  }
+  return words;
+}
+
+std::vector<std::string> WordsBelow(const std::string& word) {
+  std::vector<std::string> words;
+  for (const Command& command : Commands()) {
+    std::string name = command.name;
+    if (name.starts_with(word + " ")) words.push_back(name.substr(word.size() + 1));
+  }
+  return words;
+}
+
+std::string Synopsis(const Command& command) {
+  std::string out = command.name;
+  for (const Argument& argument : command.arguments) {
+    std::string text = argument.name;
+    if (argument.value) text += std::string(" ") + argument.value;
+    if (argument.isList) text += "...";
+    bool isOptional = !argument.isRequired;
+    out += isOptional ? " [" + text + "]" : " " + text;
+  }
+  return out;
+}
+
+}  // namespace vltctl

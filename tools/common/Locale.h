@@ -1,0 +1,13 @@
+#pragma once
+
+namespace vltctl {
+
+// Takes the locale of the environment. Where that shows nothing beyond ASCII - services and cron jobs
+// have no LANG - characters are those of C.UTF-8, so that no name is left out or garbled.
+void SetLocale();
+
+// True if the environment's locale was replaced. The library follows the locale of its process: in a
+// program that is started with this environment it does not read names beyond ASCII.
+bool LocaleWasReplaced();
+
+}  // namespace vltctl

@@ -1,0 +1,114 @@
+#include "tools/common/Output.h"
+
+#include <errno.h>
+#include <stdio.h>
+#include <string.h>
+
+#include <algorithm>
+
+#include "tools/common/Terminal.h"
+
+namespace vltctl {
+namespace {
+
+std::string Dump(const Json& value) {
+  return value.dump(-1, ' ', false, Json::error_handler_t::replace);
+}
+
+void Write(std::string_view text) { fwrite(text.data(), 1, text.size(), stdout); }
+
+Json OrNull(const std::string& text) { return text.empty() ? Json() : Json(text); }
+
+}  // namespace
+
+std::string TextOf(const Problem& problem) {
+  std::string out;
+  for (const std::string* part : {&problem.where, &problem.what, &problem.why}) {
+    if (!part->empty()) out += (out.empty() ? "" : ": ") + *part;
+  }
+  return problem.next.empty() ? out : out + "; " + problem.next;
+}
+
+void Table::add(std::vector<std::string> cells) {
+  for (std::string& cell : cells) cell = ForTerminal(cell);
+  m_rows.push_back(std::move(cells));
+}
+
+std::string Table::text() const {
+  std::vector<size_t> widths;
+  for (const auto& row : m_rows) {
+    widths.resize(std::max(widths.size(), row.size()));
+    for (size_t i = 0; i < row.size(); ++i) widths[i] = std::max(widths[i], DisplayWidth(row[i]));
+  }
+  std::string out;
+  for (const auto& row : m_rows) {
+    std::string line;
+    for (size_t i = 0; i < row.size(); ++i) {
+      line += row[i] + std::string(widths[i] - DisplayWidth(row[i]) + 2, ' ');
+    }
+    line.erase(line.find_last_not_of(' ') + 1);
+    out += line + "\n";
+  }
+  return out;
+}
+
+void Output::begin() {
+  if (m_begun) return;
+  m_begun = true;
+  Write("{\"schema\": \"vltctl/1\", \"command\": " + Dump(OrNull(m_command)) + ", \"items\": [");
+}
+
+void Output::item(const Json& item) {
+  if (!m_json) return;
+  begin();
+  Write((m_hasItems ? ",\n" : "\n") + Dump(item));
+  m_hasItems = true;
+  fflush(stdout);
+}
+
+void Output::line(std::string_view text) {
+  if (m_json) return;
+  Write(ForTerminal(text) + "\n");
+}
+
+void Output::print(const Table& table) {
+  if (!m_json) Write(table.text());
+}
+
+void Output::raw(std::string_view text) {
+  if (!m_json) Write(text);
+}
+
+void Output::note(std::string_view text) {
+  fflush(stdout);
+  fprintf(stderr, "vltctl: %s\n", ForTerminal(text).c_str());
+}
+
+void Output::problem(const Problem& problem) {
+  note(TextOf(problem));
+  m_problems.push_back({{"code", problem.code},
+                        {"where", OrNull(problem.where)},
+                        {"what", problem.what},
+                        {"why", OrNull(problem.why)},
+                        {"next", OrNull(problem.next)}});
+}
+
+int Output::finish(int code) {
+  if (m_json) {
+    begin();
+    Write((m_hasItems ? "\n], \"problems\": " : "], \"problems\": ") + Dump(m_problems) + "}\n");
+  }
+  errno = 0;
+  bool failed = fflush(stdout) != 0;
+  int error = errno;
+  if (!failed && !ferror(stdout)) return code;
+  // An earlier flush has seen the cause; it is asked for again.
+  if (!error && fputc('\n', stdout) != EOF && fflush(stdout) != 0) error = errno;
+  if (error != EPIPE) {
+    fprintf(stderr, "vltctl: standard output: cannot be written: %s; the output is incomplete\n",
+            error ? strerror(error) : "an earlier write failed");
+  }
+  return kCannotWrite;
+}
+
+}  // namespace vltctl

@@ -1,0 +1,88 @@
+#pragma once
+
+#include <exception>
+#include <nlohmann/json.hpp>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "tools/common/Commands.h"
+
+// What a command prints: text for people or, with --json, one document for programs:
+//
+//   {"schema": "vltctl/1", "command": "verify", "items": [...], "problems": [...]}
+//
+// Each item is an object of the command's own shape; tools/vltctl-1.schema.json describes all of them.
+// Numbers are numbers, and what is not there is null. It is one document on failure, too.
+namespace vltctl {
+
+using Json = nlohmann::ordered_json;
+
+// Why a command could not do what it was asked: where, what, why, and what to do. The parts are text
+// without a full stop; an empty one is left out. `code` is for programs and never changes.
+struct Problem {
+  std::string code, where, what, why, next;
+};
+
+// "where: what: why; next".
+std::string TextOf(const Problem& problem);
+
+// Ends the command with the code; Run (Program.h) reports it.
+struct Failure : std::exception {
+  Failure(ExitCode exitCode, Problem p) : code(exitCode), problem(std::move(p)) {}
+  const char* what() const noexcept override { return problem.what.c_str(); }
+  ExitCode code;
+  Problem problem;
+};
+
+// Rows that are aligned by what a terminal shows of them, without blanks at the ends of lines.
+class Table {
+ public:
+  Table() = default;
+  explicit Table(std::vector<std::string> header) { add(std::move(header)); }
+  // Cells are made safe for the terminal.
+  void add(std::vector<std::string> cells);
+  // Lines with their ends.
+  std::string text() const;
+
+ private:
+  std::vector<std::vector<std::string>> m_rows;
+};
+
+// The output of one command. With --json, text is not printed; without, items are not.
+class Output {
+ public:
+  Output(std::string command, bool json) : m_command(std::move(command)), m_json(json) {}
+  Output(const Output&) = delete;
+  Output& operator=(const Output&) = delete;
+
+  bool json() const { return m_json; }
+
+  // One element of "items", printed at once. JSON demands UTF-8; what a file holds beyond it is shown
+  // as the replacement character.
+  void item(const Json& item);
+  // One line of text, which is made safe for the terminal.
+  void line(std::string_view text);
+  void print(const Table& table);
+  // Text that is printed as it is: scripts.
+  void raw(std::string_view text);
+
+  // On standard error, in both forms, as one line.
+  void note(std::string_view text);
+  // The same, and one element of "problems".
+  void problem(const Problem& problem);
+
+  // Completes the document and writes what is still held. Returns the code, or kCannotWrite if the
+  // output could not be written; that is reported unless the reader has gone.
+  int finish(int code);
+
+ private:
+  void begin();
+
+  const std::string m_command;
+  const bool m_json;
+  bool m_begun = false, m_hasItems = false;
+  Json m_problems = Json::array();
+};
+
+}  // namespace vltctl
