@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <nlohmann/json.hpp>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -55,6 +56,21 @@ inline nlohmann::json ItemWith(const nlohmann::json& items, const std::string& m
     if (item[member] == value) return item;
   }
   return nullptr;
+}
+
+// Lines of a trace that would change something. Writing to standard output and error is allowed.
+inline std::vector<std::string> Changes(const std::string& trace) {
+  std::vector<std::string> found;
+  std::istringstream lines(trace);
+  for (std::string line; std::getline(lines, line);) {
+    if (line.find(".gcda") != std::string::npos) continue;  // the coverage build's own counters
+    for (const char* mark :
+         {"O_CREAT", "O_WRONLY", "O_RDWR", "chmod(", "fchmod(", "fchmodat(", "unlink", "rename",
+          "mkdir", "flock(", "ftruncate(", " link(", "chown(", "F_SETLK"}) {
+      if (line.find(mark) != std::string::npos) found.push_back(line);
+    }
+  }
+  return found;
 }
 
 }  // namespace vlt::test

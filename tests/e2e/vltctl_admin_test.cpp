@@ -130,21 +130,6 @@ TEST_F(VltctlAdmin, UrlAndIdentity) {
   EXPECT_EQ(Vltctl({"identity"}).out, "{00000001-0002-0003-0405-060708090A0B}\n");
 }
 
-// Lines of a trace that would change something. Writing to standard output and error is allowed.
-std::vector<std::string> Changes(const std::string& trace) {
-  std::vector<std::string> found;
-  std::istringstream lines(trace);
-  for (std::string line; std::getline(lines, line);) {
-    if (line.find(".gcda") != std::string::npos) continue;  // the coverage build's own counters
-    for (const char* mark :
-         {"O_CREAT", "O_WRONLY", "O_RDWR", "chmod(", "fchmod(", "fchmodat(", "unlink", "rename",
-          "mkdir", "flock(", "ftruncate(", " link(", "chown(", "F_SETLK"}) {
-      if (line.find(mark) != std::string::npos) found.push_back(line);
-    }
-  }
-  return found;
-}
-
 TEST_F(VltctlAdmin, LookingChangesNothingAndWaitsForNobody) {
   if (RunProgram({"strace", "-e", "trace=none", "true"}).exitCode != 0) {
     GTEST_SKIP() << "strace is missing or not permitted";

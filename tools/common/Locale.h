@@ -7,7 +7,8 @@ namespace vltctl {
 void SetLocale();
 
 // True if the environment's locale was replaced. The library follows the locale of its process: in a
-// program that is started with this environment it does not read names beyond ASCII.
+// program that is started with this environment it does not find components whose names or paths
+// go beyond ASCII.
 bool LocaleWasReplaced();
 
 }  // namespace vltctl

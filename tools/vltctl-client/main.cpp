@@ -64,14 +64,14 @@ bool IsAscii(const std::string& text) {
 // What a program started from here would not see (tools/common/Locale.h).
 void NoteLocale(const std::vector<Component>& components, Output& output) {
   if (!vltctl::LocaleWasReplaced()) return;
-  std::string names;
+  std::string unseen;
   for (const Component& c : components) {
-    if (!IsAscii(c.name + c.file)) names += (names.empty() ? "" : ", ") + c.name;
+    if (!IsAscii(c.name + c.file)) unseen += (unseen.empty() ? "" : ", ") + c.name;
   }
-  if (names.empty()) return;
+  if (unseen.empty()) return;
   output.note(
-      "the environment has no UTF-8 locale; a program that is started with it does not list: " +
-      names + "; set LANG=C.UTF-8 for it");
+      "the environment has no UTF-8 locale: a program that is started with it does not find " +
+      unseen + "; set LANG=C.UTF-8 for it");
 }
 
 void PrintOne(const Component& c, Output& output) {

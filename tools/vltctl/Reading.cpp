@@ -13,6 +13,7 @@
 #include "source/vlIniMgr.h"
 #include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
+#include "zt/posix/Files.h"
 
 using zt::posix::ScopedFd;
 
@@ -92,26 +93,19 @@ GuardedBytes ReadOnce(const std::string& file, const std::string& sidecar) {
 
 }  // namespace
 
-// Opening a pipe or a device does something to it already, so the name is first opened for looking
-// only; what it led to is then opened through that descriptor, whatever the name leads to by now.
 ScopedFd OpenRegular(const std::string& file, std::string* error) {
-  ScopedFd place(open(file.c_str(), O_PATH | O_CLOEXEC));
-  struct stat info;
-  int failed = !place.valid() || fstat(place.get(), &info) != 0 ? errno : 0;
-  if (!failed && !S_ISREG(info.st_mode)) {
-    *error = "it is no regular file";
-    errno = EINVAL;
-    return ScopedFd();
-  }
-  ScopedFd fd;
-  if (!failed) {
-    std::string link = "/proc/self/fd/" + std::to_string(place.get());
-    fd.reset(open(link.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
-    if (!fd.valid()) failed = errno;
-  }
-  if (failed) *error = strerror(failed);
+  ScopedFd fd = zt::posix::OpenExisting(file.c_str(), O_RDONLY);
+  int failed = fd ? 0 : errno;
+  if (failed) *error = WhyNotOpened(failed);
   errno = failed;
   return fd;
+}
+
+std::string WhyNotOpened(int error) {
+  if (error == EISDIR) return "it is a directory";
+  if (error == ENXIO) return "it is no regular file";
+  if (error == ELOOP) return "a symbolic link of another user leads there, or links in a circle";
+  return strerror(error);
 }
 
 GuardedBytes ReadGuarded(const std::string& file) {

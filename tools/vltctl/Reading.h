@@ -16,10 +16,11 @@ namespace admin {
 // No file of an installation comes near this size; a larger one was made to exhaust the reader.
 inline constexpr size_t kFileLimit = size_t{256} << 20;
 
-// The file for reading, if it is a regular one; links are followed. Nothing else is opened, so a pipe
-// is not waited for and a device not touched. Invalid otherwise, with errno (EINVAL for what is no
-// regular file) and why in *error.
+// The file for reading, if it is a regular one that the library opens too (zt/posix/Files.h): a pipe is not
+// waited for, a device not touched, a link of another user not followed. Invalid otherwise, with errno and
+// why in *error.
 zt::posix::ScopedFd OpenRegular(const std::string& file, std::string* error);
+std::string WhyNotOpened(int error);
 
 // A file and its sidecar as they were together at one moment.
 struct GuardedBytes {

@@ -1,0 +1,222 @@
+// vltctl where something around it is missing: space on the disk, the reader of its output, /proc, a locale.
+#include <gtest/gtest.h>
+#include <locale.h>
+#include <signal.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <filesystem>
+
+#include "tests/e2e/Start.h"
+#include "tests/e2e/Vltctl.h"
+
+namespace vlt::test {
+namespace {
+
+// An installation in which each command has something to print.
+class VltctlSurroundings : public testing::Test {
+ protected:
+  VltctlSurroundings() {
+    m_installation.addObjectExpert("Tank", "Tank", GText(1),
+                                   "{" + GText(1) + "}:1:{" + GText(9) + "}");
+    std::filesystem::create_directory(m_data);
+    WriteBytes(m_data + "/vltjar.ini",
+               "[ServerSection]\nServerIdentity={00000001-0002-0003-0405-060708090A0B}\n");
+    EXPECT_EQ(Vltctl({"list"}).exitCode, kGood);
+  }
+
+  std::vector<std::vector<std::string>> commands() const {
+    return {{"list"},
+            {"show", GText(1)},
+            {"classes", GText(9)},
+            {"settings"},
+            {"jar"},
+            {"identity"},
+            {"trace"},
+            {"hook", "list"},
+            {"--version"},
+            {"--help"},
+            {"list", "--help"},
+            {"completion", "bash"},
+            {"verify", m_installation.database()}};
+  }
+
+  Installation m_installation;
+  const std::string m_data = m_installation.root() + "/Data";
+};
+
+std::string Joined(const std::vector<std::string>& words) {
+  std::string out;
+  for (const std::string& word : words) out += word + " ";
+  return out;
+}
+
+ProgramResult InShell(const std::string& script, const std::vector<std::string>& arguments) {
+  std::vector<std::string> all = {"sh", "-c", script, "sh", kVltctl};
+  all.insert(all.end(), arguments.begin(), arguments.end());
+  return RunProgram(all);
+}
+
+TEST_F(VltctlSurroundings, AFullDiskIsAFailureOfEachCommand) {
+  for (std::vector<std::string> command : commands()) {
+    for (bool json : {false, true}) {
+      if (json) command.push_back("--json");
+      ProgramResult result = InShell("exec \"$@\" >/dev/full", command);
+      EXPECT_EQ(result.exitCode, kCannotWrite) << Joined(command);
+      EXPECT_EQ(
+          result.err,
+          "vltctl: standard output: cannot be written: No space left on device; the output is "
+          "incomplete\n")
+          << Joined(command);
+    }
+  }
+}
+
+// The reader has gone, as "head" does.
+int EndWithoutReader(const std::vector<std::string>& command, bool signalIsIgnored,
+                     const std::string& errors) {
+  Child child([&]() -> int {
+    int ends[2];
+    if (pipe(ends) != 0) return 97;
+    close(ends[0]);
+    dup2(ends[1], 1);
+    FILE* err = freopen(errors.c_str(), "w", stderr);
+    if (!err) return 97;
+    signal(SIGPIPE, signalIsIgnored ? SIG_IGN : SIG_DFL);
+    std::vector<char*> argv = {const_cast<char*>(kVltctl.c_str())};
+    for (const std::string& word : command) argv.push_back(const_cast<char*>(word.c_str()));
+    argv.push_back(nullptr);
+    execv(argv[0], argv.data());
+    return 97;
+  });
+  return child.wait();
+}
+
+TEST_F(VltctlSurroundings, AReaderThatHasGoneEndsEachCommandQuietly) {
+  TempDir dir;
+  for (const std::vector<std::string>& command : commands()) {
+    EXPECT_EQ(EndWithoutReader(command, false, dir / "err"), 128 + SIGPIPE) << Joined(command);
+    EXPECT_EQ(ReadBytes(dir / "err"), "") << Joined(command);
+    EXPECT_EQ(EndWithoutReader(command, true, dir / "err"), kCannotWrite) << Joined(command);
+    EXPECT_EQ(ReadBytes(dir / "err"), "") << Joined(command);
+  }
+}
+
+// In a mount name space of its own, with nothing in /proc. Its mount is made private before, so that the
+// machine keeps its own.
+std::vector<std::string> WithoutProc(const std::string& script) {
+  return {"unshare",
+          "--mount",
+          "--propagation",
+          "unchanged",
+          "sh",
+          "-c",
+          "mount --make-rprivate /proc && mount -t tmpfs none /proc && " + script,
+          "sh"};
+}
+
+bool CanHideProc() { return RunProgram(WithoutProc("test ! -e /proc/self")).exitCode == 0; }
+
+TEST_F(VltctlSurroundings, NoCommandNeedsProc) {
+  if (!CanHideProc()) GTEST_SKIP() << "NOT TESTED: /proc cannot be hidden here";
+  auto all = commands();
+  all.push_back({"check"});
+  all.push_back({"events"});
+  for (const std::vector<std::string>& command : all) {
+    ProgramResult with = Vltctl(command);
+    std::vector<std::string> words = WithoutProc("exec \"$@\"");
+    words.push_back(kVltctl);
+    words.insert(words.end(), command.begin(), command.end());
+    ProgramResult hidden = RunProgram(words);
+    EXPECT_EQ(hidden.exitCode, with.exitCode) << Joined(command) << hidden.err;
+    EXPECT_EQ(hidden.err, with.err) << Joined(command);
+    size_t compared =
+        std::min(with.out.find("; scanned"), with.out.size());  // what follows is a time
+    EXPECT_EQ(hidden.out.substr(0, compared), with.out.substr(0, compared)) << Joined(command);
+  }
+}
+
+TEST_F(VltctlSurroundings, WithoutProcARelativeNameFindsTheClientToo) {
+  if (!CanHideProc()) GTEST_SKIP() << "NOT TESTED: /proc cannot be hidden here";
+  std::vector<std::string> words = WithoutProc("cd \"$(dirname \"$1\")\" && exec ./vltctl list");
+  words.push_back(kVltctl);
+  ProgramResult result = RunProgram(words);
+  EXPECT_EQ(result.exitCode, kGood) << result.err;
+}
+
+// ---- What does not need the library
+
+TEST_F(VltctlSurroundings, HelpAndVersionTouchNothing) {
+  if (RunProgram({"strace", "-e", "trace=none", "true"}).exitCode != 0) {
+    GTEST_SKIP() << "strace is missing or not permitted";
+  }
+  TempDir dir;
+  for (const std::vector<std::string>& command :
+       {std::vector<std::string>{"--help"}, {"--version"}, {"check", "--help"}, {"lsit"}, {}}) {
+    std::vector<std::string> traced = {"strace", "-f", "-o", dir / "trace", kVltctl};
+    traced.insert(traced.end(), command.begin(), command.end());
+    RunProgram(traced, {{"ASAN_OPTIONS", "detect_leaks=0"}});
+    std::string trace = ReadBytes(dir / "trace");
+    std::vector<std::string> changes = Changes(trace);
+    EXPECT_TRUE(changes.empty()) << Joined(command) << changes[0];
+    EXPECT_EQ(trace.find("libvltutils"), std::string::npos) << Joined(command);
+    EXPECT_EQ(trace.find("com.zentrex.kor.ini"), std::string::npos) << Joined(command);
+  }
+}
+
+// ---- The locale
+
+class VltctlSurroundingsLocale : public testing::Test {
+ protected:
+  VltctlSurroundingsLocale() {
+    m_installation.addObjectExpert(
+        "Gr\xC3\xB6\xC3\x9F"
+        "e",
+        "Path", GText(1));
+    m_installation.addObjectExpert("Plain", "N\xC3\xA4me", GText(2));
+    m_installation.addObjectExpert("Ascii", "Ascii", GText(3));
+  }
+  ProgramResult listed() const {
+    return RunProgram({"env", "-u", "LANG", "-u", "LC_ALL", "-u", "LC_CTYPE", kVltctl, "list"});
+  }
+  Installation m_installation;
+};
+
+TEST_F(VltctlSurroundingsLocale, WithoutOneAllIsListedAndWhatTheLibraryMissesIsSaid) {
+  ProgramResult result = listed();
+  EXPECT_EQ(result.exitCode, kGood);
+  EXPECT_NE(result.out.find("/Experts/Gr\xC3\xB6\xC3\x9F"
+                            "e.vle\n"),
+            std::string::npos)
+      << result.out;
+  EXPECT_NE(result.out.find("N\xC3\xA4me"), std::string::npos) << result.out;
+  EXPECT_EQ(
+      result.err,
+      "vltctl: the environment has no UTF-8 locale: a program that is started with it does not "
+      "find Path, N\xC3\xA4me; set LANG=C.UTF-8 for it\n");
+}
+
+// What the notes say is so.
+TEST_F(VltctlSurroundingsLocale, TheLibraryMissesThemInTheCLocale) {
+  ExpectInChild([] {
+    setlocale(LC_ALL, "C");
+    IvltRegistrar* registrar = nullptr;
+    ASSERT_EQ(GetRegistrar(&registrar), "ok");
+    _vltComponent2 record;
+    memset(&record, 0, sizeof record);
+    EXPECT_LT(registrar->GetComponent(G(1), &record), 0);
+    EXPECT_LT(registrar->GetComponent(G(2), &record), 0);
+    EXPECT_EQ(registrar->GetComponent(G(3), &record), S_OK);
+    vltutilsFreeComponent2(record);
+    registrar->Release();
+  });
+}
+
+TEST_F(VltctlSurroundingsLocale, WithOneThereIsNothingToSay) {
+  ProgramResult result = Vltctl({"list"}, {{"LC_ALL", "C.UTF-8"}});
+  EXPECT_EQ(result.exitCode, kGood);
+  EXPECT_EQ(result.err, "");
+}
+
+}  // namespace
+}  // namespace vlt::test
