@@ -26,6 +26,33 @@ struct GuardedIniKind {
   const char* sealedPoint;   // the sidecar is written
 };
 
+// What a guarded file and its sidecar are like, and what the next opening makes of them.
+struct GuardedIniState {
+  enum class Kind {
+    Sound,              // the digest matches
+    NoSidecar,          // nor anything that counts as one
+    FirstSave,          // the sidecar is the mark of a first save that has not ended
+    DigestDiffers,      // a save that has not ended, or a change by hand
+    Missing,            // there is no file
+    Unparsable,         // in an encoding that cannot be read
+    UnparsableChanged,  // the same, and the digest differs
+    Unreadable,         // not to be opened or read now; nothing is known of the contents
+    SidecarShort,
+    SidecarDirectory,
+    SidecarUnreadable,
+  };
+  enum class Opening {
+    Takes,               // the file as it is
+    Begins,              // an empty file
+    SetsAsideAndBegins,  // moves the file aside and begins an empty one
+    SetsAsideAndFails,   // moves it aside and fails; the opening after it begins an empty one
+    Fails,               // and leaves everything
+  };
+  Kind kind;
+  Opening opening;
+  int error = 0;  // errno of what is Unreadable, if it is known
+};
+
 // An INI file with its sidecar (source/IniSidecar.h): how both are opened, saved and set aside.
 //
 //   found at open              | *out              | result
@@ -54,6 +81,10 @@ class GuardedIniFile {
   // the sidecar if that cannot be written: the file is the new one then, and the next opening takes
   // it.
   HRESULT save(CvlIniMgr& ini) const;
+
+  // What open() would find and do, by the same judges, without the lock and without a change: while
+  // another process saves, the answer may be of no moment at all. Throws std::bad_alloc.
+  GuardedIniState inspect() const;
 
   // Renames the file and removes the sidecar (CvlIniMgr::SetAside). E_FAIL where the system
   // refuses. The caller holds the file's lock.

@@ -170,7 +170,7 @@ void CvlIniMgr::GetMD5Checksum(const unsigned char* data, unsigned long lengthBy
   md5.getDigest(digest);
 }
 
-bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest) const {
+bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest) {
   if (!digest) return true;
   // What cannot be checked is not accepted.
   return vlt::Attempt<std::bad_alloc>([&] {
@@ -182,26 +182,61 @@ bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest) const {
   });
 }
 
+namespace {
+
+struct DisposeIni {
+  void operator()(IniStructForwardReferenceTag* document) const { IniDispose(document); }
+};
+using OwnedIni = std::unique_ptr<IniStructForwardReferenceTag, DisposeIni>;
+
+// Empty, with the options that every guarded file is read with; null without memory.
+OwnedIni NewDocument() {
+  OwnedIni fresh(IniNew(0));
+  if (fresh) IniSetReadOptions(fresh.get(), kReadOptions);
+  return fresh;
+}
+
+int ErrorOf(int fd, int32_t status) {
+  struct stat info;
+  if (status == kIniOutOfMemory) return ENOMEM;
+  if (fstat(fd, &info) != 0) return errno;
+  if (S_ISDIR(info.st_mode)) return EISDIR;
+  return info.st_size > ztini::kLargestFileBytes ? EFBIG : 0;
+}
+
+}  // namespace
+
+CvlIniMgr::Finding CvlIniMgr::Inspect(const std::string& fileName, const unsigned char* digest) {
+  ScopedFd fd = OpenForReading(fileName);
+  if (!fd) {
+    int error = errno;
+    return {error == ENOENT ? Found::Missing : Found::NotReadable, error};
+  }
+  if (!ValidateFile(fd.get(), digest)) return {Found::OtherDigest};
+  OwnedIni document = NewDocument();
+  int32_t status = document ? IniReadFromDescriptor(document.get(), fileName.c_str(), fd.get())
+                            : kIniOutOfMemory;
+  if (status == 0) return {Found::Readable};
+  if (ConcernsTheContents(status)) return {Found::NoIniFile};
+  return {Found::NotReadable, ErrorOf(fd.get(), status)};
+}
+
 int32_t CvlIniMgr::InitializeIniBindings() {
   ScopedFd fd = OpenForReading(m_fileName);
   return readDocument(fd.get());
 }
 
 int32_t CvlIniMgr::readDocument(int fd) {
-  IniStructForwardReferenceTag* fresh = IniNew(0);
+  OwnedIni fresh = NewDocument();
   if (!fresh) return kIniOutOfMemory;
-  IniSetReadOptions(fresh, kReadOptions);
-  IniSetWriteOptions(fresh, kNoLineLimit, ' ', kWriteOptions);
-  IniSetDurability(fresh, m_durability);
-  int32_t status = IniReadFromDescriptor(fresh, m_fileName.c_str(), fd);
+  IniSetWriteOptions(fresh.get(), kNoLineLimit, ' ', kWriteOptions);
+  IniSetDurability(fresh.get(), m_durability);
+  int32_t status = IniReadFromDescriptor(fresh.get(), m_fileName.c_str(), fd);
   // What is held stays, whatever the status: the next save would otherwise replace the file by
   // less.
-  if (m_ini && status != 0) {
-    IniDispose(fresh);
-    return status;
-  }
+  if (m_ini && status != 0) return status;
   DisposeDocument();
-  m_ini = fresh;
+  m_ini = fresh.release();
   return status;
 }
 

@@ -109,10 +109,19 @@ class CvlIniMgr {
   // throws; a directory in the sidecar's place that cannot be moved leaves the file.
   static void SetAside(const zt::fnd::String& fileName);
 
+  // What a construction would find, by the same judges, without the lock and without changing
+  // anything. `digest`: 16 bytes or null for no check.
+  enum class Found { Readable, Missing, OtherDigest, NoIniFile, NotReadable };
+  struct Finding {
+    Found found;
+    int error = 0;  // why it is NotReadable: errno, or 0 if that is not known
+  };
+  static Finding Inspect(const std::string& fileName, const unsigned char* digest);
+
  private:
   void Initialize(unsigned char const* digest);
   void CreateFile();
-  bool ValidateFile(int fd, unsigned char const* digest) const;
+  static bool ValidateFile(int fd, unsigned char const* digest);
   static int32_t GetFileLength(int fd);
   static void GetMD5Checksum(const unsigned char* data, unsigned long lengthBytes,
                              unsigned char* digest);

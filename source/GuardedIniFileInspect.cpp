@@ -1,0 +1,60 @@
+#include <errno.h>
+#include <sys/stat.h>
+
+#include "source/GuardedIniFile.h"
+#include "zt/posix/Files.h"
+
+namespace {
+
+using Kind = GuardedIniState::Kind;
+using Opening = GuardedIniState::Opening;
+using Found = CvlIniMgr::Found;
+
+bool IsDirectory(const std::string& path) {
+  zt::posix::ScopedFd found = zt::posix::LookUp(path.c_str(), false);
+  struct stat info;
+  return found && fstat(found.get(), &info) == 0 && S_ISDIR(info.st_mode);
+}
+
+// Of a file whose digest is the expected one, or of which none is expected; `taken` is its kind where
+// it can be parsed.
+GuardedIniState Judge(const CvlIniMgr::Finding& finding, Kind taken) {
+  switch (finding.found) {
+    case Found::Readable:
+      return {taken, Opening::Takes};
+    case Found::Missing:
+      return {Kind::Missing, Opening::Begins};
+    case Found::NoIniFile:
+      return {Kind::Unparsable, Opening::SetsAsideAndBegins};
+    default:
+      return {Kind::Unreadable, Opening::Fails, finding.error};
+  }
+}
+
+// The first opening has failed over the digest. The second one expects none, and where it sets
+// the file aside there is no third.
+GuardedIniState JudgeChanged(const CvlIniMgr::Finding& finding, bool isMark) {
+  GuardedIniState state = Judge(finding, isMark ? Kind::FirstSave : Kind::DigestDiffers);
+  if (state.kind != Kind::Unparsable) return state;
+  return {Kind::UnparsableChanged, Opening::SetsAsideAndFails};
+}
+
+}  // namespace
+
+GuardedIniState GuardedIniFile::inspect() const {
+  IniSidecar::Digest digest;
+  switch (IniSidecar::Read(m_sidecar, &digest)) {
+    case IniSidecar::State::Unreadable:
+      return {Kind::SidecarUnreadable, Opening::Fails, errno};
+    case IniSidecar::State::Short:
+      return {IsDirectory(m_sidecar) ? Kind::SidecarDirectory : Kind::SidecarShort,
+              Opening::SetsAsideAndFails};
+    case IniSidecar::State::Missing:
+      return Judge(CvlIniMgr::Inspect(m_file, nullptr), Kind::NoSidecar);
+    case IniSidecar::State::Present:
+      break;
+  }
+  CvlIniMgr::Finding finding = CvlIniMgr::Inspect(m_file, digest.data());
+  if (finding.found != Found::OtherDigest) return Judge(finding, Kind::Sound);
+  return JudgeChanged(CvlIniMgr::Inspect(m_file, nullptr), digest == IniSidecar::kInvalidMark);
+}
