@@ -62,39 +62,6 @@ TEST_F(VltctlAdmin, JarTellsItsSections) {
   EXPECT_NE(Vltctl({"jar"}).out.find("ServerProcessID"), std::string::npos);
 }
 
-TEST_F(VltctlAdmin, VerifyNamesTheRow) {
-  struct Case {
-    std::string bytes, sidecar, found;
-    int code;
-  };
-  const std::string good = "[a]\nb = 1\n";
-  TempDir dir;
-  WriteBytes(dir / "good", good);
-  std::string digest;
-  std::string hex = Md5Sum(dir / "good");
-  for (size_t i = 0; i < hex.size(); i += 2) {
-    digest += static_cast<char>(std::stoi(hex.substr(i, 2), nullptr, 16));
-  }
-  const Case cases[] = {
-      {good, "", "there is no sidecar", 0},
-      {good, digest, "the digest matches", 0},
-      {good, std::string(16, 'x'), "the digest differs", 0},
-      {good, std::string(16, '0'), "the sidecar is the mark of a first save under way", 0},
-      {good, "short", "the sidecar is short", 3},
-      {"\xFF\xFE[", "", "the file cannot be parsed", 3}};
-  for (const Case& c : cases) {
-    WriteBytes(dir / "x.ini", c.bytes);
-    std::filesystem::remove(dir / "x.vl5");
-    if (!c.sidecar.empty()) WriteBytes(dir / "x.vl5", c.sidecar);
-    EXPECT_EQ(VltctlJson({"verify", dir / "x.ini"}).items.at(0)["found"], c.found);
-    EXPECT_EQ(Vltctl({"verify", dir / "x.ini"}).exitCode, c.code) << c.found;
-    EXPECT_EQ(ReadBytes(dir / "x.ini"), c.bytes);
-  }
-  EXPECT_EQ(Vltctl({"verify", dir / "none.ini"}).exitCode, 1);
-  EXPECT_EQ(Vltctl({"verify", dir.path()}).exitCode, 3);
-  EXPECT_EQ(Vltctl({"verify"}).exitCode, 2);
-}
-
 TEST_F(VltctlAdmin, HookIsArmedAndCleared) {
   std::string file = installation.root() + "/VLTHooks.ini";
   std::string point = "TestHookNT\"./source/Common/vltDuplicateString2\"19";

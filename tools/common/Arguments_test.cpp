@@ -52,7 +52,7 @@ TEST(Arguments, WhatIsWrongSaysWhatToDo) {
       {{"list", "more"},
        "The following argument was not expected: more",
        "see \"vltctl list --help\""},
-      {{"verify"}, "FILE is required", "see \"vltctl verify --help\""}};
+      {{"show"}, "GUID is required", "see \"vltctl show --help\""}};
   for (const WrongRow& row : rows) {
     Parsed parsed = Parse(row.words);
     EXPECT_EQ(parsed.kind, Parsed::Kind::Wrong) << row.what;

@@ -19,7 +19,13 @@ constexpr Argument kSettings[] = {
     {"--client", nullptr, "What a client reads"},
     {"--server", nullptr, "What the server reads"},
     {"--name", "NAME", "NAME.ini instead of kor.ini"}};
-constexpr Argument kVerify[] = {{"FILE", nullptr, "The INI file", true, false, kFiles}};
+constexpr Argument kVerify[] = {
+    {"--all", nullptr, "The database, the jar and the settings; so it is without files too"},
+    {"FILE", nullptr, "An INI file", false, true, kFiles}};
+constexpr Argument kRepair[] = {
+    {"--all", nullptr, "The database, the jar and the settings; so it is without files too"},
+    {"--dry-run", nullptr, "Say what would be done; exit code 1 if it is anything"},
+    {"FILE", nullptr, "An INI file", false, true, kFiles}};
 
 constexpr Argument kHookArm[] = {
     {"POINT", nullptr, "Name of a point, as \"hook list\" shows it", true},
@@ -40,8 +46,11 @@ constexpr Command kCommands[] = {
     {kRendezvous, "jar", "What server and clients have left each other", {}},
     {kRendezvous, "url", "Where the local server listens", {}},
     {kRendezvous, "identity", "Identity of this machine's server; made if there is none", {}},
-    {kRendezvous, "verify", "A guarded INI file and its sidecar, and what the next opening does",
+    {kRendezvous, "verify", "Guarded INI files and their sidecars, and what the next opening does",
      kVerify},
+    {kRendezvous, "repair",
+     "Makes guarded INI files such that the next opening takes them; keeps a copy of each",
+     kRepair},
     {kDiagnostics, "trace", "Where the log of this user goes, its options and last lines", {}},
     {kDiagnostics, "events", "Named events of the machine and who holds them", {}},
     {kDiagnostics, "hook list", "Points of fault injection", {}},

@@ -1,11 +1,5 @@
-// settings, jar, verify: what the guarded files say.
-#include <algorithm>
-
-#include "source/Cmd5vlt.h"
-#include "source/Common/vltFileSecurity.h"
-#include "source/IniSidecar.h"
+// settings, jar: what the guarded files say.
 #include "source/Utilities/vltSettingsKeys.h"
-#include "source/vlIniMgr.h"
 #include "tools/vltctl/Reading.h"
 #include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/String.h"
@@ -97,58 +91,6 @@ int Jar(const Arguments&, Output& output) {
   }
   output.print(table);
   return document.status() < 0 ? vltctl::kDataUnusable : vltctl::kGood;
-}
-
-namespace {
-
-struct Verdict {
-  const char* found;
-  const char* nextOpen;
-  vltctl::ExitCode code;
-};
-
-std::string Md5(const std::string& bytes) {
-  unsigned char digest[IniSidecar::kSizeBytes];
-  Cmd5vlt md5;
-  md5.addString(reinterpret_cast<const unsigned char*>(bytes.data()),
-                static_cast<unsigned>(bytes.size()));
-  md5.getDigest(digest);
-  return std::string(reinterpret_cast<char*>(digest), sizeof digest);
-}
-
-constexpr const char* kTaken = "takes the file as it is";
-constexpr const char* kSetAside = "sets the file aside as .bad and begins an empty one";
-
-Verdict Judge(const GuardedBytes& read) {
-  if (read.state == GuardedBytes::State::Missing) {
-    return {"the file is missing", "makes an empty file", vltctl::kNotFound};
-  }
-  if (read.state == GuardedBytes::State::Unreadable) {
-    return {"the file cannot be opened", "fails and leaves the file", vltctl::kDataUnusable};
-  }
-  if (read.sidecar && read.sidecar->size() < IniSidecar::kSizeBytes) {
-    return {"the sidecar is short", kSetAside, vltctl::kDataUnusable};
-  }
-  if (Document(read.bytes).status() < 0) {
-    return {"the file cannot be parsed", kSetAside, vltctl::kDataUnusable};
-  }
-  if (!read.sidecar) return {"there is no sidecar", kTaken, vltctl::kGood};
-  std::string digest = read.sidecar->substr(0, IniSidecar::kSizeBytes);
-  if (digest == Md5(read.bytes)) return {"the digest matches", kTaken, vltctl::kGood};
-  if (std::equal(digest.begin(), digest.end(), IniSidecar::kInvalidMark.begin())) {
-    return {"the sidecar is the mark of a first save under way", kTaken, vltctl::kGood};
-  }
-  return {"the digest differs", kTaken, vltctl::kGood};
-}
-
-}  // namespace
-
-int Verify(const Arguments& arguments, Output& output) {
-  std::string file = arguments.text("FILE");
-  Verdict verdict = Judge(ReadGuarded(file));
-  output.item({{"file", file}, {"found", verdict.found}, {"nextOpen", verdict.nextOpen}});
-  output.line(file + ": " + verdict.found + "; the next open " + verdict.nextOpen);
-  return verdict.code;
 }
 
 }  // namespace admin

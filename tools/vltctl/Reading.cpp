@@ -9,7 +9,6 @@
 
 #include <algorithm>
 
-#include "source/IniSidecar.h"
 #include "source/vlIniMgr.h"
 #include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
@@ -64,31 +63,11 @@ int ReadAll(const std::string& file, std::string* bytes, std::string* error) {
   if (!failed && !large) failed = Append(fd.get(), kFileLimit + 1, bytes);
   if (large || bytes->size() > kFileLimit) {
     bytes->clear();
-    *error = "it is larger than 256 MiB, which no file of an installation is";
+    *error = kTooLarge;
     return EFBIG;
   }
   if (failed) *error = strerror(failed);
   return failed;
-}
-
-// A sidecar counts by its first bytes only, however many it has.
-std::optional<std::string> ReadSidecar(const std::string& file) {
-  std::string ignored, digest;
-  ScopedFd fd = OpenRegular(file, &ignored);
-  if (!fd.valid() || Append(fd.get(), IniSidecar::kSizeBytes, &digest) != 0) return std::nullopt;
-  return digest;
-}
-
-GuardedBytes ReadOnce(const std::string& file, const std::string& sidecar) {
-  GuardedBytes out;
-  int error = ReadAll(file, &out.bytes, &out.error);
-  out.sidecar = ReadSidecar(sidecar);
-  if (error == 0) {
-    out.state = GuardedBytes::State::Read;
-  } else if (error != ENOENT) {
-    out.state = GuardedBytes::State::Unreadable;
-  }
-  return out;
 }
 
 }  // namespace
@@ -108,14 +87,23 @@ std::string WhyNotOpened(int error) {
   return strerror(error);
 }
 
-GuardedBytes ReadGuarded(const std::string& file) {
+void ReadBetweenSaves(const std::string& file, const std::function<void()>& read) {
   std::string sidecar = CvlIniMgr::SidecarName(file);
-  GuardedBytes out;
   for (int i = 0; i < kTornReadsTolerated; ++i) {
     Stamp before = StampOf(file), sidecarBefore = StampOf(sidecar);
-    out = ReadOnce(file, sidecar);
+    read();
     if (StampOf(file) == before && StampOf(sidecar) == sidecarBefore) break;
   }
+}
+
+GuardedBytes ReadGuarded(const std::string& file) {
+  GuardedBytes out;
+  ReadBetweenSaves(file, [&] {
+    out = GuardedBytes();
+    int error = ReadAll(file, &out.bytes, &out.error);
+    if (error == 0) out.state = GuardedBytes::State::Read;
+    if (error != 0 && error != ENOENT) out.state = GuardedBytes::State::Unreadable;
+  });
   return out;
 }
 

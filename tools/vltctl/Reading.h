@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <optional>
 #include <string>
 #include <utility>
@@ -15,6 +16,8 @@ namespace admin {
 
 // No file of an installation comes near this size; a larger one was made to exhaust the reader.
 inline constexpr size_t kFileLimit = size_t{256} << 20;
+inline constexpr const char* kTooLarge =
+    "it is larger than 256 MiB, which no file of an installation is";
 
 // The file for reading, if it is a regular one that the library opens too (zt/posix/Files.h): a pipe is not
 // waited for, a device not touched, a link of another user not followed. Invalid otherwise, with errno and
@@ -22,16 +25,19 @@ inline constexpr size_t kFileLimit = size_t{256} << 20;
 zt::posix::ScopedFd OpenRegular(const std::string& file, std::string* error);
 std::string WhyNotOpened(int error);
 
-// A file and its sidecar as they were together at one moment.
+// Reads a guarded file, and again if another process has written it or its sidecar in between; at most
+// twenty times.
+void ReadBetweenSaves(const std::string& file, const std::function<void()>& read);
+
+// A guarded file as it was at one moment.
 struct GuardedBytes {
   enum class State { Missing, Unreadable, Read };
   State state = State::Missing;
   std::string error;  // why it is unreadable
   std::string bytes;
-  std::optional<std::string> sidecar;  // its first bytes, as many as count
 };
 
-// A file beyond kFileLimit is unreadable. Reads file and sidecar again if another process writes them in between.
+// A file beyond kFileLimit is unreadable.
 GuardedBytes ReadGuarded(const std::string& file);
 
 // A document read from bytes, and its status (ztini.h).
@@ -75,6 +81,7 @@ using vltctl::Output;
 int Settings(const Arguments& arguments, Output& output);
 int Jar(const Arguments& arguments, Output& output);
 int Verify(const Arguments& arguments, Output& output);
+int Repair(const Arguments& arguments, Output& output);
 int Trace(const Arguments& arguments, Output& output);
 int Events(const Arguments& arguments, Output& output);
 int HookList(const Arguments& arguments, Output& output);

@@ -56,11 +56,11 @@ int BecomeClient(char** argv, Output& output) {
 
 int main(int argc, char** argv) {
   const vltctl::Handler handlers[] = {
-      {"settings", admin::Settings},     {"jar", admin::Jar},
-      {"verify", admin::Verify},         {"trace", admin::Trace},
-      {"events", admin::Events},         {"hook list", admin::HookList},
-      {"hook arm", admin::HookArm},      {"hook clear", admin::HookClear},
-      {"completion", admin::Completion},
+      {"settings", admin::Settings},    {"jar", admin::Jar},
+      {"verify", admin::Verify},        {"repair", admin::Repair},
+      {"trace", admin::Trace},          {"events", admin::Events},
+      {"hook list", admin::HookList},   {"hook arm", admin::HookArm},
+      {"hook clear", admin::HookClear}, {"completion", admin::Completion},
   };
   return vltctl::Run(argc, argv, handlers, admin::BecomeClient);
 }
