@@ -40,11 +40,6 @@ using zt::posix::ScopedFd;
 
 namespace {
 
-constexpr int32_t kReadOptions =
-    kIniReadDoubleQuotes | kIniReadSingleQuotes | 16;  // 16 is idle here
-constexpr int32_t kWriteOptions = kIniWriteSafely | kIniWriteSpaces | kIniWriteTight;
-constexpr int32_t kNoLineLimit = -1;
-constexpr int32_t kQuotesOn = 1;
 constexpr mode_t kNewFileMode = 0666;
 
 ScopedFd OpenForReading(const std::string& fileName) {
@@ -62,17 +57,6 @@ bool ReadWhole(int fd, int32_t lengthBytes, std::vector<unsigned char>* data) {
   return zt::fnd::osdep::BinaryFile::ReadExactSize(fd, data->data(), data->size()) >= 0;
 }
 
-HRESULT CopyOut(const char* value, char** out) {
-  // The caller has sized the buffer, by contract.
-  strcpy(*out, value);
-  return S_OK;
-}
-
-HRESULT CopyOut(const char* value, std::string* out) {
-  *out = value;
-  return S_OK;
-}
-
 void SetAsideIfPossible(const std::string& fileName) {
   // The caller is about to throw anyway; a file that cannot be set aside is met again next time.
   vlt::Attempt<zt::fnd::exception::Exception>(
@@ -83,17 +67,14 @@ void MoveAside(const std::string& file, const std::string& stamp) {
   if (zt::posix::MoveAside(file.c_str(), stamp.c_str()) != 0) ZT_RAISE(PosixError());
 }
 
-bool IsNull(char** out) { return !out || !*out; }
-bool IsNull(const std::string* out) { return !out; }
-
 }  // namespace
 
 CvlIniMgr::CvlIniMgr(char const* fileName, bool lockOnly, unsigned char const* expectedChecksum,
                      bool saveOnDestroy, bool useEscapes)
-    : m_fileName(fileName),
+    : IniDocument(useEscapes),
+      m_fileName(fileName),
       m_lockOnly(lockOnly),
-      m_saveOnDestroy(saveOnDestroy),
-      m_useEscapes(useEscapes) {
+      m_saveOnDestroy(saveOnDestroy) {
   Initialize(expectedChecksum);
 }
 
@@ -116,7 +97,7 @@ CvlIniMgr CvlIniMgr::LockOnly(const std::string& fileName) {
 CvlIniMgr::~CvlIniMgr() {
   if (m_lockOnly) return;
   if (m_ini && m_saveOnDestroy) Write();
-  DisposeDocument();
+  Dispose();
   // A destructor cannot report it; the next opening sets the mode again.
   vlt::Attempt<std::exception>(
       [&] { vlrSetFileSecurity(String(m_fileName.c_str()), kSharedMode); });
@@ -189,13 +170,6 @@ struct DisposeIni {
 };
 using OwnedIni = std::unique_ptr<IniStructForwardReferenceTag, DisposeIni>;
 
-// Empty, with the options that every guarded file is read with; null without memory.
-OwnedIni NewDocument() {
-  OwnedIni fresh(IniNew(0));
-  if (fresh) IniSetReadOptions(fresh.get(), kReadOptions);
-  return fresh;
-}
-
 int ErrorOf(int fd, int32_t status) {
   struct stat info;
   if (status == kIniOutOfMemory) return ENOMEM;
@@ -213,7 +187,7 @@ CvlIniMgr::Finding CvlIniMgr::Inspect(const std::string& fileName, const unsigne
     return {error == ENOENT ? Found::Missing : Found::NotReadable, error};
   }
   if (!ValidateFile(fd.get(), digest)) return {Found::OtherDigest};
-  OwnedIni document = NewDocument();
+  OwnedIni document(NewDocument());
   int32_t status = document ? IniReadFromDescriptor(document.get(), fileName.c_str(), fd.get())
                             : kIniOutOfMemory;
   if (status == 0) return {Found::Readable};
@@ -227,15 +201,14 @@ int32_t CvlIniMgr::InitializeIniBindings() {
 }
 
 int32_t CvlIniMgr::readDocument(int fd) {
-  OwnedIni fresh = NewDocument();
+  OwnedIni fresh(NewDocument());
   if (!fresh) return kIniOutOfMemory;
-  IniSetWriteOptions(fresh.get(), kNoLineLimit, ' ', kWriteOptions);
   IniSetDurability(fresh.get(), m_durability);
   int32_t status = IniReadFromDescriptor(fresh.get(), m_fileName.c_str(), fd);
   // What is held stays, whatever the status: the next save would otherwise replace the file by
   // less.
   if (m_ini && status != 0) return status;
-  DisposeDocument();
+  Dispose();
   m_ini = fresh.release();
   return status;
 }
@@ -245,14 +218,9 @@ void CvlIniMgr::SetDurability(IniDurability durability) {
   if (m_ini) IniSetDurability(m_ini, durability);
 }
 
-void CvlIniMgr::DisposeDocument() {
-  IniDispose(m_ini);
-  m_ini = nullptr;
-}
-
 void CvlIniMgr::CleanupAndThrow(bool setAside) {
   if (m_ini) {
-    DisposeDocument();
+    Dispose();
     if (setAside) SetAsideIfPossible(m_fileName);
   }
   m_lock.reset();
@@ -383,100 +351,4 @@ HRESULT CvlIniMgr::WriteAndGetChecksum(unsigned char** digest) {
   if (!*digest) return E_OUTOFMEMORY;
   memcpy(*digest, written.data(), written.size());
   return result;
-}
-
-namespace {
-
-// The value as stored, or decoded; null when absent.
-const char* Value(IniStructForwardReferenceTag* document, const char* section, const char* item,
-                  bool decoded) {
-  const char* value = nullptr;
-  int32_t status = decoded ? IniGetPointerToString(document, section, item, &value)
-                           : IniGetPointerToRawString(document, section, item, &value);
-  return status == 1 ? value : nullptr;
-}
-
-template <class Out>
-HRESULT GetValue(IniStructForwardReferenceTag* document, const char* section, const char* item,
-                 bool decoded, Out* out) {
-  if (!section || !item || IsNull(out)) return E_POINTER;
-  const char* value = Value(document, section, item, decoded);
-  // Sections and items that are missing are not distinguished: callers ask for the value.
-  return value ? CopyOut(value, out) : E_FAIL;
-}
-
-template <class Out>
-HRESULT GetSectionName(IniStructForwardReferenceTag* document, int n, Out* out) {
-  if (IsNull(out)) return E_POINTER;
-  const char* name = nullptr;
-  return IniNthSectionName(document, n, &name) == 1 ? CopyOut(name, out) : E_FAIL;
-}
-
-template <class Out>
-HRESULT GetItemName(IniStructForwardReferenceTag* document, const char* section, int n, Out* out) {
-  if (!section || IsNull(out)) return E_POINTER;
-  const char* name = nullptr;
-  return IniNthItemName(document, section, n, &name) == 1 ? CopyOut(name, out) : E_FAIL;
-}
-
-}  // namespace
-
-HRESULT CvlIniMgr::GetItem(char const* section, char const* item, char** out) const {
-  return GetValue(m_ini, section, item, m_useEscapes, out);
-}
-
-HRESULT CvlIniMgr::GetItem(char const* section, char const* item, std::string* out) const {
-  return GetValue(m_ini, section, item, m_useEscapes, out);
-}
-
-HRESULT CvlIniMgr::SetItem(char const* section, char const* item, char const* value, bool quote) {
-  if (!section || !item || !value) return E_POINTER;
-  if (IniPutStringWithOptions(m_ini, section, item, value, quote ? kQuotesOn : 0,
-                              m_useEscapes ? 1 : 0) != 1) {
-    return E_FAIL;
-  }
-  m_dirty = true;
-  return S_OK;
-}
-
-HRESULT CvlIniMgr::ItemExists(char const* section, char const* item) const {
-  return IniItemExists(m_ini, section, item) == 1 ? S_OK : E_FAIL;
-}
-
-HRESULT CvlIniMgr::SectionExists(char const* section) const {
-  if (!section) return E_POINTER;
-  return IniSectionExists(m_ini, section) == 1 ? S_OK : E_FAIL;
-}
-
-HRESULT CvlIniMgr::EraseItem(char const* section, char const* item) {
-  if (!section || !item) return E_POINTER;
-  if (IniRemoveItem(m_ini, section, item) != 1) return E_FAIL;
-  m_dirty = true;
-  return S_OK;
-}
-
-HRESULT CvlIniMgr::EraseSection(char const* section) {
-  if (!section) return E_POINTER;
-  if (IniRemoveSection(m_ini, section) != 1) return E_FAIL;
-  m_dirty = true;
-  return S_OK;
-}
-
-int CvlIniMgr::GetNumberOfSections() const { return IniNumberOfSections(m_ini); }
-
-int CvlIniMgr::GetNumberOfItems(char const* section) const {
-  return IniNumberOfItems(m_ini, section);
-}
-
-HRESULT CvlIniMgr::GetNthSectionName(int n, char** out) const {
-  return GetSectionName(m_ini, n, out);
-}
-HRESULT CvlIniMgr::GetNthSectionName(int n, std::string* out) const {
-  return GetSectionName(m_ini, n, out);
-}
-HRESULT CvlIniMgr::GetNthItemName(char const* section, int n, char** out) const {
-  return GetItemName(m_ini, section, n, out);
-}
-HRESULT CvlIniMgr::GetNthItemName(char const* section, int n, std::string* out) const {
-  return GetItemName(m_ini, section, n, out);
 }

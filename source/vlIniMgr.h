@@ -6,6 +6,7 @@
 #include <string>
 
 #include "source/Common/vltTypes.h"
+#include "source/IniDocument.h"
 #include "source/IniFileLock.h"
 #include "source/IniSidecar.h"
 #include "ztini/ztini.h"
@@ -27,10 +28,9 @@
 //   no memory; the file cannot be      | throws 1; the file stays
 //   opened or read; above 256 MiB      |
 //
-// Results are S_OK, E_FAIL, E_POINTER for a null argument, E_OUTOFMEMORY. Names and values are
-// taken as they are: a line feed in a name or, without escapes, in a value breaks the file's lines.
-// Threads: an object belongs to one at a time; any may destroy it.
-class CvlIniMgr {
+// Results are S_OK, E_FAIL, E_POINTER for a null argument, E_OUTOFMEMORY. The items are those of
+// the IniDocument. Threads: an object belongs to one at a time; any may destroy it.
+class CvlIniMgr : public IniDocument {
  public:
   // The usual ways to open a file, without a check of its digest. They throw what the constructor
   // throws.
@@ -50,9 +50,7 @@ class CvlIniMgr {
   // plain int 1 as in the table, and what the lock throws (zt::fnd::osdep::PosixError).
   CvlIniMgr(char const* fileName, bool lockOnly, unsigned char const* expectedChecksum,
             bool saveOnDestroy, bool useEscapes);
-  virtual ~CvlIniMgr();
-  CvlIniMgr(const CvlIniMgr&) = delete;
-  CvlIniMgr& operator=(const CvlIniMgr&) = delete;
+  ~CvlIniMgr() override;
 
   // Makes sure that the lock still keeps other processes out: a fork, a host that closes all
   // descriptors and a removed lock file each end it without a word. A lost lock is taken again
@@ -79,23 +77,6 @@ class CvlIniMgr {
   HRESULT WriteAndGetChecksum(unsigned char** digest);
   // The same into *digest, which is indeterminate on failure.
   HRESULT WriteAndGetDigest(IniSidecar::Digest* digest);
-
-  // Copies the value to *out, which the caller provides and sizes.
-  HRESULT GetItem(char const* section, char const* item, char** out) const;
-  HRESULT GetItem(char const* section, char const* item, std::string* out) const;
-  HRESULT SetItem(char const* section, char const* item, char const* value, bool quote);
-  // S_OK when it is there, E_FAIL when not.
-  HRESULT ItemExists(char const* section, char const* item) const;
-  HRESULT SectionExists(char const* section) const;
-  HRESULT EraseItem(char const* section, char const* item);
-  HRESULT EraseSection(char const* section);
-  int GetNumberOfSections() const;
-  int GetNumberOfItems(char const* section) const;  // 0 for an unknown section
-  // n from 1; 0 is the last and -1 the first.
-  HRESULT GetNthSectionName(int n, char** out) const;
-  HRESULT GetNthSectionName(int n, std::string* out) const;
-  HRESULT GetNthItemName(char const* section, int n, char** out) const;
-  HRESULT GetNthItemName(char const* section, int n, std::string* out) const;
 
   // What a Write guarantees when it returns; Synced at first.
   void SetDurability(IniDurability durability);
@@ -130,7 +111,6 @@ class CvlIniMgr {
   [[noreturn]] void CleanupAndThrow(bool setAside);
   HRESULT DigestFile(IniSidecar::Digest* digest) const;
   HRESULT writeDocument(IniSidecar::Digest* digest, bool* isInPlace);
-  void DisposeDocument();
   bool ownsLock();
 
   using FileState = IniFileState;
@@ -139,12 +119,9 @@ class CvlIniMgr {
   // Whether that is the state in which this object last read or wrote the file.
   bool isUnchanged(const FileState& now) const { return now.isKnown() && now == m_known; }
 
-  IniStructForwardReferenceTag* m_ini = nullptr;
   std::string m_fileName;
   bool m_lockOnly;
-  bool m_dirty = false;
   bool m_saveOnDestroy;
-  bool m_useEscapes;
   IniDurability m_durability = IniDurability::Synced;
   FileState m_known;           // of the file as it was last read or written
   bool m_lockWasLost = false;  // and the file has not been compared with m_known since

@@ -104,6 +104,13 @@ void ReadWholeLines(IniStructForwardReferenceTag* doc, Bytes bytes) {
   ztini::IniReadText(doc, std::move(bytes.block), static_cast<size_t>(offset), bytes.size);
 }
 
+// The block becomes the document's.
+int32_t ReadBlock(IniStructForwardReferenceTag* doc, Bytes bytes) {
+  const int32_t offset = TextOffset(bytes.block.get(), bytes.size < 4 ? bytes.size : 4);
+  if (offset < 0) return offset;
+  return ztini::IniReadText(doc, std::move(bytes.block), static_cast<size_t>(offset), bytes.size);
+}
+
 template <class Source>
 int32_t ReadDocument(IniStructForwardReferenceTag* doc, const Source& source) {
   Bytes bytes;
@@ -112,12 +119,20 @@ int32_t ReadDocument(IniStructForwardReferenceTag* doc, const Source& source) {
     if (status == kIniReadFailed) ReadWholeLines(doc, std::move(bytes));
     return status;
   }
-  const int32_t offset = TextOffset(bytes.block.get(), bytes.size < 4 ? bytes.size : 4);
-  if (offset < 0) return offset;
-  return ztini::IniReadText(doc, std::move(bytes.block), static_cast<size_t>(offset), bytes.size);
+  return ReadBlock(doc, std::move(bytes));
 }
 
 }  // namespace
+
+int32_t IniReadBytes(IniStructForwardReferenceTag* doc, const char* bytes, size_t sizeBytes) {
+  if (!doc) return 0;
+  Bytes copy;
+  copy.block.reset(static_cast<char*>(ztini::Reallocate(nullptr, sizeBytes + 1)));
+  if (!copy.block) return kIniOutOfMemory;
+  copy.size = sizeBytes;
+  if (sizeBytes) memcpy(copy.block.get(), bytes, sizeBytes);
+  return ReadBlock(doc, std::move(copy));
+}
 
 int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* file) {
   if (!doc || !file) return 0;

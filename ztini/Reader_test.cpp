@@ -64,6 +64,9 @@ TEST(Reader, ByteOrderMarks) {
     Document doc = NewDocument();
     EXPECT_EQ(IniReadFromFile(doc.get(), path.c_str()), row.status) << row.bytes;
     EXPECT_EQ(Show(doc), row.expected) << row.bytes;
+    Document fromMemory = NewDocument();
+    EXPECT_EQ(IniReadBytes(fromMemory.get(), row.bytes.data(), row.bytes.size()), row.status);
+    EXPECT_EQ(Show(fromMemory), row.expected) << row.bytes;
   }
 }
 

@@ -121,6 +121,8 @@ int32_t IniReadFromDescriptor(IniStructForwardReferenceTag* doc, const char* pat
 // The same of a stream, from its start, which stays the caller's. kIniReadFailed where the stream
 // reports an error: the document then has the lines that were whole.
 int32_t ztini_IniReadFromFileHelper(IniStructForwardReferenceTag* doc, FILE* file);
+// As a file of these bytes would be read. 0, kIniUnsupportedEncoding or kIniOutOfMemory.
+int32_t IniReadBytes(IniStructForwardReferenceTag* doc, const char* bytes, size_t sizeBytes);
 // The same line by line, from the caller's own source; null reads nothing. A negative result of the
 // source ends the reading and is returned.
 int32_t IniRead(IniStructForwardReferenceTag* doc, IniLineInputFunction input, void* context);

@@ -1,0 +1,149 @@
+#include "source/IniDocument.h"
+
+#include <string.h>
+
+#include "ztini/Render.h"
+
+namespace {
+
+constexpr int32_t kReadOptions =
+    kIniReadDoubleQuotes | kIniReadSingleQuotes | 16;  // 16 is idle here
+constexpr int32_t kWriteOptions = kIniWriteSafely | kIniWriteSpaces | kIniWriteTight;
+constexpr int32_t kNoLineLimit = -1;
+constexpr int32_t kQuotesOn = 1;
+
+HRESULT CopyOut(const char* value, char** out) {
+  strcpy(*out, value);
+  return S_OK;
+}
+
+HRESULT CopyOut(const char* value, std::string* out) {
+  *out = value;
+  return S_OK;
+}
+
+bool IsNull(char** out) { return !out || !*out; }
+bool IsNull(const std::string* out) { return !out; }
+
+}  // namespace
+
+IniStructForwardReferenceTag* IniDocument::NewDocument() {
+  IniStructForwardReferenceTag* fresh = IniNew(0);
+  if (!fresh) return nullptr;
+  IniSetReadOptions(fresh, kReadOptions);
+  IniSetWriteOptions(fresh, kNoLineLimit, ' ', kWriteOptions);
+  return fresh;
+}
+
+int32_t IniDocument::Parse(std::string_view bytes) {
+  Dispose();
+  m_ini = NewDocument();
+  return m_ini ? IniReadBytes(m_ini, bytes.data(), bytes.size()) : kIniOutOfMemory;
+}
+
+int32_t IniDocument::Render(std::string* bytes) const {
+  ztini::TextBuffer text;
+  int32_t status = ztini::IniRender(m_ini, &text);
+  if (status == 0) bytes->assign(text.text(), text.size());
+  return status;
+}
+
+void IniDocument::Dispose() {
+  IniDispose(m_ini);
+  m_ini = nullptr;
+}
+
+namespace {
+
+// The value as stored, or decoded; null when absent.
+const char* Value(IniStructForwardReferenceTag* document, const char* section, const char* item,
+                  bool decoded) {
+  const char* value = nullptr;
+  int32_t status = decoded ? IniGetPointerToString(document, section, item, &value)
+                           : IniGetPointerToRawString(document, section, item, &value);
+  return status == 1 ? value : nullptr;
+}
+
+template <class Out>
+HRESULT GetValue(IniStructForwardReferenceTag* document, const char* section, const char* item,
+                 bool decoded, Out* out) {
+  if (!section || !item || IsNull(out)) return E_POINTER;
+  const char* value = Value(document, section, item, decoded);
+  return value ? CopyOut(value, out) : E_FAIL;
+}
+
+template <class Out>
+HRESULT GetSectionName(IniStructForwardReferenceTag* document, int n, Out* out) {
+  if (IsNull(out)) return E_POINTER;
+  const char* name = nullptr;
+  return IniNthSectionName(document, n, &name) == 1 ? CopyOut(name, out) : E_FAIL;
+}
+
+template <class Out>
+HRESULT GetItemName(IniStructForwardReferenceTag* document, const char* section, int n, Out* out) {
+  if (!section || IsNull(out)) return E_POINTER;
+  const char* name = nullptr;
+  return IniNthItemName(document, section, n, &name) == 1 ? CopyOut(name, out) : E_FAIL;
+}
+
+}  // namespace
+
+HRESULT IniDocument::GetItem(char const* section, char const* item, char** out) const {
+  return GetValue(m_ini, section, item, m_useEscapes, out);
+}
+
+HRESULT IniDocument::GetItem(char const* section, char const* item, std::string* out) const {
+  return GetValue(m_ini, section, item, m_useEscapes, out);
+}
+
+HRESULT IniDocument::SetItem(char const* section, char const* item, char const* value, bool quote) {
+  if (!section || !item || !value) return E_POINTER;
+  if (IniPutStringWithOptions(m_ini, section, item, value, quote ? kQuotesOn : 0,
+                              m_useEscapes ? 1 : 0) != 1) {
+    return E_FAIL;
+  }
+  m_dirty = true;
+  return S_OK;
+}
+
+HRESULT IniDocument::ItemExists(char const* section, char const* item) const {
+  return IniItemExists(m_ini, section, item) == 1 ? S_OK : E_FAIL;
+}
+
+HRESULT IniDocument::SectionExists(char const* section) const {
+  if (!section) return E_POINTER;
+  return IniSectionExists(m_ini, section) == 1 ? S_OK : E_FAIL;
+}
+
+HRESULT IniDocument::EraseItem(char const* section, char const* item) {
+  if (!section || !item) return E_POINTER;
+  if (IniRemoveItem(m_ini, section, item) != 1) return E_FAIL;
+  m_dirty = true;
+  return S_OK;
+}
+
+HRESULT IniDocument::EraseSection(char const* section) {
+  if (!section) return E_POINTER;
+  if (IniRemoveSection(m_ini, section) != 1) return E_FAIL;
+  m_dirty = true;
+  return S_OK;
+}
+
+int IniDocument::GetNumberOfSections() const { return IniNumberOfSections(m_ini); }
+
+int IniDocument::GetNumberOfItems(char const* section) const {
+  return IniNumberOfItems(m_ini, section);
+}
+
+HRESULT IniDocument::GetNthSectionName(int n, char** out) const {
+  return GetSectionName(m_ini, n, out);
+}
+HRESULT IniDocument::GetNthSectionName(int n, std::string* out) const {
+  return GetSectionName(m_ini, n, out);
+}
+HRESULT IniDocument::GetNthItemName(char const* section, int n, char** out) const {
+  return GetItemName(m_ini, section, n, out);
+}
+HRESULT IniDocument::GetNthItemName(char const* section, int n, std::string* out) const {
+  return GetItemName(m_ini, section, n, out);
+}

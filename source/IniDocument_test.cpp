@@ -1,0 +1,61 @@
+#include "source/IniDocument.h"
+
+#include <gtest/gtest.h>
+
+#include "source/vlIniMgr.h"
+#include "tests/support/TempDir.h"
+
+namespace {
+
+using namespace std::string_literals;
+using vlt::test::ReadBytes;
+using vlt::test::TempDir;
+using vlt::test::WriteBytes;
+
+std::string Value(const IniDocument& document, const char* section, const char* item) {
+  std::string value;
+  return document.GetItem(section, item, &value) < 0 ? "none" : value;
+}
+
+TEST(IniDocument, HoldsNothingBeforeItIsParsed) {
+  IniDocument document(true);
+  EXPECT_EQ(document.GetNumberOfSections(), 0);
+  EXPECT_EQ(Value(document, "a", "x"), "none");
+}
+
+TEST(IniDocument, ParsesAndRendersAsAFileIsReadAndWritten) {
+  const std::string texts[] = {"", "[a]\nx = \"1\"\n", "\xEF\xBB\xBF[a]\nx=1\n\n[b]\ny = '\\x41'\n",
+                               "[a]\nname Line0001 = \"1\"\nname Line0002 = \"2\"\n", "[a]\nx=1"};
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  for (const std::string& text : texts) {
+    WriteBytes(file, text);
+    {
+      CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
+      ASSERT_EQ(ini.SetItem("a", "new", "v\n", true), S_OK);
+      ASSERT_EQ(ini.Write(), S_OK);
+    }
+    IniDocument document(true);
+    ASSERT_EQ(document.Parse(text), 0);
+    ASSERT_EQ(document.SetItem("a", "new", "v\n", true), S_OK);
+    std::string rendered;
+    ASSERT_EQ(document.Render(&rendered), 0);
+    EXPECT_EQ(rendered, ReadBytes(file)) << text;
+  }
+}
+
+TEST(IniDocument, AnUnsupportedEncodingLeavesAnEmptyDocument) {
+  IniDocument document(true);
+  ASSERT_EQ(document.Parse("[a]\nx=1\n"), 0);
+  EXPECT_EQ(document.Parse("\xFF\xFE[\0a\0]\0"s), kIniUnsupportedEncoding);
+  EXPECT_EQ(document.GetNumberOfSections(), 0);
+}
+
+TEST(IniDocument, ValuesAreDecodedOnlyWhereEscapesAreUsed) {
+  IniDocument escaped(true), raw(false);
+  for (IniDocument* document : {&escaped, &raw}) ASSERT_EQ(document->Parse("[a]\nx=\\x41\n"), 0);
+  EXPECT_EQ(Value(escaped, "a", "x"), "A");
+  EXPECT_EQ(Value(raw, "a", "x"), "\\x41");
+}
+
+}  // namespace
