@@ -8,13 +8,13 @@
 #include "source/Common/vltBindingClasses.h"
 #include "source/GuardedIniFile.h"
 #include "source/Pharlap/DatabaseSaves.h"
-#include "source/Pharlap/registrationFiles.h"
+#include "source/Database/registrationFiles.h"
 #include "source/vlIniMgr.h"
 #include "source/vltRegistrar.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
 
 namespace registrar {
-class Scan;
+class LiveScan;
 }
 
 // Keeps the components in one guarded INI file, the registration database, and in memory.
@@ -178,5 +178,5 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   std::unique_ptr<CvlIniMgr> m_registrationIni;
   std::unique_ptr<DatabaseSaves> m_saves;  // null where the opening failed
   class ScanHold;
-  registrar::Scan* m_scan = nullptr;  // the one under way, if there is one
+  registrar::LiveScan* m_scan = nullptr;  // the one under way, if there is one
 };

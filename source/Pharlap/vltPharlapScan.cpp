@@ -1,10 +1,10 @@
 // The scan of the installation: finding registration files, merging what is new or changed,
 // dropping what has vanished. What is done to the database is done by registrar::Scan.
-#include "source/Pharlap/Scan.h"
+#include "source/Pharlap/LiveScan.h"
 
 #include <optional>
 
-#include "source/Pharlap/contentsWalk.h"
+#include "source/Database/contentsWalk.h"
 #include "source/Pharlap/registrarText.h"
 #include "source/Pharlap/vltPharlapRegistrar.h"
 #include "vlloader/source/InstallLayout.h"
@@ -40,11 +40,11 @@ class CvltPharlapRegistrar::ScanHold {
   }
   ScanHold(const ScanHold&) = delete;
   ScanHold& operator=(const ScanHold&) = delete;
-  registrar::Scan* operator->() const { return m_current; }
+  registrar::LiveScan* operator->() const { return m_current; }
 
  private:
-  std::optional<registrar::Scan> m_own;
-  registrar::Scan*& m_current;
+  std::optional<registrar::LiveScan> m_own;
+  registrar::LiveScan*& m_current;
 };
 
 HRESULT CvltPharlapRegistrar::UpdateRegistrationFile() {

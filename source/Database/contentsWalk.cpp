@@ -1,7 +1,7 @@
-#include "source/Pharlap/contentsWalk.h"
+#include "source/Database/contentsWalk.h"
 
-#include "source/Pharlap/registrarText.h"
-#include "source/vlIniMgr.h"
+#include "source/Database/databaseText.h"
+#include "source/IniDocument.h"
 #include "zt/fnd/osdep/StringCompare.h"
 
 namespace {
@@ -24,7 +24,7 @@ std::string BaseOf(const std::string& name) {
 
 }  // namespace
 
-std::vector<ContentsItem> ReadContents(const CvlIniMgr& database) {
+std::vector<ContentsItem> ReadContents(const IniDocument& database) {
   std::vector<ContentsItem> items;
   bool inPieces = false;  // The last item may go on with the next piece.
   int count = database.GetNumberOfItems(registrar::kContents);
@@ -60,7 +60,7 @@ void ContentsFiles::learn(const std::vector<ContentsItem>& items) {
   m_known = true;
 }
 
-void ContentsFiles::add(const CvlIniMgr& database, const std::string& item) {
+void ContentsFiles::add(const IniDocument& database, const std::string& item) {
   if (!m_known) return;
   // Both as they are kept: a name loses the white space around it, and a new one comes last.
   std::string name, file;

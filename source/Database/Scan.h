@@ -1,20 +1,19 @@
 #pragma once
 
 #include <cstdint>
-#include <memory>
 #include <set>
 #include <string>
 
-#include "source/Pharlap/contentsWalk.h"
+#include "source/Database/contentsWalk.h"
 #include "zt/fnd/AbsTime.h"
 #include "zt/fnd/String.h"
 
-class CvlIniMgr;
+class IniDocument;
 
 namespace registrar {
 
 // What one comparison of the installation with the database knows, and the changes of the database
-// that it makes. Lives for one CvltPharlapRegistrar::UpdateRegistrationFile, which drives it.
+// that it makes. Its user walks the files and their sections.
 //
 // Changes the open document only; saving is the caller's. An item that cannot be set, because
 // memory is out, is left out; its file gets no stamp, so that the next start merges it again.
@@ -22,8 +21,7 @@ namespace registrar {
 class Scan {
  public:
   // The database stays open as long as the object lives.
-  explicit Scan(CvlIniMgr& database);
-  ~Scan();
+  explicit Scan(IniDocument& database);
   Scan(const Scan&) = delete;
   Scan& operator=(const Scan&) = delete;
 
@@ -32,21 +30,18 @@ class Scan {
   // Remembers that the file was merged with this time, unless an item of it is missing.
   void setStamp(const std::string& file, const zt::fnd::AbsTime& time);
 
-  // Opens the registration file for takeFragment. False if it cannot be used. One that cannot be
-  // parsed has been set aside then; any other failure leaves it.
-  bool openFragment(const std::string& file);
-  // The file that was opened last; opens it if there is none. Null if it cannot be used.
-  std::unique_ptr<CvlIniMgr> takeFragment(const std::string& file);
+  // To be called before a file is merged.
+  void beginFile() { m_isIncomplete = false; }
 
   // Erases what the database has from the file.
   void eraseComponentsOf(const std::string& file);
 
   // Whether the section is merged: it has a header, and is no component that is named like a
   // section of the database itself. The list of components is merged, too.
-  static bool isMerged(const CvlIniMgr& fragment, const std::string& section);
+  static bool isMerged(const IniDocument& fragment, const std::string& section);
   // Copies the items of one section of the registration file; `changed` becomes the mark of a
   // dictionary. True if it has a file name.
-  bool mergeSection(const CvlIniMgr& fragment, const zt::fnd::String& installDirectory,
+  bool mergeSection(const IniDocument& fragment, const zt::fnd::String& installDirectory,
                     const std::string& file, const std::string& section, bool changed);
 
   // Whether the file is still in the installation, as far as this user can see.
@@ -60,15 +55,14 @@ class Scan {
  private:
   void set(const std::string& section, const std::string& item, const std::string& value,
            bool quote);
-  bool mergeItem(const CvlIniMgr& fragment, const zt::fnd::String& installDirectory,
+  bool mergeItem(const IniDocument& fragment, const zt::fnd::String& installDirectory,
                  const std::string& file, const std::string& section, const std::string& item);
 
-  CvlIniMgr& m_database;
+  IniDocument& m_database;
   std::set<std::string> m_filesSeen;
   ContentsFiles m_contentsFiles;
-  std::unique_ptr<CvlIniMgr> m_fragment;
   bool m_droppedPlanted = false;
-  bool m_isIncomplete = false;  // what was merged since the last file was opened
+  bool m_isIncomplete = false;  // what was merged since beginFile
 };
 
 // Makes the short file name of a registration file a path: adds the extension of its kind to a name

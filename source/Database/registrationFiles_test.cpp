@@ -1,4 +1,4 @@
-#include "source/Pharlap/registrationFiles.h"
+#include "source/Database/registrationFiles.h"
 
 #include <gtest/gtest.h>
 #include <sys/stat.h>

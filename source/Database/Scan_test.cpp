@@ -1,8 +1,8 @@
-#include "source/Pharlap/Scan.h"
+#include "source/Database/Scan.h"
 
 #include <gtest/gtest.h>
 
-#include "source/Pharlap/registrarText.h"
+#include "source/Database/databaseText.h"
 #include "source/vlIniMgr.h"
 #include "tests/support/TempDir.h"
 #include "zt/fnd/osdep/DateTime.h"
@@ -37,8 +37,8 @@ struct ScanTest : testing::Test {
     return dir / name;
   }
   void merge(const std::string& file) {
-    std::unique_ptr<CvlIniMgr> fragment = scan->takeFragment(file);
-    ASSERT_TRUE(fragment);
+    std::unique_ptr<CvlIniMgr> fragment = Open(file);
+    scan->beginFile();
     for (int n = 1; n <= fragment->GetNumberOfSections(); ++n) {
       std::string section;
       ASSERT_EQ(fragment->GetNthSectionName(n, &section), S_OK);
@@ -61,13 +61,6 @@ TEST_F(ScanTest, AFileThatWasSeenIsPresent) {
   EXPECT_TRUE(scan->isPresent("/seen"));
   EXPECT_FALSE(scan->isPresent("/unseen"));
   EXPECT_TRUE(scan->isPresent(addFile("there", "")));
-}
-
-TEST_F(ScanTest, AFileOpenedBeforeIsTheOneThatIsTaken) {
-  std::string file = addFile("a.vlr", "[S]\nx = 1\n");
-  ASSERT_TRUE(scan->openFragment(file));
-  EXPECT_TRUE(scan->takeFragment("/not opened"));
-  EXPECT_FALSE(scan->openFragment(dir.makeDir("directory")));
 }
 
 TEST_F(ScanTest, MergesWhatAComponentBringsAndErasesItAgain) {

@@ -1,4 +1,4 @@
-#include "source/Pharlap/contentsWalk.h"
+#include "source/Database/contentsWalk.h"
 
 #include <gtest/gtest.h>
 

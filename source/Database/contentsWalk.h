@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-class CvlIniMgr;
+class IniDocument;
 
 // An item of "VLRContentsSection" as it was meant: a component and the registration file it came
 // from.
@@ -19,7 +19,7 @@ struct ContentsItem {
 // The section's items. A long one may be in pieces, "name Line0001", "name Line0002" and so on:
 // neighbours of one such name are put together. The parser does that too for runs that are whole;
 // what is met here is the rest. Names shorter than 11 characters are never pieces.
-std::vector<ContentsItem> ReadContents(const CvlIniMgr& database);
+std::vector<ContentsItem> ReadContents(const IniDocument& database);
 
 // The registration files that the section's items hold, whatever the case of their letters: known
 // from one walk, so that not each of the new files of a first start needs a walk that finds
@@ -35,7 +35,7 @@ class ContentsFiles {
   // All items, from a walk.
   void learn(const std::vector<ContentsItem>& items);
   // The item has been set.
-  void add(const CvlIniMgr& database, const std::string& item);
+  void add(const IniDocument& database, const std::string& item);
   // The section has been changed in some other way.
   void forget();
 

@@ -1,9 +1,9 @@
-#include "source/Pharlap/registrationFiles.h"
+#include "source/Database/registrationFiles.h"
 
 #include <errno.h>
 #include <sys/stat.h>
 
-#include "source/Pharlap/registrarText.h"
+#include "source/Database/databaseText.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/DateTime.h"
 #include "zt/fnd/osdep/FindFiles.h"

@@ -6,17 +6,15 @@
 // Registration files are written by others and may hold anything. What would change the database's
 // own sections, or write lines of its own into them, is left out; the stamp of a file of which an
 // item could not be set is left out too, so that the next start merges it again.
-#include "source/Pharlap/Scan.h"
+#include "source/Database/Scan.h"
 
 #include <stdio.h>
 
-#include <utility>
 #include <vector>
 
-#include "source/Common/vltResultOf.h"
-#include "source/Pharlap/registrarText.h"
-#include "source/Pharlap/registrationFiles.h"
-#include "source/vlIniMgr.h"
+#include "source/Database/databaseText.h"
+#include "source/Database/registrationFiles.h"
+#include "source/IniDocument.h"
 #include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/osdep/StringCompare.h"
 #include "zt/fnd/osdep/path.h"
@@ -55,8 +53,7 @@ struct Stamp {
 
 }  // namespace
 
-Scan::Scan(CvlIniMgr& database) : m_database(database) {}
-Scan::~Scan() = default;
+Scan::Scan(IniDocument& database) : m_database(database) {}
 
 bool Scan::isUpToDate(const std::string& file, const zt::fnd::AbsTime& time) {
   m_filesSeen.insert(file);
@@ -80,18 +77,6 @@ void Scan::setStamp(const std::string& file, const zt::fnd::AbsTime& time) {
   m_database.SetItem(kRegistrations, file.c_str(), text.c_str(), true);
 }
 
-bool Scan::openFragment(const std::string& file) {
-  m_isIncomplete = false;
-  // A file that cannot be parsed has been set aside by its manager already. Any other reason - no
-  // memory, no descriptor - says nothing about the file, which stays.
-  return vlt::Attempt([&] { m_fragment.reset(new CvlIniMgr(CvlIniMgr::OpenForUpdate(file))); });
-}
-
-std::unique_ptr<CvlIniMgr> Scan::takeFragment(const std::string& file) {
-  if (!m_fragment) openFragment(file);
-  return std::move(m_fragment);
-}
-
 void Scan::eraseComponentsOf(const std::string& file) {
   if (!m_contentsFiles.mayHave(file)) return;
   // Erasing a component that bears the name of a list edits the list; the walk is over its copy.
@@ -111,7 +96,7 @@ void Scan::eraseComponentsOf(const std::string& file) {
   for (const std::string& name : eraseList) m_database.EraseItem(kContents, name.c_str());
 }
 
-bool Scan::isMerged(const CvlIniMgr& fragment, const std::string& section) {
+bool Scan::isMerged(const IniDocument& fragment, const std::string& section) {
   // Written without a header, so that its items would fall to whichever section comes before.
   if (section == kHeaderless) return false;
   // A component that is named like a section of the database itself must not overlay it. The list
@@ -127,7 +112,7 @@ void Scan::set(const std::string& section, const std::string& item, const std::s
   }
 }
 
-bool Scan::mergeItem(const CvlIniMgr& fragment, const String& installDirectory,
+bool Scan::mergeItem(const IniDocument& fragment, const String& installDirectory,
                      const std::string& file, const std::string& section, const std::string& item) {
   std::string value;
   if (fragment.GetItem(section.c_str(), item.c_str(), &value) < 0) {
@@ -153,7 +138,7 @@ bool Scan::mergeItem(const CvlIniMgr& fragment, const String& installDirectory,
   return isFileName;
 }
 
-bool Scan::mergeSection(const CvlIniMgr& fragment, const String& installDirectory,
+bool Scan::mergeSection(const IniDocument& fragment, const String& installDirectory,
                         const std::string& file, const std::string& section, bool changed) {
   bool hasFileName = false;
   int items = fragment.GetNumberOfItems(section.c_str());
