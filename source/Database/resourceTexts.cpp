@@ -1,0 +1,121 @@
+#include "source/Database/resourceTexts.h"
+
+#include <algorithm>
+
+#include "source/Common/vltcmn.h"
+#include "source/Database/databaseText.h"
+#include "ztini/ztini.h"
+
+namespace registrar {
+namespace {
+
+constexpr size_t kFileNameSize = 260;
+
+// What follows the last slash; the whole text without one.
+std::string BaseName(const std::string& file) { return file.substr(file.rfind('/') + 1); }
+
+}  // namespace
+
+ResourceTexts::ResourceTexts(IniStructForwardReferenceTag* document, ResourceObserver* observer)
+    : m_document(document), m_observer(observer) {}
+
+ResourceTexts::~ResourceTexts() { IniDispose(m_document); }
+
+IniStructForwardReferenceTag* ResourceTexts::NewDocument() {
+  IniStructForwardReferenceTag* document = IniNew(0);
+  if (document) IniSetDuplicateChecking(document, 1);
+  return document;
+}
+
+std::string ResourceTexts::TargetOf(const std::string& file) {
+  return file.find('/') == std::string::npos ? "" : BaseName(file);
+}
+
+// False for a section that names no file.
+bool ResourceTexts::fileNameOf(const char* section, std::string* base) {
+  if (!IniSectionExists(m_document, section)) {
+    if (reports()) m_observer->noSection(section);
+    return false;
+  }
+  if (IniItemExists(m_document, section, kFileName) != 1) return false;
+  char file[kFileNameSize];
+  int32_t status = IniGetStringIntoBuffer(m_document, section, kFileName, file, sizeof file);
+  if (status < 1) {
+    if (reports()) m_observer->noFileName(section, static_cast<int>(status));
+    return false;
+  }
+  *base = BaseName(file);
+  return true;
+}
+
+// Adds the text of one component. True if the search is over.
+bool ResourceTexts::appendFrom(Query& q, const char* section) {
+  if (IniItemExists(m_document, section, q.key.c_str()) == 1) {
+    TaskMem<char> text(static_cast<char*>(q.maxLength ? vltTaskMemAlloc(q.maxLength) : nullptr));
+    if (!text && q.maxLength) q.outOfMemory = true;
+    int32_t status = 0;
+    if (text) {
+      status = IniGetStringIntoBuffer(m_document, section, q.key.c_str(), text.get(), q.maxLength);
+    }
+    if (status != 0 && text) {
+      if (!q.joined.empty()) q.joined += q.separator ? q.separator : "";
+      q.joined += text.get();
+      q.found = true;
+    } else if (reports()) {
+      m_observer->noText(q.key.c_str(), section, static_cast<int>(status));
+    }
+  }
+  return !q.separator;
+}
+
+// Puts the next component of the list into the index. Returns its section and the base name of its
+// file, which is empty if it has none; null at the end of the list.
+const char* ResourceTexts::indexNext(std::string* base) {
+  base->clear();
+  const char* section = nullptr;
+  if (IniNthItemName(m_document, kComponents, m_indexed + 1, &section) != 1) return nullptr;
+  // An empty name matches nothing.
+  if (fileNameOf(section, base) && !base->empty()) m_sectionsOf[*base].push_back(section);
+  ++m_indexed;  // Last: out of memory leaves the component to the next question.
+  return section;
+}
+
+void ResourceTexts::answer(Query& q) {
+  if (!m_document) return;
+  if (IniSectionExists(m_document, kComponents) != 1) {
+    if (reports()) m_observer->noList();
+    return;
+  }
+  if (reports()) {
+    m_indexed = 0;
+    m_sectionsOf.clear();
+    m_answers.clear();
+  }
+  Kind kind(q.separator != nullptr, q.separator ? q.separator : "", q.key, q.maxLength);
+  auto& known = m_answers[kind];
+  if (auto found = known.find(q.target); found != known.end()) {
+    q.found = found->second.found;
+    q.joined = found->second.text;
+    return;
+  }
+  search(q);
+  q.joined.resize(std::min<size_t>(q.joined.size(), q.maxLength));
+  if (!q.outOfMemory) known.emplace(q.target, Answer{q.found, q.joined});
+}
+
+// The index first, and then what follows it in the list.
+void ResourceTexts::search(Query& q) {
+  if (auto found = m_sectionsOf.find(q.target); found != m_sectionsOf.end()) {
+    for (const std::string& section : found->second) {
+      if (appendFrom(q, section.c_str())) return;
+    }
+  }
+  std::string base;
+  while (const char* section = indexNext(&base)) {
+    bool matches =
+        !base.empty() && zt::fnd::osdep::StringCaseCompare(base.c_str(), q.target.c_str()) == 0;
+    if (matches && appendFrom(q, section)) return;
+  }
+}
+
+}  // namespace registrar
