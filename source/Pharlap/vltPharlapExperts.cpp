@@ -9,8 +9,10 @@
 #include <string.h>
 
 #include <memory>
+#include <optional>
 
 #include "source/Common/vltcmn.h"
+#include "source/Database/recordText.h"
 #include "source/Pharlap/registrarText.h"
 #include "source/Pharlap/vltPharlapRegistrar.h"
 #include "vlloader/source/InstallLayout.h"
@@ -22,9 +24,9 @@ using zt::fnd::String;
 
 namespace {
 
-constexpr uint32_t kNoSchemaVersion = 0xFFFFFFFF;
-
-wchar_t* CopyOfNarrow(const std::string& text) { return CopyOf(Widen(text).c_str()); }
+wchar_t* CopyOfNarrow(const std::optional<std::string>& text) {
+  return text ? CopyOf(Widen(*text).c_str()) : nullptr;
+}
 
 }  // namespace
 
@@ -121,50 +123,14 @@ HRESULT CvltPharlapRegistrar::RegisterResourceExpert(_vltComponent2* record) {
 
 // ---- Reading
 
-void CvltPharlapRegistrar::readDictionary(const std::string& section, _vltComponent2* record) {
-  auto read = [&](const char* item, std::string* value) {
-    value->clear();
-    return m_registrationIni->GetItem(section.c_str(), item, value) >= 0;
-  };
-  auto number = [&](const char* item, uint32_t fallback) {
-    std::string value;
-    return read(item, &value) && !value.empty() ? Number(value) : fallback;
-  };
-  std::string value;
-  record->version = kDictionaryVersion;
-  record->type = vltComponentDataDictionary;
-  if (read(kFileName, &value)) record->fileName = CopyOfNarrow(value);
-  if (read(kPrefix, &value)) record->dictionary.prefix = CopyOfNarrow(value);
-  record->dictionary.schemaVersion = number(kSchemaVersion, 0);
-  record->dictionary.fragmentRegistered = number(kFragmentRegistered, 0);
-  record->dictionary.lastInstalledSchemaVersion =
-      number(kLastInstalledSchemaVersion, kNoSchemaVersion);
-}
-
 // True if the database was changed and has to be saved.
-bool CvltPharlapRegistrar::readExpert(const std::string& section, EmptyFileName emptyFileName,
-                                      _vltComponent2* record) {
-  bool isResourceExpert = record->type == vltComponentResourceExpert;
-  bool changed = false;
-  std::string file, pnp;
-  bool hasFile = m_registrationIni->GetItem(section.c_str(), kFileName, &file) >= 0;
-  if (isResourceExpert && file.empty() && emptyFileName == EmptyFileName::IsNone) hasFile = false;
-  if (hasFile) {
-    // Registered by a bare name (RegisterObjectExpert): the path is completed at the first start
-    // that finds it, and kept.
-    if (file.find_first_of("\\/") == std::string::npos) {
-      String experts;
-      vlrMakeRootDirectory(vlt::layout::kExperts, &experts);
-      file = Narrow(experts) + file;
-      m_registrationIni->SetItem(section.c_str(), kFileName, file.c_str(), true);
-      changed = true;
-    }
-    record->fileName = CopyOfNarrow(file);
-  }
-  if (isResourceExpert && m_registrationIni->GetItem(section.c_str(), kPnp, &pnp) >= 0) {
-    record->resource.pnp = CopyOfNarrow(pnp);
-  }
-  return changed;
+bool CvltPharlapRegistrar::completeFileName(const std::string& section, RecordText* text) {
+  if (!LacksDirectory(*text)) return false;
+  String experts;
+  vlrMakeRootDirectory(vlt::layout::kExperts, &experts);
+  text->file = Narrow(experts) + *text->file;
+  m_registrationIni->SetItem(section.c_str(), kFileName, text->file->c_str(), true);
+  return true;
 }
 
 HRESULT CvltPharlapRegistrar::ReadComponent(const wchar_t* section) {
@@ -173,24 +139,25 @@ HRESULT CvltPharlapRegistrar::ReadComponent(const wchar_t* section) {
 
 HRESULT CvltPharlapRegistrar::ReadSection(const wchar_t* wideSection, EmptyFileName emptyFileName) {
   std::string section = Narrow(wideSection);
+  RecordText text = ReadRecord(*m_registrationIni, section, emptyFileName);
+  bool changed = completeFileName(section, &text);
   auto component = std::make_unique<CvltComponent>();
   _vltComponent2& record = component->record();
   // The stamp is that of the object: clients see by it that the record came from here.
   record.size = sizeof(CvltComponent);
+  record.version = text.version;
+  record.type = text.type;
   record.name = CopyOf(wideSection);
-  std::string identifier;
-  if (m_registrationIni->GetItem(section.c_str(), kIdentifier, &identifier) >= 0 &&
-      !identifier.empty()) {
-    record.identifier = vlrGuidFromString(Widen(identifier));
-  }
-  if (m_registrationIni->ItemExists(section.c_str(), kSchemaVersion) >= 0) {
-    readDictionary(section, &record);
+  record.identifier = text.identifier;
+  record.fileName = CopyOfNarrow(text.file);
+  if (text.type == vltComponentDataDictionary) {
+    record.dictionary.prefix = CopyOfNarrow(text.prefix);
+    record.dictionary.schemaVersion = text.schemaVersion;
+    record.dictionary.fragmentRegistered = text.fragmentRegistered;
+    record.dictionary.lastInstalledSchemaVersion = text.lastInstalledSchemaVersion;
     return AddComponent(component.release());
   }
-  bool isResourceExpert = m_registrationIni->ItemExists(section.c_str(), kPnp) >= 0;
-  record.version = kExpertVersion;
-  record.type = isResourceExpert ? vltComponentResourceExpert : vltComponentObjectExpert;
-  bool changed = readExpert(section, emptyFileName, &record);
+  if (text.type == vltComponentResourceExpert) record.resource.pnp = CopyOfNarrow(text.pnp);
   HRESULT result = PopulateBindingClasses(&record);
   if (result < 0) result = S_OK;  // An expert without binding classes is an expert.
   AddComponent(component.release());

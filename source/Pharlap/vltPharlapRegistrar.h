@@ -6,9 +6,10 @@
 
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/Common/vltBindingClasses.h"
+#include "source/Database/recordText.h"
+#include "source/Database/registrationFiles.h"
 #include "source/GuardedIniFile.h"
 #include "source/Pharlap/DatabaseSaves.h"
-#include "source/Database/registrationFiles.h"
 #include "source/vlIniMgr.h"
 #include "source/vltRegistrar.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
@@ -114,8 +115,7 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   static HRESULT StripBracesFromGuid(wchar_t* text);
 
  protected:
-  // Whether an item that is there, but empty, counts as the file name of a resource expert.
-  enum class EmptyFileName { Counts, IsNone };
+  using EmptyFileName = registrar::EmptyFileName;
   // What the sections of experts have in their database form.
   enum class GuidText { WithoutBraces, WithBraces };
 
@@ -166,8 +166,7 @@ class CvltPharlapRegistrar : public CvltRegistrar,
   HRESULT dataDirectory(zt::fnd::String* directory);
   HRESULT setAndSave(const char* key, const char* value, bool quote);
   HRESULT previousDictionariesFolder(zt::fnd::String* folder);
-  void readDictionary(const std::string& section, _vltComponent2* record);
-  bool readExpert(const std::string& section, EmptyFileName emptyFileName, _vltComponent2* record);
+  bool completeFileName(const std::string& section, registrar::RecordText* text);
 
   // Filled while the components are read, and only read after that.
   BindingClassesMap m_resourceExpertBindings;
