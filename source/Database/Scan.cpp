@@ -154,8 +154,10 @@ bool Scan::mergeSection(const IniDocument& fragment, const String& installDirect
 }
 
 bool Scan::isPresent(const std::string& file) const {
-  return m_filesSeen.count(file) != 0 || FileIsThere(file);
+  return m_filesSeen.count(file) != 0 || isThere(file);
 }
+
+bool Scan::isThere(const std::string& file) const { return FileIsThere(file); }
 
 void Scan::erase(const std::string& component, const std::string& file) {
   // No merge writes a relative path: the entry was made by hand, or by a registration file that

@@ -22,6 +22,7 @@ class Scan {
  public:
   // The database stays open as long as the object lives.
   explicit Scan(IniDocument& database);
+  virtual ~Scan() = default;
   Scan(const Scan&) = delete;
   Scan& operator=(const Scan&) = delete;
 
@@ -51,6 +52,10 @@ class Scan {
   // Whether an entry was erased that no file can have made: such must not come back with the next
   // start.
   bool droppedPlanted() const { return m_droppedPlanted; }
+
+ protected:
+  // Whether a file that was not seen is there.
+  virtual bool isThere(const std::string& file) const;
 
  private:
   void set(const std::string& section, const std::string& item, const std::string& value,

@@ -3,6 +3,9 @@
 #include "source/Common/vltcmn.h"
 #include "source/Database/databaseText.h"
 #include "source/IniDocument.h"
+#include "zt/fnd/Guid.h"
+
+using zt::fnd::String;
 
 namespace registrar {
 namespace {
@@ -34,8 +37,7 @@ void ReadDictionary(const Section& section, RecordText* record) {
   record->prefix = section.text(kPrefix);
   record->schemaVersion = section.number(kSchemaVersion, 0);
   record->fragmentRegistered = section.number(kFragmentRegistered, 0);
-  record->lastInstalledSchemaVersion =
-      section.number(kLastInstalledSchemaVersion, kNeverInstalled);
+  record->lastInstalledSchemaVersion = section.number(kLastInstalledSchemaVersion, kNeverInstalled);
 }
 
 }  // namespace
@@ -59,6 +61,35 @@ RecordText ReadRecord(const IniDocument& database, const std::string& name,
   if (emptyFileName == EmptyFileName::IsNone && record.file && record.file->empty()) {
     record.file.reset();
   }
+  return record;
+}
+
+HRESULT WriteDictionary(IniDocument& database, const std::string& section,
+                        const RecordText& record) {
+  String identifier;
+  zt::fnd::Guid(record.identifier).toString(identifier);
+  HRESULT result = database.SetItem(kComponents, section.c_str(), section.c_str(), true);
+  auto set = [&](const char* item, const std::string& value, bool quote) {
+    if (result >= 0) result = database.SetItem(section.c_str(), item, value.c_str(), quote);
+  };
+  set(kIdentifier, WithoutBraces(Narrow(identifier)), true);
+  set(kFileName, record.file.value_or(""), true);
+  set(kSchemaVersion, Decimal(record.schemaVersion), false);
+  set(kFragmentRegistered, Decimal(record.fragmentRegistered), false);
+  set(kLastInstalledSchemaVersion, Decimal(record.lastInstalledSchemaVersion), false);
+  set(kPrefix, record.prefix.value_or(""), true);
+  return result;
+}
+
+RecordText BuiltInDictionary(const std::string& directory) {
+  RecordText record;
+  record.type = vltComponentDataDictionary;
+  record.version = kDictionaryVersion;
+  record.identifier = {
+      0x790F6A90, 0xE0D8, 0x11D3, {0xAA, 0x15, 0x00, 0x50, 0x04, 0xD1, 0x31, 0xEE}};
+  record.file = directory + kBuiltInDictionary + ".framework";
+  record.lastInstalledSchemaVersion = 0;
+  record.prefix = "vl";
   return record;
 }
 

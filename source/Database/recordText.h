@@ -33,6 +33,15 @@ enum class EmptyFileName { Counts, IsNone };
 RecordText ReadRecord(const IniDocument& database, const std::string& section,
                       EmptyFileName emptyFileName);
 
+// Lists a dictionary and sets the items of its section. The first negative result ends it: a name that
+// is empty, or out of memory.
+HRESULT WriteDictionary(IniDocument& database, const std::string& section,
+                        const RecordText& record);
+
+// The dictionary that every start registers, in the directory of dictionaries, which ends in a slash.
+inline constexpr const char* kBuiltInDictionary = "vltdd";
+RecordText BuiltInDictionary(const std::string& directory);
+
 // Whether the file of an expert is to be put into the directory of experts.
 bool LacksDirectory(const RecordText& record);
 

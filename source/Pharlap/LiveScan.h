@@ -14,7 +14,7 @@ namespace registrar {
 class LiveScan : public Scan {
  public:
   using Scan::Scan;
-  ~LiveScan();
+  ~LiveScan() override;
 
   // Opens the registration file for takeFragment. False if it cannot be used. One that cannot be
   // parsed has been set aside then; any other failure leaves it.

@@ -62,22 +62,16 @@ HRESULT CvltPharlapRegistrar::RegisterDataDictionary(_vltComponent2* record) {
   // value.
   std::string section = Narrow(record->name);
   if (IsReserved(section)) return E_FAIL;
-  std::string identifier = WithoutBraces(Narrow(vlrGuidToString(record->identifier)));
   const vltDictVariant& variant = record->dictionary;
-  HRESULT setResult =
-      m_registrationIni->SetItem(kComponents, section.c_str(), section.c_str(), true);
-  // After the first failure nothing more is set, and its result is that of the call.
-  auto set = [&](const char* item, const std::string& value, bool quote) {
-    if (setResult < 0) return;
-    setResult = m_registrationIni->SetItem(section.c_str(), item, value.c_str(), quote);
-  };
-  set(kIdentifier, identifier, true);
-  set(kFileName, Narrow(record->fileName), true);
-  set(kSchemaVersion, Decimal(variant.schemaVersion), false);
-  set(kFragmentRegistered, Decimal(variant.fragmentRegistered), false);
-  set(kLastInstalledSchemaVersion, Decimal(variant.lastInstalledSchemaVersion), false);
-  set(kPrefix, Narrow(variant.prefix), true);
-  // A name that is empty, or no memory: what was not set is not saved as if it were.
+  RecordText text;
+  text.identifier = record->identifier;
+  text.file = Narrow(record->fileName);
+  text.schemaVersion = variant.schemaVersion;
+  text.fragmentRegistered = variant.fragmentRegistered;
+  text.lastInstalledSchemaVersion = variant.lastInstalledSchemaVersion;
+  text.prefix = Narrow(variant.prefix);
+  // What was not set is not saved as if it were.
+  HRESULT setResult = WriteDictionary(*m_registrationIni, section, text);
   if (setResult < 0) return setResult;
   HRESULT result = SaveChanges();
 

@@ -25,9 +25,6 @@ using zt::fnd::String;
 
 namespace {
 
-constexpr GUID kBuiltInDictionary = {
-    0x790F6A90, 0xE0D8, 0x11D3, {0xAA, 0x15, 0x00, 0x50, 0x04, 0xD1, 0x31, 0xEE}};
-
 // Fails by exceptions, and has no hook points and no messages.
 constexpr GuardedIniKind kDatabase = {.useEscapes = true,
                                       .otherFailure = E_FAIL,
@@ -128,17 +125,17 @@ void CvltPharlapRegistrar::initSettings() {
 }
 
 void CvltPharlapRegistrar::registerBuiltInDictionary() {
-  String file;
-  vlrMakeRootDirectory(vlt::layout::kDictionaries, &file);
-  file += L"vltdd.framework";
-  String name(L"vltdd"), prefix(L"vl");
+  String directory;
+  vlrMakeRootDirectory(vlt::layout::kDictionaries, &directory);
+  RecordText text = BuiltInDictionary(Narrow(directory));
+  String name = Widen(kBuiltInDictionary), file = Widen(*text.file), prefix = Widen(*text.prefix);
   _vltComponent2 record;
   memset(&record, 0, sizeof record);
   record.size = sizeof record;
-  record.version = kDictionaryVersion;
-  record.type = vltComponentDataDictionary;
+  record.version = text.version;
+  record.type = text.type;
   record.name = name.begin();
-  record.identifier = kBuiltInDictionary;
+  record.identifier = text.identifier;
   record.fileName = file.begin();
   record.dictionary.prefix = prefix.begin();
   RegisterDataDictionary(&record);

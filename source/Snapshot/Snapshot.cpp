@@ -1,0 +1,152 @@
+#include <stdexcept>
+#include <system_error>
+
+#include "source/Database/databaseText.h"
+#include "source/Snapshot/DatabaseFile.h"
+#include "source/Snapshot/Rehearsal.h"
+#include "source/Snapshot/Tree.h"
+#include "source/Snapshot/snapshot.hpp"
+#include "vlloader/source/InstallLayout.h"
+#include "zt/fnd/Guid.h"
+#include "zt/fnd/osdep/OSException.h"
+
+using registrar::Narrow;
+using registrar::Widen;
+using zt::fnd::String;
+
+namespace vlt::snapshot {
+namespace {
+
+std::optional<std::string> Setting(const IniDocument& document, const char* item) {
+  std::string text;
+  if (document.GetItem(registrar::kGlobalSection, item, &text) < 0 || text.empty()) {
+    return std::nullopt;
+  }
+  return text;
+}
+
+void ReadSettings(const IniDocument& document, Snapshot* snapshot) {
+  if (auto text = Setting(document, registrar::kSchemaVersion)) {
+    snapshot->schemaVersion = registrar::Number(*text);
+  }
+  if (auto text = Setting(document, registrar::kCacheSize)) {
+    snapshot->cacheSizeBytes = registrar::Number(*text);
+  }
+  if (auto text = Setting(document, registrar::kConfigFile)) {
+    snapshot->configurationFile = Utf8(*text);
+  }
+}
+
+void ReadTree(const Tree& tree, Rehearsal* rehearsal, Snapshot* snapshot) {
+  for (const TreeFile& file : tree.files) {
+    FileState state = rehearsal->stateOf(file.recorded, file.time);
+    snapshot->files.push_back({Utf8(file.here), state});
+  }
+  for (const std::string& path : tree.previousDictionaries) {
+    snapshot->previousDictionaries.push_back(Utf8(path));
+  }
+  snapshot->problems = tree.problems;
+}
+
+// What the database answers, in an installation of this place.
+void Answer(const std::string& bytes, const Place& place, Snapshot* snapshot) {
+  Rehearsal rehearsal(bytes, place);
+  if (!rehearsal.isParsable()) snapshot->database.state = DatabaseState::Unparsable;
+  ReadSettings(rehearsal.document(), snapshot);
+  ReadTree(ReadTree(place), &rehearsal, snapshot);
+  std::vector<std::string> vanished;
+  rehearsal.removeVanished(&vanished);
+  for (const std::string& file : vanished) {
+    snapshot->files.push_back({Utf8(place.toHere(file)), FileState::Vanished});
+  }
+  rehearsal.readComponents(&snapshot->components, &snapshot->bindings);
+}
+
+Snapshot ReadAt(const String& root, bool isInForce) {
+  DatabaseAccess access;
+  Snapshot snapshot;
+  std::string here = Narrow(root);
+  snapshot.root = Utf8(here);
+  DatabaseBytes read = ReadDatabase(here + Narrow(layout::kDatabase), access);
+  snapshot.database = read.database;
+  Place place{here, isInForce ? here : RecordedRoot(read.bytes, here)};
+  Answer(read.bytes, place, &snapshot);
+  return snapshot;
+}
+
+// The library's exceptions end here: they are no part of this interface.
+template <class Step>
+Snapshot WithStandardErrors(Step step) {
+  try {
+    return step();
+  } catch (const zt::fnd::osdep::PosixError& error) {
+    throw std::system_error(static_cast<int>(error.whatcode()), std::generic_category(),
+                            "the installation cannot be read");
+  } catch (const zt::fnd::exception::Exception& error) {
+    throw std::runtime_error(error.what());
+  }
+}
+
+}  // namespace
+
+Snapshot Read() {
+  return WithStandardErrors([] {
+    String root = layout::InstallRoot();
+    if (root.empty()) throw std::runtime_error("the preference \"Dir\" names no directory");
+    return ReadAt(root, true);
+  });
+}
+
+Snapshot Read(const std::string& root) {
+  if (root.empty()) throw std::runtime_error("no directory");
+  return WithStandardErrors([&] { return ReadAt(layout::FileIn(Widen(root), L""), false); });
+}
+
+const char* NameOf(Type type) {
+  switch (type) {
+    case Type::Dictionary:
+      return "dictionary";
+    case Type::ObjectExpert:
+      return "object expert";
+    case Type::ResourceExpert:
+      break;
+  }
+  return "resource expert";
+}
+
+const Component* Snapshot::find(const std::string& guid) const {
+  std::optional<std::string> wanted = ParseGuid(guid);
+  for (const Component& component : components) {
+    if (wanted && component.guid == *wanted) return &component;
+  }
+  return nullptr;
+}
+
+std::vector<std::string> Snapshot::boundTo(Type type, const std::string& bindingClass) const {
+  std::optional<std::string> wanted = ParseGuid(bindingClass);
+  std::vector<std::string> found;
+  for (const Binding& binding : bindings) {
+    if (binding.type == type && wanted && binding.bindingClass == *wanted) {
+      found.push_back(binding.component);
+    }
+  }
+  return found;
+}
+
+unsigned Snapshot::changes() const {
+  unsigned count = 0;
+  for (const RegistrationFile& file : files) count += file.state != FileState::Unchanged;
+  return count;
+}
+
+std::optional<std::string> ParseGuid(const std::string& text) {
+  try {
+    bool hasBrace = text.find('{') != std::string::npos;
+    return GuidText(zt::fnd::Guid(Widen(hasBrace ? text : "{" + text + "}")).get());
+  } catch (const zt::fnd::exception::BadGuidString&) {
+    // A result here.
+    return std::nullopt;
+  }
+}
+
+}  // namespace vlt::snapshot
