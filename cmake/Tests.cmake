@@ -25,7 +25,7 @@ set(slow_tests "Check.AHang*" "ForkThreads.TextBeyond*" "ForkThreads.MutexWithAN
   "Hostile.A*Million*" "Hostile.AHundredThousand*" "IniFileLockLocale.Writers*" "Locales.*" "NamesInLocales.*"
   "NamedEventLimits.StateFilesThatCannot*" "NamedEventLimits.ThousandUnusable*" "NamedEventHostile.LockFileShared*"
   "Planted.Links*" "Planted.SecondNames*" "Planted.Sockets" "PowerCut*" "FailingCall.*" "Prefork.SlowWrites*"
-  "RegistrarKill.*" "Rendezvous*" "vltSettingsTable.EveryChoice*Server")
+  "RegistrarKill.*" "Rendezvous*" "SnapshotRegistrar.*" "vltSettingsTable.EveryChoice*Server")
 list(JOIN slow_tests ":" slow_tests)
 
 # vlt_tests(name LABELS ... [SOURCES ...] [GLOBS ...] [LINKS ...] [TIMEOUT seconds])
@@ -67,6 +67,9 @@ foreach(floor ${VLT_FLOORS})
   if(floor MATCHES "^vlt")
     set(linked vltexports)
   endif()
+  if(floor STREQUAL "vltsnapshot")
+    set(linked vltsnapshot vltexports)
+  endif()
   vlt_tests(${floor}_tests LABELS unit SOURCES ${${floor}_TESTS} LINKS ${linked})
 endforeach()
 
@@ -80,14 +83,19 @@ if(TARGET vltctl_common)
 endif()
 if(TARGET vltutils)
   vlt_tests(oom_tests LABELS e2e TIMEOUT 600 GLOBS tests/oom/*_test.cpp LINKS vltutils)
-  vlt_tests(e2e_tests LABELS e2e TIMEOUT 300 GLOBS tests/e2e/*_test.cpp tests/power/*.cpp
-    LINKS vltutils)
+  vlt_tests(e2e_tests LABELS e2e TIMEOUT 300 GLOBS tests/e2e/*_test.cpp tests/e2e/Random*.cpp
+    tests/power/*.cpp LINKS vltutils)
   if(TARGET e2e_tests)
     find_package(nlohmann_json REQUIRED)
     target_link_libraries(e2e_tests PRIVATE nlohmann_json::nlohmann_json)
     if(TARGET vltctl)
       add_dependencies(e2e_tests vltctl)
     endif()
+    # A program of the snapshot reader's users, which need no later language than its header.
+    add_executable(snapshot_client tests/e2e/snapshot_client.cpp)
+    set_target_properties(snapshot_client PROPERTIES CXX_STANDARD 17)
+    target_link_libraries(snapshot_client PRIVATE vlt_strict vltsnapshot nlohmann_json::nlohmann_json)
+    add_dependencies(e2e_tests snapshot_client)
     target_compile_definitions(e2e_tests PRIVATE
       VLT_TEST_LIBRARY="$<TARGET_FILE:vltutils>" VLT_TEST_BIN="${CMAKE_BINARY_DIR}/bin"
       VLT_TEST_SOURCE="${CMAKE_SOURCE_DIR}")

@@ -119,7 +119,7 @@ void CvltPharlapRegistrar::initSettings() {
   String configuration;
   // Without an installation the text is empty, and the bare name is what is stored.
   dataDirectory(&configuration);
-  configuration += L"config3.vlt";
+  configuration += vlt::layout::kConfiguration;
   SetConfigurationPath(configuration.c_str());
   SetSchemaVersion(0);
 }
@@ -183,7 +183,6 @@ uint32_t Setting(const CvlIniMgr* ini, const char* key, uint32_t fallback) {
 }
 
 constexpr uint32_t kDefaultCacheSizeBytes = 0x2000000;
-constexpr const wchar_t* kBareConfiguration = L"config3.vlt";
 
 }  // namespace
 
@@ -240,7 +239,7 @@ HRESULT CvltPharlapRegistrar::GetConfigurationPath(wchar_t** path) {
     return vlrDuplicateString(L"/Library/Application Support/Zentrex/KOR/Data/config3.vlt", path);
   }
   String value = Widen(stored);
-  if (value != kBareConfiguration) return vlrDuplicateString(value.c_str(), path);
+  if (value != vlt::layout::kConfiguration) return vlrDuplicateString(value.c_str(), path);
   String whole;
   HRESULT result = dataDirectory(&whole);
   whole += value;
@@ -258,7 +257,7 @@ HRESULT CvltPharlapRegistrar::SetConfigurationPath(const wchar_t* path) {
     return S_OK;
   }
   String value(path);
-  if (value == kBareConfiguration) {
+  if (value == vlt::layout::kConfiguration) {
     dataDirectory(&value);
     value += path;
   }

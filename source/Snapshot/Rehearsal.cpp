@@ -90,6 +90,30 @@ FileState Rehearsal::stateOf(const std::string& file, const zt::fnd::AbsTime& ti
   return known ? FileState::Changed : FileState::New;
 }
 
+void Rehearsal::set(const char* key, const std::string& value, bool quote) {
+  if (m_document.SetItem(registrar::kGlobalSection, key, value.c_str(), quote) < 0) {
+    throw std::bad_alloc();
+  }
+  save();
+}
+
+void Rehearsal::beginStart() {
+  using namespace registrar;
+  String root = Widen(m_place.recorded);
+  String configuration = layout::DirectoryIn(root, layout::kData) + layout::kConfiguration;
+  std::string stored;
+  m_document.GetItem(kGlobalSection, kConfigFile, &stored);
+  if (stored.empty() || Widen(stored) != configuration) {
+    set(kConfigFile, Narrow(configuration), true);
+  }
+  stored.clear();
+  m_document.GetItem(kGlobalSection, kSchemaVersion, &stored);
+  if (stored.empty() || Number(stored) != 0) set(kSchemaVersion, Decimal(0), false);
+  RecordText builtIn = BuiltInDictionary(Narrow(layout::DirectoryIn(root, layout::kDictionaries)));
+  if (WriteDictionary(m_document, kBuiltInDictionary, builtIn) < 0) throw std::bad_alloc();
+  save();
+}
+
 void Rehearsal::save() {
   if (m_document.Render(&m_onDisk) != 0 || m_document.Parse(m_onDisk) != 0) throw std::bad_alloc();
   m_texts.clear();

@@ -52,6 +52,8 @@ class Rehearsal {
   bool isParsable() const { return m_isParsable; }
   IniDocument& document() { return m_document; }
 
+  // The settings and the dictionary that every start writes.
+  void beginStart();
   // Compares the files with the database.
   FileState stateOf(const std::string& file, const zt::fnd::AbsTime& time);
   // Drops the components whose registration file is gone; those files, once each, in `vanished`.
@@ -61,6 +63,7 @@ class Rehearsal {
 
  private:
   void save();
+  void set(const char* key, const std::string& value, bool quote);
   bool completeFileName(const std::string& section, registrar::RecordText* record);
   void bind(const GUID& component, Type type, const std::string& file,
             std::vector<Binding>* bindings);

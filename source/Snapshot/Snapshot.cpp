@@ -37,7 +37,7 @@ void ReadSettings(const IniDocument& document, Snapshot* snapshot) {
   }
 }
 
-void ReadTree(const Tree& tree, Rehearsal* rehearsal, Snapshot* snapshot) {
+void AddTree(const Tree& tree, Rehearsal* rehearsal, Snapshot* snapshot) {
   for (const TreeFile& file : tree.files) {
     FileState state = rehearsal->stateOf(file.recorded, file.time);
     snapshot->files.push_back({Utf8(file.here), state});
@@ -48,12 +48,20 @@ void ReadTree(const Tree& tree, Rehearsal* rehearsal, Snapshot* snapshot) {
   snapshot->problems = tree.problems;
 }
 
+// Whether a registrar begins with what the database holds.
+bool IsTaken(DatabaseState state) {
+  return state == DatabaseState::Sound || state == DatabaseState::DigestDiffers ||
+         state == DatabaseState::SidecarMissing;
+}
+
 // What the database answers, in an installation of this place.
 void Answer(const std::string& bytes, const Place& place, Snapshot* snapshot) {
   Rehearsal rehearsal(bytes, place);
   if (!rehearsal.isParsable()) snapshot->database.state = DatabaseState::Unparsable;
+  AddTree(ReadTree(place), &rehearsal, snapshot);
+  if (!IsTaken(snapshot->database.state)) return;
+  rehearsal.beginStart();
   ReadSettings(rehearsal.document(), snapshot);
-  ReadTree(ReadTree(place), &rehearsal, snapshot);
   std::vector<std::string> vanished;
   rehearsal.removeVanished(&vanished);
   for (const std::string& file : vanished) {

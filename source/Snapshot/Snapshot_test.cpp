@@ -102,7 +102,7 @@ TEST_IN_CHILD(Snapshot, AMissingOrUnusableDatabaseHasNoComponents) {
     size_t components;
   } rows[] = {{"\xFF\xFE[\1", "0000000000000000", DatabaseState::Unparsable, 0},
               {"[KORComponents]\nA=A\n", "short", DatabaseState::SidecarShort, 0},
-              {"[KORComponents]\nA=A\n", "0000000000000000", DatabaseState::DigestDiffers, 1}};
+              {"[KORComponents]\nA=A\n", "0000000000000000", DatabaseState::DigestDiffers, 2}};
   for (const auto& row : rows) {
     WriteBytes(s.database(), row.database);
     WriteBytes(s.sidecar(), row.sidecar);

@@ -85,7 +85,8 @@ struct Problem {
   int error = 0;
 };
 
-// The answers of a registrar that starts now and finds no registration file new or changed.
+// The answers of a registrar that starts now and finds no registration file new or changed. None where
+// it would not begin with what the database holds: where that is missing, set aside or unreadable.
 struct Snapshot {
   std::string root;  // ends in a slash
   Database database;

@@ -17,9 +17,10 @@ namespace vlt::layout {
 inline constexpr const wchar_t* kDatabase = L"vlt.vlr";
 inline constexpr const wchar_t* kHookFile = L"VLTHooks.ini";
 inline constexpr const wchar_t* kData = L"Data";
-inline constexpr const wchar_t* kJar = L"vltjar.ini";          // in kData
-inline constexpr const wchar_t* kSettings = L"kor.ini";        // in kData
-inline constexpr const wchar_t* kDiagnostics = L"vldiag.ini";  // in kData
+inline constexpr const wchar_t* kConfiguration = L"config3.vlt";  // in kData
+inline constexpr const wchar_t* kJar = L"vltjar.ini";             // in kData
+inline constexpr const wchar_t* kSettings = L"kor.ini";           // in kData
+inline constexpr const wchar_t* kDiagnostics = L"vldiag.ini";     // in kData
 inline constexpr const wchar_t* kDictionaries = L"Data Dictionaries";
 inline constexpr const wchar_t* kPreviousDictionaries = L"Last";  // in kDictionaries
 inline constexpr const wchar_t* kExperts = L"Experts";
