@@ -78,7 +78,8 @@ std::string RandomInstallation::value(const std::string& text) {
 std::string RandomInstallation::section(const std::string& name, bool isDictionary) {
   std::string text = "[" + name + "]\n";
   if (!oneIn(12)) text += "Identifier" + value(guid());
-  if (!oneIn(12)) text += "FileName" + value(oneOf(kFiles));
+  std::string file = oneIn(8) ? root() + "/Data Dictionaries/Last/One.vle" : oneOf(kFiles);
+  if (!oneIn(12)) text += "FileName" + value(file);
   if (isDictionary != oneIn(10)) {
     text +=
         "SchemaVersion = " + std::string(oneOf({"7", "\"8\"", "0", "text", "4294967296"})) + "\n";
@@ -169,13 +170,15 @@ void RandomInstallation::change() {
 }
 
 void RandomInstallation::damage() {
-  switch (any(6)) {
+  auto append = [&](const std::string& text) {
+    if (Exists(database())) WriteBytes(database(), ReadBytes(database()) + text);
+  };
+  switch (any(8)) {
     case 0:
       unlink(sidecar().c_str());
       break;
     case 1:
-      if (Exists(database()))
-        WriteBytes(database(), ReadBytes(database()) + "[Added]\nby = \"hand\"\n");
+      append("[Added]\nby = \"hand\"\n");
       break;
     case 2:
       if (Exists(database())) WriteBytes(database() + ".durable", ReadBytes(database()));
@@ -183,6 +186,18 @@ void RandomInstallation::damage() {
       break;
     case 3:
       unlink(database().c_str());
+      break;
+    case 4:
+    case 5:
+      append("[KORComponents]\nHand = \"Hand\"\n" + section("Hand", false) +
+             "[KORComponents]\nBare = \"Bare\"\n[Bare]\nPnP = \"x\"\nFileName = \"" +
+             oneOf({"", "one.vle", "two.vle"}) + "\"\n");
+      break;
+    case 6:
+      fs::create_directories(root() + "/Data Dictionaries/Last");
+      WriteBytes(root() + "/Data Dictionaries/Last/vlt.vlr",
+                 "[KORComponents]\nL = L\n[L]\nFileName = \"/One.vle\"\nBINDING_CLASSES" +
+                     value(bindingClasses()));
       break;
     default:
       break;
