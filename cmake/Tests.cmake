@@ -25,7 +25,7 @@ set(slow_tests "Check.AHang*" "ForkThreads.TextBeyond*" "ForkThreads.MutexWithAN
   "Hostile.A*Million*" "Hostile.AHundredThousand*" "IniFileLockLocale.Writers*" "Locales.*" "NamesInLocales.*"
   "NamedEventLimits.StateFilesThatCannot*" "NamedEventLimits.ThousandUnusable*" "NamedEventHostile.LockFileShared*"
   "Planted.Links*" "Planted.SecondNames*" "Planted.Sockets" "PowerCut*" "FailingCall.*" "Prefork.SlowWrites*"
-  "RegistrarKill.*" "Rendezvous*" "SnapshotRegistrar.*" "vltSettingsTable.EveryChoice*Server")
+  "RegistrarKill.*" "Rendezvous*" "SnapshotRegistrar.*" "SnapshotStart.*" "vltSettingsTable.EveryChoice*Server")
 list(JOIN slow_tests ":" slow_tests)
 
 # vlt_tests(name LABELS ... [SOURCES ...] [GLOBS ...] [LINKS ...] [TIMEOUT seconds])

@@ -6,6 +6,7 @@
 #include "source/Common/vltBindingClasses.h"
 #include "source/Database/contentsWalk.h"
 #include "source/Database/databaseText.h"
+#include "source/Snapshot/DatabaseFile.h"
 #include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/Guid.h"
 
@@ -35,21 +36,6 @@ std::optional<std::string> Utf8IfAny(const std::optional<std::string>& text) {
   return text ? std::optional<std::string>(Utf8(*text)) : std::nullopt;
 }
 
-Component Describe(const std::string& section, const RecordText& record) {
-  Component component;
-  component.type = TypeOf(record);
-  component.name = Utf8(section);
-  component.guid = GuidText(record.identifier);
-  component.file = Utf8IfAny(record.file);
-  component.recordVersion = record.version;
-  component.schemaVersion = record.schemaVersion;
-  component.fragmentRegistered = record.fragmentRegistered;
-  component.lastInstalledSchemaVersion = record.lastInstalledSchemaVersion;
-  component.prefix = Utf8IfAny(record.prefix);
-  component.pnp = Utf8IfAny(record.pnp);
-  return component;
-}
-
 // As the registrar keeps its texts: through the wide form.
 std::string AsKept(const std::string& text) { return Narrow(Widen(text)); }
 
@@ -64,6 +50,26 @@ std::string GuidText(const GUID& guid) {
   String text;
   zt::fnd::Guid(guid).toString(text);
   return Narrow(text);
+}
+
+Component Describe(const IniDocument& document, const Place& place, const std::string& section,
+                   const RecordText& record) {
+  Component component;
+  component.type = TypeOf(record);
+  component.name = Utf8(section);
+  component.guid = GuidText(record.identifier);
+  component.file = Utf8IfAny(record.file);
+  component.recordVersion = record.version;
+  component.schemaVersion = record.schemaVersion;
+  component.fragmentRegistered = record.fragmentRegistered;
+  component.lastInstalledSchemaVersion = record.lastInstalledSchemaVersion;
+  component.prefix = Utf8IfAny(record.prefix);
+  component.pnp = Utf8IfAny(record.pnp);
+  std::string from;
+  if (document.GetItem(registrar::kContents, section.c_str(), &from) >= 0) {
+    component.registrationFile = Utf8(place.toHere(from));
+  }
+  return component;
 }
 
 std::string Place::exchange(const std::string& path, const std::string& from,
@@ -117,6 +123,28 @@ void Rehearsal::beginStart() {
 void Rehearsal::save() {
   if (m_document.Render(&m_onDisk) != 0 || m_document.Parse(m_onDisk) != 0) throw std::bad_alloc();
   m_texts.clear();
+  ++m_saves;
+}
+
+Rehearsal::Merge Rehearsal::merge(const std::string& file, const zt::fnd::AbsTime& time) {
+  std::string bytes;
+  if (DatabaseAccess().read(m_place.toHere(file), &bytes) != 0) return Merge::Skipped;
+  IniDocument fragment(true);
+  m_scan.beginFile();
+  bool isParsable = fragment.Parse(bytes) == 0;
+  m_scan.eraseComponentsOf(file);
+  int sections = isParsable ? fragment.GetNumberOfSections() : 0;
+  for (int n = 1; n <= sections; ++n) {
+    std::string section;
+    if (fragment.GetNthSectionName(n, &section) < 0) continue;
+    if (!registrar::Scan::isMerged(fragment, section)) continue;
+    // A dictionary that is merged counts as changed; it is asked for by its name as it is kept.
+    bool changed = fragment.ItemExists(AsKept(section).c_str(), registrar::kSchemaVersion) >= 0;
+    m_scan.mergeSection(fragment, Widen(m_place.recorded), file, section, changed);
+  }
+  m_scan.setStamp(file, time);
+  save();
+  return isParsable ? Merge::Merged : Merge::SetAside;
 }
 
 void Rehearsal::removeVanished(std::vector<std::string>* vanished) {
@@ -150,11 +178,7 @@ void Rehearsal::readComponents(std::vector<Component>* components, std::vector<B
     RecordText record =
         registrar::ReadRecord(m_document, section, registrar::EmptyFileName::IsNone);
     bool completed = completeFileName(section, &record);
-    Component component = Describe(section, record);
-    std::string from;
-    if (m_document.GetItem(registrar::kContents, section.c_str(), &from) >= 0) {
-      component.registrationFile = Utf8(m_place.toHere(from));
-    }
+    Component component = Describe(m_document, m_place, section, record);
     if (component.type != Type::Dictionary) {
       bind(record.identifier, component.type, AsKept(record.file.value_or("")), bindings);
     }

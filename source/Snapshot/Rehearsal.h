@@ -51,11 +51,17 @@ class Rehearsal {
 
   bool isParsable() const { return m_isParsable; }
   IniDocument& document() { return m_document; }
+  // The bytes of the database on disk, and how often they were saved.
+  const std::string& onDisk() const { return m_onDisk; }
+  unsigned saves() const { return m_saves; }
 
   // The settings and the dictionary that every start writes.
   void beginStart();
   // Compares the files with the database.
   FileState stateOf(const std::string& file, const zt::fnd::AbsTime& time);
+  // Merges a file that is new or changed. One that cannot be read is skipped, and stays as it is.
+  enum class Merge { Merged, SetAside, Skipped };
+  Merge merge(const std::string& file, const zt::fnd::AbsTime& time);
   // Drops the components whose registration file is gone; those files, once each, in `vanished`.
   void removeVanished(std::vector<std::string>* vanished);
   // Reads all that is listed.
@@ -74,11 +80,16 @@ class Rehearsal {
   IniDocument m_document;
   bool m_isParsable;
   PlacedScan m_scan;
-  std::string m_onDisk;  // the database's bytes
+  std::string m_onDisk;
+  unsigned m_saves = 0;
   // By directory, until the next save.
   std::map<std::string, std::unique_ptr<registrar::ResourceTexts>> m_texts;
   std::map<std::string, std::unique_ptr<CvltBindingClasses>> m_classesByFile;
 };
+
+// What a section that is listed says. `place` for the path of its registration file.
+Component Describe(const IniDocument& document, const Place& place, const std::string& section,
+                   const registrar::RecordText& record);
 
 // UTF-8 of a text of the database.
 std::string Utf8(const std::string& text);

@@ -1,11 +1,9 @@
-#include <stdexcept>
-#include <system_error>
-
+#include "source/Snapshot/snapshot.hpp"
 #include "source/Database/databaseText.h"
 #include "source/Snapshot/DatabaseFile.h"
+#include "source/Snapshot/Opened.h"
 #include "source/Snapshot/Rehearsal.h"
 #include "source/Snapshot/Tree.h"
-#include "source/Snapshot/snapshot.hpp"
 #include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/Guid.h"
 #include "zt/fnd/osdep/OSException.h"
@@ -48,12 +46,6 @@ void AddTree(const Tree& tree, Rehearsal* rehearsal, Snapshot* snapshot) {
   snapshot->problems = tree.problems;
 }
 
-// Whether a registrar begins with what the database holds.
-bool IsTaken(DatabaseState state) {
-  return state == DatabaseState::Sound || state == DatabaseState::DigestDiffers ||
-         state == DatabaseState::SidecarMissing;
-}
-
 // What the database answers, in an installation of this place.
 void Answer(const std::string& bytes, const Place& place, Snapshot* snapshot) {
   Rehearsal rehearsal(bytes, place);
@@ -70,44 +62,22 @@ void Answer(const std::string& bytes, const Place& place, Snapshot* snapshot) {
   rehearsal.readComponents(&snapshot->components, &snapshot->bindings);
 }
 
-Snapshot ReadAt(const String& root, bool isInForce) {
-  DatabaseAccess access;
+Snapshot ReadAt(const Opened& opened) {
   Snapshot snapshot;
-  std::string here = Narrow(root);
-  snapshot.root = Utf8(here);
-  DatabaseBytes read = ReadDatabase(here + Narrow(layout::kDatabase), access);
-  snapshot.database = read.database;
-  Place place{here, isInForce ? here : RecordedRoot(read.bytes, here)};
-  Answer(read.bytes, place, &snapshot);
+  snapshot.root = Utf8(opened.place.here);
+  snapshot.database = opened.database;
+  Answer(opened.bytes, opened.place, &snapshot);
   return snapshot;
-}
-
-// The library's exceptions end here: they are no part of this interface.
-template <class Step>
-Snapshot WithStandardErrors(Step step) {
-  try {
-    return step();
-  } catch (const zt::fnd::osdep::PosixError& error) {
-    throw std::system_error(static_cast<int>(error.whatcode()), std::generic_category(),
-                            "the installation cannot be read");
-  } catch (const zt::fnd::exception::Exception& error) {
-    throw std::runtime_error(error.what());
-  }
 }
 
 }  // namespace
 
 Snapshot Read() {
-  return WithStandardErrors([] {
-    String root = layout::InstallRoot();
-    if (root.empty()) throw std::runtime_error("the preference \"Dir\" names no directory");
-    return ReadAt(root, true);
-  });
+  return WithStandardErrors([] { return ReadAt(OpenInForce()); });
 }
 
 Snapshot Read(const std::string& root) {
-  if (root.empty()) throw std::runtime_error("no directory");
-  return WithStandardErrors([&] { return ReadAt(layout::FileIn(Widen(root), L""), false); });
+  return WithStandardErrors([&] { return ReadAt(OpenAt(root)); });
 }
 
 const char* NameOf(Type type) {

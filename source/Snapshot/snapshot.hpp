@@ -115,6 +115,38 @@ Snapshot Read();
 // another path, on another machine say: recorded paths below that are taken for paths below `root`.
 Snapshot Read(const std::string& root);
 
+// ---- What the next start of a registrar would do.
+
+// An item of the database. None for one that is not there.
+struct ItemChange {
+  std::string section, item;
+  std::optional<std::string> before, after;
+};
+
+struct Start {
+  std::string root;
+  Database database;
+  // False where the registrar does not scan: the database cannot be opened, or is set aside and
+  // nothing answered until the start after this one. `files` is all there is then.
+  bool scans = false;
+  std::vector<RegistrationFile> files;  // in the order of the scan; at last those that vanished
+  std::vector<std::string> setAside;    // registration files that cannot be parsed
+  std::vector<std::string>
+      skipped;  // new or changed ones that cannot be read: they stay as they are
+  // Listed components, by their names.
+  std::vector<Component> added, removed, changed;
+  std::vector<ItemChange> items;
+  unsigned saves = 0;
+  // What the start erases reaches the disk with the next save only.
+  bool leavesErasedOnDisk = false;
+  std::string text;  // the bytes of the database after it
+  std::vector<Problem> problems;
+};
+
+// As Read.
+Start RehearseStart();
+Start RehearseStart(const std::string& root);
+
 // The text form with braces, in upper case; nothing for a text that is no GUID.
 std::optional<std::string> ParseGuid(const std::string& text);
 

@@ -2,6 +2,7 @@
 // the tree. Prints what it finds as JSON.
 //
 //   snapshot_client [ROOT]
+//   snapshot_client --start ROOT
 #include <locale.h>
 #include <stdio.h>
 
@@ -52,11 +53,42 @@ json ToJson(const Snapshot& snapshot) {
   return out;
 }
 
+json Names(const std::vector<Component>& components) {
+  json out = json::array();
+  for (const Component& c : components) out.push_back(c.name);
+  return out;
+}
+
+json ToJson(const Start& start) {
+  json out = {{"scans", start.scans},
+              {"saves", start.saves},
+              {"fromDurableCopy", start.database.readFromDurableCopy},
+              {"added", Names(start.added)},
+              {"removed", Names(start.removed)},
+              {"changed", Names(start.changed)},
+              {"setAside", start.setAside},
+              {"items", json::array()},
+              {"leavesErasedOnDisk", start.leavesErasedOnDisk},
+              {"text", std::vector<unsigned char>(start.text.begin(), start.text.end())}};
+  for (const ItemChange& change : start.items) {
+    out["items"].push_back(
+        {change.section, change.item, OrNull(change.before), OrNull(change.after)});
+  }
+  for (const RegistrationFile& f : start.files) {
+    out["files"][f.path] = static_cast<int>(f.state);
+  }
+  return out;
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
   setlocale(LC_ALL, "");
   try {
+    if (argc > 2) {
+      puts(ToJson(RehearseStart(argv[2])).dump().c_str());
+      return 0;
+    }
     puts(ToJson(argc > 1 ? Read(argv[1]) : Read()).dump().c_str());
     return 0;
   } catch (const std::exception& error) {
