@@ -1,3 +1,6 @@
+// The answer of open() without its effects. The same questions are asked in the same order: the
+// sidecar first, then the file with the digest that it names, then the file without one, as the
+// second opening takes it. Nothing is locked, so that the answer is that of the moment.
 #include <errno.h>
 #include <sys/stat.h>
 
@@ -16,8 +19,8 @@ bool IsDirectory(const std::string& path) {
   return found && fstat(found.get(), &info) == 0 && S_ISDIR(info.st_mode);
 }
 
-// Of a file whose digest is the expected one, or of which none is expected; `taken` is its kind where
-// it can be parsed.
+// Of a file whose digest is the expected one, or of which none is expected; `taken` is its kind
+// where it can be parsed.
 GuardedIniState Judge(const CvlIniMgr::Finding& finding, Kind taken) {
   switch (finding.found) {
     case Found::Readable:

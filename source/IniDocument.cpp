@@ -13,6 +13,7 @@ constexpr int32_t kNoLineLimit = -1;
 constexpr int32_t kQuotesOn = 1;
 
 HRESULT CopyOut(const char* value, char** out) {
+  // The caller has sized the buffer, by contract.
   strcpy(*out, value);
   return S_OK;
 }
@@ -44,6 +45,7 @@ int32_t IniDocument::Parse(std::string_view bytes) {
 int32_t IniDocument::Render(std::string* bytes) const {
   ztini::TextBuffer text;
   int32_t status = ztini::IniRender(m_ini, &text);
+  // Only a whole text: a rendering that ran out of memory leaves the caller's.
   if (status == 0) bytes->assign(text.text(), text.size());
   return status;
 }
@@ -69,6 +71,7 @@ HRESULT GetValue(IniStructForwardReferenceTag* document, const char* section, co
                  bool decoded, Out* out) {
   if (!section || !item || IsNull(out)) return E_POINTER;
   const char* value = Value(document, section, item, decoded);
+  // Sections and items that are missing are not distinguished: callers ask for the value.
   return value ? CopyOut(value, out) : E_FAIL;
 }
 

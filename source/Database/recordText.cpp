@@ -1,3 +1,6 @@
+// How a component is written in the database, in one place for all who read or change it. The type
+// is decided by the items that a section has: a schema version makes a dictionary, "PnP" a resource
+// expert, and anything else is an object expert.
 #include "source/Database/recordText.h"
 
 #include "source/Common/vltcmn.h"
@@ -68,7 +71,9 @@ HRESULT WriteDictionary(IniDocument& database, const std::string& section,
                         const RecordText& record) {
   String identifier;
   zt::fnd::Guid(record.identifier).toString(identifier);
+  // The list has the section's name as item and as value.
   HRESULT result = database.SetItem(kComponents, section.c_str(), section.c_str(), true);
+  // After the first failure nothing more is set, and its result is that of the call.
   auto set = [&](const char* item, const std::string& value, bool quote) {
     if (result >= 0) result = database.SetItem(section.c_str(), item, value.c_str(), quote);
   };

@@ -12,8 +12,8 @@ namespace registrar {
 
 inline constexpr uint32_t kNeverInstalled = 0xFFFFFFFF;
 
-// What a component's section says, as the registrar reads it. Texts are as they are in the database;
-// one that is not there is none.
+// What a component's section says, as the registrar reads it. Texts are as they are in the
+// database; one that is not there is none.
 struct RecordText {
   _vltComponentType type = vltComponentNone;
   uint32_t version = 0;
@@ -33,12 +33,13 @@ enum class EmptyFileName { Counts, IsNone };
 RecordText ReadRecord(const IniDocument& database, const std::string& section,
                       EmptyFileName emptyFileName);
 
-// Lists a dictionary and sets the items of its section. The first negative result ends it: a name that
-// is empty, or out of memory.
+// Lists a dictionary and sets the items of its section. The first negative result ends it: a name
+// that is empty, or out of memory.
 HRESULT WriteDictionary(IniDocument& database, const std::string& section,
                         const RecordText& record);
 
-// The dictionary that every start registers, in the directory of dictionaries, which ends in a slash.
+// The dictionary that every start registers, in the directory of dictionaries, which ends in a
+// slash.
 inline constexpr const char* kBuiltInDictionary = "vltdd";
 RecordText BuiltInDictionary(const std::string& directory);
 

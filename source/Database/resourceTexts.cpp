@@ -1,3 +1,8 @@
+// A question names a file and a key, and is answered from the components of the database whose own
+// file has the same base name. Two things keep many questions cheap: an index from file to sections
+// grows with the walk through the list of components, and each answer is kept under all of the
+// question. The index is built no further than needed: a question without a separator ends at its
+// first match.
 #include "source/Database/resourceTexts.h"
 
 #include <algorithm>
@@ -9,6 +14,7 @@
 namespace registrar {
 namespace {
 
+// Bytes with the terminator; a longer value is cut, and then names another file or none.
 constexpr size_t kFileNameSize = 260;
 
 // What follows the last slash; the whole text without one.
@@ -87,6 +93,8 @@ void ResourceTexts::answer(Query& q) {
     return;
   }
   if (reports()) {
+    // An observer gets the reports of each question as if it were the only one: the walk begins
+    // again.
     m_indexed = 0;
     m_sectionsOf.clear();
     m_answers.clear();
@@ -99,6 +107,8 @@ void ResourceTexts::answer(Query& q) {
     return;
   }
   search(q);
+  // The joined text may be longer than any one; what does not fit is never returned, and need not
+  // be kept.
   q.joined.resize(std::min<size_t>(q.joined.size(), q.maxLength));
   if (!q.outOfMemory) known.emplace(q.target, Answer{q.found, q.joined});
 }

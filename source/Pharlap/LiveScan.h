@@ -9,8 +9,8 @@ class CvlIniMgr;
 
 namespace registrar {
 
-// The registrar's scan: it opens the registration files as guarded files, which sets aside what cannot
-// be parsed. Lives for one CvltPharlapRegistrar::UpdateRegistrationFile. Threads: one.
+// The registrar's scan: it opens the registration files as guarded files, which sets aside what
+// cannot be parsed. Lives for one CvltPharlapRegistrar::UpdateRegistrationFile. Threads: one.
 class LiveScan : public Scan {
  public:
   using Scan::Scan;

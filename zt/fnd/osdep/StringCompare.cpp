@@ -27,9 +27,9 @@ wchar_t Raw(wchar_t c) { return c; }
 int Difference(int a, int b) { return a - b; }
 int Difference(wchar_t a, wchar_t b) { return wcsncmp(&a, &b, 1); }
 
-// The two cases of one ASCII letter, by the table of single bytes, which is quicker to ask than that of wide
-// characters. A letter that folds to another ASCII letter there folds so here, too; that of i in a Turkish
-// locale is no single byte, and is not seen.
+// The two cases of one ASCII letter, by the table of single bytes, which is quicker to ask than
+// that of wide characters. A letter that folds to another ASCII letter there folds so here, too;
+// that of i in a Turkish locale is no single byte, and is not seen.
 bool AreCasesOfALetter(wchar_t a, wchar_t b) {
   if ((a ^ b) != 0x20) return false;
   const wchar_t lower = a | 0x20;
