@@ -3,6 +3,8 @@
 // a word at a time: a folded copy would take memory, which look-up must not need.
 #include "ztini/NameHash.h"
 
+#include <pthread.h>
+
 #include <bit>
 #include <chrono>
 #include <cstring>
@@ -93,15 +95,22 @@ uint64_t FoldedWord(const NameFold& fold, const char* text, size_t length) {
   return word;
 }
 
+// One key for the process: an index may outlive the call that made it, and is asked by any later one.
+// No static of a function: a child that is forked while another thread makes one waits for that thread,
+// which it does not have. pthread_once makes the key again there.
+const Key& ProcessKey() {
+  static pthread_once_t once = PTHREAD_ONCE_INIT;
+  static constinit Key key = {};
+  pthread_once(&once, [] { key = DrawKey(); });
+  return key;
+}
+
 }  // namespace
 
 uint64_t HashName(const NameFold& fold, const char* name) {
-  // One key for the process: an index may outlive the call that made it, and is asked by any later
-  // one.
-  static const Key key = DrawKey();
   const Range range = Trimmed(fold, name);
   const size_t length = static_cast<size_t>(range.end - range.begin);
-  SipState state(key);
+  SipState state(ProcessKey());
   const char* at = range.begin;
   for (size_t left = length / 8; left > 0; --left, at += 8) state.take(FoldedWord(fold, at, 8));
   // What is left of the name, at most seven bytes, with the length in the top one.
