@@ -26,6 +26,7 @@
 #include "source/Common/vltResultOf.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/BinaryFile.h"
+#include "zt/fnd/osdep/LeakedInstance.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/path.h"
 #include "zt/posix/Files.h"
@@ -34,6 +35,7 @@
 
 using zt::fnd::AnsiString;
 using zt::fnd::String;
+using zt::fnd::osdep::LeakedInstance;
 using zt::fnd::osdep::path;
 using zt::fnd::osdep::PosixError;
 using zt::posix::ScopedFd;
@@ -280,8 +282,7 @@ HRESULT CvlIniMgr::MakeSureOfLock() {
 
 void CvlIniMgr::AbandonDocument() {
   // Reachable, so that it is not reported as a leak.
-  static auto* abandoned = new std::vector<IniStructForwardReferenceTag*>;
-  abandoned->push_back(m_ini);
+  LeakedInstance<std::vector<IniStructForwardReferenceTag*>>().push_back(m_ini);
   m_ini = nullptr;
   m_dirty = false;
   m_lockWasLost = true;
