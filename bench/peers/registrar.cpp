@@ -5,13 +5,17 @@
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
+#include <sys/wait.h>
+#include <time.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <filesystem>
 #include <fstream>
 #include <map>
 #include <memory>
 #include <set>
+#include <vector>
 
 #include "bench/peers/Contest.h"
 #include "bench/peers/Parts.h"
@@ -179,6 +183,52 @@ void RunStarts(unsigned bundles) {
        bundles == 1000 ? 15 : 5});
 }
 
+// ---- Processes that start at once take turns at the database.
+
+double Milliseconds() {
+  timespec now;
+  clock_gettime(CLOCK_MONOTONIC, &now);
+  return static_cast<double>(now.tv_sec) * 1e3 + static_cast<double>(now.tv_nsec) / 1e6;
+}
+
+// Starts so many processes; the time from the first fork to the end of the last.
+double StartTogether(int processes) {
+  double begin = Milliseconds();
+  for (int n = 0; n < processes; ++n) {
+    pid_t child = fork();
+    Require(child >= 0, "fork");
+    if (child == 0) {
+      Start();
+      _exit(0);
+    }
+  }
+  for (int n = 0; n < processes; ++n) {
+    int status = -1;
+    Require(wait(&status) > 0 && status == 0, "a start beside others");
+  }
+  return Milliseconds() - begin;
+}
+
+double Median(std::vector<double> values) {
+  std::nth_element(values.begin(), values.begin() + static_cast<long>(values.size() / 2),
+                   values.end());
+  return values[values.size() / 2];
+}
+
+void RunTurns() {
+  constexpr int kRounds = 15;
+  puts("row  second starts at once, 1000 bundles: total, and what each costs beyond one alone");
+  double alone = 0;
+  for (int processes : {1, 2, 4, 8, 16}) {
+    std::vector<double> totals;
+    for (int round = 0; round < kRounds; ++round) totals.push_back(StartTogether(processes));
+    double total = Median(totals);
+    if (processes == 1) alone = total;
+    printf("20   %2d processes %8.1f ms %8.2f ms\n", processes, total, total / processes - alone);
+    fflush(stdout);
+  }
+}
+
 GUID Id(unsigned n) {
   return {n + 1, 0x1111, 0x4222, {0x83, 0x33, 0x44, 0x44, 0x44, 0x44, 0x44, 0x44}};
 }
@@ -209,6 +259,7 @@ void RunAnswers(unsigned components) {
 
 void RunRegistrar() {
   RunStarts(1000);
+  RunTurns();
   RunAnswers(1000);
   RunStarts(3000);
   RunStarts(10000);
