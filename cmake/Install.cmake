@@ -3,20 +3,9 @@
 include(CMakePackageConfigHelpers)
 
 set(packages ${CMAKE_INSTALL_LIBDIR}/cmake/vltutils)
-install(TARGETS vltutils EXPORT vltutilsTargets
-  LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}
-  INCLUDES DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/vltutils)
+install(TARGETS vltutils EXPORT vltutilsTargets LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
 install(EXPORT vltutilsTargets NAMESPACE vltutils:: DESTINATION ${packages})
-
-# Headers keep their places below the tree's root, as they name each other by them.
-foreach(header
-    source/Common/ZtUtils/General/vlt_vlTracer.h
-    source/Utilities/vltutils.h source/Common/vltInterfaces.h source/Common/vltTypes.h
-    zt/fnd/Exception.h zt/fnd/GuidType.h zt/fnd/StringFwd.h zt/fnd/osdep/OSException.h
-    ztcom/ztcore/ztunknown.h)
-  get_filename_component(directory ${header} DIRECTORY)
-  install(FILES ${header} DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/vltutils/${directory})
-endforeach()
+install(DIRECTORY ${CMAKE_BINARY_DIR}/include/vltutils DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
 
 write_basic_package_version_file(${CMAKE_BINARY_DIR}/vltutilsConfigVersion.cmake
   COMPATIBILITY SameMajorVersion)
@@ -30,7 +19,7 @@ file(RELATIVE_PATH up /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
 file(WRITE ${CMAKE_BINARY_DIR}/vltutils.pc
 "prefix=\${pcfiledir}/${up}
 libdir=\${prefix}/${CMAKE_INSTALL_LIBDIR}
-includedir=\${prefix}/${CMAKE_INSTALL_INCLUDEDIR}/vltutils
+includedir=\${prefix}/${CMAKE_INSTALL_INCLUDEDIR}
 
 Name: vltutils
 Description: Client-side support of a configuration storage service

@@ -17,5 +17,25 @@ target_link_options(vltutils PRIVATE -Wl,--version-script=${exports} -Wl,-z,node
 if(NOT VLT_SANITIZE)
   target_link_options(vltutils PRIVATE -Wl,-z,defs)
 endif()
+
+# The surface as clients see it: one flat directory, <vltutils/...>, whose headers name each other so. In
+# the tree they keep their places, and name each other by them.
+set(surface
+  source/Common/ZtUtils/General/vlt_vlTracer.h
+  source/Utilities/vltutils.h source/Common/vltInterfaces.h source/Common/vltTypes.h
+  zt/fnd/Exception.h zt/fnd/GuidType.h zt/fnd/StringFwd.h zt/fnd/osdep/OSException.h
+  ztcom/ztcore/ztunknown.h client/vltutils.hpp client/results.hpp)
+foreach(header ${surface})
+  file(READ ${PROJECT_SOURCE_DIR}/${header} text)
+  foreach(other ${surface})
+    get_filename_component(name ${other} NAME)
+    string(REPLACE "#include \"${other}\"" "#include <vltutils/${name}>" text "${text}")
+    string(REPLACE "(${other})" "(vltutils/${name})" text "${text}")
+  endforeach()
+  get_filename_component(name ${header} NAME)
+  file(CONFIGURE OUTPUT ${PROJECT_BINARY_DIR}/include/vltutils/${name} CONTENT "${text}" @ONLY)
+  set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/${header})
+endforeach()
 target_include_directories(vltutils INTERFACE
-  $<BUILD_INTERFACE:${CMAKE_SOURCE_DIR}> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/vltutils>)
+  $<BUILD_INTERFACE:${PROJECT_BINARY_DIR}/include> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)
+target_compile_features(vltutils INTERFACE cxx_std_17)

@@ -70,7 +70,11 @@ foreach(floor ${VLT_FLOORS})
   if(floor STREQUAL "vltsnapshot")
     set(linked vltsnapshot vltexports)
   endif()
-  vlt_tests(${floor}_tests LABELS unit SOURCES ${${floor}_TESTS} LINKS ${linked})
+  set(globs)
+  if(floor STREQUAL "vltexports")
+    set(globs client/*_test.cpp)
+  endif()
+  vlt_tests(${floor}_tests LABELS unit SOURCES ${${floor}_TESTS} GLOBS ${globs} LINKS ${linked})
 endforeach()
 
 # Units of the command that use neither form of the library.

@@ -27,6 +27,8 @@ using zt::posix::ScopedFd;
 
 namespace {
 
+constexpr mode_t kParentMode = 0755;
+
 // A fixed name, so that one that a killed process leaves is found and used by the next.
 constexpr const char* kUnfinished = ".NEW";
 
@@ -134,7 +136,9 @@ HRESULT vlrSetFileSecurity(const String& path, int mode) {
 HRESULT vltMakeSharedDirectory(const String& directory) {
   if (path::IsDirectory(directory.c_str()) || MakeOpenDirectory(directory)) return S_OK;
   try {
-    path::CreateDir(directory.c_str());
+    // The levels above are no place to share, but every user has to come through: made by root under a
+    // strict mask they would shut all others out.
+    path::CreateDir(directory.c_str(), kParentMode);
   } catch (const zt::fnd::exception::ObjectAlreadyExists&) {
     // Another process was first, which is as good. A file in its place is not.
     if (!path::IsDirectory(directory.c_str())) throw;

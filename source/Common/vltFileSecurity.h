@@ -19,8 +19,8 @@ HRESULT vltSetFileSecurityImpl(const zt::fnd::String& path, int mode, bool recur
 // root nor the caller owns. S_OK or E_FAIL.
 HRESULT vlrSetFileSecurity(const zt::fnd::String& path, int mode);
 
-// Makes the directory, with the missing ones above it, unless it is there. Its mode becomes
-// kSharedMode; the result is that of the mode change. A process that is killed here leaves the
+// Makes the directory, with the missing ones above it, which get mode 0755, unless it is there. Its
+// mode becomes kSharedMode; the result is that of the mode change. A process that is killed here leaves the
 // directory open to all or not there, where the level above it was there before. Throws what
 // path::CreateDir throws.
 HRESULT vltMakeSharedDirectory(const zt::fnd::String& directory);

@@ -77,10 +77,12 @@ TEST(vltFileSecurity, DateStampIsTodaysLocalDate) {
 
 TEST(vltFileSecurity, SharedDirectoryIsMadeOrRaises) {
   TempDir dir;
+  ASSERT_EQ(chmod(dir.path().c_str(), 0700), 0);
   ScopedUmask strict(077);
   EXPECT_EQ(vltMakeSharedDirectory(zt::fnd::String((dir / "a/b/").c_str())), S_OK);
   EXPECT_EQ(ModeOf(dir / "a/b"), 0777);
-  EXPECT_EQ(ModeOf(dir / "a"), 0700);
+  EXPECT_EQ(ModeOf(dir / "a"), 0755);   // every user can reach what is shared
+  EXPECT_EQ(ModeOf(dir.path()), 0700);  // what was there is left alone
   EXPECT_EQ(vltMakeSharedDirectory(zt::fnd::String((dir / "a/b/").c_str())), S_OK);
   WriteBytes(dir / "file", "");
   EXPECT_THROW(vltMakeSharedDirectory(zt::fnd::String((dir / "file/").c_str())),

@@ -184,7 +184,8 @@ VLT_EXPORT HRESULT vltGetStringResource(const char* separator, const wchar_t* fi
 VLT_EXPORT int vltGetBinaryResource();  // 0: there are none
 // Sets the mode bits, as chmod(2) takes them; with `recursive` also of what a directory holds, but
 // for entries whose name begins with a dot, up to the first failure. A symbolic link is left alone,
-// which is S_OK. E_FAIL where the path names nothing or the system refuses.
+// which is S_OK. E_FAIL where the path names nothing or the system refuses. For the library's own
+// programs: the text class is not installed, and other programs use chmod(2).
 VLT_EXPORT HRESULT vltSetFileSecurity(const zt::fnd::String& path, int mode, bool recursive);
 // Flags of "vlttrace.txt" in the install directory, read once: (second number << 4) | first. 0
 // without the file. The low two bits of the first number ask for early trace lines on standard

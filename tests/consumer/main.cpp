@@ -1,10 +1,10 @@
 // Lists the components by name, one a line; exits with 4 when the library raises InvalidArgument.
+#include <vltutils/Exception.h>
+#include <vltutils/OSException.h>
+#include <vltutils/vltutils.h>
+
 #include <cstdio>
 #include <cstring>
-
-#include "source/Utilities/vltutils.h"
-#include "zt/fnd/Exception.h"
-#include "zt/fnd/osdep/OSException.h"
 
 namespace {
 

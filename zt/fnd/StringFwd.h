@@ -1,7 +1,7 @@
 #pragma once
 
 // Names of the string template and its four instances, for headers that only pass strings by
-// reference or return them. Whoever touches a string includes zt/fnd/String.h.
+// reference or return them. The template itself is the library's own and is not installed.
 
 namespace zt::fnd {
 

@@ -16,7 +16,8 @@ class __attribute__((visibility("default"))) vlt_vlTracer {
   // Which lines are wanted: bit value 2 errors, 0x20 load and unload; the other bits belong to the
   // components. 0 until the log is started. Runs a pending callback first, which may start it.
   static unsigned GetTraceMask();
-  // Of a trace object, a call of a function with its arguments: writes its text, cut to 1023 bytes,
+  // Of a trace object of the library's own kind, which no other program can make: a call of a function
+  // with its arguments. Writes its text, cut to 1023 bytes,
   // with its marker and with detail.
   void TraceArgsHelper();
 };
