@@ -5,6 +5,7 @@
 #include <nlohmann/json.hpp>
 #include <regex>
 #include <string>
+#include <utility>
 
 namespace vlt::test {
 

@@ -3,7 +3,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <filesystem>
+#include <system_error>
 
 #include "tests/support/RegistrarClient.h"
 

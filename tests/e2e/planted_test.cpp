@@ -13,6 +13,7 @@
 
 #include <cstring>
 #include <filesystem>
+#include <system_error>
 
 #include "tests/e2e/HostileInstallation.h"
 #include "tests/e2e/Promises.h"

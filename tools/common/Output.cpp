@@ -5,6 +5,7 @@
 #include <string.h>
 
 #include <algorithm>
+#include <utility>
 
 #include "tools/common/Terminal.h"
 

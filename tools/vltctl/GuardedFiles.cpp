@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <filesystem>
+#include <system_error>
 
 #include "source/IniFileLock.h"
 #include "tools/vltctl/Reading.h"

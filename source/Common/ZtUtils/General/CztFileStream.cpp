@@ -6,6 +6,7 @@
 #include "source/Common/ZtUtils/General/CztFileStream.h"
 
 #include <new>
+#include <utility>
 
 #include "source/Common/ZtUtils/General/CztMemoryStream.h"
 #include "source/Common/ZtUtils/General/ztStreamException.h"

@@ -12,6 +12,7 @@
 #include <climits>
 #include <memory>
 #include <new>
+#include <utility>
 #include <vector>
 
 #include "source/Common/ZtUtils/General/ztStreamException.h"
