@@ -23,6 +23,14 @@ constexpr uid_t kNobody = 65534;
   throw std::system_error(errno, std::generic_category(), what);
 }
 
+// Nothing that is mounted below `root` from here on may show outside. In a changed root directory "/" is
+// often no mount point, and `root` is made one.
+bool HideMounts(const std::string& root) {
+  if (mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0) return true;
+  return mount(root.c_str(), root.c_str(), nullptr, MS_BIND, nullptr) == 0 &&
+         mount(nullptr, root.c_str(), nullptr, MS_PRIVATE, nullptr) == 0;
+}
+
 void BindAll(const std::string& root) {
   for (const auto& entry : fs::directory_iterator("/")) {
     std::string name = entry.path().filename();
@@ -45,28 +53,21 @@ bool EnterPrivateRoot(const std::string& place) {
   std::string root = place + kBelow;
   std::string here = fs::current_path();
   if (unshare(CLONE_NEWNS) != 0) return false;
-  // First of all: nothing that is mounted from here on may show outside.
-  if (mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) Fail("mount");
   fs::create_directory(root);
+  if (!HideMounts(root)) {
+    LeavePrivateRoot(place);
+    rmdir(root.c_str());
+    return false;
+  }
   BindAll(root);
+  // What was bound may be of a group that shows outside. Where `root` is no mount point, all is private.
+  mount(nullptr, root.c_str(), nullptr, MS_REC | MS_PRIVATE, nullptr);
   if (chroot(root.c_str()) != 0 || chdir(here.c_str()) != 0) Fail("chroot");
   return true;
 }
 
-void RemovePrivateRoot(const std::string& place) {
-  std::string root = place + kBelow;
-  std::error_code ignored;
-  fs::remove_all(root + "/" + kOwn, ignored);
-  // One by one, and only what is empty: if a mount were still here, it would be the machine itself.
-  for (fs::directory_iterator entry(root, ignored), end; !ignored && entry != end;
-       entry.increment(ignored)) {
-    if (entry->is_symlink(ignored)) {
-      unlink(entry->path().c_str());
-    } else {
-      rmdir(entry->path().c_str());
-    }
-  }
-  rmdir(root.c_str());
+void LeavePrivateRoot(const std::string& place) {
+  umount2((place + kBelow).c_str(), MNT_DETACH | UMOUNT_NOFOLLOW);
 }
 
 bool BecomeOrdinaryUser(const std::string& place) {

@@ -54,8 +54,11 @@ int RunInside(char** argv) {
     SetUp(root);
     bool privateAlready = getenv("VLT_PRIVATE_ROOT") != nullptr;  // tests/support/in-private-root
     if (geteuid() == 0 && !privateAlready && !vlt::test::EnterPrivateRoot(root)) {
-      fprintf(stderr, "No private root directory: the tests run as an ordinary user.\n");
-      if (!vlt::test::BecomeOrdinaryUser(root)) _exit(97);
+      fprintf(stderr, "No right to mount a root directory of its own: runs as an ordinary user.\n");
+      if (!vlt::test::BecomeOrdinaryUser(root)) {
+        fprintf(stderr, "No right to become one, either.\n");
+        _exit(97);
+      }
     }
     execv("/proc/self/exe", argv);
     _exit(97);
@@ -63,6 +66,7 @@ int RunInside(char** argv) {
   int status = 0;
   while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
   }
+  vlt::test::LeavePrivateRoot(root);
   std::error_code
       ignored;  // What a test made unreadable for its own user stays in the temporary place.
   fs::remove_all(root, ignored);
