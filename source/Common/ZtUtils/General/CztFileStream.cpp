@@ -5,6 +5,9 @@
 // every byte is data.
 #include "source/Common/ZtUtils/General/CztFileStream.h"
 
+#include <errno.h>
+
+#include <algorithm>
 #include <new>
 #include <utility>
 
@@ -40,6 +43,10 @@ bool Succeeds(Step step) {
   }
 }
 
+// A directory opens for reading, but holds no byte. Its size is none, a small or a huge number, as
+// the file system has it, so that it cannot be left to the search for the sub-streams.
+bool IsDirectory(const BinaryFile& file) { return file.read(nullptr, 0) < 0 && errno == EISDIR; }
+
 }  // namespace
 
 CztFileStream* CztFileStream::CreateStream(const zt::fnd::String& name, bool truncate, bool read,
@@ -65,7 +72,10 @@ bool CztFileStream::Init(const zt::fnd::String& name, bool truncate, bool read, 
   auto file = std::make_unique<BinaryFile>();
   if (!Succeeds([&] { file->open(m_fileName, OpenMode(truncate, read, write)); })) return false;
   m_file = std::move(file);
-  if (read && !truncate) LoadSubStreamInfo(write);
+  if (read && !truncate) {
+    if (IsDirectory(*m_file)) throw CztEndOfStreamException();
+    LoadSubStreamInfo(write);
+  }
   return true;
 }
 

@@ -19,7 +19,8 @@ class CztFileStream : public CztStreamBaseImp {
 
   // Opens the file; one that is open is closed first. Writing makes a missing file. A file that is
   // opened for reading and not truncated has its sub-streams loaded. False when it does not open.
-  // Throws what LoadSubStreamInfo throws, std::bad_alloc.
+  // Throws what LoadSubStreamInfo throws, CztEndOfStreamException for a directory that is to be
+  // read, std::bad_alloc.
   bool Init(const zt::fnd::String& name, bool truncate, bool read, bool write);
 
   HRESULT Read(void* buffer, unsigned int count, unsigned int* done) override;
