@@ -20,12 +20,15 @@ if(VLT_PCH)
     <thread> <vector>)
 endif()
 
-# Tests that take more than two seconds. They get the label "slow", and ./dev alone leaves them out.
-set(slow_tests "Check.AHang*" "ForkThreads.TextBeyond*" "ForkThreads.MutexWithAName*" "Failures/Oom.EveryCall*"
-  "Hostile.A*Million*" "Hostile.AHundredThousand*" "IniFileLockLocale.Writers*" "Locales.*" "NamesInLocales.*"
-  "NamedEventLimits.StateFilesThatCannot*" "NamedEventLimits.ThousandUnusable*" "NamedEventHostile.LockFileShared*"
-  "Planted.Links*" "Planted.SecondNames*" "Planted.Sockets" "PowerCut*" "FailingCall.*" "Prefork.SlowWrites*"
-  "RegistrarKill.*" "Rendezvous*" "SnapshotRegistrar.*" "SnapshotStart.*" "vltSettingsTable.EveryChoice*Server")
+# Tests that take more than two seconds, by themselves or with their like. They get the label
+# "slow", and ./dev alone leaves them out.
+set(slow_tests "Check.AHang*" "Check.AnExit*" "Failures/Oom.EveryCall*" "FailingCall.*"
+  "FindFiles.ManyEntries*" "ForkThreads.*" "Hostile.A*Million*" "Hostile.AHundredThousand*"
+  "IniFileLockLocale.*" "Locales.*" "NamedEventHostile.LockFileShared*"
+  "NamedEventHostile.SetsLocked*" "NamedEventLimits.StateFilesThatCannot*"
+  "NamedEventLimits.ThousandUnusable*" "NamesInLocales.*" "Planted.*" "PowerCut*"
+  "Prefork.SlowWrites*" "RegistrarKill.*" "Rendezvous*" "SnapshotRegistrar.*" "SnapshotStart.*"
+  "vltSettingsTable.EveryChoice*Server" "WriterReuse.EverySave*")
 list(JOIN slow_tests ":" slow_tests)
 
 # vlt_tests(name LABELS ... [SOURCES ...] [GLOBS ...] [LINKS ...] [TIMEOUT seconds])

@@ -23,8 +23,8 @@ constexpr uid_t kNobody = 65534;
   throw std::system_error(errno, std::generic_category(), what);
 }
 
-// Nothing that is mounted below `root` from here on may show outside. In a changed root directory "/" is
-// often no mount point, and `root` is made one.
+// Nothing that is mounted below `root` from here on may show outside. In a changed root directory
+// "/" is often no mount point, and `root` is made one.
 bool HideMounts(const std::string& root) {
   if (mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0) return true;
   return mount(root.c_str(), root.c_str(), nullptr, MS_BIND, nullptr) == 0 &&
@@ -60,7 +60,8 @@ bool EnterPrivateRoot(const std::string& place) {
     return false;
   }
   BindAll(root);
-  // What was bound may be of a group that shows outside. Where `root` is no mount point, all is private.
+  // What was bound may be of a group that shows outside. Where `root` is no mount point, all is
+  // private.
   mount(nullptr, root.c_str(), nullptr, MS_REC | MS_PRIVATE, nullptr);
   if (chroot(root.c_str()) != 0 || chdir(here.c_str()) != 0) Fail("chroot");
   return true;
