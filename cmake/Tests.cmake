@@ -22,7 +22,7 @@ endif()
 
 # Tests that take more than two seconds, by themselves or with their like. They get the label
 # "slow", and ./dev alone leaves them out.
-set(slow_tests "Check.AHang*" "Check.AnExit*" "Failures/Oom.EveryCall*" "FailingCall.*"
+set(slow_tests "Check.AHang*" "Check.AnExit*" "CheckBundles.Thousands*" "Failures/Oom.EveryCall*" "FailingCall.*"
   "FindFiles.ManyEntries*" "ForkThreads.*" "Hostile.A*Million*" "Hostile.AHundredThousand*"
   "IniFileLockLocale.*" "Locales.*" "NamedEventHostile.LockFileShared*"
   "NamedEventHostile.SetsLocked*" "NamedEventLimits.StateFilesThatCannot*"
@@ -83,6 +83,7 @@ endforeach()
 # Units of the command that use neither form of the library.
 if(TARGET vltctl_common)
   vlt_tests(tools_tests LABELS unit GLOBS tools/common/*_test.cpp tools/vltctl-client/LibraryTrust*.cpp
+    tools/vltctl-client/Candidates*.cpp
     LINKS vltctl_common)
   if(TARGET tools_tests)
     target_compile_definitions(tools_tests PRIVATE VLT_TEST_SOURCE="${CMAKE_SOURCE_DIR}")

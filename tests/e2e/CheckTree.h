@@ -47,6 +47,7 @@ class Experts : public Installation {
 struct Found {
   int exitCode;
   bool sound;
+  std::string code;  // empty for a sound one
   Messages messages, notes;
 };
 
@@ -56,9 +57,11 @@ inline Found Check(uint32_t n) {
   const nlohmann::json& out = result.items;
   if (out.size() != 1) {
     ADD_FAILURE() << out << result.err;
-    return {result.exitCode, false, {}, {}};
+    return {result.exitCode, false, {}, {}, {}};
   }
-  return {result.exitCode, out[0]["sound"], out[0]["messages"], out[0]["notes"]};
+  std::string code = out[0]["code"].is_null() ? "" : out[0]["code"];
+  EXPECT_EQ(out[0]["sound"], code.empty());
+  return {result.exitCode, out[0]["sound"], code, out[0]["messages"], out[0]["notes"]};
 }
 
 inline std::string AtLoad(const std::string& statement) {

@@ -58,16 +58,18 @@ std::pair<HRESULT, Messages> Checked(GUID id) {
   return {result, messages};
 }
 
-// The library is reported by the export, in a fresh process, and by the tool, with these notes.
-void ExpectTold(uint32_t n, const Messages& messages, const Messages& notes) {
+// The library is reported by the export, in a fresh process, with these messages, and by the tool with
+// its own.
+void ExpectTold(uint32_t n, const Messages& byTheExport, const std::string& code,
+                const Messages& messages, const Messages& notes) {
   ExpectStart([&](IvltRegistrar&) {
     auto [result, reported] = Checked(G(n));
-    EXPECT_EQ(result, messages.empty() ? S_OK : E_FAIL);
-    EXPECT_EQ(reported, messages);
+    EXPECT_EQ(result, byTheExport.empty() ? S_OK : E_FAIL);
+    EXPECT_EQ(reported, byTheExport);
   });
   Found found = Check(n);
-  EXPECT_EQ(found.exitCode, messages.empty() ? kGood : kNotFound);
-  EXPECT_EQ(found.sound, messages.empty());
+  EXPECT_EQ(found.exitCode, code.empty() ? kGood : kNotFound);
+  EXPECT_EQ(found.code, code);
   EXPECT_EQ(found.messages, messages);
   EXPECT_EQ(found.notes, notes);
 }
@@ -77,19 +79,20 @@ void ExpectTold(uint32_t n, const Messages& messages, const Messages& notes) {
 TEST(Check, ASoundLibraryHasNothingToTell) {
   Experts e;
   Build(e.add(1, "good"), kGoodEntry);
-  ExpectTold(1, {}, {});
+  ExpectTold(1, {}, "", {}, {});
   ProgramResult text = Vltctl({"check", GText(1)});
   EXPECT_EQ(text.exitCode, kGood);
-  EXPECT_EQ(text.out, "object expert good: sound\n");
+  EXPECT_EQ(text.out, "object expert good: sound\n1 component: sound\n");
 }
 
 TEST(Check, AMissingEntryPoint) {
   Experts e;
   std::string file = e.add(1, "bare");
   Build(file, "extern \"C\" int vltCreateObjectExpertToo() { return 0; }\n");
-  ExpectTold(1, {HasNoEntry(file)}, {});
+  const std::string told = file + " does not export \"vltCreateObjectExpert\"";
+  ExpectTold(1, {HasNoEntry(file)}, "no-entry-point", {told}, {});
   ProgramResult text = Vltctl({"check", GText(1)});
-  EXPECT_EQ(text.out, "object expert bare: NOT SOUND\n  " + HasNoEntry(file) + "\n");
+  EXPECT_EQ(text.out, "object expert bare: NOT SOUND\n  " + told + "\n1 component: 1 not sound\n");
 }
 
 TEST(Check, AMissingDependency) {
@@ -100,7 +103,8 @@ TEST(Check, AMissingDependency) {
   Build(file, std::string("int gone(); int use() { return gone(); }\n") + kGoodEntry,
         {"-L" + dir.path(), "-lvlt_gone"});
   std::filesystem::remove(dir / "libvlt_gone.so");
-  ExpectTold(1, {DoesNotLoad(file)},
+  ExpectTold(1, {DoesNotLoad(file)}, "missing-dependency",
+             {file + " needs libvlt_gone.so, which is not found"},
              {"libvlt_gone.so: cannot open shared object file: No such file or directory"});
 }
 
@@ -109,7 +113,9 @@ TEST(Check, AMissingSymbol) {
   std::string file = e.add(1, "unresolved");
   Build(file,
         std::string("extern \"C\" int vltGone(); int use() { return vltGone(); }\n") + kGoodEntry);
-  ExpectTold(1, {DoesNotLoad(file)}, {file + ": undefined symbol: vltGone"});
+  ExpectTold(1, {DoesNotLoad(file)}, "undefined-symbol",
+             {file + " uses \"vltGone\", which no library that it needs has"},
+             {file + ": undefined symbol: vltGone"});
 }
 
 TEST(Check, ATextFileAndAnEmptyOne) {
@@ -117,8 +123,10 @@ TEST(Check, ATextFileAndAnEmptyOne) {
   std::string text = e.add(1, "text"), empty = e.add(2, "empty");
   WriteBytes(text, std::string(200, 't'));
   WriteBytes(empty, "");
-  ExpectTold(1, {DoesNotLoad(text)}, {text + ": invalid ELF header"});
-  ExpectTold(2, {DoesNotLoad(empty)}, {empty + ": file too short"});
+  ExpectTold(1, {DoesNotLoad(text)}, "not-a-library", {text + " is no library"},
+             {text + ": invalid ELF header"});
+  ExpectTold(2, {DoesNotLoad(empty)}, "not-a-library", {empty + " is no library"},
+             {empty + ": file too short"});
 }
 
 TEST(Check, ALibraryThatIsCutAtAnyPlaceTakesNothingDown) {
@@ -140,18 +148,19 @@ TEST(Check, ALibraryForTheOtherWordSize) {
   std::string file = e.add(1, "foreign");
   BuildForTheOtherWordSize(file);
   bool is64 = sizeof(void*) == 8;
-  ExpectTold(1, {DoesNotLoad(file)},
-             {file + ": wrong ELF class: " + (is64 ? "ELFCLASS32" : "ELFCLASS64"),
-              is64 ? "the library is built for 32 bits, this program for 64"
-                   : "the library is built for 64 bits, this program for 32"});
+  ExpectTold(1, {DoesNotLoad(file)}, "wrong-class",
+             {file + (is64 ? " is built for 32 bits, this program for 64"
+                           : " is built for 64 bits, this program for 32")},
+             {file + ": wrong ELF class: " + (is64 ? "ELFCLASS32" : "ELFCLASS64")});
 }
 
 TEST(Check, AMissingFileAndADirectoryDoNotExist) {
   Experts e;
   std::string missing = e.add(1, "missing"), directory = e.add(2, "directory");
   std::filesystem::create_directory(directory);
-  ExpectTold(1, {IsNot("does not exist", missing)}, {});
-  ExpectTold(2, {IsNot("does not exist", directory)}, {});
+  ExpectTold(1, {IsNot("does not exist", missing)}, "missing", {missing + " does not exist"}, {});
+  ExpectTold(2, {IsNot("does not exist", directory)}, "no-library",
+             {directory + " has none of libdirectory.so, directory.so and directory"}, {});
 }
 
 // Another user may write everywhere in the installation and where the locks are, but for the place whose
@@ -191,7 +200,8 @@ TEST_IN_CHILD(Check, TheToolToldOfAFileThatMayNotBeRead) {
   }
   Found found = Check(1);
   EXPECT_EQ(found.exitCode, kNotFound);
-  EXPECT_EQ(found.messages, Messages{IsNot("is not readable", file)});
+  EXPECT_EQ(found.code, "unreadable");
+  EXPECT_EQ(found.messages, Messages{file + " cannot be read: Permission denied"});
 }
 
 // ---- Paths that the system does not even let the check look at
@@ -199,7 +209,8 @@ TEST_IN_CHILD(Check, TheToolToldOfAFileThatMayNotBeRead) {
 TEST(Check, ANameThatIsTooLong) {
   Experts e;
   std::string file = e.add(GText(1), "long", e.file(std::string(300, 'x')));
-  ExpectTold(1, {IsNot("is not readable", file)}, {});
+  ExpectTold(1, {IsNot("is not readable", file)}, "unreachable",
+             {file + " cannot be reached: File name too long"}, {});
 }
 
 // The list has the problems of all, those after such a path too.
@@ -221,7 +232,8 @@ TEST(Check, LinksThatGoInCircles) {
   Experts e;
   std::string file = e.add(1, "circle");
   std::filesystem::create_symlink(file, file);
-  ExpectTold(1, {IsNot("is not readable", file)}, {});
+  ExpectTold(1, {IsNot("is not readable", file)}, "unreachable",
+             {file + " cannot be reached: Too many levels of symbolic links"}, {});
 }
 
 TEST(Check, ADirectoryThatMayNotBeEntered) {
@@ -236,25 +248,27 @@ TEST(Check, ADirectoryThatMayNotBeEntered) {
   OpenAllBut(e, e.root() + "/locked", 0700);
   ExpectInChild([&] {
     ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
-    ExpectTold(1, {IsNot("is not readable", file)}, {});
+    ExpectTold(1, {IsNot("is not readable", file)}, "unreachable",
+               {file + " cannot be reached: Permission denied"}, {});
   });
 }
 
 // ---- Libraries that do harm while they are loaded. Only the tool survives them.
 
-void ExpectNote(const std::string& statement, const std::string& note) {
+void ExpectFate(const std::string& statement, const std::string& code, const std::string& fate) {
   Experts e;
   Build(e.add(1, "harm"), AtLoad(statement));
   Found found = Check(1);
   EXPECT_EQ(found.exitCode, kNotFound) << statement;
   EXPECT_FALSE(found.sound) << statement;
-  EXPECT_EQ(found.messages, Messages{}) << statement;
-  EXPECT_EQ(found.notes, Messages{note}) << statement;
+  EXPECT_EQ(found.code, code) << statement;
+  EXPECT_EQ(found.messages, Messages{fate}) << statement;
+  EXPECT_EQ(found.notes, Messages()) << statement;
 }
 
 TEST(Check, ACrashAtLoad) {
-  ExpectNote("abort();", "the process that loaded the library died: Aborted");
-  ExpectNote("signal(SIGSEGV, SIG_DFL); raise(SIGSEGV);",
+  ExpectFate("abort();", "died", "the process that loaded the library died: Aborted");
+  ExpectFate("signal(SIGSEGV, SIG_DFL); raise(SIGSEGV);", "died",
              "the process that loaded the library died: Segmentation fault");
 }
 
@@ -262,14 +276,17 @@ TEST(Check, ACrashAtLoad) {
 TEST(Check, AnExitAtLoadIsNeverSound) {
   for (int code : {0, 1, 7}) {
     std::string text = std::to_string(code);
-    ExpectNote("exit(" + text + ");", "the library ended its process with " + text);
-    ExpectNote("_exit(" + text + ");", "the library ended its process with " + text);
+    ExpectFate("exit(" + text + ");", "ended-its-process",
+               "the library ended its process with " + text);
+    ExpectFate("_exit(" + text + ");", "ended-its-process",
+               "the library ended its process with " + text);
   }
 }
 
 TEST(Check, AHangAtLoadEndsAtTheTimeLimit) {
   auto begin = std::chrono::steady_clock::now();
-  ExpectNote("for (;;) pause();", "the library did not load within 10 s; its process was killed");
+  ExpectFate("for (;;) pause();", "hangs",
+             "the library did not load within 10 s; its process was killed");
   std::chrono::duration<double> taken = std::chrono::steady_clock::now() - begin;
   printf("a library that hangs: %.1f s\n", taken.count());
   EXPECT_GE(taken.count(), 10);
@@ -306,7 +323,7 @@ TEST(Check, WhatALibraryPrintsAtLoadIsNotShown) {
         AtLoad("(void)!write(1, \"MMMnoise\\n\", 9); (void)!write(2, \"E\\n\", 2);"));
   ProgramResult result = Vltctl({"check", GText(1)});
   EXPECT_EQ(result.exitCode, kGood);
-  EXPECT_EQ(result.out, "object expert noisy: sound\n");
+  EXPECT_EQ(result.out, "object expert noisy: sound\n1 component: sound\n");
   EXPECT_EQ(result.err, "");
 }
 
@@ -321,13 +338,14 @@ TEST(Check, OneBadLibraryHidesNoOther) {
   EXPECT_EQ(result.exitCode, kNotFound);
   EXPECT_NE(result.out.find("object expert good: sound\n"
                             "object expert crash: NOT SOUND\n"
-                            "    the process that loaded the library died: Aborted\n"
+                            "  the process that loaded the library died: Aborted\n"
                             "object expert missing: NOT SOUND\n"
                             "  " +
-                            IsNot("does not exist", missing) + "\n"),
+                            missing + " does not exist\n"),
             std::string::npos)
       << result.out;
-  EXPECT_NE(result.out.find("dictionary vltdd: NOT SOUND\n"), std::string::npos);
+  EXPECT_EQ(result.out.find("dictionary vltdd: sound\n"), 0u);
+  EXPECT_TRUE(result.out.ends_with("\n4 components: 2 not sound\n"));
 }
 
 // The null identifier is the library's word for all components: what the others do, and that one of them
@@ -339,10 +357,10 @@ TEST(Check, AComponentWithoutAnIdentifierIsNotTakenForAll) {
   const char* const kNull = "00000000-0000-0000-0000-000000000000";
   const std::string reported =
       "object expert nameless: NOT SOUND\n"
-      "    it has no identifier of its own, so it cannot be checked alone\n";
+      "  it has no identifier of its own, so no program can ask for it\n";
   ProgramResult one = Vltctl({"check", kNull});
   EXPECT_EQ(one.exitCode, kNotFound);
-  EXPECT_EQ(one.out, reported);
+  EXPECT_EQ(one.out, reported + "1 component: 1 not sound\n");
   ProgramResult all = Vltctl({"check"});
   EXPECT_NE(all.out.find(reported + "object expert crash: NOT SOUND\n"), std::string::npos)
       << all.out;

@@ -12,7 +12,10 @@ constexpr const char* kTool = "The command itself";
 
 constexpr Argument kShow[] = {{"GUID", nullptr, "Identifier, with or without braces", true}};
 constexpr Argument kClasses[] = {{"GUID", nullptr, "Identifier of the class", true}};
-constexpr Argument kCheck[] = {{"GUID", nullptr, "One component; all without"}};
+constexpr Argument kCheck[] = {
+    {"--only-bad", nullptr, "Show the components that are not sound only"},
+    {"--library", nullptr, "Add what the library's own check says, as notes"},
+    {"COMPONENT", nullptr, "Identifier or name of one component; all without"}};
 
 constexpr Argument kSettings[] = {
     {"--index", "N", "Number after the names of the items; 3 without it"},

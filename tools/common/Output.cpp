@@ -80,6 +80,8 @@ void Output::raw(std::string_view text) {
   if (!m_json) Write(text);
 }
 
+void Output::flush() { fflush(stdout); }
+
 void Output::note(std::string_view text) {
   fflush(stdout);
   fprintf(stderr, "vltctl: %s\n", ForTerminal(text).c_str());

@@ -68,6 +68,9 @@ class Output {
   // Text that is printed as it is: scripts.
   void raw(std::string_view text);
 
+  // Writes what was printed so far: the rest may take a while.
+  void flush();
+
   // On standard error, in both forms, as one line.
   void note(std::string_view text);
   // The same, and one element of "problems".

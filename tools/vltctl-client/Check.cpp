@@ -1,43 +1,47 @@
+// The parent hands batches of components to children and reads what they say through a pipe each, in
+// lines: which component is begun, what is found of it, and that it has ended. A library may write into
+// the pipe as well, which is no more than it could do to its own verdict; what root checks of another
+// user's is alone in its child.
 #include "tools/vltctl-client/Check.h"
 
-#include <dlfcn.h>
-#include <elf.h>
 #include <errno.h>
 #include <fcntl.h>
 #include <poll.h>
 #include <signal.h>
+#include <stdio.h>
 #include <string.h>
 #include <sys/prctl.h>
-#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <chrono>
-#include <exception>
-#include <fstream>
+#include <deque>
 #include <memory>
-#include <set>
+#include <optional>
 #include <system_error>
-
-#include "tools/vltctl-client/DropRights.h"
-#include "tools/vltctl-client/LibraryTrust.h"
+#include <thread>
+#include <utility>
 
 namespace vltctl {
 namespace {
 
+using Clock = std::chrono::steady_clock;
+
 constexpr auto kTimeLimit = std::chrono::seconds(10);
 constexpr size_t kTextLimit = 1 << 20;
-constexpr char kMessage = 'M', kNote = 'N', kEnd = 'E';
+constexpr size_t kBatch = 64;
+constexpr char kBegin = 'B', kCode = 'C', kLibrary = 'L', kMessage = 'M', kNote = 'N', kEnd = 'E';
 
 [[noreturn]] void Fail(const char* what) {
   throw std::system_error(errno, std::generic_category(), what);
 }
 
+// ---- The child
+
 // Sends one line to the parent. A text of several lines stays one.
 void Send(int fd, char kind, std::string text) {
-  for (char& c : text) {
-    if (c == '\n') c = ' ';
-  }
+  std::replace(text.begin(), text.end(), '\n', ' ');
   text = kind + text + "\n";
   const char* at = text.data();
   for (size_t left = text.size(); left > 0;) {
@@ -53,245 +57,261 @@ void DieWith(pid_t parent) {
   if (getppid() != parent) _exit(1);
 }
 
-// A library for the other word size is a likely mistake, and the loader's words for it are dark.
-std::string WordSizeNote(const std::string& file) {
-  std::ifstream in(file, std::ios::binary);
-  char ident[EI_NIDENT] = {};
-  in.read(ident, sizeof ident);
-  if (!in || memcmp(ident, ELFMAG, SELFMAG) != 0) return "";
-  int bits = ident[EI_CLASS] == ELFCLASS64 ? 64 : 32;
-  int own = sizeof(void*) * 8;
-  if (bits == own) return "";
-  return "the library is built for " + std::to_string(bits) + " bits, this program for " +
-         std::to_string(own);
-}
-
-// What the loader itself says of the file; nothing if it loads.
-// The check loads no relative path, and neither does this: it would begin in the present directory.
-void SendLoadersWords(int fd, const std::string& file) {
-  struct stat info;
-  if (!file.starts_with('/') || stat(file.c_str(), &info) != 0 || !S_ISREG(info.st_mode)) return;
-  void* handle = dlopen(file.c_str(), RTLD_NOW | RTLD_LOCAL);
-  if (handle) {
-    dlclose(handle);
-    return;
-  }
-  const char* words = dlerror();
-  if (words) Send(fd, kNote, words);
-  std::string note = WordSizeNote(file);
-  if (!note.empty()) Send(fd, kNote, note);
-}
-
-void SendMessages(int fd, IEnumString* list) {
-  wchar_t* text = nullptr;
-  unsigned fetched = 0;
-  while (list->Next(1, &text, &fetched) == S_OK) {
-    Send(fd, kMessage, NarrowText(text));
-    vltFree(text);
-  }
-}
-
-HRESULT CheckByTheLibrary(const Component& component, int fd) {
-  IEnumString* list = nullptr;
-  HRESULT result = vltCheckComponent(ParseGuid(component.guid), &list);
-  if (list) {
-    SendMessages(fd, list);
-    list->Release();
-  }
-  return result;
-}
-
-// What the check raises is a note in place of the messages, which are lost with it.
-HRESULT CheckOrTellWhyNot(const Component& component, int fd) {
-  try {
-    return CheckByTheLibrary(component, fd);
-  } catch (const std::exception& error) {
-    Send(fd, kNote, std::string("the check could not be finished: ") + error.what());
-    return E_FAIL;
-  }
-}
-
-std::string Join(const std::set<uid_t>& users) {
-  std::string out;
-  for (uid_t user : users) out += (out.empty() ? "" : ", ") + std::to_string(user);
+Verdict Refused(const std::string& why) {
+  Verdict out;
+  out.code = "refused";
+  out.messages.push_back(why);
   return out;
 }
 
-// What root must not load, with the reason; or nothing.
-std::string Refusal(const Controllers& controllers) {
-  std::string why;
-  if (!controllers.shared.empty()) {
-    why = "\"" + controllers.shared + "\": " + controllers.reason;
-  } else if (controllers.users.size() > 1) {
-    why = "users " + Join(controllers.users) + " can each change it or a directory on its path";
+void CheckInside(const Component& component, const CheckOptions& options, pid_t parent, int* fd) {
+  Send(*fd, kBegin, "");
+  // A change of user makes the kernel forget whom this process dies with.
+  std::string refusal = PrepareToLoad(component, fd);
+  DieWith(parent);
+  Verdict verdict = refusal.empty() ? CheckLibrary(component) : Refused(refusal);
+  if (refusal.empty() && options.asksLibrary) AddLibrarysWords(component, &verdict);
+  if (!verdict.code.empty()) Send(*fd, kCode, verdict.code);
+  if (!verdict.library.empty()) Send(*fd, kLibrary, verdict.library);
+  for (const std::string& text : verdict.messages) Send(*fd, kMessage, text);
+  for (const std::string& text : verdict.notes) Send(*fd, kNote, text);
+  Send(*fd, kEnd, "");
+}
+
+// ---- The parent
+
+using Jobs = std::deque<size_t>;
+
+class Checker {
+ public:
+  Checker(const std::vector<Component>& components, const CheckOptions& options)
+      : m_components(components), m_options(options), m_verdicts(components.size()) {}
+  ~Checker() {
+    for (auto& worker : m_workers) end(*worker);
   }
-  if (why.empty()) return "";
-  return "not loaded, as root would run the code of other users: " + why +
-         "; check it as an ordinary user, or leave only its owner the right to change the path";
-}
+  Checker(const Checker&) = delete;
+  Checker& operator=(const Checker&) = delete;
 
-// The library's own conversion of the name may lead elsewhere.
-constexpr const char* kInexact =
-    "not loaded, as its path has characters that the locale lacks, and so root cannot see whose it "
-    "is; "
-    "check it in a UTF-8 locale";
+  void run(const std::function<void(const Component&, const Verdict&)>& done);
 
-// Why the process could not become the user, or nothing.
-std::string Become(uid_t user, int* fd) {
-  const char* failed = DetachFromParent(fd);
-  if (!failed) failed = DropRights(user);
-  if (!failed) return "";
-  return "not loaded, as root cannot become user " + std::to_string(user) +
-         ", who can change it: " + failed + "; check it as that user";
-}
+ private:
+  struct Worker {
+    pid_t pid = -1;
+    int fd = -1;
+    Jobs jobs;  // the first one is under way once it has begun
+    bool isAlone = false;
+    bool hasBegun = false;
+    std::string text;      // what is not a whole line yet
+    size_t sizeBytes = 0;  // of what it has said of the present job
+    Clock::time_point deadline;
+    Verdict verdict;
+  };
 
-// Before root loads a library that another user can put there, it becomes that user: a process that
-// shares nothing with the terminal and the files of the command. False, with a note, where it must not
-// be loaded.
-bool PrepareToLoad(const Component& component, pid_t parent, int* fd) {
-  bool isLoaded = component.type != "dictionary" && component.file.starts_with('/');
-  if (geteuid() != 0 || !isLoaded) return true;
-  Controllers controllers = ControllersOfLibrary(component.file);
-  std::string refusal = component.fileIsExact ? Refusal(controllers) : kInexact;
-  if (refusal.empty() && controllers.users.empty()) return true;
-  if (refusal.empty()) refusal = Become(*controllers.users.begin(), fd);
-  if (!refusal.empty()) {
-    Send(*fd, kNote, refusal);
-    return false;
-  }
-  DieWith(parent);  // The change of user has made the kernel forget it.
-  return true;
-}
+  void plan();
+  void start(const Jobs& jobs);
+  void wait();
+  void read(Worker& worker);
+  void take(Worker& worker, const std::string& line);
+  void finish(Worker& worker);
+  void fail(Worker& worker, const char* code, const std::string& fate);
+  int end(Worker& worker);
 
-// The child: exit code 0 for a sound component, 1 for one with problems. Its last word is kEnd, without
-// which the code is foreign: a library may end the process with any code while it is loaded.
-int CheckInside(const Component& component, pid_t parent, int fd) {
-  if (!PrepareToLoad(component, parent, &fd)) {
-    Send(fd, kEnd, "");
-    return 1;
-  }
-  HRESULT result = CheckOrTellWhyNot(component, fd);
-  if (result < 0 && component.type != "dictionary") SendLoadersWords(fd, component.file);
-  Send(fd, kEnd, "");
-  return result < 0 ? 1 : 0;
-}
+  const std::vector<Component>& m_components;
+  const CheckOptions m_options;
+  std::vector<std::optional<Verdict>> m_verdicts;
+  std::deque<Jobs> m_queue;
+  std::vector<std::unique_ptr<Worker>> m_workers;
+};
 
-bool HasEnded(const std::string& text) {
-  const char end[] = {kEnd, '\n', 0};
-  return text == end || text.ends_with(std::string("\n") + end);
-}
-
-// How the reading of what a child says has ended.
-enum class Reading { Ended, TooSlow, TooMuch };
-
-// What came through the pipe until its end, or the child's last word: processes that a library has
-// started keep the pipe open. The library may write into it as well, and so no check says that much.
-Reading ReadUntilEnd(int fd, std::string* text) {
-  auto end = std::chrono::steady_clock::now() + kTimeLimit;
-  char block[4096];
-  for (;;) {
-    auto left = std::chrono::duration_cast<std::chrono::milliseconds>(
-        end - std::chrono::steady_clock::now());
-    pollfd wait = {fd, POLLIN, 0};
-    if (left.count() <= 0 || poll(&wait, 1, static_cast<int>(left.count())) == 0) {
-      return Reading::TooSlow;
+void Checker::plan() {
+  Jobs batch;
+  for (size_t i = 0; i < m_components.size(); ++i) {
+    if (NeedsOtherUser(m_components[i])) {
+      m_queue.push_back({i});
+      continue;
     }
-    ssize_t got = read(fd, block, sizeof block);
-    if (got < 0 && errno == EINTR) continue;
-    if (got <= 0) return Reading::Ended;
-    text->append(block, static_cast<size_t>(got));
-    if (HasEnded(*text)) return Reading::Ended;
-    if (text->size() > kTextLimit) return Reading::TooMuch;
+    batch.push_back(i);
+    if (batch.size() == kBatch) m_queue.push_back(std::exchange(batch, {}));
   }
-}
-
-void Sort(const std::string& text, Finding* finding) {
-  for (size_t begin = 0; begin < text.size();) {
-    size_t end = text.find('\n', begin);
-    if (end == std::string::npos) end = text.size();
-    std::string line = text.substr(begin, end - begin);
-    if (line.starts_with(kMessage)) finding->messages.push_back(line.substr(1));
-    if (line.starts_with(kNote)) finding->notes.push_back(line.substr(1));
-    begin = end + 1;
-  }
+  if (!batch.empty()) m_queue.push_back(batch);
 }
 
 // In a session of its own, so that what a library starts can be ended with it, and has no terminal.
-pid_t StartChild(const Component& component, int (&pipeEnds)[2]) {
-  if (pipe2(pipeEnds, O_CLOEXEC) != 0) Fail("pipe");
+void Checker::start(const Jobs& jobs) {
+  int ends[2];
+  if (pipe2(ends, O_CLOEXEC) != 0) Fail("pipe");
   fflush(nullptr);
-  pid_t parent = getpid();
-  pid_t child = fork();
+  pid_t parent = getpid(), child = fork();
   if (child < 0) Fail("fork");
-  if (child > 0) {
-    close(pipeEnds[1]);
-    return child;
+  if (child == 0) {
+    setsid();
+    DieWith(parent);  // What is typed at the terminal no longer reaches it.
+    close(ends[0]);
+    // What the library prints while it is loaded is not ours.
+    int null = open("/dev/null", O_RDWR | O_CLOEXEC);
+    dup2(null, 1);
+    dup2(null, 2);
+    for (size_t job : jobs) CheckInside(m_components[job], m_options, parent, &ends[1]);
+    _exit(0);
   }
-  setsid();
-  DieWith(parent);  // What is typed at the terminal no longer reaches it.
-  close(pipeEnds[0]);
-  // What the library prints while it is loaded is not ours.
-  int null = open("/dev/null", O_RDWR | O_CLOEXEC);
-  dup2(null, 1);
-  dup2(null, 2);
-  _exit(CheckInside(component, parent, pipeEnds[1]));
+  close(ends[1]);
+  auto worker = std::make_unique<Worker>();
+  worker->pid = child;
+  worker->fd = ends[0];
+  worker->jobs = jobs;
+  worker->isAlone = jobs.size() == 1;
+  worker->deadline = Clock::now() + kTimeLimit;
+  m_workers.push_back(std::move(worker));
 }
 
-// What became of the child, where that is worth a word.
-std::string FateOf(int status, Reading reading, bool ended) {
-  if (reading == Reading::TooSlow) {
-    return "the library did not load within 10 s; its process was killed";
+// Ends the child with all that its libraries have started; returns its status.
+int Checker::end(Worker& worker) {
+  int status = 0;
+  close(worker.fd);
+  kill(worker.pid, SIGKILL);
+  while (waitpid(worker.pid, &status, 0) < 0 && errno == EINTR) {
   }
-  if (reading == Reading::TooMuch) {
-    return "the library wrote more than 1 MiB into the check's pipe; its process was killed";
+  kill(-worker.pid, SIGKILL);
+  worker.pid = -1;
+  return status;
+}
+
+// The job under way has its verdict.
+void Checker::finish(Worker& worker) {
+  size_t job = worker.jobs.front();
+  bool isBad = !worker.verdict.code.empty();
+  if (isBad && !worker.isAlone) {
+    fail(worker, "", "");
+    return;
   }
-  if (WIFSIGNALED(status) && !ended) {
+  m_verdicts[job] = std::exchange(worker.verdict, Verdict());
+  worker.jobs.pop_front();
+  worker.hasBegun = false;
+  worker.sizeBytes = 0;
+  worker.deadline = Clock::now() + kTimeLimit;
+}
+
+// Ends the child. A job that was alone has its fate; others are checked again, each alone.
+void Checker::fail(Worker& worker, const char* code, const std::string& fate) {
+  if (worker.isAlone) {
+    worker.verdict.code = code;
+    worker.verdict.messages.push_back(fate);
+    m_verdicts[worker.jobs.front()] = std::exchange(worker.verdict, Verdict());
+  } else {
+    for (auto job = worker.jobs.rbegin(); job != worker.jobs.rend(); ++job) {
+      m_queue.push_front({*job});
+    }
+  }
+  worker.jobs.clear();
+}
+
+void Checker::take(Worker& worker, const std::string& line) {
+  std::string text = line.substr(1);
+  switch (line[0]) {
+    case kBegin:
+      worker.hasBegun = true;
+      break;
+    case kCode:
+      worker.verdict.code = text;
+      break;
+    case kLibrary:
+      worker.verdict.library = text;
+      break;
+    case kMessage:
+      worker.verdict.messages.push_back(text);
+      break;
+    case kNote:
+      worker.verdict.notes.push_back(text);
+      break;
+    case kEnd:
+      if (worker.hasBegun) finish(worker);
+      break;
+    default:  // a library's
+      break;
+  }
+}
+
+std::string FateOf(int status) {
+  if (WIFSIGNALED(status)) {
     return std::string("the process that loaded the library died: ") + strsignal(WTERMSIG(status));
   }
-  if (!ended) return "the library ended its process with " + std::to_string(WEXITSTATUS(status));
-  return "";
+  return "the library ended its process with " + std::to_string(WEXITSTATUS(status));
 }
 
-bool HasIdentifier(const Component& component) { return component.guid != GuidText(GUID_NULL); }
+void Checker::read(Worker& worker) {
+  char block[65536];
+  ssize_t got = ::read(worker.fd, block, sizeof block);
+  if (got < 0 && errno == EINTR) return;
+  if (got <= 0) {
+    // The end came without a last word, which is the code's own doing; asked for its status alone.
+    int status = 0;
+    while (waitpid(worker.pid, &status, 0) < 0 && errno == EINTR) {
+    }
+    kill(-worker.pid, SIGKILL);
+    close(worker.fd);
+    worker.pid = -1;
+    fail(worker, WIFSIGNALED(status) ? "died" : "ended-its-process", FateOf(status));
+    return;
+  }
+  worker.text.append(block, static_cast<size_t>(got));
+  worker.sizeBytes += static_cast<size_t>(got);
+  for (size_t end; !worker.jobs.empty() && (end = worker.text.find('\n')) != std::string::npos;) {
+    std::string line = worker.text.substr(0, end);
+    worker.text.erase(0, end + 1);
+    if (!line.empty()) take(worker, line);
+  }
+  if (!worker.jobs.empty() && worker.sizeBytes > kTextLimit) {
+    fail(worker, "floods",
+         "the library wrote more than 1 MiB into the check's pipe; its process was killed");
+  }
+}
 
-Finding CheckOne(const Component& component) {
-  Finding finding;
-  finding.component = component;
-  // To the library the null identifier means all components: their problems would be reported as
-  // this one's.
-  if (!HasIdentifier(component)) {
-    finding.notes.push_back("it has no identifier of its own, so it cannot be checked alone");
-    return finding;
+// Waits until a child says something, and for none longer than it may take.
+void Checker::wait() {
+  std::vector<pollfd> fds;
+  auto first = Clock::time_point::max();
+  for (auto& worker : m_workers) {
+    fds.push_back({worker->fd, POLLIN, 0});
+    first = std::min(first, worker->deadline);
   }
-  int pipeEnds[2];
-  pid_t child = StartChild(component, pipeEnds);
-  std::string text;
-  Reading reading = ReadUntilEnd(pipeEnds[0], &text);
-  close(pipeEnds[0]);
-  bool ended = HasEnded(text);
-  if (reading != Reading::Ended) kill(child, SIGKILL);
-  int status = 0;
-  while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
+  auto left = std::chrono::duration_cast<std::chrono::milliseconds>(first - Clock::now()).count();
+  poll(fds.data(), fds.size(), static_cast<int>(std::max<long long>(left + 1, 0)));
+  for (size_t i = 0; i < fds.size(); ++i) {
+    Worker& worker = *m_workers[i];
+    if (fds[i].revents) {
+      read(worker);
+    } else if (Clock::now() >= worker.deadline) {
+      fail(worker, "hangs", "the library did not load within 10 s; its process was killed");
+    }
   }
-  kill(-child, SIGKILL);  // what the library has started and left running
-  Sort(text, &finding);
-  std::string fate = FateOf(status, reading, ended);
-  if (!fate.empty()) finding.notes.push_back(fate);
-  finding.sound =
-      ended && WIFEXITED(status) && WEXITSTATUS(status) == 0 && finding.messages.empty();
-  return finding;
+  std::erase_if(m_workers, [&](auto& worker) {
+    if (!worker->jobs.empty()) return false;
+    if (worker->pid > 0) end(*worker);
+    return true;
+  });
+}
+
+void Checker::run(const std::function<void(const Component&, const Verdict&)>& done) {
+  const size_t most = std::max(1u, std::thread::hardware_concurrency());
+  plan();
+  for (size_t next = 0; next < m_components.size();) {
+    while (m_workers.size() < most && !m_queue.empty()) {
+      Jobs jobs = m_queue.front();
+      m_queue.pop_front();
+      start(jobs);
+    }
+    wait();
+    for (; next < m_components.size() && m_verdicts[next]; ++next) {
+      done(m_components[next], *m_verdicts[next]);
+    }
+  }
 }
 
 }  // namespace
 
-std::vector<Finding> CheckComponents(const Client& client, const std::optional<std::string>& guid) {
-  std::vector<Finding> findings;
-  if (guid) {
-    if (auto component = client.find(*guid)) findings.push_back(CheckOne(*component));
-    return findings;
-  }
-  for (const Component& component : client.list()) findings.push_back(CheckOne(component));
-  return findings;
+void CheckComponents(const std::vector<Component>& components, const CheckOptions& options,
+                     const std::function<void(const Component&, const Verdict&)>& done) {
+  Checker(components, options).run(done);
 }
 
 }  // namespace vltctl

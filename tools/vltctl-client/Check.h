@@ -1,24 +1,26 @@
 #pragma once
 
-#include <optional>
-#include <string>
+#include <functional>
 #include <vector>
 
+#include "tools/vltctl-client/CheckLibrary.h"
 #include "tools/vltctl-client/Component.h"
 
-// The component check, each component in a child process: a library that crashes, hangs or ends its
-// process while it is loaded takes nothing else down. A component that is registered without a readable
-// identifier is never sound: the library has no name for it.
+// The component check in child processes: a library that crashes, hangs or ends its process while it is
+// loaded takes nothing else down.
+//
+// As many children run as there are processors. Each loads many libraries, one after the other, until
+// one is found not sound; that one and all that the child still had to do are then checked in a process
+// each, so that what a library has done to its process is not another one's fault.
 namespace vltctl {
 
-struct Finding {
-  Component component;
-  bool sound = false;
-  std::vector<std::string> messages;  // the library's, as they are
-  // The loader's own words, what the check raised, and what became of the child.
-  std::vector<std::string> notes;
+struct CheckOptions {
+  bool asksLibrary = false;  // vltCheckComponent's words are notes
 };
 
-std::vector<Finding> CheckComponents(const Client& client, const std::optional<std::string>& guid);
+// Calls `done` for each component in the order given, as soon as it and all before it are known.
+// Throws std::system_error where no child can be started.
+void CheckComponents(const std::vector<Component>& components, const CheckOptions& options,
+                     const std::function<void(const Component&, const Verdict&)>& done);
 
 }  // namespace vltctl

@@ -10,6 +10,8 @@
 #include <deque>
 #include <sstream>
 
+#include "tools/vltctl-client/Candidates.h"
+
 namespace vltctl {
 namespace {
 
@@ -138,18 +140,9 @@ Controllers ControllersOf(const std::string& path) {
 
 Controllers ControllersOfLibrary(const std::string& file) {
   Controllers out = ControllersOf(file);
-  size_t slash = file.rfind('/');
-  if (slash == std::string::npos || file.find('.', slash) != std::string::npos) return out;
-  std::string directory = file.substr(0, slash + 1), name = file.substr(slash + 1);
-  std::string library = "lib" + name + ".so";
-  std::deque<std::string> others = {directory + library};
-  for (const char* bundle : {".framework/", ".bundle/"}) {
-    for (const std::string& inside : {library, name + ".so", name}) {
-      others.push_back(file + bundle + inside);
-    }
-  }
-  for (const std::string& other : others) {
-    Controllers more = ControllersOf(other);
+  for (const std::string& candidate : LibraryCandidates(file)) {
+    if (candidate == file) continue;
+    Controllers more = ControllersOf(candidate);
     out.users.insert(more.users.begin(), more.users.end());
     if (!more.shared.empty()) Share(&out, more.shared, more.reason);
   }

@@ -22,8 +22,7 @@ struct Controllers {
 // goes: whoever controls that part can complete it. Never waits; opens nothing.
 Controllers ControllersOf(const std::string& path);
 
-// The same for all that the library may load for a component's file: the loader's rules
-// (zt/fnd/osdep/SharedLibrary.h) turn a name without a dot into others beside it.
+// The same for all files that the loader tries for a component's file (Candidates.h).
 Controllers ControllersOfLibrary(const std::string& file);
 
 }  // namespace vltctl

@@ -2,11 +2,14 @@
 #include <stdio.h>
 
 #include <algorithm>
+#include <cctype>
+#include <optional>
 
 #include "tools/common/Locale.h"
 #include "tools/common/Program.h"
 #include "tools/vltctl-client/Check.h"
 #include "tools/vltctl-client/Component.h"
+#include "tools/vltctl-client/ListOnce.h"
 
 namespace {
 
@@ -128,26 +131,63 @@ int Classes(const Arguments& arguments, Output& output) {
   return kGood;
 }
 
-int Check(const Arguments& arguments, Output& output) {
-  const std::string guid = arguments.text("GUID");
-  Client client;
-  auto findings = vltctl::CheckComponents(
-      client, guid.empty() ? std::nullopt : std::optional<std::string>(guid));
-  if (findings.empty()) throw NoComponent(guid);
-  bool sound = true;
-  for (const vltctl::Finding& finding : findings) {
-    sound = sound && finding.sound;
-    Json item = ToJson(finding.component);
-    item["sound"] = finding.sound;
-    item["messages"] = finding.messages;
-    item["notes"] = finding.notes;
-    output.item(item);
-    output.line(finding.component.type + " " + finding.component.name + ": " +
-                (finding.sound ? "sound" : "NOT SOUND"));
-    for (const std::string& text : finding.messages) output.line("  " + text);
-    for (const std::string& text : finding.notes) output.line("    " + text);
+std::string Bare(std::string guid) {
+  guid.erase(std::remove_if(guid.begin(), guid.end(), [](char c) { return c == '{' || c == '}'; }),
+             guid.end());
+  std::transform(guid.begin(), guid.end(), guid.begin(),
+                 [](unsigned char c) { return toupper(c); });
+  return guid;
+}
+
+// Those that the argument names: by identifier or by name.
+std::vector<Component> Chosen(const std::vector<Component>& all, const std::string& word) {
+  std::vector<Component> chosen;
+  std::vector<std::string> names;
+  for (const Component& c : all) {
+    if (c.name == word || Bare(c.guid) == Bare(word)) chosen.push_back(c);
+    names.push_back(c.name);
   }
-  return sound ? kGood : kNotFound;
+  if (!chosen.empty()) return chosen;
+  std::string guess = vltctl::DidYouMean(word, names);
+  throw Failure(kNotFound, {"no-component", "", "no component " + word, "",
+                            guess.empty() ? "\"vltctl list\" shows all" : guess});
+}
+
+void Show(const Component& component, const vltctl::Verdict& verdict, Output& output) {
+  Json item = ToJson(component);
+  item["sound"] = verdict.code.empty();
+  item["code"] = verdict.code.empty() ? Json() : Json(verdict.code);
+  item["library"] = verdict.library.empty() ? Json() : Json(verdict.library);
+  item["messages"] = verdict.messages;
+  item["notes"] = verdict.notes;
+  output.item(item);
+  output.line(component.type + " " + component.name + ": " +
+              (verdict.code.empty() ? "sound" : "NOT SOUND"));
+  for (const std::string& text : verdict.messages) output.line("  " + text);
+  for (const std::string& text : verdict.notes) output.line("    " + text);
+  output.flush();
+}
+
+std::string Summary(size_t all, size_t bad) {
+  std::string text = std::to_string(all) + (all == 1 ? " component: " : " components: ");
+  if (bad == 0) return text + (all == 1 ? "sound" : "all sound");
+  return text + std::to_string(bad) + " not sound";
+}
+
+int Check(const Arguments& arguments, Output& output) {
+  vltctl::CheckOptions options{arguments.has("--library")};
+  std::optional<Client> client;  // kept, so that the children have it
+  if (options.asksLibrary) client.emplace();
+  std::vector<Component> components = client ? client->list() : vltctl::ListOnce();
+  const std::string word = arguments.text("COMPONENT");
+  if (!word.empty()) components = Chosen(components, word);
+  size_t bad = 0;
+  vltctl::CheckComponents(components, options, [&](const Component& c, const vltctl::Verdict& v) {
+    if (!v.code.empty()) ++bad;
+    if (!v.code.empty() || !arguments.has("--only-bad")) Show(c, v, output);
+  });
+  output.line(Summary(components.size(), bad));
+  return bad == 0 ? kGood : kNotFound;
 }
 
 int Url(const Arguments&, Output& output) {
