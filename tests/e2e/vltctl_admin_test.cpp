@@ -33,17 +33,6 @@ class VltctlAdmin : public testing::Test {
   std::string data;
 };
 
-TEST_F(VltctlAdmin, SettingsTellTheirOrigin) {
-  WriteBytes(data + "/kor.ini", "[STORAGE]\nLocalServerEndpoint3=7\nNumCheckpoints=5\n");
-  auto settings = Rows({"settings"});
-  EXPECT_EQ(settings["LocalServerEndpoint3"]["value"], "7");
-  EXPECT_EQ(settings["LocalServerEndpoint3"]["origin"], data + "/kor.ini [STORAGE]");
-  EXPECT_EQ(settings["BootstrapEndpoint3"]["value"], "62602");
-  EXPECT_EQ(settings["BootstrapEndpoint3"]["origin"], "built-in default");
-  EXPECT_EQ(settings["NumCheckpoints"]["value"], "5");
-  EXPECT_EQ(settings["ClientObjectCacheLimit"]["value"], "150000");
-}
-
 TEST_F(VltctlAdmin, SettingsByIndexNameAndSide) {
   WriteBytes(data + "/other.ini", "[STORAGE]\nLocalServerEndpoint4=9\n");
   auto client = Rows({"settings", "--index", "4", "--name", "other", "--client"});

@@ -84,7 +84,7 @@ const Row kRows[] = {
      [](auto& file, auto&) { WriteBytes(file, Utf16("[a]\n")); }},
     {"unreadable", "fails",
      "the file cannot be read: it is a directory; the next open fails and leaves the file",
-     "make it a file that every user can read", kDataUnusable,
+     "put a readable INI file in its place, or remove it", kDataUnusable,
      [](auto& file, auto&) {
        fs::remove(file);
        fs::create_directory(file);

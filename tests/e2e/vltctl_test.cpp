@@ -1,9 +1,6 @@
 // The command-line client as its users meet it: arguments, output, exit codes.
 #include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
-#include <algorithm>
 #include <sstream>
 
 #include "tests/e2e/Start.h"
@@ -190,39 +187,16 @@ TEST(Vltctl, ClassesOfAnUnknownClassIsNotFound) {
   EXPECT_NE(result.err, "");
 }
 
-// ---- Unusable data
+// ---- Unusable data: tests/e2e/vltctl_bad_situations_test.cpp
 
-TEST(Vltctl, DataThatCannotBeUsedIsToldInOneLine) {
-  auto expectUnusable = [] {
-    for (const std::vector<std::string>& command :
-         {std::vector<std::string>{"list"}, {"show", GText(1)}, {"classes", GText(1)}}) {
-      ProgramResult result = Vltctl(command);
-      EXPECT_EQ(result.exitCode, kDataUnusable) << command[0];
-      EXPECT_EQ(result.out, "");
-      EXPECT_EQ(result.err.substr(0, 8), "vltctl: ");
-      EXPECT_EQ(std::count(result.err.begin(), result.err.end(), '\n'), 1);
-    }
-  };
-  Sample s;
-  Installation::setDir("");
-  expectUnusable();
-  Installation::setDir(s.root());
-  ASSERT_EQ(mkfifo(s.database().c_str(), 0666), 0);
-  expectUnusable();
-  unlink(s.database().c_str());
-  WriteBytes(s.root() + "/Data", "in the way");
-  expectUnusable();
-  unlink((s.root() + "/Data").c_str());
-  EXPECT_EQ(Vltctl({"list"}).exitCode, kGood);
-}
-
-TEST(Vltctl, ADatabaseThatWasSetAsideIsToldAndTheNextCallWorks) {
+TEST(Vltctl, WhatWouldBeSetAsideIsKeptAndRepaired) {
   Sample s;
   ASSERT_EQ(Vltctl({"list"}).exitCode, kGood);
   WriteBytes(s.sidecar(), "short");
-  ProgramResult result = Vltctl({"list"});
-  EXPECT_EQ(result.exitCode, kDataUnusable);
-  EXPECT_NE(result.err.find("set aside"), std::string::npos);
+  std::string before = ReadBytes(s.database());
+  EXPECT_EQ(Vltctl({"list"}).exitCode, kDataUnusable);
+  EXPECT_EQ(ReadBytes(s.database()), before);
+  EXPECT_EQ(Vltctl({"repair"}).exitCode, kGood);
   EXPECT_EQ(Vltctl({"list"}).exitCode, kGood);
 }
 

@@ -22,6 +22,10 @@ constexpr Argument kSettings[] = {
     {"--client", nullptr, "What a client reads"},
     {"--server", nullptr, "What the server reads"},
     {"--name", "NAME", "NAME.ini instead of kor.ini"}};
+constexpr Argument kSettingsSet[] = {
+    {"--name", "NAME", "NAME.ini instead of kor.ini"},
+    {"KEY", nullptr, "Name of the setting, with its index if it has one", true},
+    {"VALUE", nullptr, "What it is to be", true}};
 constexpr Argument kVerify[] = {
     {"--all", nullptr, "The database, the jar and the settings; so it is without files too"},
     {"FILE", nullptr, "An INI file", false, true, kFiles}};
@@ -35,6 +39,11 @@ constexpr Argument kHookArm[] = {
     {"FLAG", nullptr, "hang[=MS], crash, fail, throw, exhaust", true, true,
      "hang crash fail throw exhaust"}};
 
+constexpr Argument kError[] = {
+    {"CODE", nullptr, "A code (0x80040326, -2147220698) or a name (E_FAIL); all without"}};
+constexpr Argument kLocks[] = {
+    {"--sweep", nullptr, "Remove the locks of logs whose processes have ended"}};
+
 constexpr Argument kCompletion[] = {{"SHELL", nullptr,
                                      "bash, zsh or fish; \"man\" is the list of the manual", true,
                                      false, "bash zsh fish man"}};
@@ -45,15 +54,21 @@ constexpr Command kCommands[] = {
     {kComponents, "classes", "The experts that bind to a class of objects", kClasses},
     {kComponents, "check", "Whether the components' files load and offer their entry points",
      kCheck},
-    {kRendezvous, "settings", "Each setting and where it comes from", kSettings},
+    {kRendezvous, "settings", "Settings in force, where they come from, and what is ignored",
+     kSettings},
+    {kRendezvous, "settings set", "Changes a setting, under the file's lock", kSettingsSet},
     {kRendezvous, "jar", "What server and clients have left each other", {}},
-    {kRendezvous, "url", "Where the local server listens", {}},
+    {kRendezvous, "url", "Where a local server of this installation listens", {}},
     {kRendezvous, "identity", "Identity of this machine's server; made if there is none", {}},
     {kRendezvous, "verify", "Guarded INI files and their sidecars, and what the next opening does",
      kVerify},
     {kRendezvous, "repair",
      "Makes guarded INI files such that the next opening takes them; keeps a copy of each",
      kRepair},
+    {kDiagnostics, "doctor", "What is good, doubtful and bad here, and what to do", {}},
+    {kDiagnostics, "paths", "Every place in use, and what decides it", {}},
+    {kDiagnostics, "error", "Name and meaning of a result or exception code", kError},
+    {kDiagnostics, "locks", "Named locks and events, their holders and age", kLocks},
     {kDiagnostics, "trace", "Where the log of this user goes, its options and last lines", {}},
     {kDiagnostics, "events", "Named events of the machine and who holds them", {}},
     {kDiagnostics, "hook list", "Points of fault injection", {}},

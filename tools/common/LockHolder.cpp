@@ -11,18 +11,6 @@
 namespace vltctl {
 namespace {
 
-struct LockLine {
-  pid_t pid;
-  unsigned major, minor;
-  unsigned long long inode;
-};
-
-// "1: FLOCK  ADVISORY  WRITE 25983 fe:00:10970436 0 EOF". Those that wait have "->" before the kind.
-bool Parse(const std::string& line, LockLine* out) {
-  return sscanf(line.c_str(), "%*d: FLOCK %*s %*s %d %x:%x:%llu", &out->pid, &out->major,
-                &out->minor, &out->inode) == 4;
-}
-
 bool HasOpen(pid_t pid, const struct stat& file) {
   std::error_code hidden;
   std::filesystem::directory_iterator fd("/proc/" + std::to_string(pid) + "/fd", hidden), end;
@@ -47,14 +35,23 @@ std::string CommandOf(pid_t pid) {
 
 }  // namespace
 
-std::vector<Process> LockHolders(const std::string& file) {
+// "1: FLOCK  ADVISORY  WRITE 25983 fe:00:10970436 0 EOF". Those that wait have "->" before the kind.
+LockTable::LockTable() {
+  std::ifstream locks("/proc/locks");
+  for (std::string line; std::getline(locks, line);) {
+    Lock lock;
+    bool isLock = sscanf(line.c_str(), "%*d: FLOCK %*s %*s %d %x:%x:%llu", &lock.pid, &lock.major,
+                         &lock.minor, &lock.inode) == 4;
+    if (isLock) m_locks.push_back(lock);
+  }
+}
+
+std::vector<Process> LockTable::holders(const std::string& file) const {
   std::vector<Process> holders;
   struct stat info;
   if (stat(file.c_str(), &info) != 0) return holders;
-  std::ifstream locks("/proc/locks");
-  for (std::string line; std::getline(locks, line);) {
-    LockLine lock;
-    if (!Parse(line, &lock) || lock.inode != info.st_ino) continue;
+  for (const Lock& lock : m_locks) {
+    if (lock.inode != info.st_ino) continue;
     bool isDevice = lock.major == major(info.st_dev) && lock.minor == minor(info.st_dev);
     if (isDevice || HasOpen(lock.pid, info)) holders.push_back({lock.pid, CommandOf(lock.pid)});
   }

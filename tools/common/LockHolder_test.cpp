@@ -19,7 +19,7 @@ TEST(LockHolder, IsTheProcessThatTookTheLock) {
   vlt::test::TempDir dir;
   const std::string file = dir / "lock";
   vlt::test::WriteBytes(file, "");
-  EXPECT_TRUE(LockHolders(file).empty());
+  EXPECT_TRUE(LockTable().holders(file).empty());
   Signal held, release;
   Child holder([&] {
     int fd = open(file.c_str(), O_RDWR);
@@ -29,7 +29,7 @@ TEST(LockHolder, IsTheProcessThatTookTheLock) {
     return 0;
   });
   ASSERT_TRUE(held.await());
-  auto holders = LockHolders(file);
+  auto holders = LockTable().holders(file);
   ASSERT_EQ(holders.size(), 1u);
   EXPECT_EQ(holders[0].pid, holder.pid());
   EXPECT_EQ(holders[0].command, "tools_tests");
@@ -41,17 +41,17 @@ TEST(LockHolder, IsTheProcessThatTookTheLock) {
     return 0;
   });
   ASSERT_TRUE(vlt::test::Eventually([&] { return vlt::test::BlockedIn(waiter.pid(), SYS_flock); }));
-  EXPECT_EQ(LockHolders(file).size(), 1u);
+  EXPECT_EQ(LockTable().holders(file).size(), 1u);
   release.notify();
   EXPECT_EQ(holder.wait(), 0);
   EXPECT_EQ(waiter.wait(), 0);
-  EXPECT_TRUE(LockHolders(file).empty());
+  EXPECT_TRUE(LockTable().holders(file).empty());
 }
 
 TEST(LockHolder, WhatIsNotThereOrNotLockedHasNone) {
   vlt::test::TempDir dir;
-  EXPECT_TRUE(LockHolders(dir / "none").empty());
-  EXPECT_TRUE(LockHolders(dir.path()).empty());
+  EXPECT_TRUE(LockTable().holders(dir / "none").empty());
+  EXPECT_TRUE(LockTable().holders(dir.path()).empty());
   EXPECT_EQ(HeldBy({}), "held by another process");
   EXPECT_EQ(HeldBy({{7, ""}, {8, "x"}}), "held by process 7, x (pid 8)");
 }

@@ -97,7 +97,13 @@ Component Describe(const _vltComponent2& r) {
 
 Client::Client() {
   auto start = std::chrono::steady_clock::now();
-  HRESULT result = vltGetRegistrar(&m_registrar);
+  HRESULT result = S_OK;
+  try {
+    result = vltGetRegistrar(&m_registrar);
+  } catch (int) {
+    // The library's word for a database that cannot be opened.
+    throw Unusable("the registration database cannot be opened", "\"vltctl verify\" says why");
+  }
   auto taken = std::chrono::steady_clock::now() - start;
   m_timeToReady = std::chrono::duration_cast<std::chrono::microseconds>(taken);
   if (result < 0 || !m_registrar) throw Unusable("the registrar cannot be had", "");

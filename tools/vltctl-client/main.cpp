@@ -190,27 +190,6 @@ int Check(const Arguments& arguments, Output& output) {
   return bad == 0 ? kGood : kNotFound;
 }
 
-int Url(const Arguments&, Output& output) {
-  wchar_t* url = nullptr;
-  HRESULT result = vltGetLocalConfigurationURL(&url);
-  std::string text = vltctl::NarrowText(url);
-  vltFree(url);
-  output.item({{"url", text}});
-  output.line(text);
-  return result < 0 ? kDataUnusable : kGood;
-}
-
-int Identity(const Arguments&, Output& output) {
-  GUID identity = {};
-  if (vltGetServerIdentity(&identity) < 0) {
-    throw Failure(kDataUnusable, {"no-identity", "", "no identity is available", "", ""});
-  }
-  std::string text = vltctl::GuidText(identity);
-  output.item({{"identity", text}});
-  output.line(text);
-  return kGood;
-}
-
 // Commands of the table that neither program knows.
 int Unknown(char** argv, Output&) {
   throw Failure(kUsage, {"usage", "", std::string("no such command: ") + argv[1], "", ""});
@@ -219,12 +198,7 @@ int Unknown(char** argv, Output&) {
 }  // namespace
 
 int main(int argc, char** argv) {
-  const vltctl::Handler handlers[] = {{"list", List},   {"show", Show}, {"classes", Classes},
-                                      {"check", Check}, {"url", Url},   {"identity", Identity}};
-  try {
-    return vltctl::Run(argc, argv, handlers, Unknown);
-  } catch (int) {
-    fprintf(stderr, "vltctl: the registration database cannot be opened\n");
-  }
-  return vltctl::kDataUnusable;
+  const vltctl::Handler handlers[] = {
+      {"list", List}, {"show", Show}, {"classes", Classes}, {"check", Check}};
+  return vltctl::Run(argc, argv, handlers, Unknown);
 }

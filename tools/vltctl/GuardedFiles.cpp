@@ -1,14 +1,19 @@
 #include "tools/vltctl/GuardedFiles.h"
 
+#include <errno.h>
 #include <string.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <filesystem>
 #include <system_error>
 
 #include "source/IniFileLock.h"
+#include "tools/common/LockHolder.h"
 #include "tools/vltctl/Reading.h"
 #include "vlloader/source/InstallLayout.h"
+#include "vlloader/source/vlloader.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/SharedObjectName.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
@@ -46,7 +51,8 @@ constexpr KindRow kKinds[] = {
     {Kind::UnparsableChanged,
      {"unparsable-changed", "the file cannot be parsed, and the digest differs", kConvert}},
     {Kind::Unreadable,
-     {"unreadable", "the file cannot be read", "make it a file that every user can read"}},
+     {"unreadable", "the file cannot be read",
+      "put a readable INI file in its place, or remove it"}},
     {Kind::SidecarShort, {"sidecar-short", "the sidecar is short", kRepair}},
     {Kind::SidecarDirectory, {"sidecar-directory", "the sidecar is a directory", kRepair}},
     {Kind::SidecarUnreadable,
@@ -113,6 +119,60 @@ std::vector<std::string> GuardedFiles() {
   std::sort(more.begin(), more.end());
   files.insert(files.end(), more.begin(), more.end());
   return files;
+}
+
+FileHold::FileHold(const std::string& file) : m_mutex(IniFileLock::NameForFile(file.c_str())) {
+  if (m_mutex.tryLock()) return;
+  std::string holder = vltctl::HeldBy(vltctl::LockTable().holders(LockFileOf(file)));
+  throw vltctl::Failure(vltctl::kBusy, {"busy", file, "its lock is " + holder, "",
+                                        "end that process, or try again later"});
+}
+
+namespace {
+
+void ExpectDirectory(const std::string& directory) {
+  struct stat info;
+  if (stat(directory.c_str(), &info) != 0) {
+    // A missing one is made.
+    if (errno == ENOENT) return;
+    throw vltctl::Failure(vltctl::kDataUnusable,
+                          {"directory", directory, "cannot be entered", strerror(errno),
+                           "give this user the right to its path, or run as its owner"});
+  }
+  if (S_ISDIR(info.st_mode)) return;
+  throw vltctl::Failure(vltctl::kDataUnusable, {"directory", directory, "is no directory", "",
+                                                "move what is there out of the way"});
+}
+
+// Whether the database could be made where there is none.
+void ExpectWritable(const std::string& directory) {
+  if (access(directory.c_str(), W_OK) == 0 || errno == ENOENT) return;
+  throw vltctl::Failure(vltctl::kDataUnusable,
+                        {"not-writable", directory, "the database cannot be made", strerror(errno),
+                         "run \"vltctl list\" once as a user who may write there"});
+}
+
+}  // namespace
+
+void ExpectUsableDatabase() {
+  const std::string root = vlLookUpInstallDirectory();
+  if (root.empty()) {
+    throw vltctl::Failure(vltctl::kDataUnusable,
+                          {"no-install-directory", PreferenceFile(),
+                           "the preference \"Dir\" is empty, so there is no installation", "",
+                           "set it to the install directory, or remove it for the default"});
+  }
+  ExpectDirectory(root);
+  ExpectDirectory(InstalledFile(vlt::layout::kData));
+  const std::string database = InstalledFile(vlt::layout::kDatabase);
+  GuardedIniState state = Inspect(database);
+  if (state.opening == Opening::Fails || state.opening == Opening::SetsAsideAndFails) {
+    const StateWords& words = WordsOf(state.kind);
+    throw vltctl::Failure(vltctl::kDataUnusable,
+                          {words.code, database, words.found, WhyOf(state), words.next});
+  }
+  if (state.kind == Kind::Missing) ExpectWritable(root);
+  ExpectFree(database);
 }
 
 std::string LockFileOf(const std::string& guardedFile) {

@@ -4,6 +4,7 @@
 #include <vector>
 
 #include "source/GuardedIniFile.h"
+#include "zt/fnd/osdep/Mutex.h"
 
 // The guarded files of an installation: their states in words, and their locks.
 namespace admin {
@@ -32,7 +33,27 @@ GuardedIniState Inspect(const std::string& file);
 // the jar, the settings and other INI files of "Data".
 std::vector<std::string> GuardedFiles();
 
+// Throws a Failure that says why the registrar of this installation cannot be had at this moment: its
+// database would be set aside or cannot be opened, a directory cannot be used, or another process has
+// it, for which a client would wait without limit. A change in the next moment is not foreseen.
+void ExpectUsableDatabase();
+
 // The lock of a guarded file.
 std::string LockFileOf(const std::string& guardedFile);
+
+// Holds that lock. Throws a Failure of kBusy, which names the holder, instead of waiting.
+class FileHold {
+ public:
+  explicit FileHold(const std::string& file);
+  ~FileHold() { m_mutex.unlock(); }
+  FileHold(const FileHold&) = delete;
+  FileHold& operator=(const FileHold&) = delete;
+
+ private:
+  zt::fnd::osdep::Mutex m_mutex;
+};
+
+// Throws what a FileHold throws: before a call that would wait for the lock.
+inline void ExpectFree(const std::string& file) { FileHold hold(file); }
 
 }  // namespace admin

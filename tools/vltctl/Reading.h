@@ -64,6 +64,15 @@ std::string DataFile(const std::string& name);
 // Path of a file or directory of the installation (vlloader/source/InstallLayout.h).
 std::string InstalledFile(const wchar_t* name);
 
+// The file that sets the preference "Dir"; where none does, the first that could.
+std::string PreferenceFile();
+
+// A place of the installation or the machine, and what decides it. The path is empty for none.
+struct Place {
+  std::string name, path, origin;
+};
+std::vector<Place> Places();
+
 // A name with its value and where that comes from.
 struct Row {
   std::string name, value, origin;
@@ -79,6 +88,9 @@ using vltctl::Output;
 
 // ---- The commands.
 int Settings(const Arguments& arguments, Output& output);
+int SettingsSet(const Arguments& arguments, Output& output);
+int Url(const Arguments& arguments, Output& output);
+int Identity(const Arguments& arguments, Output& output);
 int Jar(const Arguments& arguments, Output& output);
 int Verify(const Arguments& arguments, Output& output);
 int Repair(const Arguments& arguments, Output& output);
@@ -87,6 +99,10 @@ int Events(const Arguments& arguments, Output& output);
 int HookList(const Arguments& arguments, Output& output);
 int HookArm(const Arguments& arguments, Output& output);
 int HookClear(const Arguments& arguments, Output& output);
+int Error(const Arguments& arguments, Output& output);
+int Paths(const Arguments& arguments, Output& output);
+int Locks(const Arguments& arguments, Output& output);
+int Doctor(const Arguments& arguments, Output& output);
 int Completion(const Arguments& arguments, Output& output);
 
 }  // namespace admin

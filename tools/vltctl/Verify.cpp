@@ -11,11 +11,8 @@
 
 #include "source/Cmd5vlt.h"
 #include "source/Common/vltFileSecurity.h"
-#include "source/IniFileLock.h"
-#include "tools/common/LockHolder.h"
 #include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Reading.h"
-#include "zt/fnd/osdep/Mutex.h"
 #include "zt/posix/Files.h"
 
 namespace admin {
@@ -111,24 +108,6 @@ constexpr const char* WordOf(Remedy remedy) {
   constexpr const char* words[] = {"none", "seal", "convert", "impossible"};
   return words[static_cast<int>(remedy)];
 }
-
-// The lock of the file, for the object's life.
-class Hold {
- public:
-  explicit Hold(const std::string& file) : m_mutex(IniFileLock::NameForFile(file.c_str())) {
-    if (m_mutex.tryLock()) return;
-    throw vltctl::Failure(
-        vltctl::kBusy,
-        {"busy", file, "its lock is " + HeldBy(vltctl::LockHolders(LockFileOf(file))), "",
-         "end that process, or try again later"});
-  }
-  ~Hold() { m_mutex.unlock(); }
-  Hold(const Hold&) = delete;
-  Hold& operator=(const Hold&) = delete;
-
- private:
-  zt::fnd::osdep::Mutex m_mutex;
-};
 
 void WriteNew(const std::string& file, const std::string& bytes) {
   ScopedFd fd = zt::posix::CreateNew(file.c_str(), O_WRONLY, 0666);
@@ -248,7 +227,7 @@ int RepairOne(const std::string& file, bool dry, Output& output) {
   Repaired done{RemedyFor(before.kind), ""};
   bool hasWork = done.remedy == Remedy::Seal || done.remedy == Remedy::Convert;
   if (hasWork && !dry) {
-    Hold hold(file);
+    FileHold hold(file);
     before = Inspect(file);
     done = Repair(file);
   }

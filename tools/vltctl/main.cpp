@@ -8,6 +8,7 @@
 
 #include "tools/common/Help.h"
 #include "tools/common/Program.h"
+#include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Reading.h"
 
 namespace admin {
@@ -41,6 +42,7 @@ int Completion(const Arguments& arguments, Output& output) {
 
 // It lies beside this program, or, once installed, among those that only other programs start.
 int BecomeClient(char** argv, Output& output) {
+  ExpectUsableDatabase();
   fs::path here = OwnPath().parent_path();
   for (const char* place : {"vltctl-client", "../libexec/vltutils/vltctl-client"}) {
     std::string program = here / place;
@@ -56,11 +58,23 @@ int BecomeClient(char** argv, Output& output) {
 
 int main(int argc, char** argv) {
   const vltctl::Handler handlers[] = {
-      {"settings", admin::Settings},    {"jar", admin::Jar},
-      {"verify", admin::Verify},        {"repair", admin::Repair},
-      {"trace", admin::Trace},          {"events", admin::Events},
-      {"hook list", admin::HookList},   {"hook arm", admin::HookArm},
-      {"hook clear", admin::HookClear}, {"completion", admin::Completion},
+      {"settings", admin::Settings},
+      {"settings set", admin::SettingsSet},
+      {"url", admin::Url},
+      {"identity", admin::Identity},
+      {"jar", admin::Jar},
+      {"verify", admin::Verify},
+      {"repair", admin::Repair},
+      {"trace", admin::Trace},
+      {"events", admin::Events},
+      {"hook list", admin::HookList},
+      {"hook arm", admin::HookArm},
+      {"hook clear", admin::HookClear},
+      {"error", admin::Error},
+      {"paths", admin::Paths},
+      {"locks", admin::Locks},
+      {"doctor", admin::Doctor},
+      {"completion", admin::Completion},
   };
   return vltctl::Run(argc, argv, handlers, admin::BecomeClient);
 }

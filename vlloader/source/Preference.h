@@ -12,4 +12,6 @@
 // again. Throws std::bad_alloc, also where a file could not be read because memory or descriptors
 // ran out, and zt::fnd::osdep::PosixError where the system could not read it for the moment (EIO,
 // ESTALE).
-std::optional<std::string> vlReadPreference(const std::string& domain, const std::string& key);
+// *where, if asked for, is the file that has the item, or the first one that could; empty without any.
+std::optional<std::string> vlReadPreference(const std::string& domain, const std::string& key,
+                                            std::string* where = nullptr);

@@ -82,10 +82,16 @@ std::optional<std::string> ReadItem(const std::string& file, const std::string& 
 
 }  // namespace
 
-std::optional<std::string> vlReadPreference(const std::string& domain, const std::string& key) {
+std::optional<std::string> vlReadPreference(const std::string& domain, const std::string& key,
+                                            std::string* where) {
   const std::string file = "/" + domain + ".ini";
-  for (const std::string& directory : ConfigDirectories()) {
-    if (auto value = ReadItem(directory + file, key)) return value;
+  const std::vector<std::string> directories = ConfigDirectories();
+  if (where) *where = directories.empty() ? "" : directories.front() + file;
+  for (const std::string& directory : directories) {
+    auto value = ReadItem(directory + file, key);
+    if (!value) continue;
+    if (where) *where = directory + file;
+    return value;
   }
   return std::nullopt;
 }
