@@ -138,11 +138,13 @@ Start RehearseAt(const Opened& opened) {
   std::vector<Binding> bindings;
   rehearsal.readComponents(&components, &bindings);  // which completes file names
   CompareComponents(listed, ListedIn(rehearsal.document(), opened.place), &start);
-  CompareItems(items, ItemsOf(rehearsal.document()), &start);
+  Items left = ItemsOf(rehearsal.document());
+  CompareItems(items, left, &start);
   start.saves = rehearsal.saves();
   start.text = rehearsal.onDisk();
-  std::string rendered;
-  start.leavesErasedOnDisk = rehearsal.document().Render(&rendered) == 0 && rendered != start.text;
+  IniDocument onDisk(true);
+  if (onDisk.Parse(start.text) != 0) throw std::bad_alloc();
+  start.leavesErasedOnDisk = ItemsOf(onDisk) != left;
   return start;
 }
 
