@@ -139,7 +139,7 @@ std::vector<std::string> Below(const std::string& directory) {
 
 // A start by the command-line client, as a user makes it.
 void Start() {
-  ProgramResult result = RunProgram({std::string(VLT_TEST_BIN) + "/vltctl-client", "list"});
+  ProgramResult result = RunProgram({std::string(VLT_TEST_BIN) + "/vltctl", "list", "--live"});
   EXPECT_EQ(result.exitCode, 0) << result.err;
 }
 

@@ -68,8 +68,13 @@ TEST_F(VltctlHostile, NamesOfComponentsAreShownEscaped) {
                                "]\nIdentifier = \"" + GText(1) + "\"\nFileName = \"" + file +
                                "\"\nBINDING_CLASSES = \"{" + GText(1) + "}:1:{" + GText(9) +
                                "}\"\n");
-  for (const std::vector<std::string>& command :
-       {std::vector<std::string>{"list"}, {"show", GText(1)}, {"classes", GText(9)}, {"check"}}) {
+  for (const std::vector<std::string>& command : {std::vector<std::string>{"scan", "--dry-run"},
+                                                  {"list", "--live"},
+                                                  {"list", "--long"},
+                                                  {"show", GText(1)},
+                                                  {"show", "evil"},
+                                                  {"classes", GText(9)},
+                                                  {"check"}}) {
     ProgramResult result = Look(command);
     ExpectNothingToObey(result.out + result.err);
     EXPECT_NE(result.out.find(kShown), std::string::npos) << command[0] << result.out << result.err;
@@ -101,7 +106,7 @@ TEST_F(VltctlHostile, ArgumentsAndFileNamesAreShownEscaped) {
   ProgramResult verify = Look({"verify", m_data + "/" + kEvil});
   ExpectNothingToObey(verify.out + verify.err);
   EXPECT_NE(verify.out.find(kShown), std::string::npos);
-  for (const std::vector<std::string>& command : {std::vector<std::string>{"show", kEvil},
+  for (const std::vector<std::string>& command : {std::vector<std::string>{"list", "--type", kEvil},
                                                   {"settings", kEvil},
                                                   {"hook", "arm", kEvil, "fail"}}) {
     ProgramResult result = Look(command);

@@ -22,11 +22,13 @@ class VltctlSurroundings : public testing::Test {
     std::filesystem::create_directory(m_data);
     WriteBytes(m_data + "/vltjar.ini",
                "[ServerSection]\nServerIdentity={00000001-0002-0003-0405-060708090A0B}\n");
-    EXPECT_EQ(Vltctl({"list"}).exitCode, kGood);
+    EXPECT_EQ(Vltctl({"list", "--live"}).exitCode, kGood);
   }
 
   std::vector<std::vector<std::string>> commands() const {
     return {{"list"},
+            {"list", "--live"},
+            {"scan", "--dry-run"},
             {"show", GText(1)},
             {"classes", GText(9)},
             {"settings"},
@@ -175,6 +177,7 @@ class VltctlSurroundingsLocale : public testing::Test {
         "Path", GText(1));
     m_installation.addObjectExpert("Plain", "N\xC3\xA4me", GText(2));
     m_installation.addObjectExpert("Ascii", "Ascii", GText(3));
+    EXPECT_EQ(Vltctl({"list", "--live"}, {{"LC_ALL", "C.UTF-8"}}).exitCode, kGood);
   }
   ProgramResult listed() const {
     return RunProgram({"env", "-u", "LANG", "-u", "LC_ALL", "-u", "LC_CTYPE", kVltctl, "list"});

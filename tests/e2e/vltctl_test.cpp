@@ -1,6 +1,8 @@
 // The command-line client as its users meet it: arguments, output, exit codes.
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <filesystem>
 #include <sstream>
 
 #include "tests/e2e/Start.h"
@@ -19,6 +21,7 @@ class Sample : public Installation {
     addObjectExpert("Tank", "Tank", GText(2), "{" + GText(2) + "}:1:{" + GText(9) + "}");
     addResourceExpert("Serial", "Serial \"Ports\"", GText(3), "PNP0501",
                       "{" + GText(3) + "}:1:{" + GText(9) + "}");
+    EXPECT_EQ(Vltctl({"list", "--live"}).exitCode, kGood);
   }
 };
 
@@ -51,9 +54,9 @@ TEST(Vltctl, BadArgumentsAreUsageErrorsAndStartNothing) {
                                                       {"list", "more"},
                                                       {"list", "--nothing"},
                                                       {"show"},
-                                                      {"show", "words"},
-                                                      {"show", ""},
-                                                      {"show", GText(1) + "0"},
+                                                      {"show", "words", "--live"},
+                                                      {"list", "--type", "words"},
+                                                      {"scan"},
                                                       {"show", GText(1), GText(2)},
                                                       {"classes"},
                                                       {"classes", "{" + GText(1)}};
@@ -70,7 +73,7 @@ TEST(Vltctl, BadArgumentsAreUsageErrorsAndStartNothing) {
 
 TEST(Vltctl, ListShowsATable) {
   Sample s;
-  ProgramResult result = Vltctl({"list"});
+  ProgramResult result = Vltctl({"list", "--live"});
   EXPECT_EQ(result.exitCode, kGood);
   EXPECT_EQ(result.err, "");
   std::vector<std::string> lines;
@@ -109,7 +112,10 @@ TEST(Vltctl, ListAsJson) {
                           {"changed", true},
                           {"lastInstalledSchemaVersion", nullptr},
                           {"prefix", "co"},
-                          {"pnp", nullptr}}));
+                          {"pnp", nullptr},
+                          {"registrationFile",
+                           s.root() + "/Data Dictionaries/Core.framework" + "/Resources/Info.vlr"},
+                          {"classes", json::array()}}));
   EXPECT_EQ(out[2], (json{{"type", "object expert"},
                           {"name", "Tank"},
                           {"guid", B(2)},
@@ -118,9 +124,17 @@ TEST(Vltctl, ListAsJson) {
                           {"changed", nullptr},
                           {"lastInstalledSchemaVersion", nullptr},
                           {"prefix", nullptr},
-                          {"pnp", nullptr}}));
+                          {"pnp", nullptr},
+                          {"registrationFile", s.root() + "/Experts/Tank.vle/Resources/Info.vlr"},
+                          {"classes", {B(9)}}}));
   EXPECT_EQ(out[3]["name"], "Serial \"Ports\"");
   EXPECT_EQ(out[3]["pnp"], "PNP0501");
+  // The registrar does not say which file brought a component.
+  for (json& item : out) {
+    item.erase("registrationFile");
+    item.erase("classes");
+  }
+  EXPECT_EQ(VltctlJson({"list", "--live"}).items, out);
 }
 
 TEST(Vltctl, JsonIsValidWhateverTheNames) {
@@ -129,7 +143,7 @@ TEST(Vltctl, JsonIsValidWhateverTheNames) {
               "[KORComponents]\nx = \"x\"\n[x]\nIdentifier = \"" + GText(1) +
                   "\"\nFileName = \"/a\\x01\xFF\xC3\x28\\n\\\"b\"\n");
   for (const char* locale : {"C", "C.UTF-8"}) {
-    JsonResult result = VltctlJson({"list"}, {{"LC_ALL", locale}});
+    JsonResult result = VltctlJson({"list", "--live"}, {{"LC_ALL", locale}});
     EXPECT_EQ(result.exitCode, kGood) << result.err;
     EXPECT_EQ(result.items.size(), 2u);
   }
@@ -157,7 +171,8 @@ TEST(Vltctl, ShowOfAnUnknownOneIsNotFound) {
   ProgramResult text = Vltctl({"show", GText(77)});
   EXPECT_EQ(text.exitCode, kNotFound);
   EXPECT_EQ(text.out, "");
-  EXPECT_EQ(text.err, "vltctl: no component " + GText(77) + "; \"vltctl list\" shows all\n");
+  EXPECT_EQ(text.err, "vltctl: no component " + GText(77) +
+                          "; \"vltctl list\" shows all\n");
   JsonResult asJson = VltctlJson({"show", GText(77)});
   EXPECT_EQ(asJson.exitCode, kNotFound);
   EXPECT_EQ(asJson.problems.at(0)["code"], "no-component");
@@ -189,15 +204,47 @@ TEST(Vltctl, ClassesOfAnUnknownClassIsNotFound) {
 
 // ---- Unusable data: tests/e2e/vltctl_bad_situations_test.cpp
 
-TEST(Vltctl, WhatWouldBeSetAsideIsKeptAndRepaired) {
+TEST(Vltctl, DataThatCannotBeUsedIsToldInOneLine) {
+  auto expectUnusable = [](bool live) {
+    for (const std::vector<std::string>& command :
+         {std::vector<std::string>{"list"}, {"show", GText(1)}, {"classes", GText(1)}}) {
+      std::vector<std::string> arguments = command;
+      if (live) arguments.push_back("--live");
+      ProgramResult result = Vltctl(arguments);
+      EXPECT_EQ(result.exitCode, kDataUnusable) << command[0];
+      EXPECT_EQ(result.out, "");
+      EXPECT_EQ(result.err.substr(0, 8), "vltctl: ");
+      EXPECT_EQ(std::count(result.err.begin(), result.err.end(), '\n'), 1);
+    }
+  };
   Sample s;
-  ASSERT_EQ(Vltctl({"list"}).exitCode, kGood);
+  Installation::setDir("");
+  expectUnusable(false);
+  expectUnusable(true);
+  Installation::setDir(s.root());
+  unlink(s.database().c_str());
+  expectUnusable(false);
+  ASSERT_EQ(mkfifo(s.database().c_str(), 0666), 0);
+  expectUnusable(false);
+  expectUnusable(true);
+  unlink(s.database().c_str());
+  std::filesystem::remove_all(s.root() + "/Data");
+  WriteBytes(s.root() + "/Data", "in the way");
+  expectUnusable(true);
+  unlink((s.root() + "/Data").c_str());
+  EXPECT_EQ(Vltctl({"list", "--live"}).exitCode, kGood);
+}
+
+TEST(Vltctl, ADatabaseThatWasSetAsideIsToldAndTheNextCallWorks) {
+  Sample s;
   WriteBytes(s.sidecar(), "short");
-  std::string before = ReadBytes(s.database());
-  EXPECT_EQ(Vltctl({"list"}).exitCode, kDataUnusable);
-  EXPECT_EQ(ReadBytes(s.database()), before);
-  EXPECT_EQ(Vltctl({"repair"}).exitCode, kGood);
-  EXPECT_EQ(Vltctl({"list"}).exitCode, kGood);
+  ProgramResult before = Vltctl({"list"});
+  EXPECT_EQ(before.exitCode, kDataUnusable);
+  EXPECT_NE(before.err.find("sets the database aside"), std::string::npos) << before.err;
+  ProgramResult result = Vltctl({"list", "--live"});
+  EXPECT_EQ(result.exitCode, kDataUnusable);
+  EXPECT_NE(result.err.find("set aside"), std::string::npos);
+  EXPECT_EQ(Vltctl({"list", "--live"}).exitCode, kGood);
 }
 
 }  // namespace

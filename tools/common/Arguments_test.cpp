@@ -52,7 +52,7 @@ TEST(Arguments, WhatIsWrongSaysWhatToDo) {
       {{"list", "more"},
        "The following argument was not expected: more",
        "see \"vltctl list --help\""},
-      {{"show"}, "GUID is required", "see \"vltctl show --help\""}};
+      {{"show"}, "COMPONENT is required", "see \"vltctl show --help\""}};
   for (const WrongRow& row : rows) {
     Parsed parsed = Parse(row.words);
     EXPECT_EQ(parsed.kind, Parsed::Kind::Wrong) << row.what;

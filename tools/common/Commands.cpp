@@ -10,8 +10,34 @@ constexpr const char* kRendezvous = "Rendezvous";
 constexpr const char* kDiagnostics = "Diagnostics";
 constexpr const char* kTool = "The command itself";
 
-constexpr Argument kShow[] = {{"GUID", nullptr, "Identifier, with or without braces", true}};
-constexpr Argument kClasses[] = {{"GUID", nullptr, "Identifier of the class", true}};
+// What list, show and classes share. Without --live they read the files and take part in nothing.
+constexpr Argument kLive = {"--live", nullptr,
+                            "Ask the registrar, which registers what has changed"};
+constexpr Argument kWait = {
+    "--wait", "SECONDS", "With --live: how long to wait while another process holds it; 0 without"};
+constexpr Argument kRoot = {"--root", "DIR", "The installation in that directory; an image will do",
+                            false,    false, kDirectories};
+
+constexpr Argument kList[] = {
+    {"--type", "TYPE", "Only dictionary, object-expert or resource-expert", false, false,
+     "dictionary object-expert resource-expert"},
+    {"--class", "GUID", "Only experts that bind to the class"},
+    {"--name", "PATTERN", "Only names that match, with * and ?"},
+    {"--long", nullptr, "With prefix or PnP, number of classes, registration file"},
+    kLive,
+    kWait,
+    kRoot};
+constexpr Argument kShow[] = {
+    {"COMPONENT", nullptr, "Name, GUID or path, or the beginning of a name or GUID", true},
+    {"--exists", nullptr, "Print nothing; the exit code is the answer"},
+    {"--at-least", "VERSION", "Print nothing; 0 if it is a dictionary of that schema version"},
+    kLive,
+    kWait,
+    kRoot};
+constexpr Argument kClasses[] = {
+    {"GUID", nullptr, "Identifier of the class", true}, kLive, kWait, kRoot};
+constexpr Argument kScan[] = {
+    {"--dry-run", nullptr, "Only say it; required, as a registrar scans by itself"}, kRoot};
 constexpr Argument kCheck[] = {
     {"--only-bad", nullptr, "Show the components that are not sound only"},
     {"--library", nullptr, "Add what the library's own check says, as notes"},
@@ -49,9 +75,10 @@ constexpr Argument kCompletion[] = {{"SHELL", nullptr,
                                      false, "bash zsh fish man"}};
 
 constexpr Command kCommands[] = {
-    {kComponents, "list", "All components: type, name, GUID, schema version, file", {}},
-    {kComponents, "show", "One component", kShow},
+    {kComponents, "list", "All components: type, name, GUID, schema version, file", kList},
+    {kComponents, "show", "One component and what belongs to it", kShow},
     {kComponents, "classes", "The experts that bind to a class of objects", kClasses},
+    {kComponents, "scan", "What the next start of a registrar would merge, remove and save", kScan},
     {kComponents, "check", "Whether the components' files load and offer their entry points",
      kCheck},
     {kRendezvous, "settings", "Settings in force, where they come from, and what is ignored",

@@ -1,5 +1,8 @@
 #pragma once
 
+#include <string>
+#include <vector>
+
 namespace vltctl {
 
 // Takes the locale of the environment. Where that shows nothing beyond ASCII - services and cron jobs
@@ -10,5 +13,13 @@ void SetLocale();
 // program that is started with this environment it does not find components whose names or paths
 // go beyond ASCII.
 bool LocaleWasReplaced();
+
+// A component's name, and all its texts that a locale may not have.
+struct NamedTexts {
+  std::string name, texts;
+};
+
+// What to note of components that such a program would not find; empty if there is nothing to say.
+std::string LocaleNote(const std::vector<NamedTexts>& components);
 
 }  // namespace vltctl

@@ -59,22 +59,11 @@ void Print(const std::vector<Component>& components, Output& output) {
   output.print(table);
 }
 
-bool IsAscii(const std::string& text) {
-  return std::all_of(text.begin(), text.end(),
-                     [](char c) { return static_cast<signed char>(c) >= 0; });
-}
-
 // What a program started from here would not see (tools/common/Locale.h).
 void NoteLocale(const std::vector<Component>& components, Output& output) {
-  if (!vltctl::LocaleWasReplaced()) return;
-  std::string unseen;
-  for (const Component& c : components) {
-    if (!IsAscii(c.name + c.file)) unseen += (unseen.empty() ? "" : ", ") + c.name;
-  }
-  if (unseen.empty()) return;
-  output.note(
-      "the environment has no UTF-8 locale: a program that is started with it does not find " +
-      unseen + "; set LANG=C.UTF-8 for it");
+  std::vector<vltctl::NamedTexts> texts;
+  for (const Component& c : components) texts.push_back({c.name, c.name + c.file});
+  if (std::string note = vltctl::LocaleNote(texts); !note.empty()) output.note(note);
 }
 
 void PrintOne(const Component& c, Output& output) {
@@ -114,7 +103,10 @@ int List(const Arguments&, Output& output) {
 }
 
 int Show(const Arguments& arguments, Output& output) {
-  const std::string guid = arguments.text("GUID");
+  const std::string guid = arguments.text("COMPONENT");
+  if (!vltctl::IsGuidText(guid)) {
+    throw Failure(kUsage, {"usage", "", "with --live, show takes a GUID", "", ""});
+  }
   auto component = Client().find(guid);
   if (!component) throw NoComponent(guid);
   PrintOne(*component, output);

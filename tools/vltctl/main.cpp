@@ -8,6 +8,7 @@
 
 #include "tools/common/Help.h"
 #include "tools/common/Program.h"
+#include "tools/vltctl/Components.h"
 #include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Reading.h"
 
@@ -56,8 +57,27 @@ int BecomeClient(char** argv, Output& output) {
 
 }  // namespace admin
 
+namespace {
+
+char** s_argv;
+
+// Reads the snapshot, or, with --live, becomes the client when no other process has the registrar.
+template <int (*snapshot)(const vltctl::Arguments&, vltctl::Output&)>
+int OrLive(const vltctl::Arguments& arguments, vltctl::Output& output) {
+  if (!arguments.has("--live")) return snapshot(arguments, output);
+  admin::WaitForRegistrar(arguments);
+  return admin::BecomeClient(s_argv, output);
+}
+
+}  // namespace
+
 int main(int argc, char** argv) {
+  s_argv = argv;
   const vltctl::Handler handlers[] = {
+      {"list", OrLive<admin::List>},
+      {"show", OrLive<admin::Show>},
+      {"classes", OrLive<admin::Classes>},
+      {"scan", admin::Scan},
       {"settings", admin::Settings},
       {"settings set", admin::SettingsSet},
       {"url", admin::Url},

@@ -1,0 +1,238 @@
+#include "tools/vltctl/Components.h"
+
+#include <string.h>
+#include <sys/stat.h>
+#include <time.h>
+
+#include <algorithm>
+#include <chrono>
+#include <system_error>
+
+#include "source/IniFileLock.h"
+#include "tools/common/LockHolder.h"
+#include "tools/vltctl/GuardedFiles.h"
+#include "tools/vltctl/Reading.h"
+#include "vlloader/source/InstallLayout.h"
+#include "zt/fnd/osdep/Mutex.h"
+
+namespace admin {
+
+using vlt::snapshot::DatabaseState;
+using vlt::snapshot::Type;
+using vltctl::Failure;
+using vltctl::Json;
+
+void WithFailures(const std::function<void()>& step) {
+  try {
+    step();
+  } catch (const std::system_error& error) {
+    throw Failure(vltctl::kDataUnusable, {"unreadable", "", "the installation cannot be read",
+                                          strerror(error.code().value()), "try again later"});
+  } catch (const std::runtime_error& error) {
+    throw Failure(vltctl::kDataUnusable, {"no-installation", "", "there is no installation",
+                                          error.what(), "give its directory with --root"});
+  }
+}
+
+Snapshot ReadSnapshot(const Arguments& arguments) {
+  Snapshot snapshot;
+  WithFailures([&] {
+    std::string root = arguments.text("--root");
+    snapshot = root.empty() ? vlt::snapshot::Read() : vlt::snapshot::Read(root);
+  });
+  return snapshot;
+}
+
+void NoteProblems(const std::vector<vlt::snapshot::Problem>& problems, Output& output) {
+  for (const auto& problem : problems) {
+    output.problem({"unreadable-directory", problem.path, "cannot be read", strerror(problem.error),
+                    "run the command as a user who may"});
+  }
+}
+
+namespace {
+
+constexpr const char* kSeeScan = "\"vltctl scan --dry-run\" shows what the next start registers";
+
+void CheckDatabase(const vlt::snapshot::Database& database) {
+  auto fail = [&](const char* code, const char* what, const std::string& why, const char* next) {
+    throw Failure(vltctl::kDataUnusable, {code, database.path, what, why, next});
+  };
+  switch (database.state) {
+    case DatabaseState::Missing:
+      return fail("no-database", "there is no registration database", "no registrar has run here",
+                  kSeeScan);
+    case DatabaseState::Unreadable:
+      throw Failure(vltctl::kDataUnusable,
+                    {"unreadable", database.failedPath, "cannot be read", strerror(database.error),
+                     "run the command as a user who may read it"});
+    case DatabaseState::Unparsable:
+      return fail("unparsable", "cannot be parsed",
+                  "it is not in UTF-8, and the next start sets it aside",
+                  "\"vltctl repair\" converts it");
+    case DatabaseState::SidecarShort:
+    case DatabaseState::SidecarDirectory:
+      return fail("sidecar-short", "the next start sets the database aside",
+                  "its sidecar is no whole digest", "\"vltctl repair\" seals it as it is");
+    default:
+      return;
+  }
+}
+
+std::string Plural(unsigned count, const std::string& what) {
+  return std::to_string(count) + " " + what + (count == 1 ? "" : "s");
+}
+
+}  // namespace
+
+Snapshot ReadComponents(const Arguments& arguments, Output& output) {
+  Snapshot snapshot = ReadSnapshot(arguments);
+  CheckDatabase(snapshot.database);
+  NoteProblems(snapshot.problems, output);
+  if (snapshot.database.state == DatabaseState::DigestDiffers) {
+    output.note(snapshot.database.path +
+                ": the digest differs; \"vltctl verify\" says what the next opening does");
+  }
+  if (unsigned changes = snapshot.changes()) {
+    output.note(Plural(changes, "registration file") +
+                " changed since the database was saved; 'vltctl scan --dry-run' lists them");
+  }
+  return snapshot;
+}
+
+std::vector<std::string> ClassesOf(const Snapshot& snapshot, const Component& component) {
+  std::vector<std::string> classes;
+  for (const auto& binding : snapshot.bindings) {
+    if (binding.component != component.guid || binding.type != component.type) continue;
+    if (std::find(classes.begin(), classes.end(), binding.bindingClass) == classes.end()) {
+      classes.push_back(binding.bindingClass);
+    }
+  }
+  return classes;
+}
+
+Json ToJson(const Snapshot& snapshot, const Component& c) {
+  bool isDictionary = c.type == Type::Dictionary;
+  bool wasInstalled = isDictionary && c.lastInstalledSchemaVersion != 0xFFFFFFFF;
+  auto text = [](const std::optional<std::string>& value) { return value ? Json(*value) : Json(); };
+  return {
+      {"type", NameOf(c.type)},
+      {"name", c.name},
+      {"guid", c.guid},
+      {"file", text(c.file)},
+      {"schemaVersion", isDictionary ? Json(c.schemaVersion) : Json()},
+      {"changed", isDictionary ? Json(c.fragmentRegistered != 0) : Json()},
+      {"lastInstalledSchemaVersion", wasInstalled ? Json(c.lastInstalledSchemaVersion) : Json()},
+      {"prefix", text(c.prefix)},
+      {"pnp", text(c.pnp)},
+      {"registrationFile", c.registrationFile.empty() ? Json() : Json(c.registrationFile)},
+      {"classes", ClassesOf(snapshot, c)}};
+}
+
+// ---- Which component is meant
+
+namespace {
+
+std::string Folded(std::string text) {
+  for (char& c : text) c = c >= 'a' && c <= 'z' ? static_cast<char>(c - 'a' + 'A') : c;
+  return text;
+}
+
+std::string Bare(const std::string& guid) { return guid.size() == 38 ? guid.substr(1, 36) : guid; }
+
+bool IsPathOf(const Component& component, const std::string& text) {
+  std::string path = text;
+  while (path.size() > 1 && path.back() == '/') path.pop_back();
+  if (component.file == path || component.registrationFile == path) return true;
+  return component.registrationFile == path + "/Resources/Info.vlr";
+}
+
+bool IsExact(const Component& component, const std::string& text) {
+  return component.name == text || vlt::snapshot::ParseGuid(text) == component.guid ||
+         IsPathOf(component, text);
+}
+
+bool BeginsLike(const Component& component, const std::string& text) {
+  std::string start = Folded(text);
+  std::string guid = start[0] == '{' ? start.substr(1) : start;
+  return Folded(component.name).starts_with(start) || Bare(component.guid).starts_with(guid);
+}
+
+}  // namespace
+
+std::vector<const Component*> Matches(const Snapshot& snapshot, const std::string& text) {
+  std::vector<const Component*> exact, beginnings;
+  for (const Component& component : snapshot.components) {
+    if (text.empty()) break;
+    if (IsExact(component, text)) exact.push_back(&component);
+    if (BeginsLike(component, text)) beginnings.push_back(&component);
+  }
+  return exact.empty() ? beginnings : exact;
+}
+
+const Component& Only(const Snapshot& snapshot, const std::string& text) {
+  std::vector<const Component*> found = Matches(snapshot, text);
+  if (found.size() == 1) return *found[0];
+  if (found.empty()) {
+    throw Failure(vltctl::kNotFound, {"no-component", "", "no component " + text, "",
+                                      "\"vltctl list\" shows all"});
+  }
+  std::string all;
+  for (const Component* component : found) {
+    all += (all.empty() ? "" : ", ") + component->name + " " + component->guid;
+  }
+  throw Failure(vltctl::kNotFound,
+                {"ambiguous", "", text + " may be any of " + all, "", "give more of the name"});
+}
+
+bool IsTypeWord(const std::string& word) {
+  for (Type type : {Type::Dictionary, Type::ObjectExpert, Type::ResourceExpert}) {
+    if (word == TypeWord(type)) return true;
+  }
+  return false;
+}
+
+std::string TypeWord(Type type) {
+  std::string word = NameOf(type);
+  std::replace(word.begin(), word.end(), ' ', '-');
+  return word;
+}
+
+std::string LibraryOf(const Component& c) {
+  struct stat info;
+  if (!c.file || stat(c.file->c_str(), &info) != 0) return "";
+  if (!S_ISDIR(info.st_mode)) return *c.file;
+  std::string stem = c.file->substr(c.file->rfind('/') + 1);
+  stem = stem.substr(0, stem.rfind('.'));
+  for (const std::string& name : {"lib" + stem + ".so", stem + ".so", stem}) {
+    std::string path = *c.file + "/" + name;
+    if (stat(path.c_str(), &info) == 0 && S_ISREG(info.st_mode)) return path;
+  }
+  return "";
+}
+
+// ---- --live
+
+void WaitForRegistrar(const Arguments& arguments) {
+  using Clock = std::chrono::steady_clock;
+  if (!arguments.text("--root").empty()) {
+    throw Failure(vltctl::kUsage, {"usage", "", "--live goes without --root",
+                                   "a registrar is that of the installation in force", ""});
+  }
+  auto deadline = Clock::now() + std::chrono::seconds(arguments.number("--wait", 0));
+  const std::string file = InstalledFile(vlt::layout::kDatabase);
+  zt::fnd::osdep::Mutex mutex(IniFileLock::NameForFile(file.c_str()));
+  while (!mutex.tryLock()) {
+    if (Clock::now() >= deadline) {
+      throw Failure(
+          vltctl::kBusy,
+          {"busy", file, "the registrar is " + HeldBy(vltctl::LockHolders(LockFileOf(file))), "",
+           "leave --live out, or wait for it with --wait SECONDS"});
+    }
+    timespec pause = {0, 20 * 1000000};
+    nanosleep(&pause, nullptr);
+  }
+  mutex.unlock();
+}
+
+}  // namespace admin
