@@ -75,7 +75,8 @@ TEST_F(SnapshotCommands, NothingWaitsForTheHolderOfTheRegistrar) {
   for (const std::vector<std::string>& command : {std::vector<std::string>{"list"},
                                                   {"show", "Tank"},
                                                   {"classes", GText(9)},
-                                                  {"scan", "--dry-run"}}) {
+                                                  {"scan", "--dry-run"},
+                                                  {"why", "Tank"}}) {
     auto start = std::chrono::steady_clock::now();
     ProgramResult result = Vltctl(command);
     auto taken = std::chrono::steady_clock::now() - start;
@@ -113,7 +114,9 @@ TEST_F(SnapshotCommands, NothingIsOpenedForWritingMadeOrLocked) {
   for (const std::vector<std::string>& command : {std::vector<std::string>{"list", "--long"},
                                                   {"show", "Tank"},
                                                   {"classes", GText(9)},
-                                                  {"scan", "--dry-run"}}) {
+                                                  {"scan", "--dry-run"},
+                                                  {"why", "Tank"},
+                                                  {"why", "Nothing"}}) {
     std::vector<std::string> traced = {"strace", "-f", "-o", dir / "trace", kVltctl};
     traced.insert(traced.end(), command.begin(), command.end());
     ProgramResult result = RunProgram(traced);

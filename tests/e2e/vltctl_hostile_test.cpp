@@ -74,6 +74,7 @@ TEST_F(VltctlHostile, NamesOfComponentsAreShownEscaped) {
                                                   {"show", GText(1)},
                                                   {"show", "evil"},
                                                   {"classes", GText(9)},
+                                                  {"why", GText(1)},
                                                   {"check"}}) {
     ProgramResult result = Look(command);
     ExpectNothingToObey(result.out + result.err);

@@ -172,7 +172,7 @@ TEST(Vltctl, ShowOfAnUnknownOneIsNotFound) {
   EXPECT_EQ(text.exitCode, kNotFound);
   EXPECT_EQ(text.out, "");
   EXPECT_EQ(text.err, "vltctl: no component " + GText(77) +
-                          "; \"vltctl list\" shows all\n");
+                          "; \"vltctl list\" shows all, and \"vltctl why\" says why\n");
   JsonResult asJson = VltctlJson({"show", GText(77)});
   EXPECT_EQ(asJson.exitCode, kNotFound);
   EXPECT_EQ(asJson.problems.at(0)["code"], "no-component");

@@ -36,6 +36,8 @@ constexpr Argument kShow[] = {
     kRoot};
 constexpr Argument kClasses[] = {
     {"GUID", nullptr, "Identifier of the class", true}, kLive, kWait, kRoot};
+constexpr Argument kWhy[] = {
+    {"COMPONENT", nullptr, "Name, GUID or path of a bundle or registration file", true}, kRoot};
 constexpr Argument kScan[] = {
     {"--dry-run", nullptr, "Only say it; required, as a registrar scans by itself"}, kRoot};
 constexpr Argument kCheck[] = {
@@ -79,6 +81,7 @@ constexpr Command kCommands[] = {
     {kComponents, "show", "One component and what belongs to it", kShow},
     {kComponents, "classes", "The experts that bind to a class of objects", kClasses},
     {kComponents, "scan", "What the next start of a registrar would merge, remove and save", kScan},
+    {kComponents, "why", "Why a component is not registered, and what to do; 1 if it is not", kWhy},
     {kComponents, "check", "Whether the components' files load and offer their entry points",
      kCheck},
     {kRendezvous, "settings", "Settings in force, where they come from, and what is ignored",

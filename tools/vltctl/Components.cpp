@@ -175,7 +175,7 @@ const Component& Only(const Snapshot& snapshot, const std::string& text) {
   if (found.size() == 1) return *found[0];
   if (found.empty()) {
     throw Failure(vltctl::kNotFound, {"no-component", "", "no component " + text, "",
-                                      "\"vltctl list\" shows all"});
+                                      "\"vltctl list\" shows all, and \"vltctl why\" says why"});
   }
   std::string all;
   for (const Component* component : found) {

@@ -91,6 +91,7 @@ int List(const Arguments& arguments, Output& output);
 int Show(const Arguments& arguments, Output& output);
 int Classes(const Arguments& arguments, Output& output);
 int Scan(const Arguments& arguments, Output& output);
+int Why(const Arguments& arguments, Output& output);
 int Settings(const Arguments& arguments, Output& output);
 int SettingsSet(const Arguments& arguments, Output& output);
 int Url(const Arguments& arguments, Output& output);

@@ -78,6 +78,7 @@ int main(int argc, char** argv) {
       {"show", OrLive<admin::Show>},
       {"classes", OrLive<admin::Classes>},
       {"scan", admin::Scan},
+      {"why", admin::Why},
       {"settings", admin::Settings},
       {"settings set", admin::SettingsSet},
       {"url", admin::Url},
