@@ -2,12 +2,15 @@
 
 #include <gtest/gtest.h>
 
+#include <cerrno>
 #include <cstring>
 #include <set>
 #include <string>
 
+#include "source/Common/ZtUtils/General/ztStreamInterfaces.h"
 #include "source/Common/vltTypes.h"
 #include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/OSException.h"
 
 namespace {
 
@@ -36,7 +39,9 @@ TEST(results, EveryResultOfTheSurfaceHasItsNameAndCode) {
               ROW(VLT_E_NO_COMPONENT),
               ROW(VLT_E_NO_BINDING_CLASSES),
               ROW(VLT_E_UUID_LIBRARY),
-              ROW(VLT_E_UUID_ENTRY)};
+              ROW(VLT_E_UUID_ENTRY),
+              ROW(ZT_E_END_OF_STREAM),
+              ROW(ZT_E_ACCESS_DENIED)};
 #undef ROW
   for (const auto& row : rows) {
     ASSERT_TRUE(Row(row.name)) << row.name;
@@ -64,6 +69,8 @@ TEST(results, EveryExceptionHasItsNameAndCode) {
               CODE(DeserializationError),
               CODE(BufferOverflow),
               {"AccessDenied", AccessDenied("").getErrorCode()},
+              {"PosixError", zt::fnd::osdep::PosixError(ENOENT).getErrorCode()},
+              {"OSException", zt::fnd::osdep::PosixError(EIO).getErrorCode()},
               CODE(FileAlreadyExists),
               CODE(InvalidLocale),
               CODE(InvalidSequence),

@@ -226,7 +226,8 @@ void WaitForRegistrar(const Arguments& arguments) {
     if (Clock::now() >= deadline) {
       throw Failure(
           vltctl::kBusy,
-          {"busy", file, "the registrar is " + HeldBy(vltctl::LockHolders(LockFileOf(file))), "",
+          {"busy", file,
+           "the registrar is " + vltctl::HeldBy(vltctl::LockTable().holders(LockFileOf(file))), "",
            "leave --live out, or wait for it with --wait SECONDS"});
     }
     timespec pause = {0, 20 * 1000000};

@@ -232,12 +232,12 @@ class Judge {
   Verdict ofUnmerged(const Claim& claim) const {
     const std::string& file = claim.bundle->file;
     std::string database = m_opened.place.here + registrar::Narrow(vlt::layout::kDatabase);
-    std::vector<vltctl::Process> holders = vltctl::LockHolders(LockFileOf(database));
+    std::vector<vltctl::Process> holders = vltctl::LockTable().holders(LockFileOf(database));
     for (const vltctl::Process& holder : holders) {
       std::optional<double> started = StartOf(holder.pid);
       if (!started || *started > ChangeOf(file)) continue;
       return {"process-older-than-file", claim.key, file,
-              "is newer than the registrar, which is " + HeldBy(holders),
+              "is newer than the registrar, which is " + vltctl::HeldBy(holders),
               "start that program again"};
     }
     return {"not-yet-scanned", claim.key, file, "is new or changed since the last start",
