@@ -23,8 +23,8 @@ endif()
 # Tests that take more than two seconds, by themselves or with their like. They get the label
 # "slow", and ./dev alone leaves them out.
 set(slow_tests "Check.AHang*" "Check.AnExit*" "CheckBundles.Thousands*" "Failures/Oom.EveryCall*" "FailingCall.*"
-  "FindFiles.ManyEntries*" "ForkThreads.*" "Hostile.A*Million*" "Hostile.AHundredThousand*"
-  "IniFileLockLocale.*" "Locales.*" "NamedEventHostile.LockFileShared*"
+  "FindFiles.ManyEntries*" "ForkStorm.*" "ForkThreads.*" "Hostile.A*Million*"
+  "Hostile.AHundredThousand*" "IniFileLockLocale.*" "Locales.*" "NamedEventHostile.LockFileShared*"
   "NamedEventHostile.SetsLocked*" "NamedEventLimits.StateFilesThatCannot*"
   "NamedEventLimits.ThousandUnusable*" "NamesInLocales.*" "Planted.*" "PowerCut*"
   "Prefork.SlowWrites*" "RegistrarKill.*" "Rendezvous*" "SnapshotRegistrar.*" "SnapshotStart.*"

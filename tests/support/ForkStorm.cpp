@@ -8,9 +8,11 @@
 
 #include <atomic>
 #include <chrono>
+#include <string>
 #include <thread>
 #include <vector>
 
+#include "tests/support/TempDir.h"
 #include "tests/support/Tracing.h"
 
 namespace vlt::test {
@@ -18,14 +20,38 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 
-constexpr auto kLimit = std::chrono::seconds(5);
+constexpr auto kInterval = std::chrono::seconds(5);
+constexpr auto kLongest = std::chrono::seconds(60);
 constexpr int kFull = 2000;
 constexpr int kEnoughHung = 3;
 
+// A process as the kernel reports it, with the processor time it has had in nanoseconds. It is the
+// same text as long as the process does nothing.
+std::string WhatItDid(pid_t pid) {
+  std::string place = "/proc/" + std::to_string(pid);
+  return ReadBytes(place + "/stat") + ReadBytes(place + "/schedstat");
+}
+
+// Not one that waits for a processor or a disk, which are slow on a busy machine.
+bool Sleeps(const std::string& whatItDid) {
+  size_t state = whatItDid.rfind(") ");  // after the name, which is in parentheses
+  return state != std::string::npos && whatItDid[state + 2] == 'S';
+}
+
+// The exit code, or -1 for a child that is hung: it sleeps, and did nothing for a whole interval, or
+// it runs beyond any measure.
 int EndOf(pid_t pid) {
   int status = 0;
-  for (auto end = Clock::now() + kLimit; waitpid(pid, &status, WNOHANG) != pid;) {
-    if (Clock::now() >= end) return -1;
+  const auto last = Clock::now() + kLongest;
+  std::string before;
+  for (auto next = Clock::now() + kInterval; waitpid(pid, &status, WNOHANG) != pid;) {
+    if (Clock::now() >= last) return -1;
+    if (Clock::now() >= next) {
+      std::string now = WhatItDid(pid);
+      if (now == before && Sleeps(now)) return -1;
+      before = now;
+      next = Clock::now() + kInterval;
+    }
     poll(nullptr, 0, 1);
   }
   return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);

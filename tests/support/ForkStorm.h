@@ -9,7 +9,7 @@ namespace vlt::test {
 
 struct ForkStorm {
   int children = 0;
-  int hung = 0;    // that had not ended after five seconds, and were killed
+  int hung = 0;    // that slept and did nothing for five seconds, or ran for a minute; killed
   int failed = 0;  // that ended otherwise than with 0
 };
 

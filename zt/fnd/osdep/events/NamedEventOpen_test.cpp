@@ -9,7 +9,6 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
-#include <chrono>
 #include <cstring>
 #include <filesystem>
 #include <memory>
@@ -294,9 +293,7 @@ TEST(NamedEventOpen, OtherKindInAnotherProcessIsENOLCKAndChangesNothing) {
   for (bool manual : {kManual, kAutomatic}) {
     auto event = Open("name", manual, kSet);
     std::string state = ReadBytes(place.file("sem_1")), lock = ReadBytes(place.file("name"));
-    auto begin = std::chrono::steady_clock::now();
     EXPECT_EQ(ErrorElsewhere("name", !manual), ENOLCK);
-    EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::milliseconds(1500));
     EXPECT_EQ(state, ReadBytes(place.file("sem_1")));
     EXPECT_EQ(lock, ReadBytes(place.file("name")));
     EXPECT_TRUE(event->checkOnly());
