@@ -14,9 +14,14 @@ namespace vlt::test {
 namespace {
 
 #if defined(__x86_64__)
-constexpr int kThirdArgument = REG_RDX, kResult = REG_RAX;
-#else
-constexpr int kThirdArgument = REG_EDX, kResult = REG_EAX;
+auto& ThirdArgument(mcontext_t& context) { return context.gregs[REG_RDX]; }
+auto& Result(mcontext_t& context) { return context.gregs[REG_RAX]; }
+#elif defined(__i386__)
+auto& ThirdArgument(mcontext_t& context) { return context.gregs[REG_EDX]; }
+auto& Result(mcontext_t& context) { return context.gregs[REG_EAX]; }
+#elif defined(__aarch64__)
+auto& ThirdArgument(mcontext_t& context) { return context.regs[2]; }
+auto& Result(mcontext_t& context) { return context.regs[0]; }
 #endif
 
 // The time of SYS_clock_nanosleep, which serves sleeps below 68 years in 32-bit processes, too.
@@ -28,11 +33,11 @@ std::array<long long, 1000> s_sleeps;
 std::size_t s_count;
 
 void OnSleep(int, siginfo_t*, void* context) {
-  auto& registers = static_cast<ucontext_t*>(context)->uc_mcontext.gregs;
-  auto* time = reinterpret_cast<const KernelTime*>(registers[kThirdArgument]);
+  mcontext_t& registers = static_cast<ucontext_t*>(context)->uc_mcontext;
+  auto* time = reinterpret_cast<const KernelTime*>(ThirdArgument(registers));
   long long ms = time->seconds * 1000LL + time->nanoseconds / 1000000;
   if (s_count < s_sleeps.size()) s_sleeps[s_count++] = ms;
-  registers[kResult] = 0;
+  Result(registers) = 0;
 }
 
 }  // namespace

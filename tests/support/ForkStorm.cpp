@@ -38,8 +38,8 @@ bool Sleeps(const std::string& whatItDid) {
   return state != std::string::npos && whatItDid[state + 2] == 'S';
 }
 
-// The exit code, or -1 for a child that is hung: it sleeps, and did nothing for a whole interval, or
-// it runs beyond any measure.
+// The exit code, or -1 for a child that is hung: it sleeps, and did nothing for a whole interval,
+// or it runs beyond any measure.
 int EndOf(pid_t pid) {
   int status = 0;
   const auto last = Clock::now() + kLongest;

@@ -1,5 +1,6 @@
 #include "tests/support/TracedChild.h"
 
+#include <elf.h>
 #include <signal.h>
 #include <stdio.h>
 #include <sys/prctl.h>
@@ -11,6 +12,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <climits>
 #include <cstddef>
@@ -21,12 +23,42 @@
 namespace vlt::test {
 namespace {
 
+using Arguments = std::array<uint64_t, 6>;
+
 #if defined(__x86_64__)
-auto& NumberOf(user_regs_struct& registers) { return registers.orig_rax; }
-auto& ResultOf(user_regs_struct& registers) { return registers.rax; }
+auto& NumberOf(user_regs_struct& r) { return r.orig_rax; }
+auto& ResultOf(user_regs_struct& r) { return r.rax; }
+Arguments ArgumentsOf(const user_regs_struct& r) {
+  return {r.rdi, r.rsi, r.rdx, r.r10, r.r8, r.r9};
+}
+#elif defined(__i386__)
+auto& NumberOf(user_regs_struct& r) { return r.orig_eax; }
+auto& ResultOf(user_regs_struct& r) { return r.eax; }
+Arguments ArgumentsOf(const user_regs_struct& r) {
+  const auto word = [](long value) -> uint64_t { return static_cast<uint32_t>(value); };
+  return {word(r.ebx), word(r.ecx), word(r.edx), word(r.esi), word(r.edi), word(r.ebp)};
+}
+#elif defined(__aarch64__)
+auto& NumberOf(user_regs_struct& r) { return r.regs[8]; }
+auto& ResultOf(user_regs_struct& r) { return r.regs[0]; }
+Arguments ArgumentsOf(const user_regs_struct& r) {
+  return {r.regs[0], r.regs[1], r.regs[2], r.regs[3], r.regs[4], r.regs[5]};
+}
+#endif
+
+// The process, stopped at the entry of a call, then makes none: no call has the number -1. False if
+// the process is gone.
+#if defined(__aarch64__)
+bool SkipCall(pid_t process, user_regs_struct) {
+  int number = -1;
+  iovec data = {&number, sizeof number};
+  return ptrace(PTRACE_SETREGSET, process, NT_ARM_SYSTEM_CALL, &data) == 0;
+}
 #else
-auto& NumberOf(user_regs_struct& registers) { return registers.orig_eax; }
-auto& ResultOf(user_regs_struct& registers) { return registers.eax; }
+bool SkipCall(pid_t process, user_regs_struct r) {
+  NumberOf(r) = -1;
+  return ptrace(PTRACE_SETREGS, process, nullptr, &r) == 0;
+}
 #endif
 
 // What paths a call has: the numbers of its arguments, -1 for none.
@@ -127,7 +159,8 @@ class Tracer {
 
   user_regs_struct registers() const {
     user_regs_struct registers;
-    if (ptrace(PTRACE_GETREGS, m_process, nullptr, &registers) != 0) Fail("PTRACE_GETREGS");
+    iovec data = {&registers, sizeof registers};
+    if (ptrace(PTRACE_GETREGSET, m_process, NT_PRSTATUS, &data) != 0) Fail("PTRACE_GETREGSET");
     return registers;
   }
 
@@ -136,19 +169,11 @@ class Tracer {
     m_call = SystemCall{};
     m_call.process = m_process;
     m_call.number = static_cast<long>(NumberOf(r));
-#if defined(__x86_64__)
-    const uint64_t args[] = {r.rdi, r.rsi, r.rdx, r.r10, r.r8, r.r9};
-#else
-    const auto word = [](long value) -> uint64_t { return static_cast<uint32_t>(value); };
-    const uint64_t args[] = {word(r.ebx), word(r.ecx), word(r.edx),
-                             word(r.esi), word(r.edi), word(r.ebp)};
-#endif
-    std::copy(args, args + 6, m_call.args);
+    std::ranges::copy(ArgumentsOf(r), m_call.args);
     m_inside = true;
     m_error = m_before ? m_before(m_call) : 0;
     if (m_error != 0 && m_call.number != SYS_close) {
-      NumberOf(r) = -1;  // No call has this number, so nothing happens.
-      if (ptrace(PTRACE_SETREGS, m_process, nullptr, &r) != 0) Fail("PTRACE_SETREGS");
+      if (!SkipCall(m_process, r)) Fail("PTRACE_SETREGS");
     }
   }
 
@@ -157,7 +182,8 @@ class Tracer {
     user_regs_struct r = registers();
     if (m_error != 0) {
       ResultOf(r) = m_error == TracedChild::kPretend ? 0 : -m_error;
-      if (ptrace(PTRACE_SETREGS, m_process, nullptr, &r) != 0) Fail("PTRACE_SETREGS");
+      iovec data = {&r, sizeof r};
+      if (ptrace(PTRACE_SETREGSET, m_process, NT_PRSTATUS, &data) != 0) Fail("PTRACE_SETREGSET");
       return;
     }
     m_call.result = static_cast<long>(ResultOf(r));
