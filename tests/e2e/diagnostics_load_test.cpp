@@ -12,6 +12,7 @@
 
 #include "tests/support/EventPlace.h"
 #include "tests/support/InChild.h"
+#include "tests/support/PrivateRoot.h"
 #include "tests/support/TempDir.h"
 
 namespace vlt::test {
@@ -114,6 +115,9 @@ TEST_F(DiagnosticsLoad, ADiskThatIsShortGetsNoLog) {
 // The log is asked for in each of the following, so that it is tried to be opened.
 
 TEST_F(DiagnosticsLoad, AnUnwritableHomeIsNothingToSpeakOf) {
+  if (!vlt::test::AllMayEnter(VLT_TEST_BIN)) {
+    GTEST_SKIP() << "NOT TESTED: another user may not enter the build tree";
+  }
   options("[vlt]\nSeverity = 34\nTarget = 1\n");
   TempDir home;
   chmod(home.path().c_str(), 0755);
@@ -129,6 +133,9 @@ TEST_F(DiagnosticsLoad, AnUnwritableHomeIsNothingToSpeakOf) {
 }
 
 TEST_F(DiagnosticsLoad, AHomeOfAnyLengthHasTheLog) {
+  if (!vlt::test::AllMayEnter(VLT_TEST_BIN)) {
+    GTEST_SKIP() << "NOT TESTED: another user may not enter the build tree";
+  }
   options("[vlt]\nSeverity = 32\nTarget = 1\n");
   TempDir dir;
   std::string home = dir.makeDir(std::string(200, 'h') + "/" + std::string(200, 'i'));
@@ -142,6 +149,9 @@ TEST_F(DiagnosticsLoad, AHomeOfAnyLengthHasTheLog) {
 }
 
 TEST_F(DiagnosticsLoad, WithoutAHomeTheLogIsInTheTemporaryPlace) {
+  if (!vlt::test::AllMayEnter(VLT_TEST_BIN)) {
+    GTEST_SKIP() << "NOT TESTED: another user may not enter the build tree";
+  }
   options("[vlt]\nSeverity = 32\nTarget = 1\n");
   for (const char* mode : {"mode=1777", "mode=755", "ro"}) {
     int code = -1;

@@ -80,4 +80,11 @@ bool BecomeOrdinaryUser(const std::string& place) {
          setresgid(kNobody, kNobody, kNobody) == 0 && setresuid(kNobody, kNobody, kNobody) == 0;
 }
 
+bool AllMayEnter(const std::string& path) {
+  for (fs::path place = path; place != place.root_path(); place = place.parent_path()) {
+    if ((fs::status(place).permissions() & fs::perms::others_exec) == fs::perms::none) return false;
+  }
+  return true;
+}
+
 }  // namespace vlt::test

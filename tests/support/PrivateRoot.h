@@ -19,4 +19,7 @@ void LeavePrivateRoot(const std::string& place);
 // Makes the superuser an ordinary user who owns `place`.
 bool BecomeOrdinaryUser(const std::string& place);
 
+// True if every user may enter the directories on the path.
+bool AllMayEnter(const std::string& path);
+
 }  // namespace vlt::test

@@ -22,5 +22,14 @@ TEST(PrivateRoot, TheSuperuserHasARootDirectoryOfItsOwn) {
   std::filesystem::remove_all("/Library");
 }
 
+TEST(PrivateRoot, OneDirectoryThatIsClosedKeepsOthersOut) {
+  TempDir dir;
+  std::string inner = dir.makeDir("outer/inner");
+  chmod(dir.path().c_str(), 0755);
+  EXPECT_TRUE(AllMayEnter(inner));
+  chmod((dir / "outer").c_str(), 0700);
+  EXPECT_FALSE(AllMayEnter(inner));
+}
+
 }  // namespace
 }  // namespace vlt::test
