@@ -7,9 +7,25 @@ install(TARGETS vltutils EXPORT vltutilsTargets LIBRARY DESTINATION ${CMAKE_INST
 install(EXPORT vltutilsTargets NAMESPACE vltutils:: DESTINATION ${packages})
 install(DIRECTORY ${CMAKE_BINARY_DIR}/include/vltutils DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
 
+# The snapshot reader, whole: one archive of its floor and the ones below, for programs that do without
+# the library.
+set(objects "")
+foreach(floor vltsnapshot vltcommon ztcore ztini ztfnd ztposix)
+  list(APPEND objects $<TARGET_OBJECTS:${floor}>)
+endforeach()
+add_library(snapshot STATIC cmake/empty.cpp ${objects})
+set_target_properties(snapshot PROPERTIES OUTPUT_NAME vltsnapshot
+  ARCHIVE_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/package)
+target_link_libraries(snapshot INTERFACE Threads::Threads ${CMAKE_DL_LIBS})
+target_include_directories(snapshot INTERFACE $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)
+target_compile_features(snapshot INTERFACE cxx_std_17)
+install(TARGETS snapshot EXPORT vltutilsTargets ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR})
+install(FILES source/Snapshot/snapshot.hpp DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/vltutils)
+
 write_basic_package_version_file(${CMAKE_BINARY_DIR}/vltutilsConfigVersion.cmake
   COMPATIBILITY SameMajorVersion)
 file(WRITE ${CMAKE_BINARY_DIR}/vltutilsConfig.cmake
+  "include(CMakeFindDependencyMacro)\nfind_dependency(Threads)\n"
   "include(\"\${CMAKE_CURRENT_LIST_DIR}/vltutilsTargets.cmake\")\n")
 install(FILES ${CMAKE_BINARY_DIR}/vltutilsConfig.cmake
   ${CMAKE_BINARY_DIR}/vltutilsConfigVersion.cmake DESTINATION ${packages})

@@ -23,8 +23,8 @@ enum class Type { Dictionary, ObjectExpert, ResourceExpert };
 // "dictionary", "object expert", "resource expert".
 const char* NameOf(Type type);
 
-// A component as GetComponent and EnumComponents of the registrar give it. Texts that are null there
-// are none here.
+// A component as GetComponent and EnumComponents of the registrar give it. Texts that are null
+// there are none here.
 struct Component {
   Type type = Type::ObjectExpert;
   std::string name;
@@ -85,8 +85,9 @@ struct Problem {
   int error = 0;
 };
 
-// The answers of a registrar that starts now and finds no registration file new or changed. None where
-// it would not begin with what the database holds: where that is missing, set aside or unreadable.
+// The answers of a registrar that starts now and finds no registration file new or changed. None
+// where it would not begin with what the database holds: where that is missing, set aside or
+// unreadable.
 struct Snapshot {
   std::string root;  // ends in a slash
   Database database;
@@ -107,8 +108,9 @@ struct Snapshot {
   unsigned changes() const;
 };
 
-// Of the installation in force: the preference "Dir". Throws std::runtime_error where that names
-// none, std::system_error where the system cannot read it now, std::bad_alloc.
+// Of the installation in force: the preference "Dir", looked up once a process as by the library.
+// Throws std::runtime_error where that names none, std::system_error where the system cannot read
+// it now, std::bad_alloc.
 Snapshot Read();
 
 // Of the installation in a directory. Its database may have been written where the installation had

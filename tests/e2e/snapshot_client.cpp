@@ -1,5 +1,5 @@
-// A program of the snapshot reader, as others write them: C++17, the installed header, nothing else of
-// the tree. Prints what it finds as JSON.
+// A program of the snapshot reader, as others write them: C++17, the installed header, nothing else
+// of the tree. Prints what it finds as JSON.
 //
 //   snapshot_client [ROOT]
 //   snapshot_client --start ROOT

@@ -1,5 +1,5 @@
-// list, show, classes and scan as readers: beside a registrar that another process holds, on trees that
-// may only be read, as another user, and without a trace.
+// list, show, classes and scan as readers: beside a registrar that another process holds, on trees
+// that may only be read, as another user, and without a trace.
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -97,7 +97,7 @@ TEST_F(SnapshotCommands, LiveIsRefusedWhileAnotherProcessHoldsTheRegistrar) {
   EXPECT_EQ(Vltctl({"list", "--live", "--wait", "x"}).exitCode, kUsage);
 }
 
-TEST_F(SnapshotCommands, LiveWaitsAsLongAsItIsTold) {
+TEST_F(SnapshotCommands, LiveWaitsAsLongAsItIsAsked) {
   Holder holder;
   Child waiter([] { return Vltctl({"list", "--live", "--wait", "25"}).exitCode; });
   EXPECT_EQ(Vltctl({"list", "--live", "--wait", "1"}).exitCode, kBusy);

@@ -1,5 +1,5 @@
-// The snapshot reader beside the registrar: on random installations, over several starts, both give the
-// same answers, field by field.
+// The snapshot reader beside the registrar: on random installations, over several starts, both give
+// the same answers, field by field.
 #include <gtest/gtest.h>
 #include <locale.h>
 #include <string.h>

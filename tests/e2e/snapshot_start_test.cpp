@@ -1,5 +1,5 @@
-// What the reader says of the next start, and what that start then does: on random installations, the
-// bytes of the database, the saves, and the registration files that are set aside.
+// What the reader says of the next start, and what that start then does: on random installations,
+// the bytes of the database, the saves, and the registration files that are set aside.
 #include <gtest/gtest.h>
 #include <locale.h>
 
@@ -69,29 +69,29 @@ void CompareOne(unsigned seed, int rounds, Counts* counts) {
   const std::string out = installation.root() + ".names";
   for (int round = 0; round < rounds; ++round) {
     SCOPED_TRACE("seed " + std::to_string(seed) + ", round " + std::to_string(round));
-    json told = Rehearse(installation, locale);
+    json foreseen = Rehearse(installation, locale);
     unsigned bad = BadFiles(installation.root());
     SaveCounter saves(installation.root(), "vlt.vlr");
     bool hasRegistrar = StartFor(locale, out);
-    if (told["scans"] != true) {
+    if (foreseen["scans"] != true) {
       EXPECT_TRUE(!hasRegistrar || ReadBytes(out) == "[]") << ReadBytes(out);
       EXPECT_EQ(saves.count(), 0);
     } else {
       ASSERT_TRUE(hasRegistrar);
-      EXPECT_EQ(ReadBytes(installation.database()), BytesOf(told["text"]));
+      EXPECT_EQ(ReadBytes(installation.database()), BytesOf(foreseen["text"]));
       // A second name that is taken up is renamed, too.
-      int renames = told["saves"].get<int>() + (told["fromDurableCopy"] == true);
+      int renames = foreseen["saves"].get<int>() + (foreseen["fromDurableCopy"] == true);
       EXPECT_EQ(saves.count(), renames);
-      EXPECT_EQ(BadFiles(installation.root()) - bad, told["setAside"].size());
+      EXPECT_EQ(BadFiles(installation.root()) - bad, foreseen["setAside"].size());
       json names = json::parse(ReadBytes(out));
-      for (const json& removed : told["removed"]) {
+      for (const json& removed : foreseen["removed"]) {
         EXPECT_EQ(std::count(names.begin(), names.end(), removed), 0) << removed;
       }
       ++counts->starts;
-      counts->merges += told["added"].size() + told["changed"].size() > 0;
-      counts->removals += !told["removed"].empty();
-      counts->setAside += !told["setAside"].empty();
-      counts->erasedOnDisk += told["leavesErasedOnDisk"] == true;
+      counts->merges += foreseen["added"].size() + foreseen["changed"].size() > 0;
+      counts->removals += !foreseen["removed"].empty();
+      counts->setAside += !foreseen["setAside"].empty();
+      counts->erasedOnDisk += foreseen["leavesErasedOnDisk"] == true;
     }
     if (testing::Test::HasFailure()) return;
     installation.change();

@@ -39,7 +39,7 @@ constexpr Argument kClasses[] = {
 constexpr Argument kWhy[] = {
     {"COMPONENT", nullptr, "Name, GUID or path of a bundle or registration file", true}, kRoot};
 constexpr Argument kScan[] = {
-    {"--dry-run", nullptr, "Only say it; required, as a registrar scans by itself"}, kRoot};
+    {"--dry-run", nullptr, "Required: only report it; a registrar scans when it starts"}, kRoot};
 constexpr Argument kCheck[] = {
     {"--only-bad", nullptr, "Show the components that are not sound only"},
     {"--library", nullptr, "Add what the library's own check says, as notes"},

@@ -27,8 +27,8 @@ struct Bundle {
   std::string stem() const;
 };
 
-// All entries of the two directories of bundles, and bundles that lie elsewhere below the root; in a
-// scan's order.
+// All entries of the two directories of bundles, and bundles that lie elsewhere below the root; in
+// a scan's order.
 std::vector<Bundle> FindBundles(const std::string& root);
 // The one at a path, which need not be below the root.
 Bundle BundleAt(const std::string& root, const std::string& path);

@@ -8,8 +8,8 @@
 #include "tools/common/Arguments.h"
 #include "tools/common/Output.h"
 
-// Components as the snapshot reader finds them (source/Snapshot/snapshot.hpp): what list, show, classes,
-// scan and why have in common.
+// Components as the snapshot reader finds them (source/Snapshot/snapshot.hpp): what list, show,
+// classes, scan and why have in common.
 namespace admin {
 
 using vlt::snapshot::Component;
@@ -19,8 +19,8 @@ using vltctl::Output;
 
 // Of the installation in force, or of --root. Throws vltctl::Failure.
 Snapshot ReadSnapshot(const Arguments& arguments);
-// The same, but a database that has no components to show is a failure, too. What the components do not
-// tell is noted: a tree that has changed since, a digest that differs.
+// The same, but a database that has no components to show is a failure, too. What the components do
+// not say is noted: a tree that has changed since, a digest that differs.
 Snapshot ReadComponents(const Arguments& arguments, Output& output);
 
 // Runs a step of the reader; what it throws becomes a vltctl::Failure.
@@ -34,8 +34,8 @@ vltctl::Json ToJson(const Snapshot& snapshot, const Component& component);
 // The classes that the component binds to, as the registrar answers.
 std::vector<std::string> ClassesOf(const Snapshot& snapshot, const Component& component);
 
-// The components that a text of the command line means: a GUID or a name, or the beginning of one, or a
-// path of the component's file or registration file. An exact match counts alone.
+// The components that a text of the command line means: a GUID or a name, or the beginning of one,
+// or a path of the component's file or registration file. An exact match counts alone.
 std::vector<const Component*> Matches(const Snapshot& snapshot, const std::string& text);
 
 // The one component. Throws vltctl::Failure with kNotFound for none and for several.
@@ -45,12 +45,12 @@ const Component& Only(const Snapshot& snapshot, const std::string& text);
 bool IsTypeWord(const std::string& word);
 std::string TypeWord(vlt::snapshot::Type type);
 
-// The code of a component's bundle, as the library looks for it; empty if there is none. A file is its own
-// code.
+// The code of a component's bundle, as the library looks for it; empty if there is none. A file is
+// its own code.
 std::string LibraryOf(const Component& component);
 
-// For --live: returns when the registrar can be had at once, within --wait seconds. Throws
-// vltctl::Failure with kBusy.
+// For --live: waits, for at most --wait seconds, until no other process has the registrar. Throws
+// vltctl::Failure with kBusy. A process that takes it right after that is waited for by the library.
 void WaitForRegistrar(const Arguments& arguments);
 
 }  // namespace admin
