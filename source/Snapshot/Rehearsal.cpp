@@ -36,6 +36,20 @@ std::optional<std::string> Utf8IfAny(const std::optional<std::string>& text) {
   return text ? std::optional<std::string>(Utf8(*text)) : std::nullopt;
 }
 
+using Components = std::map<GUID, Component>;
+
+// A component that was replaced by one of its GUID leaves its bindings.
+void AddClasses(const std::vector<Binding>& bindings, Components* components) {
+  std::map<std::string, Component*> byText;
+  for (auto& [guid, component] : *components) byText.emplace(component.guid, &component);
+  for (const Binding& binding : bindings) {
+    Component& component = *byText.at(binding.component);
+    std::vector<std::string>& classes = component.classes;
+    bool isKnown = std::find(classes.begin(), classes.end(), binding.bindingClass) != classes.end();
+    if (component.type == binding.type && !isKnown) classes.push_back(binding.bindingClass);
+  }
+}
+
 // As the registrar keeps its texts: through the wide form.
 std::string AsKept(const std::string& text) { return Narrow(Widen(text)); }
 
@@ -169,7 +183,7 @@ void Rehearsal::removeVanished(std::vector<std::string>* vanished) {
 }
 
 void Rehearsal::readComponents(std::vector<Component>* components, std::vector<Binding>* bindings) {
-  std::map<GUID, Component> byGuid;  // of two with one GUID the later counts
+  Components byGuid;  // of two with one GUID the later counts
   int count = m_document.GetNumberOfItems(registrar::kComponents);
   for (int n = 1; n <= count; ++n) {
     std::string name;
@@ -185,6 +199,7 @@ void Rehearsal::readComponents(std::vector<Component>* components, std::vector<B
     byGuid.insert_or_assign(record.identifier, std::move(component));
     if (completed) save();
   }
+  AddClasses(*bindings, &byGuid);
   for (auto& [guid, component] : byGuid) components->push_back(std::move(component));
 }
 

@@ -58,6 +58,7 @@ TEST_IN_CHILD(Snapshot, HasTheFieldsOfEveryType) {
   EXPECT_EQ(serial.type, Type::ResourceExpert);
   EXPECT_EQ(serial.pnp, "PNP");
   EXPECT_EQ(serial.recordVersion, 3u);
+  EXPECT_EQ(serial.classes, std::vector<std::string>{Sample::B(9)});
   EXPECT_EQ(found.boundTo(Type::ObjectExpert, GText(9)), std::vector<std::string>{Sample::B(2)});
   EXPECT_EQ(found.boundTo(Type::ResourceExpert, GText(9)), std::vector<std::string>{Sample::B(3)});
   EXPECT_EQ(found.boundTo(Type::ResourceExpert, GText(8)), std::vector<std::string>{});

@@ -37,6 +37,9 @@ struct Component {
   // Resource experts.
   std::optional<std::string> pnp;
 
+  // Experts: the classes it binds to, once each.
+  std::vector<std::string> classes;
+
   std::string registrationFile;  // which brought it; empty for one that came by a call
 };
 

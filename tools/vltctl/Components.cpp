@@ -100,18 +100,7 @@ Snapshot ReadComponents(const Arguments& arguments, Output& output) {
   return snapshot;
 }
 
-std::vector<std::string> ClassesOf(const Snapshot& snapshot, const Component& component) {
-  std::vector<std::string> classes;
-  for (const auto& binding : snapshot.bindings) {
-    if (binding.component != component.guid || binding.type != component.type) continue;
-    if (std::find(classes.begin(), classes.end(), binding.bindingClass) == classes.end()) {
-      classes.push_back(binding.bindingClass);
-    }
-  }
-  return classes;
-}
-
-Json ToJson(const Snapshot& snapshot, const Component& c) {
+Json ToJson(const Component& c) {
   bool isDictionary = c.type == Type::Dictionary;
   bool wasInstalled = isDictionary && c.lastInstalledSchemaVersion != 0xFFFFFFFF;
   auto text = [](const std::optional<std::string>& value) { return value ? Json(*value) : Json(); };
@@ -126,7 +115,7 @@ Json ToJson(const Snapshot& snapshot, const Component& c) {
       {"prefix", text(c.prefix)},
       {"pnp", text(c.pnp)},
       {"registrationFile", c.registrationFile.empty() ? Json() : Json(c.registrationFile)},
-      {"classes", ClassesOf(snapshot, c)}};
+      {"classes", c.classes}};
 }
 
 // ---- Which component is meant

@@ -29,10 +29,7 @@ void WithFailures(const std::function<void()>& step);
 // Notes the directories that could not be read.
 void NoteProblems(const std::vector<vlt::snapshot::Problem>& problems, Output& output);
 
-vltctl::Json ToJson(const Snapshot& snapshot, const Component& component);
-
-// The classes that the component binds to, as the registrar answers.
-std::vector<std::string> ClassesOf(const Snapshot& snapshot, const Component& component);
+vltctl::Json ToJson(const Component& component);
 
 // The components that a text of the command line means: a GUID or a name, or the beginning of one,
 // or a path of the component's file or registration file. An exact match counts alone.

@@ -1,6 +1,8 @@
 // list and classes: the components of a snapshot.
 #include <fnmatch.h>
 
+#include <algorithm>
+
 #include "tools/common/Locale.h"
 #include "tools/vltctl/Components.h"
 #include "tools/vltctl/Reading.h"
@@ -19,8 +21,7 @@ std::string Versions(const Component& c) {
   return c.type == Type::Dictionary ? std::to_string(c.schemaVersion) : "-";
 }
 
-void Print(const Snapshot& snapshot, const std::vector<const Component*>& components, bool isLong,
-           Output& output) {
+void Print(const std::vector<const Component*>& components, bool isLong, Output& output) {
   std::vector<std::string> header = {"TYPE", "NAME", "GUID", "VERSION", "FILE"};
   if (isLong) header.insert(header.end(), {"PREFIX OR PNP", "CLASSES", "REGISTRATION FILE"});
   vltctl::Table table(header);
@@ -29,11 +30,11 @@ void Print(const Snapshot& snapshot, const std::vector<const Component*>& compon
                                     OrDash(c->file)};
     if (isLong) {
       row.push_back(OrDash(c->type == Type::Dictionary ? c->prefix : c->pnp));
-      row.push_back(std::to_string(ClassesOf(snapshot, *c).size()));
+      row.push_back(std::to_string(c->classes.size()));
       row.push_back(OrDash(c->registrationFile));
     }
     table.add(row);
-    output.item(ToJson(snapshot, *c));
+    output.item(ToJson(*c));
   }
   output.print(table);
 }
@@ -49,11 +50,9 @@ std::vector<const Component*> InOrder(const Snapshot& snapshot) {
   return order;
 }
 
-bool BindsTo(const Snapshot& snapshot, const Component& component, const std::string& guid) {
-  for (const std::string& bindingClass : ClassesOf(snapshot, component)) {
-    if (bindingClass == guid) return true;
-  }
-  return false;
+bool BindsTo(const Component& component, const std::string& guid) {
+  return std::find(component.classes.begin(), component.classes.end(), guid) !=
+         component.classes.end();
 }
 
 std::string GuidOf(const std::string& text) {
@@ -80,10 +79,10 @@ int List(const Arguments& arguments, Output& output) {
   for (const Component* c : InOrder(snapshot)) {
     if (!type.empty() && TypeWord(c->type) != type) continue;
     if (!name.empty() && fnmatch(name.c_str(), c->name.c_str(), 0) != 0) continue;
-    if (!bindingClass.empty() && !BindsTo(snapshot, *c, bindingClass)) continue;
+    if (!bindingClass.empty() && !BindsTo(*c, bindingClass)) continue;
     shown.push_back(c);
   }
-  Print(snapshot, shown, arguments.has("--long"), output);
+  Print(shown, arguments.has("--long"), output);
   std::vector<vltctl::NamedTexts> texts;
   for (const Component* c : shown) texts.push_back({c->name, c->name + c->file.value_or("")});
   if (std::string note = vltctl::LocaleNote(texts); !note.empty()) output.note(note);
@@ -104,7 +103,7 @@ int Classes(const Arguments& arguments, Output& output) {
     throw Failure(vltctl::kNotFound,
                   {"no-class", "", "no component binds to " + guid, "", "\"vltctl list --long\""});
   }
-  Print(snapshot, bound, false, output);
+  Print(bound, false, output);
   return vltctl::kGood;
 }
 

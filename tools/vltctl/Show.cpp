@@ -69,7 +69,7 @@ void Print(const Snapshot& snapshot, const Component& c, Output& output) {
     add("previous version", PreviousOf(snapshot, c));
   }
   add("pnp", c.pnp.value_or(""));
-  for (const std::string& bindingClass : ClassesOf(snapshot, c)) add("binds to", bindingClass);
+  for (const std::string& bindingClass : c.classes) add("binds to", bindingClass);
   add("registration file", c.registrationFile);
   const char* state = StateOf(snapshot, c.registrationFile);
   if (state) add("its stamp", TimeOf(c.registrationFile) + ", " + state);
@@ -79,7 +79,7 @@ void Print(const Snapshot& snapshot, const Component& c, Output& output) {
 Json ItemOf(const Snapshot& snapshot, const Component& c) {
   auto orNull = [](const std::string& text) { return text.empty() ? Json() : Json(text); };
   const char* state = StateOf(snapshot, c.registrationFile);
-  Json item = ToJson(snapshot, c);
+  Json item = ToJson(c);
   item["stamp"] = state ? orNull(TimeOf(c.registrationFile)) : Json();
   item["registrationState"] = state ? Json(state) : Json();
   item["library"] = orNull(LibraryOf(c));
