@@ -41,7 +41,7 @@ void Kor(const std::string& root, const std::string& text) {
 
 const Situation kSituations[] = {
     {"no install directory",
-     {"list"},
+     {"list", "--live"},
      kDataUnusable,
      "vltctl: CONFIG/com.zentrex.kor.ini: the preference \"Dir\" is empty, so there is no "
      "installation; "
@@ -49,7 +49,7 @@ const Situation kSituations[] = {
      "to the install directory, or remove it for the default\n",
      [](auto&) { Installation::setDir(""); }},
     {"install directory is a file",
-     {"list"},
+     {"list", "--live"},
      kDataUnusable,
      "vltctl: ROOT: is no directory; move what is there out of the way\n",
      [](auto& root) {
@@ -57,7 +57,7 @@ const Situation kSituations[] = {
        WriteBytes(root, "");
      }},
     {"Data is a file",
-     {"list"},
+     {"list", "--live"},
      kDataUnusable,
      "vltctl: ROOT/Data: is no directory; move what is there out of the way\n",
      [](auto& root) { WriteBytes(root + "/Data", ""); }},
@@ -290,12 +290,11 @@ TEST(VltctlBadSituations, AnotherUsersInstallationThatMayNotBeWritten) {
   RunProgram({"chmod", "-R", "a+rX", getenv("VLT_TEST_ROOT")});
   ExpectInChild([&] {
     ASSERT_EQ(setuid(65534), 0);
-    ProgramResult result = Vltctl({"list"});
+    ProgramResult result = Vltctl({"list", "--live"});
     EXPECT_EQ(result.exitCode, kDataUnusable);
-    EXPECT_EQ(result.err,
-              "vltctl: " + installation.root() +
-                  ": the database cannot be made: Permission denied; run \"vltctl list\" "
-                  "once as a user who may write there\n");
+    EXPECT_EQ(result.err, "vltctl: " + installation.root() +
+                              ": the database cannot be made: Permission denied; run \"vltctl list "
+                              "--live\" once as a user who may write there\n");
   });
 }
 

@@ -235,15 +235,17 @@ TEST(Vltctl, DataThatCannotBeUsedIsToldInOneLine) {
   EXPECT_EQ(Vltctl({"list", "--live"}).exitCode, kGood);
 }
 
-TEST(Vltctl, ADatabaseThatWasSetAsideIsToldAndTheNextCallWorks) {
+TEST(Vltctl, ADatabaseThatWouldBeSetAsideIsReportedAndRepaired) {
   Sample s;
   WriteBytes(s.sidecar(), "short");
-  ProgramResult before = Vltctl({"list"});
-  EXPECT_EQ(before.exitCode, kDataUnusable);
-  EXPECT_NE(before.err.find("sets the database aside"), std::string::npos) << before.err;
-  ProgramResult result = Vltctl({"list", "--live"});
-  EXPECT_EQ(result.exitCode, kDataUnusable);
-  EXPECT_NE(result.err.find("set aside"), std::string::npos);
+  for (const std::vector<std::string>& command :
+       {std::vector<std::string>{"list"}, {"list", "--live"}}) {
+    ProgramResult result = Vltctl(command);
+    EXPECT_EQ(result.exitCode, kDataUnusable);
+    EXPECT_NE(result.err.find("the sidecar is short"), std::string::npos) << result.err;
+  }
+  EXPECT_EQ(Vltctl({"repair"}).exitCode, kGood);
+  EXPECT_EQ(Vltctl({"list"}).exitCode, kGood);
   EXPECT_EQ(Vltctl({"list", "--live"}).exitCode, kGood);
 }
 

@@ -54,29 +54,25 @@ namespace {
 
 constexpr const char* kSeeScan = "\"vltctl scan --dry-run\" shows what the next start registers";
 
+// A database that a registrar would not begin with has nothing to show. Why, is said in the words of
+// verify and repair.
 void CheckDatabase(const vlt::snapshot::Database& database) {
-  auto fail = [&](const char* code, const char* what, const std::string& why, const char* next) {
-    throw Failure(vltctl::kDataUnusable, {code, database.path, what, why, next});
-  };
   switch (database.state) {
-    case DatabaseState::Missing:
-      return fail("no-database", "there is no registration database", "no registrar has run here",
-                  kSeeScan);
-    case DatabaseState::Unreadable:
-      throw Failure(vltctl::kDataUnusable,
-                    {"unreadable", database.failedPath, "cannot be read", strerror(database.error),
-                     "run the command as a user who may read it"});
-    case DatabaseState::Unparsable:
-      return fail("unparsable", "cannot be parsed",
-                  "it is not in UTF-8, and the next start sets it aside",
-                  "\"vltctl repair\" converts it");
-    case DatabaseState::SidecarShort:
-    case DatabaseState::SidecarDirectory:
-      return fail("sidecar-short", "the next start sets the database aside",
-                  "its sidecar is no whole digest", "\"vltctl repair\" seals it as it is");
-    default:
+    case DatabaseState::Sound:
+    case DatabaseState::DigestDiffers:
+    case DatabaseState::SidecarMissing:
       return;
+    case DatabaseState::Missing:
+      throw Failure(vltctl::kDataUnusable,
+                    {"no-database", database.path, "there is no registration database",
+                     "no registrar has run here", kSeeScan});
+    default:
+      break;
   }
+  GuardedIniState state = Inspect(database.path);
+  const StateWords& words = WordsOf(state.kind);
+  throw Failure(vltctl::kDataUnusable,
+                {words.code, database.path, words.found, WhyOf(state), words.next});
 }
 
 std::string Plural(unsigned count, const std::string& what) {

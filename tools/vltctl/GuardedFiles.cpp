@@ -149,7 +149,7 @@ void ExpectWritable(const std::string& directory) {
   if (access(directory.c_str(), W_OK) == 0 || errno == ENOENT) return;
   throw vltctl::Failure(vltctl::kDataUnusable,
                         {"not-writable", directory, "the database cannot be made", strerror(errno),
-                         "run \"vltctl list\" once as a user who may write there"});
+                         "run \"vltctl list --live\" once as a user who may write there"});
 }
 
 }  // namespace
