@@ -6,6 +6,7 @@ namespace vltctl {
 namespace {
 
 constexpr const char* kComponents = "Components";
+constexpr const char* kAuthors = "For authors of components";
 constexpr const char* kRendezvous = "Rendezvous";
 constexpr const char* kDiagnostics = "Diagnostics";
 constexpr const char* kTool = "The command itself";
@@ -72,6 +73,17 @@ constexpr Argument kError[] = {
 constexpr Argument kLocks[] = {
     {"--sweep", nullptr, "Remove the locks of logs whose processes have ended"}};
 
+constexpr Argument kLint[] = {
+    {"--strict", nullptr, "Warnings make the exit code 1, too"},
+    {"PATH", nullptr, "A registration file, a bundle, or a directory with bundles below it", true,
+     true, kFiles}};
+constexpr Argument kNew[] = {
+    {"--name", "NAME", "Name of the component and its bundle"},
+    {"--class", "GUID", "Class of objects that an expert binds to; a fresh one without"},
+    {"KIND", nullptr, "dictionary, object-expert or resource-expert", true, false,
+     "dictionary object-expert resource-expert"},
+    {"DIR", nullptr, "Directory to make the sources in", true, false, kDirectories}};
+
 constexpr Argument kCompletion[] = {{"SHELL", nullptr,
                                      "bash, zsh or fish; \"man\" is the list of the manual", true,
                                      false, "bash zsh fish man"}};
@@ -84,6 +96,8 @@ constexpr Command kCommands[] = {
     {kComponents, "why", "Why a component is not registered, and what to do; 1 if it is not", kWhy},
     {kComponents, "check", "Whether the components' files load and offer their entry points",
      kCheck},
+    {kAuthors, "lint", "What is wrong with registration files, by file and line", kLint},
+    {kAuthors, "new", "Skeleton of a component that builds, registers and checks sound", kNew},
     {kRendezvous, "settings", "Settings in force, where they come from, and what is ignored",
      kSettings},
     {kRendezvous, "settings set", "Changes a setting, under the file's lock", kSettingsSet},

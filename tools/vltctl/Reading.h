@@ -108,6 +108,8 @@ int Error(const Arguments& arguments, Output& output);
 int Paths(const Arguments& arguments, Output& output);
 int Locks(const Arguments& arguments, Output& output);
 int Doctor(const Arguments& arguments, Output& output);
+int Lint(const Arguments& arguments, Output& output);
+int New(const Arguments& arguments, Output& output);
 int Completion(const Arguments& arguments, Output& output);
 
 }  // namespace admin

@@ -95,6 +95,8 @@ int main(int argc, char** argv) {
       {"paths", admin::Paths},
       {"locks", admin::Locks},
       {"doctor", admin::Doctor},
+      {"lint", admin::Lint},
+      {"new", admin::New},
       {"completion", admin::Completion},
   };
   return vltctl::Run(argc, argv, handlers, admin::BecomeClient);
