@@ -1,6 +1,7 @@
 #include "tools/common/Help.h"
 
 #include <algorithm>
+#include <sstream>
 #include <string_view>
 #include <vector>
 
@@ -118,6 +119,21 @@ std::string Escaped(std::string_view text) {
   return out;
 }
 
+// In lines of at most 80 bytes, as "mandoc -T lint" wants them. None begins with a macro's character.
+std::string Wrapped(const std::string& text) {
+  constexpr size_t kWidth = 80;
+  std::string out, line;
+  std::istringstream words(text);
+  for (std::string word; words >> word;) {
+    if (!line.empty() && line.size() + 1 + word.size() > kWidth) {
+      out += line + "\n";
+      line.clear();
+    }
+    line += (line.empty() ? "" : " ") + word;
+  }
+  return out + line + "\n";
+}
+
 std::string InManual(const Argument& argument) {
   std::string out = argument.isPositional() ? "\\fI" : "\\fB";
   out += Escaped(argument.name) + "\\fR";
@@ -131,10 +147,10 @@ std::string InManual(const Command& command) {
   for (const Argument& argument : command.arguments) {
     std::string text = InManual(argument);
     head += argument.isRequired ? " " + text : " [" + text + "]";
-    list += ".TP\n" + text + "\n" + Escaped(argument.summary) + ".\n";
+    list += ".TP\n" + text + "\n" + Wrapped(Escaped(argument.summary) + ".");
   }
   if (!list.empty()) list = ".RS\n" + list + ".RE\n";
-  return ".TP\n" + head + "\n" + Escaped(command.summary) + ".\n" + list;
+  return ".TP\n" + head + "\n" + Wrapped(Escaped(command.summary) + ".") + list;
 }
 
 }  // namespace

@@ -28,6 +28,17 @@ TEST(Help, TheManualHasTheListOfTheTable) {
   EXPECT_EQ(manual.substr(first, last - first), ManualText());
 }
 
+TEST(Help, TheManualsAreClean) {
+  if (RunProgram({"sh", "-c", "command -v mandoc"}).exitCode != 0) {
+    GTEST_SKIP() << "NOT TESTED: mandoc is not installed";
+  }
+  for (const char* manual : {"/man/vltctl.1", "/man/vltutils.7"}) {
+    auto result = RunProgram({"mandoc", "-T", "lint", kSource + manual});
+    EXPECT_EQ(result.out, "");
+    EXPECT_EQ(result.exitCode, 0);
+  }
+}
+
 TEST(Help, NamesEachCommandAndEachArgument) {
   std::string all = HelpText("");
   for (const Command& command : Commands()) {
