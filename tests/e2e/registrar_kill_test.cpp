@@ -132,7 +132,8 @@ TEST_F(RegistrarKill, AtEveryCallOfASaveThatAClientAskedFor) {
 void KillStarts(const char* what, const Installation& i, const std::vector<GUID>& all,
                 size_t atLeast, const std::function<void()>& prepare,
                 const std::function<void()>& check) {
-  Tracing start({std::string(VLT_TEST_BIN) + "/vltctl", "list", "--live"}, {});
+  // The client by itself: the command inspects the database before it becomes the client.
+  Tracing start({std::string(VLT_TEST_BIN) + "/vltctl-client", "list", "--live"}, {});
   // The first run of all makes the directories of the locks and the log, which later ones find: calls
   // are found again by their number.
   EXPECT_EQ(start.runOnce(), 0);
