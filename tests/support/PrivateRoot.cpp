@@ -8,6 +8,7 @@
 
 #include <cerrno>
 #include <filesystem>
+#include <fstream>
 #include <system_error>
 
 namespace vlt::test {
@@ -47,6 +48,16 @@ void BindAll(const std::string& root) {
   }
 }
 
+// The superuser of a user name space without other users is an ordinary one in a name space within.
+bool RenameUser() {
+  if (unshare(CLONE_NEWUSER) != 0) return false;
+  const std::string map = std::to_string(kNobody) + " 0 1";
+  std::ofstream("/proc/self/setgroups") << "deny";
+  std::ofstream("/proc/self/gid_map") << map;
+  std::ofstream("/proc/self/uid_map") << map;
+  return getuid() == kNobody && getgid() == kNobody;
+}
+
 }  // namespace
 
 bool EnterPrivateRoot(const std::string& place) {
@@ -71,7 +82,12 @@ void LeavePrivateRoot(const std::string& place) {
   umount2((place + kBelow).c_str(), MNT_DETACH | UMOUNT_NOFOLLOW);
 }
 
+bool HasOtherUsers(const std::string& place) {
+  return chown(place.c_str(), kNobody, kNobody) == 0 && chown(place.c_str(), 0, 0) == 0;
+}
+
 bool BecomeOrdinaryUser(const std::string& place) {
+  if (!HasOtherUsers(place)) return RenameUser();
   std::error_code failed;
   for (const auto& entry : fs::recursive_directory_iterator(place, failed)) {
     if (lchown(entry.path().c_str(), kNobody, kNobody) != 0) return false;

@@ -16,6 +16,10 @@ bool EnterPrivateRoot(const std::string& place);
 // then, go with `place`.
 void LeavePrivateRoot(const std::string& place);
 
+// True if the superuser can give `place`, which is its own, to another user: a user name space may
+// have no other.
+bool HasOtherUsers(const std::string& place);
+
 // Makes the superuser an ordinary user who owns `place`.
 bool BecomeOrdinaryUser(const std::string& place);
 

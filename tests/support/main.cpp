@@ -55,8 +55,10 @@ int RunInside(char** argv) {
     if (getppid() != parent) _exit(97);
     SetUp(root);
     bool privateAlready = getenv("VLT_PRIVATE_ROOT") != nullptr;  // tests/support/in-private-root
-    if (geteuid() == 0 && !privateAlready && !vlt::test::EnterPrivateRoot(root)) {
-      fprintf(stderr, "No right to mount a root directory of its own: runs as an ordinary user.\n");
+    if (geteuid() == 0 && !privateAlready &&
+        (!vlt::test::HasOtherUsers(root) || !vlt::test::EnterPrivateRoot(root))) {
+      fprintf(stderr,
+              "No root directory of its own, or no other user: runs as an ordinary user.\n");
       if (!vlt::test::BecomeOrdinaryUser(root)) {
         fprintf(stderr, "No right to become one, either.\n");
         _exit(97);
