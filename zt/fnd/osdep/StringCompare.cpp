@@ -32,8 +32,8 @@ int Difference(wchar_t a, wchar_t b) { return wcsncmp(&a, &b, 1); }
 // that of i in a Turkish locale is no single byte, and is not seen.
 bool AreCasesOfALetter(wchar_t a, wchar_t b) {
   if ((a ^ b) != 0x20) return false;
-  const wchar_t lower = a | 0x20;
-  return lower >= L'a' && lower <= L'z' && std::toupper(static_cast<int>(lower)) == lower - 0x20;
+  const int letter = static_cast<int>(a) | 0x20;
+  return letter >= 'a' && letter <= 'z' && std::toupper(letter) == letter - 0x20;
 }
 bool AreCasesOfALetter(char, char) { return false; }
 

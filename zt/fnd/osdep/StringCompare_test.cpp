@@ -43,7 +43,7 @@ bool PairsFoldAsTheLocaleSays() {
   for (wchar_t a = 1; a < 0x180; ++a) {
     for (wchar_t b = 1; b < 0x180; ++b) {
       if (Sign(StringCaseCompare(&a, &a + 1, &b, &b + 1)) == Sign(PlainComparison(a, b))) continue;
-      ADD_FAILURE() << std::hex << "0x" << int{a} << " 0x" << int{b};
+      ADD_FAILURE() << std::hex << "0x" << static_cast<int>(a) << " 0x" << static_cast<int>(b);
       return false;
     }
   }
