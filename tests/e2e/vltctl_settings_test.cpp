@@ -54,8 +54,7 @@ TEST_F(VltctlSettings, ValuesAreThoseThatTheLibraryAnswers) {
       "[storage]\nRemoteServerEnabled3 = 5\nValidateDBStructure = "
       "\"0\"\n[other]\nNumCheckpoints=3\n"
       "[STORAGE]\nNumCheckpoints=4\n",
-      "\xEF\xBB\xBF[STORAGE]\r\nClientObjectCacheLimit=-1\r\nClientObjectCacheFlushPercentage="
-      "\r\n"};
+      "\xEF\xBB\xBF[STORAGE]\r\nClientObjectCacheLimit=-1\r\nNumCheckpoints=\r\n"};
   for (const char* text : texts) {
     SCOPED_TRACE(text);
     WriteBytes(file(), text);

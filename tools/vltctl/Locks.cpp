@@ -27,7 +27,7 @@ using zt::posix::ScopedFd;
 struct Lock {
   std::string name, file;
   const char* kind;  // "lock", "log" or "event"
-  long ageSeconds;
+  time_t ageSeconds;
   std::vector<vltctl::Process> holders;
 };
 
@@ -62,7 +62,7 @@ std::vector<Lock> LocksIn(const std::string& directory, const char* kind,
   return locks;
 }
 
-std::string Age(long seconds) {
+std::string Age(time_t seconds) {
   if (seconds < 60) return std::to_string(seconds) + " s";
   if (seconds < 3600) return std::to_string(seconds / 60) + " min";
   if (seconds < 86400) return std::to_string(seconds / 3600) + " h";
