@@ -95,8 +95,8 @@ int List(const Arguments&, Output& output) {
   double readyMs = static_cast<double>(client.timeToReady().count()) / 1000;
   Print(components, output);
   char summary[80];
-  snprintf(summary, sizeof summary, "%zu components; scanned in %.1f ms", components.size(),
-           readyMs);
+  snprintf(summary, sizeof summary, "%zu component%s; scanned in %.1f ms", components.size(),
+           components.size() == 1 ? "" : "s", readyMs);
   output.line(summary);
   NoteLocale(components, output);
   return kGood;

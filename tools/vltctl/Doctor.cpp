@@ -59,9 +59,10 @@ void CheckInstallation(Signs* signs) {
     return;
   }
   CheckDirectory("the install directory", root, signs);
-  for (const auto& [name, place] : {std::pair{"the dictionaries", vlt::layout::kDictionaries},
-                                    {"the experts", vlt::layout::kExperts},
-                                    {"the data", vlt::layout::kData}}) {
+  for (const auto& [name, place] :
+       {std::pair{"the directory of dictionaries", vlt::layout::kDictionaries},
+        {"the directory of experts", vlt::layout::kExperts},
+        {"the data directory", vlt::layout::kData}}) {
     CheckDirectory(name, InstalledFile(place), signs);
   }
 }
