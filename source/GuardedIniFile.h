@@ -8,22 +8,22 @@
 
 // What differs between the kinds of guarded files. The texts are static; a null one is left out.
 struct GuardedIniKind {
-  bool useEscapes;  // as CvlIniMgr takes it
+  bool useEscapes = false;  // as CvlIniMgr takes it
   // Result of a step that the system did not refuse and that failed all the same: out of memory, or
   // a relative path where a full one is needed.
-  HRESULT otherFailure;
+  HRESULT otherFailure = E_FAIL;
   // Lines of the log for a file that cannot be set aside: where the system refuses, and otherwise.
-  const char* refusedMessage;
-  const char* otherFailureMessage;
+  const char* refusedMessage = nullptr;
+  const char* otherFailureMessage = nullptr;
   // Function that an opening reports as out of memory, with the result E_OUTOFMEMORY. Null: the
   // opening throws std::bad_alloc.
-  const char* openSignature;
+  const char* openSignature = nullptr;
   // Hook points (source/Common/vltHookPoints.h) in the order in which they are passed. An answer
   // other than 0 at the first two means out of memory.
-  const char* openPoint;
-  const char* retryPoint;    // before the second opening
-  const char* writtenPoint;  // the file is written, its sidecar is old
-  const char* sealedPoint;   // the sidecar is written
+  const char* openPoint = nullptr;
+  const char* retryPoint = nullptr;    // before the second opening
+  const char* writtenPoint = nullptr;  // the file is written, its sidecar is old
+  const char* sealedPoint = nullptr;   // the sidecar is written
 };
 
 // What a guarded file and its sidecar are like, and what the next opening makes of them.

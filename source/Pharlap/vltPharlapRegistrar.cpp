@@ -26,15 +26,7 @@ using zt::fnd::String;
 namespace {
 
 // Fails by exceptions, and has no hook points and no messages.
-constexpr GuardedIniKind kDatabase = {.useEscapes = true,
-                                      .otherFailure = E_FAIL,
-                                      .refusedMessage = nullptr,
-                                      .otherFailureMessage = nullptr,
-                                      .openSignature = nullptr,
-                                      .openPoint = nullptr,
-                                      .retryPoint = nullptr,
-                                      .writtenPoint = nullptr,
-                                      .sealedPoint = nullptr};
+constexpr GuardedIniKind kDatabase = {.useEscapes = true};
 
 }  // namespace
 

@@ -64,4 +64,26 @@ inline void ExpectWhole(const Installation& i) {
   EXPECT_EQ(RunProgram({"sh", "-c", "ls \"$1\" | grep -c '\\.bad$'", "sh", i.root()}).out, "0\n");
 }
 
+// Another process that has the registrar of the installation, as a server has it.
+class Server {
+ public:
+  // True once it has the registrar.
+  bool isReady() const { return m_held.await(); }
+  pid_t pid() const { return m_child.pid(); }
+  // Ends it; its exit code is 0 if all went well.
+  int end() {
+    m_end.notify();
+    return m_child.wait();
+  }
+
+ private:
+  Signal m_held, m_end;
+  Child m_child{[this] {
+    IvltRegistrar* registrar = nullptr;
+    if (GetRegistrar(&registrar) != "ok") return 1;
+    m_held.notify();
+    return m_end.await() ? 0 : 2;
+  }};
+};
+
 }  // namespace vlt::test

@@ -266,22 +266,14 @@ TEST(VltctlBadSituations, EachHasItsTextAndItsCode) {
 
 TEST(VltctlBadSituations, BesideAnotherRegistrarNobodyWaits) {
   Installation installation;
-  Signal held, release;
-  Child server([&] {
-    IvltRegistrar* registrar = nullptr;
-    if (GetRegistrar(&registrar) != "ok") return 1;
-    held.notify();
-    release.await();
-    return 0;
-  });
-  ASSERT_TRUE(held.await());
+  Server server;
+  ASSERT_TRUE(server.isReady());
   ProgramResult result = Vltctl({"check"});
   EXPECT_EQ(result.exitCode, kBusy);
   EXPECT_EQ(result.err, "vltctl: " + installation.database() +
                             ": its lock is held by e2e_tests (pid " + std::to_string(server.pid()) +
                             "); end that process, or try again later\n");
-  release.notify();
-  EXPECT_EQ(server.wait(), 0);
+  EXPECT_EQ(server.end(), 0);
 }
 
 TEST(VltctlBadSituations, AnotherUsersInstallationThatMayNotBeWritten) {

@@ -149,15 +149,8 @@ class VltctlDoctorLocks : public VltctlDoctor {
 };
 
 TEST_F(VltctlDoctorLocks, AHeldLockNamesItsHolder) {
-  Signal held, release;
-  Child server([&] {
-    IvltRegistrar* registrar = nullptr;
-    if (GetRegistrar(&registrar) != "ok") return 1;
-    held.notify();
-    release.await();
-    return 0;
-  });
-  ASSERT_TRUE(held.await());
+  Server server;
+  ASSERT_TRUE(server.isReady());
   std::vector<json> holders;
   for (const json& lock : VltctlJson({"locks"}).items) {
     if (!lock["holders"].empty()) holders.push_back(lock["holders"][0]);
@@ -165,8 +158,7 @@ TEST_F(VltctlDoctorLocks, AHeldLockNamesItsHolder) {
   ASSERT_EQ(holders.size(), 1u);
   EXPECT_EQ(holders[0], (json{{"pid", server.pid()}, {"command", "e2e_tests"}}));
   EXPECT_NE(Vltctl({"locks"}).out.find("held by e2e_tests (pid "), std::string::npos);
-  release.notify();
-  EXPECT_EQ(server.wait(), 0);
+  EXPECT_EQ(server.end(), 0);
 }
 
 TEST_F(VltctlDoctorLocks, SweepRemovesLocksOfLogsOfEndedProcessesOnly) {

@@ -226,15 +226,8 @@ TEST_F(VltctlRepair, WhatIsSoundIsLeftAlone) {
 
 TEST_F(VltctlRepair, BesideAServerItIsBusyAndChangesNothing) {
   WriteBytes(sidecar(), std::string(16, 'x'));
-  Signal held, release;
-  Child server([&] {
-    IvltRegistrar* registrar = nullptr;
-    if (GetRegistrar(&registrar) != "ok") return 1;
-    held.notify();
-    release.await();
-    return 0;
-  });
-  ASSERT_TRUE(held.await());
+  Server server;
+  ASSERT_TRUE(server.isReady());
   WriteBytes(sidecar(), std::string(16, 'x'));
   JsonResult result = VltctlJson({"repair"});
   EXPECT_EQ(result.exitCode, kBusy);
@@ -244,8 +237,7 @@ TEST_F(VltctlRepair, BesideAServerItIsBusyAndChangesNothing) {
   EXPECT_EQ(result.problems.at(0)["code"], "busy");
   EXPECT_EQ(ReadBytes(sidecar()), std::string(16, 'x'));
   EXPECT_EQ(copy(), "");
-  release.notify();
-  EXPECT_EQ(server.wait(), 0);
+  EXPECT_EQ(server.end(), 0);
 }
 
 }  // namespace

@@ -45,6 +45,13 @@ bool IsGuidText(const std::string& text) {
   return true;
 }
 
+std::string BareGuid(std::string text) {
+  std::erase_if(text, [](char c) { return c == '{' || c == '}'; });
+  std::transform(text.begin(), text.end(), text.begin(),
+                 [](unsigned char c) { return toupper(c); });
+  return text;
+}
+
 namespace {
 
 std::string Lower(std::string text) {

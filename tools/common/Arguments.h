@@ -42,6 +42,9 @@ Parsed Parse(int argc, char** argv);
 // True for the text form of a GUID, with or without braces.
 bool IsGuidText(const std::string& text);
 
+// Text forms of one GUID become equal: without braces, in upper case.
+std::string BareGuid(std::string text);
+
 // The candidate that a mistyped word may stand for; empty if none is near.
 std::string Nearest(const std::string& word, const std::vector<std::string>& candidates);
 

@@ -2,7 +2,6 @@
 #include <stdio.h>
 
 #include <algorithm>
-#include <cctype>
 #include <optional>
 
 #include "tools/common/Locale.h"
@@ -123,20 +122,12 @@ int Classes(const Arguments& arguments, Output& output) {
   return kGood;
 }
 
-std::string Bare(std::string guid) {
-  guid.erase(std::remove_if(guid.begin(), guid.end(), [](char c) { return c == '{' || c == '}'; }),
-             guid.end());
-  std::transform(guid.begin(), guid.end(), guid.begin(),
-                 [](unsigned char c) { return toupper(c); });
-  return guid;
-}
-
 // Those that the argument names: by identifier or by name.
 std::vector<Component> Chosen(const std::vector<Component>& all, const std::string& word) {
   std::vector<Component> chosen;
   std::vector<std::string> names;
   for (const Component& c : all) {
-    if (c.name == word || Bare(c.guid) == Bare(word)) chosen.push_back(c);
+    if (c.name == word || vltctl::BareGuid(c.guid) == vltctl::BareGuid(word)) chosen.push_back(c);
     names.push_back(c.name);
   }
   if (!chosen.empty()) return chosen;

@@ -196,6 +196,20 @@ std::string LibraryOf(const Component& c) {
   return "";
 }
 
+const char* WordOf(vlt::snapshot::FileState state) {
+  switch (state) {
+    case vlt::snapshot::FileState::Unchanged:
+      return "unchanged";
+    case vlt::snapshot::FileState::New:
+      return "new";
+    case vlt::snapshot::FileState::Changed:
+      return "changed";
+    case vlt::snapshot::FileState::Vanished:
+      break;
+  }
+  return "vanished";
+}
+
 // ---- --live
 
 void WaitForRegistrar(const Arguments& arguments) {

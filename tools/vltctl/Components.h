@@ -42,6 +42,9 @@ const Component& Only(const Snapshot& snapshot, const std::string& text);
 bool IsTypeWord(const std::string& word);
 std::string TypeWord(vlt::snapshot::Type type);
 
+// "unchanged", "new", "changed", "vanished".
+const char* WordOf(vlt::snapshot::FileState state);
+
 // The code of a component's bundle, as the library looks for it; empty if there is none. A file is
 // its own code.
 std::string LibraryOf(const Component& component);

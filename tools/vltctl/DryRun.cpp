@@ -13,20 +13,6 @@ using vlt::snapshot::Start;
 using vltctl::Failure;
 using vltctl::Json;
 
-const char* WordOf(FileState state) {
-  switch (state) {
-    case FileState::Unchanged:
-      return "unchanged";
-    case FileState::New:
-      return "new";
-    case FileState::Changed:
-      return "changed";
-    case FileState::Vanished:
-      break;
-  }
-  return "vanished";
-}
-
 Start Rehearse(const Arguments& arguments) {
   Start start;
   WithFailures([&] {

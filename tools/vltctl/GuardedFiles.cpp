@@ -25,15 +25,7 @@ namespace fs = std::filesystem;
 using Kind = GuardedIniState::Kind;
 using Opening = GuardedIniState::Opening;
 
-constexpr GuardedIniKind kAnyKind = {.useEscapes = false,
-                                     .otherFailure = E_FAIL,
-                                     .refusedMessage = nullptr,
-                                     .otherFailureMessage = nullptr,
-                                     .openSignature = nullptr,
-                                     .openPoint = nullptr,
-                                     .retryPoint = nullptr,
-                                     .writtenPoint = nullptr,
-                                     .sealedPoint = nullptr};
+constexpr GuardedIniKind kAnyKind = {};
 
 struct KindRow {
   Kind kind;

@@ -41,14 +41,6 @@ struct Tally {
 // Identifiers that were met so far, without braces and in upper case, and where.
 using Taken = std::map<std::string, std::string>;
 
-std::string Bare(std::string guid) {
-  guid.erase(std::remove_if(guid.begin(), guid.end(), [](char c) { return c == '{' || c == '}'; }),
-             guid.end());
-  std::transform(guid.begin(), guid.end(), guid.begin(),
-                 [](unsigned char c) { return toupper(c); });
-  return guid;
-}
-
 bool IsNumber(const std::string& text) {
   return !text.empty() && text.size() <= 10 &&
          std::all_of(text.begin(), text.end(), [](unsigned char c) { return isdigit(c); });
@@ -309,7 +301,7 @@ void Linter::lintIdentifier(const IniLine& head, const std::string& name) {
     error(head, "no-identifier", "[" + name + "] has no Identifier", "add a fresh GUID");
     return;
   }
-  std::string guid = Bare(line->value);
+  std::string guid = vltctl::BareGuid(line->value);
   if (!vltctl::IsGuidText(line->value)) {
     error(*line, "bad-identifier", "Identifier \"" + line->value + "\" is no GUID");
   } else if (guid == kNullIdentifier) {
@@ -345,7 +337,7 @@ void Linter::lintBindings(const IniLine& line, const std::string& identifier) {
                 " classes");
       return;
     }
-    if (!identifier.empty() && Bare(fields[at]) != Bare(identifier)) {
+    if (!identifier.empty() && vltctl::BareGuid(fields[at]) != vltctl::BareGuid(identifier)) {
       warn(line, "binding-other", "the entry is of " + fields[at] + ", not of this component");
     }
     at += 2 + count;
@@ -477,12 +469,12 @@ void AddInstalled(const std::vector<std::string>& files, Taken* taken) {
   std::set<std::string> linted;
   for (const std::string& file : files) {
     for (const IniLine& line : vltctl::LinesOf(ReadGuarded(file).bytes))
-      linted.insert(Bare(line.section));
+      linted.insert(vltctl::BareGuid(line.section));
   }
   for (const std::string& section : database.sections()) {
     auto identifier = database.get(section, registrar::kIdentifier);
-    if (identifier && !linted.count(Bare(section))) {
-      taken->emplace(Bare(*identifier), "[" + section + "], which is installed");
+    if (identifier && !linted.count(vltctl::BareGuid(section))) {
+      taken->emplace(vltctl::BareGuid(*identifier), "[" + section + "], which is installed");
     }
   }
 }

@@ -25,17 +25,7 @@ std::string PreviousOf(const Snapshot& snapshot, const Component& c) {
 
 const char* StateOf(const Snapshot& snapshot, const std::string& file) {
   for (const auto& known : snapshot.files) {
-    if (known.path != file) continue;
-    switch (known.state) {
-      case FileState::Unchanged:
-        return "unchanged";
-      case FileState::New:
-        return "new";
-      case FileState::Changed:
-        return "changed";
-      case FileState::Vanished:
-        return "vanished";
-    }
+    if (known.path == file) return WordOf(known.state);
   }
   return nullptr;
 }
