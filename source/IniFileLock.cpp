@@ -18,17 +18,20 @@
 #include <cstdint>
 #include <map>
 #include <memory>
-#include <mutex>
 #include <string>
 
 #include "source/Cmd5vlt.h"
 #include "source/Common/vltResultOf.h"
 #include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/Mutex.h"
+#include "zt/fnd/osdep/PosixMutex.h"
 #include "zt/fnd/osdep/ProcessMark.h"
 #include "zt/fnd/osdep/SharedObjectName.h"
 
 using zt::fnd::String;
+using zt::fnd::osdep::Hold;
+using zt::fnd::osdep::PosixMutex;
 
 namespace {
 
@@ -97,9 +100,9 @@ class IniFileLock::Table {
   void release(Entry* entry);
 
  private:
-  Entry* find(const String& name);
-  Entry* enter(std::unique_lock<std::mutex>& hold, const String& name, bool* mine);
-  void leave(Entry* entry);
+  Entry* find(const String& name) REQUIRES(m_lock);
+  Entry* enter(const String& name, bool* mine) REQUIRES(m_lock);
+  void leave(Entry* entry) REQUIRES(m_lock);
 
   // A child of fork starts without: another thread may have held the table at that moment.
   static void Register() {
@@ -112,12 +115,13 @@ class IniFileLock::Table {
   // The parent's, never used again, but still reachable: its entries are no leak.
   static inline Table* s_inherited = nullptr;
 
-  std::mutex m_lock;
-  std::condition_variable m_ownerGone;
-  std::map<std::string, std::unique_ptr<Entry>> m_entries;
+  PosixMutex m_lock;
+  std::condition_variable_any m_ownerGone;
+  // The owner, depth and users of each entry are guarded, too; its mutex is the owner's.
+  std::map<std::string, std::unique_ptr<Entry>> m_entries GUARDED_BY(m_lock);
 };
 
-// The name's entry, made where there is none; the table is locked.
+// The name's entry, made where there is none.
 IniFileLock::Entry* IniFileLock::Table::find(const String& name) {
   std::string key = zt::fnd::osdep::SharedObjectFileName(name).c_str();
   auto& slot = m_entries[key];
@@ -126,19 +130,18 @@ IniFileLock::Entry* IniFileLock::Table::find(const String& name) {
 }
 
 // Waits until the entry is this thread's. `mine` says whether it was before.
-IniFileLock::Entry* IniFileLock::Table::enter(std::unique_lock<std::mutex>& hold,
-                                              const String& name, bool* mine) {
+IniFileLock::Entry* IniFileLock::Table::enter(const String& name, bool* mine) {
   Entry* entry = find(name);
   ++entry->users;
   *mine = entry->owner == ThisThread();
   // users was raised before the wait: the entry outlives it.
-  m_ownerGone.wait(hold, [&] { return *mine || entry->owner == kNobody; });
+  m_ownerGone.wait(m_lock, [&] { return *mine || entry->owner == kNobody; });
   entry->owner = ThisThread();
   ++entry->depth;
   return entry;
 }
 
-// Gives the entry up; the table is locked.
+// Gives the entry up.
 void IniFileLock::Table::leave(Entry* entry) {
   entry->owner = kNobody;
   entry->depth = 0;
@@ -147,11 +150,14 @@ void IniFileLock::Table::leave(Entry* entry) {
 }
 
 IniFileLock::Entry* IniFileLock::Table::acquire(const String& name) {
-  std::unique_lock<std::mutex> hold(m_lock);
-  bool mine = false;
-  Entry* entry = enter(hold, name, &mine);
-  if (mine) return entry;
-  hold.unlock();  // The wait for other processes must not stop the threads that want other files.
+  Entry* entry;
+  {
+    Hold hold(m_lock);
+    bool mine = false;
+    entry = enter(name, &mine);
+    if (mine) return entry;
+  }
+  // Unlocked: the wait for other processes must not stop the threads that want other files.
   try {
     auto mutex = CreateMutex(name);
     mutex->lock();
@@ -159,7 +165,7 @@ IniFileLock::Entry* IniFileLock::Table::acquire(const String& name) {
     return entry;
   } catch (...) {
     // Whatever it was goes on to the caller; the threads that wait for this name must not be stuck.
-    hold.lock();
+    Hold hold(m_lock);
     leave(entry);
     throw;
   }
@@ -169,7 +175,7 @@ IniFileLock::Entry* IniFileLock::Table::tryAcquire(const String& name) {
   auto mutex = CreateMutex(name);
   // The mutex was made before the table was locked, as that opens a file. Trying it does not wait,
   // so that it may be done inside.
-  std::lock_guard<std::mutex> hold(m_lock);
+  Hold hold(m_lock);
   Entry* entry = find(name);
   if (entry->owner == ThisThread()) {
     ++entry->users;
@@ -188,16 +194,18 @@ IniFileLock::Entry* IniFileLock::Table::tryAcquire(const String& name) {
 }
 
 void IniFileLock::Table::release(Entry* entry) {
-  std::unique_lock<std::mutex> hold(m_lock);
-  if (--entry->depth > 0) {
-    --entry->users;
-    return;
+  std::unique_ptr<zt::fnd::osdep::Mutex> mutex;
+  {
+    Hold hold(m_lock);
+    if (--entry->depth > 0) {
+      --entry->users;
+      return;
+    }
+    mutex = std::move(entry->mutex);
+    // The owner is another thread where a hold ends on a thread that did not begin it, and must wait
+    // as all others do.
+    entry->owner = kReleasing;
   }
-  auto mutex = std::move(entry->mutex);
-  // The owner is another thread where a hold ends on a thread that did not begin it, and must wait
-  // as all others do.
-  entry->owner = kReleasing;
-  hold.unlock();
   // Outside the table: closing a file on a slow disk must not stop the threads that want other
   // files.
   mutex->unlock();
@@ -205,7 +213,7 @@ void IniFileLock::Table::release(Entry* entry) {
   // inside stays with the first thread, and only the end of the last Mutex of the name does away
   // with it.
   mutex.reset();
-  hold.lock();
+  Hold hold(m_lock);
   leave(entry);
 }
 

@@ -1,5 +1,5 @@
 // A save copies the sections that have not changed from the save before. The judge is the way that
-// makes each line anew: IniWrite.
+// makes every line again: IniWrite.
 #include <gtest/gtest.h>
 
 #include <cstdlib>
