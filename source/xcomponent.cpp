@@ -73,7 +73,7 @@ void FreeAndNull(wchar_t** text) {
 // Takes back what a copy made whose variant failed: the caller of a failed copy frees nothing, and
 // fills the record again. The text that failed is null already.
 template <class Target>
-void TakeBack(Target* target) {
+void DiscardCopies(Target* target) {
   FreeAndNull(&target->name);
   FreeAndNull(&target->fileName);
   if (target->type == vltComponentDataDictionary) {
@@ -96,10 +96,10 @@ HRESULT CopyFields(Target* target, const Source* source) {
   target->type = source->type;
   target->identifier = source->identifier;
   CopyOpaque(target, source);
-  // After the type, by which TakeBack knows what there is to free.
+  // After the type, by which DiscardCopies knows what there is to free.
   HRESULT variantResult = CopyVariant(target, source);
   if (variantResult >= 0) return result;
-  TakeBack(target);
+  DiscardCopies(target);
   return variantResult;
 }
 

@@ -48,7 +48,7 @@ HRESULT Tell(vltErrors& errors, const std::string& message) {
   return E_FAIL;
 }
 
-HRESULT TellOfFile(vltErrors& errors, const wchar_t* word, const wchar_t* file, const char* what) {
+HRESULT ReportFile(vltErrors& errors, const wchar_t* word, const wchar_t* file, const char* what) {
   return Tell(errors,
               "the " + Narrow(word) + " \"" + Narrow(file) + "\" is registered but " + what);
 }
@@ -72,12 +72,12 @@ bool IsThere(const wchar_t* file) {
 
 HRESULT CheckFileExistence(const wchar_t* file, const wchar_t* word, vltErrors& errors) {
   try {
-    if (!IsThere(file)) return TellOfFile(errors, word, file, kMissing);
+    if (!IsThere(file)) return ReportFile(errors, word, file, kMissing);
     BinaryFile(String(file), BinaryFile::Mode::Read, false).close();
     return S_OK;
   } catch (const zt::fnd::osdep::OSException&) {
     // What the check is there to find. Raised, it would cost the caller all other messages.
-    return TellOfFile(errors, word, file, kUnreadable);
+    return ReportFile(errors, word, file, kUnreadable);
   }
 }
 
@@ -103,7 +103,7 @@ HRESULT CheckComponent(const _vltComponent2& component, vltErrors& errors) {
   // A type without files, or one that a later build knows: nothing to check.
   if (!kind) return S_OK;
   if (kind->entryPoint) {
-    if (!component.fileName) return TellOfFile(errors, kind->word, L"", kMissing);
+    if (!component.fileName) return ReportFile(errors, kind->word, L"", kMissing);
     HRESULT result = CheckFileExistence(component.fileName, kind->word, errors);
     return result < 0 ? result : CheckEntryPoint(component.fileName, kind->entryPoint, errors);
   }
