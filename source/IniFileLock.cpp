@@ -104,6 +104,8 @@ class IniFileLock::Table {
   Entry* enter(const String& name, bool* mine) REQUIRES(m_lock);
   void leave(Entry* entry) REQUIRES(m_lock);
 
+  // At load, before any thread can fork: a handler that is registered during a fork is not run by it.
+  static void RegisterAtLoad() __attribute__((constructor));
   // A child of fork starts without: another thread may have held the table at that moment.
   static void Register() {
     pthread_atfork(nullptr, nullptr, [] { s_inherited = s_instance.exchange(nullptr); });
@@ -120,6 +122,8 @@ class IniFileLock::Table {
   // The owner, depth and users of each entry are guarded, too; its mutex is the owner's.
   std::map<std::string, std::unique_ptr<Entry>> m_entries GUARDED_BY(m_lock);
 };
+
+void IniFileLock::Table::RegisterAtLoad() { pthread_once(&s_once, Register); }
 
 // The name's entry, made where there is none.
 IniFileLock::Entry* IniFileLock::Table::find(const String& name) {

@@ -62,6 +62,9 @@ void InChild() RELEASE(s_lock) {
 
 void Register() { pthread_atfork(BeforeFork, InParent, InChild); }
 
+// Not at the first use, for the reason that ForkSafeMutex_posix.cpp has.
+__attribute__((constructor)) void RegisterAtLoad() { CloseOnForkFd::RegisterForkHandlers(); }
+
 unsigned ForksSoFar() {
   Hold hold(s_lock);
   return s_forks;

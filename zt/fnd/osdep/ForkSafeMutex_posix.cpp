@@ -68,6 +68,8 @@ class ForkSafeMutex::Registry {
   }
 
  private:
+  static void RegisterAtLoad() __attribute__((constructor));
+
   // Handlers before a fork run from the last registered to the first. Those of the floor below go
   // first here: what they hold, a thread with one of these mutexes may need to get on.
   static void Register() {
@@ -128,6 +130,10 @@ class ForkSafeMutex::Registry {
   static inline constinit PosixMutex s_lock;
   static inline ForkSafeMutex* s_first GUARDED_BY(s_lock) = nullptr;
 };
+
+// Not at the first use: a fork that is under way then runs the handlers of before no more, and copies
+// whatever a thread has locked since. The child would have it locked for good.
+void ForkSafeMutex::Registry::RegisterAtLoad() { pthread_once(&s_once, Register); }
 
 ForkSafeMutex::ForkSafeMutex(AtFork atFork, int rank) : m_atFork(atFork), m_rank(rank) {
   Registry::Add(*this);
