@@ -78,7 +78,8 @@ size_t Distance(const std::string& a, const std::string& b) {
 }  // namespace
 
 std::string Nearest(const std::string& word, const std::vector<std::string>& candidates) {
-  constexpr size_t kLongest = 200;  // longer words are no typing errors, and the table grows with the square
+  constexpr size_t kLongest =
+      200;  // longer words are no typing errors, and the table grows with the square
   if (word.empty() || word.size() > kLongest) return "";
   std::string best;
   size_t least = 1 + word.size() / 3 + 1;
