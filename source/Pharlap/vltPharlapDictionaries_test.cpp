@@ -327,7 +327,7 @@ TEST_IN_CHILD(vltPharlapDictionariesPrevious, WithoutARootEverythingFails) {
 }
 
 TEST(vltPharlapDictionariesPrevious, MissingRightsAreAResult) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs root, to become a user without rights";
   Installation i;
   chmod(fs::path(i.root()).parent_path().c_str(), 0755);
   chmod(getenv("ZTFNDTMPSHAREDFILEDIR"), 0777);

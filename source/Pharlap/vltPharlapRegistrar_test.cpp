@@ -279,7 +279,7 @@ TEST_IN_CHILD(vltPharlapRegistrarSettings, ALongConfigurationPathIsKeptWhole) {
 
 // A bare name in a process that has no right to make the missing data directory.
 TEST(vltPharlapRegistrarSettings, ABareNameIsHandedOutEvenWithAFailure) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs root, to become a user without rights";
   Installation i;
   OpenUp(i);
   ASSERT_EQ(StartOnce(i), 0);
@@ -365,7 +365,7 @@ TEST(vltPharlapRegistrarStart, WithoutADirectoryTheNamesStayBare) {
 }
 
 TEST(vltPharlapRegistrarStart, MissingRightsToMakeDirectoriesAreSwallowed) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs root, to become a user without rights";
   Installation i;
   OpenUp(i);
   chmod(i.root().c_str(), 0555);

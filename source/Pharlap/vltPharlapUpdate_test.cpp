@@ -304,7 +304,7 @@ TEST(vltPharlapUpdateUnreadable, AFileThatCannotBeParsedIsSetAsideWithItsCompone
 }
 
 TEST(vltPharlapUpdateUnreadable, WhatCannotBeOpenedJustNowStaysAndIsTriedAgain) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs root, to become a user without rights";
   Installation i;
   chmod(fs::path(i.root()).parent_path().c_str(), 0755);
   chmod(i.root().c_str(), 0777);

@@ -110,7 +110,7 @@ TEST_F(DatabaseFile, WhatIsNoFileIsUnreadable) {
 }
 
 TEST_F(DatabaseFile, WithoutTheRightItIsUnreadable) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs root, to become a user without rights";
   write("[a]\n");
   ASSERT_EQ(chmod(file.c_str(), 0600), 0);
   Child child([&] {

@@ -130,7 +130,7 @@ TEST_IN_CHILD(Snapshot, AnImageIsReadWhereItIs) {
 }
 
 TEST_IN_CHILD(Snapshot, ADirectoryThatCannotBeReadIsNamed) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs root, to become a user without rights";
   Sample s;
   std::filesystem::path root = s.root();
   ASSERT_EQ(chmod(root.parent_path().c_str(), 0755), 0);

@@ -21,7 +21,7 @@ constexpr uid_t kNobody = 65534;
 class HostileUsers : public testing::Test {
  protected:
   void SetUp() override {
-    if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+    if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs root, to become a user without rights";
     chmod(fs::path(b.root()).parent_path().c_str(), 0755);
     chmod(getenv("ZTFNDTMPSHAREDFILEDIR"), 0777);
   }

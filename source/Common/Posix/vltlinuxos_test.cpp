@@ -338,7 +338,7 @@ TEST(vltlinuxosEarlyTrace, APipeInTheFlagsPlaceDoesNotHoldUp) {
 // ---- The log directory
 
 TEST(vltlinuxosLogDirectory, ForOthersThanTheSuperuser) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs root, to become a user without rights";
   TempDir home;
   chmod(home.path().c_str(), 0777);
   ExpectInChild([&] {
@@ -362,7 +362,7 @@ TEST(vltlinuxosLogDirectory, ForOthersThanTheSuperuser) {
 }
 
 TEST(vltlinuxosLogDirectory, WithoutAHomeItIsTheTemporaryOne) {
-  if (geteuid() != 0) GTEST_SKIP() << "needs root, to become a user without rights";
+  if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs root, to become a user without rights";
   ExpectInChild([&] {
     // The place is fixed; a user without the right to make it shows the text alone.
     ASSERT_EQ(setresuid(65534, 65534, 65534), 0);
