@@ -56,7 +56,7 @@ enum _vltAttributeType : int32_t {
 };
 // How the storage keeps an attribute: 0 dynamic, 1 static. Any other value counts as dynamic.
 enum _vltAttributeStorage : int32_t {};
-// Kind of client: 0 unknown, 1 programmatic, 2 specification.
+// Kind of client, 0 to 2; vltClientToString has their names. Any other value counts as unknown.
 enum _vltClient : int32_t {};
 // Kind of a component, which selects the variant of its record. RegisterComponent stores
 // dictionaries and the two experts only. UI providers and type 7 have the variant of object

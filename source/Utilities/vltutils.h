@@ -270,11 +270,9 @@ VLT_EXPORT _vltAttributeType vltAttributeTypeFromString(const wchar_t* s);
 // "vltUnspecifiedType" for no type. vltAttributeTypeFromString takes the former back.
 VLT_EXPORT const wchar_t* vltAttributeTypeToString(_vltAttributeType t);
 VLT_EXPORT const wchar_t* vltAttributeTypeToString2(_vltAttributeType t);
-// The client that a word names: 1 for "kor" and "programmatic", 2 for "spec" and "specification", 0
-// for any other.
+// The client that a word names, in its short or its long form; 0 for any other word.
 VLT_EXPORT _vltClient vltClientFromString(const wchar_t* s);
-// "Programmatic" for 1 and "Specification" for 2, which vltClientFromString takes back; "Unknown"
-// for other numbers.
+// The long form for 1 and 2, which vltClientFromString takes back; "Unknown" for other numbers.
 VLT_EXPORT const wchar_t* vltClientToString(_vltClient c);
 // The type in source code, "i32[]"; "!!! BAD TYPE" for no type.
 VLT_EXPORT const wchar_t* vltAttributeTypeToVltTypeString(_vltAttributeType t);

@@ -74,7 +74,7 @@ void Components() {
   Expect(registrar
              .boundTo(vlt::ObjectExpert, *vlt::Guid::parse("11111111-2222-3333-4444-555555555555"))
              .empty(),
-         "a class that nobody binds to");
+         "a class without experts");
   Expect(!registrar.configurationPath().empty(), "the configuration's path");
   // The copy keeps the object.
   const vlt::Registrar copy = registrar;
