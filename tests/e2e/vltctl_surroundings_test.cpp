@@ -121,7 +121,8 @@ std::vector<std::string> WithoutProc(const std::string& script) {
 // Why a program cannot be run without /proc here; empty where it can.
 std::string WhyProcStays() {
   if (!kCanLimitMemory) return "a sanitizer's program reads /proc itself";
-  if (RunProgram(WithoutProc("test ! -e /proc/self")).exitCode != 0) return "mount is not permitted";
+  if (RunProgram(WithoutProc("test ! -e /proc/self")).exitCode != 0)
+    return "mount is not permitted";
   return "";
 }
 
