@@ -66,8 +66,7 @@ inline void AllSteps(uint32_t& a, uint32_t& b, uint32_t& c, uint32_t& d, const u
 
 }  // namespace
 
-Cmd5vlt::Cmd5vlt()
-    : m_state{0x67452301, 0xefcdab89, 0x98badcfe, 0x10325476}, m_count{}, m_buffer{} {}
+Cmd5vlt::Cmd5vlt() : m_state{0x67452301, 0xefcdab89, 0x98badcfe, 0x10325476} {}
 
 void Cmd5vlt::addString(const unsigned char* data, unsigned int lengthBytes) {
   unsigned used = m_count[0] >> 3 & (kBlock - 1);

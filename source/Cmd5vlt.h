@@ -19,6 +19,6 @@ class Cmd5vlt {
   static void Decode(unsigned int* out, const unsigned char* in, unsigned int lengthBytes);
 
   uint32_t m_state[4];
-  uint32_t m_count[2];  // message length in bits, low word first
-  unsigned char m_buffer[64];
+  uint32_t m_count[2] = {};  // message length in bits, low word first
+  unsigned char m_buffer[64] = {};
 };

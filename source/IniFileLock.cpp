@@ -129,7 +129,9 @@ void IniFileLock::Table::RegisterAtLoad() { pthread_once(&s_once, Register); }
 IniFileLock::Entry* IniFileLock::Table::find(const String& name) {
   std::string key = zt::fnd::osdep::SharedObjectFileName(name).c_str();
   auto& slot = m_entries[key];
-  if (!slot) slot.reset(new Entry{key, name, zt::fnd::osdep::ProcessMark::Current(), nullptr});
+  if (!slot)
+    slot =
+        std::make_unique<Entry>(Entry{key, name, zt::fnd::osdep::ProcessMark::Current(), nullptr});
   return slot.get();
 }
 

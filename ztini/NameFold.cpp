@@ -11,7 +11,7 @@ namespace {
 // Null while the thread has a locale of its own: its handle proves nothing, since a freed one may
 // come back with other contents.
 const char* GlobalLocaleName() {
-  return uselocale(locale_t(0)) == LC_GLOBAL_LOCALE ? setlocale(LC_CTYPE, nullptr) : nullptr;
+  return uselocale(locale_t{}) == LC_GLOBAL_LOCALE ? setlocale(LC_CTYPE, nullptr) : nullptr;
 }
 
 }  // namespace

@@ -23,11 +23,11 @@ namespace {
 // Where the text begins, or kIniUnsupportedEncoding.
 int32_t TextOffset(const char* bytes, size_t read) {
   switch (ztini::MarkIn(bytes, read)) {
-    case ztini::ByteOrderMark::kWide:
+    case ztini::ByteOrderMark::Wide:
       return kIniUnsupportedEncoding;
-    case ztini::ByteOrderMark::kUtf8:
+    case ztini::ByteOrderMark::Utf8:
       return ztini::kUtf8MarkSize;
-    case ztini::ByteOrderMark::kNone:
+    case ztini::ByteOrderMark::None:
       break;
   }
   return 0;

@@ -95,7 +95,7 @@ class TextInMemory {
   void endFirst() {
     m_isFirst = false;
     const char* line = m_first.text();
-    if (ztini::MarkIn(line, strnlen(line, 4)) != ztini::ByteOrderMark::kNone) m_text->append('\n');
+    if (ztini::MarkIn(line, strnlen(line, 4)) != ztini::ByteOrderMark::None) m_text->append('\n');
     m_text->append(m_first.view());
   }
 

@@ -80,8 +80,8 @@ struct Exhaustion {
 
 // The block is never freed. Volatile, or the compiler sees that it is not used and removes it.
 void TakeChunk(uint32_t chunkSize) {
-  [[maybe_unused]] static void* volatile s_last;
-  s_last = ::operator new[](static_cast<size_t>(chunkSize) * kChunkUnitBytes);
+  [[maybe_unused]] static void* volatile last;
+  last = ::operator new[](static_cast<size_t>(chunkSize) * kChunkUnitBytes);
 }
 
 // After a success. True if the exhaustion is over.

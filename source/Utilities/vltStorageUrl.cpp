@@ -23,7 +23,7 @@ namespace {
 
 // A name without a directory: the settings file of this look-up lies in the working directory,
 // unlike that of the settings calls.
-constexpr const wchar_t* g_ModulePath = L"vltutils";
+constexpr const wchar_t* kModulePath = L"vltutils";
 constexpr const wchar_t* kLocalHost = L"127.0.0.1:";
 constexpr const wchar_t* kOfflineMarker = L"VLTOFFLINESTORAGE=";
 
@@ -34,7 +34,7 @@ constinit std::atomic<const std::wstring*> s_localServer{nullptr};
 
 // The port of the settings file; empty if the file cannot be opened.
 HRESULT ReadPort(std::string* port) {
-  String file = path::Join(path::DirName(String(g_ModulePath)), String(vlt::layout::kSettings));
+  String file = path::Join(path::DirName(String(kModulePath)), String(vlt::layout::kSettings));
   std::unique_ptr<CvlIniMgr> ini;
   // A directory that cannot be written is no reason to fail the caller otherwise.
   HRESULT result = vlt::ResultOf<int>(E_FAIL, [&] { return VltjarOpen(file.c_str(), &ini); });

@@ -144,7 +144,7 @@ void AutoBuffer::makeOwnWithRoom(uint32_t required, Growth growth) {
 const unsigned char* AutoBuffer::prepare(const void* bytes, uint32_t required) {
   const unsigned char* source = static_cast<const unsigned char*>(bytes);
   const unsigned char* old = Data();
-  std::less<const unsigned char*> before;
+  std::less<> before;
   // std::less, as comparing pointers into different objects by < is undefined. The capacity counts
   // and not the length: Modify leaves bytes beyond the end that a caller may pass.
   bool inside = old && !before(source, old) && before(source, old + Capacity());

@@ -1,7 +1,6 @@
 #include "zt/fnd/Exception.h"
 
-namespace zt::fnd {
-namespace exception {
+namespace zt::fnd::exception {
 namespace {
 
 std::string WithDetail(const char* prefix, const char* detail) {
@@ -18,10 +17,10 @@ std::string WithDetail(const char* prefix, const char* detail) {
   const char* Name::what() const noexcept { return text; } \
   uint32_t Name::getErrorCode() const noexcept { return code; }
 
-#define ZT_DETAILED(Name, prefix)                                              \
-  Name::Name(const char* detail) : message(WithDetail(prefix ": ", detail)) {} \
-  Name::~Name() = default;                                                     \
-  const char* Name::what() const noexcept { return message.c_str(); }
+#define ZT_DETAILED(Name, prefix)                                                \
+  Name::Name(const char* detail) : m_message(WithDetail(prefix ": ", detail)) {} \
+  Name::~Name() = default;                                                       \
+  const char* Name::what() const noexcept { return m_message.c_str(); }
 
 // Codes and texts are part of the surface: they stay as they are when the code changes.
 ZT_FIXED_TEXT(Exception, 0xFFFFFFFFu, "unspecified exception")
@@ -50,5 +49,4 @@ ZT_DETAILED(AccessDenied, "Access denied")
 
 uint32_t AccessDenied::getErrorCode() const noexcept { return 0x8ABC7019u; }
 
-}  // namespace exception
-}  // namespace zt::fnd
+}  // namespace zt::fnd::exception

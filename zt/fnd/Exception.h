@@ -26,8 +26,7 @@
 
 #define ZT_RAISE(...) ::zt::fnd::exception::detail::Raise(__VA_ARGS__, __LINE__, ZT_FILE_STEM)
 
-namespace zt::fnd {
-namespace exception {
+namespace zt::fnd::exception {
 
 namespace detail {
 struct Stamp;
@@ -36,7 +35,7 @@ struct Stamp;
 // Root of the family: "unspecified exception", 0xFFFFFFFF.
 class ZT_EXCEPTION_CLASS Exception : public std::exception {
  public:
-  Exception() noexcept : line(0), file(nullptr) {}
+  Exception() noexcept = default;
   Exception(const Exception&) = default;
   Exception& operator=(const Exception&) = default;
   ~Exception() override;
@@ -47,8 +46,8 @@ class ZT_EXCEPTION_CLASS Exception : public std::exception {
 
  protected:
   friend struct detail::Stamp;
-  uint32_t line;     // 0 until stamped
-  const char* file;  // static text; null until stamped
+  uint32_t line = 0;           // 0 until stamped
+  const char* file = nullptr;  // static text; null until stamped
 };
 
 // A class with a text and a code of its own and no field.
@@ -75,7 +74,7 @@ class ZT_EXCEPTION_CLASS Exception : public std::exception {
     const char* what() const noexcept override; \
                                                 \
    private:                                     \
-    std::string message;                        \
+    std::string m_message;                      \
   }
 
 // Codes are 0x8ABC7000 and a small number, with two exceptions: this class and the next share one,
@@ -113,7 +112,7 @@ class ZT_EXCEPTION_CLASS AccessDenied : public Exception {
   uint32_t getErrorCode() const noexcept override;
 
  private:
-  std::string message;
+  std::string m_message;
 };
 
 #undef ZT_FIXED_TEXT_EXCEPTION
@@ -156,5 +155,4 @@ template <class E>
 }
 
 }  // namespace detail
-}  // namespace exception
-}  // namespace zt::fnd
+}  // namespace zt::fnd::exception

@@ -21,8 +21,7 @@ inline constexpr uint32_t kLengthField = 4;
 
 // Bytes from the cursor to the limit; a limit before the cursor leaves none.
 inline uint64_t Remaining(const unsigned char* cursor, const unsigned char* limit) {
-  return std::less<const unsigned char*>()(cursor, limit) ? static_cast<uint64_t>(limit - cursor)
-                                                          : 0;
+  return std::less<>()(cursor, limit) ? static_cast<uint64_t>(limit - cursor) : 0;
 }
 
 // Reads the length field and checks that so many bytes follow. Moves the cursor past the field.

@@ -14,8 +14,8 @@ namespace zt::fnd {
 namespace {
 
 const unsigned char* OrEmpty(const unsigned char* s) {
-  static const unsigned char s_empty[1] = {0};
-  return s ? s : s_empty;
+  static const unsigned char empty[1] = {0};
+  return s ? s : empty;
 }
 
 const unsigned char* EndOf(const unsigned char* s) {

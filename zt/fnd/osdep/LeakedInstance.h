@@ -13,11 +13,11 @@ namespace zt::fnd::osdep {
 // the constructor throws. Threads: any.
 template <class T>
 T& LeakedInstance() {
-  static constinit std::atomic<T*> s_instance{nullptr};
-  T* present = s_instance.load(std::memory_order_acquire);
+  static constinit std::atomic<T*> instance{nullptr};
+  T* present = instance.load(std::memory_order_acquire);
   if (present) return *present;
   T* fresh = new T;
-  if (s_instance.compare_exchange_strong(present, fresh, std::memory_order_acq_rel)) return *fresh;
+  if (instance.compare_exchange_strong(present, fresh, std::memory_order_acq_rel)) return *fresh;
   delete fresh;
   return *present;
 }

@@ -24,6 +24,9 @@ class CztStreamBaseImp : public IztStream3, public CZTComObjectRootEx<CZTComMult
   static const GUID s_SubStreamMarker;
   static constexpr unsigned kDeepestArea = 256;
 
+  CztStreamBaseImp(const CztStreamBaseImp&) = delete;
+  CztStreamBaseImp& operator=(const CztStreamBaseImp&) = delete;
+
   static const _ZTCOM_INTMAP_ENTRY* _GetEntries();
 
   HRESULT LoadSubStreamInfo(int writable) override;
@@ -40,8 +43,6 @@ class CztStreamBaseImp : public IztStream3, public CZTComObjectRootEx<CZTComMult
  protected:
   CztStreamBaseImp();
   ~CztStreamBaseImp();
-  CztStreamBaseImp(const CztStreamBaseImp&) = delete;
-  CztStreamBaseImp& operator=(const CztStreamBaseImp&) = delete;
 
   // LoadSubStreamInfo of a stream that lies `depth` areas below the outermost one.
   HRESULT loadSubStreams(bool writable, unsigned depth);
