@@ -33,8 +33,8 @@ add_link_options(${VLT_LINK_FLAGS})
 
 # Flags of our own code only.
 add_library(vlt_strict INTERFACE)
-target_compile_options(vlt_strict INTERFACE -Wall -Wextra -Wpedantic -Werror -Wno-unused-parameter
-  -Wnon-virtual-dtor -fmacro-prefix-map=${CMAKE_SOURCE_DIR}/=)
+target_compile_options(vlt_strict INTERFACE -Wall -Wextra -Wpedantic $<$<BOOL:${VLT_WERROR}>:-Werror>
+  -Wno-unused-parameter -Wnon-virtual-dtor -fmacro-prefix-map=${PROJECT_SOURCE_DIR}/=)
 if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
   # GCC 12 sees overlapping copies in the library's own "text" + std::string (GCC bug 105651).
   target_compile_options(vlt_strict INTERFACE -Wno-restrict)
@@ -44,4 +44,4 @@ if(CMAKE_CXX_COMPILER_ID MATCHES "Clang")
   # purpose, which GCC's -Wnon-virtual-dtor accepts.
   target_compile_options(vlt_strict INTERFACE -Wthread-safety)
 endif()
-target_include_directories(vlt_strict INTERFACE ${CMAKE_SOURCE_DIR})
+target_include_directories(vlt_strict INTERFACE ${PROJECT_SOURCE_DIR})

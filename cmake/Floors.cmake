@@ -36,7 +36,7 @@ add_custom_target(floors_closed)
 foreach(name ${VLT_FLOORS})
   add_library(${name}_closed SHARED EXCLUDE_FROM_ALL cmake/empty.cpp)
   set_target_properties(${name}_closed PROPERTIES LINKER_LANGUAGE CXX
-    LIBRARY_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/closed)
+    LIBRARY_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/closed)
   target_link_libraries(${name}_closed PRIVATE ${name})
   set_property(TARGET ${name}_closed PROPERTY LINK_LIBRARY_OVERRIDE "WHOLE_ARCHIVE,${name}")
   target_link_options(${name}_closed PRIVATE -Wl,-z,defs)

@@ -19,7 +19,7 @@ foreach(source ${fuzzers})
       COMPILE_DEFINITIONS LLVMFuzzerTestOneInput=Fuzz_${topic})
     string(APPEND replayed "VLT_FUZZ_TARGET(${topic})\n")
     add_test(NAME Fuzz.${topic}
-      COMMAND fuzz_replay ${topic} ${CMAKE_SOURCE_DIR}/fuzz/corpus/${topic})
+      COMMAND fuzz_replay ${topic} ${PROJECT_SOURCE_DIR}/fuzz/corpus/${topic})
     set_tests_properties(Fuzz.${topic} PROPERTIES LABELS fuzz TIMEOUT 120)
   endif()
 endforeach()

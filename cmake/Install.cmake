@@ -3,36 +3,22 @@
 include(CMakePackageConfigHelpers)
 
 set(packages ${CMAKE_INSTALL_LIBDIR}/cmake/vltutils)
-install(TARGETS vltutils EXPORT vltutilsTargets LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
+install(TARGETS vltutils vlt_snapshot EXPORT vltutilsTargets
+  LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR})
 install(EXPORT vltutilsTargets NAMESPACE vltutils:: DESTINATION ${packages})
-install(DIRECTORY ${CMAKE_BINARY_DIR}/include/vltutils DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
+install(DIRECTORY ${PROJECT_BINARY_DIR}/include/vltutils DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
 
-# The snapshot reader, whole: one archive of its floor and the ones below, for programs that do without
-# the library.
-set(objects "")
-foreach(floor vltsnapshot vltcommon ztcore ztini ztfnd ztposix)
-  list(APPEND objects $<TARGET_OBJECTS:${floor}>)
-endforeach()
-add_library(snapshot STATIC cmake/empty.cpp ${objects})
-set_target_properties(snapshot PROPERTIES OUTPUT_NAME vltsnapshot
-  ARCHIVE_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/package)
-target_link_libraries(snapshot INTERFACE Threads::Threads ${CMAKE_DL_LIBS})
-target_include_directories(snapshot INTERFACE $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)
-target_compile_features(snapshot INTERFACE cxx_std_17)
-install(TARGETS snapshot EXPORT vltutilsTargets ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR})
-install(FILES source/Snapshot/snapshot.hpp DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/vltutils)
-
-write_basic_package_version_file(${CMAKE_BINARY_DIR}/vltutilsConfigVersion.cmake
+write_basic_package_version_file(${PROJECT_BINARY_DIR}/vltutilsConfigVersion.cmake
   COMPATIBILITY SameMajorVersion)
-file(WRITE ${CMAKE_BINARY_DIR}/vltutilsConfig.cmake
+file(WRITE ${PROJECT_BINARY_DIR}/vltutilsConfig.cmake
   "include(CMakeFindDependencyMacro)\nfind_dependency(Threads)\n"
   "include(\"\${CMAKE_CURRENT_LIST_DIR}/vltutilsTargets.cmake\")\n")
-install(FILES ${CMAKE_BINARY_DIR}/vltutilsConfig.cmake
-  ${CMAKE_BINARY_DIR}/vltutilsConfigVersion.cmake DESTINATION ${packages})
+install(FILES ${PROJECT_BINARY_DIR}/vltutilsConfig.cmake
+  ${PROJECT_BINARY_DIR}/vltutilsConfigVersion.cmake DESTINATION ${packages})
 
 # Relative to the file itself, so that a moved installation still works.
 file(RELATIVE_PATH up /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
-file(WRITE ${CMAKE_BINARY_DIR}/vltutils.pc
+file(WRITE ${PROJECT_BINARY_DIR}/vltutils.pc
 "prefix=\${pcfiledir}/${up}
 libdir=\${prefix}/${CMAKE_INSTALL_LIBDIR}
 includedir=\${prefix}/${CMAKE_INSTALL_INCLUDEDIR}
@@ -43,7 +29,7 @@ Version: ${PROJECT_VERSION}
 Libs: -L\${libdir} -lvltutils
 Cflags: -I\${includedir}
 ")
-install(FILES ${CMAKE_BINARY_DIR}/vltutils.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+install(FILES ${PROJECT_BINARY_DIR}/vltutils.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
 
 # vltctl becomes vltctl-client for what needs the library, and looks for it here.
 if(TARGET vltctl)
@@ -52,9 +38,9 @@ if(TARGET vltctl)
   set_target_properties(vltctl-client PROPERTIES INSTALL_RPATH "$ORIGIN/${library}")
   install(TARGETS vltctl RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
   install(TARGETS vltctl-client RUNTIME DESTINATION libexec/vltutils)
-  install(FILES ${CMAKE_SOURCE_DIR}/tools/vltctl-1.schema.json
+  install(FILES ${PROJECT_SOURCE_DIR}/tools/vltctl-1.schema.json
     DESTINATION ${CMAKE_INSTALL_DATADIR}/vltutils)
-  set(completions ${CMAKE_BINARY_DIR}/completion)
+  set(completions ${PROJECT_BINARY_DIR}/completion)
   install(FILES ${completions}/vltctl
     DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions)
   install(FILES ${completions}/_vltctl DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/site-functions)
@@ -62,6 +48,6 @@ if(TARGET vltctl)
     DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d)
 endif()
 foreach(section 1 7)
-  file(GLOB manuals ${CMAKE_SOURCE_DIR}/man/*.${section})
+  file(GLOB manuals ${PROJECT_SOURCE_DIR}/man/*.${section})
   install(FILES ${manuals} DESTINATION ${CMAKE_INSTALL_MANDIR}/man${section})
 endforeach()

@@ -1,7 +1,8 @@
 # libvltutils.so: all floors in one library that shows the names of cmake/exports.map and no other.
-set(exports ${CMAKE_SOURCE_DIR}/cmake/exports.map)
+set(exports ${PROJECT_SOURCE_DIR}/cmake/exports.map)
 file(GLOB startup CONFIGURE_DEPENDS source/Utilities/startup.cpp)
 add_library(vltutils SHARED ${startup})
+add_library(vltutils::vltutils ALIAS vltutils)
 set_target_properties(vltutils PROPERTIES
   LINKER_LANGUAGE CXX VERSION ${PROJECT_VERSION} SOVERSION ${PROJECT_VERSION_MAJOR}
   LINK_DEPENDS ${exports})
@@ -24,7 +25,7 @@ set(surface
   source/Common/ZtUtils/General/vlt_vlTracer.h
   source/Utilities/vltutils.h source/Common/vltInterfaces.h source/Common/vltTypes.h
   zt/fnd/Exception.h zt/fnd/GuidType.h zt/fnd/StringFwd.h zt/fnd/osdep/OSException.h
-  ztcom/ztcore/ztunknown.h client/vltutils.hpp client/results.hpp)
+  ztcom/ztcore/ztunknown.h client/vltutils.hpp client/results.hpp source/Snapshot/snapshot.hpp)
 foreach(header ${surface})
   file(READ ${PROJECT_SOURCE_DIR}/${header} text)
   foreach(other ${surface})
@@ -36,6 +37,10 @@ foreach(header ${surface})
   file(CONFIGURE OUTPUT ${PROJECT_BINARY_DIR}/include/vltutils/${name} CONTENT "${text}" @ONLY)
   set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/${header})
 endforeach()
-target_include_directories(vltutils INTERFACE
-  $<BUILD_INTERFACE:${PROJECT_BINARY_DIR}/include> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)
-target_compile_features(vltutils INTERFACE cxx_std_17)
+# vlt_surface(target): clients of the target find these headers, which need C++17.
+function(vlt_surface target)
+  target_include_directories(${target} INTERFACE
+    $<BUILD_INTERFACE:${PROJECT_BINARY_DIR}/include> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)
+  target_compile_features(${target} INTERFACE cxx_std_17)
+endfunction()
+vlt_surface(vltutils)

@@ -3,7 +3,7 @@
 include(GoogleTest)
 set(BUILD_GMOCK OFF CACHE BOOL "" FORCE)
 set(INSTALL_GTEST OFF CACHE BOOL "" FORCE)
-add_subdirectory(/usr/src/googletest ${CMAKE_BINARY_DIR}/googletest EXCLUDE_FROM_ALL SYSTEM)
+add_subdirectory(/usr/src/googletest ${PROJECT_BINARY_DIR}/googletest EXCLUDE_FROM_ALL SYSTEM)
 
 file(GLOB support CONFIGURE_DEPENDS tests/support/*.cpp)
 list(FILTER support EXCLUDE REGEX "_test\\.cpp$")
@@ -52,7 +52,7 @@ function(vlt_tests name)
   endif()
   if("vltutils" IN_LIST ARG_LINKS)
     set_target_properties(${name} PROPERTIES
-      CROSSCOMPILING_EMULATOR ${CMAKE_SOURCE_DIR}/tests/support/in-private-root)
+      CROSSCOMPILING_EMULATOR ${PROJECT_SOURCE_DIR}/tests/support/in-private-root)
   endif()
   if(NOT ARG_TIMEOUT)
     set(ARG_TIMEOUT 120)
@@ -87,7 +87,7 @@ if(TARGET vltctl_common)
     tools/vltctl-client/Candidates*.cpp
     LINKS vltctl_common)
   if(TARGET tools_tests)
-    target_compile_definitions(tools_tests PRIVATE VLT_TEST_SOURCE="${CMAKE_SOURCE_DIR}")
+    target_compile_definitions(tools_tests PRIVATE VLT_TEST_SOURCE="${PROJECT_SOURCE_DIR}")
   endif()
 endif()
 if(TARGET vltutils)
@@ -106,8 +106,8 @@ if(TARGET vltutils)
     target_link_libraries(snapshot_client PRIVATE vlt_strict vltsnapshot nlohmann_json::nlohmann_json)
     add_dependencies(e2e_tests snapshot_client)
     target_compile_definitions(e2e_tests PRIVATE
-      VLT_TEST_LIBRARY="$<TARGET_FILE:vltutils>" VLT_TEST_BIN="${CMAKE_BINARY_DIR}/bin"
-      VLT_TEST_SOURCE="${CMAKE_SOURCE_DIR}")
+      VLT_TEST_LIBRARY="$<TARGET_FILE:vltutils>" VLT_TEST_BIN="${PROJECT_BINARY_DIR}/bin"
+      VLT_TEST_SOURCE="${PROJECT_SOURCE_DIR}")
   endif()
 endif()
 
