@@ -13,10 +13,9 @@ target_link_libraries(vltutils PRIVATE vlt_strict ${shared})
 # Whole, also where one floor brings another: what nobody refers to is the surface itself.
 list(JOIN shared "," floors)
 set_property(TARGET vltutils PROPERTY LINK_LIBRARY_OVERRIDE "WHOLE_ARCHIVE,${floors}")
-target_link_options(vltutils PRIVATE -Wl,--version-script=${exports} -Wl,-z,nodelete
-  -Wl,-z,relro -Wl,-z,now -Wl,--gc-sections)
+target_link_options(vltutils PRIVATE ${VLT_LINK_SHARED})
 if(NOT VLT_SANITIZE)
-  target_link_options(vltutils PRIVATE -Wl,-z,defs)
+  target_link_options(vltutils PRIVATE ${VLT_LINK_CLOSED})
 endif()
 
 # The surface as clients see it: one flat directory, <vltutils/...>, whose headers name each other so. In

@@ -65,18 +65,18 @@ enum class Left { No, Yes, InTheWay, Unknown };
 
 // What is at the second name. begin() leaves regular files; all else was planted.
 Left WhatIsLeft(const std::string& copy) {
-  ScopedFd found = zt::posix::LookUp(copy.c_str(), false);
   struct stat info;
-  if (!found || fstat(found.get(), &info) != 0) {
+  if (!zt::posix::LookUp(copy.c_str(), false).examine(&info)) {
     return zt::posix::IsPassing(errno) ? Left::Unknown : Left::No;
   }
   return S_ISREG(info.st_mode) ? Left::Yes : Left::InTheWay;
 }
 
 bool SameFile(const std::string& a, const std::string& b) {
-  ScopedFd left = zt::posix::LookUp(a.c_str(), false), right = zt::posix::LookUp(b.c_str(), false);
+  using zt::posix::Found;
+  Found left = zt::posix::LookUp(a.c_str(), false), right = zt::posix::LookUp(b.c_str(), false);
   struct stat one, other;
-  return left && right && fstat(left.get(), &one) == 0 && fstat(right.get(), &other) == 0 &&
+  return left && right && left.examine(&one) && right.examine(&other) &&
          one.st_dev == other.st_dev && one.st_ino == other.st_ino;
 }
 

@@ -14,9 +14,8 @@ using Opening = GuardedIniState::Opening;
 using Found = CvlIniMgr::Found;
 
 bool IsDirectory(const std::string& path) {
-  zt::posix::ScopedFd found = zt::posix::LookUp(path.c_str(), false);
   struct stat info;
-  return found && fstat(found.get(), &info) == 0 && S_ISDIR(info.st_mode);
+  return zt::posix::LookUp(path.c_str(), false).examine(&info) && S_ISDIR(info.st_mode);
 }
 
 // Of a file whose digest is the expected one, or of which none is expected; `taken` is its kind

@@ -248,7 +248,7 @@ void CvlIniMgr::SetAside(const String& fileName) {
 }
 
 CvlIniMgr::FileState CvlIniMgr::stateOfFile() const {
-  return StateOf(zt::posix::LookUp(m_fileName.c_str()).get());
+  return StateOf(zt::posix::LookUp(m_fileName.c_str()).fd.get());
 }
 
 CvlIniMgr::FileState CvlIniMgr::StateOf(int fd) {

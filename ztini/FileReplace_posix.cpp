@@ -156,8 +156,7 @@ bool FileReplacement::statTarget(struct stat* status) const {
       !S_ISLNK(status->st_mode)) {
     return true;
   }
-  ScopedFd target = zt::posix::LookUp(m_target);
-  return target && fstat(target.get(), status) == 0;
+  return zt::posix::LookUp(m_target).examine(status);
 }
 
 int32_t FileReplacement::write(const char* bytes, size_t size) {

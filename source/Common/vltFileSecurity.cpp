@@ -23,6 +23,7 @@
 using zt::fnd::AnsiString;
 using zt::fnd::String;
 using zt::fnd::osdep::path;
+using zt::posix::Found;
 using zt::posix::ScopedFd;
 
 namespace {
@@ -59,8 +60,8 @@ bool MakeOpenDirectory(const String& directory) {
   // EEXIST: a killed process has left it, or another one is making it now. Whoever renames first
   // wins.
   if (mkdirat(parent, unfinished.c_str(), kSharedMode) != 0 && errno != EEXIST) return false;
-  ScopedFd made = zt::posix::LookUpEntry(parent, unfinished.c_str(), O_DIRECTORY);
-  if (made.valid() && zt::posix::SetSharedMode(made.get(), kSharedMode) == 0 &&
+  Found made = zt::posix::LookUpEntry(parent, unfinished.c_str(), O_DIRECTORY);
+  if (made && zt::posix::SetSharedMode(made.fd.get(), kSharedMode) == 0 &&
       zt::posix::RenameToNew(parent, unfinished.c_str(), entry.name) == 0) {
     return zt::posix::SyncDirectoryOf(target.c_str());
   }
@@ -85,20 +86,20 @@ class TreeMode {
  public:
   explicit TreeMode(int mode) : m_mode(static_cast<mode_t>(mode)) {}
 
-  // The thing the descriptor (O_PATH) leads to and all that is in it, without entries whose name
-  // begins with a dot. The first failure ends the walk.
-  HRESULT change(int found) {
+  // What was looked up and all that is in it, without entries whose name begins with a dot. The
+  // first failure ends the walk.
+  HRESULT change(const Found& found) {
     struct stat info;
-    if (fstat(found, &info) != 0) return E_FAIL;
+    if (!found.examine(&info)) return E_FAIL;
     if (S_ISLNK(info.st_mode)) return S_OK;
-    HRESULT status = ResultOf(zt::posix::ChangeMode(found, m_mode));
-    return S_ISDIR(info.st_mode) ? changeEntries(found, status) : status;
+    HRESULT status = ResultOf(zt::posix::ChangeMode(found.fd.get(), m_mode));
+    return S_ISDIR(info.st_mode) ? changeEntries(found.fd.get(), status) : status;
   }
 
  private:
   // Leaves the status alone if there are no entries; else returns that of the last one visited.
   HRESULT changeEntries(int directory, HRESULT status) {
-    // The descriptor of the walk is O_PATH, which cannot be listed.
+    // The descriptor of the walk is no open file, and cannot be listed.
     ScopedFd fd = zt::posix::OpenDirectory(directory);
     std::unique_ptr<DIR, int (*)(DIR*)> entries(fd.valid() ? fdopendir(fd.get()) : nullptr,
                                                 closedir);
@@ -106,9 +107,9 @@ class TreeMode {
     fd.release();
     while (const dirent* entry = readdir(entries.get())) {
       if (entry->d_name[0] == '.') continue;
-      ScopedFd found = zt::posix::LookUpEntry(dirfd(entries.get()), entry->d_name);
-      if (!found.valid() && errno == ENOENT) continue;  // removed just now
-      status = found.valid() ? change(found.get()) : E_FAIL;
+      Found found = zt::posix::LookUpEntry(dirfd(entries.get()), entry->d_name);
+      if (!found && errno == ENOENT) continue;  // removed just now
+      status = found ? change(found) : E_FAIL;
       if (status < 0) break;
     }
     return status;
@@ -121,12 +122,12 @@ class TreeMode {
 
 HRESULT vltSetFileSecurityImpl(const String& path, int mode, bool recursive) {
   AnsiString narrow(path);
-  ScopedFd found = zt::posix::LookUp(narrow.c_str(), false);
+  Found found = zt::posix::LookUp(narrow.c_str(), false);
   struct stat info;
-  if (!found || fstat(found.get(), &info) != 0) return E_FAIL;
+  if (!found.examine(&info)) return E_FAIL;
   if (S_ISLNK(info.st_mode)) return S_OK;
-  if (!recursive) return ResultOf(zt::posix::ChangeMode(found.get(), static_cast<mode_t>(mode)));
-  return TreeMode(mode).change(found.get());
+  if (!recursive) return ResultOf(zt::posix::ChangeMode(found.fd.get(), static_cast<mode_t>(mode)));
+  return TreeMode(mode).change(found);
 }
 
 HRESULT vlrSetFileSecurity(const String& path, int mode) {

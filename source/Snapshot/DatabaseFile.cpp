@@ -20,8 +20,7 @@ namespace vlt::snapshot {
 
 IniFileState DatabaseAccess::stateOf(const std::string& file) {
   struct stat info;
-  ScopedFd found = zt::posix::LookUp(file.c_str());
-  return found && fstat(found.get(), &info) == 0 ? IniFileStateOf(info) : IniFileState();
+  return zt::posix::LookUp(file.c_str()).examine(&info) ? IniFileStateOf(info) : IniFileState();
 }
 
 int DatabaseAccess::read(const std::string& file, std::string* bytes) {
@@ -65,14 +64,12 @@ IniSidecar::Digest DigestOf(const std::string& bytes) {
 
 bool IsDirectory(const std::string& path) {
   struct stat info;
-  ScopedFd found = zt::posix::LookUp(path.c_str(), false);
-  return found && fstat(found.get(), &info) == 0 && S_ISDIR(info.st_mode);
+  return zt::posix::LookUp(path.c_str(), false).examine(&info) && S_ISDIR(info.st_mode);
 }
 
 bool IsRegularFile(const std::string& path) {
   struct stat info;
-  ScopedFd found = zt::posix::LookUp(path.c_str(), false);
-  return found && fstat(found.get(), &info) == 0 && S_ISREG(info.st_mode);
+  return zt::posix::LookUp(path.c_str(), false).examine(&info) && S_ISREG(info.st_mode);
 }
 
 class Reader {

@@ -53,9 +53,7 @@ String UInt32ToString(unsigned int value, unsigned int base) { return Print(valu
 namespace osdep {
 
 // Defined above the thread primitives, which know no strings.
-String ThreadID::getDisplayStringHex() const {
-  return UIntToString(static_cast<unsigned long>(m_id), 16);
-}
+String ThreadID::getDisplayStringHex() const { return UIntToString(number(), 16); }
 
 }  // namespace osdep
 }  // namespace zt::fnd

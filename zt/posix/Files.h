@@ -4,6 +4,8 @@
 #include <sys/types.h>
 
 #include <cstddef>
+#include <optional>
+#include <utility>
 
 #include "zt/posix/ScopedFd.h"
 
@@ -44,15 +46,32 @@ ScopedFd OpenOrCreate(const char* path, int flags, mode_t mode, LastLink link = 
 
 ScopedFd OpenDirectory(const char* path);
 
-// The directory of an O_PATH descriptor, opened for reading.
+// The directory of a Found, opened for reading.
 ScopedFd OpenDirectory(int fd);
 
-// What the path names, for *at() calls and fstat only (O_PATH). `follow` false: a link in the last
-// place is the thing itself.
-ScopedFd LookUp(const char* path, bool follow = true);
+// What a path names, held without being opened: whoever replaces a part of the path changes nothing
+// about it.
+struct Found {
+  Found() = default;  // nothing
+  Found(ScopedFd held) : fd(std::move(held)) {}
+  Found(const struct stat& info) : unheld(info) {}
+
+  explicit operator bool() const { return fd.valid() || unheld; }
+
+  // As fstat(2). False with errno; nothing found keeps that of the look-up.
+  bool examine(struct stat* info) const;
+
+  // For *at() calls, fstat and ChangeMode only.
+  ScopedFd fd;
+  // The state of what the system cannot hold: never set on Linux.
+  std::optional<struct stat> unheld;
+};
+
+// `follow` false: a link in the last place is the thing itself.
+Found LookUp(const char* path, bool follow = true);
 
 // The same for an entry of a directory; a link is the thing itself. `flags`: O_DIRECTORY, or none.
-ScopedFd LookUpEntry(int directory, const char* name, int flags = 0);
+Found LookUpEntry(int directory, const char* name, int flags = 0);
 
 // The descriptor, or a copy of it that is 3 or more.
 ScopedFd AboveStandardStreams(ScopedFd fd);
@@ -92,7 +111,7 @@ int MakeRoom(const char* path);
 
 // ---- Modes
 
-// Gives the file or directory of the descriptor (O_PATH will do) these bits by rule 3, unless it
+// Gives the file or directory of the descriptor (that of a Found will do) these bits by rule 3, unless it
 // has them: EPERM or EMLINK for what the rule excludes.
 int SetSharedMode(int fd, mode_t mode);
 
@@ -102,7 +121,7 @@ int SetSharedMode(int fd, const struct stat& info, mode_t mode);
 // The same for a path. A link in the last place is left alone and counts as done.
 int SetSharedMode(const char* path, mode_t mode);
 
-// chmod for a descriptor of any kind, O_PATH included, without rule 3.
+// chmod for a descriptor of any kind, that of a Found included, without rule 3.
 int ChangeMode(int fd, mode_t mode);
 
 // ---- Failures

@@ -272,11 +272,11 @@ TEST(Files, AnEntryThatIsALinkIsLookedUpItself) {
   TempDir dir;
   dir.makeDir("d");
   ASSERT_EQ(symlink("d", (dir / "link").c_str()), 0);
-  ScopedFd directory = OpenDirectory(LookUp(dir.path().c_str()).get());
+  ScopedFd directory = OpenDirectory(LookUp(dir.path().c_str()).fd.get());
   ASSERT_TRUE(directory);
-  ScopedFd link = LookUpEntry(directory.get(), "link");
+  Found link = LookUpEntry(directory.get(), "link");
   struct stat info = {};
-  ASSERT_EQ(fstat(link.get(), &info), 0);
+  ASSERT_TRUE(link.examine(&info));
   EXPECT_TRUE(S_ISLNK(info.st_mode));
   EXPECT_FALSE(LookUpEntry(directory.get(), "link", O_DIRECTORY));
   EXPECT_EQ(errno, ENOTDIR);

@@ -3,7 +3,6 @@
 #include "source/Common/Posix/vltlinuxos.h"
 
 #include <fcntl.h>
-#include <pthread.h>
 #include <unistd.h>
 
 #include <atomic>
@@ -17,13 +16,16 @@
 #include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/ThreadID.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Environment.h"
 #include "zt/posix/Files.h"
 #include "ztini/ztini.h"
 
 using zt::fnd::AnsiString;
 using zt::fnd::String;
 using zt::fnd::osdep::path;
+using zt::fnd::osdep::ThreadID;
 using zt::posix::ScopedFd;
 
 void vltEarlyTrace(const char* sourceName, long line, const char* format, ...) {
@@ -35,7 +37,7 @@ void vltEarlyTrace(const char* sourceName, long line, const char* format, ...) {
   va_end(args);
   if (length < 0) return;
   printf("%s(%ld) : trace %d %ld: %s\n", sourceName, line, static_cast<int>(getpid()),
-         static_cast<long>(pthread_self()), message);
+         static_cast<long>(ThreadID().number()), message);
 }
 
 namespace {
@@ -78,7 +80,7 @@ String vlDiagnosticsIni() {
 
 String vlLogDirectory() {
   // Not from the environment of a user who runs a program with more rights than the own.
-  const char* home = secure_getenv("HOME");
+  const char* home = zt::posix::TrustedEnvironment("HOME");
   String root(L"/tmp/zentrex");
   // HOME is not asked for: sudo may leave that of another user, in whose directory no log of root
   // belongs.

@@ -17,6 +17,7 @@
 #include "zt/fnd/osdep/CloseOnFork.h"
 #include "zt/fnd/osdep/ForkSafeMutex.h"
 #include "zt/fnd/osdep/Hold.h"
+#include "zt/fnd/osdep/LockUntil.h"
 #include "zt/fnd/osdep/MutexGlobalStatics.h"
 #include "zt/fnd/osdep/PosixMutex.h"
 #include "zt/fnd/osdep/ProcessStatics.h"
@@ -34,14 +35,6 @@ int64_t Now() {
   timespec now;
   clock_gettime(CLOCK_MONOTONIC, &now);
   return int64_t{now.tv_sec} * kNanosecondsPerSecond + now.tv_nsec;
-}
-
-// Takes it if it becomes free before the moment.
-bool TakeUntil(pthread_mutex_t& mutex, int64_t moment) {
-  timespec end;
-  end.tv_sec = static_cast<time_t>(moment / kNanosecondsPerSecond);
-  end.tv_nsec = static_cast<long>(moment % kNanosecondsPerSecond);
-  return pthread_mutex_clocklock(&mutex, CLOCK_MONOTONIC, &end) == 0;
 }
 
 }  // namespace
@@ -107,7 +100,7 @@ class ForkSafeMutex::Registry {
   }
 
   static bool Take(ForkSafeMutex& mutex, int64_t moment) {
-    return mutex.m_takenByFork = TakeUntil(mutex.m_mutex, moment);
+    return mutex.m_takenByFork = LockUntil(mutex.m_mutex, moment);
   }
 
   static void GiveBack() REQUIRES(s_lock) {

@@ -20,6 +20,7 @@
 #include "zt/fnd/osdep/SharedUnixObject.h"
 #include "zt/fnd/osdep/Sleep.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Environment.h"
 #include "zt/posix/Files.h"
 #include "zt/posix/Retry.h"
 
@@ -98,12 +99,12 @@ OpenedFile OpenSharedPatiently(const AnsiString& path, InTheWay way) {
   }
 }
 
-void ShareDirectory(const ScopedFd& found) {
+void ShareDirectory(const zt::posix::Found& found) {
   struct stat info;
-  if (!found || ::fstat(found.get(), &info) != 0) ZT_RAISE(PosixError());
+  if (!found.examine(&info)) ZT_RAISE(PosixError());
   if (!S_ISDIR(info.st_mode)) ZT_RAISE(PosixError(ENOTDIR));
   // EPERM: it belongs to another user, whose process sets the mode.
-  if (zt::posix::SetSharedMode(found.get(), info, kDirMode) != 0 && errno != EPERM) {
+  if (zt::posix::SetSharedMode(found.fd.get(), info, kDirMode) != 0 && errno != EPERM) {
     ZT_RAISE(PosixError());
   }
 }
@@ -112,7 +113,7 @@ void ShareDirectory(const ScopedFd& found) {
 
 String GetSharedUnixBase() {
   // Not from the environment of a user who runs a program with more rights than their own.
-  const char* base = ::secure_getenv(kBaseVariable);
+  const char* base = zt::posix::TrustedEnvironment(kBaseVariable);
   return base && base[0] == '/' ? String(base) : String(kDefaultBase);
 }
 
@@ -128,7 +129,7 @@ void CreateSharedUnixDir(const String& path) {
   String::size_type last = path.find_last_not_of(L'/');
   AnsiString narrow(last == String::npos ? path : path.substr(0, last + 1));
   // Nearly every call finds the directory there.
-  ScopedFd found = zt::posix::LookUp(narrow.c_str(), false);
+  zt::posix::Found found = zt::posix::LookUp(narrow.c_str(), false);
   if (!found) {
     MakeDirectories(path);
     // MakeDirectories leaves the judgement to its caller, as it may end by its rounds.

@@ -2,6 +2,8 @@
 
 #include <pthread.h>
 
+#include <cstring>
+
 #include "zt/fnd/StringFwd.h"
 
 namespace zt::fnd::osdep {
@@ -14,6 +16,14 @@ class ThreadID {
   static ThreadID getCallingID() noexcept { return ThreadID(); }
 
   bool isCurrentThread() const noexcept { return pthread_equal(m_id, pthread_self()) != 0; }
+
+  // The number that the system gives the thread, or the address that it knows it by.
+  unsigned long number() const noexcept {
+    unsigned long number;
+    static_assert(sizeof m_id == sizeof number);
+    memcpy(&number, &m_id, sizeof number);
+    return number;
+  }
 
   // The number in capital hexadecimal digits, without prefix.
   String getDisplayStringHex() const;

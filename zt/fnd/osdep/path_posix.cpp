@@ -15,7 +15,9 @@
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/RandomBytes.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Environment.h"
 #include "zt/posix/Files.h"
 #include "zt/posix/Retry.h"
 
@@ -50,9 +52,8 @@ bool IsDirectoryText(const char* path) {
 // Links are judged on the way (zt/posix/Files.h): nothing is made below a link that another user
 // has put there.
 bool LeadsToDirectory(const char* path) {
-  zt::posix::ScopedFd found = zt::posix::LookUp(path);
   struct stat info;
-  return found && ::fstat(found.get(), &info) == 0 && S_ISDIR(info.st_mode);
+  return zt::posix::LookUp(path).examine(&info) && S_ISDIR(info.st_mode);
 }
 
 // Makes one directory, in the directory that the path led to when it was looked up; 0, or the errno
@@ -65,8 +66,8 @@ int MakeOneDir(const char* path, bool useMode, mode_t mode) {
   if (RetryEintr([&] { return ::mkdirat(parent, entry.name, first); }) != 0) return errno;
   if (!useMode) return 0;
   // The umask may have cut the mode.
-  zt::posix::ScopedFd made = zt::posix::LookUpEntry(parent, entry.name, O_DIRECTORY);
-  if (made && zt::posix::ChangeMode(made.get(), mode) == 0) return 0;
+  zt::posix::Found made = zt::posix::LookUpEntry(parent, entry.name, O_DIRECTORY);
+  if (made && zt::posix::ChangeMode(made.fd.get(), mode) == 0) return 0;
   int failure = errno;
   // A directory with another mode than asked for is not left: the next caller would take it for a
   // good one.
@@ -98,7 +99,7 @@ void CreateDirWorker(const wchar_t* path, bool useMode, mode_t mode) {
 
 // The environment's directory counts before the caller's, for who is not set-user-id.
 std::string TempDirectory(const char* wanted) {
-  const char* environment = ::secure_getenv("TMPDIR");
+  const char* environment = zt::posix::TrustedEnvironment("TMPDIR");
   for (const char* dir : {environment, wanted, P_tmpdir}) {
     if (dir && *dir && IsDirectoryText(dir)) return dir;
   }
@@ -118,7 +119,7 @@ std::string FreeName(const std::string& directory, const char* prefix) {
   start.append(prefix, strnlen(prefix, kPrefixLength));
   for (int i = 0; i < kMostNames; ++i) {
     uint64_t random;
-    if (::getentropy(&random, sizeof random) != 0) ZT_RAISE(PosixError());
+    if (!RandomBytes(&random, sizeof random)) ZT_RAISE(PosixError());
     std::string name = start;
     for (size_t n = 0; n < kRandomLength; ++n) {
       // Six digits of base 62 take 36 of the 64 bits.
@@ -158,7 +159,7 @@ String path::AbsPath(const String& path) {
 }
 
 String path::TempDirName() {
-  const char* dir = ::secure_getenv("TMPDIR");
+  const char* dir = zt::posix::TrustedEnvironment("TMPDIR");
   return dir ? String(dir) : String(L"/var/tmp/");
 }
 

@@ -10,15 +10,14 @@
 #include "vlloader/source/Preference.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/OSException.h"
+#include "zt/posix/Environment.h"
 #include "zt/posix/Files.h"
 #include "ztini/ztini.h"
 
 namespace {
 
-// secure_getenv: a program that runs with foreign rights does not let its caller choose the
-// directory.
 std::string Environment(const char* name) {
-  const char* value = secure_getenv(name);
+  const char* value = zt::posix::TrustedEnvironment(name);
   return value ? value : "";
 }
 

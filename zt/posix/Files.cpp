@@ -1,17 +1,14 @@
-// How rule 1 is kept without a race. A path is never checked and then opened: it is first turned
-// into an O_PATH descriptor, which fixes the file without opening it, then the descriptor is judged
-// by fstat, and only then is the same file opened for real, through /proc/self/fd. Whoever replaces
-// a part of the path in between changes nothing about the file that was judged.
+// How rule 1 is kept. A path is never checked and then opened: what it names is first held, without
+// being opened (HeldFiles.h), then judged, and only then is the same file opened for real. Whoever
+// replaces a part of the path in between changes nothing about the file that was judged.
 //
-// The usual path has no link, and openat2 with RESOLVE_NO_SYMLINKS walks it in one call of the
-// kernel. Only where that reports ELOOP does Walk go component by component, so that the owner of
-// each link can be compared with that of what it leads to.
+// The usual path has no link, and the kernel walks it in one call. Only where that reports ELOOP
+// does Walk go component by component, so that the owner of each link can be compared with that of
+// what it leads to.
 #include "zt/posix/Files.h"
 
 #include <fcntl.h>
-#include <linux/openat2.h>
 #include <sys/file.h>
-#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -21,6 +18,7 @@
 #include <cstring>
 #include <memory>
 
+#include "zt/posix/HeldFiles.h"
 #include "zt/posix/Retry.h"
 #include "zt/posix/Transfer.h"
 
@@ -45,15 +43,6 @@ struct Free {
 };
 using Text = std::unique_ptr<char, Free>;
 
-ScopedFd OpenAt(int directory, const char* name, int flags, mode_t mode = 0) {
-  return ScopedFd(RetryEintr([&] { return openat(directory, name, flags | O_CLOEXEC, mode); }));
-}
-
-ScopedFd Failure(int error) {
-  errno = error;
-  return ScopedFd();
-}
-
 // The third case lets users link among their own files. It is no hole: the owner of the target can
 // change that file anyway.
 bool IsTrusted(const struct stat& link, const struct stat& target) {
@@ -63,51 +52,52 @@ bool IsTrusted(const struct stat& link, const struct stat& target) {
 // Walks a path one component at a time, so that each link on the way can be judged.
 class Walk {
  public:
-  // What the path names below `at`, as O_PATH.
-  ScopedFd resolve(int at, const char* path, bool follow);
+  // What the path names below `at`.
+  Found resolve(int at, const char* path, bool follow);
 
  private:
   ScopedFd start(int at, const char* path);
-  ScopedFd step(ScopedFd directory, const char* name, bool follow);
-  ScopedFd followLink(const ScopedFd& directory, const ScopedFd& link, const struct stat& info);
+  Found step(const Found& directory, const char* name, bool follow);
+  Found followLink(int directory, const char* name, const Found& link, const struct stat& info);
 
   int m_links = 0;
 };
 
 ScopedFd Walk::start(int at, const char* path) {
   if (!*path) return Failure(ENOENT);
-  if (*path == '/') return OpenAt(AT_FDCWD, "/", O_PATH | O_DIRECTORY);
-  return OpenAt(at, ".", O_PATH | O_DIRECTORY);
+  return *path == '/' ? HoldDirectory(AT_FDCWD, "/") : HoldDirectory(at, ".");
 }
 
-ScopedFd Walk::followLink(const ScopedFd& directory, const ScopedFd& link,
-                          const struct stat& info) {
+Found Walk::followLink(int directory, const char* name, const Found& link,
+                       const struct stat& info) {
   if (++m_links > kMostLinks) return Failure(ELOOP);
   // In the heap: the function is recursive, and host threads may have small stacks.
   Text text(static_cast<char*>(malloc(PATH_MAX)));
   if (!text) return Failure(ENOMEM);
-  ssize_t length = RetryEintr([&] { return readlinkat(link.get(), "", text.get(), PATH_MAX); });
-  if (length < 0) return ScopedFd();
+  ssize_t length = ReadLink(directory, name, link, text.get(), PATH_MAX);
+  if (length < 0) return Found();
   // A full buffer may be a text that was cut.
   if (length == PATH_MAX) return Failure(ENAMETOOLONG);
   text.get()[length] = 0;
   // Relative to the directory that holds the link, and judged link by link itself.
-  ScopedFd target = resolve(directory.get(), text.get(), true);
+  Found target = resolve(directory, text.get(), true);
   struct stat led;
-  if (!target || fstat(target.get(), &led) != 0) return ScopedFd();
-  return IsTrusted(info, led) ? std::move(target) : Failure(ELOOP);
+  if (!target.examine(&led)) return Found();
+  if (!IsTrusted(info, led)) return Failure(ELOOP);
+  return target;
 }
 
-ScopedFd Walk::step(ScopedFd directory, const char* name, bool follow) {
-  ScopedFd found = LookUpEntry(directory.get(), name);
+Found Walk::step(const Found& directory, const char* name, bool follow) {
+  int at = directory.fd.get();
+  Found found = LookUpEntry(at, name);
   struct stat info;
-  if (!found || fstat(found.get(), &info) != 0) return ScopedFd();
+  if (!found.examine(&info)) return Found();
   if (!S_ISLNK(info.st_mode) || !follow) return found;
-  return followLink(directory, found, info);
+  return followLink(at, name, found, info);
 }
 
-ScopedFd Walk::resolve(int at, const char* path, bool follow) {
-  ScopedFd here = start(at, path);
+Found Walk::resolve(int at, const char* path, bool follow) {
+  Found here = start(at, path);
   char name[NAME_MAX + 1];
   while (here) {
     path += strspn(path, "/");
@@ -119,10 +109,11 @@ ScopedFd Walk::resolve(int at, const char* path, bool follow) {
     name[length] = 0;
     path += length;
     bool last = !*path;
-    here = step(std::move(here), name, follow || !last);
+    if (!here.fd) return Failure(ENOTDIR);
+    here = step(here, name, follow || !last);
     // A slash at the end asks for a directory.
     struct stat info;
-    if (here && *path && (fstat(here.get(), &info) != 0 || !S_ISDIR(info.st_mode))) {
+    if (here && *path && (!here.examine(&info) || !S_ISDIR(info.st_mode))) {
       return Failure(ENOTDIR);
     }
   }
@@ -135,40 +126,19 @@ bool NeedsSlowWalk(int error) {
   return error == ELOOP || error == ENOSYS || error == EPERM || error == EINVAL;
 }
 
-ScopedFd LookUpWithoutLinks(const char* path, bool follow) {
-  // Zeroed as a whole: the kernel refuses a request with values in fields that the flags do not
-  // use.
-  struct open_how how;
-  memset(&how, 0, sizeof how);
-  how.flags = static_cast<unsigned>(O_PATH | O_CLOEXEC | (follow ? 0 : O_NOFOLLOW));
-  how.resolve = RESOLVE_NO_SYMLINKS;
-  return ScopedFd(static_cast<int>(
-      RetryEintr([&] { return syscall(SYS_openat2, AT_FDCWD, path, &how, sizeof how); })));
-}
-
-// The path of a descriptor in /proc, through which O_PATH ones can be opened for real.
-class DescriptorPath {
- public:
-  explicit DescriptorPath(int fd) { snprintf(m_text, sizeof m_text, "/proc/self/fd/%d", fd); }
-  const char* text() const { return m_text; }
-
- private:
-  char m_text[32];
-};
-
-bool SameFile(int a, int b) {
+bool SameFile(const ScopedFd& a, const Found& b) {
   struct stat left, right;
-  return fstat(a, &left) == 0 && fstat(b, &right) == 0 && left.st_dev == right.st_dev &&
+  return fstat(a.get(), &left) == 0 && b.examine(&right) && left.st_dev == right.st_dev &&
          left.st_ino == right.st_ino;
 }
 
 // Opens for real what was looked up.
-ScopedFd Reopen(const ScopedFd& found, const char* path, int flags) {
-  ScopedFd fd = OpenAt(AT_FDCWD, DescriptorPath(found.get()).text(), flags | kAlways);
-  // Without /proc by the path once more: the same file, or none.
+ScopedFd Reopen(const Found& found, const char* path, int flags) {
+  ScopedFd fd = OpenFound(found, flags | kAlways);
+  // Or else by the path once more: the same file, or none.
   if (!fd && errno == ENOENT) {
     fd = OpenAt(AT_FDCWD, path, flags | kAlways);
-    if (fd && !SameFile(fd.get(), found.get())) return Failure(ELOOP);
+    if (fd && !SameFile(fd, found)) return Failure(ELOOP);
   }
   return AboveStandardStreams(std::move(fd));
 }
@@ -180,20 +150,22 @@ ScopedFd AboveStandardStreams(ScopedFd fd) {
   return ScopedFd(fcntl(fd.get(), F_DUPFD_CLOEXEC, kFirstFreeDescriptor));
 }
 
-ScopedFd LookUp(const char* path, bool follow) {
-  ScopedFd found = LookUpWithoutLinks(path, follow);
+bool Found::examine(struct stat* info) const {
+  if (!unheld) return fd.valid() && fstat(fd.get(), info) == 0;
+  *info = *unheld;
+  return true;
+}
+
+Found LookUp(const char* path, bool follow) {
+  Found found = LookUpWithoutLinks(path, follow);
   if (found || !NeedsSlowWalk(errno)) return found;
   return Walk().resolve(AT_FDCWD, path, follow);
 }
 
-ScopedFd LookUpEntry(int directory, const char* name, int flags) {
-  return OpenAt(directory, name, O_PATH | O_NOFOLLOW | flags);
-}
-
 ScopedFd OpenExisting(const char* path, int flags, Kind kind, LastLink link) {
-  ScopedFd found = LookUp(path, link == LastLink::Judged);
+  Found found = LookUp(path, link == LastLink::Judged);
   struct stat info;
-  if (!found || fstat(found.get(), &info) != 0) return ScopedFd();
+  if (!found.examine(&info)) return ScopedFd();
   // Only with LastLink::Refused: LookUp has followed all others.
   if (S_ISLNK(info.st_mode)) return Failure(ELOOP);
   if (S_ISDIR(info.st_mode)) {
@@ -225,19 +197,28 @@ ScopedFd OpenOrCreate(const char* path, int flags, mode_t mode, LastLink link) {
     if (fd || errno != EEXIST) return fd;
     // What is there, but leads nowhere, is a dangling link.
     struct stat info;
-    ScopedFd found = LookUp(path, false);
-    if (found && fstat(found.get(), &info) == 0 && S_ISLNK(info.st_mode)) return Failure(ELOOP);
+    Found found = LookUp(path, false);
+    if (found.examine(&info) && S_ISLNK(info.st_mode)) return Failure(ELOOP);
   }
   return Failure(EEXIST);
 }
 
 ScopedFd OpenDirectory(const char* path) {
-  ScopedFd found = LookUp(path);
-  if (!found) return found;
+  Found found = LookUp(path);
+  if (!found) return ScopedFd();
   return Reopen(found, path, O_RDONLY | O_DIRECTORY);
 }
 
 ScopedFd OpenDirectory(int fd) { return OpenAt(fd, ".", O_RDONLY | O_DIRECTORY); }
+
+namespace {
+
+ScopedFd HoldForEntry(const char* path) {
+  Found found = LookUp(path);
+  return found.unheld ? Failure(ENOTDIR) : std::move(found.fd);
+}
+
+}  // namespace
 
 Entry::Entry(const char* path) : name(path) {
   // Slashes at the end belong to the name: they ask for a directory.
@@ -246,7 +227,7 @@ Entry::Entry(const char* path) : name(path) {
   while (end > 0 && path[end - 1] != '/') --end;
   if (end == 0) {
     // Only slashes, or a name alone; the name is the whole path then.
-    directory = LookUp(*path == '/' ? "/" : ".");
+    directory = HoldForEntry(*path == '/' ? "/" : ".");
     return;
   }
   name = path + end;
@@ -257,7 +238,7 @@ Entry::Entry(const char* path) : name(path) {
   }
   memcpy(text.get(), path, end);
   text.get()[end] = 0;
-  directory = LookUp(text.get());
+  directory = HoldForEntry(text.get());
 }
 
 int Rename(const char* from, const char* to) {
@@ -293,12 +274,9 @@ int Link(const char* existing, const char* path) {
 int RenameToNew(int directory, const char* from, const char* to) {
   // The one call that both renames and refuses to replace: link() and unlink() instead would show
   // the file under two names for a moment, which SetSharedMode refuses to touch.
-  long result = RetryEintr(
-      [&] { return syscall(SYS_renameat2, directory, from, directory, to, RENAME_NOREPLACE); });
-  if (result == 0 || (errno != ENOSYS && errno != EINVAL && errno != EPERM)) {
-    return static_cast<int>(result);
-  }
-  // Some file systems do not know the flag. The name is examined first; a race here would need two
+  int result = RenameInOneStep(directory, from, to);
+  if (result == 0 || (errno != ENOSYS && errno != EINVAL && errno != EPERM)) return result;
+  // Some systems have no such call, and some file systems do not know the flag. The name is examined first; a race here would need two
   // files set aside at one moment under the file's lock.
   struct stat info;
   if (fstatat(directory, to, &info, AT_SYMLINK_NOFOLLOW) == 0) {
@@ -334,25 +312,6 @@ int MakeRoom(const char* path) {
   return errno == EISDIR || errno == EPERM ? MoveAside(path) : -1;
 }
 
-int ChangeMode(int fd, mode_t mode) {
-  int result = RetryEintr([&] { return fchmod(fd, mode); });
-  if (result == 0 || errno != EBADF) return result;
-  // O_PATH: fchmod does not take it.
-  result = RetryEintr([&] { return chmod(DescriptorPath(fd).text(), mode); });
-  if (result == 0 || errno != ENOENT) return result;
-    // Without /proc: Linux 6.6 has a call for it, and a directory can be opened.
-#ifdef SYS_fchmodat2
-  constexpr long kChangeModeAt = SYS_fchmodat2;
-#else
-  constexpr long kChangeModeAt = 452;  // on every architecture
-#endif
-  if (RetryEintr([&] { return syscall(kChangeModeAt, fd, "", mode, AT_EMPTY_PATH); }) == 0) {
-    return 0;
-  }
-  ScopedFd directory = OpenDirectory(fd);
-  return directory ? RetryEintr([&] { return fchmod(directory.get(), mode); }) : -1;
-}
-
 int SetSharedMode(int fd, const struct stat& info, mode_t mode) {
   // A second name may be one that another user has given to a file of root or of the caller, to
   // have its mode widened here. Directories have several links by nature.
@@ -373,11 +332,11 @@ int SetSharedMode(int fd, mode_t mode) {
 }
 
 int SetSharedMode(const char* path, mode_t mode) {
-  ScopedFd found = LookUp(path, false);
+  Found found = LookUp(path, false);
   struct stat info;
-  if (!found || fstat(found.get(), &info) != 0) return -1;
+  if (!found.examine(&info)) return -1;
   if (S_ISLNK(info.st_mode)) return 0;
-  return SetSharedMode(found.get(), info, mode);
+  return SetSharedMode(found.fd.get(), info, mode);
 }
 
 bool IsPassing(int error) {
