@@ -11,11 +11,11 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <cstring>
 #include <filesystem>
 #include <system_error>
 
 #include "tests/support/TempDir.h"
+#include "zt/fnd/ByteOrder.h"
 
 namespace vlt::test {
 namespace {
@@ -100,8 +100,9 @@ EventPlace::Slot EventPlace::slotOf(const std::string& name) const {
     ADD_FAILURE() << name << " has " << bytes.size() << " bytes";
     return slot;
   }
-  std::memcpy(&slot.set, &bytes[1], 4);
-  std::memcpy(&slot.index, &bytes[5], 4);
+  const auto* at = reinterpret_cast<const unsigned char*>(bytes.data());
+  slot.set = zt::fnd::little_endian::Get<uint32_t>(at + 1);
+  slot.index = zt::fnd::little_endian::Get<uint32_t>(at + 5);
   return slot;
 }
 

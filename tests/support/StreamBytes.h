@@ -72,7 +72,8 @@ using SubStream = std::pair<std::wstring, std::string>;
 
 inline std::string AreaEntry(const SubStream& s, Width width = Width::Reader,
                              Order order = Order::Little) {
-  std::string name(reinterpret_cast<const char*>(s.first.data()), s.first.size() * 4);
+  std::string name;
+  for (wchar_t character : s.first) name += Number(static_cast<uint32_t>(character), 4);
   return Number(s.first.size(), width == Width::Writer ? 4 : sizeof(unsigned long), order) + name +
          Number(s.second.size(), 4, order) + s.second;
 }

@@ -3,29 +3,47 @@
 #include <gtest/gtest.h>
 
 #include <cstdint>
+#include <cstring>
+#include <string>
 
 namespace zt::fnd {
 namespace {
 
-TEST(ByteOrder, BigEndianCopiesReverse) {
-  const unsigned char src[] = {1, 2, 3, 4, 5};
-  unsigned char dest[5] = {};
-  big_endian::CopyToBigEndian(5, dest, src);
-  EXPECT_EQ(dest[0], 5);
-  EXPECT_EQ(dest[2], 3);
-  EXPECT_EQ(dest[4], 1);
-  unsigned char back[5] = {};
-  big_endian::CopyFromBigEndian(5, back, dest);
-  EXPECT_EQ(memcmp(src, back, 5), 0);
+TEST(ByteOrder, BigEndianCopiesBeginWithTheHighestByte) {
+  const uint32_t number = 0x01020304;
+  unsigned char src[4], dest[4] = {}, back[4] = {};
+  memcpy(src, &number, sizeof src);
+  big_endian::CopyToBigEndian(4, dest, src);
+  const unsigned char expected[] = {1, 2, 3, 4};
+  EXPECT_EQ(memcmp(dest, expected, 4), 0);
+  big_endian::CopyFromBigEndian(4, back, dest);
+  EXPECT_EQ(memcmp(src, back, 4), 0);
   big_endian::CopyToBigEndian(0, dest, src);
-  EXPECT_EQ(dest[0], 5);
+  EXPECT_EQ(dest[0], 1);
 }
 
-TEST(ByteOrder, ValuesReverseOrStay) {
-  EXPECT_EQ(0x04030201u, big_endian::ToBigEndian<std::uint32_t>(0x01020304));
-  EXPECT_EQ(0x0201u, big_endian::FromBigEndian<std::uint16_t>(0x0102));
-  EXPECT_EQ(0x01020304u, little_endian::ToLittleEndian<std::uint32_t>(0x01020304));
-  EXPECT_EQ(0x01020304u, little_endian::FromLittleEndian<std::uint32_t>(0x01020304));
+template <class T>
+std::string BytesOf(T value) {
+  return std::string(reinterpret_cast<const char*>(&value), sizeof value);
+}
+
+TEST(ByteOrder, ValuesHaveTheirBytesInTheOrderOfTheName) {
+  const uint32_t value = 0x01020304;
+  EXPECT_EQ(BytesOf(big_endian::ToBigEndian(value)), "\1\2\3\4");
+  EXPECT_EQ(BytesOf(little_endian::ToLittleEndian(value)), "\4\3\2\1");
+  EXPECT_EQ(big_endian::FromBigEndian(big_endian::ToBigEndian(value)), value);
+  EXPECT_EQ(little_endian::FromLittleEndian(little_endian::ToLittleEndian(value)), value);
+  EXPECT_EQ(BytesOf(big_endian::FromBigEndian<uint16_t>(0x0102)),
+            BytesOf(big_endian::ToBigEndian<uint16_t>(0x0102)));
+}
+
+TEST(ByteOrder, PutAndGetAreLittleEndianAtAnyPlace) {
+  unsigned char bytes[10] = {};
+  little_endian::Put<int64_t>(bytes + 1, -2);
+  const unsigned char expected[] = {0, 0xFE, 0xFF, 0xFF, 0xFF, 0xFF, 0xFF, 0xFF, 0xFF, 0};
+  EXPECT_EQ(memcmp(bytes, expected, sizeof bytes), 0);
+  EXPECT_EQ(little_endian::Get<int64_t>(bytes + 1), -2);
+  EXPECT_EQ(little_endian::Get<uint16_t>(bytes), 0xFE00);
 }
 
 TEST(ByteOrder, SerializeRawWritesAndMoves) {

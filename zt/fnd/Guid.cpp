@@ -20,21 +20,37 @@ namespace zt::fnd {
 namespace {
 
 constexpr unsigned kTextLength = 38;
-constexpr unsigned kSize = sizeof(_GUID);
 
-// Which byte in memory each pair of digits shows; -1 is a hyphen.
+// Which of its bytes each pair of digits shows; -1 is a hyphen.
 // The first three fields are numbers, shown from their most significant digit (RFC 4122, section
-// 3); in memory they are little-endian, so their bytes go in reverse.
+// 3); they are little-endian, so their bytes go in reverse.
 constexpr int kByteOrder[] = {3, 2, 1, 0, -1, 5, 4, -1, 7, 6, -1, 8, 9, -1, 10, 11, 12, 13, 14, 15};
 
 }  // namespace
+
+GuidByteArray GuidBytes(const _GUID& guid) noexcept {
+  GuidByteArray bytes;
+  little_endian::Put(&bytes[0], guid.Data1);
+  little_endian::Put(&bytes[4], guid.Data2);
+  little_endian::Put(&bytes[6], guid.Data3);
+  memcpy(&bytes[8], guid.Data4, sizeof guid.Data4);
+  return bytes;
+}
+
+_GUID GuidOf(const unsigned char* bytes) noexcept {
+  _GUID guid;
+  guid.Data1 = little_endian::Get<uint32_t>(bytes);
+  guid.Data2 = little_endian::Get<uint16_t>(bytes + 4);
+  guid.Data3 = little_endian::Get<uint16_t>(bytes + 6);
+  memcpy(guid.Data4, bytes + 8, sizeof guid.Data4);
+  return guid;
+}
 
 Guid Guid::make() { return Guid(osdep::MakeGUID()); }
 
 void Guid::toString(String& out) const {
   static constexpr wchar_t kDigits[] = L"0123456789ABCDEF";
-  unsigned char bytes[kSize];
-  memcpy(bytes, &m_guid, kSize);
+  const GuidByteArray bytes = GuidBytes(m_guid);
   wchar_t text[kTextLength];
   wchar_t* p = text;
   *p++ = L'{';
@@ -42,8 +58,9 @@ void Guid::toString(String& out) const {
     if (index < 0) {
       *p++ = L'-';
     } else {
-      *p++ = kDigits[bytes[index] >> 4];
-      *p++ = kDigits[bytes[index] & 0x0F];
+      const unsigned char byte = bytes[static_cast<size_t>(index)];
+      *p++ = kDigits[byte >> 4];
+      *p++ = kDigits[byte & 0x0F];
     }
   }
   *p = L'}';
@@ -54,8 +71,8 @@ void Guid::fromString(const String& text) {
   // Before the parse, which would accept text after the closing brace.
   if (text.length() != kTextLength) ZT_RAISE(exception::BadGuidString());
   // Parsed aside: a text that turns out bad at its end leaves the value as it was.
-  unsigned char bytes[kSize] = {};
-  unsigned char* out = bytes;
+  GuidByteArray bytes = {};
+  unsigned char* out = bytes.data();
   const wchar_t* cursor = text.begin();
   const wchar_t* const end = text.end();
   bool ok = true;
@@ -72,11 +89,14 @@ void Guid::fromString(const String& text) {
   SkipCharacter(cursor, end, L'}', ok);
   // Only here: the steps do nothing once one has failed, which keeps the reader a straight line.
   if (!ok) ZT_RAISE(exception::BadGuidString());
-  memcpy(&m_guid, bytes, kSize);
+  m_guid = GuidOf(bytes.data());
 }
 
 void Guid::deserialize(const unsigned char*& cursor, const unsigned char* limit) {
-  little_endian::DeserializeRaw<_GUID>(m_guid, cursor, limit);
+  if (limit - cursor < static_cast<ptrdiff_t>(sizeof m_guid))
+    throw exception::DeserializationError();
+  m_guid = GuidOf(cursor);
+  cursor += sizeof m_guid;
 }
 
 unsigned char ParseHexNibble(const wchar_t*& cursor, const wchar_t* end, bool& ok) {
@@ -111,9 +131,8 @@ void ParseHex(const wchar_t*& cursor, const wchar_t* end, unsigned char*& out, b
     value = value << 4 | ParseHexNibble(cursor, end, ok);
   }
   if (!ok) return;
-  const T field = static_cast<T>(value);
-  memcpy(out, &field, sizeof field);
-  out += sizeof field;
+  little_endian::Put(out, static_cast<T>(value));
+  out += sizeof(T);
 }
 
 template void ParseHex<uint8_t>(const wchar_t*&, const wchar_t*, unsigned char*&, bool&);

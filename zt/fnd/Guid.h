@@ -1,5 +1,6 @@
 #pragma once
 
+#include <array>
 #include <cstdint>
 
 #include "zt/fnd/GuidType.h"
@@ -11,6 +12,11 @@ bool operator<(const _GUID& a, const _GUID& b) noexcept;
 bool operator==(const _GUID& a, const _GUID& b) noexcept;
 
 namespace zt::fnd {
+
+// The 16 bytes of an identifier in files and streams: the three numbers little-endian, then Data4.
+using GuidByteArray = std::array<unsigned char, 16>;
+GuidByteArray GuidBytes(const _GUID& guid) noexcept;
+_GUID GuidOf(const unsigned char* bytes) noexcept;
 
 // A 128-bit identifier and its text form, "{00112233-4455-6677-8899-AABBCCDDEEFF}".
 //
@@ -34,7 +40,7 @@ class Guid {
   // Throws BadGuidString for anything but the text form; the value is then unchanged.
   void fromString(const String& text);
 
-  // Wire form: the 16 bytes as they are in memory. Throws DeserializationError if fewer remain
+  // Wire form: the 16 bytes of GuidBytes. Throws DeserializationError if fewer remain
   // below `limit`; value and cursor are then unchanged.
   unsigned int serializationSize() const noexcept { return sizeof m_guid; }
   void deserialize(const unsigned char*& cursor, const unsigned char* limit);
@@ -52,7 +58,7 @@ class Guid {
 // One digit of either case; 0 where there is none.
 unsigned char ParseHexNibble(const wchar_t*& cursor, const wchar_t* end, bool& ok);
 void SkipCharacter(const wchar_t*& cursor, const wchar_t* end, wchar_t expected, bool& ok);
-// All digits of a T of 1, 2 or 4 bytes; stores it in the host's byte order and moves `out` past it.
+// All digits of a T of 1, 2 or 4 bytes; stores it in little-endian order and moves `out` past it.
 template <class T>
 void ParseHex(const wchar_t*& cursor, const wchar_t* end, unsigned char*& out, bool& ok);
 

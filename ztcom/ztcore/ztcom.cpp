@@ -2,6 +2,8 @@
 
 #include <cstring>
 
+#include "zt/fnd/ByteOrder.h"
+
 namespace {
 
 bool SameId(const GUID& a, const GUID& b) { return memcmp(&a, &b, sizeof a) == 0; }
@@ -9,10 +11,10 @@ bool SameId(const GUID& a, const GUID& b) { return memcmp(&a, &b, sizeof a) == 0
 // The third 32-bit word of IUnknown's id is the constant part of the old ids. Callers on hosts of
 // the other byte order wrote it as 0xC000.
 bool IsUnknown(const GUID& iid) {
-  uint32_t words[4];
-  memcpy(words, &iid, sizeof words);
-  return words[0] == 0 && words[1] == 0 && (words[2] == 0xC0 || words[2] == 0xC000) &&
-         words[3] == 0x46000000;
+  const auto third = zt::fnd::little_endian::Get<uint32_t>(iid.Data4);
+  const auto fourth = zt::fnd::little_endian::Get<uint32_t>(iid.Data4 + 4);
+  return iid.Data1 == 0 && iid.Data2 == 0 && iid.Data3 == 0 && (third == 0xC0 || third == 0xC000) &&
+         fourth == 0x46000000;
 }
 
 HRESULT HandOut(void* object, uintptr_t offset, void** out) {

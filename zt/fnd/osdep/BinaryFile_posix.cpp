@@ -80,7 +80,8 @@ unsigned char* MakeRoom(AutoBuffer& buffer, unsigned int n) {
 }
 
 uint32_t InOrder(uint32_t value, BinaryFile::Endianness order) {
-  return order == BinaryFile::Endianness::Little ? value : big_endian::ToBigEndian(value);
+  return order == BinaryFile::Endianness::Little ? little_endian::ToLittleEndian(value)
+                                                 : big_endian::ToBigEndian(value);
 }
 
 }  // namespace

@@ -7,9 +7,9 @@ namespace zt::fnd::osdep {
 // Converts the range until input or space runs out and sets `destEnd`, which is the end of the
 // buffer on entry, to where the output stopped. Where iconv stops with input and space left,
 // whatever its reason, one unit of input (a byte, a wide character) becomes one "?". Nothing is
-// terminated. The wide side is named "UTF-32LE"; "" is the encoding of the host's C locale. Throws
-// InvalidLocale where iconv knows no such conversion, also for an empty range. Threads: any; each
-// call opens a descriptor of its own.
+// terminated. The wide side is named "UTF-32LE" ("UTF-32BE" on a big-endian host); "" is the
+// encoding of the host's C locale. Throws InvalidLocale where iconv knows no such conversion, also
+// for an empty range. Threads: any; each call opens a descriptor of its own.
 void IConv(const char* begin, const char* end, const char* fromCode, wchar_t* dest,
            wchar_t*& destEnd, const char* toCode);
 void IConv(const wchar_t* begin, const wchar_t* end, const char* fromCode, char* dest,

@@ -7,6 +7,7 @@
 
 #include <langinfo.h>
 
+#include <bit>
 #include <cstring>
 #include <cwchar>
 #include <memory>
@@ -20,7 +21,8 @@ namespace {
 
 using SafeCount = SafeInteger<uint32_t>;
 
-constexpr char kWideCode[] = "UTF-32LE";
+constexpr const char* kWideCode =
+    std::endian::native == std::endian::little ? "UTF-32LE" : "UTF-32BE";
 // Of UTF-8; no encoding of a locale has longer ones.
 constexpr uint32_t kMostBytesPerCharacter = 4;
 

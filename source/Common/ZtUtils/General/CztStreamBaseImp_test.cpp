@@ -5,6 +5,7 @@
 #include "tests/support/FailingHeap.h"
 #include "tests/support/SlotOf.h"
 #include "tests/support/StreamBytes.h"
+#include "zt/fnd/Guid.h"
 #include "ztcom/ztcore/ztmemmgr.h"
 
 namespace vlt::test {
@@ -43,8 +44,9 @@ TEST(CztStreamBaseImp, EveryInterfaceIsTheSamePointer) {
 }
 
 TEST(CztStreamBaseImp, MarkerBytesAreThoseOfTheFormat) {
-  const auto* bytes = reinterpret_cast<const char*>(&CztStreamBaseImp::s_SubStreamMarker);
-  EXPECT_EQ(Hexed(std::string(bytes, 16)), "A1 BB 00 D3 D6 C3 CF 47 B7 52 CB 9F FD 8A BC CC ");
+  const auto bytes = zt::fnd::GuidBytes(CztStreamBaseImp::s_SubStreamMarker);
+  EXPECT_EQ(Hexed(std::string(bytes.begin(), bytes.end())),
+            "A1 BB 00 D3 D6 C3 CF 47 B7 52 CB 9F FD 8A BC CC ");
 }
 
 TEST(CztStreamBaseImp, OpenOfAMissingOneNullsThePointer) {

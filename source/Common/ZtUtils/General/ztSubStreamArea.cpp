@@ -4,8 +4,15 @@
 // damaged file costs more than the file's own size.
 #include "source/Common/ZtUtils/General/ztSubStreamArea.h"
 
+#include <bit>
 #include <cstring>
 #include <new>
+
+#include "zt/fnd/ByteOrder.h"
+#include "zt/fnd/Guid.h"
+
+using zt::fnd::little_endian::FromLittleEndian;
+using zt::fnd::little_endian::ToLittleEndian;
 
 namespace {
 
@@ -45,7 +52,7 @@ class AreaReader {
     m_left -= sizeBytes;
   }
 
-  // The characters are never reversed: they are in the reader's own order.
+  // The characters do not follow the header's byte order: they are little-endian.
   zt::fnd::String readName() {
     take(sizeof(unsigned long));
     uint64_t length = m_in.ReadLong();
@@ -55,6 +62,7 @@ class AreaReader {
     take(static_cast<int64_t>(count * sizeof(wchar_t)));
     std::vector<wchar_t> characters(count);
     readBytes(characters.data(), static_cast<uint32_t>(count * sizeof(wchar_t)));
+    for (wchar_t& character : characters) character = FromLittleEndian(character);
     return zt::fnd::String(characters.data(), count);
   }
 
@@ -87,15 +95,27 @@ void WriteBytes(IztStream* stream, const void* bytes, uint32_t count) {
   if (count > 0) ztWriteStreamBytes(stream, bytes, count);
 }
 
+void WriteName(IztStream* stream, const zt::fnd::String& name) {
+  const uint32_t sizeBytes = name.length() * uint32_t{sizeof(wchar_t)};
+  if constexpr (std::endian::native == std::endian::little) {
+    WriteBytes(stream, name.c_str(), sizeBytes);
+  } else {
+    std::vector<wchar_t> characters(name.begin(), name.end());
+    for (wchar_t& character : characters) character = ToLittleEndian(character);
+    WriteBytes(stream, characters.data(), sizeBytes);
+  }
+}
+
 }  // namespace
 
 bool ReadSubStreamTrailer(IztStream* stream, int64_t streamSize, int64_t* offset) {
+  const zt::fnd::GuidByteArray marker = zt::fnd::GuidBytes(kSubStreamMarker);
   unsigned char trailer[kSubStreamTrailerSize];
   stream->Seek(streamSize - kSubStreamTrailerSize, ztSeekBegin, nullptr);
   ztReadStreamBytes(stream, trailer, sizeof trailer);
-  memcpy(offset, trailer + sizeof kSubStreamMarker, sizeof *offset);
+  *offset = zt::fnd::little_endian::Get<int64_t>(trailer + marker.size());
   // -1 is what a stream without an area remembers, and no place.
-  return memcmp(trailer, &kSubStreamMarker, sizeof kSubStreamMarker) == 0 && *offset != -1;
+  return memcmp(trailer, marker.data(), marker.size()) == 0 && *offset != -1;
 }
 
 std::vector<CztSubStreamBlock> ReadSubStreamArea(IztStream* stream, int64_t offset,
@@ -118,12 +138,14 @@ CztSubStreamAreaWriter::CztSubStreamAreaWriter(IztStream* stream, size_t count)
 void CztSubStreamAreaWriter::add(const zt::fnd::String& name, const unsigned char* bytes,
                                  int64_t sizeBytes) {
   m_out << name.length();
-  WriteBytes(m_out.GetStream(), name.c_str(), name.length() * uint32_t{sizeof(wchar_t)});
+  WriteName(m_out.GetStream(), name);
   m_out << static_cast<int32_t>(sizeBytes);
   WriteBytes(m_out.GetStream(), bytes, static_cast<uint32_t>(sizeBytes));
 }
 
 void CztSubStreamAreaWriter::finish(int64_t start) {
-  WriteBytes(m_out.GetStream(), &kSubStreamMarker, sizeof kSubStreamMarker);
+  const zt::fnd::GuidByteArray marker = zt::fnd::GuidBytes(kSubStreamMarker);
+  WriteBytes(m_out.GetStream(), marker.data(), marker.size());
+  start = ToLittleEndian(start);
   WriteBytes(m_out.GetStream(), &start, sizeof start);
 }

@@ -1,9 +1,9 @@
 // Values have no tags: reader and writer agree on their order, and the header says in which byte
-// order the writer's machine had its numbers. Only the reader ever reverses bytes, so that streams
-// between machines of one kind cost nothing.
+// order the numbers are. It is little-endian in all that this library writes, on every machine.
 #include "source/Common/ZtUtils/General/ztTypedStream.h"
 
 #include <algorithm>
+#include <bit>
 
 #include "ztcom/ztcore/ztcom.h"
 
@@ -89,15 +89,15 @@ CztInStream::CztInStream(CztInStream& outer) : CztInStream(outer.m_stream) {}
 void CztInStream::readHeader() {
   unsigned char order = 0;
   ztReadStreamBytes(m_stream, &order, sizeof order);
-  // From here on numbers are reversed where the writer's order is another one, those of the header
-  // included.
+  // From here on numbers are read in that order, those of the header included.
   m_byteOrder = order;
   *this >> m_majorVersion >> m_minorVersion >> m_sequenceNumber;
 }
 
 void CztInStream::readNumber(void* number, unsigned int sizeBytes) {
   ztReadStreamBytes(m_stream, number, sizeBytes);
-  if (m_byteOrder == s_SystemByteOrder) return;
+  constexpr bool kLittleHost = std::endian::native == std::endian::little;
+  if ((m_byteOrder == s_SystemByteOrder) == kLittleHost) return;
   auto* bytes = static_cast<unsigned char*>(number);
   std::reverse(bytes, bytes + sizeBytes);
 }

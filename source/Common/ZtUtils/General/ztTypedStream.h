@@ -2,6 +2,7 @@
 
 #include "source/Common/ZtUtils/General/ztStreamException.h"
 #include "source/Common/ZtUtils/General/ztStreamInterfaces.h"
+#include "zt/fnd/ByteOrder.h"
 #include "zt/fnd/String.h"
 
 // Exactly `count` bytes, raw, by one call. A negative result throws: CztEndOfStreamException for
@@ -37,14 +38,16 @@ class CztStreamBase {
   CztStreamBase(const CztStreamBase&) = default;
 
   static int32_t s_ModuleMajorVersion, s_ModuleMinorVersion, s_ModuleSequenceNumber;
-  static const int32_t s_SystemByteOrder;  // 0: little-endian
+  // Of the streams that are written, on every machine. 0: little-endian; any other value of
+  // m_byteOrder is the other order.
+  static const int32_t s_SystemByteOrder;
 
   IztStream* m_stream;
   int32_t m_majorVersion, m_minorVersion, m_sequenceNumber;
   int32_t m_byteOrder;
 };
 
-// Writes values in this machine's byte order, without tags or padding, one Write a value. Every
+// Writes values little-endian, without tags or padding, one Write a value. Every
 // member and constructor throws as ztWriteStreamBytes.
 class CztOutStream : public CztStreamBase {
  public:
@@ -74,6 +77,7 @@ class CztOutStream : public CztStreamBase {
   void writeHeader();
   template <class T>
   CztOutStream& write(T value) {
+    value = zt::fnd::little_endian::ToLittleEndian(value);
     ztWriteStreamBytes(m_stream, &value, sizeof value);
     return *this;
   }
@@ -84,7 +88,7 @@ void ztWriteStreamValue(CztOutStream& out, const T& value) {
   out << value;
 }
 
-// Reads values in the writer's byte order. Every member and constructor throws as
+// Reads values in the byte order that the header states. Every member and constructor throws as
 // ztReadStreamBytes; the target of a value that fails is unchanged.
 class CztInStream : public CztStreamBase {
  public:

@@ -1,28 +1,16 @@
-// Fields are copied one by one by memcpy, and no structure is laid over the bytes: the records have
-// no padding, so that most fields are unaligned, and compilers of 32 and 64 bits would lay out
-// structures differently.
+// Fields are copied one by one, and no structure is laid over the bytes: the records have no padding,
+// so that most fields are unaligned, and compilers of 32 and 64 bits would lay out structures
+// differently.
 #include "zt/fnd/osdep/events/EventStateFile.h"
 
 #include <algorithm>
-#include <cstring>
+
+#include "zt/fnd/ByteOrder.h"
 
 namespace zt::fnd::osdep {
-namespace {
 
-template <class Number>
-void Put(unsigned char* to, Number value) {
-  memcpy(to, &value, sizeof value);
-}
-
-template <class Number>
-Number Get(const unsigned char* from) {
-  Number value;
-  memcpy(&value, from, sizeof value);
-  return value;
-}
-
-}  // namespace
-
+using little_endian::Get;
+using little_endian::Put;
 EventPlace::Bytes EventPlace::encode() const {
   Bytes bytes = {};
   Put(&bytes[1], set);

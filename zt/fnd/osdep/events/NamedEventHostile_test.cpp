@@ -26,6 +26,7 @@
 #include "tests/support/ReusedDescriptor.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/ThreadState.h"
+#include "zt/fnd/ByteOrder.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/NamedEvent.h"
 #include "zt/fnd/osdep/events/EventStateFile.h"
@@ -71,6 +72,7 @@ void Patch(const std::string& path, std::size_t at, const std::string& bytes) {
 }
 
 std::string Number(std::uint32_t value) {
+  value = little_endian::ToLittleEndian(value);
   return std::string(reinterpret_cast<const char*>(&value), sizeof value);
 }
 

@@ -15,6 +15,7 @@
 #include <string>
 #include <utility>
 
+#include "zt/fnd/ByteOrder.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/OSException.h"
@@ -154,12 +155,10 @@ bool SemaphoreSet::updateFreeRecords(int delta, unsigned newFirst, unsigned& old
     size = static_cast<size_t>(SlotRecord::Offset(slot + 1)) - kBase;
   }
   if (!m_file.read(span.data(), size, kBase)) return false;
-  uint32_t freeCount;
-  memcpy(&freeCount, &span[0], sizeof freeCount);
-  freeCount += static_cast<uint32_t>(delta);
-  memcpy(&span[0], &freeCount, sizeof freeCount);
-  memcpy(&oldFirst, &span[4], sizeof oldFirst);
-  memcpy(&span[4], &newFirst, sizeof newFirst);
+  const auto freeCount = little_endian::Get<uint32_t>(&span[0]) + static_cast<uint32_t>(delta);
+  little_endian::Put(&span[0], freeCount);
+  oldFirst = little_endian::Get<uint32_t>(&span[4]);
+  little_endian::Put(&span[4], newFirst);
   if (record) {
     const SlotRecord::Bytes bytes = record->encode();
     memcpy(&span[size - bytes.size()], bytes.data(), bytes.size());

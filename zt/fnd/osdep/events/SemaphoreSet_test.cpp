@@ -4,12 +4,12 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <cstring>
 #include <string>
 #include <vector>
 
 #include "tests/support/EventPlace.h"
 #include "tests/support/TempDir.h"
+#include "zt/fnd/ByteOrder.h"
 #include "zt/fnd/osdep/Hold.h"
 #include "zt/fnd/osdep/events/NamedEventGlobalStatics.h"
 
@@ -32,7 +32,8 @@ struct Set {
 
   void patch(size_t at, uint32_t value) const {
     std::string bytes = ReadBytes(path);
-    memcpy(&bytes.at(at), &value, sizeof value);
+    ASSERT_LE(at + sizeof value, bytes.size());
+    little_endian::Put(reinterpret_cast<unsigned char*>(bytes.data()) + at, value);
     FILE* file = fopen(path.c_str(), "r+b");
     ASSERT_NE(file, nullptr);
     EXPECT_EQ(bytes.size(), fwrite(bytes.data(), 1, bytes.size(), file));
