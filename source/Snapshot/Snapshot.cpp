@@ -65,6 +65,7 @@ void Answer(const std::string& bytes, const Place& place, Snapshot* snapshot) {
 Snapshot ReadAt(const Opened& opened) {
   Snapshot snapshot;
   snapshot.root = Utf8(opened.place.here);
+  snapshot.recordedRoot = Utf8(opened.place.recorded);
   snapshot.database = opened.database;
   Answer(opened.bytes, opened.place, &snapshot);
   return snapshot;

@@ -92,7 +92,8 @@ struct Problem {
 // where it would not begin with what the database holds: where that is missing, set aside or
 // unreadable.
 struct Snapshot {
-  std::string root;  // ends in a slash
+  std::string root;          // ends in a slash
+  std::string recordedRoot;  // what it was when the database was written; ends in a slash
   Database database;
   std::vector<Component> components;  // in the order of their GUIDs
   std::vector<Binding> bindings;      // in the order of their entry

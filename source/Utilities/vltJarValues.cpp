@@ -30,8 +30,6 @@ namespace {
 
 constexpr const char* kCookieSection = "CookieSection";
 constexpr const char* kLastServerCookie = "LastServerCookie";
-constexpr const char* kServerSection = "ServerSection";
-constexpr const char* kServerIdentity = "ServerIdentity";
 constexpr const char* kOfflineSection = "OfflineStorageSection";
 constexpr const char* kNextEndpoint = "NextEndpt";
 
@@ -149,7 +147,7 @@ HRESULT vltGetServerIdentity(GUID* out) {
 HRESULT vltGetServerIdentityFromFile(GUID* out, String& dataDir) {
   return WithPreparedJar(dataDir, [&](const wchar_t* jar, CvlIniMgr& ini) {
     std::string value;
-    HRESULT result = ini.GetItem(kServerSection, kServerIdentity, &value);
+    HRESULT result = ini.GetItem(vltjar::kServerSection, vltjar::kServerIdentity, &value);
     if (result >= 0) {
       *out = vltGuidFromString2(String(value.c_str()).c_str());
       return result;
@@ -160,7 +158,8 @@ HRESULT vltGetServerIdentityFromFile(GUID* out, String& dataDir) {
     TaskMem<wchar_t> text(vltGuidToString2(*out));
     // Never an empty identity: it could not be read again.
     if (!text || !*text.get()) return E_OUTOFMEMORY;
-    return SetAndSave(jar, ini, kServerSection, kServerIdentity, Narrow(text.get()));
+    return SetAndSave(jar, ini, vltjar::kServerSection, vltjar::kServerIdentity,
+                      Narrow(text.get()));
   });
 }
 

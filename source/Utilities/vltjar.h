@@ -64,6 +64,9 @@ HRESULT RemoveOfflineStorageInfo(const zt::fnd::String& storage, CvlIniMgr* ini)
 
 namespace vltjar {
 
+inline constexpr const char* kServerSection = "ServerSection";
+inline constexpr const char* kServerIdentity = "ServerIdentity";
+
 // <install>/Data/, or empty if that is no directory.
 zt::fnd::String ExistingDataDirectory();
 

@@ -203,6 +203,10 @@ Parsed WrongExtras(const CLI::App& app, const std::string& message) {
   const CLI::App* sub = &app;
   while (!sub->get_subcommands().empty()) sub = sub->get_subcommands().front();
   std::vector<std::string> extras = app.remaining(true);
+  const Command* command = FindCommand(CommandOf(app));
+  if (command && command->whyNoRoot && !extras.empty() && extras.front().starts_with("--root")) {
+    return Wrong(std::string(command->name) + " takes no --root: " + command->whyNoRoot, "");
+  }
   std::string guess = extras.empty() ? "" : DidYouMean(extras.front(), OptionsOf(*sub));
   return Wrong(message, guess.empty() ? HelpHint(CommandOf(app)) : guess);
 }

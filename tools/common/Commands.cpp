@@ -19,6 +19,11 @@ constexpr Argument kWait = {
 constexpr Argument kRoot = {"--root", "DIR", "The installation in that directory; an image will do",
                             false,    false, kDirectories};
 
+// Why a command takes no --root.
+constexpr const char* kGivenFiles = "it reads the files that are given";
+constexpr const char* kOfMachine = "it shows this machine, not an installation";
+constexpr const char* kOfLibrary = "it shows what the library has in every installation";
+
 constexpr Argument kList[] = {
     {"--type", "TYPE", "Only dictionary, object-expert or resource-expert", false, false,
      "dictionary object-expert resource-expert"},
@@ -44,29 +49,37 @@ constexpr Argument kScan[] = {
 constexpr Argument kCheck[] = {
     {"--only-bad", nullptr, "Show the components that are not sound only"},
     {"--library", nullptr, "Add what the library's own check says, as notes"},
-    {"COMPONENT", nullptr, "Identifier or name of one component; all without"}};
+    {"COMPONENT", nullptr, "Identifier or name of one component; all without"},
+    kRoot};
 
 constexpr Argument kSettings[] = {
     {"--index", "N", "Number after the names of the items; 3 without it"},
     {"--client", nullptr, "What a client reads"},
     {"--server", nullptr, "What the server reads"},
-    {"--name", "NAME", "NAME.ini instead of kor.ini"}};
+    {"--name", "NAME", "NAME.ini instead of kor.ini"},
+    kRoot};
 constexpr Argument kSettingsSet[] = {
     {"--name", "NAME", "NAME.ini instead of kor.ini"},
     {"KEY", nullptr, "Name of the setting, with its index if it has one", true},
-    {"VALUE", nullptr, "What it is to be", true}};
+    {"VALUE", nullptr, "What it is to be", true},
+    kRoot};
 constexpr Argument kVerify[] = {
     {"--all", nullptr, "The database, the jar and the settings; so it is without files too"},
-    {"FILE", nullptr, "An INI file", false, true, kFiles}};
+    {"FILE", nullptr, "An INI file", false, true, kFiles},
+    kRoot};
 constexpr Argument kRepair[] = {
     {"--all", nullptr, "The database, the jar and the settings; so it is without files too"},
     {"--dry-run", nullptr, "Say what would be done; exit code 1 if it is anything"},
-    {"FILE", nullptr, "An INI file", false, true, kFiles}};
+    {"FILE", nullptr, "An INI file", false, true, kFiles},
+    kRoot};
+
+constexpr Argument kOnlyRoot[] = {kRoot};
 
 constexpr Argument kHookArm[] = {
     {"POINT", nullptr, "Name of a point, as \"hook list\" shows it", true},
     {"FLAG", nullptr, "hang[=MS], crash, fail, throw, exhaust", true, true,
-     "hang crash fail throw exhaust"}};
+     "hang crash fail throw exhaust"},
+    kRoot};
 
 constexpr Argument kError[] = {
     {"CODE", nullptr, "A code (0x80040326, -2147220698) or a name (E_FAIL); all without"}};
@@ -96,29 +109,37 @@ constexpr Command kCommands[] = {
     {kComponents, "why", "Why a component is not registered, and what to do; 1 if it is not", kWhy},
     {kComponents, "check", "Whether the components' files load and offer their entry points",
      kCheck},
-    {kAuthors, "lint", "What is wrong with registration files, by file and line", kLint},
-    {kAuthors, "new", "Skeleton of a component that builds, registers and checks sound", kNew},
+    {kAuthors, "lint", "What is wrong with registration files, by file and line", kLint,
+     kGivenFiles},
+    {kAuthors, "new", "Skeleton of a component that builds, registers and checks sound", kNew,
+     "it makes sources in the directory that is given"},
     {kRendezvous, "settings", "Settings in force, where they come from, and what is ignored",
      kSettings},
     {kRendezvous, "settings set", "Changes a setting, under the file's lock", kSettingsSet},
-    {kRendezvous, "jar", "What server and clients have left each other", {}},
-    {kRendezvous, "url", "Where a local server of this installation listens", {}},
-    {kRendezvous, "identity", "Identity of this machine's server; made if there is none", {}},
+    {kRendezvous, "jar", "What server and clients have left each other", kOnlyRoot},
+    {kRendezvous, "url", "Where a local server of this installation listens", kOnlyRoot},
+    {kRendezvous, "identity", "Identity of this machine's server; made if there is none",
+     kOnlyRoot},
     {kRendezvous, "verify", "Guarded INI files and their sidecars, and what the next opening does",
      kVerify},
     {kRendezvous, "repair",
      "Makes guarded INI files such that the next opening takes them; keeps a copy of each",
      kRepair},
-    {kDiagnostics, "doctor", "What is good, doubtful and bad here, and what to do", {}},
-    {kDiagnostics, "paths", "Every place in use, and what decides it", {}},
-    {kDiagnostics, "error", "Name and meaning of a result or exception code", kError},
-    {kDiagnostics, "locks", "Named locks and events, their holders and age", kLocks},
-    {kDiagnostics, "trace", "Where the log of this user goes, its options and last lines", {}},
-    {kDiagnostics, "events", "Named events of the machine and who holds them", {}},
-    {kDiagnostics, "hook list", "Points of fault injection", {}},
+    {kDiagnostics, "doctor", "What is good, doubtful and bad here, and what to do", kOnlyRoot},
+    {kDiagnostics, "paths", "Every place in use, and what decides it", kOnlyRoot},
+    {kDiagnostics, "error", "Name and meaning of a result or exception code", kError, kOfLibrary},
+    {kDiagnostics, "locks", "Named locks and events, their holders and age", kLocks, kOfMachine},
+    {kDiagnostics,
+     "trace",
+     "Where the log of this user goes, its options and last lines",
+     {},
+     kOfMachine},
+    {kDiagnostics, "events", "Named events of the machine and who holds them", {}, kOfMachine},
+    {kDiagnostics, "hook list", "Points of fault injection", {}, kOfLibrary},
     {kDiagnostics, "hook arm", "Arms one point for processes that refresh their hooks", kHookArm},
-    {kDiagnostics, "hook clear", "Disarms", {}},
-    {kTool, "completion", "Completion of this command for a shell", kCompletion},
+    {kDiagnostics, "hook clear", "Disarms", kOnlyRoot},
+    {kTool, "completion", "Completion of this command for a shell", kCompletion,
+     "it prints a script that is the same everywhere"},
 };
 
 }  // namespace

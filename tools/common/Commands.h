@@ -9,7 +9,8 @@
 // man/vltctl.1 and the completion of shells (Help.h) are made from it.
 //
 // To add a command:
-// 1. a row in Commands.cpp, with an array of its arguments; --json and --help are added to each;
+// 1. a row in Commands.cpp, with an array of its arguments, kRoot among them, or with the reason why
+//    it takes none; --json and --help are added to each;
 // 2. a function `int(const Arguments&, Output&)` in a source of its own, declared in
 //    tools/vltctl/Reading.h and named in the table of handlers in tools/vltctl/main.cpp. A command
 //    without a handler there is done by vltctl-client, which has a table of its own;
@@ -49,6 +50,7 @@ struct Command {
   const char* name;  // of two words for a command below another one: "hook arm"
   const char* summary;
   std::span<const Argument> arguments;
+  const char* whyNoRoot = nullptr;  // for a command without --root: why that makes no sense
 };
 
 // In the order of the help.

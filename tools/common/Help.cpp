@@ -246,7 +246,7 @@ std::string Bash() {
     out += "    '" + std::string(command.name) + "') words=\"" + offers.words +
            (below.empty() ? "" : " " + below) + "\"";
     if (offers.files) out += " kind=-f";
-    if (offers.directories) out += " kind=-d";
+    if (offers.directories && !offers.files) out += " kind=-d";
     out += " ;;\n";
   }
   return out +

@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
+
 #include <set>
 
 #include "tests/support/Child.h"
@@ -74,6 +76,14 @@ std::string Completed(const std::vector<std::string>& words) {
   EXPECT_EQ(result.exitCode, 0) << result.err;
   EXPECT_EQ(result.err, "");
   return result.out;
+}
+
+TEST(Help, EachCommandTakesARootOrSaysWhyNot) {
+  for (const Command& command : Commands()) {
+    bool takesRoot = std::any_of(command.arguments.begin(), command.arguments.end(),
+                                 [](const Argument& a) { return a.name == std::string("--root"); });
+    EXPECT_NE(takesRoot, command.whyNoRoot != nullptr) << command.name;
+  }
 }
 
 TEST(Help, BashCompletesCommandsOptionsAndWords) {

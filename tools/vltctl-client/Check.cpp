@@ -57,19 +57,12 @@ void DieWith(pid_t parent) {
   if (getppid() != parent) _exit(1);
 }
 
-Verdict Refused(const std::string& why) {
-  Verdict out;
-  out.code = "refused";
-  out.messages.push_back(why);
-  return out;
-}
-
 void CheckInside(const Component& component, const CheckOptions& options, pid_t parent, int* fd) {
   Send(*fd, kBegin, "");
   // A change of user makes the kernel forget whom this process dies with.
   std::string refusal = PrepareToLoad(component, fd);
   DieWith(parent);
-  Verdict verdict = refusal.empty() ? CheckLibrary(component) : Refused(refusal);
+  Verdict verdict = refusal.empty() ? CheckLibrary(component) : Bad("refused", refusal);
   if (refusal.empty() && options.asksLibrary) AddLibrarysWords(component, &verdict);
   if (!verdict.code.empty()) Send(*fd, kCode, verdict.code);
   if (!verdict.library.empty()) Send(*fd, kLibrary, verdict.library);

@@ -83,13 +83,6 @@ void Explain(const std::string& file, const std::string& words, Verdict* out) {
   }
 }
 
-Verdict Bad(const char* code, const std::string& message) {
-  Verdict out;
-  out.code = code;
-  out.messages.push_back(message);
-  return out;
-}
-
 std::string BaseName(const std::string& path) { return path.substr(path.rfind('/') + 1); }
 
 // Names no extension, so that the loader tries others beside it.

@@ -3,20 +3,12 @@
 #include <sys/types.h>
 
 #include <string>
-#include <vector>
 
+#include "tools/common/Verdict.h"
 #include "tools/vltctl-client/Component.h"
 
 // What is to be seen of one component's library in the process that loads it.
 namespace vltctl {
-
-// What the check of one component finds.
-struct Verdict {
-  std::string code;                   // "missing-dependency"; empty if it is sound
-  std::string library;                // the file that was loaded, or refused to load
-  std::vector<std::string> messages;  // what is wrong, in one sentence each
-  std::vector<std::string> notes;     // the loader's own words, and what the library's check says
-};
 
 // Loads the component's library as a client of it would, looks for its entry point, and unloads it.
 // Whatever the library does to its process, it does to this one. A relative path is never loaded: it

@@ -136,27 +136,6 @@ std::vector<Component> Chosen(const std::vector<Component>& all, const std::stri
                             guess.empty() ? "\"vltctl list\" shows all" : guess});
 }
 
-void Show(const Component& component, const vltctl::Verdict& verdict, Output& output) {
-  Json item = ToJson(component);
-  item["sound"] = verdict.code.empty();
-  item["code"] = verdict.code.empty() ? Json() : Json(verdict.code);
-  item["library"] = verdict.library.empty() ? Json() : Json(verdict.library);
-  item["messages"] = verdict.messages;
-  item["notes"] = verdict.notes;
-  output.item(item);
-  output.line(component.type + " " + component.name + ": " +
-              (verdict.code.empty() ? "sound" : "NOT SOUND"));
-  for (const std::string& text : verdict.messages) output.line("  " + text);
-  for (const std::string& text : verdict.notes) output.line("    " + text);
-  output.flush();
-}
-
-std::string Summary(size_t all, size_t bad) {
-  std::string text = std::to_string(all) + (all == 1 ? " component: " : " components: ");
-  if (bad == 0) return text + (all == 1 ? "sound" : "all sound");
-  return text + std::to_string(bad) + " not sound";
-}
-
 int Check(const Arguments& arguments, Output& output) {
   vltctl::CheckOptions options{arguments.has("--library")};
   std::optional<Client> client;  // kept, so that the children have it
@@ -167,9 +146,9 @@ int Check(const Arguments& arguments, Output& output) {
   size_t bad = 0;
   vltctl::CheckComponents(components, options, [&](const Component& c, const vltctl::Verdict& v) {
     if (!v.code.empty()) ++bad;
-    if (!v.code.empty() || !arguments.has("--only-bad")) Show(c, v, output);
+    if (!v.code.empty() || !arguments.has("--only-bad")) vltctl::Show(ToJson(c), v, output);
   });
-  output.line(Summary(components.size(), bad));
+  output.line(vltctl::Summary(components.size(), bad));
   return bad == 0 ? kGood : kNotFound;
 }
 

@@ -11,7 +11,9 @@
 #include "source/IniFileLock.h"
 #include "tools/common/LockHolder.h"
 #include "tools/vltctl/GuardedFiles.h"
+#include "tools/vltctl/Library.h"
 #include "tools/vltctl/Reading.h"
+#include "tools/vltctl/Root.h"
 #include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/osdep/Mutex.h"
 
@@ -34,11 +36,10 @@ void WithFailures(const std::function<void()>& step) {
   }
 }
 
-Snapshot ReadSnapshot(const Arguments& arguments) {
+Snapshot ReadSnapshot() {
   Snapshot snapshot;
   WithFailures([&] {
-    std::string root = arguments.text("--root");
-    snapshot = root.empty() ? vlt::snapshot::Read() : vlt::snapshot::Read(root);
+    snapshot = HasChosenRoot() ? vlt::snapshot::Read(InstallDirectory()) : vlt::snapshot::Read();
   });
   return snapshot;
 }
@@ -81,8 +82,8 @@ std::string Plural(unsigned count, const std::string& what) {
 
 }  // namespace
 
-Snapshot ReadComponents(const Arguments& arguments, Output& output) {
-  Snapshot snapshot = ReadSnapshot(arguments);
+Snapshot ReadComponents(Output& output) {
+  Snapshot snapshot = ReadSnapshot();
   CheckDatabase(snapshot.database);
   NoteProblems(snapshot.problems, output);
   if (snapshot.database.state == DatabaseState::DigestDiffers) {
@@ -183,17 +184,20 @@ std::string TypeWord(Type type) {
   return word;
 }
 
-std::string LibraryOf(const Component& c) {
+std::string FileOf(const Snapshot& snapshot, const Component& component) {
+  const std::string file = component.file.value_or("");
+  bool isInside = file.starts_with(snapshot.recordedRoot);
+  return isInside ? snapshot.root + file.substr(snapshot.recordedRoot.size()) : file;
+}
+
+bool IsHere(const std::string& file) {
+  return !HasChosenRoot() || file.starts_with(InstallDirectory() + "/");
+}
+
+std::string LibraryOf(const std::string& file) {
   struct stat info;
-  if (!c.file || stat(c.file->c_str(), &info) != 0) return "";
-  if (!S_ISDIR(info.st_mode)) return *c.file;
-  std::string stem = c.file->substr(c.file->rfind('/') + 1);
-  stem = stem.substr(0, stem.rfind('.'));
-  for (const std::string& name : {"lib" + stem + ".so", stem + ".so", stem}) {
-    std::string path = *c.file + "/" + name;
-    if (stat(path.c_str(), &info) == 0 && S_ISREG(info.st_mode)) return path;
-  }
-  return "";
+  if (file.empty() || !IsHere(file) || stat(file.c_str(), &info) != 0) return "";
+  return S_ISDIR(info.st_mode) ? LibraryIn(file) : file;
 }
 
 const char* WordOf(vlt::snapshot::FileState state) {
@@ -214,7 +218,7 @@ const char* WordOf(vlt::snapshot::FileState state) {
 
 void WaitForRegistrar(const Arguments& arguments) {
   using Clock = std::chrono::steady_clock;
-  if (!arguments.text("--root").empty()) {
+  if (HasChosenRoot()) {
     throw Failure(vltctl::kUsage, {"usage", "", "--live goes without --root",
                                    "a registrar is that of the installation in force", ""});
   }

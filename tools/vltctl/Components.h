@@ -18,10 +18,10 @@ using vltctl::Arguments;
 using vltctl::Output;
 
 // Of the installation in force, or of --root. Throws vltctl::Failure.
-Snapshot ReadSnapshot(const Arguments& arguments);
+Snapshot ReadSnapshot();
 // The same, but a database that has no components to show is a failure, too. What the components do
 // not say is noted: a tree that has changed since, a digest that differs.
-Snapshot ReadComponents(const Arguments& arguments, Output& output);
+Snapshot ReadComponents(Output& output);
 
 // Runs a step of the reader; what it throws becomes a vltctl::Failure.
 void WithFailures(const std::function<void()>& step);
@@ -45,9 +45,16 @@ std::string TypeWord(vlt::snapshot::Type type);
 // "unchanged", "new", "changed", "vanished".
 const char* WordOf(vlt::snapshot::FileState state);
 
+// The component's file where it lies now: that of an image may be recorded elsewhere. Empty if it has
+// none.
+std::string FileOf(const Snapshot& snapshot, const Component& component);
+
+// Whether the path means a file of the installation's own machine: not one outside of an image.
+bool IsHere(const std::string& file);
+
 // The code of a component's bundle, as the library looks for it; empty if there is none. A file is
-// its own code.
-std::string LibraryOf(const Component& component);
+// its own code. One outside of an image is another machine's, and has none here.
+std::string LibraryOf(const std::string& file);
 
 // For --live: waits, for at most --wait seconds, until no other process has the registrar. Throws
 // vltctl::Failure with kBusy. A process that takes it right after that is waited for by the library.

@@ -13,8 +13,8 @@
 #include "tools/common/LockHolder.h"
 #include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Reading.h"
+#include "tools/vltctl/Root.h"
 #include "vlloader/source/InstallLayout.h"
-#include "vlloader/source/vlloader.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
 
@@ -52,7 +52,7 @@ void CheckDirectory(const std::string& name, const std::string& path, Signs* sig
 }
 
 void CheckInstallation(Signs* signs) {
-  const std::string root = vlLookUpInstallDirectory();
+  const std::string root = InstallDirectory();
   if (root.empty()) {
     signs->push_back({Level::Bad, "no-install-directory", "the preference \"Dir\" is empty",
                       PreferenceFile(), "set it to the install directory"});
@@ -84,9 +84,10 @@ void CheckGuardedFile(const std::string& file, Signs* signs) {
 }
 
 void CheckFiles(Signs* signs) {
-  if (vlLookUpInstallDirectory().empty()) return;
+  if (InstallDirectory().empty()) return;
   for (const std::string& file : GuardedFiles()) CheckGuardedFile(file, signs);
   const std::string database = InstalledFile(vlt::layout::kDatabase);
+  if (HasChosenRoot()) return;  // The machine's own locks are of other paths.
   auto holders = vltctl::LockTable().holders(LockFileOf(database));
   if (!holders.empty()) {
     signs->push_back(
@@ -95,7 +96,7 @@ void CheckFiles(Signs* signs) {
 }
 
 void CheckHooks(Signs* signs) {
-  if (vlLookUpInstallDirectory().empty()) return;
+  if (InstallDirectory().empty()) return;
   const std::string file = InstalledFile(vlt::layout::kHookFile);
   auto armed = Document(ReadGuarded(file).bytes).get("Hook", "Name");
   if (armed) {
@@ -106,7 +107,7 @@ void CheckHooks(Signs* signs) {
 
 void CheckSpace(Signs* signs) {
   constexpr unsigned kLeastPercent = 1;
-  const std::string root = vlLookUpInstallDirectory();
+  const std::string root = InstallDirectory();
   struct statvfs info;
   if (root.empty() || statvfs(root.c_str(), &info) != 0 || info.f_blocks == 0) return;
   bool isShort = info.f_bavail * 100 < info.f_blocks * kLeastPercent;
@@ -153,9 +154,9 @@ void CheckProcess(Signs* signs) {
 
 int Doctor(const Arguments&, Output& output) {
   Signs signs;
-  for (auto check :
-       {CheckInstallation, CheckFiles, CheckHooks, CheckSpace, CheckShared, CheckProcess}) {
-    check(&signs);
+  for (auto check : {CheckInstallation, CheckFiles, CheckHooks, CheckSpace}) check(&signs);
+  if (!HasChosenRoot()) {
+    for (auto check : {CheckShared, CheckProcess}) check(&signs);
   }
   vltctl::Table table;
   bool isBad = false;

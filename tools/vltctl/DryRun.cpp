@@ -3,6 +3,7 @@
 
 #include "tools/vltctl/Components.h"
 #include "tools/vltctl/Reading.h"
+#include "tools/vltctl/Root.h"
 
 namespace admin {
 namespace {
@@ -13,11 +14,11 @@ using vlt::snapshot::Start;
 using vltctl::Failure;
 using vltctl::Json;
 
-Start Rehearse(const Arguments& arguments) {
+Start Rehearse() {
   Start start;
   WithFailures([&] {
-    std::string root = arguments.text("--root");
-    start = root.empty() ? vlt::snapshot::RehearseStart() : vlt::snapshot::RehearseStart(root);
+    start = HasChosenRoot() ? vlt::snapshot::RehearseStart(InstallDirectory())
+                            : vlt::snapshot::RehearseStart();
   });
   return start;
 }
@@ -111,7 +112,7 @@ int Scan(const Arguments& arguments, Output& output) {
                   {"usage", "", "scan only knows --dry-run", "a registrar scans when it starts",
                    "\"vltctl list --live\" starts one"});
   }
-  Start start = Rehearse(arguments);
+  Start start = Rehearse();
   NoteProblems(start.problems, output);
   output.item(ItemOf(start));
   Print(start, output);

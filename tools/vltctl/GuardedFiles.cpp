@@ -12,8 +12,8 @@
 #include "source/IniFileLock.h"
 #include "tools/common/LockHolder.h"
 #include "tools/vltctl/Reading.h"
+#include "tools/vltctl/Root.h"
 #include "vlloader/source/InstallLayout.h"
-#include "vlloader/source/vlloader.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/SharedObjectName.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
@@ -147,7 +147,7 @@ void ExpectWritable(const std::string& directory) {
 }  // namespace
 
 void ExpectUsableDatabase() {
-  const std::string root = vlLookUpInstallDirectory();
+  const std::string root = InstallDirectory();
   if (root.empty()) {
     throw vltctl::Failure(vltctl::kDataUnusable,
                           {"no-install-directory", PreferenceFile(),

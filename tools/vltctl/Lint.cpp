@@ -11,6 +11,7 @@
 #include "source/Database/databaseText.h"
 #include "source/Database/recordText.h"
 #include "tools/common/IniLines.h"
+#include "tools/vltctl/Library.h"
 #include "tools/vltctl/Reading.h"
 #include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/vlloader.h"
@@ -345,22 +346,11 @@ void Linter::lintBindings(const IniLine& line, const std::string& identifier) {
 }
 
 void Linter::lintLibrary(const IniLine& line, const std::string& bundle, const char* entry) {
-  std::string base = fs::path(bundle).stem(), library;
-  for (const std::string& name : {"lib" + base + ".so", base + ".so", base}) {
-    std::error_code gone;
-    if (library.empty() && fs::is_regular_file(bundle + "/" + name, gone))
-      library = bundle + "/" + name;
-  }
+  const std::string library = LibraryIn(bundle), base = fs::path(bundle).stem();
   if (library.empty()) {
     error(line, "no-library",
           "the bundle has none of lib" + base + ".so, " + base + ".so and " + base, "build it");
-    return;
-  }
-  // The name is in the library's table of texts, or it is not exported.
-  const std::string bytes = ReadGuarded(library).bytes;
-  bool hasEntry = !entry || bytes.find(std::string("\0", 1) + entry + std::string("\0", 1)) !=
-                                std::string::npos;
-  if (!hasEntry) {
+  } else if (!MayExport(library, entry)) {
     error(line, "no-entry-point", library + " does not export \"" + entry + "\"");
   }
 }
@@ -385,8 +375,11 @@ void Linter::lintFile(const IniLine& head, const std::string& name, bool isDicti
         "FileName leads to " + file.string() + ", and the bundle is " + bundle.filename().string());
   }
   if (file.filename() != bundle.filename()) return;
-  const char* entry = isResource ? "vltCreateResourceExpert" : "vltCreateObjectExpert";
-  lintLibrary(*line, bundle, isDictionary ? nullptr : entry);
+  using vlt::snapshot::Type;
+  Type type = isDictionary ? Type::Dictionary
+              : isResource ? Type::ResourceExpert
+                           : Type::ObjectExpert;
+  lintLibrary(*line, bundle, EntryPointOf(type));
 }
 
 void Linter::lintComponent(const IniLine& head, const std::string& name) {

@@ -74,7 +74,7 @@ int List(const Arguments& arguments, Output& output) {
   std::string type = TypeOf(arguments), name = arguments.text("--name");
   std::string bindingClass =
       arguments.has("--class") ? GuidOf(arguments.text("--class")) : std::string();
-  Snapshot snapshot = ReadComponents(arguments, output);
+  Snapshot snapshot = ReadComponents(output);
   std::vector<const Component*> shown;
   for (const Component* c : InOrder(snapshot)) {
     if (!type.empty() && TypeWord(c->type) != type) continue;
@@ -92,7 +92,7 @@ int List(const Arguments& arguments, Output& output) {
 
 int Classes(const Arguments& arguments, Output& output) {
   std::string guid = GuidOf(arguments.text("GUID"));
-  Snapshot snapshot = ReadComponents(arguments, output);
+  Snapshot snapshot = ReadComponents(output);
   std::vector<const Component*> bound;
   for (Type type : {Type::ObjectExpert, Type::ResourceExpert}) {
     for (const std::string& component : snapshot.boundTo(type, guid)) {

@@ -8,6 +8,7 @@
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/vlIniMgr.h"
 #include "tools/vltctl/Reading.h"
+#include "tools/vltctl/Root.h"
 #include "vlloader/source/InstallLayout.h"
 #include "vlloader/source/Preference.h"
 #include "vlloader/source/vlloader.h"
@@ -40,11 +41,15 @@ std::string PreferenceFile() {
 std::vector<Place> Places() {
   std::string preference;
   bool isSet = vlReadPreference(kKorPreferenceDomain, "Dir", &preference).has_value();
-  const std::string root = vlLookUpInstallDirectory();
-  std::vector<Place> places = {
-      {"preference", preference,
-       isSet ? "the first that sets \"Dir\"" : "none of the places has \"Dir\""},
-      {"install directory", root, isSet ? preference : "built-in default"}};
+  const std::string root = InstallDirectory();
+  std::vector<Place> places;
+  if (HasChosenRoot()) {
+    places = {{"install directory", root, "--root"}};
+  } else {
+    places = {{"preference", preference,
+               isSet ? "the first that sets \"Dir\"" : "none of the places has \"Dir\""},
+              {"install directory", root, isSet ? preference : "built-in default"}};
+  }
   if (!root.empty()) {
     const std::string below = "below the install directory";
     const std::string database = InstalledFile(vlt::layout::kDatabase);
@@ -63,6 +68,7 @@ std::vector<Place> Places() {
       places.push_back(place);
     }
   }
+  if (HasChosenRoot()) return places;
   places.push_back({"log options", Narrow(vlDiagnosticsIni()), "the default install directory"});
   places.push_back({"log directory", Narrow(vlLogDirectory()),
                     geteuid() == 0 ? "the superuser's" : "below the user's home"});

@@ -10,8 +10,8 @@
 #include <algorithm>
 
 #include "source/vlIniMgr.h"
+#include "tools/vltctl/Root.h"
 #include "vlloader/source/InstallLayout.h"
-#include "vlloader/source/vlloader.h"
 #include "zt/posix/Files.h"
 
 using zt::posix::ScopedFd;
@@ -149,7 +149,7 @@ std::vector<std::pair<std::string, std::string>> Document::items(const std::stri
 }
 
 std::string InstalledFile(const wchar_t* name) {
-  std::string directory = vlLookUpInstallDirectory();
+  std::string directory = InstallDirectory();
   if (!directory.ends_with('/')) directory += '/';
   return directory + zt::fnd::AnsiString(name).c_str();
 }

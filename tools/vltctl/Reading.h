@@ -92,6 +92,7 @@ int Show(const Arguments& arguments, Output& output);
 int Classes(const Arguments& arguments, Output& output);
 int Scan(const Arguments& arguments, Output& output);
 int Why(const Arguments& arguments, Output& output);
+int CheckImage(const Arguments& arguments, Output& output);
 int Settings(const Arguments& arguments, Output& output);
 int SettingsSet(const Arguments& arguments, Output& output);
 int Url(const Arguments& arguments, Output& output);

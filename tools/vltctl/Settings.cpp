@@ -12,6 +12,7 @@
 #include "tools/common/IniLines.h"
 #include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Reading.h"
+#include "tools/vltctl/Root.h"
 #include "vlloader/source/InstallLayout.h"
 #include "zt/fnd/String.h"
 
@@ -354,21 +355,26 @@ std::string EndpointOf(const File& file, Effective* effective) {
   return "127.0.0.1:" + TextOf(effective->value);
 }
 
+// The library's look-up (source/Utilities/vltStorageUrl.cpp) reads the working directory's file, and
+// makes it if it is missing, which is not done here.
+std::string LibrarysUrl() {
+  File local = Read(Narrow(vlt::layout::kSettings));
+  Effective ignored;
+  return EndpointOf(local, &ignored);
+}
+
 }  // namespace
 
 int Url(const Arguments&, Output& output) {
   File file = Read(DataFile(Narrow(vlt::layout::kSettings)));
-  // The library's look-up (source/Utilities/vltStorageUrl.cpp) reads the working directory's file, and
-  // makes it if it is missing, which is not done here.
-  File local = Read(Narrow(vlt::layout::kSettings));
-  Effective server, library;
-  std::string url = EndpointOf(file, &server), byLibrary = EndpointOf(local, &library);
+  Effective server;
+  std::string url = EndpointOf(file, &server), byLibrary = HasChosenRoot() ? "" : LibrarysUrl();
   output.line(url);
   output.item({{"url", url},
                {"origin", server.origin},
                {"line", server.line ? Json(server.line->number) : Json()},
-               {"library", byLibrary}});
-  if (url != byLibrary) {
+               {"library", byLibrary.empty() ? Json() : Json(byLibrary)}});
+  if (!byLibrary.empty() && url != byLibrary) {
     output.note("vltGetLocalConfigurationURL answers " + byLibrary +
                 " in this directory: it reads kor.ini of the working directory, not " + file.path);
   }

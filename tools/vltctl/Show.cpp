@@ -48,7 +48,7 @@ void Print(const Snapshot& snapshot, const Component& c, Output& output) {
   add("name", c.name);
   add("guid", c.guid);
   add("file", c.file.value_or(""));
-  add("library", LibraryOf(c));
+  add("library", LibraryOf(FileOf(snapshot, c)));
   if (c.type == Type::Dictionary) {
     add("schema version", std::to_string(c.schemaVersion));
     add("changed since reset", c.fragmentRegistered ? "yes" : "no");
@@ -72,7 +72,7 @@ Json ItemOf(const Snapshot& snapshot, const Component& c) {
   Json item = ToJson(c);
   item["stamp"] = state ? orNull(TimeOf(c.registrationFile)) : Json();
   item["registrationState"] = state ? Json(state) : Json();
-  item["library"] = orNull(LibraryOf(c));
+  item["library"] = orNull(LibraryOf(FileOf(snapshot, c)));
   item["previousVersion"] = orNull(PreviousOf(snapshot, c));
   return item;
 }
@@ -87,7 +87,7 @@ int IsAtLeast(const Component& c, unsigned version) {
 
 int Show(const Arguments& arguments, Output& output) {
   unsigned version = arguments.number("--at-least", 0);
-  Snapshot snapshot = ReadComponents(arguments, output);
+  Snapshot snapshot = ReadComponents(output);
   std::string text = arguments.text("COMPONENT");
   if (arguments.has("--exists")) {
     return Matches(snapshot, text).empty() ? vltctl::kNotFound : vltctl::kGood;

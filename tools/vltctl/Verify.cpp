@@ -13,6 +13,7 @@
 #include "source/Common/vltFileSecurity.h"
 #include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Reading.h"
+#include "tools/vltctl/Root.h"
 #include "zt/posix/Files.h"
 
 namespace admin {
@@ -33,6 +34,10 @@ ExitCode CodeOf(const GuardedIniState& state) {
 
 std::vector<std::string> FilesOf(const Arguments& arguments) {
   std::vector<std::string> files = arguments.list("FILE");
+  if (!files.empty() && HasChosenRoot()) {
+    throw vltctl::Failure(vltctl::kUsage, {"usage", "", "--root goes without files",
+                                           "it is for those of the installation", ""});
+  }
   if (!files.empty() && !arguments.has("--all")) return files;
   if (files.empty()) {
     // Those of the installation that are there: a setting or a jar that nothing has made yet is missing

@@ -1,7 +1,4 @@
 // why: one verdict on a component, and what to do about it.
-#include <elf.h>
-#include <errno.h>
-#include <fcntl.h>
 #include <stdio.h>
 #include <string.h>
 #include <sys/stat.h>
@@ -21,9 +18,10 @@
 #include "tools/vltctl/Claims.h"
 #include "tools/vltctl/Components.h"
 #include "tools/vltctl/GuardedFiles.h"
+#include "tools/vltctl/Library.h"
 #include "tools/vltctl/Reading.h"
+#include "tools/vltctl/Root.h"
 #include "vlloader/source/InstallLayout.h"
-#include "zt/posix/Files.h"
 
 namespace admin {
 namespace {
@@ -37,18 +35,6 @@ constexpr const char* kNullGuid = "{00000000-0000-0000-0000-000000000000}";
 struct Verdict {
   std::string code, component, where, what, next;
 };
-
-// The library of a bundle was built for another machine than this program was.
-bool IsForeign(const std::string& library) {
-  zt::posix::ScopedFd self = zt::posix::OpenExisting("/proc/self/exe", O_RDONLY);
-  zt::posix::ScopedFd other = zt::posix::OpenExisting(library.c_str(), O_RDONLY);
-  unsigned char mine[20], its[20];  // up to e_machine
-  if (!self || !other || read(self.get(), mine, sizeof mine) != sizeof mine ||
-      read(other.get(), its, sizeof its) != sizeof its || memcmp(its, ELFMAG, SELFMAG) != 0) {
-    return false;
-  }
-  return its[EI_CLASS] != mine[EI_CLASS] || memcmp(its + 18, mine + 18, 2) != 0;
-}
 
 double SecondsOf(const timespec& time) {
   return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_nsec) / 1e9;
@@ -267,9 +253,10 @@ class Judge {
   }
 
   Verdict ofComponent(const Component& c) const {
-    const std::string file = c.file.value_or("");
+    const std::string file = FileOf(m_snapshot, c);
     bool isOwn = c.name == registrar::kBuiltInDictionary;
-    if (!isOwn && c.registrationFile.empty() && !IsThere(file)) {
+    bool isGone = IsHere(file) && !IsThere(file);
+    if (!isOwn && c.registrationFile.empty() && isGone) {
       return {"ghost", c.name, file,
               "is gone; the component came by a call, and no start removes it",
               "end all programs that use the registrar, and remove [" + c.name +
@@ -279,8 +266,8 @@ class Judge {
       return {"guid-null", c.name, c.registrationFile, "its Identifier is missing, null or no GUID",
               "give it an Identifier of its own"};
     }
-    std::string library = LibraryOf(c);
-    if (!library.empty() && IsForeign(library)) {
+    std::string library = LibraryOf(file);
+    if (!HasChosenRoot() && !library.empty() && IsForeign(library)) {
       return {"other-architecture", c.name, library, "was built for another kind of machine",
               "install the bundle for this one"};
     }
@@ -337,12 +324,12 @@ Json OrNull(const std::string& text) { return text.empty() ? Json() : Json(text)
 }  // namespace
 
 int Why(const Arguments& arguments, Output& output) {
-  std::string root = arguments.text("--root");
-  Snapshot snapshot = ReadSnapshot(arguments);
+  Snapshot snapshot = ReadSnapshot();
   Verdict verdict;
   WithFailures([&] {
     vlt::snapshot::WithStandardErrors([&] {
-      Opened opened = root.empty() ? vlt::snapshot::OpenInForce() : vlt::snapshot::OpenAt(root);
+      Opened opened = HasChosenRoot() ? vlt::snapshot::OpenAt(InstallDirectory())
+                                      : vlt::snapshot::OpenInForce();
       verdict = Judge(opened, snapshot, arguments.text("COMPONENT")).verdict();
       return 0;
     });

@@ -11,6 +11,7 @@
 #include "tools/vltctl/Components.h"
 #include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Reading.h"
+#include "tools/vltctl/Root.h"
 
 namespace admin {
 namespace {
@@ -42,7 +43,7 @@ int Completion(const Arguments& arguments, Output& output) {
 }
 
 // It lies beside this program, or, once installed, among those that only other programs start.
-int BecomeClient(char** argv, Output& output) {
+int BecomeClient(char** argv, Output&) {
   ExpectUsableDatabase();
   fs::path here = OwnPath().parent_path();
   for (const char* place : {"vltctl-client", "../libexec/vltutils/vltctl-client"}) {
@@ -69,32 +70,46 @@ int OrLive(const vltctl::Arguments& arguments, vltctl::Output& output) {
   return admin::BecomeClient(s_argv, output);
 }
 
+// The client loads libraries, which those of an image are not for.
+int Check(const vltctl::Arguments& arguments, vltctl::Output& output) {
+  if (admin::HasChosenRoot()) return admin::CheckImage(arguments, output);
+  return admin::BecomeClient(s_argv, output);
+}
+
+// The command on the installation in force, or on that of --root.
+template <int (*command)(const vltctl::Arguments&, vltctl::Output&)>
+int At(const vltctl::Arguments& arguments, vltctl::Output& output) {
+  admin::ChooseRoot(arguments);
+  return command(arguments, output);
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
   s_argv = argv;
   const vltctl::Handler handlers[] = {
-      {"list", OrLive<admin::List>},
-      {"show", OrLive<admin::Show>},
-      {"classes", OrLive<admin::Classes>},
-      {"scan", admin::Scan},
-      {"why", admin::Why},
-      {"settings", admin::Settings},
-      {"settings set", admin::SettingsSet},
-      {"url", admin::Url},
-      {"identity", admin::Identity},
-      {"jar", admin::Jar},
-      {"verify", admin::Verify},
-      {"repair", admin::Repair},
+      {"list", At<OrLive<admin::List>>},
+      {"show", At<OrLive<admin::Show>>},
+      {"classes", At<OrLive<admin::Classes>>},
+      {"scan", At<admin::Scan>},
+      {"why", At<admin::Why>},
+      {"check", At<Check>},
+      {"settings", At<admin::Settings>},
+      {"settings set", At<admin::SettingsSet>},
+      {"url", At<admin::Url>},
+      {"identity", At<admin::Identity>},
+      {"jar", At<admin::Jar>},
+      {"verify", At<admin::Verify>},
+      {"repair", At<admin::Repair>},
       {"trace", admin::Trace},
       {"events", admin::Events},
       {"hook list", admin::HookList},
-      {"hook arm", admin::HookArm},
-      {"hook clear", admin::HookClear},
+      {"hook arm", At<admin::HookArm>},
+      {"hook clear", At<admin::HookClear>},
       {"error", admin::Error},
-      {"paths", admin::Paths},
+      {"paths", At<admin::Paths>},
       {"locks", admin::Locks},
-      {"doctor", admin::Doctor},
+      {"doctor", At<admin::Doctor>},
       {"lint", admin::Lint},
       {"new", admin::New},
       {"completion", admin::Completion},
