@@ -3,9 +3,8 @@
 #include <map>
 #include <string>
 #include <tuple>
+#include <unordered_map>
 #include <vector>
-
-#include "zt/fnd/osdep/StringCompare.h"
 
 struct IniStructForwardReferenceTag;
 
@@ -55,30 +54,24 @@ class ResourceTexts {
  private:
   bool fileNameOf(const char* section, std::string* base);
   bool appendFrom(Query& query, const char* section);
-  void search(Query& query);
-  const char* indexNext(std::string* base);
+  void search(Query& query, const std::string& folded);
+  const char* indexNext(std::string* folded);
   bool reports() const { return m_observer && m_observer->wantsAll(); }
-
-  struct NameLess {
-    bool operator()(const std::string& a, const std::string& b) const {
-      return zt::fnd::osdep::StringCaseCompare(a.c_str(), b.c_str()) < 0;
-    }
-  };
 
   IniStructForwardReferenceTag* const m_document;
   ResourceObserver* const m_observer;
   int m_indexed = 0;  // items of the list that are in m_sectionsOf
-  // Base name of a component's file to the sections that have it, in the order of the list.
-  std::map<std::string, std::vector<std::string>, NameLess> m_sectionsOf;
+  // Folded base name of a component's file to the sections that have it, in the order of the list.
+  std::unordered_map<std::string, std::vector<std::string>> m_sectionsOf;
 
-  // Answers given, by all of a question but the file: the components of one file all ask the same,
+  // Answers given, by the file's folded base name below all else of a question: the components of one file all ask the same,
   // and each answer looks at all of them.
   struct Answer {
     bool found;
     std::string text;
   };
   using Kind = std::tuple<bool, std::string, std::string, unsigned>;
-  std::map<Kind, std::map<std::string, Answer, NameLess>> m_answers;
+  std::map<Kind, std::unordered_map<std::string, Answer>> m_answers;
 };
 
 }  // namespace registrar
