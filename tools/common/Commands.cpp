@@ -46,6 +46,10 @@ constexpr Argument kWhy[] = {
     {"COMPONENT", nullptr, "Name, GUID or path of a bundle or registration file", true}, kRoot};
 constexpr Argument kScan[] = {
     {"--dry-run", nullptr, "Required: only report it; a registrar scans when it starts"}, kRoot};
+constexpr Argument kWatch[] = {
+    {"--count", "N", "End after N changes"},
+    {"--for", "SECONDS", "End then; with --count and fewer changes the exit code is 1"},
+    kRoot};
 constexpr Argument kCheck[] = {
     {"--only-bad", nullptr, "Show the components that are not sound only"},
     {"--library", nullptr, "Add what the library's own check says, as notes"},
@@ -107,6 +111,9 @@ constexpr Command kCommands[] = {
     {kComponents, "classes", "The experts that bind to a class of objects", kClasses},
     {kComponents, "scan", "What the next start of a registrar would merge, remove and save", kScan},
     {kComponents, "why", "Why a component is not registered, and what to do; 1 if it is not", kWhy},
+    {kComponents, "watch",
+     "What changes in the components, settings and database, line by line; ends with SIGINT",
+     kWatch},
     {kComponents, "check", "Whether the components' files load and offer their entry points",
      kCheck},
     {kAuthors, "lint", "What is wrong with registration files, by file and line", kLint,

@@ -44,6 +44,15 @@ Snapshot ReadSnapshot() {
   return snapshot;
 }
 
+vlt::snapshot::Start Rehearse() {
+  vlt::snapshot::Start start;
+  WithFailures([&] {
+    start = HasChosenRoot() ? vlt::snapshot::RehearseStart(InstallDirectory())
+                            : vlt::snapshot::RehearseStart();
+  });
+  return start;
+}
+
 void NoteProblems(const std::vector<vlt::snapshot::Problem>& problems, Output& output) {
   for (const auto& problem : problems) {
     output.problem({"unreadable-directory", problem.path, "cannot be read", strerror(problem.error),

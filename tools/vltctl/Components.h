@@ -23,6 +23,9 @@ Snapshot ReadSnapshot();
 // not say is noted: a tree that has changed since, a digest that differs.
 Snapshot ReadComponents(Output& output);
 
+// What the next start of a registrar would do there. Throws vltctl::Failure.
+vlt::snapshot::Start Rehearse();
+
 // Runs a step of the reader; what it throws becomes a vltctl::Failure.
 void WithFailures(const std::function<void()>& step);
 

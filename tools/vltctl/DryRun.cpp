@@ -3,7 +3,6 @@
 
 #include "tools/vltctl/Components.h"
 #include "tools/vltctl/Reading.h"
-#include "tools/vltctl/Root.h"
 
 namespace admin {
 namespace {
@@ -13,15 +12,6 @@ using vlt::snapshot::RegistrationFile;
 using vlt::snapshot::Start;
 using vltctl::Failure;
 using vltctl::Json;
-
-Start Rehearse() {
-  Start start;
-  WithFailures([&] {
-    start = HasChosenRoot() ? vlt::snapshot::RehearseStart(InstallDirectory())
-                            : vlt::snapshot::RehearseStart();
-  });
-  return start;
-}
 
 std::string Quoted(const std::optional<std::string>& text) {
   return text ? "\"" + *text + "\"" : "nothing";

@@ -148,12 +148,7 @@ void ExpectWritable(const std::string& directory) {
 
 void ExpectUsableDatabase() {
   const std::string root = InstallDirectory();
-  if (root.empty()) {
-    throw vltctl::Failure(vltctl::kDataUnusable,
-                          {"no-install-directory", PreferenceFile(),
-                           "the preference \"Dir\" is empty, so there is no installation", "",
-                           "set it to the install directory, or remove it for the default"});
-  }
+  if (root.empty()) throw NoInstallDirectory();
   ExpectDirectory(root);
   ExpectDirectory(InstalledFile(vlt::layout::kData));
   const std::string database = InstalledFile(vlt::layout::kDatabase);

@@ -5,6 +5,7 @@
 #include <stdio.h>
 #include <string.h>
 #include <sys/stat.h>
+#include <time.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -158,6 +159,13 @@ std::string DataFile(const std::string& name) {
   return InstalledFile(vlt::layout::kData) + "/" + name;
 }
 
+std::string UtcText(time_t time) {
+  struct tm utc;
+  char text[32];
+  strftime(text, sizeof text, "%Y-%m-%dT%H:%M:%SZ", gmtime_r(&time, &utc));
+  return text;
+}
+
 void Print(const std::vector<Row>& rows, vltctl::Output& output) {
   vltctl::Table table;
   for (const Row& row : rows) {
@@ -167,6 +175,13 @@ void Print(const std::vector<Row>& rows, vltctl::Output& output) {
                  {"origin", row.origin.empty() ? vltctl::Json() : vltctl::Json(row.origin)}});
   }
   output.print(table);
+}
+
+vltctl::Failure NoInstallDirectory() {
+  return {vltctl::kDataUnusable,
+          {"no-install-directory", PreferenceFile(),
+           "the preference \"Dir\" is empty, so there is no installation", "",
+           "set it to the install directory, or remove it for the default"}};
 }
 
 vltctl::Failure Unusable(const std::string& file, const std::string& why) {

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <sys/types.h>
+
 #include <functional>
 #include <optional>
 #include <string>
@@ -80,6 +82,12 @@ struct Row {
 // Prints them as a table, and as items {"name", "value", "origin"}.
 void Print(const std::vector<Row>& rows, vltctl::Output& output);
 
+// "2026-01-31T23:59:59Z".
+std::string UtcText(time_t time);
+
+// The preference "Dir" is empty.
+vltctl::Failure NoInstallDirectory();
+
 // The file cannot be used, for the reason that reading it gave.
 vltctl::Failure Unusable(const std::string& file, const std::string& why);
 
@@ -92,6 +100,7 @@ int Show(const Arguments& arguments, Output& output);
 int Classes(const Arguments& arguments, Output& output);
 int Scan(const Arguments& arguments, Output& output);
 int Why(const Arguments& arguments, Output& output);
+int Watch(const Arguments& arguments, Output& output);
 int CheckImage(const Arguments& arguments, Output& output);
 int Settings(const Arguments& arguments, Output& output);
 int SettingsSet(const Arguments& arguments, Output& output);

@@ -32,12 +32,15 @@ void Follow(const fs::path& link, const fs::path& directory) {
        "the machine of the image has another file there", "put a copy of that file in its place"});
 }
 
-void ExpectNoWayOut(const std::string& root) {
+}  // namespace
+
+void ExpectNoWayOut() {
+  if (!HasChosenRoot()) return;
   std::error_code hidden;
-  const fs::path directory = fs::canonical(root, hidden);
+  const fs::path directory = fs::canonical(s_chosen, hidden);
   // Links to directories are not entered.
   for (fs::recursive_directory_iterator
-           entry(root, fs::directory_options::skip_permission_denied, hidden),
+           entry(s_chosen, fs::directory_options::skip_permission_denied, hidden),
        end;
        !hidden && entry != end; entry.increment(hidden)) {
     std::error_code gone;
@@ -45,13 +48,12 @@ void ExpectNoWayOut(const std::string& root) {
   }
 }
 
-}  // namespace
-
-void ChooseRoot(const vltctl::Arguments& arguments) {
+void ChooseRoot(const vltctl::Arguments& arguments, MissingRoot missing) {
   if (!arguments.has("--root")) return;
   const std::string given = arguments.text("--root");
   std::error_code error;
-  if (!fs::is_directory(given, error)) {
+  bool isThere = fs::is_directory(given, error);
+  if (!isThere && missing == MissingRoot::Failure) {
     throw vltctl::Failure(
         vltctl::kDataUnusable,
         {"no-directory", given, "is no directory", error ? strerror(error.value()) : "",
@@ -59,7 +61,7 @@ void ChooseRoot(const vltctl::Arguments& arguments) {
   }
   s_chosen = fs::absolute(given).lexically_normal();
   while (s_chosen.size() > 1 && s_chosen.ends_with('/')) s_chosen.pop_back();
-  ExpectNoWayOut(s_chosen);
+  ExpectNoWayOut();
 }
 
 bool HasChosenRoot() { return !s_chosen.empty(); }

@@ -9,9 +9,14 @@
 namespace admin {
 
 // Takes --root for the installation of this process, if it was given. Comes before every other function
-// of this program. Throws a Failure: there is no such directory, or a link in it leads out of it, where
-// another machine has another file.
-void ChooseRoot(const vltctl::Arguments& arguments);
+// of this program. Throws a Failure: there is no such directory, unless it is awaited, or a link in it
+// leads out of it.
+enum class MissingRoot { Failure, Awaited };
+void ChooseRoot(const vltctl::Arguments& arguments, MissingRoot missing = MissingRoot::Failure);
+
+// Throws a Failure if --root was given and a link in it leads out of it by now: where it leads another
+// machine has another file.
+void ExpectNoWayOut();
 
 // Whether --root was given. Then nothing of this machine counts but the files, and nothing is made that
 // only a program in force makes.

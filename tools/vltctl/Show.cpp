@@ -1,6 +1,5 @@
 // show: one component of a snapshot, with all that belongs to it.
 #include <sys/stat.h>
-#include <time.h>
 
 #include "tools/vltctl/Components.h"
 #include "tools/vltctl/Reading.h"
@@ -33,10 +32,7 @@ const char* StateOf(const Snapshot& snapshot, const std::string& file) {
 std::string TimeOf(const std::string& file) {
   struct stat info;
   if (file.empty() || stat(file.c_str(), &info) != 0) return "";
-  struct tm utc;
-  char text[32];
-  strftime(text, sizeof text, "%Y-%m-%dT%H:%M:%SZ", gmtime_r(&info.st_mtime, &utc));
-  return text;
+  return UtcText(info.st_mtime);
 }
 
 void Print(const Snapshot& snapshot, const Component& c, Output& output) {

@@ -93,6 +93,7 @@ int main(int argc, char** argv) {
       {"classes", At<OrLive<admin::Classes>>},
       {"scan", At<admin::Scan>},
       {"why", At<admin::Why>},
+      {"watch", admin::Watch},
       {"check", At<Check>},
       {"settings", At<admin::Settings>},
       {"settings set", At<admin::SettingsSet>},
