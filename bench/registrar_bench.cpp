@@ -11,7 +11,7 @@
 #include <fstream>
 #include <string>
 
-#include "source/Posix/vltLinuxRegistrar.h"
+#include "bench/Installation.h"
 #include "source/Utilities/vltutils.h"
 #include "vlloader/source/vlloader.h"
 #include "ztcom/ztcore/ztcom.h"
@@ -19,7 +19,7 @@
 namespace {
 
 namespace fs = std::filesystem;
-using zt::fnd::String;
+using bench::Id;
 
 // The places of this run, made before anything of the library looks at them. The library reads the
 // install directory once a process, so all sizes share one root and fill it again.
@@ -43,42 +43,11 @@ Places& ThePlaces() {
   return places;
 }
 
-std::string Guid(unsigned n) {
-  char text[64];
-  snprintf(text, sizeof text, "%08X-1111-4222-8333-444444444444", n + 1);
-  return text;
-}
-
-// A bundle whose registration file brings `components` experts.
-void AddBundle(unsigned number, unsigned components) {
-  std::string name = "Expert" + std::to_string(number);
-  std::string directory = ThePlaces().root + "/Experts/" + name + ".vle/Resources";
-  fs::create_directories(directory);
-  std::ofstream file(directory + "/Info.vlr");
-  file << "[KORComponents]\n";
-  for (unsigned c = 0; c < components; ++c) {
-    file << name << " " << c << " = \"" << name << " " << c << "\"\n";
-  }
-  for (unsigned c = 0; c < components; ++c) {
-    file << "[" << name << " " << c << "]\nIdentifier = \"{" << Guid(number * components + c)
-         << "}\"\nFileName = \"" << name << "\"\n";
-  }
-}
-
 void Install(unsigned bundles, unsigned componentsEach = 1) {
-  fs::remove_all(ThePlaces().root);
-  fs::create_directories(ThePlaces().root + "/Data Dictionaries");
-  fs::create_directories(ThePlaces().root + "/Experts");
-  for (unsigned n = 0; n < bundles; ++n) AddBundle(n, componentsEach);
+  bench::Install(ThePlaces().root, bundles, componentsEach);
 }
 
-CztComPtr<IvltRegistrar> Start() {
-  CztComPtr<IvltRegistrar> registrar;
-  auto* created = new CvltLinuxRegistrar(String((ThePlaces().root + "/vlt.vlr").c_str()),
-                                         String(ThePlaces().root.c_str()));
-  created->QueryInterface(IID_IvltRegistrar, reinterpret_cast<void**>(registrar.out()));
-  return registrar;
-}
+CztComPtr<IvltRegistrar> Start() { return bench::Start(ThePlaces().root); }
 
 void FirstStart(benchmark::State& state) {
   Install(static_cast<unsigned>(state.range(0)));
@@ -113,10 +82,6 @@ void BareScan(benchmark::State& state) {
   }
 }
 BENCHMARK(BareScan)->Arg(10)->Arg(100)->Arg(1000)->Arg(3000)->Unit(benchmark::kMillisecond);
-
-GUID Id(unsigned n) {
-  return {n + 1, 0x1111, 0x4222, {0x83, 0x33, 0x44, 0x44, 0x44, 0x44, 0x44, 0x44}};
-}
 
 constexpr unsigned kComponentsEach = 100;
 

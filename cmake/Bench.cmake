@@ -16,3 +16,7 @@ if(PEERS_FOUND)
   target_link_libraries(peers PRIVATE vlt_strict vltexports PkgConfig::PEERS)
   add_dependencies(peers vltutils)
 endif()
+
+add_executable(growth EXCLUDE_FROM_ALL bench/growth/growth.cpp)
+target_link_libraries(growth PRIVATE vlt_strict vltexports)
+add_dependencies(growth vltctl)

@@ -12,11 +12,9 @@
 #include <string>
 #include <vector>
 
+#include "bench/Installation.h"
 #include "source/Cmd5vlt.h"
-#include "source/Posix/vltLinuxRegistrar.h"
-#include "zt/fnd/String.h"
 #include "zt/fnd/Utf8ToWide.h"
-#include "ztcom/ztcore/ztcom.h"
 #include "ztini/ztini.h"
 
 namespace {
@@ -57,29 +55,9 @@ Document Read(const std::string& path) {
   return doc;
 }
 
-void Install(const std::string& root) {
-  fs::create_directories(root + "/Data Dictionaries");
-  for (unsigned n = 0; n < kBundles; ++n) {
-    std::string name = "Expert" + std::to_string(n);
-    std::string directory = root + "/Experts/" + name + ".vle/Resources";
-    fs::create_directories(directory);
-    char guid[64];
-    snprintf(guid, sizeof guid, "{%08X-1111-4222-8333-444444444444}", n + 1);
-    std::ofstream(directory + "/Info.vlr")
-        << "[KORComponents]\n"
-        << name << " = \"" << name << "\"\n[" << name << "]\nIdentifier = \"" << guid
-        << "\"\nFileName = \"" << name << "\"\n";
-  }
-}
+void Install(const std::string& root) { bench::Install(root, kBundles); }
 
-void Start(const std::string& root) {
-  CztComPtr<IvltRegistrar> registrar;
-  auto* created = new CvltLinuxRegistrar(zt::fnd::String((root + "/vlt.vlr").c_str()),
-                                         zt::fnd::String(root.c_str()));
-  Require(
-      created->QueryInterface(IID_IvltRegistrar, reinterpret_cast<void**>(registrar.out())) == S_OK,
-      "a start");
-}
+void Start(const std::string& root) { bench::Start(root); }
 
 // A job that is ready to be counted.
 using Job = std::function<void()>;

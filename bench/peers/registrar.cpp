@@ -17,10 +17,10 @@
 #include <set>
 #include <vector>
 
+#include "bench/Installation.h"
 #include "bench/peers/Contest.h"
 #include "bench/peers/Parts.h"
 #include "source/Common/vltcmn.h"
-#include "source/Posix/vltLinuxRegistrar.h"
 #include "zt/fnd/Guid.h"
 #include "ztcom/ztcore/ztcom.h"
 
@@ -31,37 +31,9 @@ namespace fs = std::filesystem;
 
 std::string Root() { return Place() + "/KOR"; }
 
-std::string GuidText(unsigned n) {
-  char text[64];
-  snprintf(text, sizeof text, "%08X-1111-4222-8333-444444444444", n + 1);
-  return text;
-}
+void Install(unsigned bundles) { bench::Install(Root(), bundles); }
 
-std::string RegistrationText(unsigned n) {
-  std::string name = "Expert" + std::to_string(n);
-  return "[KORComponents]\n" + name + " = \"" + name + "\"\n[" + name + "]\nIdentifier = \"{" +
-         GuidText(n) + "}\"\nFileName = \"" + name + "\"\n";
-}
-
-void Install(unsigned bundles) {
-  fs::remove_all(Root());
-  fs::create_directories(Root() + "/Data Dictionaries");
-  for (unsigned n = 0; n < bundles; ++n) {
-    std::string directory = Root() + "/Experts/Expert" + std::to_string(n) + ".vle/Resources";
-    fs::create_directories(directory);
-    std::ofstream(directory + "/Info.vlr") << RegistrationText(n);
-  }
-}
-
-CztComPtr<IvltRegistrar> Start() {
-  CztComPtr<IvltRegistrar> registrar;
-  auto* created = new CvltLinuxRegistrar(zt::fnd::String((Root() + "/vlt.vlr").c_str()),
-                                         zt::fnd::String(Root().c_str()));
-  Require(
-      created->QueryInterface(IID_IvltRegistrar, reinterpret_cast<void**>(registrar.out())) == S_OK,
-      "a registrar");
-  return registrar;
-}
+CztComPtr<IvltRegistrar> Start() { return bench::Start(Root()); }
 
 // ---- The composition: GKeyFile, flock and MD5 doing the same job in the plain way.
 
@@ -229,26 +201,22 @@ void RunTurns() {
   }
 }
 
-GUID Id(unsigned n) {
-  return {n + 1, 0x1111, 0x4222, {0x83, 0x33, 0x44, 0x44, 0x44, 0x44, 0x44, 0x44}};
-}
-
 void RunAnswers(unsigned components) {
   Install(components);
   CztComPtr<IvltRegistrar> registrar = Start();
   std::map<GUID, std::wstring> map;
-  for (unsigned n = 0; n < components; ++n) map[Id(n)] = L"Expert" + std::to_wstring(n);
+  for (unsigned n = 0; n < components; ++n) map[bench::Id(n)] = L"Expert" + std::to_wstring(n);
   unsigned n = 0, m = 0;
   Run({"18",
        "GetComponent and free, of " + std::to_string(components),
        [&] {
          _vltComponent2 record;
-         Require(registrar->GetComponent(Id(n), &record) == S_OK, "GetComponent");
+         Require(registrar->GetComponent(bench::Id(n), &record) == S_OK, "GetComponent");
          vltFreeComponent2(record);
          n = (n + 7919) % components;
        },
        {{"std::map, two copies", 1.0, [&] {
-           const std::wstring& name = map.find(Id(m))->second;
+           const std::wstring& name = map.find(bench::Id(m))->second;
            wchar_t* copies[] = {wcsdup(name.c_str()), wcsdup(name.c_str())};
            for (wchar_t* copy : copies) free(copy);
            m = (m + 7919) % components;
