@@ -137,7 +137,8 @@ struct Parser {
   static void add(CLI::App* sub, const Argument& argument, Arguments* values) {
     std::string name = argument.name;
     if (argument.isFlag()) {
-      sub->add_flag_callback(name, [values, name] { values->m_values[name] = {}; });
+      std::string names = argument.letter ? argument.letter + ("," + name) : name;
+      sub->add_flag_callback(names, [values, name] { values->m_values[name] = {}; });
       return;
     }
     CLI::callback_t take = [values, name](const CLI::results_t& texts) {

@@ -90,6 +90,11 @@ constexpr Argument kError[] = {
 constexpr Argument kLocks[] = {
     {"--sweep", nullptr, "Remove the locks of logs whose processes have ended"}};
 
+constexpr Argument kTrace[] = {
+    {"--follow", nullptr, "Print what is added, until the process or this command is ended", false,
+     false, nullptr, "-f"},
+    {"PID", nullptr, "Process whose log it is; the newest log without"}};
+
 constexpr Argument kLint[] = {
     {"--strict", nullptr, "Warnings make the exit code 1, too"},
     {"PATH", nullptr, "A registration file, a bundle, or a directory with bundles below it", true,
@@ -136,10 +141,7 @@ constexpr Command kCommands[] = {
     {kDiagnostics, "paths", "Every place in use, and what decides it", kOnlyRoot},
     {kDiagnostics, "error", "Name and meaning of a result or exception code", kError, kOfLibrary},
     {kDiagnostics, "locks", "Named locks and events, their holders and age", kLocks, kOfMachine},
-    {kDiagnostics,
-     "trace",
-     "Where the log of this user goes, its options and last lines",
-     {},
+    {kDiagnostics, "trace", "Where the log of this user goes, its options and last lines", kTrace,
      kOfMachine},
     {kDiagnostics, "events", "Named events of the machine and who holds them", {}, kOfMachine},
     {kDiagnostics, "hook list", "Points of fault injection", {}, kOfLibrary},

@@ -38,6 +38,7 @@ struct Argument {
   // What completion offers in this place; null for nothing: words with blanks between them, or one of
   // kFiles and kDirectories.
   const char* offers = nullptr;
+  const char* letter = nullptr;  // "-f": the short form of a flag
 
   bool isFlag() const { return name[0] == '-' && !value; }
   bool isPositional() const { return name[0] != '-'; }

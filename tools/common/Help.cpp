@@ -49,7 +49,9 @@ std::vector<const Argument*> OptionsOf(const Command& command) {
 }
 
 std::string Left(const Argument& argument) {
-  return argument.value ? std::string(argument.name) + " " + argument.value : argument.name;
+  std::string name = argument.name;
+  if (argument.letter) name = argument.letter + (", " + name);
+  return argument.value ? name + " " + argument.value : name;
 }
 
 std::string Indented(const Table& table) {
@@ -136,6 +138,7 @@ std::string Wrapped(const std::string& text) {
 
 std::string InManual(const Argument& argument) {
   std::string out = argument.isPositional() ? "\\fI" : "\\fB";
+  if (argument.letter) out += Escaped(argument.letter) + "\\fR, \\fB";
   out += Escaped(argument.name) + "\\fR";
   if (argument.value) out += " \\fI" + Escaped(argument.value) + "\\fR";
   if (argument.isList) out += " ...";
@@ -208,8 +211,7 @@ Offers OffersOf(const Command& command) {
   Offers out;
   for (const Argument* option : OptionsOf(command)) {
     if (!option->isPositional())
-      out.words +=
-          (out.words.empty() ? "" : " ") + Left(*option).substr(0, Left(*option).find(' '));
+      out.words += (out.words.empty() ? "" : " ") + std::string(option->name);
     if (!option->offers) continue;
     std::string_view offers = option->offers;
     out.files = out.files || offers == kFiles;
@@ -329,6 +331,7 @@ std::string FishOption(const std::string& condition, const Argument& option) {
     return "complete -c vltctl -n " + condition + " -a '" + list + "'\n";
   }
   return "complete -c vltctl -n " + condition + " -l " + (option.name + 2) +
+         (option.letter ? std::string(" -s ") + (option.letter + 1) : "") +
          (option.value ? " -x" : "") + " -d " + FishQuoted(option.summary) + "\n";
 }
 

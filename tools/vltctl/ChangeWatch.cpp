@@ -8,13 +8,14 @@
 #include <sys/signalfd.h>
 #include <unistd.h>
 
-#include <algorithm>
+#include <filesystem>
 
 #include "tools/common/Output.h"
 
 namespace admin {
 namespace {
 
+namespace fs = std::filesystem;
 using Clock = std::chrono::steady_clock;
 using std::chrono::milliseconds;
 
@@ -52,6 +53,15 @@ bool ChangeWatch::add(const std::string& directory, const std::string& only) {
   if (watch < 0) return false;
   m_only[watch] = only;
   return true;
+}
+
+bool ChangeWatch::addWithWay(const std::string& directory) {
+  fs::path path = fs::path(directory).lexically_normal();
+  if (!path.has_filename()) path = path.parent_path();
+  for (fs::path part = path; part.has_relative_path(); part = part.parent_path()) {
+    add(part.parent_path(), part.filename());
+  }
+  return add(path);
 }
 
 // Takes all events that there are. Whether one of them counts; lost ones do.

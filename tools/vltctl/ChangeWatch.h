@@ -19,6 +19,9 @@ class ChangeWatch {
   // Once added it stays so, until it is removed or renamed. Throws as the constructor does.
   bool add(const std::string& directory, const std::string& only = "");
 
+  // The same, with the way to it: a directory that is missing now may come.
+  bool addWithWay(const std::string& directory);
+
   enum class Woken { Changed, Signalled, Late };
   Woken wait(std::chrono::milliseconds longest);
 

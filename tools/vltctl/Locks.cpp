@@ -1,9 +1,5 @@
 // locks: the named locks and events of the machine, who holds them, and how old they are.
-#include <errno.h>
 #include <fcntl.h>
-#include <signal.h>
-#include <stdlib.h>
-#include <string.h>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <time.h>
@@ -13,6 +9,7 @@
 #include <filesystem>
 
 #include "tools/common/LockHolder.h"
+#include "tools/vltctl/Logs.h"
 #include "tools/vltctl/Reading.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/SharedUnixObject.h"
@@ -30,20 +27,6 @@ struct Lock {
   time_t ageSeconds;
   std::vector<vltctl::Process> holders;
 };
-
-// The process whose log a lock of this name belongs to: "20260101_000000-vlTracer-0000530C.log". 0 for
-// any other name.
-pid_t ProcessOfLog(const std::string& name) {
-  constexpr const char* kMark = "-vlTracer-";
-  size_t mark = name.find(kMark);
-  if (mark == std::string::npos || !name.ends_with(".log")) return 0;
-  std::string digits = name.substr(mark + strlen(kMark), 8);
-  char* end = nullptr;
-  unsigned long pid = strtoul(digits.c_str(), &end, 16);
-  return *end == 0 && pid <= INT32_MAX ? static_cast<pid_t>(pid) : 0;
-}
-
-bool HasEnded(pid_t pid) { return kill(pid, 0) != 0 && errno == ESRCH; }
 
 std::vector<Lock> LocksIn(const std::string& directory, const char* kind,
                           const vltctl::LockTable& table) {

@@ -35,11 +35,8 @@ void AddBelow(const fs::path& directory, int depth, ChangeWatch* watch) {
   }
 }
 
-// The tree, and the way to it: a directory that is missing now may come.
 void AddAll(const fs::path& root, ChangeWatch* watch) {
-  for (fs::path part = root; part.has_relative_path(); part = part.parent_path()) {
-    watch->add(part.parent_path(), part.filename());
-  }
+  watch->addWithWay(root);
   AddBelow(root, kDepth, watch);
 }
 
