@@ -64,7 +64,10 @@ class Diagnostics : public testing::Test {
 TEST_F(Diagnostics, HookListNamesEachPointOnce) {
   std::istringstream lines(Vltctl({"hook", "list"}).out);
   std::multiset<std::string> names;
-  for (std::string line; std::getline(lines, line);) names.insert(line.substr(0, line.find("  ")));
+  for (std::string line; std::getline(lines, line);) {
+    line.erase(0, line.find_first_not_of("0123456789 "));
+    names.insert(line.substr(0, line.find("  ")));
+  }
   EXPECT_EQ(names, std::multiset<std::string>(kPoints.begin(), kPoints.end()));
   std::set<std::string> keys;
   for (const json& item : VltctlJson({"hook", "list"}).items) {
@@ -145,6 +148,19 @@ TEST_F(Diagnostics, ArmingWritesTheFileOfThePointAndItsFault) {
             "SimulateMemoryAllocationFailureAndThrow = true\n\n");
 }
 
+TEST_F(Diagnostics, TheNumbersOfTheListArmAsTheNamesDo) {
+  for (const json& point : VltctlJson({"hook", "list"}).items) {
+    JsonResult armed = VltctlJson({"hook", "arm", point["number"].dump(), "fail"});
+    EXPECT_EQ(armed.exitCode, kGood);
+    EXPECT_EQ(armed.items.at(0)["armed"], point["name"]);
+    std::string text = ReadBytes(hookFile());
+    EXPECT_EQ(text.find("[Hook]\nName = " + point["name"].get<std::string>() + "\n"), 0u) << text;
+  }
+  for (const char* number : {"0", "22", "01", "-1", "1x"}) {
+    EXPECT_EQ(Vltctl({"hook", "arm", number, "fail"}).exitCode, kNotFound) << number;
+  }
+}
+
 TEST_F(Diagnostics, WhatIsRefusedLeavesTheArmedPoint) {
   ASSERT_EQ(Vltctl({"hook", "arm", "vltjarValidChecksumSet", "crash"}).exitCode, 0);
   std::string before = ReadBytes(hookFile());
@@ -152,6 +168,10 @@ TEST_F(Diagnostics, WhatIsRefusedLeavesTheArmedPoint) {
        {std::vector<std::string>{"VLTJARVALIDCHECKSUMSET", "fail"},
         {"vltjarInvalidChecksumSet", "Fail"},
         {"vltjarInvalidChecksumSet", "fail", "nonsense"},
+        {"vltjarInvalidChecksumSet", "fail=1"},
+        {"vltjarInvalidChecksumSet", "hang="},
+        {"vltjarInvalidChecksumSet", "hang=-1"},
+        {"vltjarInvalidChecksumSet", "hang=2147483648"},
         {"vltjarInvalidChecksumSet"},
         {}}) {
     arguments.insert(arguments.begin(), {"hook", "arm"});

@@ -80,7 +80,7 @@ constexpr Argument kRepair[] = {
 constexpr Argument kOnlyRoot[] = {kRoot};
 
 constexpr Argument kHookArm[] = {
-    {"POINT", nullptr, "Name of a point, as \"hook list\" shows it", true},
+    {"POINT", nullptr, "Number or name of a point, as \"hook list\" shows them", true},
     {"FLAG", nullptr, "hang[=MS], crash, fail, throw, exhaust", true, true,
      "hang crash fail throw exhaust"},
     kRoot};

@@ -3,8 +3,9 @@
 #include <string.h>
 
 #include <algorithm>
+#include <charconv>
 #include <filesystem>
-#include <map>
+#include <utility>
 
 #include "source/Common/vltHookPoints.h"
 #include "source/vlIniMgr.h"
@@ -14,26 +15,19 @@
 namespace admin {
 
 namespace fs = std::filesystem;
-using vltctl::ExitCode;
-
-int HookList(const Arguments&, Output& output) {
-  vltctl::Table table;
-  for (const auto& point : vlt::hook::kPoints) {
-    table.add({point.name, point.where});
-    output.item({{"name", point.name}, {"where", point.where}});
-  }
-  output.print(table);
-  return vltctl::kGood;
-}
 
 namespace {
 
-const std::map<std::string, const char*> kFlags = {
-    {"hang", "Hang"},
-    {"crash", "Crash"},
-    {"fail", "SimulateMemoryAllocationFailure"},
-    {"throw", "SimulateMemoryAllocationFailureAndThrow"},
-    {"exhaust", "MemoryAllocationFailure"}};
+constexpr unsigned kLongestHangMs = 0x7FFFFFFF;  // what the library waits without a time
+
+struct Flag {
+  const char *word, *key;
+};
+constexpr Flag kFlags[] = {{"hang", "Hang"},
+                           {"crash", "Crash"},
+                           {"fail", "SimulateMemoryAllocationFailure"},
+                           {"throw", "SimulateMemoryAllocationFailureAndThrow"},
+                           {"exhaust", "MemoryAllocationFailure"}};
 
 std::string HookFile() { return InstalledFile(vlt::layout::kHookFile); }
 
@@ -43,16 +37,39 @@ void ExpectUsable(const std::string& file) {
   if (read.state == GuardedBytes::State::Unreadable) throw Unusable(file, read.error);
 }
 
+// An item of the hook file.
+using Item = std::pair<std::string, std::string>;
+
+vltctl::Failure BadFlag(const std::string& code, const std::string& what, const std::string& next) {
+  return {vltctl::kUsage, {code, "", what, "", next}};
+}
+
+Item HangTime(const std::string& text) {
+  unsigned milliseconds = 0;
+  auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), milliseconds);
+  bool isNumber = error == std::errc() && end == text.data() + text.size();
+  if (isNumber && milliseconds <= kLongestHangMs) return {"HangTime", text};
+  throw BadFlag("bad-hang-time", "\"" + text + "\" is no time to hang for",
+                "give milliseconds, from 0 to 2147483647");
+}
+
 // "hang=250" arms a hang of so many milliseconds.
-bool SetFlag(CvlIniMgr& ini, const std::string& flag) {
+std::vector<Item> ItemsOf(const std::string& flag) {
   size_t equals = flag.find('=');
-  auto found = kFlags.find(flag.substr(0, equals));
-  if (found == kFlags.end()) return false;
-  ini.SetItem("Hook", found->second, "true", false);
-  if (equals != std::string::npos) {
-    ini.SetItem("Hook", "HangTime", flag.substr(equals + 1).c_str(), false);
+  const std::string word = flag.substr(0, equals);
+  auto found = std::find_if(std::begin(kFlags), std::end(kFlags),
+                            [&](const Flag& row) { return row.word == word; });
+  if (found == std::end(kFlags)) {
+    throw BadFlag("no-such-flag", "no such flag: " + flag,
+                  "give hang[=MS], crash, fail, throw or exhaust");
   }
-  return true;
+  std::vector<Item> items = {{found->key, "true"}};
+  if (equals == std::string::npos) return items;
+  if (word != "hang") {
+    throw BadFlag("bad-flag", word + " takes no value", "write " + word + " alone");
+  }
+  items.push_back(HangTime(flag.substr(equals + 1)));
+  return items;
 }
 
 std::vector<std::string> PointNames() {
@@ -61,12 +78,17 @@ std::vector<std::string> PointNames() {
   return names;
 }
 
-vltctl::Failure NoSuch(ExitCode code, const std::string& what, const std::string& word,
-                       const std::vector<std::string>& candidates, const std::string& otherwise) {
-  std::string guess = vltctl::DidYouMean(word, candidates);
-  return {code,
-          {"no-such-" + what, "", "no such " + what + ": " + word, "",
-           guess.empty() ? otherwise : guess}};
+// By its name, or by its number in the list, from 1.
+std::string PointOf(const std::string& word) {
+  const std::vector<std::string> names = PointNames();
+  if (std::find(names.begin(), names.end(), word) != names.end()) return word;
+  for (size_t n = 0; n < names.size(); ++n) {
+    if (std::to_string(n + 1) == word) return names[n];
+  }
+  std::string guess = vltctl::DidYouMean(word, names);
+  throw vltctl::Failure(vltctl::kNotFound,
+                        {"no-such-point", "", "no such point: " + word, "",
+                         guess.empty() ? "\"vltctl hook list\" shows all" : guess});
 }
 
 int Save(CvlIniMgr& ini, const std::string& file) {
@@ -79,32 +101,47 @@ int Save(CvlIniMgr& ini, const std::string& file) {
 
 }  // namespace
 
+int HookList(const Arguments&, Output& output) {
+  vltctl::Table table;
+  unsigned number = 0;
+  for (const auto& point : vlt::hook::kPoints) {
+    table.add({std::to_string(++number), point.name, point.where});
+    output.item({{"number", number}, {"name", point.name}, {"where", point.where}});
+  }
+  output.print(table);
+  return vltctl::kGood;
+}
+
 int HookArm(const Arguments& arguments, Output& output) {
-  const std::string name = arguments.text("POINT");
-  std::vector<std::string> points = PointNames();
-  if (std::find(points.begin(), points.end(), name) == points.end()) {
-    throw NoSuch(vltctl::kNotFound, "point", name, points, "\"vltctl hook list\" shows all");
+  const std::string name = PointOf(arguments.text("POINT")), file = HookFile();
+  const std::vector<std::string> flags = arguments.list("FLAG");
+  std::vector<Item> items = {{"Name", name}};
+  for (const std::string& flag : flags) {
+    for (const Item& item : ItemsOf(flag)) items.push_back(item);
   }
-  ExpectUsable(HookFile());
-  CvlIniMgr ini = CvlIniMgr::OpenRaw(HookFile());
+  ExpectUsable(file);
+  CvlIniMgr ini = CvlIniMgr::OpenRaw(file);
   ini.EraseSection("Hook");
-  ini.SetItem("Hook", "Name", name.c_str(), false);
-  for (const std::string& flag : arguments.list("FLAG")) {
-    if (SetFlag(ini, flag)) continue;
-    throw NoSuch(vltctl::kUsage, "flag", flag, {}, "give hang[=MS], crash, fail, throw or exhaust");
-  }
-  int code = Save(ini, HookFile());
-  output.item({{"file", HookFile()}, {"armed", name}, {"flags", arguments.list("FLAG")}});
+  for (const auto& [key, value] : items) ini.SetItem("Hook", key.c_str(), value.c_str(), false);
+  int code = Save(ini, file);
+  output.item({{"file", file}, {"armed", name}, {"flags", flags}});
+  output.line(file + ": armed " + name + "; it counts in a process that calls vltRefreshHook");
   return code;
 }
 
 int HookClear(const Arguments&, Output& output) {
-  output.item({{"file", HookFile()}, {"armed", nullptr}, {"flags", vltctl::Json::array()}});
-  if (!fs::exists(HookFile())) return vltctl::kGood;
-  ExpectUsable(HookFile());
-  CvlIniMgr ini = CvlIniMgr::OpenRaw(HookFile());
+  const std::string file = HookFile();
+  output.item({{"file", file}, {"armed", nullptr}, {"flags", vltctl::Json::array()}});
+  if (!fs::exists(file)) {
+    output.line(file + ": nothing is armed");
+    return vltctl::kGood;
+  }
+  ExpectUsable(file);
+  CvlIniMgr ini = CvlIniMgr::OpenRaw(file);
   ini.EraseSection("Hook");
-  return Save(ini, HookFile());
+  int code = Save(ini, file);
+  output.line(file + ": disarmed; flags that a process has read stay set until it ends");
+  return code;
 }
 
 }  // namespace admin
