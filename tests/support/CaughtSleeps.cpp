@@ -22,6 +22,12 @@ auto& Result(mcontext_t& context) { return context.gregs[REG_EAX]; }
 #elif defined(__aarch64__)
 auto& ThirdArgument(mcontext_t& context) { return context.regs[2]; }
 auto& Result(mcontext_t& context) { return context.regs[0]; }
+#elif defined(__arm__)
+auto& ThirdArgument(mcontext_t& context) { return context.arm_r2; }
+auto& Result(mcontext_t& context) { return context.arm_r0; }
+#elif defined(__s390x__)
+auto& ThirdArgument(mcontext_t& context) { return context.gregs[4]; }
+auto& Result(mcontext_t& context) { return context.gregs[2]; }
 #endif
 
 // The time of SYS_clock_nanosleep, which serves sleeps below 68 years in 32-bit processes, too.
