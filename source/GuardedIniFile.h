@@ -32,6 +32,7 @@ struct GuardedIniState {
     Sound,              // the digest matches
     NoSidecar,          // nor anything that counts as one
     FirstSave,          // the sidecar is the mark of a first save that has not ended
+    DurableCopy,        // a database whose scan has not ended, with its second name
     DigestDiffers,      // a save that has not ended, or a change by hand
     Missing,            // there is no file
     Unparsable,         // in an encoding that cannot be read
@@ -43,6 +44,7 @@ struct GuardedIniState {
   };
   enum class Opening {
     Takes,               // the file as it is
+    TakesCopy,           // the second name, in the place of the file (source/DurableCopy.h)
     Begins,              // an empty file
     SetsAsideAndBegins,  // moves the file aside and begins an empty one
     SetsAsideAndFails,   // moves it aside and fails; the opening after it begins an empty one
@@ -85,6 +87,8 @@ class GuardedIniFile {
   // What open() would find and do, by the same judges, without the lock and without a change: while
   // another process saves, the answer may be of no moment at all. Throws std::bad_alloc.
   GuardedIniState inspect() const;
+  // The same for the opening of a registrar, which takes up a second name before.
+  GuardedIniState inspectDatabase() const;
 
   // Renames the file and removes the sidecar (CvlIniMgr::SetAside). E_FAIL where the system
   // refuses. The caller holds the file's lock.
@@ -100,6 +104,7 @@ class GuardedIniFile {
   const std::string& sidecar() const { return m_sidecar; }
 
  private:
+  GuardedIniState inspectContents(const std::string& contents) const;
   std::unique_ptr<CvlIniMgr> create(const char* hookPoint,
                                     const IniSidecar::Digest* expected) const;
 

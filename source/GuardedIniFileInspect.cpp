@@ -4,6 +4,7 @@
 #include <errno.h>
 #include <sys/stat.h>
 
+#include "source/DurableCopy.h"
 #include "source/GuardedIniFile.h"
 #include "zt/posix/Files.h"
 
@@ -13,9 +14,9 @@ using Kind = GuardedIniState::Kind;
 using Opening = GuardedIniState::Opening;
 using Found = CvlIniMgr::Found;
 
-bool IsDirectory(const std::string& path) {
+bool IsOfType(const std::string& path, mode_t type) {
   struct stat info;
-  return zt::posix::LookUp(path.c_str(), false).examine(&info) && S_ISDIR(info.st_mode);
+  return zt::posix::LookUp(path.c_str(), false).examine(&info) && (info.st_mode & S_IFMT) == type;
 }
 
 // Of a file whose digest is the expected one, or of which none is expected; `taken` is its kind
@@ -43,20 +44,33 @@ GuardedIniState JudgeChanged(const CvlIniMgr::Finding& finding, bool isMark) {
 
 }  // namespace
 
-GuardedIniState GuardedIniFile::inspect() const {
+GuardedIniState GuardedIniFile::inspect() const { return inspectContents(m_file); }
+
+GuardedIniState GuardedIniFile::inspectDatabase() const {
+  GuardedIniState state = inspect();
+  const std::string copy = DurableCopy::NameFor(m_file);
+  bool counts = state.kind != Kind::Sound && state.opening != Opening::Fails;
+  if (!counts || !IsOfType(copy, S_IFREG)) return state;
+  GuardedIniState taken = inspectContents(copy);
+  if (taken.opening != Opening::Takes) return taken;
+  return {Kind::DurableCopy, Opening::TakesCopy};
+}
+
+// `contents`: the file, or what takes its place.
+GuardedIniState GuardedIniFile::inspectContents(const std::string& contents) const {
   IniSidecar::Digest digest;
   switch (IniSidecar::Read(m_sidecar, &digest)) {
     case IniSidecar::State::Unreadable:
       return {Kind::SidecarUnreadable, Opening::Fails, errno};
     case IniSidecar::State::Short:
-      return {IsDirectory(m_sidecar) ? Kind::SidecarDirectory : Kind::SidecarShort,
+      return {IsOfType(m_sidecar, S_IFDIR) ? Kind::SidecarDirectory : Kind::SidecarShort,
               Opening::SetsAsideAndFails};
     case IniSidecar::State::Missing:
-      return Judge(CvlIniMgr::Inspect(m_file, nullptr), Kind::NoSidecar);
+      return Judge(CvlIniMgr::Inspect(contents, nullptr), Kind::NoSidecar);
     case IniSidecar::State::Present:
       break;
   }
-  CvlIniMgr::Finding finding = CvlIniMgr::Inspect(m_file, digest.data());
+  CvlIniMgr::Finding finding = CvlIniMgr::Inspect(contents, digest.data());
   if (finding.found != Found::OtherDigest) return Judge(finding, Kind::Sound);
-  return JudgeChanged(CvlIniMgr::Inspect(m_file, nullptr), digest == IniSidecar::kInvalidMark);
+  return JudgeChanged(CvlIniMgr::Inspect(contents, nullptr), digest == IniSidecar::kInvalidMark);
 }

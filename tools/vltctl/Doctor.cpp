@@ -71,9 +71,12 @@ void CheckGuardedFile(const std::string& file, Signs* signs) {
   GuardedIniState state = Inspect(file);
   const StateWords& words = WordsOf(state.kind);
   std::string why = WhyOf(state), what = words.found + (why.empty() ? "" : ": " + why);
-  bool isTaken = state.opening == GuardedIniState::Opening::Takes;
+  bool isTaken = state.opening == GuardedIniState::Opening::Takes ||
+                 state.opening == GuardedIniState::Opening::TakesCopy;
   if (!isTaken && state.kind != GuardedIniState::Kind::Missing) {
     signs->push_back({Level::Bad, words.code, what, file, words.next});
+  } else if (state.kind == GuardedIniState::Kind::DurableCopy) {
+    signs->push_back({Level::Warn, words.code, what, file, words.next});
   } else if (state.kind == GuardedIniState::Kind::DigestDiffers) {
     signs->push_back(
         {Level::Warn, words.code, what, file,

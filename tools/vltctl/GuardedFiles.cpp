@@ -37,6 +37,9 @@ constexpr KindRow kKinds[] = {
     {Kind::Sound, {"sound", "the digest matches", ""}},
     {Kind::NoSidecar, {"no-sidecar", "there is no sidecar", ""}},
     {Kind::FirstSave, {"first-save", "the sidecar is the mark of a first save under way", ""}},
+    {Kind::DurableCopy,
+     {"durable-copy", "a scan has not ended, and NAME.durable is the last state on disk",
+      "the next start of a registrar, or \"vltctl repair\", takes it"}},
     {Kind::DigestDiffers, {"digest-differs", "the digest differs", ""}},
     {Kind::Missing, {"missing", "the file is missing", ""}},
     {Kind::Unparsable, {"unparsable", "the file cannot be parsed", kConvert}},
@@ -57,6 +60,7 @@ struct OpeningRow {
 };
 constexpr OpeningRow kOpenings[] = {
     {Opening::Takes, {"takes", "takes the file as it is"}},
+    {Opening::TakesCopy, {"takes-copy", "takes NAME.durable in its place"}},
     {Opening::Begins, {"begins", "makes an empty file"}},
     {Opening::SetsAsideAndBegins,
      {"sets-aside", "sets the file aside as .bad and begins an empty one"}},
@@ -90,7 +94,9 @@ std::string WhyOf(const GuardedIniState& state) {
 GuardedIniState Inspect(const std::string& file) {
   GuardedIniFile guarded(file, kAnyKind);
   GuardedIniState state = {};
-  ReadBetweenSaves(file, [&] { state = guarded.inspect(); });
+  bool isDatabase = fs::path(file).filename() == Narrow(vlt::layout::kDatabase);
+  ReadBetweenSaves(file,
+                   [&] { state = isDatabase ? guarded.inspectDatabase() : guarded.inspect(); });
   return state;
 }
 

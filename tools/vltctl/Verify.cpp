@@ -11,6 +11,7 @@
 
 #include "source/Cmd5vlt.h"
 #include "source/Common/vltFileSecurity.h"
+#include "source/DurableCopy.h"
 #include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Reading.h"
 #include "tools/vltctl/Root.h"
@@ -28,7 +29,9 @@ using zt::posix::ScopedFd;
 Json OrNull(const std::string& text) { return text.empty() ? Json() : Json(text); }
 
 ExitCode CodeOf(const GuardedIniState& state) {
-  if (state.opening == Opening::Takes) return vltctl::kGood;
+  if (state.opening == Opening::Takes || state.opening == Opening::TakesCopy) {
+    return vltctl::kGood;
+  }
   return state.opening == Opening::Begins ? vltctl::kNotFound : vltctl::kDataUnusable;
 }
 
@@ -89,7 +92,7 @@ vltctl::Failure CannotWrite(const std::string& file, int error) {
 }
 
 // What a repair does about a state.
-enum class Remedy { None, Seal, Convert, Impossible };
+enum class Remedy { None, Seal, Convert, TakeUp, Impossible };
 
 Remedy RemedyFor(Kind kind) {
   switch (kind) {
@@ -101,6 +104,8 @@ Remedy RemedyFor(Kind kind) {
     case Kind::Unparsable:
     case Kind::UnparsableChanged:
       return Remedy::Convert;
+    case Kind::DurableCopy:
+      return Remedy::TakeUp;
     case Kind::Unreadable:
     case Kind::SidecarUnreadable:
       return Remedy::Impossible;
@@ -110,7 +115,7 @@ Remedy RemedyFor(Kind kind) {
 }
 
 constexpr const char* WordOf(Remedy remedy) {
-  constexpr const char* words[] = {"none", "seal", "convert", "impossible"};
+  constexpr const char* words[] = {"none", "seal", "convert", "take-up", "impossible"};
   return words[static_cast<int>(remedy)];
 }
 
@@ -179,11 +184,31 @@ struct Repaired {
   std::string copy;
 };
 
+// The second name takes the file's; what it replaces, if there is anything, is kept.
+Repaired TakeUp(const std::string& file) {
+  Repaired out;
+  out.remedy = Remedy::TakeUp;
+  GuardedBytes read = ReadGuarded(file);
+  if (read.state == GuardedBytes::State::Read) {
+    out.copy = FreeName(file);
+    WriteNew(out.copy, read.bytes);
+  }
+  errno = 0;
+  if (!DurableCopy::takeUp(file) || Inspect(file).kind == Kind::DurableCopy) {
+    throw CannotWrite(file, errno);
+  }
+  if (Inspect(file).kind != Kind::Sound) Seal(file, ReadGuarded(file).bytes);
+  return out;
+}
+
+bool HasWork(Remedy remedy) { return remedy != Remedy::None && remedy != Remedy::Impossible; }
+
 // The caller holds the file's lock, so that nothing changes between the judgement and its remedy.
 Repaired Repair(const std::string& file) {
   Repaired out;
   out.remedy = RemedyFor(Inspect(file).kind);
-  if (out.remedy != Remedy::Seal && out.remedy != Remedy::Convert) return out;
+  if (out.remedy == Remedy::TakeUp) return TakeUp(file);
+  if (!HasWork(out.remedy)) return out;
   GuardedBytes read = ReadGuarded(file);
   if (read.state != GuardedBytes::State::Read) throw Unusable(file, read.error);
   bool isText = Document(read.bytes).status() == 0;
@@ -198,6 +223,17 @@ Repaired Repair(const std::string& file) {
   if (!isText) Replace(file, text);
   Seal(file, text);
   return out;
+}
+
+std::string Sentence(Remedy remedy, bool dry) {
+  switch (remedy) {
+    case Remedy::Seal:
+      return dry ? "would get a new sidecar" : "has a new sidecar";
+    case Remedy::TakeUp:
+      return dry ? "would be NAME.durable" : "is what was NAME.durable";
+    default:
+      return dry ? "would be converted to UTF-8" : "is converted to UTF-8";
+  }
 }
 
 void Show(const std::string& file, const GuardedIniState& before, const Repaired& done, bool dry,
@@ -218,10 +254,7 @@ void Show(const std::string& file, const GuardedIniState& before, const Repaired
       line += "cannot be repaired; " + std::string(WordsOf(before.kind).next);
       break;
     default:
-      line += dry ? "would " : "";
-      line += done.remedy == Remedy::Seal
-                  ? (dry ? "get a new sidecar" : "has a new sidecar")
-                  : (dry ? "be converted to UTF-8" : "is converted to UTF-8");
+      line += Sentence(done.remedy, dry);
       if (!done.copy.empty()) line += "; what it was is " + done.copy;
   }
   output.line(line);
@@ -230,7 +263,7 @@ void Show(const std::string& file, const GuardedIniState& before, const Repaired
 int RepairOne(const std::string& file, bool dry, Output& output) {
   GuardedIniState before = Inspect(file);
   Repaired done{RemedyFor(before.kind), ""};
-  bool hasWork = done.remedy == Remedy::Seal || done.remedy == Remedy::Convert;
+  bool hasWork = HasWork(done.remedy);
   if (hasWork && !dry) {
     FileHold hold(file);
     before = Inspect(file);
