@@ -11,7 +11,7 @@ else()
 endif()
 
 # The linker's flags, for ELF: nothing undefined; one export list, never unloaded, tables read-only
-# after the start, without what nobody refers to.
+# after the start, without what nothing refers to.
 set(VLT_LINK_CLOSED -Wl,-z,defs)
 set(VLT_LINK_SHARED -Wl,--version-script=${PROJECT_SOURCE_DIR}/cmake/exports.map -Wl,-z,nodelete
   -Wl,-z,relro -Wl,-z,now -Wl,--gc-sections)
