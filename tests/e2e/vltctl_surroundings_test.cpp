@@ -9,6 +9,7 @@
 
 #include "tests/e2e/Start.h"
 #include "tests/e2e/Vltctl.h"
+#include "tests/support/BuildModule.h"
 #include "tests/support/Sanitizer.h"
 
 namespace vlt::test {
@@ -52,6 +53,52 @@ std::string Joined(const std::vector<std::string>& words) {
   std::string out;
   for (const std::string& word : words) out += word + " ";
   return out;
+}
+
+// What the command prints to a terminal; both streams come there.
+std::string OnTerminal(const std::string& command, const Environment& environment) {
+  return RunProgram({"script", "-qec", kVltctl + " " + command, "/dev/null"}, environment).out;
+}
+
+TEST_F(VltctlSurroundings, ColoursAreForTerminals) {
+  if (RunProgram({"sh", "-c", "command -v script"}).exitCode != 0) {
+    GTEST_SKIP() << "NOT TESTED: script is not installed";
+  }
+  const std::string escape = "\x1B[", verify = "verify " + m_installation.database();
+  const Environment terminal = {{"TERM", "xterm"}, {"NO_COLOR", ""}, {"CLICOLOR_FORCE", ""}};
+  auto with = [&](const char* name, const char* value) {
+    Environment environment = terminal;
+    environment.push_back({name, value});
+    return environment;
+  };
+  EXPECT_NE(OnTerminal(verify, terminal).find(": \x1B[32mthe digest matches\x1B[0m; the next"),
+            std::string::npos)
+      << OnTerminal(verify, terminal);
+  EXPECT_EQ(OnTerminal(verify, with("NO_COLOR", "1")).find(escape), std::string::npos);
+  EXPECT_EQ(OnTerminal(verify, with("TERM", "dumb")).find(escape), std::string::npos);
+  EXPECT_EQ(OnTerminal(verify + " --json", terminal).find(escape), std::string::npos);
+  for (const std::vector<std::string>& command : commands()) {
+    EXPECT_EQ(Vltctl(command).out.find(escape), std::string::npos) << command[0];
+  }
+  EXPECT_EQ(Vltctl({"doctor"}).out.find(escape), std::string::npos);
+  std::string forced = Vltctl({"doctor"}, {{"CLICOLOR_FORCE", "1"}}).out;
+  EXPECT_EQ(forced.find("\x1B[32mok\x1B[0m"), 0u) << forced;
+}
+
+// A library that takes its time to load, and one after it.
+TEST_F(VltctlSurroundings, ALongCheckShowsHowFarItIsOnATerminal) {
+  if (RunProgram({"sh", "-c", "command -v script"}).exitCode != 0) {
+    GTEST_SKIP() << "NOT TESTED: script is not installed";
+  }
+  m_installation.addObjectExpert("Last", "Last", GText(2));
+  const std::string library = m_installation.root() + "/Experts/Tank.vle/libTank.so";
+  BuildModule(library,
+              "#include <unistd.h>\n"
+              "__attribute__((constructor)) void start() { usleep(700000); }\n"
+              "extern \"C\" int vltCreateObjectExpert() { return 0; }\n");
+  std::string shown = OnTerminal("check", {{"TERM", "xterm"}});
+  EXPECT_NE(shown.find("\rchecking "), std::string::npos) << shown;
+  EXPECT_EQ(Vltctl({"check"}).err, "");
 }
 
 ProgramResult InShell(const std::string& script, const std::vector<std::string>& arguments) {

@@ -7,8 +7,6 @@
 #include <algorithm>
 #include <utility>
 
-#include "tools/common/Terminal.h"
-
 namespace vltctl {
 namespace {
 
@@ -30,22 +28,23 @@ std::string TextOf(const Problem& problem) {
   return problem.next.empty() ? out : out + "; " + problem.next;
 }
 
-void Table::add(std::vector<std::string> cells) {
+void Table::add(std::vector<std::string> cells, Mood mood) {
   for (std::string& cell : cells) cell = ForTerminal(cell);
-  m_rows.push_back(std::move(cells));
+  m_rows.push_back({std::move(cells), mood});
 }
 
 std::string Table::text() const {
   std::vector<size_t> widths;
-  for (const auto& row : m_rows) {
+  for (const auto& [row, mood] : m_rows) {
     widths.resize(std::max(widths.size(), row.size()));
     for (size_t i = 0; i < row.size(); ++i) widths[i] = std::max(widths[i], DisplayWidth(row[i]));
   }
   std::string out;
-  for (const auto& row : m_rows) {
+  for (const auto& [row, mood] : m_rows) {
     std::string line;
     for (size_t i = 0; i < row.size(); ++i) {
-      line += row[i] + std::string(widths[i] - DisplayWidth(row[i]) + 2, ' ');
+      line += Coloured(row[i], i == 0 ? mood : Mood::Plain) +
+              std::string(widths[i] - DisplayWidth(row[i]) + 2, ' ');
     }
     line.erase(line.find_last_not_of(' ') + 1);
     out += line + "\n";
@@ -70,6 +69,12 @@ void Output::item(const Json& item) {
 void Output::line(std::string_view text) {
   if (m_json) return;
   Write(ForTerminal(text) + "\n");
+}
+
+void Output::line(std::string_view before, std::string_view word, Mood mood,
+                  std::string_view after) {
+  if (m_json) return;
+  Write(ForTerminal(before) + Coloured(ForTerminal(word), mood) + ForTerminal(after) + "\n");
 }
 
 void Output::print(const Table& table) {

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "tools/common/Commands.h"
+#include "tools/common/Terminal.h"
 
 // What a command prints: text for people or, with --json, one document for programs:
 //
@@ -41,13 +42,17 @@ class Table {
  public:
   Table() = default;
   explicit Table(std::vector<std::string> header) { add(std::move(header)); }
-  // Cells are made safe for the terminal.
-  void add(std::vector<std::string> cells);
+  // Cells are made safe for the terminal. The first one is shown in the colour of the mood.
+  void add(std::vector<std::string> cells, Mood mood = Mood::Plain);
   // Lines with their ends.
   std::string text() const;
 
  private:
-  std::vector<std::vector<std::string>> m_rows;
+  struct Row {
+    std::vector<std::string> cells;
+    Mood mood;
+  };
+  std::vector<Row> m_rows;
 };
 
 // The output of one command. With --json, text is not printed; without, items are not.
@@ -64,6 +69,8 @@ class Output {
   void item(const Json& item);
   // One line of text, which is made safe for the terminal.
   void line(std::string_view text);
+  // The same, of three parts, the middle one in the colour of the mood.
+  void line(std::string_view before, std::string_view word, Mood mood, std::string_view after);
   void print(const Table& table);
   // Text that is printed as it is: scripts.
   void raw(std::string_view text);

@@ -1,6 +1,9 @@
 #include "tools/common/Terminal.h"
 
 #include <stdio.h>
+#include <stdlib.h>
+#include <string.h>
+#include <unistd.h>
 #include <wchar.h>
 
 namespace vltctl {
@@ -61,6 +64,27 @@ size_t DisplayWidth(std::string_view text) {
     text.remove_prefix(isCharacter ? size : 1);
   }
   return width;
+}
+
+bool ShowsColours() {
+  auto isSet = [](const char* name) {
+    const char* value = getenv(name);
+    return value && *value;
+  };
+  auto is = [](const char* name, const char* value) {
+    const char* found = getenv(name);
+    return found && strcmp(found, value) == 0;
+  };
+  if (isSet("NO_COLOR")) return false;
+  if (isSet("CLICOLOR_FORCE") && !is("CLICOLOR_FORCE", "0")) return true;
+  return isatty(STDOUT_FILENO) && !is("TERM", "dumb");
+}
+
+std::string Coloured(std::string_view text, Mood mood) {
+  static const bool shows = ShowsColours();
+  constexpr const char* kCodes[] = {"", "\x1B[32m", "\x1B[33m", "\x1B[31m"};
+  if (!shows || mood == Mood::Plain) return std::string(text);
+  return kCodes[static_cast<int>(mood)] + std::string(text) + "\x1B[0m";
 }
 
 }  // namespace vltctl

@@ -16,4 +16,14 @@ std::string ForTerminal(std::string_view text);
 // for those that combine with the one before.
 size_t DisplayWidth(std::string_view text);
 
+// What a word is like, which a terminal shows in green, yellow or red.
+enum class Mood { Plain, Good, Doubtful, Bad };
+
+// Whether standard output shows colours: a terminal does, unless NO_COLOR is set; CLICOLOR_FORCE makes
+// everything do.
+bool ShowsColours();
+
+// The text in the colour of the mood, where colours are shown.
+std::string Coloured(std::string_view text, Mood mood);
+
 }  // namespace vltctl

@@ -22,8 +22,10 @@ void Show(const Json& component, const Verdict& verdict, Output& output) {
   item["messages"] = verdict.messages;
   item["notes"] = verdict.notes;
   output.item(item);
-  output.line(component["type"].get<std::string>() + " " + component["name"].get<std::string>() +
-              ": " + (verdict.code.empty() ? "sound" : "NOT SOUND"));
+  const std::string name =
+      component["type"].get<std::string>() + " " + component["name"].get<std::string>();
+  bool isSound = verdict.code.empty();
+  output.line(name + ": ", isSound ? "sound" : "NOT SOUND", isSound ? Mood::Good : Mood::Bad, "");
   for (const std::string& text : verdict.messages) output.line("  " + text);
   for (const std::string& text : verdict.notes) output.line("    " + text);
   output.flush();

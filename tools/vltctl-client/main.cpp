@@ -6,6 +6,7 @@
 
 #include "tools/common/Locale.h"
 #include "tools/common/Program.h"
+#include "tools/common/Progress.h"
 #include "tools/vltctl-client/Check.h"
 #include "tools/vltctl-client/Component.h"
 #include "tools/vltctl-client/ListOnce.h"
@@ -144,10 +145,14 @@ int Check(const Arguments& arguments, Output& output) {
   const std::string word = arguments.text("COMPONENT");
   if (!word.empty()) components = Chosen(components, word);
   size_t bad = 0;
+  vltctl::Progress progress("checking", components.size());
   vltctl::CheckComponents(components, options, [&](const Component& c, const vltctl::Verdict& v) {
     if (!v.code.empty()) ++bad;
+    progress.clear();
     if (!v.code.empty() || !arguments.has("--only-bad")) vltctl::Show(ToJson(c), v, output);
+    progress.step();
   });
+  progress.clear();
   output.line(vltctl::Summary(components.size(), bad));
   return bad == 0 ? kGood : kNotFound;
 }

@@ -24,6 +24,11 @@ namespace {
 enum class Level { Ok, Warn, Bad };
 constexpr const char* kLevels[] = {"ok", "warn", "BAD"};
 
+vltctl::Mood MoodOf(Level level) {
+  if (level == Level::Ok) return vltctl::Mood::Good;
+  return level == Level::Warn ? vltctl::Mood::Doubtful : vltctl::Mood::Bad;
+}
+
 struct Sign {
   Level level;
   std::string code, what, where, next;
@@ -166,7 +171,7 @@ int Doctor(const Arguments&, Output& output) {
   for (const Sign& sign : signs) {
     const char* level = kLevels[static_cast<int>(sign.level)];
     isBad = isBad || sign.level == Level::Bad;
-    table.add({level, sign.what, sign.where, sign.next});
+    table.add({level, sign.what, sign.where, sign.next}, MoodOf(sign.level));
     output.item({{"level", level},
                  {"code", sign.code},
                  {"what", sign.what},

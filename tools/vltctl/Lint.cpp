@@ -154,8 +154,9 @@ void Linter::say(size_t line, Level level, const char* code, const std::string& 
                  const std::string& next) {
   bool isError = level == Level::Error;
   ++(isError ? m_tally.errors : m_tally.warnings);
-  m_output.line(m_file + ":" + std::to_string(line) + ": " + (isError ? "error: " : "warning: ") +
-                text + (next.empty() ? "" : "; " + next));
+  m_output.line(m_file + ":" + std::to_string(line) + ": ", isError ? "error" : "warning",
+                isError ? vltctl::Mood::Bad : vltctl::Mood::Doubtful,
+                ": " + text + (next.empty() ? "" : "; " + next));
   m_output.item({{"file", m_file},
                  {"line", line},
                  {"level", isError ? "error" : "warning"},

@@ -35,6 +35,12 @@ ExitCode CodeOf(const GuardedIniState& state) {
   return state.opening == Opening::Begins ? vltctl::kNotFound : vltctl::kDataUnusable;
 }
 
+vltctl::Mood MoodOf(const GuardedIniState& state) {
+  if (CodeOf(state) == vltctl::kDataUnusable) return vltctl::Mood::Bad;
+  bool isUsual = state.kind == Kind::Sound || state.kind == Kind::NoSidecar;
+  return isUsual ? vltctl::Mood::Good : vltctl::Mood::Doubtful;
+}
+
 std::vector<std::string> FilesOf(const Arguments& arguments) {
   std::vector<std::string> files = arguments.list("FILE");
   if (!files.empty() && HasChosenRoot()) {
@@ -74,7 +80,8 @@ int Verify(const Arguments& arguments, Output& output) {
                  {"opening", opening.code},
                  {"nextOpen", opening.text},
                  {"next", OrNull(words.next)}});
-    output.line(file + ": " + Sentence(state) + "; the next open " + opening.text);
+    output.line(file + ": ", Sentence(state), MoodOf(state),
+                std::string("; the next open ") + opening.text);
     if (*words.next) output.line("  " + std::string(words.next));
     code = std::max<int>(code, CodeOf(state));
   }
