@@ -47,7 +47,7 @@ if(TARGET vltctl)
   install(FILES ${completions}/vltctl.fish
     DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d)
 endif()
-foreach(section 1 7)
+foreach(section 1 3 5 7)
   file(GLOB manuals ${PROJECT_SOURCE_DIR}/man/*.${section})
   install(FILES ${manuals} DESTINATION ${CMAKE_INSTALL_MANDIR}/man${section})
 endforeach()

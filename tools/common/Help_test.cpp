@@ -4,7 +4,9 @@
 
 #include <algorithm>
 
+#include <regex>
 #include <set>
+#include <sstream>
 
 #include "tests/support/Child.h"
 #include "tests/support/TempDir.h"
@@ -34,11 +36,26 @@ TEST(Help, TheManualsAreClean) {
   if (RunProgram({"sh", "-c", "command -v mandoc"}).exitCode != 0) {
     GTEST_SKIP() << "NOT TESTED: mandoc is not installed";
   }
-  for (const char* manual : {"/man/vltctl.1", "/man/vltutils.7"}) {
+  for (const char* manual : {"/man/vltctl.1", "/man/vltutils.3", "/man/Info.vlr.5",
+                             "/man/kor.ini.5", "/man/vlt.vlr.5", "/man/vltutils.7"}) {
     auto result = RunProgram({"mandoc", "-T", "lint", kSource + manual});
     EXPECT_EQ(result.out, "");
     EXPECT_EQ(result.exitCode, 0);
   }
+}
+
+TEST(Help, TheManualOfTheLibraryNamesEachExport) {
+  const std::string manual = ReadBytes(kSource + "/man/vltutils.3");
+  std::istringstream map(ReadBytes(kSource + "/cmake/exports.map"));
+  const std::regex function("\\s*(vlt\\w+);");
+  std::smatch name;
+  int count = 0;
+  for (std::string line; std::getline(map, line);) {
+    if (!std::regex_match(line, name, function)) continue;
+    ++count;
+    EXPECT_NE(manual.find(".B " + name[1].str() + "\n"), std::string::npos) << name[1];
+  }
+  EXPECT_GE(count, 60);
 }
 
 TEST(Help, NamesEachCommandAndEachArgument) {
