@@ -16,7 +16,7 @@ namespace {
 std::wstring ToWide(const std::string& text, const char* from, size_t room = 64) {
   std::vector<wchar_t> out(room + 1, L'#');
   wchar_t* end = out.data() + room;
-  IConv(text.data(), text.data() + text.size(), from, out.data(), end, "UTF-32LE");
+  IConv(text.data(), text.data() + text.size(), from, out.data(), end, kWideEncoding);
   EXPECT_EQ(out[room], L'#') << "written beyond the room";
   return std::wstring(out.data(), end);
 }
@@ -24,7 +24,7 @@ std::wstring ToWide(const std::string& text, const char* from, size_t room = 64)
 std::string ToNarrow(const std::wstring& text, const char* to, size_t room = 64) {
   std::vector<char> out(room + 1, '#');
   char* end = out.data() + room;
-  IConv(text.data(), text.data() + text.size(), "UTF-32LE", out.data(), end, to);
+  IConv(text.data(), text.data() + text.size(), kWideEncoding, out.data(), end, to);
   EXPECT_EQ(out[room], '#') << "written beyond the room";
   return std::string(out.data(), end);
 }

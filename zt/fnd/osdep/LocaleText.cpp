@@ -7,7 +7,6 @@
 
 #include <langinfo.h>
 
-#include <bit>
 #include <cstring>
 #include <cwchar>
 #include <memory>
@@ -20,9 +19,6 @@ namespace zt::fnd::osdep {
 namespace {
 
 using SafeCount = SafeInteger<uint32_t>;
-
-constexpr const char* kWideCode =
-    std::endian::native == std::endian::little ? "UTF-32LE" : "UTF-32BE";
 // Of UTF-8; no encoding of a locale has longer ones.
 constexpr uint32_t kMostBytesPerCharacter = 4;
 
@@ -182,13 +178,13 @@ uint32_t GetWideToAnsiRequiredBufferLength(const wchar_t* begin, const wchar_t* 
 uint32_t AnsiToWideNoAlloc(const char* begin, const char* end, const char* locale, wchar_t* dest,
                            wchar_t*& destEnd) {
   const char* const encoding = EncodingOf(locale);
-  return Convert(begin, end, encoding, dest, destEnd, encoding, kWideCode);
+  return Convert(begin, end, encoding, dest, destEnd, encoding, kWideEncoding);
 }
 
 uint32_t WideToAnsiNoAlloc(const wchar_t* begin, const wchar_t* end, const char* locale, char* dest,
                            char*& destEnd) {
   const char* const encoding = EncodingOf(locale);
-  return Convert(begin, end, encoding, dest, destEnd, kWideCode, encoding);
+  return Convert(begin, end, encoding, dest, destEnd, kWideEncoding, encoding);
 }
 
 void AnsiToWide(const char* begin, const char* end, const char* locale, wchar_t*& out,

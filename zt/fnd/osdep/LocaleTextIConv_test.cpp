@@ -15,8 +15,6 @@ namespace {
 
 using vlt::test::ScopedLocale;
 
-constexpr char kWide[] = "UTF-32LE";
-
 // What is beyond the end shows that nothing was written there.
 template <class Out, class Converter>
 std::basic_string<Out> Converted(size_t room, Converter convert) {
@@ -35,7 +33,7 @@ std::wstring WideByHand(const std::string& text, size_t room) {
 
 std::wstring WideByIConv(const std::string& text, size_t room) {
   return Converted<wchar_t>(room, [&](wchar_t* dest, wchar_t*& end) {
-    IConv(text.data(), text.data() + text.size(), "", dest, end, kWide);
+    IConv(text.data(), text.data() + text.size(), "", dest, end, kWideEncoding);
   });
 }
 
@@ -47,7 +45,7 @@ std::string NarrowByHand(const std::wstring& text, size_t room) {
 
 std::string NarrowByIConv(const std::wstring& text, size_t room) {
   return Converted<char>(room, [&](char* dest, char*& end) {
-    IConv(text.data(), text.data() + text.size(), kWide, dest, end, "");
+    IConv(text.data(), text.data() + text.size(), kWideEncoding, dest, end, "");
   });
 }
 
