@@ -19,6 +19,7 @@
 #include <system_error>
 #include <utility>
 
+#include "tests/support/Emulation.h"
 #include "tests/support/PrivateRoot.h"
 
 namespace {
@@ -90,5 +91,6 @@ bool ListsOnly(int argc, char** argv) {
 int main(int argc, char** argv) {
   if (!getenv(kInside) && !ListsOnly(argc, argv)) return RunInside(argv);
   testing::InitGoogleTest(&argc, argv);
+  if (!ListsOnly(argc, argv)) vlt::test::LeaveOutBeyondEmulators();
   return RUN_ALL_TESTS();
 }

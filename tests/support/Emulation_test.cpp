@@ -1,0 +1,23 @@
+#include "tests/support/Emulation.h"
+
+#include <gtest/gtest.h>
+
+namespace vlt::test {
+namespace {
+
+TEST(Emulation, AKernelsOwnProcessorIsNotEmulated) {
+#if defined(__x86_64__) || defined(__i386__)
+  EXPECT_FALSE(IsEmulated());
+#else
+  GTEST_SKIP() << "NOT TESTED: this processor may be emulated";
+#endif
+}
+
+TEST(Emulation, WhatAnEmulatorCannotDoHasAReason) {
+  EXPECT_EQ(BeyondEmulators("ByteOrder.PutAndGetAreLittleEndianAtAnyPlace"), nullptr);
+  EXPECT_STREQ(BeyondEmulators("FileReplace.AFailedSyncIsAFailedSave"),
+               "the emulator knows no filter of system calls");
+}
+
+}  // namespace
+}  // namespace vlt::test
