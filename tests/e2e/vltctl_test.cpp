@@ -46,6 +46,12 @@ TEST(Vltctl, HelpAndVersionAreGoodAndGoToStandardOutput) {
   EXPECT_NE(help.out.find("--json"), std::string::npos);
 }
 
+TEST(Vltctl, HelpAndVersionAsJson) {
+  EXPECT_EQ(VltctlJson({"--version"}).items.at(0), (json{{"version", "1.0.0"}}));
+  std::string help = VltctlJson({"list", "--help"}).items.at(0)["help"];
+  EXPECT_EQ(help.find("vltctl list "), 0u) << help;
+}
+
 TEST(Vltctl, BadArgumentsAreUsageErrorsAndStartNothing) {
   Installation i;
   const std::vector<std::vector<std::string>> rows = {{},

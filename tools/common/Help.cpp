@@ -212,13 +212,42 @@ Offers OffersOf(const Command& command) {
   for (const Argument* option : OptionsOf(command)) {
     if (!option->isPositional())
       out.words += (out.words.empty() ? "" : " ") + std::string(option->name);
-    if (!option->offers) continue;
+    if (!option->offers || option->value) continue;
     std::string_view offers = option->offers;
     out.files = out.files || offers == kFiles;
     out.directories = out.directories || offers == kDirectories;
     if (offers != kFiles && offers != kDirectories) out.words += " " + std::string(offers);
   }
   return out;
+}
+
+// Options with a value, each name once: what follows one is its value.
+std::vector<const Argument*> ValuedOptions() {
+  std::vector<const Argument*> out;
+  for (const Command& command : Commands()) {
+    for (const Argument& argument : command.arguments) {
+      bool isKnown = std::any_of(out.begin(), out.end(), [&](const Argument* known) {
+        return std::string_view(known->name) == argument.name;
+      });
+      if (argument.value && !isKnown) out.push_back(&argument);
+    }
+  }
+  return out;
+}
+
+bool OffersDirectories(const Argument& argument) {
+  return argument.offers == std::string_view(kDirectories);
+}
+
+std::string BashValues() {
+  std::string out = "  case ${COMP_WORDS[COMP_CWORD - 1]} in\n";
+  for (const Argument* option : ValuedOptions()) {
+    bool isDirectory = option->offers && OffersDirectories(*option);
+    std::string words = option->offers && !isDirectory ? option->offers : "";
+    out += std::string("    ") + option->name + ") words=\"" + words +
+           "\" kind=" + (isDirectory ? "-d" : "") + " ;;\n";
+  }
+  return out + "  esac\n";
 }
 
 std::string Bash() {
@@ -248,11 +277,10 @@ std::string Bash() {
     out += "    '" + std::string(command.name) + "') words=\"" + offers.words +
            (below.empty() ? "" : " " + below) + "\"";
     if (offers.files) out += " kind=-f";
-    if (offers.directories && !offers.files) out += " kind=-d";
+    if (offers.directories) out += " kind=-d";
     out += " ;;\n";
   }
-  return out +
-         "  esac\n"
+  return out + "  esac\n" + BashValues() +
          "  mapfile -t COMPREPLY < <(compgen -W \"$words\" -- \"$current\"\n"
          "    [[ -z $kind ]] || compgen $kind -- \"$current\")\n"
          "  [[ -z $kind ]] || compopt -o filenames\n"
@@ -284,14 +312,26 @@ std::string ZshList(const std::vector<NamedWord>& words) {
   return out;
 }
 
+std::string ZshValues() {
+  std::string out = "case $words[CURRENT-1] in\n";
+  for (const Argument* option : ValuedOptions()) {
+    std::string offer = !option->offers ? ""
+                        : OffersDirectories(*option)
+                            ? "_files -/; "
+                            : std::string("compadd -- ") + option->offers + "; ";
+    out += std::string("  ") + option->name + ") " + offer + "return ;;\n";
+  }
+  return out + "esac\n";
+}
+
 std::string Zsh() {
   std::string out =
       "#compdef vltctl\n# Completion of vltctl for zsh, made by \"vltctl completion zsh\".\n"
       "local -a commands\nlocal key=$words[2]\n"
       "(( CURRENT == 2 )) && key=\n"
-      "(( CURRENT > 3 )) && key+=\" $words[3]\"\n"
-      "case $key in\n  '')\n    commands=(\n" +
-      ZshList(FirstWords()) + "    )\n    _describe command commands\n    ;;\n";
+      "(( CURRENT > 3 )) && key+=\" $words[3]\"\n" +
+      ZshValues() + "case $key in\n  '')\n    commands=(\n" + ZshList(FirstWords()) +
+      "    )\n    _describe command commands\n    ;;\n";
   for (const NamedWord& first : FirstWords()) {
     if (WordsBelow(first.word).empty()) continue;
     const Command* command = FindCommand(first.word);
@@ -323,6 +363,12 @@ std::string FishQuoted(std::string_view text) {
   return out + "'";
 }
 
+std::string FishValues(const Argument& option) {
+  if (!option.value || !option.offers) return "";
+  return OffersDirectories(option) ? " -a '(__fish_complete_directories)'"
+                                   : std::string(" -a '") + option.offers + "'";
+}
+
 std::string FishOption(const std::string& condition, const Argument& option) {
   if (option.isPositional()) {
     if (!option.offers || option.offers == std::string_view(kFiles)) return "";
@@ -332,7 +378,8 @@ std::string FishOption(const std::string& condition, const Argument& option) {
   }
   return "complete -c vltctl -n " + condition + " -l " + (option.name + 2) +
          (option.letter ? std::string(" -s ") + (option.letter + 1) : "") +
-         (option.value ? " -x" : "") + " -d " + FishQuoted(option.summary) + "\n";
+         (option.value ? " -x" : "") + FishValues(option) + " -d " + FishQuoted(option.summary) +
+         "\n";
 }
 
 std::string Fish() {

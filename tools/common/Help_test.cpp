@@ -118,6 +118,12 @@ TEST(Help, BashCompletesCommandsOptionsAndWords) {
   }
 }
 
+TEST(Help, BashCompletesTheValueOfAnOption) {
+  EXPECT_EQ(Completed({"list", "--type", "d"}), "dictionary ");
+  EXPECT_EQ(Completed({"verify", "--root", kSource + "/m"}), kSource + "/man ");
+  EXPECT_EQ(Completed({"watch", "--count", ""}), " ");
+}
+
 TEST(Help, BashCompletesFiles) {
   std::string completed = Completed({"verify", kSource + "/man/vltctl."});
   EXPECT_EQ(completed, kSource + "/man/vltctl.1 ");
