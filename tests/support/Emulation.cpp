@@ -11,6 +11,7 @@
 namespace vlt::test {
 namespace {
 
+constexpr const char* kAccess = "the emulator gives a descriptor without access the right to read";
 constexpr const char* kLimit = "the emulator keeps no limit of memory";
 constexpr const char* kFilter = "the emulator knows no filter of system calls";
 constexpr const char* kState = "/proc shows the emulator's waits, not the program's";
@@ -23,8 +24,22 @@ struct Row {
 constexpr Row kRows[] = {
     {"AutoBuffer.FailedAllocationLeavesTheBytes", kLimit},
     {"BinaryFile.ExactTransferSurvivesSignals", kState},
+    {"BinaryFile.ModesOpenAsToldBitByBit", kAccess},
     {"CztMemoryStream.WithoutMemoryNothingChanges", kLimit},
     {"FileReplace.AFailedSyncIsAFailedSave", kFilter},
+    {"Files.SyncReportsRealFailuresOnly", kFilter},
+    {"Files.TheRuleHoldsWithoutTheKernelsOwnWalk", kFilter},
+    {"NamedEvent.AutomaticSetReleasesOneOfThreeWaiters", kState},
+    {"NamedEvent.ManualSetReleasesAllWaitersInAllProcessesAndStays", kState},
+    {"NamedEvent.PulseBetweenTwoLooksGoesUnseen", kState},
+    {"NamedEvent.PulseReleasesThoseWhoWaitWithoutLimit", kState},
+    {"NamedEvent.TimedWaitSeesASignal", kState},
+    {"NamedEvent.TimedWaitSleeps50MsAndThenTheRest", kFilter},
+    {"String.GrowthFallsBackToTheExactSizeWhenMemoryIsShort", kLimit},
+    {"String.WithoutMemoryEveryOperationFailsAndChangesNothing", kLimit},
+    {"vlTracer.AFailedLockDoesNotStopTheOutput", kFilter},
+    {"vlTracerFork.ChildOfAForkDuringAWriteKeepsNoLock", kState},
+    {"vlTracerHostile.TheEndDoesNotWaitForAWriteThatDoesNotEnd", kState},
 };
 
 // By the positive patterns of a filter, "a*:b.c-d".
