@@ -6,8 +6,8 @@ namespace vlt::test {
 // then those of the emulator.
 bool IsEmulated();
 
-// Why such an emulator cannot run the test, named "Suite.Name"; null if it can. docs/platform.md has the
-// counts.
+// Why such an emulator cannot run the test, named "Suite.Name"; null if it can. docs/platform.md has
+// the counts.
 const char* BeyondEmulators(const char* test);
 
 // Under an emulator takes these tests out of the run, and says so for each. For main(), after

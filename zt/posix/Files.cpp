@@ -276,8 +276,8 @@ int RenameToNew(int directory, const char* from, const char* to) {
   // the file under two names for a moment, which SetSharedMode refuses to touch.
   int result = RenameInOneStep(directory, from, to);
   if (result == 0 || (errno != ENOSYS && errno != EINVAL && errno != EPERM)) return result;
-  // Some systems have no such call, and some file systems do not know the flag. The name is examined first; a race here would need two
-  // files set aside at one moment under the file's lock.
+  // Some systems have no such call, and some file systems do not know the flag. The name is examined
+  // first; a race here would need two files set aside at one moment under the file's lock.
   struct stat info;
   if (fstatat(directory, to, &info, AT_SYMLINK_NOFOLLOW) == 0) {
     errno = EEXIST;

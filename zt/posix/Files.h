@@ -111,8 +111,8 @@ int MakeRoom(const char* path);
 
 // ---- Modes
 
-// Gives the file or directory of the descriptor (that of a Found will do) these bits by rule 3, unless it
-// has them: EPERM or EMLINK for what the rule excludes.
+// Gives the file or directory of the descriptor (that of a Found will do) these bits by rule 3,
+// unless it has them: EPERM or EMLINK for what the rule excludes.
 int SetSharedMode(int fd, mode_t mode);
 
 // The same where fstat() of the descriptor is known.

@@ -1,5 +1,5 @@
-// An O_PATH descriptor fixes a file without opening it, and the path of the descriptor in /proc opens
-// that very file later.
+// An O_PATH descriptor fixes a file without opening it, and the path of the descriptor in /proc
+// opens that very file later.
 #include "zt/posix/HeldFiles.h"
 
 #include <linux/openat2.h>

@@ -1,6 +1,6 @@
 // pthread_mutex_timedlock waits by the time of day, which may be set while it waits. So it waits in
-// slices, and the moment is compared with the monotonic clock: only a clock that is set back within a
-// slice lengthens the wait.
+// slices, and the moment is compared with the monotonic clock: only a clock that is set back within
+// a slice lengthens the wait.
 #include <algorithm>
 #include <ctime>
 

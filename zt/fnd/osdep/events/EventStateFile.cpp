@@ -1,5 +1,5 @@
-// Fields are copied one by one, and no structure is laid over the bytes: the records have no padding,
-// so that most fields are unaligned, and compilers of 32 and 64 bits would lay out structures
+// Fields are copied one by one, and no structure is laid over the bytes: the records have no
+// padding, so that most fields are unaligned, and compilers of 32 and 64 bits would lay out structures
 // differently.
 #include "zt/fnd/osdep/events/EventStateFile.h"
 

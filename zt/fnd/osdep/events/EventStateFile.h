@@ -6,7 +6,8 @@
 
 // The bytes of the two kinds of file in "namedEvent/" of the shared directory.
 //
-// All numbers are little-endian, field after field, without padding, and the same on every host. docs/event-files.md shows them in worked examples.
+// All numbers are little-endian, field after field, without padding, and the same on every host.
+// docs/event-files.md shows them in worked examples.
 namespace zt::fnd::osdep {
 
 constexpr uint32_t kSlotsPerSet = 128;
