@@ -68,6 +68,7 @@ constexpr Argument kSettingsSet[] = {
     {"VALUE", nullptr, "What it is to be", true},
     kRoot};
 constexpr Argument kVerify[] = {
+    {"--content", nullptr, "Registration files instead: whether the database has what they say"},
     {"--all", nullptr, "The database, the jar and the settings; so it is without files too"},
     {"FILE", nullptr, "An INI file", false, true, kFiles},
     kRoot};

@@ -85,11 +85,11 @@ void CheckDatabase(const vlt::snapshot::Database& database) {
                 {words.code, database.path, words.found, WhyOf(state), words.next});
 }
 
+}  // namespace
+
 std::string Plural(unsigned count, const std::string& what) {
   return std::to_string(count) + " " + what + (count == 1 ? "" : "s");
 }
-
-}  // namespace
 
 Snapshot ReadComponents(Output& output) {
   Snapshot snapshot = ReadSnapshot();

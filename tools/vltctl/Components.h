@@ -59,6 +59,9 @@ bool IsHere(const std::string& file);
 // its own code. One outside of an image is another machine's, and has none here.
 std::string LibraryOf(const std::string& file);
 
+// "1 file", "2 files".
+std::string Plural(unsigned count, const std::string& what);
+
 // For --live: waits, for at most --wait seconds, until no other process has the registrar. Throws
 // vltctl::Failure with kBusy. A process that takes it right after that is waited for by the library.
 void WaitForRegistrar(const Arguments& arguments);

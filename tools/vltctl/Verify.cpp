@@ -12,6 +12,7 @@
 #include "source/Cmd5vlt.h"
 #include "source/Common/vltFileSecurity.h"
 #include "source/DurableCopy.h"
+#include "tools/vltctl/Content.h"
 #include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Reading.h"
 #include "tools/vltctl/Root.h"
@@ -68,6 +69,7 @@ std::string Sentence(const GuardedIniState& state) {
 }  // namespace
 
 int Verify(const Arguments& arguments, Output& output) {
+  if (arguments.has("--content")) return VerifyContent(arguments, output);
   int code = vltctl::kGood;
   for (const std::string& file : FilesOf(arguments)) {
     GuardedIniState state = Inspect(file);

@@ -12,11 +12,11 @@
 
 #include "source/Database/databaseText.h"
 #include "source/Snapshot/Opened.h"
-#include "source/Snapshot/Tree.h"
 #include "tools/common/Locale.h"
 #include "tools/common/LockHolder.h"
 #include "tools/vltctl/Claims.h"
 #include "tools/vltctl/Components.h"
+#include "tools/vltctl/Content.h"
 #include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Library.h"
 #include "tools/vltctl/Reading.h"
@@ -207,7 +207,7 @@ class Judge {
       return {"overlaid-by", claim.key, from, "brings a component of that name, too, and counts",
               "give one of them another name"};
     }
-    if (sectionWouldChange(claim)) {
+    if (ItemsAfterMerge(m_opened, file, claim.key) != ItemsOf(m_document, claim.key)) {
       return {"stamp-equal-but-changed", claim.key, file,
               "was changed and has the time that is remembered, so that no start reads it",
               "touch the file"};
@@ -228,28 +228,6 @@ class Judge {
     }
     return {"not-yet-scanned", claim.key, file, "is new or changed since the last start",
             "start a program that uses the registrar, or \"vltctl list --live\""};
-  }
-
-  // Whether merging the file would give the component other items than the database has.
-  bool sectionWouldChange(const Claim& claim) const {
-    vlt::snapshot::Rehearsal rehearsal(m_opened.bytes, m_opened.place);
-    for (const auto& file : vlt::snapshot::ReadTree(m_opened.place).files) {
-      if (file.here == claim.bundle->file) rehearsal.merge(file.recorded, file.time);
-    }
-    return itemsOf(rehearsal.document(), claim.key) != itemsOf(m_document, claim.key);
-  }
-
-  static std::vector<std::string> itemsOf(const IniDocument& document, const std::string& section) {
-    std::vector<std::string> items;
-    for (int n = 1; n <= document.GetNumberOfItems(section.c_str()); ++n) {
-      std::string item, value;
-      if (document.GetNthItemName(section.c_str(), n, &item) < 0) continue;
-      document.GetItem(section.c_str(), item.c_str(), &value);
-      // What a client acknowledges, and what a start completes.
-      if (item != registrar::kFragmentRegistered) items.push_back(item + "=" + value);
-    }
-    std::sort(items.begin(), items.end());
-    return items;
   }
 
   Verdict ofComponent(const Component& c) const {
