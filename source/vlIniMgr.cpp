@@ -18,6 +18,7 @@
 #include <unistd.h>
 
 #include <new>
+#include <utility>
 #include <vector>
 
 #include "source/Cmd5vlt.h"
@@ -110,7 +111,7 @@ void CvlIniMgr::Initialize(unsigned char const* digest) {
   if (m_lockOnly) return;
   ScopedFd fd = OpenForReading(m_fileName);
   if (fd.valid()) {
-    if (!ValidateFile(fd.get(), digest)) CleanupAndThrow(false);
+    if (!ValidateFile(fd.get(), digest, &m_validated)) CleanupAndThrow(false);
     // By the path, so that what a link leads to keeps its mode.
     zt::posix::SetSharedMode(m_fileName.c_str(), kSharedMode);
   } else if (errno == ENOENT) {
@@ -153,16 +154,27 @@ void CvlIniMgr::GetMD5Checksum(const unsigned char* data, unsigned long lengthBy
   md5.getDigest(digest);
 }
 
-bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest) {
+bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest, Digested* validated) {
   if (!digest) return true;
   // What cannot be checked is not accepted.
   return vlt::Attempt<std::bad_alloc>([&] {
-    std::vector<unsigned char> data;
-    if (!ReadWhole(fd, GetFileLength(fd), &data)) return false;
-    IniSidecar::Digest found;
-    GetMD5Checksum(data.data(), data.size(), found.data());
-    return memcmp(found.data(), digest, found.size()) == 0;
+    Digested found;
+    if (!ReadWhole(fd, GetFileLength(fd), &found.bytes)) return false;
+    GetMD5Checksum(found.bytes.data(), found.bytes.size(), found.digest.data());
+    if (memcmp(found.digest.data(), digest, found.digest.size()) != 0) return false;
+    *validated = std::move(found);
+    return true;
   });
+}
+
+// A start that finds nothing new saves what it has read. Comparing that is much quicker than MD5.
+IniSidecar::Digest CvlIniMgr::digestOf(const unsigned char* text, size_t sizeBytes) {
+  Digested known = std::exchange(m_validated, Digested());
+  if (sizeBytes == 0 || known.bytes.size() != sizeBytes ||
+      memcmp(known.bytes.data(), text, sizeBytes) != 0) {
+    GetMD5Checksum(text, sizeBytes, known.digest.data());
+  }
+  return known.digest;
 }
 
 namespace {
@@ -188,7 +200,8 @@ CvlIniMgr::Finding CvlIniMgr::Inspect(const std::string& fileName, const unsigne
     int error = errno;
     return {error == ENOENT ? Found::Missing : Found::NotReadable, error};
   }
-  if (!ValidateFile(fd.get(), digest)) return {Found::OtherDigest};
+  Digested ignored;
+  if (!ValidateFile(fd.get(), digest, &ignored)) return {Found::OtherDigest};
   OwnedIni document(NewDocument());
   int32_t status = document ? IniReadFromDescriptor(document.get(), fileName.c_str(), fd.get())
                             : kIniOutOfMemory;
@@ -301,12 +314,16 @@ HRESULT CvlIniMgr::writeDocument(IniSidecar::Digest* digest, bool* isInPlace) {
   if (!m_ini || !ownsLock()) return E_FAIL;
   // The changes may have been made to what the file no longer is.
   if (m_lockWasLost && !isUnchanged(stateOfFile())) return E_FAIL;
+  struct Wanted {
+    CvlIniMgr* of;
+    IniSidecar::Digest* digest;
+  } wanted = {this, digest};
   IniTextFunction takeDigest = [](void* context, const char* text, size_t sizeBytes) {
-    GetMD5Checksum(reinterpret_cast<const unsigned char*>(text), sizeBytes,
-                   static_cast<IniSidecar::Digest*>(context)->data());
+    auto* to = static_cast<Wanted*>(context);
+    *to->digest = to->of->digestOf(reinterpret_cast<const unsigned char*>(text), sizeBytes);
   };
   int32_t status = IniWriteToFileAndTell(m_ini, m_fileName.c_str(), digest ? takeDigest : nullptr,
-                                         digest, &m_known);
+                                         &wanted, &m_known);
   *isInPlace = m_known.isKnown();
   if (!*isInPlace) m_known = stateOfFile();
   return status == 0 ? S_OK : E_FAIL;

@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "source/Common/vltTypes.h"
 #include "source/IniDocument.h"
@@ -102,7 +103,13 @@ class CvlIniMgr : public IniDocument {
  private:
   void Initialize(unsigned char const* digest);
   void CreateFile();
-  static bool ValidateFile(int fd, unsigned char const* digest);
+  // Bytes and their digest.
+  struct Digested {
+    std::vector<unsigned char> bytes;
+    IniSidecar::Digest digest = {};
+  };
+  static bool ValidateFile(int fd, unsigned char const* digest, Digested* validated);
+  IniSidecar::Digest digestOf(const unsigned char* text, size_t sizeBytes);
   static int32_t GetFileLength(int fd);
   static void GetMD5Checksum(const unsigned char* data, unsigned long lengthBytes,
                              unsigned char* digest);
@@ -123,7 +130,8 @@ class CvlIniMgr : public IniDocument {
   bool m_lockOnly;
   bool m_saveOnDestroy;
   IniDurability m_durability = IniDurability::Synced;
-  FileState m_known;           // of the file as it was last read or written
+  FileState m_known;     // of the file as it was last read or written
+  Digested m_validated;  // what was found good when the file was opened, until the first write
   bool m_lockWasLost = false;  // and the file has not been compared with m_known since
   std::unique_ptr<IniFileLock> m_lock;
 };

@@ -299,6 +299,24 @@ TEST(vlIniMgr, ChecksumIsThatOfTheFile) {
   EXPECT_EQ(ini.WriteAndGetChecksum(nullptr), E_POINTER);
 }
 
+// Opened with its digest, then saved three times: as it was, with other bytes of the same size, and as
+// it was at first.
+TEST(vlIniMgr, TheDigestIsThatOfWhatIsWritten) {
+  TempDir dir;
+  std::string file = dir / "x.ini";
+  WriteBytes(file, "[s]\na = 1\n");
+  const std::string expected = Unhex(Md5Sum(file));
+  CvlIniMgr ini(file.c_str(), false, reinterpret_cast<const unsigned char*>(expected.data()), false,
+                true);
+  for (const char* value : {"1", "2", "1"}) {
+    ini.SetItem("s", "a", value, false);
+    IniSidecar::Digest digest = {};
+    ASSERT_EQ(ini.WriteAndGetDigest(&digest), S_OK);
+    EXPECT_EQ(ReadBytes(file), std::string("[s]\na = ") + value + "\n");
+    EXPECT_EQ(Hex(std::string(digest.begin(), digest.end())), Md5Sum(file));
+  }
+}
+
 TEST(vlIniMgr, AVanishedFileFailsTheDigestAndIsSavedAgain) {
   TempDir dir;
   std::string file = dir / "x.ini";
