@@ -48,6 +48,8 @@ struct Stamp {
     low = static_cast<uint32_t>(ticks);
     high = static_cast<uint32_t>(ticks >> 32);
   }
+  std::string text() const { return Decimal(low) + " " + Decimal(high); }
+
   uint32_t low, high;
 };
 
@@ -60,6 +62,7 @@ bool Scan::isUpToDate(const std::string& file, const zt::fnd::AbsTime& time) {
   std::string stored;
   if (m_database.GetItem(kRegistrations, file.c_str(), &stored) < 0) return false;
   Stamp stamp(time);
+  if (stored == stamp.text()) return true;
   unsigned long low = 0, high = 0;
   // Any difference counts, not only a later time: a bundle that is replaced by an older one has
   // changed as well.
@@ -72,9 +75,7 @@ void Scan::setStamp(const std::string& file, const zt::fnd::AbsTime& time) {
     m_database.EraseItem(kRegistrations, file.c_str());
     return;
   }
-  Stamp stamp(time);
-  std::string text = Decimal(stamp.low) + " " + Decimal(stamp.high);
-  m_database.SetItem(kRegistrations, file.c_str(), text.c_str(), true);
+  m_database.SetItem(kRegistrations, file.c_str(), Stamp(time).text().c_str(), true);
 }
 
 void Scan::eraseComponentsOf(const std::string& file) {

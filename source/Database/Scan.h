@@ -1,8 +1,8 @@
 #pragma once
 
 #include <cstdint>
-#include <set>
 #include <string>
+#include <unordered_set>
 
 #include "source/Database/contentsWalk.h"
 #include "zt/fnd/AbsTime.h"
@@ -64,7 +64,7 @@ class Scan {
                  const std::string& file, const std::string& section, const std::string& item);
 
   IniDocument& m_database;
-  std::set<std::string> m_filesSeen;
+  std::unordered_set<std::string> m_filesSeen;
   ContentsFiles m_contentsFiles;
   bool m_droppedPlanted = false;
   bool m_isIncomplete = false;  // what was merged since beginFile

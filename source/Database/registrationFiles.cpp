@@ -1,6 +1,8 @@
 #include "source/Database/registrationFiles.h"
 
 #include <errno.h>
+#include <fcntl.h>
+#include <limits.h>
 #include <sys/stat.h>
 
 #include "source/Database/databaseText.h"
@@ -9,8 +11,8 @@
 #include "zt/fnd/osdep/FindFiles.h"
 #include "zt/fnd/osdep/OSException.h"
 #include "zt/fnd/osdep/path.h"
+#include "zt/posix/Files.h"
 
-using zt::fnd::AnsiString;
 using zt::fnd::String;
 using zt::fnd::Vector;
 using zt::fnd::osdep::path;
@@ -30,10 +32,30 @@ bool NamesNothing(int error) {
 // must not keep it from the others.
 bool MayNotLook(int error) { return error == EACCES || error == EPERM; }
 
-// One stat() answers both whether the file is there and how old it is.
-bool RegistrationTime(const String& file, zt::fnd::AbsTime* time) {
+// Looks at files below one directory, which is opened once: the kernel then walks the end of each
+// path only.
+class FilesBelow {
+ public:
+  explicit FilesBelow(const std::string& directory)
+      : m_prefix(directory), m_directory(zt::posix::OpenDirectory(directory.c_str())) {
+    if (m_prefix.empty() || m_prefix.back() != '/') m_prefix += '/';
+  }
+  // As stat(2), which does not find a path that is too long either.
+  int state(const std::string& file, struct stat* info) const {
+    const bool isBelow = m_directory && file.size() < PATH_MAX && file.starts_with(m_prefix);
+    return isBelow ? fstatat(m_directory.get(), file.c_str() + m_prefix.size(), info, 0)
+                   : stat(file.c_str(), info);
+  }
+
+ private:
+  std::string m_prefix;
+  zt::posix::ScopedFd m_directory;
+};
+
+// One call answers both whether the file is there and how old it is.
+bool RegistrationTime(const FilesBelow& files, const std::string& file, zt::fnd::AbsTime* time) {
   struct stat info;
-  if (stat(AnsiString(file).c_str(), &info) != 0) {
+  if (files.state(file, &info) != 0) {
     int error = errno;
     if (NamesNothing(error) || MayNotLook(error)) return false;
     ZT_RAISE(zt::fnd::osdep::PosixError(error));
@@ -50,18 +72,24 @@ bool RegistrationTime(const String& file, zt::fnd::AbsTime* time) {
 
 }  // namespace
 
-bool HasLineEnd(const std::string& text) { return text.find_first_of("\r\n") != std::string::npos; }
+bool HasLineEnd(const std::string& text) {
+  return text.find('\n') != std::string::npos || text.find('\r') != std::string::npos;
+}
 
 void AppendRegistrationFiles(const String& directory, const String& mask,
                              RegistrationFiles& files) {
   Vector<String> names = zt::fnd::osdep::FindFiles().getFilenames(path::Join(directory, mask));
+  if (names.empty()) return;
+  const FilesBelow below(Narrow(directory));
+  const String registrationFile(kRegistrationFile);
   for (const String& name : names) {
     String bundle = path::IsAbs(name) ? name : path::Join(directory, name);
-    String file = path::Join(bundle, String(kRegistrationFile));
+    String file = path::Join(bundle, registrationFile);
+    const std::string narrow = Narrow(file);
     // The path becomes the name of an item, where a line end would write lines of its own.
-    if (HasLineEnd(Narrow(file))) continue;
+    if (HasLineEnd(narrow)) continue;
     zt::fnd::AbsTime time;
-    if (RegistrationTime(file, &time)) files.push_back({file, time});
+    if (RegistrationTime(below, narrow, &time)) files.push_back({file, time});
   }
 }
 

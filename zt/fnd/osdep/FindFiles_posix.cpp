@@ -23,8 +23,14 @@ bool Has(Flags flags, Flags flag) {
   return (static_cast<uint32_t>(flags) & static_cast<uint32_t>(flag)) != 0;
 }
 
+// Equal to no other character, in whatever locale.
+bool HasNoCase(wchar_t c) {
+  return c < 0x80 && !(c >= L'a' && c <= L'z') && !(c >= L'A' && c <= L'Z');
+}
+
 bool SameCharacter(wchar_t a, wchar_t b) {
-  return a == b || StringCaseCompare(&a, &a + 1, &b, &b + 1) == 0;
+  if (a == b) return true;
+  return !HasNoCase(a) && !HasNoCase(b) && StringCaseCompare(&a, &a + 1, &b, &b + 1) == 0;
 }
 
 struct Mask {
