@@ -42,7 +42,7 @@ class vltStringResources {
   void forget();
 
  private:
-  struct Database;
+  class Database;
   // Null, after a word where that is asked for, if there is no install directory.
   Database* databaseFor(const std::string& file);
 
