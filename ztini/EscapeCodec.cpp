@@ -69,7 +69,10 @@ char* EncodeEscapes(const char* text) {
 }
 
 size_t DecodeEscapes(const char* text, char* out) {
-  size_t length = 0;
+  // Most values have no escapes at all.
+  size_t length = strcspn(text, "\\");
+  if (out) memcpy(out, text, length);
+  text += length;
   // One walk for counting and for writing, so that both agree on every malformed text.
   const auto emit = [&](char c) {
     if (out) out[length] = c;

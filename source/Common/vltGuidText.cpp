@@ -72,9 +72,14 @@ GUID vltGuidFromString2(const wchar_t* s) {
   // completed to a good one.
   if (wcschr(s, L'{')) {
     vltStringToGUID(s, &g);
-  } else {
-    vltStringToGUID((zt::fnd::String(L"{") + s + L"}").c_str(), &g);
+    return g;
   }
+  wchar_t text[] = L"{00000000-0000-0000-0000-000000000000}";
+  constexpr size_t kLengthInside = std::size(text) - 3;
+  // A text of another length is bad without braces as it is with them.
+  const bool fits = wcslen(s) == kLengthInside;
+  if (fits) wmemcpy(text + 1, s, kLengthInside);
+  vltStringToGUID(fits ? text : s, &g);
   return g;
 }
 

@@ -48,11 +48,12 @@ std::string ResourceTexts::TargetOf(const std::string& file) {
 
 // False for a section that names no file.
 bool ResourceTexts::fileNameOf(const char* section, std::string* base) {
-  if (!IniSectionExists(m_document, section)) {
+  IniSection* found = IniFindSection(m_document, section);
+  if (!found) {
     if (reports()) m_observer->noSection(section);
     return false;
   }
-  if (IniItemExists(m_document, section, kFileName) != 1) return false;
+  if (!IniFindEntry(found, 0, kFileName)) return false;
   char file[kFileNameSize];
   int32_t status = IniGetStringIntoBuffer(m_document, section, kFileName, file, sizeof file);
   if (status < 1) {
