@@ -13,7 +13,7 @@ constexpr size_t kMallocBytes = 16;
 
 }  // namespace
 
-void* Arena::record(size_t sizeBytes) {
+void* Arena::recordElsewhere(size_t sizeBytes) {
   if (sizeBytes > SIZE_MAX - alignof(void*)) return nullptr;
   // Records only: texts come down from the back and need no alignment, so that none is lost between
   // them.

@@ -19,7 +19,13 @@ class Arena {
   Arena& operator=(const Arena&) = delete;
 
   // Uninitialised bytes, aligned for a pointer; null without memory.
-  void* record(size_t sizeBytes);
+  void* record(size_t sizeBytes) {
+    if (sizeBytes > roomLeft() || sizeBytes % alignof(void*) != 0)
+      return recordElsewhere(sizeBytes);
+    char* place = m_front;
+    m_front += sizeBytes;
+    return place;
+  }
 
   // A terminated copy of the bytes; null without memory.
   char* text(const char* begin, size_t length);
@@ -32,6 +38,7 @@ class Arena {
     Block* next;
   };
 
+  void* recordElsewhere(size_t sizeBytes);
   char* addBlock(size_t sizeBytes);
   bool makeRoom(size_t sizeBytes);
   bool needsOwnBlock(size_t sizeBytes) const { return sizeBytes > m_nextBlockBytes / 4; }

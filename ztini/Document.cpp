@@ -12,17 +12,6 @@ namespace {
 
 constexpr size_t kScratchSize = 256;
 
-bool EnclosedIn(char quote, const char* value, size_t length) {
-  return length >= 2 && value[0] == quote && value[length - 1] == quote;
-}
-
-// The quote that the options have removed from the value; 0 for none.
-int32_t EnclosingQuote(const char* value, size_t length, int32_t readOptions) {
-  if ((readOptions & kIniReadDoubleQuotes) && EnclosedIn('"', value, length)) return '"';
-  if ((readOptions & kIniReadSingleQuotes) && EnclosedIn('\'', value, length)) return '\'';
-  return 0;
-}
-
 }  // namespace
 
 IniStructForwardReferenceTag* IniNew(int reserved) {
@@ -109,26 +98,6 @@ IniSection* IniReadSection(IniStructForwardReferenceTag* doc, char* name) {
   return section;
 }
 
-IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, size_t nameLength,
-                       char* value, size_t valueLength) {
-  void* place = doc->arena.record(sizeof(IniEntry));
-  if (!place) return nullptr;
-  auto* entry = new (place) IniEntry;
-  entry->name = name;
-  entry->value = value;
-  entry->knownNameLength = IniKnownLength(nameLength);
-  entry->nameInArena = entry->valueInArena = entry->recordInArena = 1;
-  entry->quote = EnclosingQuote(value, valueLength, doc->readOptions);
-  if (entry->quote) {
-    // In place, by moving both ends inward: the text belongs to the document.
-    value[valueLength - 1] = 0;
-    ++entry->value;
-    valueLength -= 2;
-  }
-  entry->knownValueLength = IniKnownLength(valueLength);
-  return entry;
-}
-
 void IniDisposeSection(IniSection* section) {
   if (!section) return;
   ztini::NameNode** items = section->items.nodes();
@@ -153,7 +122,7 @@ void IniDisposeEntry(IniEntry* entry) {
 
 void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions) {
   const size_t length = strlen(entry->value);
-  entry->quote = EnclosingQuote(entry->value, length, readOptions);
+  entry->quote = IniEnclosingQuote(entry->value, length, readOptions);
   entry->knownValueLength = IniKnownLength(length);
   if (!entry->quote) return;
   entry->knownValueLength = IniKnownLength(length - 2);
@@ -168,23 +137,14 @@ void IniReplaceValue(IniEntry* entry, char* value) {
   entry->valueInArena = 0;
 }
 
-bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section) {
+bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section,
+                      ztini::NameHash hash) {
   // Before the append, which cannot report.
   if (!doc->sections.reserve(1)) {
     IniDisposeSection(section);
     return false;
   }
-  doc->sections.append(section);
-  return true;
-}
-
-bool IniAppendEntry(IniSection* section, IniEntry* entry) {
-  if (!section->items.reserve(1)) {
-    IniDisposeEntry(entry);
-    return false;
-  }
-  section->items.append(entry);
-  section->markChanged();
+  doc->sections.append(section, hash);
   return true;
 }
 

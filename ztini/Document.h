@@ -117,6 +117,13 @@ IniSection* IniReadSection(IniStructForwardReferenceTag* doc, char* name);
 IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, size_t nameLength,
                        char* value, size_t valueLength);
 
+// The quote that the options have removed from the value; 0 for none.
+inline int32_t IniEnclosingQuote(const char* value, size_t length, int32_t readOptions) {
+  if (length < 2 || value[0] != value[length - 1]) return 0;
+  if (value[0] == '"') return readOptions & kIniReadDoubleQuotes ? '"' : 0;
+  return value[0] == '\'' && readOptions & kIniReadSingleQuotes ? '\'' : 0;
+}
+
 // Frees the record and what it holds, but for what lies in the arena; it must be in no list. Null
 // is allowed.
 void IniDisposeSection(IniSection* section);
@@ -129,15 +136,51 @@ void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions);
 void IniReplaceValue(IniEntry* entry, char* value);
 
 // Appends the record, or disposes it. False without memory.
-bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section);
+bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section,
+                      ztini::NameHash hash = {});
 bool IniAppendEntry(IniSection* section, IniEntry* entry);
 
 // IniFindSection and IniFindEntry for those who ask again and again: 0 with the record or null, or
 // kIniOutOfMemory with null where only a scan of many names could find it.
 int32_t IniSeekSection(IniStructForwardReferenceTag* doc, const char* name, IniSection** found,
-                       ztini::FoldState fold = ztini::FoldState::Unknown);
+                       ztini::FoldState fold = ztini::FoldState::Unknown,
+                       ztini::NameHash* hash = nullptr);
 int32_t IniSeekEntry(IniStructForwardReferenceTag* doc, IniSection* section, const char* name,
                      IniEntry** found, ztini::FoldState fold = ztini::FoldState::Unknown);
 
 // Removes all sections, the last one first.
 void IniEmptyDocument(IniStructForwardReferenceTag* doc);
+
+// ---- Once a line of a file: in the header for the parser's sake.
+
+inline IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, size_t nameLength,
+                              char* value, size_t valueLength) {
+  void* place = doc->arena.record(sizeof(IniEntry));
+  if (!place) return nullptr;
+  const int32_t quote = IniEnclosingQuote(value, valueLength, doc->readOptions);
+  if (quote) {
+    // In place, by moving both ends inward: the text belongs to the document.
+    value[valueLength - 1] = 0;
+    ++value;
+    valueLength -= 2;
+  }
+  // The fields of bits one after the other, so that they become one store.
+  auto* entry = new (place) IniEntry;
+  entry->name = name;
+  entry->value = value;
+  entry->nameInArena = entry->valueInArena = entry->recordInArena = 1;
+  entry->quote = static_cast<uint32_t>(quote);
+  entry->knownNameLength = IniKnownLength(nameLength);
+  entry->knownValueLength = IniKnownLength(valueLength);
+  return entry;
+}
+
+inline bool IniAppendEntry(IniSection* section, IniEntry* entry) {
+  if (!section->items.reserve(1)) {
+    IniDisposeEntry(entry);
+    return false;
+  }
+  section->items.append(entry);
+  section->markChanged();
+  return true;
+}

@@ -123,7 +123,7 @@ int32_t AnalyzeItemName(const char* name, size_t* baseLength, long* number) {
   return 1;
 }
 
-bool IniMayBePiece(const char* name, const char* end) {
+bool IniEndsAsPiece(const char* name, const char* end) {
   const char* digits = end;
   while (digits > name && digits[-1] >= '0' && digits[-1] <= '9') --digits;
   const ptrdiff_t markLength = sizeof kPieceMark - 1;

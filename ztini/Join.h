@@ -15,8 +15,12 @@ inline constexpr size_t kIniLongestBaseName = 255;
 // beyond the platform's long and a base beyond kIniLongestBaseName included.
 int32_t AnalyzeItemName(const char* name, size_t* baseLength, long* number);
 
+bool IniEndsAsPiece(const char* name, const char* end);
+
 // False only if the name is not that of a piece. For a name that is known by its ends.
-bool IniMayBePiece(const char* name, const char* end);
+inline bool IniMayBePiece(const char* name, const char* end) {
+  return end > name && end[-1] >= '0' && end[-1] <= '9' && IniEndsAsPiece(name, end);
+}
 
 // Merges, in each section, every run of a piece numbered 1 and the pieces with other numbers that
 // follow it into one item. The numbers need not ascend and the base names may differ; the first

@@ -97,13 +97,14 @@ IniSection* IniFindSection(Doc* doc, const char* section) {
   return static_cast<IniSection*>(found);
 }
 
-int32_t IniSeekSection(Doc* doc, const char* name, IniSection** found, ztini::FoldState fold) {
+int32_t IniSeekSection(Doc* doc, const char* name, IniSection** found, ztini::FoldState fold,
+                       ztini::NameHash* hash) {
   *found = nullptr;
   if (fold == ztini::FoldState::Unknown) doc->fold.refresh();
   ztini::NameNode* node = nullptr;
   if (IsCurrent(doc, name)) {
     node = doc->currentSection;
-  } else if (!doc->sections.seek(name, doc->match(), &node, ztini::FoldState::Fresh)) {
+  } else if (!doc->sections.seek(name, doc->match(), &node, ztini::FoldState::Fresh, hash)) {
     return kIniOutOfMemory;
   }
   if (node) doc->currentSection = *found = static_cast<IniSection*>(node);

@@ -23,7 +23,14 @@ uint32_t ShortHash(const NameFold& fold, const char* name) {
   return static_cast<uint32_t>(HashName(fold, name));
 }
 
+uint32_t ShortHash(const NameFold& fold, const char* name, NameHash known) {
+  return known.isKnown ? known.value : ShortHash(fold, name);
+}
+
 }  // namespace
+
+NameHash::NameHash(const NameFold& fold, const char* name)
+    : value(ShortHash(fold, name)), isKnown(true) {}
 
 uint32_t NodesInOrder::placeOf(uint32_t sequence) const {
   if (!count || sequence < begin[0]->sequence) return count;
@@ -99,13 +106,13 @@ size_t NameIndex::find(const NameFold& fold, NodesInOrder nodes, const char* nam
   return at;
 }
 
-bool NameIndex::insert(const NameFold& fold, NodesInOrder nodes, NameNode* node) {
+bool NameIndex::insert(const NameFold& fold, NodesInOrder nodes, NameNode* node, NameHash known) {
   if (full() && !grow()) {
     clear();
     return false;
   }
   node->twin = 0;
-  const uint32_t hash = ShortHash(fold, node->name);
+  const uint32_t hash = ShortHash(fold, node->name, known);
   Slot* slot = &m_slots[find(fold, nodes, node->name, hash)];
   if (slot->head == kNoSequence) {
     *slot = {hash, node->sequence};
@@ -214,8 +221,9 @@ void NameIndex::freeSlot(size_t at) {
   --m_used;
 }
 
-NameNode* NameIndex::chain(const NameFold& fold, NodesInOrder nodes, const char* name) const {
-  const Slot& slot = m_slots[find(fold, nodes, name, ShortHash(fold, name))];
+NameNode* NameIndex::chain(const NameFold& fold, NodesInOrder nodes, const char* name,
+                           NameHash known) const {
+  const Slot& slot = m_slots[find(fold, nodes, name, ShortHash(fold, name, known))];
   return slot.head == kNoSequence ? nullptr : nodes.bySequence(slot.head);
 }
 

@@ -33,6 +33,16 @@ struct NodesInOrder {
   NameNode* bySequence(uint32_t sequence) const { return begin[placeOf(sequence)]; }
 };
 
+// The hash of a name under a fold, or nothing: whoever asks for a name and then adds it hashes it
+// once.
+struct NameHash {
+  NameHash() = default;
+  NameHash(const NameFold& fold, const char* name);
+
+  uint32_t value = 0;
+  bool isKnown = false;
+};
+
 // Hash table from name to the chain of nodes that have it, in list order.
 //
 // Open addressing, one slot of 8 bytes a name: any number of equal names takes one slot, and
@@ -62,14 +72,16 @@ class NameIndex {
   // Makes an empty table with space for so many names. False without memory.
   bool create(const NameFold& fold, size_t names);
 
-  // Adds a node at its place in the order. False without memory; the index is then cleared.
-  bool insert(const NameFold& fold, NodesInOrder nodes, NameNode* node);
+  // Adds a node at its place in the order. False without memory; the index is then cleared. `hash`: of
+  // its name, if the caller knows it.
+  bool insert(const NameFold& fold, NodesInOrder nodes, NameNode* node, NameHash hash = {});
 
   // Takes out a node that is in the index, before its name changes or goes.
   void remove(const NameFold& fold, NodesInOrder nodes, NameNode* node);
 
   // First in order of the nodes with this name, or null.
-  NameNode* chain(const NameFold& fold, NodesInOrder nodes, const char* name) const;
+  NameNode* chain(const NameFold& fold, NodesInOrder nodes, const char* name,
+                  NameHash hash = {}) const;
 
   // The next node in order with the same name, or null.
   NameNode* nextSame(NodesInOrder nodes, const NameNode* node) const;

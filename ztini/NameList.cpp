@@ -39,20 +39,28 @@ NameNode** NameList::nodes() const {
 
 NameNode* NameList::find(const char* name, NameMatch match, FoldState fold) {
   if (!name) return nullptr;
-  return wayToFind(fold) == Way::Index ? findInIndex(name, match) : scan(name, match);
+  return wayToFind(fold) == Way::Index ? findInIndex(name, match, NameHash(*m_fold, name))
+                                       : scan(name, match);
 }
 
-bool NameList::seek(const char* name, NameMatch match, NameNode** found, FoldState fold) {
+bool NameList::seek(const char* name, NameMatch match, NameNode** found, FoldState fold,
+                    NameHash* hash) {
   *found = nullptr;
   if (!name) return true;
   const Way way = wayToFind(fold);
   if (way == Way::OutOfMemory) return false;
-  *found = way == Way::Index ? findInIndex(name, match) : scan(name, match);
+  if (way == Way::Scan) {
+    *found = scan(name, match);
+    return true;
+  }
+  const NameHash computed(*m_fold, name);
+  if (hash) *hash = computed;
+  *found = findInIndex(name, match, computed);
   return true;
 }
 
-NameNode* NameList::findInIndex(const char* name, NameMatch match) const {
-  NameNode* node = m_index->chain(*m_fold, inOrder(), name);
+NameNode* NameList::findInIndex(const char* name, NameMatch match, NameHash hash) const {
+  NameNode* node = m_index->chain(*m_fold, inOrder(), name, hash);
   while (node && !Matches(*m_fold, match, node->name, name)) {
     node = m_index->nextSame(inOrder(), node);
   }
@@ -108,7 +116,7 @@ uint32_t NameList::nextSequence() {
   return m_list.count;
 }
 
-void NameList::append(NameNode* node) {
+void NameList::appendAnywhere(NameNode* node, NameHash hash) {
   node->sequence = nextSequence();
   if (m_list.first + m_list.count < m_list.capacity) {
     nodes()[m_list.count++] = node;
@@ -118,7 +126,7 @@ void NameList::append(NameNode* node) {
   if (!m_index) return;
   // Out of memory is no failure here: the record is in the list, and the index is built again when
   // it is needed.
-  if (!indexIsCurrent() || !m_index->insert(*m_fold, inOrder(), node)) dropIndex();
+  if (!indexIsCurrent() || !m_index->insert(*m_fold, inOrder(), node, hash)) dropIndex();
 }
 
 void NameList::remove(NameNode* node) {

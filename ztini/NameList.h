@@ -42,9 +42,9 @@ class NameList {
   NameNode* find(const char* name, NameMatch match, FoldState fold = FoldState::Unknown);
 
   // As find(), into `found`, but never scans a long list: false, with null, without memory for its
-  // index.
+  // index. *hash, if asked for, is set where the index was asked.
   bool seek(const char* name, NameMatch match, NameNode** found,
-            FoldState fold = FoldState::Unknown);
+            FoldState fold = FoldState::Unknown, NameHash* hash = nullptr);
 
   // Whether find() compares the names one by one.
   bool isScanned() const { return !m_index && count() < kIndexFrom; }
@@ -53,10 +53,20 @@ class NameList {
   int32_t positionOf(const NameNode* node) const;
 
   // Makes sure that the next `records` appends need no memory. False without memory.
-  bool reserve(uint32_t records) { return ztini_ListReserve(&m_list, records) != 0; }
+  bool reserve(uint32_t records) {
+    return spaceAtEnd() >= records || ztini_ListReserve(&m_list, records) != 0;
+  }
 
-  // Adds at the end; space must have been reserved.
-  void append(NameNode* node);
+  // Adds at the end; space must have been reserved. `hash`: of its name, where seek() has given it.
+  void append(NameNode* node, NameHash hash = {}) {
+    if (m_index || spaceAtEnd() == 0 || !m_list.count) return appendAnywhere(node, hash);
+    NameNode** end = reinterpret_cast<NameNode**>(m_list.block) + m_list.first + m_list.count;
+    const uint32_t last = end[-1]->sequence;
+    if (last + 1 >= NameIndex::kNoSequence) return appendAnywhere(node, hash);
+    node->sequence = last + 1;
+    *end = node;
+    ++m_list.count;
+  }
 
   // Takes a record of the list out; it is the caller's afterwards.
   void remove(NameNode* node);
@@ -72,6 +82,11 @@ class NameList {
  private:
   enum class Way { Scan, Index, OutOfMemory };
 
+  uint32_t spaceAtEnd() const {
+    return m_list.capacity ? m_list.capacity - m_list.first - m_list.count : 0;
+  }
+  void appendAnywhere(NameNode* node, NameHash hash);
+
   // Below this a scan is as quick as the hash, and most sections have fewer items.
   static constexpr int32_t kIndexFrom = 16;
 
@@ -82,7 +97,7 @@ class NameList {
   NodesInOrder inOrder() const { return {nodes(), m_list.count}; }
   uint32_t nextSequence();
   NameNode* scan(const char* name, NameMatch match) const;
-  NameNode* findInIndex(const char* name, NameMatch match) const;
+  NameNode* findInIndex(const char* name, NameMatch match, NameHash hash) const;
 
   ztini_ListRecord m_list;
   NameIndex* m_index = nullptr;  // null: none; otherwise it is built

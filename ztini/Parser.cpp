@@ -39,6 +39,13 @@ class ItemKeys {
   // Equal for names that are equal; of a trimmed name that is not empty.
   static Key Of(const NameFold& fold, const char* begin, const char* end) {
     const size_t length = static_cast<size_t>(end - begin);
+    if (length >= sizeof(Key) && fold.foldsAsciiOnly()) {
+      // The last eight characters at once; the length takes the place of a bit of each that case
+      // changes or that letters share.
+      Key key;
+      memcpy(&key, end - sizeof key, sizeof key);
+      return (key & kWithoutCase) ^ (length * kOddFactor);
+    }
     Key key = length;
     for (size_t i = 1; i <= 4 && i <= length; ++i) key = key << 8 | fold.upper(end[-int(i)]);
     for (size_t i = 0; i < 3 && i < length; ++i) key = key << 8 | fold.upper(begin[i]);
@@ -48,24 +55,32 @@ class ItemKeys {
   // Forgets all; the section that follows has so many items, of which nothing is known.
   void start(int32_t items) {
     m_count = 0;
+    m_seen = 0;
     m_good = items == 0;
   }
   void add(Key key) {
     m_good = m_good && m_count < kMost;
-    if (m_good) m_keys[m_count++] = key;
+    if (!m_good) return;
+    m_keys[m_count++] = key;
+    m_seen |= bitOf(key);
   }
   // False only if no item has a name of this key.
   bool mayHave(Key key) const {
     if (!m_good) return true;
-    for (int i = 0; i < m_count; ++i) {
-      if (m_keys[i] == key) return true;
-    }
-    return false;
+    if (!(m_seen & bitOf(key))) return false;
+    return std::find(m_keys, m_keys + m_count, key) != m_keys + m_count;
   }
 
  private:
   static constexpr int kMost = 16;
+  static constexpr Key kWithoutCase = 0xdfdfdfdfdfdfdfdfu;
+  static constexpr Key kOddFactor = 0x9e3779b97f4a7c15u;
+
+  // One of 64, by the key: most keys that are not there are found missing by it.
+  static uint64_t bitOf(Key key) { return uint64_t(1) << (key * kOddFactor >> 58); }
+
   Key m_keys[kMost];
+  uint64_t m_seen = 0;
   int m_count = 0;
   bool m_good = false;
 };
@@ -88,7 +103,7 @@ class DocumentBuilder {
   int32_t store(char* name, char* nameEnd, char* value, char* valueEnd, int32_t line);
   int32_t replace(IniEntry* entry, const char* value, int32_t line);
   int32_t appendEntry(char* name, char* nameEnd, char* value, char* valueEnd, int32_t line);
-  int32_t openSection(char* name, char* nameEnd, int32_t line);
+  int32_t openSection(char* name, char* nameEnd, int32_t line, ztini::NameHash hash = {});
   int32_t openNullSection();
   int32_t badLine(int32_t line);
   char* keep(char* begin, char* end);
@@ -139,21 +154,23 @@ int32_t DocumentBuilder::takeHeader(char* begin, char* end, int32_t line) {
   char* nameEnd = cutTrailingWhite(name, bracket);
   if (nameEnd == name) return badLine(line);
   IniSection* known = nullptr;
-  if (m_doc->duplicateChecking && IniSeekSection(m_doc, name, &known, FoldState::Fresh) < 0)
+  ztini::NameHash hash;
+  if (m_doc->duplicateChecking && IniSeekSection(m_doc, name, &known, FoldState::Fresh, &hash) < 0)
     return kIniOutOfMemory;
-  if (!known) return openSection(name, nameEnd, line);
+  if (!known) return openSection(name, nameEnd, line, hash);
   known->line = line;
   m_section = known;
   m_keys.start(known->items.count());
   return 0;
 }
 
-int32_t DocumentBuilder::openSection(char* name, char* nameEnd, int32_t line) {
+int32_t DocumentBuilder::openSection(char* name, char* nameEnd, int32_t line,
+                                     ztini::NameHash hash) {
   char* kept = keep(name, nameEnd);
   IniSection* section = kept ? IniReadSection(m_doc, kept) : nullptr;
   if (!section) return kIniOutOfMemory;
   section->line = line;
-  if (!IniAppendSection(m_doc, section)) return kIniOutOfMemory;
+  if (!IniAppendSection(m_doc, section, hash)) return kIniOutOfMemory;
   m_hasNullSection = m_hasNullSection || IniSectionIsNull(section);
   if (m_section) m_itemsExpected = std::clamp(m_section->items.count() - 1, 1, kMostExpected);
   m_section = section;

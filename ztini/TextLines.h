@@ -2,6 +2,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 
 namespace ztini {
 
@@ -17,7 +18,26 @@ class TextLines {
   TextLines(char* begin, char* end);
 
   // False after the last line.
-  bool next();
+  bool next() {
+    if (m_cursor == m_textEnd) return false;
+    char* begin = m_cursor;
+    // The second half of a pair.
+    if (IsTerminator(*begin) && *begin != m_lastTerminator) ++begin;
+    char* end = m_onlyLineFeeds ? lineFeedFrom(begin) : terminatorFrom(begin);
+    // The buffer never shrinks, so that the capacity is kept from line to line: a long line changes
+    // how later ones are cut.
+    if (static_cast<size_t>(end - begin) >= m_capacity - 1) return nextLong();
+    if (end == m_textEnd) {
+      m_cursor = m_textEnd;
+      // Only the second half of a pair was left.
+      if (begin == end) return false;
+      m_begin = begin;
+      return finishAt(end, end);
+    }
+    m_begin = begin;
+    m_lastTerminator = *end;
+    return finishAt(end, end + 1);
+  }
 
   // The present line; *end() may be written.
   char* begin() const { return m_begin; }
@@ -25,9 +45,20 @@ class TextLines {
   int32_t lineNumber() const { return m_lineNumber; }
 
  private:
+  static bool IsTerminator(char c) { return c == '\r' || c == '\n' || c == '\0'; }
+
+  char* lineFeedFrom(char* at) const {
+    void* found = memchr(at, '\n', static_cast<size_t>(m_textEnd - at));
+    return found ? static_cast<char*>(found) : m_textEnd;
+  }
   char* terminatorFrom(char* at) const;
   bool nextLong();
-  bool finishAt(char* end, char* next);
+  bool finishAt(char* end, char* next) {
+    m_end = end;
+    m_cursor = next;
+    if (m_lineNumber < INT32_MAX) ++m_lineNumber;
+    return true;
+  }
 
   char* m_cursor;
   char* m_textEnd;
