@@ -1,6 +1,7 @@
 // One walk over the document serves two ends: a caller's function that takes lines, and a text in
 // memory for a file. The walk is a template over the two, so that both write the same. Values that
 // would make a line too long are split into pieces, which the reader joins (Join.h).
+#include <bit>
 #include <cstring>
 #include <string_view>
 
@@ -233,6 +234,15 @@ int32_t DocumentWriter<Lines>::endWithValue(ztini::TextBuffer& line, std::string
   return m_lines.end();
 }
 
+// Of the block for a rendering after one of `sizeBytes`: a little more than that, and the same for many
+// renderings, each a little longer. An allocator gives a block of a size that was just freed from
+// what it has; a new size of its own comes from the system, page by page.
+size_t BlockFor(size_t sizeBytes) {
+  const size_t least = sizeBytes + sizeBytes / 64;
+  const size_t step = std::bit_floor(least) / 8 + 1;
+  return (least / step + 1) * step;
+}
+
 }  // namespace
 
 int32_t IniWrite(IniStructForwardReferenceTag* doc, IniLineOutputFunction output, void* stream) {
@@ -256,7 +266,7 @@ int32_t ztini::IniRender(IniStructForwardReferenceTag* doc, TextBuffer* text) {
   const bool marked = (doc->writeOptions & kIniWriteMark) != 0;
   // The sections' places in it are overwritten one by one, so it serves once only.
   const TextBuffer before = std::move(doc->rendering);
-  text->reserve(before.size() + before.size() / 64);
+  text->reserve(BlockFor(before.size()));
   if (marked) text->append(kUtf8Mark);
   TextInMemory lines(text, before.view(), marked);
   const int32_t status = DocumentWriter(doc, &lines).write();
