@@ -27,7 +27,11 @@ class WantedName {
   }
 
   bool is(const IniEntry* entry) const {
-    return !differsAtAGlance(entry) && ztini::CompareNames(m_fold, entry->name, m_name) == 0;
+    if (differsAtAGlance(entry)) return false;
+    if (m_length != 0 && entry->knownNameLength == m_length &&
+        memcmp(entry->name, m_begin, m_length) == 0)
+      return true;
+    return ztini::CompareNames(m_fold, entry->name, m_name) == 0;
   }
 
  private:
@@ -71,12 +75,25 @@ IniEntry* NthItem(Doc* doc, const char* section, int32_t n) {
   return found ? found->item(n) : nullptr;
 }
 
+// True only for names that are different. Names with white space around them are left to the whole
+// comparison.
+bool DifferAtTheirEnds(const ztini::NameFold& fold, const char* a, const char* b) {
+  const size_t aLength = strlen(a), bLength = strlen(b);
+  if (!aLength || !bLength) return false;
+  const char aLast = a[aLength - 1], bLast = b[bLength - 1];
+  for (char end : {*a, aLast, *b, bLast}) {
+    if (fold.isSpace(end)) return false;
+  }
+  return aLength != bLength || fold.upper(aLast) != fold.upper(bLast);
+}
+
 // The fold is fresh.
 bool IsCurrent(Doc* doc, const char* name) {
   if (!doc->currentSection) return false;
   // Byte by byte, white space included, as names are stored without any.
-  if (doc->caseSensitive) return strcmp(doc->currentSection->name, name) == 0;
-  return ztini::CompareNames(doc->fold, doc->currentSection->name, name) == 0;
+  if (strcmp(doc->currentSection->name, name) == 0) return true;
+  return !doc->caseSensitive && !DifferAtTheirEnds(doc->fold, doc->currentSection->name, name) &&
+         ztini::CompareNames(doc->fold, doc->currentSection->name, name) == 0;
 }
 
 int32_t Give(const char* text, const char** out) {

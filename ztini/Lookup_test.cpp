@@ -38,6 +38,15 @@ TEST(Lookup, WhiteSpaceInsideANameCounts) {
   EXPECT_EQ(IniItemExists(doc.get(), "A B", "X  Y"), 1);
 }
 
+// The length of so long a name is not kept, and is no zero either.
+TEST(Lookup, AnEmptyNameIsNoLongOne) {
+  const std::string name(5000, 'n');
+  Document doc = Parse("[a]\n" + name + "=1\n");
+  EXPECT_EQ(IniItemExists(doc.get(), "a", name.c_str()), 1);
+  EXPECT_EQ(IniItemExists(doc.get(), "a", ""), 0);
+  EXPECT_EQ(IniItemExists(doc.get(), "a", " "), 0);
+}
+
 TEST(Lookup, HandlesAndPositions) {
   Document doc = Sample();
   IniSection* b = IniFindSection(doc.get(), "B");

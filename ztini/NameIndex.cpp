@@ -32,12 +32,8 @@ uint32_t ShortHash(const NameFold& fold, const char* name, NameHash known) {
 NameHash::NameHash(const NameFold& fold, const char* name)
     : value(ShortHash(fold, name)), isKnown(true) {}
 
-uint32_t NodesInOrder::placeOf(uint32_t sequence) const {
-  if (!count || sequence < begin[0]->sequence) return count;
-  // Every gap before the node moves it towards the front, nothing moves it the other way.
-  const uint32_t last = sequence - begin[0]->sequence;
-  // Without gaps the number is the place.
-  if (last < count && begin[last]->sequence == sequence) return last;
+// Its place is `last` or before.
+uint32_t NodesInOrder::search(uint32_t sequence, uint32_t last) const {
   NameNode** end = begin + std::min(last, count);
   NameNode** at = std::lower_bound(begin, end, sequence, [](const NameNode* node, uint32_t wanted) {
     return node->sequence < wanted;
@@ -95,13 +91,17 @@ bool NameIndex::grow() {
   return true;
 }
 
-size_t NameIndex::find(const NameFold& fold, NodesInOrder nodes, const char* name,
-                       uint32_t hash) const {
+size_t NameIndex::find(const NameFold& fold, NodesInOrder nodes, const char* name, uint32_t hash,
+                       bool* isExact) const {
   size_t at = hash & m_mask;
   for (; m_slots[at].head != kNoSequence; at = (at + 1) & m_mask) {
     const Slot& slot = m_slots[at];
+    if (slot.hash != hash) continue;
     // The first node has the name of its whole chain.
-    if (slot.hash == hash && SameFoldedName(fold, nodes.bySequence(slot.head)->name, name)) break;
+    const char* known = nodes.bySequence(slot.head)->name;
+    const bool same = strcmp(known, name) == 0;
+    if (isExact) *isExact = same;
+    if (same || SameFoldedName(fold, known, name)) break;
   }
   return at;
 }
@@ -222,8 +222,8 @@ void NameIndex::freeSlot(size_t at) {
 }
 
 NameNode* NameIndex::chain(const NameFold& fold, NodesInOrder nodes, const char* name,
-                           NameHash known) const {
-  const Slot& slot = m_slots[find(fold, nodes, name, ShortHash(fold, name, known))];
+                           NameHash known, bool* isExact) const {
+  const Slot& slot = m_slots[find(fold, nodes, name, ShortHash(fold, name, known), isExact)];
   return slot.head == kNoSequence ? nullptr : nodes.bySequence(slot.head);
 }
 

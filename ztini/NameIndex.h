@@ -27,10 +27,19 @@ struct NodesInOrder {
 
   // Place of the node with this number, or `count`. Constant time before the first gap, else by
   // bisection.
-  uint32_t placeOf(uint32_t sequence) const;
+  uint32_t placeOf(uint32_t sequence) const {
+    if (!count || sequence < begin[0]->sequence) return count;
+    // Every gap before the node moves it towards the front, nothing moves it the other way. Without
+    // gaps the number is the place.
+    const uint32_t last = sequence - begin[0]->sequence;
+    return last < count && begin[last]->sequence == sequence ? last : search(sequence, last);
+  }
 
   // The node with this number, which is in the list.
   NameNode* bySequence(uint32_t sequence) const { return begin[placeOf(sequence)]; }
+
+ private:
+  uint32_t search(uint32_t sequence, uint32_t last) const;
 };
 
 // The hash of a name under a fold, or nothing: whoever asks for a name and then adds it hashes it
@@ -79,9 +88,10 @@ class NameIndex {
   // Takes out a node that is in the index, before its name changes or goes.
   void remove(const NameFold& fold, NodesInOrder nodes, NameNode* node);
 
-  // First in order of the nodes with this name, or null.
-  NameNode* chain(const NameFold& fold, NodesInOrder nodes, const char* name,
-                  NameHash hash = {}) const;
+  // First in order of the nodes with this name, or null. *isExact, if asked for: whether its name is
+  // the same byte by byte.
+  NameNode* chain(const NameFold& fold, NodesInOrder nodes, const char* name, NameHash hash = {},
+                  bool* isExact = nullptr) const;
 
   // The next node in order with the same name, or null.
   NameNode* nextSame(NodesInOrder nodes, const NameNode* node) const;
@@ -99,7 +109,8 @@ class NameIndex {
     uint32_t prev;
   };
 
-  size_t find(const NameFold& fold, NodesInOrder nodes, const char* name, uint32_t hash) const;
+  size_t find(const NameFold& fold, NodesInOrder nodes, const char* name, uint32_t hash,
+              bool* isExact = nullptr) const;
   bool allocateSlots(size_t slots);
   bool full() const { return (m_used + 1) * 8 > (m_mask + 1) * 7; }
   bool grow();

@@ -60,7 +60,9 @@ bool NameList::seek(const char* name, NameMatch match, NameNode** found, FoldSta
 }
 
 NameNode* NameList::findInIndex(const char* name, NameMatch match, NameHash hash) const {
-  NameNode* node = m_index->chain(*m_fold, inOrder(), name, hash);
+  bool isExact = false;
+  NameNode* node = m_index->chain(*m_fold, inOrder(), name, hash, &isExact);
+  if (node && isExact) return node;
   while (node && !Matches(*m_fold, match, node->name, name)) {
     node = m_index->nextSame(inOrder(), node);
   }
