@@ -30,9 +30,9 @@ enum class AtFork {
 //
 // The ranks say in which order a fork waits for the mutexes, which is the order in which code that
 // holds several mostly takes them: 10 registrar, 20 its creation, 30 loader, 40 open database, 50
-// component map, 60 start of the log, 65 trace of the object core, 70 hooks, 80 loading of modules,
-// 90 times of the system, 95 text conversion. A fork that meets a holder who is waiting for what
-// the fork has taken gives that back and begins with the holder's.
+// component map, 60 start of the log, 62 its lines, 65 trace of the object core, 70 hooks, 80
+// loading of modules, 90 times of the system, 95 text conversion. A fork that meets a holder who is
+// waiting for what the fork has taken gives that back and begins with the holder's.
 //
 // A mutex is not made or destroyed while one of AtFork::Wait is held: a fork would wait its second
 // out. Threads: any. A process made without the handlers of fork() (vfork, clone) has none of this.

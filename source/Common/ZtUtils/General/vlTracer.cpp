@@ -1,8 +1,12 @@
 // What a line needs at any time - mask, targets, threshold - is atomic and read without a lock. The
-// file and its state are guarded by a named mutex, made at the start, which keeps the lines of this
-// process's threads, and of those that it forks, from running into each other. The pointer to that
-// mutex says that the log is started; it is set last and cleared first, and what it points to is
-// never freed, since a thread may have read it just before.
+// file and its state are guarded by a mutex of the process, which keeps its threads' lines apart.
+//
+// The children that the process forks write to the same places. In the file, each call is one write
+// to a descriptor for appending, which the system does in one piece, so that the usual log needs no
+// more. Standard streams have a write for each line, and a disk that may become short is asked
+// before each: there a named mutex, made at the start, keeps the processes apart. The pointer to it
+// says that the log is started; it is set last and cleared first, and what it points to is never
+// freed, since a thread may have read it just before.
 //
 // Tracing reports nothing and must not fail its caller: what cannot be written is dropped, and a
 // lock that is not available is done without.
@@ -52,11 +56,12 @@ constexpr const char* kDiskShort =
 constinit std::atomic<uint32_t> gs_traceTarget{vlTracer::kTargetError};
 constinit std::atomic<long> gs_traceLowDiskThreshold{0};
 constinit std::atomic<void (*)()> gs_traceInitCallback{nullptr};
-// Serialises the output; its presence says that the log is started. Never freed: a thread may be
-// inside while another one cleans up.
+// Serialises the output of this process and its children, where that takes several calls; its
+// presence says that the log is started. Never freed: a thread may be inside while another one
+// cleans up.
 constinit std::atomic<Toolyard::CztMutex*> gs_traceSync{nullptr};
 
-// What the lock above guards. Never freed, as exit handlers trace too.
+// Guarded by the output lock of the process. Never freed, as exit handlers trace too.
 struct LogFile {
   std::string directory, name;
   int fd = -1;
@@ -69,6 +74,9 @@ LogFile& Log() { return LeakedInstance<LogFile>(); }
 
 struct Start {
   ForkSafeMutex lock{AtFork::Wait, 60};
+  // Output of this process. A fork does not wait for it, as a write may not end; the file's number
+  // is set last, so that a child can go on from any moment of an opening.
+  ForkSafeMutex output{AtFork::Renew, 62};
   // Output locks are never destroyed, since threads may be inside one while the log is closed. Held
   // here, they do not count as lost.
   std::vector<Toolyard::CztMutex*> outputLocks GUARDED_BY(lock);
@@ -76,15 +84,17 @@ struct Start {
 
 Start& TheStart() { return LeakedInstance<Start>(); }
 
-// The lock, if it is available: a line that may come between another's is better than none.
-class OutputLock {
+// The lock between processes, where it is needed and available: a line that may come between
+// another's is better than none.
+class ProcessesLock {
  public:
-  explicit OutputLock(Toolyard::CztMutex& mutex) : m_mutex(mutex), m_held(Take(mutex)) {}
-  ~OutputLock() {
+  ProcessesLock(Toolyard::CztMutex& mutex, bool needed)
+      : m_mutex(mutex), m_held(needed && Take(mutex)) {}
+  ~ProcessesLock() {
     if (m_held) m_mutex.Unlock();
   }
-  OutputLock(const OutputLock&) = delete;
-  OutputLock& operator=(const OutputLock&) = delete;
+  ProcessesLock(const ProcessesLock&) = delete;
+  ProcessesLock& operator=(const ProcessesLock&) = delete;
 
  private:
   static bool Take(Toolyard::CztMutex& mutex) {
@@ -129,31 +139,41 @@ void CloseLog(LogFile& log) {
   log.fd = -1;
 }
 
-// Writes the line with its end. Allocates nothing: lines are about memory, too.
-void AppendLine(int fd, const char* line) {
-  char text[kLongestLine + 2];
-  snprintf(text, sizeof text, "%.*s\n", static_cast<int>(kLongestLine), line);
+// Writes the lines with their ends, in one call; the second may be null. Allocates nothing: lines are
+// about memory, too.
+void AppendLines(int fd, const char* first, const char* second) {
+  constexpr int kMost = static_cast<int>(kLongestLine);
+  char text[2 * (kLongestLine + 1) + 1];
+  if (second) {
+    snprintf(text, sizeof text, "%.*s\n%.*s\n", kMost, first, kMost, second);
+  } else {
+    snprintf(text, sizeof text, "%.*s\n", kMost, first);
+  }
   zt::posix::WriteAll(fd, text, strlen(text));
+}
+
+// Opens the file where it is not open. False without one.
+bool EnsureOpen(LogFile& log) {
+  // The host has closed it, as daemons do; the number is not this log's any more.
+  if (log.fd >= 0 && !log.identity.isBehind(log.fd)) log.fd = -1;
+  if (log.fd < 0) OpenLog(log);
+  return log.fd >= 0;
 }
 
 // Writes the line to the file; on a disk that has become short, the message in the line's place,
 // for all targets, and that is the file's last one.
 const char* WriteToLog(LogFile& log, const char* line) {
-  // The host has closed it, as daemons do; the number is not this log's any more.
-  if (log.fd >= 0 && !log.identity.isBehind(log.fd)) log.fd = -1;
-  if (log.fd < 0) OpenLog(log);
-  if (log.fd < 0) return line;
+  if (!EnsureOpen(log)) return line;
   if (DiskIsShort(log)) {
     line = kDiskShort;
     log.diskShort = true;
   }
-  AppendLine(log.fd, line);
+  AppendLines(log.fd, line, nullptr);
   if (log.diskShort) CloseLog(log);
   return line;
 }
 
-void WriteLine(const char* line) {
-  uint32_t target = gs_traceTarget;
+void WriteLine(uint32_t target, const char* line) {
   if (target & vlTracer::kTargetFile) line = WriteToLog(Log(), line);
   if (target & vlTracer::kTargetError) fprintf(stderr, "%s\n", line);
   if (target & vlTracer::kTargetOutput) puts(line);
@@ -219,12 +239,13 @@ void vlTracer::Cleanup() {
   if (!sync) return;
   // A thread may be in a write that does not end, to a full pipe. It must not keep the process from
   // ending; what is written is in the file already.
-  for (int tries = 0; !sync->TryLock(); ++tries) {
+  ForkSafeMutex& output = TheStart().output;
+  for (int tries = 0; !output.try_lock(); ++tries) {
     if (tries == kCleanupTries) return;
     usleep(kCleanupPauseMicroseconds);
   }
   CloseLog(Log());
-  sync->Unlock();
+  output.unlock();
 }
 
 unsigned vlt_vlTracer::GetTraceMask() {
@@ -241,12 +262,20 @@ void vlt_vlTracer::TraceOutput(char marker, const char* text, bool detail) {
   if (!sync) return;
   // The time before the lock: what the system's own locks hold up must not hold up the log.
   const std::string detailLine = detail ? DetailLine() : std::string();
-  OutputLock lock(*sync);
+  const char* second = detail ? detailLine.c_str() : nullptr;
+  Hold hold(TheStart().output);
+  const uint32_t target = gs_traceTarget;
+  const bool oneWrite = target == vlTracer::kTargetFile && gs_traceLowDiskThreshold == 0;
+  ProcessesLock lock(*sync, !oneWrite);
   if (gs_traceSync != sync) return;  // The log was closed while this line waited.
   char line[kLongestLine + 1];
   snprintf(line, sizeof line, "%c %s", marker, text ? text : "");
-  WriteLine(line);
-  if (detail) WriteLine(detailLine.c_str());
+  if (oneWrite) {
+    if (EnsureOpen(Log())) AppendLines(Log().fd, line, second);
+    return;
+  }
+  WriteLine(target, line);
+  if (second) WriteLine(target, second);
 }
 
 void vlt_vlTracer::TraceArgsHelper() {

@@ -23,6 +23,7 @@
 #include "tests/support/Child.h"
 #include "tests/support/FailSystemCall.h"
 #include "tests/support/TempDir.h"
+#include "tests/support/TracedChild.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/ThreadID.h"
 
@@ -228,13 +229,52 @@ TEST(vlTracer, ABackslashEndsADirectoryToo) {
 
 TEST(vlTracer, AFailedLockDoesNotStopTheOutput) {
   Traced t = Trace([](const std::wstring& directory) {
-    Start(1, directory.c_str());
+    Start(1 | 4, directory.c_str());
     vlt_vlTracer::TraceOutput(' ', "one", false);
     if (!FailSystemCall(SYS_flock, EIO)) _exit(1);
     vlt_vlTracer::TraceOutput(' ', "two", true);
   });
   EXPECT_EQ(t.exitCode, 0);
   EXPECT_TRUE(std::regex_match(t.log, std::regex("  one\n  two\n  Thread = .*\n"))) << t.log;
+  EXPECT_EQ(t.err, t.log);
+}
+
+// Names of the calls that write and lock, for a call with detail after the first one.
+std::vector<std::string> CallsOfALine(int target, long threshold) {
+  TempDir dir;
+  std::string logs = dir.makeDir("logs");
+  std::vector<std::string> names;
+  bool counts = false;
+  TracedChild::Run(
+      [&] {
+        dup2(open((dir / "err").c_str(), O_CREAT | O_WRONLY, 0600), 2);
+        Start(target, std::wstring(logs.begin(), logs.end()).c_str(), threshold);
+        vlt_vlTracer::TraceOutput(' ', "opens", false);
+        getppid();
+        vlt_vlTracer::TraceOutput(' ', "x", true);
+        getppid();
+        return 0;
+      },
+      [&](const SystemCall& call) {
+        if (call.number == SYS_getppid) counts = !counts;
+        bool wanted = call.number == SYS_flock || call.number == SYS_write;
+        if (counts && wanted) names.push_back(call.name());
+        return 0;
+      },
+      [](const SystemCall&) {});
+  return names;
+}
+
+// What one write cannot keep together needs the lock between processes.
+TEST(vlTracer, TheFileAloneGetsACallInOneWriteWithoutALock) {
+  if (std::string missing = TracedChild::Missing(); !missing.empty()) {
+    GTEST_SKIP() << "NOT TESTED: " << missing;
+  }
+  using Names = std::vector<std::string>;
+  EXPECT_EQ(CallsOfALine(1, 0), (Names{"write"}));
+  const Names locked{"flock", "write", "write", "flock"};
+  EXPECT_EQ(CallsOfALine(4, 0), locked);
+  EXPECT_EQ(CallsOfALine(1, 1), locked);
 }
 
 TEST(vlTracer, LinesAreInTheFileWhenTheCallReturns) {
