@@ -21,6 +21,7 @@
 #include "zt/fnd/osdep/Sleep.h"
 #include "zt/fnd/osdep/path.h"
 #include "zt/posix/Environment.h"
+#include "zt/posix/FileNumbers.h"
 #include "zt/posix/Files.h"
 #include "zt/posix/Retry.h"
 
@@ -152,14 +153,15 @@ int CreateSharedUnixFile(const AnsiString& path, InTheWay way, FileIdentity* ide
 }
 
 bool FileIdentity::isBehind(int fd) const noexcept {
-  struct stat info;
+  dev_t itsDevice;
+  ino_t itsInode;
   int saved = errno;
   // EBADF is the one failure that answers the question; any other leaves the descriptor the benefit
   // of the doubt, so that a failing disk does not look like a lost lock.
-  bool known = ::fstat(fd, &info) == 0;
+  bool known = zt::posix::GetFileNumbers(fd, itsDevice, itsInode);
   bool open = known || errno != EBADF;
   errno = saved;
-  return known ? info.st_dev == device && info.st_ino == inode : open;
+  return known ? itsDevice == device && itsInode == inode : open;
 }
 
 bool FileIdentity::isNamedBy(const AnsiString& path) const {
