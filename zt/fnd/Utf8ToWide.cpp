@@ -6,8 +6,8 @@
 // result.
 #include "zt/fnd/Utf8ToWide.h"
 
+#include <algorithm>
 #include <array>
-#include <cstring>
 #include <iterator>
 #include <memory>
 
@@ -46,9 +46,14 @@ constexpr auto kRowOfLead = [] {
   return rows;
 }();
 
-// Decodes the sequence of a lead byte of 0x80 or more; s is below end.
-const unsigned char* DecodeSequence(const unsigned char* s, const unsigned char* end,
-                                    uint32_t& value) {
+struct Decoded {
+  const unsigned char* next;
+  uint32_t value;
+};
+
+// Decodes the sequence of a lead byte of 0x80 or more; s is below end. Out of line, as the usual
+// sequences do not come here.
+[[gnu::noinline]] Decoded DecodeSequence(const unsigned char* s, const unsigned char* end) {
   const LeadRule rule = kLeadRules[kRowOfLead[*s - 0x80u]];
   // The length first: only then may the second byte be read.
   if (rule.length == 0 || end - s < rule.length || s[1] < rule.leastSecond) {
@@ -75,65 +80,95 @@ const unsigned char* DecodeSequence(const unsigned char* s, const unsigned char*
       takeNext();
   }
   if (bad != 0) ZT_RAISE(exception::InvalidSequence());
-  value = result;
-  return s;
+  return {s, result};
 }
 
-inline bool IsContinuation(unsigned char byte) { return (byte & 0xC0u) == 0x80; }
+// Four bytes of the text, the first one lowest, whatever the order of the host.
+inline uint32_t FourBytes(const unsigned char* s) {
+  return s[0] | uint32_t{s[1]} << 8 | uint32_t{s[2]} << 16 | uint32_t{s[3]} << 24;
+}
 
-inline const unsigned char* DecodeOne(const unsigned char* s, const unsigned char* end,
-                                      uint32_t& value) {
+// The character at s, of which four bytes may be read.
+inline Decoded DecodeInside(const unsigned char* s, const unsigned char* end) {
   const uint32_t lead = *s;
-  if (lead < 0x80) {
-    value = lead;
-    return s + 1;
+  if (lead < 0x80) return {s + 1, lead};
+  // Two to four bytes are nearly all of what is not ASCII: the marks of lead and continuation bytes
+  // are compared at once. What is wrong, if anything, is found by the rules.
+  const uint32_t four = FourBytes(s);
+  const uint32_t second = four >> 8 & 0x3F, third = four >> 16 & 0x3F;
+  if ((four & 0xC0E0) == 0x80C0 && lead >= 0xC2) return {s + 2, (lead & 0x1F) << 6 | second};
+  if ((four & 0xC0C0F0) == 0x8080E0 && lead != 0xE0) {
+    return {s + 3, (lead & 0x0F) << 12 | second << 6 | third};
   }
-  // Two to four bytes are nearly all of what is not ASCII; what is wrong with them, if anything, is
-  // found by the rules.
-  if (lead - 0xC2u < 0xE0u - 0xC2u && end - s >= 2 && IsContinuation(s[1])) {
-    value = (lead & 0x1Fu) << 6 | (s[1] & 0x3Fu);
-    return s + 2;
+  if ((four & 0xC0C0C0F8) == 0x808080F0 && (lead != 0xF0 || second >= 0x10)) {
+    return {s + 4, (lead & 0x07) << 18 | second << 12 | third << 6 | (four >> 24 & 0x3F)};
   }
-  if (lead - 0xE1u < 0xF0u - 0xE1u && end - s >= 3 && IsContinuation(s[1]) &&
-      IsContinuation(s[2])) {
-    value = (lead & 0x0Fu) << 12 | (s[1] & 0x3Fu) << 6 | (s[2] & 0x3Fu);
-    return s + 3;
-  }
-  if (lead - 0xF0u < 0xF8u - 0xF0u && end - s >= 4 && IsContinuation(s[1]) &&
-      IsContinuation(s[2]) && IsContinuation(s[3]) && (lead != 0xF0 || s[1] >= 0x90)) {
-    value = (lead & 0x07u) << 18 | (s[1] & 0x3Fu) << 12 | (s[2] & 0x3Fu) << 6 | (s[3] & 0x3Fu);
-    return s + 4;
-  }
-  return DecodeSequence(s, end, value);
+  return DecodeSequence(s, end);
+}
+
+inline Decoded DecodeOne(const unsigned char* s, const unsigned char* end) {
+  if (*s < 0x80) return {s + 1, *s};
+  return end - s >= 4 ? DecodeInside(s, end) : DecodeSequence(s, end);
 }
 
 // Most text is ASCII, and most of that in long runs: bytes at a time of which none has its top bit
-// set.
+// set. The processor's own operations, as compilers make a move a byte of the plain form.
 constexpr ptrdiff_t kRun = 16;
 
-inline bool StartsWithAsciiRun(const unsigned char* s, const unsigned char* end) {
-  if (end - s < kRun) return false;
-  uint64_t words[kRun / sizeof(uint64_t)];
-  // The text is not aligned; the compiler makes two loads of it.
-  memcpy(words, s, sizeof words);
-  return ((words[0] | words[1]) & 0x8080808080808080u) == 0;
+#ifdef __SSE2__
+static_assert(sizeof(wchar_t) == 4 && kRun == sizeof(__m128i));
+
+inline __m128i LoadRun(const unsigned char* s) {
+  return _mm_loadu_si128(reinterpret_cast<const __m128i*>(s));
 }
 
-// Writes a run, as StartsWithAsciiRun has found it. Compilers make a move a byte of a loop here.
+inline bool IsAsciiRun(const unsigned char* s) { return _mm_movemask_epi8(LoadRun(s)) == 0; }
+
 inline void WidenAsciiRun(const unsigned char* s, wchar_t* out) {
-#ifdef __SSE2__
-  static_assert(sizeof(wchar_t) == 4 && kRun == 16);
-  const __m128i zero = _mm_setzero_si128();
-  const __m128i bytes = _mm_loadu_si128(reinterpret_cast<const __m128i*>(s));
+  const __m128i zero = _mm_setzero_si128(), bytes = LoadRun(s);
   const __m128i low = _mm_unpacklo_epi8(bytes, zero), high = _mm_unpackhi_epi8(bytes, zero);
   auto* to = reinterpret_cast<__m128i*>(out);
   _mm_storeu_si128(to, _mm_unpacklo_epi16(low, zero));
   _mm_storeu_si128(to + 1, _mm_unpackhi_epi16(low, zero));
   _mm_storeu_si128(to + 2, _mm_unpacklo_epi16(high, zero));
   _mm_storeu_si128(to + 3, _mm_unpackhi_epi16(high, zero));
+}
 #else
+inline bool IsAsciiRun(const unsigned char* s) {
+  unsigned bits = 0;
+  for (ptrdiff_t i = 0; i < kRun; ++i) bits |= s[i];
+  return bits < 0x80;
+}
+
+inline void WidenAsciiRun(const unsigned char* s, wchar_t* out) {
   for (ptrdiff_t i = 0; i < kRun; ++i) out[i] = s[i];
+}
 #endif
+
+// Writes the runs that the text begins with, of which the first is known to be one; returns their
+// characters, which are no more than `most`.
+inline ptrdiff_t WidenAsciiRuns(const unsigned char* s, ptrdiff_t most, wchar_t* out) {
+  ptrdiff_t done = 0;
+  do {
+    WidenAsciiRun(s + done, out + done);
+    done += kRun;
+  } while (most - done >= kRun && IsAsciiRun(s + done));
+  return done;
+}
+
+// Where no run begins, characters are decoded in groups, whose bytes are all there: one question for
+// the ends of text and destination, and for a run, instead of one a character.
+constexpr ptrdiff_t kGroup = 8;
+constexpr ptrdiff_t kLongestGroup = kGroup * 6;
+
+template <class Put>
+inline const unsigned char* DecodeGroup(const unsigned char* s, const unsigned char* end, Put put) {
+  for (ptrdiff_t i = 0; i < kGroup; ++i) {
+    const Decoded one = DecodeInside(s, end);
+    put(i, one.value);
+    s = one.next;
+  }
+  return s;
 }
 
 bool IsEmpty(const unsigned char* begin, const unsigned char* end) {
@@ -145,13 +180,15 @@ bool IsEmpty(const unsigned char* begin, const unsigned char* end) {
 uint32_t GetUtf8StringLength(const unsigned char* begin, const unsigned char* end) {
   if (IsEmpty(begin, end)) return 0;
   uint64_t count = 0;
-  uint32_t ignored;
   while (begin != end) {
-    if (StartsWithAsciiRun(begin, end)) {
+    if (end - begin >= kRun && IsAsciiRun(begin)) {
       begin += kRun;
       count += kRun;
+    } else if (end - begin >= kLongestGroup) {
+      begin = DecodeGroup(begin, end, [](ptrdiff_t, uint32_t) {});
+      count += kGroup;
     } else {
-      begin = DecodeOne(begin, end, ignored);
+      begin = DecodeOne(begin, end).next;
       ++count;
     }
   }
@@ -165,19 +202,23 @@ uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* 
   if (IsEmpty(begin, end)) return 0;
   const unsigned char* s = begin;
   wchar_t* out = dest;
-  uint32_t value;
   while (s != end && out != destEnd) {
-    if (destEnd - out >= kRun && StartsWithAsciiRun(s, end)) {
-      WidenAsciiRun(s, out);
-      s += kRun;
-      out += kRun;
+    const ptrdiff_t most = std::min(end - s, destEnd - out);
+    if (most >= kRun && IsAsciiRun(s)) {
+      const ptrdiff_t ascii = WidenAsciiRuns(s, most, out);
+      s += ascii;
+      out += ascii;
       continue;
     }
-    // No run begins here, nor before the next character that is not ASCII or the end is near.
-    do {
-      s = DecodeOne(s, end, value);
-      *out++ = static_cast<wchar_t>(value);
-    } while (value < 0x80 && s != end && out != destEnd);
+    if (destEnd - out >= kGroup && end - s >= kLongestGroup) {
+      s = DecodeGroup(s, end,
+                      [&](ptrdiff_t i, uint32_t value) { out[i] = static_cast<wchar_t>(value); });
+      out += kGroup;
+      continue;
+    }
+    const Decoded one = DecodeOne(s, end);
+    *out++ = static_cast<wchar_t>(one.value);
+    s = one.next;
   }
   if (static_cast<uint64_t>(out - dest) > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
   // Only here: a sequence that is malformed leaves the caller's cursor where the call began.
@@ -205,10 +246,9 @@ const unsigned char* ConvertNextUtf8Character(const unsigned char* s, const unsi
                                               wchar_t& out) {
   out = L'\0';
   if (IsEmpty(s, end)) return s;
-  uint32_t value;
-  s = DecodeOne(s, end, value);
-  out = static_cast<wchar_t>(value);
-  return s;
+  const Decoded one = DecodeOne(s, end);
+  out = static_cast<wchar_t>(one.value);
+  return one.next;
 }
 
 }  // namespace zt::fnd

@@ -3,7 +3,10 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <cstddef>
+#include <iterator>
 #include <memory>
+#include <random>
 #include <string>
 #include <vector>
 
@@ -207,4 +210,135 @@ TEST(Utf8ToWide, EveryEncodableValueOutsideTheFiveByteFormComesBack) {
     ASSERT_EQ(bytes + n, ConvertNextUtf8Character(bytes, bytes + n, back));
     ASSERT_EQ(c, back);
   }
+}
+
+// ---- beside a decoder without shortcuts
+
+namespace {
+
+// The rules of the header, byte by byte: the value of the sequence at the cursor, which moves past
+// it. False, with the cursor where it was, for a malformed one.
+bool DecodePlainly(const unsigned char*& s, const unsigned char* end, unsigned& value) {
+  const unsigned lead = *s;
+  if (lead < 0x80) {
+    value = lead;
+    ++s;
+    return true;
+  }
+  if (lead < 0xC2 || lead > 0xFD) return false;
+  const int length = lead < 0xE0 ? 2 : lead < 0xF0 ? 3 : lead < 0xF8 ? 4 : 6;
+  if (end - s < length) return false;
+  const unsigned least = lead == 0xE0                  ? 0xA0
+                         : lead == 0xF0                ? 0x90
+                         : length == 6 && lead != 0xFD ? 0x84
+                                                       : 0x80;
+  if (s[1] < least) return false;
+  unsigned result = lead & (length == 2 ? 0x1F : length == 3 ? 0x0F : length == 4 ? 0x07 : 0x01);
+  for (int i = 1; i < length; ++i) {
+    if ((s[i] & 0xC0) != 0x80) return false;
+    result = result << 6 | (s[i] & 0x3F);
+  }
+  value = result;
+  s += length;
+  return true;
+}
+
+struct Outcome {
+  bool valid = true;
+  ptrdiff_t bytes = 0;  // passed; 0 where the text is malformed, as the count
+  size_t count = 0;
+  std::wstring text;  // all of the destination
+
+  bool operator==(const Outcome&) const = default;
+};
+
+Outcome Plainly(const Bytes& bytes, size_t space) {
+  Outcome outcome;
+  const unsigned char* s = bytes.data();
+  const unsigned char* const end = s + bytes.size();
+  unsigned value;
+  while (outcome.valid && s != end && outcome.text.size() < space) {
+    outcome.valid = DecodePlainly(s, end, value);
+    if (outcome.valid) outcome.text += static_cast<wchar_t>(value);
+  }
+  if (outcome.valid) {
+    outcome.bytes = s - bytes.data();
+    outcome.count = outcome.text.size();
+  }
+  outcome.text.resize(space, L'#');
+  return outcome;
+}
+
+Outcome ByTheLibrary(const Bytes& bytes, size_t space) {
+  Outcome outcome;
+  // Blocks of exactly the size.
+  const std::unique_ptr<unsigned char[]> exact(new unsigned char[bytes.size()]);
+  std::copy(bytes.begin(), bytes.end(), exact.get());
+  const std::unique_ptr<wchar_t[]> dest(new wchar_t[space]);
+  std::fill(dest.get(), dest.get() + space, L'#');
+  const unsigned char* cursor = exact.get();
+  try {
+    outcome.count =
+        Utf8ToWideNoOverflow(cursor, exact.get() + bytes.size(), dest.get(), dest.get() + space);
+  } catch (const exception::InvalidSequence&) {
+    outcome.valid = false;
+  }
+  outcome.bytes = cursor - exact.get();
+  outcome.text.assign(dest.get(), space);
+  return outcome;
+}
+
+// Mostly ASCII, or mostly not; whole sequences of each length, now and then one that is cut, or a
+// byte that is changed.
+Bytes RandomText(std::mt19937& random) {
+  static const Bytes kSequences[] = {{0xC3, 0xA9},
+                                     {0xDF, 0xBF},
+                                     {0xE0, 0xA0, 0x80},
+                                     {0xE2, 0x82, 0xAC},
+                                     {0xED, 0xA0, 0x80},
+                                     {0xF0, 0x90, 0x80, 0x80},
+                                     {0xF0, 0x9F, 0x98, 0x80},
+                                     {0xF7, 0xBF, 0xBF, 0xBF},
+                                     {0xF8, 0x84, 0x80, 0x80, 0x80, 0x80},
+                                     {0xFD, 0x80, 0x80, 0x80, 0x80, 0x80}};
+  Bytes bytes;
+  const size_t pieces = random() % 120;
+  const unsigned ascii = random() % 20;
+  for (size_t i = 0; i < pieces; ++i) {
+    if (random() % 20 < ascii) {
+      bytes.push_back(static_cast<unsigned char>(random() % 0x80));
+    } else {
+      const Bytes& one = kSequences[random() % std::size(kSequences)];
+      bytes.insert(bytes.end(), one.begin(), one.end());
+    }
+  }
+  if (!bytes.empty() && random() % 4 == 0) {
+    bytes[random() % bytes.size()] = static_cast<unsigned char>(random());
+  }
+  if (random() % 4 == 0) bytes.resize(bytes.size() - random() % (bytes.size() + 1));
+  return bytes;
+}
+
+}  // namespace
+
+TEST(Utf8ToWide, RandomTextsDecodeAsByTheRulesAlone) {
+  std::mt19937 random(20261122);
+  int malformed = 0, cut = 0;
+  for (int i = 0; i < 20000; ++i) {
+    const Bytes bytes = RandomText(random);
+    const size_t space = random() % (bytes.size() + 20);
+    const Outcome plain = Plainly(bytes, space);
+    ASSERT_EQ(plain, ByTheLibrary(bytes, space)) << testing::PrintToString(bytes) << space;
+    const unsigned char* const end = bytes.data() + bytes.size();
+    const Outcome whole = Plainly(bytes, bytes.size());
+    if (whole.valid) {
+      ASSERT_EQ(GetUtf8StringLength(bytes.data(), end), whole.count);
+      cut += plain.bytes < whole.bytes;
+    } else {
+      ASSERT_THROW(GetUtf8StringLength(bytes.data(), end), exception::InvalidSequence);
+      ++malformed;
+    }
+  }
+  EXPECT_GT(malformed, 1000);
+  EXPECT_GT(cut, 1000);
 }

@@ -3,10 +3,15 @@
 // are written, where RFC 3629 would refuse them.
 #include "zt/fnd/WideToUtf8.h"
 
+#include <algorithm>
 #include <cwchar>
 #include <memory>
 
 #include "zt/fnd/Exception.h"
+
+#ifdef __SSE2__
+#include <emmintrin.h>
+#endif
 
 namespace zt::fnd {
 namespace {
@@ -27,6 +32,49 @@ unsigned EncodedBytes(uint32_t value) {
   return value <= 0x3FFFFFF ? 5 : 6;
 }
 
+// Most text is ASCII: characters at a time. The processor's own operations, as compilers make a move
+// a byte of the plain form.
+constexpr ptrdiff_t kRun = 16;
+
+#ifdef __SSE2__
+static_assert(sizeof(wchar_t) == 4);
+
+struct Run {
+  explicit Run(const wchar_t* s) {
+    for (int i = 0; i < 4; ++i) {
+      parts[i] = _mm_loadu_si128(reinterpret_cast<const __m128i*>(s + 4 * i));
+    }
+  }
+  bool isAscii() const {
+    const __m128i bits =
+        _mm_or_si128(_mm_or_si128(parts[0], parts[1]), _mm_or_si128(parts[2], parts[3]));
+    const __m128i beyond = _mm_andnot_si128(_mm_set1_epi32(0x7F), bits);
+    return _mm_movemask_epi8(_mm_cmpeq_epi32(beyond, _mm_setzero_si128())) == 0xFFFF;
+  }
+  void narrow(unsigned char* out) const {
+    const __m128i low = _mm_packs_epi32(parts[0], parts[1]);
+    const __m128i high = _mm_packs_epi32(parts[2], parts[3]);
+    _mm_storeu_si128(reinterpret_cast<__m128i*>(out), _mm_packus_epi16(low, high));
+  }
+
+  __m128i parts[4];
+};
+#else
+struct Run {
+  explicit Run(const wchar_t* s) : text(s) {}
+  bool isAscii() const {
+    uint32_t bits = 0;
+    for (ptrdiff_t i = 0; i < kRun; ++i) bits |= ValueOf(text[i]);
+    return bits <= 0x7F;
+  }
+  void narrow(unsigned char* out) const {
+    for (ptrdiff_t i = 0; i < kRun; ++i) out[i] = static_cast<unsigned char>(text[i]);
+  }
+
+  const wchar_t* text;
+};
+#endif
+
 // Writes the sequence of a value of `count` bytes and returns the place after it.
 unsigned char* EncodeOne(uint32_t value, unsigned count, unsigned char* dest) {
   if (count == 1) {
@@ -41,6 +89,30 @@ unsigned char* EncodeOne(uint32_t value, unsigned count, unsigned char* dest) {
   return dest + count;
 }
 
+// Characters in groups, for which there is space whatever they are: one question for the ends of text
+// and destination, and for a run, instead of one a character.
+constexpr ptrdiff_t kGroup = 8;
+constexpr ptrdiff_t kLongestGroup = kGroup * 6;
+
+inline unsigned char* EncodeGroup(const wchar_t* s, unsigned char* out) {
+  for (ptrdiff_t i = 0; i < kGroup; ++i) {
+    const uint32_t value = ValueOf(s[i]);
+    if (value <= 0x7F) {
+      *out++ = static_cast<unsigned char>(value);
+    } else if (value <= 0x7FF) {
+      *out++ = static_cast<unsigned char>(0xC0 | value >> 6);
+      *out++ = static_cast<unsigned char>(0x80 | (value & 0x3F));
+    } else if (value <= 0xFFFF) {
+      *out++ = static_cast<unsigned char>(0xE0 | value >> 12);
+      *out++ = static_cast<unsigned char>(0x80 | (value >> 6 & 0x3F));
+      *out++ = static_cast<unsigned char>(0x80 | (value & 0x3F));
+    } else {
+      out = EncodeOne(value, EncodedBytes(value), out);
+    }
+  }
+  return out;
+}
+
 uint32_t Checked(uint64_t count) {
   if (count > 0xFFFFFFFFu) ZT_RAISE(exception::OutOfRange());
   return static_cast<uint32_t>(count);
@@ -53,7 +125,15 @@ uint32_t GetUtf8EncodingBytes(const wchar_t* s) { return GetUtf8EncodingBytes(s,
 uint32_t GetUtf8EncodingBytes(const wchar_t* begin, const wchar_t* end) {
   if (IsEmpty(begin, end)) return 0;
   uint64_t count = 0;
-  for (; begin != end; ++begin) count += EncodedBytes(ValueOf(*begin));
+  while (begin != end) {
+    if (end - begin >= kRun && Run(begin).isAscii()) {
+      begin += kRun;
+      count += kRun;
+    } else {
+      const wchar_t* const stop = begin + std::min(end - begin, kGroup);
+      for (; begin != stop; ++begin) count += EncodedBytes(ValueOf(*begin));
+    }
+  }
   return Checked(count);
 }
 
@@ -76,16 +156,24 @@ uint32_t WideToUtf8NoOverflow(const wchar_t*& begin, const wchar_t* end, unsigne
   if (IsEmpty(begin, end)) return 0;
   const wchar_t* s = begin;
   unsigned char* out = dest;
-  for (; s != end && out != destEnd; ++s) {
-    const uint32_t value = ValueOf(*s);
-    if (value <= 0x7F) {
-      *out++ = static_cast<unsigned char>(value);
+  while (s != end && out != destEnd) {
+    if (end - s >= kRun && destEnd - out >= kRun && Run(s).isAscii()) {
+      Run(s).narrow(out);
+      s += kRun;
+      out += kRun;
       continue;
     }
+    if (end - s >= kGroup && destEnd - out >= kLongestGroup) {
+      out = EncodeGroup(s, out);
+      s += kGroup;
+      continue;
+    }
+    const uint32_t value = ValueOf(*s);
     const unsigned count = EncodedBytes(value);
     // No sequence is ever cut: its rest would read as malformed text.
     if (static_cast<ptrdiff_t>(count) > destEnd - out) break;
     out = EncodeOne(value, count, out);
+    ++s;
   }
   // Before `begin` moves: a count that does not fit throws with the caller's cursor unchanged.
   const uint32_t written = Checked(static_cast<uint64_t>(out - dest));

@@ -2,7 +2,11 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <cstddef>
+#include <iterator>
 #include <memory>
+#include <random>
 #include <string>
 #include <vector>
 
@@ -107,4 +111,68 @@ TEST(WideToUtf8, NewBlockIsTerminated) {
   EXPECT_STREQ(chars(range), "a");
   EXPECT_STREQ(chars(none), "");
   EXPECT_STREQ(chars(nullRange), "");
+}
+
+// ---- beside an encoder without shortcuts
+
+namespace {
+
+std::string EncodePlainly(unsigned value) {
+  if (value > 0x7FFFFFFF) return "?";
+  if (value <= 0x7F) return std::string(1, static_cast<char>(value));
+  std::string text;
+  unsigned first = 0x3F;  // what the lead of this length can hold
+  for (; value > first; value >>= 6, first >>= 1) {
+    text.insert(text.begin(), static_cast<char>(0x80 | (value & 0x3F)));
+  }
+  return static_cast<char>(~(2 * first + 1) | value) + text;
+}
+
+// Mostly ASCII, or mostly not.
+std::wstring RandomText(std::mt19937& random) {
+  static const unsigned kMost[] = {0x80,      0x7FF,      0xFFFF,    0x1FFFFF,
+                                   0x3FFFFFF, 0x7FFFFFFF, 0xFFFFFFFF};
+  std::wstring text(random() % 120, L'\0');
+  const unsigned ascii = random() % 20;
+  for (wchar_t& c : text) {
+    const unsigned most = random() % 20 < ascii ? 0x7F : kMost[random() % std::size(kMost)];
+    c = static_cast<wchar_t>(most - random() % (most / 2 + 1));
+  }
+  return text;
+}
+
+}  // namespace
+
+TEST(WideToUtf8, RandomTextsEncodeAsByTheRulesAlone) {
+  std::mt19937 random(20261122);
+  int cut = 0;
+  for (int i = 0; i < 20000; ++i) {
+    const std::wstring text = RandomText(random);
+    std::string whole, fitting;
+    const size_t space = random() % (text.size() * 3 + 20);
+    size_t passed = 0;
+    for (wchar_t c : text) {
+      const std::string one = EncodePlainly(static_cast<unsigned>(c));
+      const bool fits = fitting == whole && whole.size() + one.size() <= space;
+      if (fits) {
+        fitting += one;
+        ++passed;
+      }
+      whole += one;
+    }
+    cut += passed < text.size();
+    // Blocks of exactly the size.
+    const std::unique_ptr<wchar_t[]> exact(new wchar_t[text.size()]);
+    std::copy(text.begin(), text.end(), exact.get());
+    const wchar_t* const end = exact.get() + text.size();
+    const std::unique_ptr<unsigned char[]> dest(new unsigned char[space]);
+    std::fill(dest.get(), dest.get() + space, '#');
+    const wchar_t* cursor = exact.get();
+    ASSERT_EQ(WideToUtf8NoOverflow(cursor, end, dest.get(), dest.get() + space), fitting.size());
+    ASSERT_EQ(cursor - exact.get(), static_cast<ptrdiff_t>(passed));
+    const std::string rest(space - fitting.size(), '#');
+    ASSERT_EQ(std::string(dest.get(), dest.get() + space), fitting + rest) << "space " << space;
+    ASSERT_EQ(GetUtf8EncodingBytes(exact.get(), end), whole.size());
+  }
+  EXPECT_GT(cut, 1000);
 }
