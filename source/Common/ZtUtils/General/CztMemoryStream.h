@@ -45,6 +45,7 @@ class CztMemoryStream : public CztSubStream {
   CztSubStream* newSubStream() override { return CreateStream(); }
 
  private:
+  HRESULT writeAny(const void* buffer, unsigned int count, unsigned int* done);
   HRESULT growTo(uint64_t size);
   HRESULT resizeBlock(uint32_t capacity);
   void dropBlock();

@@ -2,6 +2,9 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <random>
+
 #include "tests/support/FailingHeap.h"
 #include "tests/support/InChild.h"
 #include "tests/support/MemoryLimit.h"
@@ -81,6 +84,39 @@ TEST(CztMemoryStream, WritesOverAndBeyondWhatIsThere) {
   EXPECT_EQ(Contents(stream.get()), "abXY12345");
   EXPECT_EQ(Position(stream.get()), 9);
   EXPECT_EQ(stream->Write(nullptr, 0, nullptr), S_OK);
+}
+
+// Lengths on both sides of four, which has a way of its own, at any place of the data.
+TEST(CztMemoryStream, RandomWritesLeaveWhatAPlainTextHas) {
+  MemoryPtr stream = NewMemory();
+  std::mt19937 random(20261122);
+  std::string plain;
+  for (int i = 0; i < 5000; ++i) {
+    const size_t at = random() % 8 == 0 ? random() % (plain.size() + 1) : plain.size();
+    stream->Seek(static_cast<int64_t>(at), ztSeekBegin, nullptr);
+    std::string piece(random() % 2 == 0 ? 4 : random() % 10, '\0');
+    for (char& c : piece) c = static_cast<char>(random());
+    unsigned done = 99;
+    ASSERT_EQ(stream->Write(piece.data(), static_cast<unsigned>(piece.size()), &done), S_OK);
+    ASSERT_EQ(done, piece.size());
+    plain.replace(at, std::min(piece.size(), plain.size() - at), piece);
+    ASSERT_EQ(stream->size(), plain.size());
+    ASSERT_EQ(Position(stream.get()), static_cast<int64_t>(at + piece.size()));
+  }
+  EXPECT_EQ(Contents(stream.get()), plain);
+}
+
+TEST(CztMemoryStream, FourBytesAreRefusedAsAnyOthers) {
+  MemoryPtr stream = MemoryOf("abcdef");
+  unsigned done = 99;
+  EXPECT_EQ(stream->Write(nullptr, 4, &done), E_INVALIDARG);
+  EXPECT_EQ(done, 0u);
+  stream->Seek(-1, ztSeekBegin, nullptr);
+  EXPECT_EQ(stream->Write("1234", 4, nullptr), E_INVALIDARG);
+  unsigned char block[8] = {};
+  ASSERT_EQ(stream->AttachBuffer(block, sizeof block, true), S_OK);
+  EXPECT_EQ(stream->Write("1234", 4, nullptr), E_FAIL);
+  EXPECT_EQ(block[0], 0);
 }
 
 TEST(CztMemoryStream, ReadGivesWhatThereIs) {
