@@ -11,6 +11,7 @@
 #include <limits>
 
 #include "zt/fnd/Exception.h"
+#include "zt/fnd/osdep/UpperCase.h"
 
 namespace zt::fnd::osdep {
 namespace {
@@ -27,41 +28,64 @@ wchar_t Raw(wchar_t c) { return c; }
 int Difference(int a, int b) { return a - b; }
 int Difference(wchar_t a, wchar_t b) { return wcsncmp(&a, &b, 1); }
 
-// The two cases of one ASCII letter, by the table of single bytes, which is quicker to ask than
-// that of wide characters. A letter that folds to another ASCII letter there folds so here, too;
-// that of i in a Turkish locale is no single byte, and is not seen.
-bool AreCasesOfALetter(wchar_t a, wchar_t b) {
-  if ((a ^ b) != 0x20) return false;
-  const int letter = static_cast<int>(a) | 0x20;
-  return letter >= 'a' && letter <= 'z' && std::toupper(letter) == letter - 0x20;
-}
-bool AreCasesOfALetter(char, char) { return false; }
-
-// Equal characters fold to equal ones, whatever the locale: only a raw difference needs the
-// library's tables.
+// By the library's tables. Out of line, so that the usual comparison saves no registers.
 template <class C>
-int FoldedDifference(C a, C b) {
-  if (a == b || AreCasesOfALetter(a, b)) return 0;
+[[gnu::noinline]] int UpperDifference(C a, C b) {
   return Difference(Upper(a), Upper(b));
 }
 
+// Folds the characters of one comparison, and keeps what it knows of the locale meanwhile.
 template <class C>
-int RawDifference(C a, C b) {
-  return a == b ? 0 : Difference(Raw(a), Raw(b));
-}
+class Folding {
+ public:
+  // Equal characters fold to equal ones, whatever the locale: only a raw difference needs the
+  // library's tables.
+  int operator()(C a, C b) {
+    if (a == b || areCasesOfALetter(a, b)) [[likely]]
+      return 0;
+    return UpperDifference(a, b);
+  }
+
+ private:
+  // The two cases of one ASCII letter, by the table of single bytes, which is quicker to ask than
+  // that of wide characters. A letter that folds to another ASCII letter there folds so here, too;
+  // that of i in a Turkish locale is no single byte, and is not seen.
+  bool areCasesOfALetter(wchar_t a, wchar_t b) {
+    if ((a ^ b) != 0x20) return false;
+    const int letter = static_cast<int>(a) | 0x20;
+    return letter >= 'a' && letter <= 'z' && upper(letter) == letter - 0x20;
+  }
+  bool areCasesOfALetter(char, char) { return false; }
+
+  int upper(int letter) {
+    if (!m_table) m_table = UpperCaseTable();
+    if (m_table) [[likely]]
+      return m_table[letter];
+    return std::toupper(letter);
+  }
+
+  const int32_t* m_table = nullptr;  // until the first two cases of a letter
+};
+
+template <class C>
+struct RawDifference {
+  int operator()(C a, C b) const { return a == b ? 0 : Difference(Raw(a), Raw(b)); }
+};
 
 template <class C>
 int CompareFolded(const C* a, const C* b) {
+  Folding<C> folded;
   for (;; ++a, ++b) {
-    const int difference = FoldedDifference(*a, *b);
+    const int difference = folded(*a, *b);
     if (difference != 0 || *a == C() || *b == C()) return difference;
   }
 }
 
-template <class C, int (*CharDifference)(C, C)>
+template <class C, class CharDifference>
 int CompareRanges(const C* a, const C* aEnd, const C* b, const C* bEnd) {
+  CharDifference differenceOf;
   while (a != aEnd && b != bEnd) {
-    const int difference = CharDifference(*a++, *b++);
+    const int difference = differenceOf(*a++, *b++);
     if (difference != 0) return difference;
   }
   return LengthDifference(aEnd - a, bEnd - b);
@@ -98,12 +122,12 @@ int StringExactCompare(const wchar_t* a, const wchar_t* b) {
 }
 
 int StringCaseCompare(const char* a, const char* aEnd, const char* b, const char* bEnd) {
-  return CompareRanges<char, FoldedDifference<char>>(a, aEnd, b, bEnd);
+  return CompareRanges<char, Folding<char>>(a, aEnd, b, bEnd);
 }
 
 int StringCaseCompare(const wchar_t* a, const wchar_t* aEnd, const wchar_t* b,
                       const wchar_t* bEnd) {
-  return CompareRanges<wchar_t, FoldedDifference<wchar_t>>(a, aEnd, b, bEnd);
+  return CompareRanges<wchar_t, Folding<wchar_t>>(a, aEnd, b, bEnd);
 }
 
 int StringExactCompare(const char* a, const char* aEnd, const char* b, const char* bEnd) {
