@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <new>
+#include <unordered_map>
 
 #include "source/Common/vltBindingClasses.h"
 #include "source/Database/contentsWalk.h"
@@ -36,17 +37,19 @@ std::optional<std::string> Utf8IfAny(const std::optional<std::string>& text) {
   return text ? std::optional<std::string>(Utf8(*text)) : std::nullopt;
 }
 
-using Components = std::map<GUID, Component>;
-
 // A component that was replaced by one of its GUID leaves its bindings.
-void AddClasses(const std::vector<Binding>& bindings, Components* components) {
-  std::map<std::string, Component*> byText;
-  for (auto& [guid, component] : *components) byText.emplace(component.guid, &component);
-  for (const Binding& binding : bindings) {
-    Component& component = *byText.at(binding.component);
+void AddClasses(const std::vector<Binding>& bindings, std::vector<Component>* components) {
+  std::unordered_map<std::string, std::vector<const Binding*>> byComponent;
+  for (const Binding& binding : bindings) byComponent[binding.component].push_back(&binding);
+  if (byComponent.empty()) return;
+  for (Component& component : *components) {
     std::vector<std::string>& classes = component.classes;
-    bool isKnown = std::find(classes.begin(), classes.end(), binding.bindingClass) != classes.end();
-    if (component.type == binding.type && !isKnown) classes.push_back(binding.bindingClass);
+    for (const Binding* binding : byComponent[component.guid]) {
+      if (component.type != binding->type) continue;
+      bool isKnown =
+          std::find(classes.begin(), classes.end(), binding->bindingClass) != classes.end();
+      if (!isKnown) classes.push_back(binding->bindingClass);
+    }
   }
 }
 
@@ -163,12 +166,16 @@ Rehearsal::Merge Rehearsal::merge(const std::string& file, const zt::fnd::AbsTim
 
 void Rehearsal::removeVanished(std::vector<std::string>* vanished) {
   std::vector<std::string> eraseList;
+  // A file has many components, and is looked up once.
+  std::unordered_map<std::string, bool> present;
   for (const ContentsItem& item : ReadContents(m_document)) {
-    if (m_scan.isPresent(item.file)) continue;
-    m_scan.erase(item.component, item.file);
-    if (std::find(vanished->begin(), vanished->end(), item.file) == vanished->end()) {
-      vanished->push_back(item.file);
+    auto [file, isNew] = present.try_emplace(item.file);
+    if (isNew) {
+      file->second = m_scan.isPresent(item.file);
+      if (!file->second) vanished->push_back(item.file);
     }
+    if (file->second) continue;
+    m_scan.erase(item.component, item.file);
     for (int number = item.first; number <= item.last; ++number) {
       std::string name;
       if (m_document.GetNthItemName(registrar::kContents, number + 1, &name) >= 0) {
@@ -183,7 +190,7 @@ void Rehearsal::removeVanished(std::vector<std::string>* vanished) {
 }
 
 void Rehearsal::readComponents(std::vector<Component>* components, std::vector<Binding>* bindings) {
-  Components byGuid;  // of two with one GUID the later counts
+  std::map<GUID, Component> byGuid;  // of two with one GUID the later counts
   int count = m_document.GetNumberOfItems(registrar::kComponents);
   for (int n = 1; n <= count; ++n) {
     std::string name;
@@ -199,8 +206,8 @@ void Rehearsal::readComponents(std::vector<Component>* components, std::vector<B
     byGuid.insert_or_assign(record.identifier, std::move(component));
     if (completed) save();
   }
-  AddClasses(*bindings, &byGuid);
   for (auto& [guid, component] : byGuid) components->push_back(std::move(component));
+  AddClasses(*bindings, components);
 }
 
 bool Rehearsal::completeFileName(const std::string& section, RecordText* record) {
