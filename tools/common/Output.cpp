@@ -29,25 +29,29 @@ std::string TextOf(const Problem& problem) {
 }
 
 void Table::add(std::vector<std::string> cells, Mood mood) {
-  for (std::string& cell : cells) cell = ForTerminal(cell);
-  m_rows.push_back({std::move(cells), mood});
+  Row row{{}, mood};
+  for (const std::string& cell : cells) {
+    std::string text = ForTerminal(cell);
+    size_t width = DisplayWidth(text);
+    row.cells.push_back({std::move(text), width});
+  }
+  m_rows.push_back(std::move(row));
 }
 
 std::string Table::text() const {
   std::vector<size_t> widths;
-  for (const auto& [row, mood] : m_rows) {
-    widths.resize(std::max(widths.size(), row.size()));
-    for (size_t i = 0; i < row.size(); ++i) widths[i] = std::max(widths[i], DisplayWidth(row[i]));
+  for (const auto& [cells, mood] : m_rows) {
+    widths.resize(std::max(widths.size(), cells.size()));
+    for (size_t i = 0; i < cells.size(); ++i) widths[i] = std::max(widths[i], cells[i].width);
   }
   std::string out;
-  for (const auto& [row, mood] : m_rows) {
-    std::string line;
-    for (size_t i = 0; i < row.size(); ++i) {
-      line += Coloured(row[i], i == 0 ? mood : Mood::Plain) +
-              std::string(widths[i] - DisplayWidth(row[i]) + 2, ' ');
+  for (const auto& [cells, mood] : m_rows) {
+    for (size_t i = 0; i < cells.size(); ++i) {
+      out += Coloured(cells[i].text, i == 0 ? mood : Mood::Plain);
+      out.append(widths[i] - cells[i].width + 2, ' ');
     }
-    line.erase(line.find_last_not_of(' ') + 1);
-    out += line + "\n";
+    out.erase(out.find_last_not_of(' ') + 1);
+    out += "\n";
   }
   return out;
 }

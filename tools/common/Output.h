@@ -1,5 +1,7 @@
 #pragma once
 
+#include <stddef.h>
+
 #include <exception>
 #include <nlohmann/json.hpp>
 #include <string>
@@ -48,8 +50,12 @@ class Table {
   std::string text() const;
 
  private:
+  struct Cell {
+    std::string text;
+    size_t width;
+  };
   struct Row {
-    std::vector<std::string> cells;
+    std::vector<Cell> cells;
     Mood mood;
   };
   std::vector<Row> m_rows;

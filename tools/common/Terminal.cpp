@@ -6,6 +6,8 @@
 #include <unistd.h>
 #include <wchar.h>
 
+#include <algorithm>
+
 namespace vltctl {
 namespace {
 
@@ -22,6 +24,12 @@ bool ChangesLayout(wchar_t c) {
          (c >= 0x2066 && c <= 0x2069);
 }
 
+// How many bytes of the beginning every encoding has as the same visible characters, one column each.
+size_t PlainLength(std::string_view text) {
+  auto isPlain = [](char c) { return c >= 0x20 && c < 0x7F; };
+  return static_cast<size_t>(std::find_if_not(text.begin(), text.end(), isPlain) - text.begin());
+}
+
 std::string Character(wchar_t c, std::string_view bytes) {
   auto code = static_cast<unsigned>(c);
   if (code < 0x20 || code == 0x7F) return Formatted("\\x%02X", code);
@@ -34,7 +42,11 @@ std::string Character(wchar_t c, std::string_view bytes) {
 std::string ForTerminal(std::string_view text) {
   std::string out;
   mbstate_t state = {};
-  while (!text.empty()) {
+  for (;;) {
+    size_t plain = PlainLength(text);
+    out += text.substr(0, plain);
+    text.remove_prefix(plain);
+    if (text.empty()) return out;
     wchar_t c = 0;
     size_t size = mbrtowc(&c, text.data(), text.size(), &state);
     if (size == 0) size = 1;  // a zero byte is a character of its own
@@ -48,13 +60,16 @@ std::string ForTerminal(std::string_view text) {
     }
     text.remove_prefix(size);
   }
-  return out;
 }
 
 size_t DisplayWidth(std::string_view text) {
   size_t width = 0;
   mbstate_t state = {};
-  while (!text.empty()) {
+  for (;;) {
+    size_t plain = PlainLength(text);
+    width += plain;
+    text.remove_prefix(plain);
+    if (text.empty()) return width;
     wchar_t c = 0;
     size_t size = mbrtowc(&c, text.data(), text.size(), &state);
     bool isCharacter = size > 0 && size <= text.size();
@@ -63,7 +78,6 @@ size_t DisplayWidth(std::string_view text) {
     if (!isCharacter) state = {};
     text.remove_prefix(isCharacter ? size : 1);
   }
-  return width;
 }
 
 bool ShowsColours() {

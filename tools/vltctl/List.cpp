@@ -2,6 +2,7 @@
 #include <fnmatch.h>
 
 #include <algorithm>
+#include <utility>
 
 #include "tools/common/Locale.h"
 #include "tools/vltctl/Components.h"
@@ -26,6 +27,10 @@ void Print(const std::vector<const Component*>& components, bool isLong, Output&
   if (isLong) header.insert(header.end(), {"PREFIX OR PNP", "CLASSES", "REGISTRATION FILE"});
   vltctl::Table table(header);
   for (const Component* c : components) {
+    if (output.json()) {
+      output.item(ToJson(*c));
+      continue;
+    }
     std::vector<std::string> row = {NameOf(c->type), c->name, c->guid, Versions(*c),
                                     OrDash(c->file)};
     if (isLong) {
@@ -33,8 +38,7 @@ void Print(const std::vector<const Component*>& components, bool isLong, Output&
       row.push_back(std::to_string(c->classes.size()));
       row.push_back(OrDash(c->registrationFile));
     }
-    table.add(row);
-    output.item(ToJson(*c));
+    table.add(std::move(row));
   }
   output.print(table);
 }
