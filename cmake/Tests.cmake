@@ -28,7 +28,7 @@ set(slow_tests "Check.AHang*" "Check.AnExit*" "CheckBundles.Thousands*" "Failure
   "NamedEventHostile.SetsLocked*" "NamedEventLimits.StateFilesThatCannot*"
   "NamedEventLimits.ThousandUnusable*" "NamesInLocales.*" "Planted.*" "PowerCut*"
   "Prefork.SlowWrites*" "RegistrarKill.*" "Rendezvous*" "SnapshotRegistrar.*" "SnapshotStart.*"
-  "vltSettingsTable.EveryChoice*Server" "WriterReuse.EverySave*")
+  "VltctlSurroundings.WhatTakesLong*" "vltSettingsTable.EveryChoice*Server" "WriterReuse.EverySave*")
 list(JOIN slow_tests ":" slow_tests)
 
 # vlt_tests(name LABELS ... [SOURCES ...] [GLOBS ...] [LINKS ...] [TIMEOUT seconds])

@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <filesystem>
 
 #include "tests/e2e/Start.h"
@@ -99,6 +100,45 @@ TEST_F(VltctlSurroundings, ALongCheckShowsHowFarItIsOnATerminal) {
   std::string shown = OnTerminal("check", {{"TERM", "xterm"}});
   EXPECT_NE(shown.find("\rchecking "), std::string::npos) << shown;
   EXPECT_EQ(Vltctl({"check"}).err, "");
+}
+
+// Each reads files that take their time to open.
+TEST_F(VltctlSurroundings, WhatTakesLongShowsOnATerminalHowLongOrHowFar) {
+  if (RunProgram({"sh", "-c", "command -v script"}).exitCode != 0 ||
+      RunProgram({"strace", "-e", "trace=none", "true"}).exitCode != 0) {
+    GTEST_SKIP() << "NOT TESTED: script is not installed, or strace is missing or not permitted";
+  }
+  m_installation.addObjectExpert("Last", "Last", GText(2));
+  ASSERT_EQ(Vltctl({"list", "--live"}).exitCode, kGood);
+  const std::string experts = m_installation.root() + "/Experts",
+                    files = experts + "/Last.vle/Resources/Info.vlr -P " + experts +
+                            "/Tank.vle/Resources/Info.vlr",
+                    database = m_installation.database(), cleared = "\r\x1B[K";
+  auto slowly = [](const std::string& path, const std::string& command) {
+    return "strace -f -o /dev/null -P " + path +
+           " -e trace=openat,openat2 -e inject=openat,openat2:delay_enter=600000 " + kVltctl + " " +
+           command;
+  };
+  const Environment terminal = {{"TERM", "xterm"}, {"ASAN_OPTIONS", "detect_leaks=0"}};
+  auto shown = [&](const std::string& command) {
+    return RunProgram({"script", "-qec", command, "/dev/null"}, terminal).out;
+  };
+  for (const auto& [path, command, line, result] :
+       {std::array<std::string, 4>{database, "list", "reading the installation: 1 s", "TYPE"},
+        {database, "scan --dry-run", "reading the installation: 1 s", "2 unchanged"},
+        {database, "doctor", "examining the installation: 1 s", "ok"},
+        {files, "verify --content", "comparing 1 of 2", "2 registration files"},
+        {files, "lint " + experts, "reading 1 of 2", experts}}) {
+    const std::string text = shown(slowly(path, command));
+    size_t at = text.find("\r" + line), end = text.find(cleared), output = text.rfind(result);
+    EXPECT_NE(at, std::string::npos) << command << "\n" << text;
+    EXPECT_LT(at, end) << command << "\n" << text;
+    EXPECT_LT(end, output) << command << "\n" << text;
+    EXPECT_NE(output, std::string::npos) << command << "\n" << text;
+  }
+  for (const std::string& slow : {slowly(database, "list"), slowly(files, "lint " + experts)}) {
+    EXPECT_EQ(RunProgram({"sh", "-c", slow}, terminal).err, "");
+  }
 }
 
 ProgramResult InShell(const std::string& script, const std::vector<std::string>& arguments) {

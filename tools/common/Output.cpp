@@ -7,6 +7,8 @@
 #include <algorithm>
 #include <utility>
 
+#include "tools/common/Progress.h"
+
 namespace vltctl {
 namespace {
 
@@ -14,7 +16,10 @@ std::string Dump(const Json& value) {
   return value.dump(-1, ' ', false, Json::error_handler_t::replace);
 }
 
-void Write(std::string_view text) { fwrite(text.data(), 1, text.size(), stdout); }
+void Write(std::string_view text) {
+  ClearProgress();
+  fwrite(text.data(), 1, text.size(), stdout);
+}
 
 Json OrNull(const std::string& text) { return text.empty() ? Json() : Json(text); }
 
@@ -92,6 +97,7 @@ void Output::raw(std::string_view text) {
 void Output::flush() { fflush(stdout); }
 
 void Output::note(std::string_view text) {
+  ClearProgress();
   fflush(stdout);
   fprintf(stderr, "vltctl: %s\n", ForTerminal(text).c_str());
 }

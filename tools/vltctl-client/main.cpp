@@ -148,11 +148,9 @@ int Check(const Arguments& arguments, Output& output) {
   vltctl::Progress progress("checking", components.size());
   vltctl::CheckComponents(components, options, [&](const Component& c, const vltctl::Verdict& v) {
     if (!v.code.empty()) ++bad;
-    progress.clear();
     if (!v.code.empty() || !arguments.has("--only-bad")) vltctl::Show(ToJson(c), v, output);
     progress.step();
   });
-  progress.clear();
   output.line(vltctl::Summary(components.size(), bad));
   return bad == 0 ? kGood : kNotFound;
 }

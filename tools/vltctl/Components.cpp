@@ -10,6 +10,7 @@
 
 #include "source/IniFileLock.h"
 #include "tools/common/LockHolder.h"
+#include "tools/common/Progress.h"
 #include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Library.h"
 #include "tools/vltctl/Reading.h"
@@ -36,7 +37,12 @@ void WithFailures(const std::function<void()>& step) {
   }
 }
 
+namespace {
+constexpr const char* kReading = "reading the installation";
+}  // namespace
+
 Snapshot ReadSnapshot() {
+  vltctl::Waiting waiting(kReading);
   Snapshot snapshot;
   WithFailures([&] {
     snapshot = HasChosenRoot() ? vlt::snapshot::Read(InstallDirectory()) : vlt::snapshot::Read();
@@ -45,6 +51,7 @@ Snapshot ReadSnapshot() {
 }
 
 vlt::snapshot::Start Rehearse() {
+  vltctl::Waiting waiting(kReading);
   vlt::snapshot::Start start;
   WithFailures([&] {
     start = HasChosenRoot() ? vlt::snapshot::RehearseStart(InstallDirectory())

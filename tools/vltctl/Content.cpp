@@ -7,6 +7,7 @@
 #include "source/Database/databaseText.h"
 #include "source/Snapshot/Rehearsal.h"
 #include "source/Snapshot/Tree.h"
+#include "tools/common/Progress.h"
 #include "tools/vltctl/Claims.h"
 #include "tools/vltctl/Components.h"
 #include "tools/vltctl/Root.h"
@@ -69,10 +70,15 @@ class Comparison {
   }
 
   Contents compare() {
-    for (const TreeFile& file : vlt::snapshot::ReadTree(m_opened.place).files) {
-      if (m_rehearsal.stateOf(file.recorded, file.time) != FileState::Unchanged) continue;
-      ++m_contents.files;
-      compare(file);
+    const std::vector<TreeFile> files = vlt::snapshot::ReadTree(m_opened.place).files;
+    vltctl::Progress progress("comparing", files.size());
+    for (const TreeFile& file : files) {
+      bool isCompared = m_rehearsal.stateOf(file.recorded, file.time) == FileState::Unchanged;
+      if (isCompared) {
+        ++m_contents.files;
+        compare(file);
+      }
+      progress.step();
     }
     return m_contents;
   }

@@ -11,6 +11,7 @@
 #include "source/Common/Posix/vltlinuxos.h"
 #include "tools/common/Locale.h"
 #include "tools/common/LockHolder.h"
+#include "tools/common/Progress.h"
 #include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Reading.h"
 #include "tools/vltctl/Root.h"
@@ -158,14 +159,20 @@ void CheckProcess(Signs* signs) {
   }
 }
 
-}  // namespace
-
-int Doctor(const Arguments&, Output& output) {
+Signs AllSigns() {
+  vltctl::Waiting waiting("examining the installation");
   Signs signs;
   for (auto check : {CheckInstallation, CheckFiles, CheckHooks, CheckSpace}) check(&signs);
   if (!HasChosenRoot()) {
     for (auto check : {CheckShared, CheckProcess}) check(&signs);
   }
+  return signs;
+}
+
+}  // namespace
+
+int Doctor(const Arguments&, Output& output) {
+  const Signs signs = AllSigns();
   vltctl::Table table;
   bool isBad = false;
   for (const Sign& sign : signs) {

@@ -11,6 +11,7 @@
 #include "source/Database/databaseText.h"
 #include "source/Database/recordText.h"
 #include "tools/common/IniLines.h"
+#include "tools/common/Progress.h"
 #include "tools/vltctl/Library.h"
 #include "tools/vltctl/Reading.h"
 #include "vlloader/source/InstallLayout.h"
@@ -484,7 +485,11 @@ int Lint(const Arguments& arguments, Output& output) {
   Taken taken;
   AddInstalled(files, &taken);
   Tally tally;
-  for (const std::string& file : files) Linter(file, &taken, &tally, output).run();
+  vltctl::Progress progress("reading", files.size());
+  for (const std::string& file : files) {
+    Linter(file, &taken, &tally, output).run();
+    progress.step();
+  }
   output.line(Count(tally.errors, "error") + " and " + Count(tally.warnings, "warning") + " in " +
               Count(tally.files, "file"));
   bool isBad = tally.errors > 0 || (arguments.has("--strict") && tally.warnings > 0);
