@@ -76,6 +76,22 @@ TEST_F(VltctlRoot, PlacesAndSignsAreThoseOfTheImageAlone) {
   }
 }
 
+TEST_F(VltctlRoot, WhatToDoIsSaidForTheImage) {
+  const std::string option = " --root " + root() + "\"";
+  EXPECT_EQ(text({"show", "Nothing"}).err, "vltctl: no component Nothing; \"vltctl list" + option +
+                                               " shows all, and \"vltctl why" + option +
+                                               " says why\n");
+  EXPECT_EQ(asJson({"show", "Nothing"}).problems.at(0)["next"],
+            "\"vltctl list" + option + " shows all, and \"vltctl why" + option + " says why");
+  WriteBytes(file("vlt.vl5"), "short");
+  const std::string repair = "\"vltctl repair" + option + " keeps the file and gives it a sidecar";
+  EXPECT_EQ(ItemWith(asJson({"verify"}).items, "file", file("vlt.vlr"))["next"], repair);
+  EXPECT_NE(text({"verify"}).out.find("\n  " + repair + "\n"), std::string::npos);
+  EXPECT_EQ(ItemWith(asJson({"doctor"}).items, "code", "sidecar-short")["next"], repair);
+  EXPECT_EQ(text({"list"}).err,
+            "vltctl: " + file("vlt.vlr") + ": the sidecar is short; " + repair + "\n");
+}
+
 TEST_F(VltctlRoot, AnIdentityIsNotMadeInAnImage) {
   fs::remove(file("Data/vltjar.ini"));
   JsonResult result = asJson({"identity"});

@@ -102,7 +102,9 @@ void Output::note(std::string_view text) {
   fprintf(stderr, "vltctl: %s\n", ForTerminal(text).c_str());
 }
 
-void Output::problem(const Problem& problem) {
+void Output::problem(const Problem& given) {
+  Problem problem = given;
+  problem.next = remedy(problem.next);
   note(TextOf(problem));
   m_problems.push_back({{"code", problem.code},
                         {"where", OrNull(problem.where)},

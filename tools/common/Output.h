@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "tools/common/Commands.h"
+#include "tools/common/Remedy.h"
 #include "tools/common/Terminal.h"
 
 // What a command prints: text for people or, with --json, one document for programs:
@@ -64,11 +65,16 @@ class Table {
 // The output of one command. With --json, text is not printed; without, items are not.
 class Output {
  public:
-  Output(std::string command, bool json) : m_command(std::move(command)), m_json(json) {}
+  // `root` is the value of --root; empty without it.
+  Output(std::string command, bool json, std::string root = "")
+      : m_command(std::move(command)), m_json(json), m_root(std::move(root)) {}
   Output(const Output&) = delete;
   Output& operator=(const Output&) = delete;
 
   bool json() const { return m_json; }
+
+  // What to do, for the installation of the command (Remedy.h). Problems are given theirs here.
+  std::string remedy(const std::string& text) const { return RemedyAt(m_root, text); }
 
   // One element of "items", printed at once. JSON demands UTF-8; what a file holds beyond it is shown
   // as the replacement character.
@@ -98,6 +104,7 @@ class Output {
 
   const std::string m_command;
   const bool m_json;
+  const std::string m_root;
   bool m_begun = false, m_hasItems = false;
   Json m_problems = Json::array();
 };

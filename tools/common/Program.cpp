@@ -29,7 +29,7 @@ int Show(Output& output, const char* what, const std::string& text) {
 
 int RunCommand(const Arguments& arguments, char** argv, std::span<const Handler> handlers,
                int (*other)(char** argv, Output& output)) {
-  Output output(arguments.command().name, arguments.json());
+  Output output(arguments.command().name, arguments.json(), arguments.text("--root"));
   auto handler = std::find_if(handlers.begin(), handlers.end(), [&](const Handler& row) {
     return std::string_view(row.command) == arguments.command().name;
   });

@@ -103,12 +103,14 @@ Snapshot ReadComponents(Output& output) {
   CheckDatabase(snapshot.database);
   NoteProblems(snapshot.problems, output);
   if (snapshot.database.state == DatabaseState::DigestDiffers) {
-    output.note(snapshot.database.path +
-                ": the digest differs; \"vltctl verify\" says what the next opening does");
+    output.note(
+        snapshot.database.path +
+        output.remedy(": the digest differs; \"vltctl verify\" says what the next opening does"));
   }
   if (unsigned changes = snapshot.changes()) {
-    output.note(Plural(changes, "registration file") +
-                " changed since the database was saved; 'vltctl scan --dry-run' lists them");
+    output.note(
+        Plural(changes, "registration file") +
+        output.remedy(" changed since the database was saved; 'vltctl scan --dry-run' lists them"));
   }
   return snapshot;
 }

@@ -178,12 +178,13 @@ int Doctor(const Arguments&, Output& output) {
   for (const Sign& sign : signs) {
     const char* level = kLevels[static_cast<int>(sign.level)];
     isBad = isBad || sign.level == Level::Bad;
-    table.add({level, sign.what, sign.where, sign.next}, MoodOf(sign.level));
+    const std::string next = output.remedy(sign.next);
+    table.add({level, sign.what, sign.where, next}, MoodOf(sign.level));
     output.item({{"level", level},
                  {"code", sign.code},
                  {"what", sign.what},
                  {"where", sign.where},
-                 {"next", sign.next.empty() ? vltctl::Json() : vltctl::Json(sign.next)}});
+                 {"next", next.empty() ? vltctl::Json() : vltctl::Json(next)}});
   }
   output.print(table);
   return isBad ? vltctl::kNotFound : vltctl::kGood;

@@ -75,16 +75,17 @@ int Verify(const Arguments& arguments, Output& output) {
     GuardedIniState state = Inspect(file);
     const StateWords& words = WordsOf(state.kind);
     const OpeningWords& opening = WordsOf(state.opening);
+    const std::string next = output.remedy(words.next);
     output.item({{"file", file},
                  {"state", words.code},
                  {"found", words.found},
                  {"why", OrNull(WhyOf(state))},
                  {"opening", opening.code},
                  {"nextOpen", opening.text},
-                 {"next", OrNull(words.next)}});
+                 {"next", OrNull(next)}});
     output.line(file + ": ", Sentence(state), MoodOf(state),
                 std::string("; the next open ") + opening.text);
-    if (*words.next) output.line("  " + std::string(words.next));
+    if (!next.empty()) output.line("  " + next);
     code = std::max<int>(code, CodeOf(state));
   }
   return code;
@@ -260,7 +261,7 @@ void Show(const std::string& file, const GuardedIniState& before, const Repaired
       line += "nothing to do";
       break;
     case Remedy::Impossible:
-      line += "cannot be repaired; " + std::string(WordsOf(before.kind).next);
+      line += "cannot be repaired; " + output.remedy(WordsOf(before.kind).next);
       break;
     default:
       line += Sentence(done.remedy, dry);

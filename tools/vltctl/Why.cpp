@@ -227,7 +227,8 @@ class Judge {
               "start that program again"};
     }
     return {"not-yet-scanned", claim.key, file, "is new or changed since the last start",
-            "start a program that uses the registrar, or \"vltctl list --live\""};
+            HasChosenRoot() ? "start a program that uses the registrar, on its own machine"
+                            : "start a program that uses the registrar, or \"vltctl list --live\""};
   }
 
   Verdict ofComponent(const Component& c) const {
