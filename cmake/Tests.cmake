@@ -24,7 +24,7 @@ endif()
 # "slow", and ./dev alone leaves them out.
 set(slow_tests "Check.AHang*" "Check.AnExit*" "CheckBundles.Thousands*" "Failures/Oom.EveryCall*" "FailingCall.*"
   "FindFiles.ManyEntries*" "ForkStorm.*" "ForkThreads.*" "Hostile.A*Million*"
-  "Hostile.AHundredThousand*" "IniFileLockLocale.*" "Locales.*" "NamedEventHostile.LockFileShared*"
+  "Help.ZshCompletes*" "Hostile.AHundredThousand*" "IniFileLockLocale.*" "Locales.*" "NamedEventHostile.LockFileShared*"
   "NamedEventHostile.SetsLocked*" "NamedEventLimits.StateFilesThatCannot*"
   "NamedEventLimits.ThousandUnusable*" "NamesInLocales.*" "Planted.*" "PowerCut*"
   "Prefork.SlowWrites*" "RegistrarKill.*" "Rendezvous*" "SnapshotRegistrar.*" "SnapshotStart.*"

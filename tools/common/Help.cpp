@@ -331,7 +331,7 @@ std::string Zsh() {
       "(( CURRENT == 2 )) && key=\n"
       "(( CURRENT > 3 )) && key+=\" $words[3]\"\n" +
       ZshValues() + "case $key in\n  '')\n    commands=(\n" + ZshList(FirstWords()) +
-      "    )\n    _describe command commands\n    ;;\n";
+      "    )\n    _describe command commands\n    compadd -- --help --version\n    ;;\n";
   for (const NamedWord& first : FirstWords()) {
     if (WordsBelow(first.word).empty()) continue;
     const Command* command = FindCommand(first.word);
@@ -382,21 +382,40 @@ std::string FishOption(const std::string& condition, const Argument& option) {
          "\n";
 }
 
-std::string Fish() {
-  std::string out =
-      "# Completion of vltctl for fish, made by \"vltctl completion fish\".\n"
-      "complete -c vltctl -f\n";
-  for (const NamedWord& word : FirstWords()) {
-    out += "complete -c vltctl -n __fish_use_subcommand -a " + word.word + " -d " +
+// By the words before the cursor: what they are in whole, and what they begin with. The words of a command
+// are also values of others.
+constexpr const char* kFishFunctions =
+    "function __vltctl_is\n"
+    "  set -l words (commandline -opc)\n"
+    "  test \"$words[2..-1]\" = \"$argv\"\n"
+    "end\n"
+    "function __vltctl_in\n"
+    "  set -l words (commandline -opc)\n"
+    "  test \"$words[2..\"(math 1 + (count $argv))\"]\" = \"$argv\"\n"
+    "end\n";
+
+std::string FishWords(const std::string& above, const std::vector<NamedWord>& words) {
+  std::string out;
+  for (const NamedWord& word : words) {
+    out += "complete -c vltctl -n '__vltctl_is" + above + "' -a " + word.word + " -d " +
            FishQuoted(word.summary) + "\n";
   }
+  return out;
+}
+
+std::string Fish() {
+  std::string out =
+      std::string("# Completion of vltctl for fish, made by \"vltctl completion fish\".\n") +
+      kFishFunctions + "complete -c vltctl -f\n" + FishWords("", FirstWords()) +
+      "complete -c vltctl -n __vltctl_is -l help\n"
+      "complete -c vltctl -n __vltctl_is -l version\n";
+  for (const NamedWord& first : FirstWords()) {
+    out += FishWords(" " + first.word, WordsBelow(first.word));
+  }
   for (const Command& command : Commands()) {
-    std::string condition = "'__fish_seen_subcommand_from " + FirstWord(command);
-    std::string second = SecondWord(command);
-    if (!second.empty()) {
-      out += "complete -c vltctl -n " + condition + "' -a " + second + " -d " +
-             FishQuoted(command.summary) + "\n";
-      condition += "; and __fish_seen_subcommand_from " + second;
+    std::string condition = std::string("'__vltctl_in ") + command.name;
+    for (const NamedWord& word : WordsBelow(command.name)) {
+      condition += "; and not __vltctl_in " + std::string(command.name) + " " + word.word;
     }
     condition += "'";
     if (OffersOf(command).files) out += "complete -c vltctl -n " + condition + " -F\n";

@@ -21,6 +21,10 @@ using vlt::test::WriteBytes;
 
 const std::string kSource = VLT_TEST_SOURCE;
 
+bool IsHere(const char* program) {
+  return RunProgram({"sh", "-c", std::string("command -v ") + program}).exitCode == 0;
+}
+
 TEST(Help, TheManualHasTheListOfTheTable) {
   std::string manual = ReadBytes(kSource + "/man/vltctl.1");
   const std::string begin = ".\\\" Made by \"vltctl completion man\".\n",
@@ -33,9 +37,7 @@ TEST(Help, TheManualHasTheListOfTheTable) {
 }
 
 TEST(Help, TheManualsAreClean) {
-  if (RunProgram({"sh", "-c", "command -v mandoc"}).exitCode != 0) {
-    GTEST_SKIP() << "NOT TESTED: mandoc is not installed";
-  }
+  if (!IsHere("mandoc")) GTEST_SKIP() << "NOT TESTED: mandoc is not installed";
   for (const char* manual : {"/man/vltctl.1", "/man/vltutils.3", "/man/Info.vlr.5",
                              "/man/kor.ini.5", "/man/vlt.vlr.5", "/man/vltutils.7"}) {
     auto result = RunProgram({"mandoc", "-T", "lint", kSource + manual});
@@ -129,12 +131,88 @@ TEST(Help, BashCompletesFiles) {
   EXPECT_EQ(completed, kSource + "/man/vltctl.1 ");
 }
 
+struct Completion {
+  const char *line, *expected;
+};
+
+// All that fish offers for the last word of the line.
+TEST(Help, FishOffersWhatFits) {
+  if (!IsHere("fish")) GTEST_SKIP() << "NOT TESTED: fish is not installed";
+  const std::string man = kSource + "/man/", root = "vltctl verify --root " + kSource + "/m",
+                    file = "vltctl verify " + man + "vltctl.";
+  const std::string page = man + "vltctl.1";
+  const Completion rows[] = {
+      {"vltctl ver", "verify "},
+      {"vltctl -", "--help --version "},
+      {"vltctl hook ", "arm clear list "},
+      {"vltctl hook list ", ""},
+      {"vltctl hook list --", "--help --json "},
+      {"vltctl hook arm x ", "crash exhaust fail hang throw "},
+      {"vltctl settings --c", "--client "},
+      {"vltctl settings set --", "--help --json --name --root "},
+      {"vltctl list --type ", "dictionary object-expert resource-expert "},
+      {root.c_str(), man.c_str()},
+      {file.c_str(), page.c_str()},
+  };
+  vlt::test::TempDir dir;
+  WriteBytes(dir / "vltctl.fish", CompletionText("fish"));
+  for (const auto& [line, expected] : rows) {
+    auto result = RunProgram({"fish", "--no-config", "-c",
+                              "source " + (dir / "vltctl.fish") + "; complete -C '" + line + "'"});
+    std::istringstream offers(result.out);
+    std::string words;
+    for (std::string offer; std::getline(offers, offer);) {
+      words += offer.substr(0, offer.find('\t')) + " ";
+    }
+    if (*expected == '/') words.pop_back();
+    EXPECT_EQ(words, expected) << line << result.err;
+  }
+}
+
+// What zsh makes of the line, in a terminal of its own, when its completion is asked for.
+TEST(Help, ZshCompletesWhatFits) {
+  if (!IsHere("zsh")) GTEST_SKIP() << "NOT TESTED: zsh is not installed";
+  const std::string root = "vltctl verify --root " + kSource + "/m",
+                    file = "vltctl verify " + kSource + "/man/vltctl.";
+  const std::string man = "vltctl verify --root " + kSource + "/man/", page = file + "1 ";
+  const Completion rows[] = {
+      {"vltctl ver", "vltctl verify "},
+      {"vltctl --v", "vltctl --version "},
+      {"vltctl hook a", "vltctl hook arm "},
+      {"vltctl hook arm x ex", "vltctl hook arm x exhaust "},
+      {"vltctl hook list --j", "vltctl hook list --json "},
+      {"vltctl hook list --t", "vltctl hook list --t"},
+      {"vltctl settings --c", "vltctl settings --client "},
+      {"vltctl settings set --n", "vltctl settings set --name "},
+      {"vltctl list --type d", "vltctl list --type dictionary "},
+      {root.c_str(), man.c_str()},
+      {file.c_str(), page.c_str()},
+  };
+  vlt::test::TempDir dir;
+  WriteBytes(dir / "_vltctl", CompletionText("zsh"));
+  WriteBytes(dir / "ask",
+             "zmodload zsh/zpty\n"
+             "zpty shell zsh -f -i\n"
+             "zpty -w shell \"PS1= PS2= fpath=($1 \\$fpath)\"\n"
+             "zpty -w shell 'autoload -Uz compinit && compinit -D -u'\n"
+             "zpty -w shell \"answer() { zle complete-word; print -rn -- \\\"\\$BUFFER\\\" >$2; "
+             "exit }\"\n"
+             "zpty -w shell 'zle -N answer; bindkey \"^X\" answer'\n"
+             "zpty -w -n shell \"$3\"$'\\x18'\n"
+             "while zpty -r shell output; do :; done\n");
+  for (const auto& [line, expected] : rows) {
+    WriteBytes(dir / "answer", "none");
+    RunProgram({"timeout", "60", "zsh", "-f", dir / "ask", dir / "", dir / "answer", line});
+    EXPECT_EQ(ReadBytes(dir / "answer"), expected) << line;
+  }
+}
+
 // The other shells, if they are here, accept their scripts.
 TEST(Help, ZshAndFishAcceptTheirScripts) {
   vlt::test::TempDir dir;
   int tested = 0;
   for (const char* shell : {"zsh", "fish"}) {
-    if (RunProgram({"sh", "-c", std::string("command -v ") + shell}).exitCode != 0) continue;
+    if (!IsHere(shell)) continue;
     WriteBytes(dir / shell, CompletionText(shell));
     auto result = RunProgram({shell, "-n", dir / shell});
     EXPECT_EQ(result.exitCode, 0) << result.err;
