@@ -60,6 +60,28 @@ TEST(Help, TheManualOfTheLibraryNamesEachExport) {
   EXPECT_GE(count, 60);
 }
 
+// Declarations of functions, each in one line, in their order.
+std::vector<std::string> Declarations(const std::string& text, const std::string& pattern) {
+  const std::regex declaration(pattern), blanks("\\s+"), afterBracket("\\( ");
+  std::vector<std::string> found;
+  for (std::sregex_iterator one(text.begin(), text.end(), declaration), end; one != end; ++one) {
+    std::string line = std::regex_replace(one->str(1), blanks, " ");
+    found.push_back(std::regex_replace(line, afterBracket, "("));
+  }
+  return found;
+}
+
+TEST(Help, TheManualOfTheLibraryHasTheDeclarationsOfTheHeader) {
+  const std::string manual = ReadBytes(kSource + "/man/vltutils.3");
+  const size_t begin = manual.find(".SH SYNOPSIS"), end = manual.find("\n.fi\n", begin);
+  ASSERT_NE(end, std::string::npos);
+  const std::vector<std::string> declared = Declarations(
+      ReadBytes(kSource + "/source/Utilities/vltutils.h"), "VLT_EXPORT ([^;]*\\bvlt\\w+\\([^;]*;)");
+  EXPECT_GE(declared.size(), 60u);
+  EXPECT_EQ(Declarations(manual.substr(begin, end - begin), "\n(\\w[^;]*\\bvlt\\w+\\([^;]*;)"),
+            declared);
+}
+
 TEST(Help, NamesEachCommandAndEachArgument) {
   std::string all = HelpText("");
   for (const Command& command : Commands()) {
