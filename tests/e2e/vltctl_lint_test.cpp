@@ -210,7 +210,8 @@ TEST(VltctlLintNew, WhatIsWrongIsSaidAndMakesNothing) {
   const std::vector<std::pair<std::vector<std::string>, std::string>> rows = {
       {{"new", "object-expret", dir / "x", "--name", "A"},
        "no such kind of component: object-expret; did you mean \"object-expert\"?"},
-      {{"new", "dictionary", dir / "x"},
+      {{"new", "dictionary", dir / "x"}, "new needs a name; give it as --name NAME"},
+      {{"new", "dictionary", dir / "x", "--name", ""},
        "--name: \"\" is no name for a bundle; give letters, digits, \"-\" and \"_\", a letter "
        "first"},
       {{"new", "dictionary", dir / "x", "--name", "../A"},

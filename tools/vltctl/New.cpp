@@ -130,6 +130,9 @@ void ExpectEmpty(const fs::path& directory) {
 int New(const Arguments& arguments, Output& output) {
   const Kind& kind = KindOf(arguments.text("KIND"));
   const std::string name = arguments.text("--name"), guid = FreshGuid();
+  if (!arguments.has("--name")) {
+    throw Failure(vltctl::kUsage, {"usage", "", "new needs a name", "", "give it as --name NAME"});
+  }
   ExpectName(name);
   std::string boundTo = arguments.has("--class") ? arguments.text("--class") : FreshGuid();
   if (!vltctl::IsGuidText(boundTo)) {
