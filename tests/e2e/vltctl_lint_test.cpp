@@ -212,8 +212,7 @@ TEST(VltctlLintNew, WhatIsWrongIsSaidAndMakesNothing) {
        "no such kind of component: object-expret; did you mean \"object-expert\"?"},
       {{"new", "dictionary", dir / "x"}, "new needs a name; give it as --name NAME"},
       {{"new", "dictionary", dir / "x", "--name", ""},
-       "--name: \"\" is no name for a bundle; give letters, digits, \"-\" and \"_\", a letter "
-       "first"},
+       "--name: is empty; see \"vltctl new --help\""},
       {{"new", "dictionary", dir / "x", "--name", "../A"},
        "--name: \"../A\" is no name for a bundle; give letters, digits, \"-\" and \"_\", a letter "
        "first"},

@@ -151,6 +151,17 @@ TEST_F(VltctlRepair, WithoutFilesThoseOfTheInstallationAreVerified) {
   EXPECT_EQ(Vltctl({"verify", "--all"}).out, Vltctl({"verify"}).out);
 }
 
+TEST_F(VltctlRepair, WhereNothingIsThatIsSaid) {
+  TempDir empty;
+  for (const char* command : {"verify", "repair"}) {
+    ProgramResult result = Vltctl({command, "--root", empty.path()});
+    EXPECT_EQ(result.exitCode, kGood) << result.err;
+    EXPECT_EQ(result.out,
+              "there is no database, jar or settings file yet; programs make them when they need "
+              "them\n");
+  }
+}
+
 // ---- repair
 
 // The components of a start after the repair are those of the one before the damage.

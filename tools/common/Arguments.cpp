@@ -152,6 +152,12 @@ struct Parser {
     } else {
       option->expected(1);
     }
+    // A variable of a script that is not set must not stand for all components, or for no filter.
+    if (name != "VALUE") {
+      option->check([](const std::string& text) {
+        return text.empty() ? std::string("is empty") : std::string();
+      });
+    }
     if (name == "GUID") {
       option->check([](const std::string& text) {
         return IsGuidText(text) ? std::string() : "not a GUID: " + text;
@@ -220,6 +226,9 @@ Parsed Parse(int argc, char** argv) {
   if (!first.starts_with('-') && !IsOneOf(first, CommandWords())) {
     return WrongWord(first, CommandWords(), "");
   }
+  if (first.starts_with('-') && !IsOneOf(first, {"-h", "--help", "--version"})) {
+    return Wrong("the command comes before " + first, HelpHint(""));
+  }
   std::vector<std::string> below = WordsBelow(first);
   if (!FindCommand(first) && argc == 2 && !below.empty()) {
     return Wrong(first + " needs one more word", HelpHint(first));
@@ -240,6 +249,11 @@ Parsed Parse(int argc, char** argv) {
     out.kind = Parsed::Kind::Version;
   } catch (const CLI::ExtrasError& error) {
     return WrongExtras(parser.app, error.what());
+  } catch (const CLI::ArgumentMismatch& error) {
+    const std::string option = error.what();
+    bool isMissing = option.ends_with("missing");
+    return Wrong(isMissing ? option.substr(0, option.find(':')) + " needs a value" : option,
+                 HelpHint(CommandOf(parser.app)));
   } catch (const CLI::ParseError& error) {
     return Wrong(error.what(), HelpHint(CommandOf(parser.app)));
   }

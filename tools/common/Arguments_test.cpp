@@ -52,13 +52,25 @@ TEST(Arguments, WhatIsWrongSaysWhatToDo) {
       {{"list", "more"},
        "The following argument was not expected: more",
        "see \"vltctl list --help\""},
-      {{"show"}, "COMPONENT is required", "see \"vltctl show --help\""}};
+      {{"show"}, "COMPONENT is required", "see \"vltctl show --help\""},
+      {{"--root", "/", "list"}, "the command comes before --root", "see \"vltctl --help\""},
+      {{"--json", "list"}, "the command comes before --json", "see \"vltctl --help\""},
+      {{"list", "--root"}, "--root needs a value", "see \"vltctl list --help\""},
+      {{"list", "--root", ""}, "--root: is empty", "see \"vltctl list --help\""},
+      {{"check", ""}, "COMPONENT: is empty", "see \"vltctl check --help\""},
+      {{"lint", "a", ""}, "PATH: is empty", "see \"vltctl lint --help\""}};
   for (const WrongRow& row : rows) {
     Parsed parsed = Parse(row.words);
     EXPECT_EQ(parsed.kind, Parsed::Kind::Wrong) << row.what;
     EXPECT_EQ(parsed.whatIsWrong, row.what);
     EXPECT_EQ(parsed.next, row.next);
   }
+}
+
+TEST(Arguments, ASettingMayBeEmpty) {
+  Parsed parsed = Parse({"settings", "set", "EventNameAppend3", ""});
+  EXPECT_EQ(parsed.kind, Parsed::Kind::Run) << parsed.whatIsWrong;
+  EXPECT_EQ(parsed.arguments.text("VALUE"), "");
 }
 
 TEST(Arguments, HelpAndVersionAreAskedForAnywhere) {

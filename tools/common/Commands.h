@@ -28,7 +28,8 @@ enum ExitCode {
 };
 
 // A flag ("--json"), an option with a value ("--index", "N") or, without dashes, what has no name on the
-// command line ("GUID"). A positional of the name GUID is checked for its form.
+// command line ("GUID"). A positional of the name GUID is checked for its form. No value but that of
+// VALUE may be empty.
 struct Argument {
   const char* name;
   const char* value;  // what the help calls the value; null for flags and positionals

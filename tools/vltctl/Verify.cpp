@@ -61,6 +61,9 @@ std::vector<std::string> FilesOf(const Arguments& arguments) {
                         {"usage", "", "--all goes without files", "", "give --all, or the files"});
 }
 
+constexpr const char* kNoFiles =
+    "there is no database, jar or settings file yet; programs make them when they need them";
+
 std::string Sentence(const GuardedIniState& state) {
   std::string why = WhyOf(state);
   return WordsOf(state.kind).found + (why.empty() ? "" : ": " + why);
@@ -71,7 +74,9 @@ std::string Sentence(const GuardedIniState& state) {
 int Verify(const Arguments& arguments, Output& output) {
   if (arguments.has("--content")) return VerifyContent(arguments, output);
   int code = vltctl::kGood;
-  for (const std::string& file : FilesOf(arguments)) {
+  const std::vector<std::string> files = FilesOf(arguments);
+  if (files.empty()) output.line(kNoFiles);
+  for (const std::string& file : files) {
     GuardedIniState state = Inspect(file);
     const StateWords& words = WordsOf(state.kind);
     const OpeningWords& opening = WordsOf(state.opening);
@@ -288,7 +293,9 @@ int RepairOne(const std::string& file, bool dry, Output& output) {
 
 int Repair(const Arguments& arguments, Output& output) {
   int code = vltctl::kGood;
-  for (const std::string& file : FilesOf(arguments)) {
+  const std::vector<std::string> files = FilesOf(arguments);
+  if (files.empty()) output.line(kNoFiles);
+  for (const std::string& file : files) {
     code = std::max(code, RepairOne(file, arguments.has("--dry-run"), output));
   }
   return code;
