@@ -302,6 +302,11 @@ TEST(VltctlBadSituations, AnotherUsersInstallationThatMayNotBeWritten) {
     EXPECT_EQ(result.err, "vltctl: " + installation.root() +
                               ": the database cannot be made: Permission denied; run \"vltctl list "
                               "--live\" once as a user who may write there\n");
+    result = Vltctl({"settings", "set", "NumCheckpoints", "5"});
+    EXPECT_EQ(result.exitCode, kDataUnusable);
+    EXPECT_EQ(result.err,
+              "vltctl: a file of the installation, or its lock, cannot be opened; run the command "
+              "as a user who may write them\n");
   });
 }
 

@@ -38,6 +38,11 @@ int RunCommand(const Arguments& arguments, char** argv, std::span<const Handler>
                                                    : handler->run(arguments, output));
   } catch (const Failure& failure) {
     return Report(output, failure.code, failure.problem);
+  } catch (int) {
+    // The library's own report of a guarded file that cannot be opened.
+    return Report(output, kDataUnusable,
+                  {"cannot-open", "", "a file of the installation, or its lock, cannot be opened",
+                   "", "run the command as a user who may write them"});
   } catch (const std::bad_alloc&) {
     return Report(output, kDataUnusable, {"no-memory", "", "out of memory", "", ""});
   } catch (const std::exception& error) {
