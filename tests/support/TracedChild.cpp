@@ -180,7 +180,8 @@ class Tracer {
     m_call = SystemCall{};
     m_call.process = m_process;
     m_call.number = static_cast<long>(NumberOf(r));
-    std::ranges::copy(ArgumentsOf(r), m_call.args);
+    const Arguments arguments = ArgumentsOf(r);
+    std::copy(arguments.begin(), arguments.end(), m_call.args);
     m_inside = true;
     m_error = m_before ? m_before(m_call) : 0;
     if (m_error != 0 && m_call.number != SYS_close) {

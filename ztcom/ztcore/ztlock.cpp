@@ -37,8 +37,8 @@ bool CZTMutex::IsNesting() const {
 }
 
 // Sequentially consistent: a thread that takes the last reference away must see what the others
-// wrote.
-int ZTInterlockedInc(int* counter) { return std::atomic_ref<int>(*counter).fetch_add(1) + 1; }
-int ZTInterlockedDec(int* counter) { return std::atomic_ref<int>(*counter).fetch_sub(1) - 1; }
-int ZTInterlockedGet(int* counter) { return std::atomic_ref<int>(*counter).load(); }
+// wrote. Built-in functions, as libc++ has std::atomic_ref since its version 19 only.
+int ZTInterlockedInc(int* counter) { return __atomic_add_fetch(counter, 1, __ATOMIC_SEQ_CST); }
+int ZTInterlockedDec(int* counter) { return __atomic_sub_fetch(counter, 1, __ATOMIC_SEQ_CST); }
+int ZTInterlockedGet(int* counter) { return __atomic_load_n(counter, __ATOMIC_SEQ_CST); }
 pthread_t ZTGetThreadId() { return pthread_self(); }

@@ -11,6 +11,7 @@
 #include <atomic>
 #include <chrono>
 #include <cstdlib>
+#include <iterator>
 #include <memory>
 #include <string>
 #include <thread>
@@ -60,7 +61,8 @@ constexpr long kWaitCalls[] = {
 };
 
 bool Waiting(pid_t pid) {
-  return std::ranges::any_of(kWaitCalls, [pid](long number) { return BlockedIn(pid, number); });
+  return std::any_of(std::begin(kWaitCalls), std::end(kWaitCalls),
+                     [pid](long number) { return BlockedIn(pid, number); });
 }
 
 // A process that waits for the event without limit and ends with 0 when it was released.

@@ -247,7 +247,8 @@ TEST(ztSyncSemaphore, ReleaseWakesAsManyAsThereAreUnits) {
   }
   EXPECT_EQ(semaphore.Release(3), 0);
   auto running = [&] {
-    return std::ranges::count_if(waiters, [](auto& waiter) { return !waiter->done(); });
+    return std::count_if(waiters.begin(), waiters.end(),
+                         [](auto& waiter) { return !waiter->done(); });
   };
   EXPECT_TRUE(Eventually([&] { return running() == 1; }));
   EXPECT_EQ(got, 3);

@@ -69,11 +69,13 @@ StateFileBytes EncodeEmptySet() {
   // All slots in one chain, each naming the next: taking one, and giving it back, changes its
   // record and the head only.
   header.count = header.freeCount = kSlotsPerSet;
-  auto end = std::ranges::copy(header.encode(), bytes.begin()).out;
+  const SetHeader::Bytes head = header.encode();
+  auto end = std::copy(head.begin(), head.end(), bytes.begin());
   for (uint32_t slot = 0; slot < kSlotsPerSet; ++slot) {
     SlotRecord record;
     record.keyOrNext = slot + 1 < kSlotsPerSet ? static_cast<int32_t>(slot + 1) : -1;
-    end = std::ranges::copy(record.encode(), end).out;
+    const SlotRecord::Bytes encoded = record.encode();
+    end = std::copy(encoded.begin(), encoded.end(), end);
   }
   return bytes;
 }

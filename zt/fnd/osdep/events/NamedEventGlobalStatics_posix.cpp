@@ -81,7 +81,8 @@ void NamedEventGlobalStatics::removeNamedEvent(const EventData& event) {
 
 bool NamedEventGlobalStatics::hasSemaphoreSetOfId(int id) const {
   Hold hold(section);
-  return std::ranges::any_of(m_sets, [id](const auto& entry) { return entry.second->id() == id; });
+  return std::any_of(m_sets.begin(), m_sets.end(),
+                     [id](const auto& entry) { return entry.second->id() == id; });
 }
 
 void NamedEventGlobalStatics::Release(EventData& event) {
