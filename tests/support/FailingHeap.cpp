@@ -71,6 +71,7 @@ extern "C" {
 void* __libc_malloc(size_t);
 void* __libc_calloc(size_t, size_t);
 void* __libc_realloc(void*, size_t);
+void* __libc_memalign(size_t, size_t);
 void __libc_free(void*);
 
 __attribute__((visibility("default"))) void* malloc(size_t sizeBytes) {
@@ -86,6 +87,15 @@ __attribute__((visibility("default"))) void* realloc(void* old, size_t sizeBytes
   if (Refuse()) return nullptr;
   void* block = __libc_realloc(old, sizeBytes);
   return old ? block : Counted(block);
+}
+// Where libc++abi gets the memory of exceptions. Never refused: the reserve of its version 14 is not
+// aligned, and a throw that uses it crashes.
+__attribute__((visibility("default"))) int posix_memalign(void** block, size_t alignment,
+                                                          size_t sizeBytes) {
+  void* found = vlt::test::heap::Counted(__libc_memalign(alignment, sizeBytes));
+  if (!found) return ENOMEM;
+  *block = found;
+  return 0;
 }
 __attribute__((visibility("default"))) void free(void* block) {
   if (block) --vlt::test::heap::g_live;
