@@ -128,7 +128,8 @@ void ExpectEmpty(const fs::path& directory) {
 }  // namespace
 
 int New(const Arguments& arguments, Output& output) {
-  const Kind& kind = KindOf(arguments.text("KIND"));
+  const std::string kindName = arguments.text("KIND");
+  const Kind& kind = KindOf(kindName);
   const std::string name = arguments.text("--name"), guid = FreshGuid();
   if (!arguments.has("--name")) {
     throw Failure(vltctl::kUsage, {"usage", "", "new needs a name", "", "give it as --name NAME"});
