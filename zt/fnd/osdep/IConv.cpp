@@ -1,12 +1,13 @@
 // iconv stops at the first text that it cannot convert; the callers want all of the rest. The loop
 // therefore replaces one unit and goes on from the next, until input or space runs out. errno is
 // not consulted: bad text, text cut at the end and a character that the target lacks all become
-// "?".
+// "?". POSIX lets iconv write a character of its choice for one that the target lacks, and musl
+// writes "*"; it then gets one character at a time, and what it chose is taken back.
 #include "zt/fnd/osdep/IConv.h"
 
 #include <iconv.h>
+#include <string.h>
 
-#include <algorithm>
 #include <cstddef>
 
 #include "zt/fnd/Exception.h"
@@ -27,6 +28,14 @@ iconv_t Open(const char* toCode, const char* fromCode) {
   return iconv_open(toCode, fromCode);
 }
 
+// What is left to do: input, and space.
+struct Rest {
+  char* in;
+  size_t inLeft;
+  char* out;
+  size_t outLeft;
+};
+
 class ScopedIconv {
  public:
   ScopedIconv(const char* toCode, const char* fromCode) : m_cd(Open(toCode, fromCode)) {
@@ -40,11 +49,36 @@ class ScopedIconv {
   ScopedIconv& operator=(const ScopedIconv&) = delete;
 
   // False where iconv stopped before the end of the input.
-  bool convert(char*& in, size_t& inLeft, char*& out, size_t& outLeft) const {
-    return iconv(m_cd, &in, &inLeft, &out, &outLeft) != static_cast<size_t>(-1);
+  bool convert(Rest& rest) const { return call(rest) != kStopped; }
+
+  // The same for the next `size` bytes, a character; also false, and nothing is converted, where
+  // iconv chose another character for it.
+  bool convertOne(Rest& rest, size_t size) const {
+    Rest one = {rest.in, size, rest.out, rest.outLeft};
+    if (call(one) != 0) return false;
+    rest = {one.in, rest.inLeft - size, one.out, one.outLeft};
+    return true;
+  }
+
+  // For a descriptor from the wide side, not used yet: true if iconv writes another character where
+  // the target lacks one. Asked with a character of private use.
+  bool substitutes() const {
+    char32_t lacking = 0x10FFFD;
+    char out[16];
+    Rest rest = {reinterpret_cast<char*>(&lacking), sizeof lacking, out, sizeof out};
+    const size_t substituted = call(rest);
+    iconv(m_cd, nullptr, nullptr, nullptr, nullptr);
+    return substituted != 0 && substituted != kStopped;
   }
 
  private:
+  static constexpr size_t kStopped = static_cast<size_t>(-1);
+
+  // The number of characters that iconv chose others for.
+  size_t call(Rest& rest) const {
+    return iconv(m_cd, &rest.in, &rest.inLeft, &rest.out, &rest.outLeft);
+  }
+
   iconv_t m_cd;
 };
 
@@ -52,22 +86,24 @@ template <class In, class Out>
 void Convert(const In* begin, const In* end, const char* fromCode, Out* dest, Out*& destEnd,
              const char* toCode) {
   const ScopedIconv converter(toCode, fromCode);
+  // The wide side lacks no character, and who asks for substitutes ("//TRANSLIT") gets them.
+  const bool oneByOne =
+      sizeof(In) == sizeof(wchar_t) && !strstr(toCode, "//") && converter.substitutes();
   // iconv takes a pointer to non-const for history's sake; it does not write there.
-  char* in = const_cast<char*>(reinterpret_cast<const char*>(begin));
-  size_t inLeft = static_cast<size_t>(end - begin) * sizeof(In);
-  char* out = reinterpret_cast<char*>(dest);
-  size_t outLeft = static_cast<size_t>(destEnd - dest) * sizeof(Out);
-  while (inLeft != 0 && outLeft >= sizeof(Out)) {
-    if (converter.convert(in, inLeft, out, outLeft)) continue;
+  Rest rest = {const_cast<char*>(reinterpret_cast<const char*>(begin)),
+               static_cast<size_t>(end - begin) * sizeof(In), reinterpret_cast<char*>(dest),
+               static_cast<size_t>(destEnd - dest) * sizeof(Out)};
+  while (rest.inLeft != 0 && rest.outLeft >= sizeof(Out)) {
+    if (oneByOne ? converter.convertOne(rest, sizeof(In)) : converter.convert(rest)) continue;
     // A full buffer stops iconv too, and is no bad text.
-    if (inLeft == 0 || outLeft < sizeof(Out)) break;
-    *reinterpret_cast<Out*>(out) = static_cast<Out>('?');
-    out += sizeof(Out);
-    outLeft -= sizeof(Out);
-    in += std::min(inLeft, sizeof(In));
-    inLeft -= std::min(inLeft, sizeof(In));
+    if (rest.inLeft == 0 || rest.outLeft < sizeof(Out)) break;
+    *reinterpret_cast<Out*>(rest.out) = static_cast<Out>('?');
+    rest.out += sizeof(Out);
+    rest.outLeft -= sizeof(Out);
+    rest.in += sizeof(In);
+    rest.inLeft -= sizeof(In);
   }
-  destEnd = reinterpret_cast<Out*>(out);
+  destEnd = reinterpret_cast<Out*>(rest.out);
 }
 
 }  // namespace

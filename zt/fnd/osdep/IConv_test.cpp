@@ -1,7 +1,11 @@
 #include "zt/fnd/osdep/IConv.h"
 
+#include <dlfcn.h>
 #include <gtest/gtest.h>
+#include <iconv.h>
+#include <string.h>
 
+#include <cerrno>
 #include <string>
 #include <vector>
 
@@ -10,6 +14,52 @@
 
 using namespace zt::fnd;
 using namespace zt::fnd::osdep;
+
+namespace {
+
+// While an object lives, iconv writes "*" for a character that the target lacks, and counts it, as
+// POSIX allows and musl does.
+class IConvThatSubstitutes {
+ public:
+  IConvThatSubstitutes() { s_substitutes = true; }
+  ~IConvThatSubstitutes() { s_substitutes = false; }
+  IConvThatSubstitutes(const IConvThatSubstitutes&) = delete;
+  IConvThatSubstitutes& operator=(const IConvThatSubstitutes&) = delete;
+
+  inline static thread_local bool s_substitutes = false;
+};
+
+using IConvFunction = size_t (*)(iconv_t, char**, size_t*, char**, size_t*);
+
+// From the wide side only. What is no character at all stops this iconv too.
+size_t Substituting(IConvFunction real, iconv_t cd, char** in, size_t* inLeft, char** out,
+                    size_t* outLeft) {
+  size_t substituted = 0;
+  for (;;) {
+    const size_t result = real(cd, in, inLeft, out, outLeft);
+    if (result != static_cast<size_t>(-1) || errno != EILSEQ || *outLeft == 0) {
+      return result == 0 ? substituted : result;
+    }
+    char32_t lacking;
+    memcpy(&lacking, *in, sizeof lacking);
+    if (lacking > 0x10FFFF || (lacking >= 0xD800 && lacking < 0xE000)) return result;
+    *(*out)++ = '*';
+    --*outLeft;
+    *in += sizeof lacking;
+    *inLeft -= sizeof lacking;
+    ++substituted;
+  }
+}
+
+}  // namespace
+
+// Comes before the C library's in this program.
+extern "C" size_t iconv(iconv_t cd, char** in, size_t* inLeft, char** out, size_t* outLeft) {
+  static const IConvFunction real = reinterpret_cast<IConvFunction>(dlsym(RTLD_NEXT, "iconv"));
+  return IConvThatSubstitutes::s_substitutes && in
+             ? Substituting(real, cd, in, inLeft, out, outLeft)
+             : real(cd, in, inLeft, out, outLeft);
+}
 
 namespace {
 
@@ -49,6 +99,26 @@ TEST(IConv, EachBadUnitBecomesOneQuestionMark) {
                             L"b",
                             "ISO-8859-1"));
   EXPECT_EQ("??", ToNarrow(L"\xD800\x110000", "UTF-8"));
+}
+
+TEST(IConv, TheQuestionMarkIsOursWhereIConvWritesAnother) {
+  IConvThatSubstitutes substitutes;
+  EXPECT_EQ("a?b?", ToNarrow(L"a\x20AC"
+                             L"b\x20AC",
+                             "ISO-8859-1"));
+  EXPECT_EQ("a??b\xE9", ToNarrow(L"a\x20AC\xD800"
+                                 L"b\xE9",
+                                 "ISO-8859-1"));
+  EXPECT_EQ("a?", ToNarrow(L"a\x20AC"
+                           L"b",
+                           "ISO-8859-1", 2));
+  EXPECT_EQ("a\xE2\x82\xAC?", ToNarrow(L"a\x20AC\xD800", "UTF-8"));
+}
+
+TEST(IConv, TransliterationIsNoSubstitution) {
+  EXPECT_EQ("aEURb", ToNarrow(L"a\x20AC"
+                              L"b",
+                              "US-ASCII//TRANSLIT"));
 }
 
 TEST(IConv, ShortageOfRoomTruncates) {

@@ -39,15 +39,19 @@ enum class ByHand {
   Utf8,
 };
 
+// What C libraries call the encoding of the "C" locale: glibc, BSD and macOS, musl.
+bool IsAsciiCodeset(const char* codeset) {
+  return Same(codeset, "ANSI_X3.4-1968") || Same(codeset, "US-ASCII") || Same(codeset, "ASCII");
+}
+
 // The host may change its locale at any time, so the answer for "" is never kept.
 ByHand ByHandOf(const char* encoding) {
   if (Same(encoding, "US-ASCII")) return ByHand::Ascii;
   if (Same(encoding, "UTF-8")) return ByHand::Utf8;
   if (*encoding != '\0') return ByHand::Nothing;
-  // "ANSI_X3.4-1968" is what the C library calls ASCII, the encoding of the "C" locale.
   const char* const codeset = nl_langinfo(CODESET);
   if (Same(codeset, "UTF-8")) return ByHand::Utf8;
-  return Same(codeset, "ANSI_X3.4-1968") ? ByHand::LocaleAscii : ByHand::Nothing;
+  return IsAsciiCodeset(codeset) ? ByHand::LocaleAscii : ByHand::Nothing;
 }
 
 bool IsAscii(char c) { return static_cast<unsigned char>(c) < 0x80; }
