@@ -120,13 +120,20 @@ TEST(Exports, EveryFunctionIsFoundByName) {
   dlclose(library);
 }
 
+#if defined(_LIBCPP_VERSION)
+constexpr const char* kCppRuntime[] = {"libc++.so.1", "libc++abi.so.1", "libunwind.so.1"};
+#else
+constexpr const char* kCppRuntime[] = {"libstdc++.so.6"};
+#endif
+
 TEST(Exports, TheLibraryNeedsTheCppRuntimeAndTheSystemOnly) {
   ProgramResult result = RunProgram({"objdump", "-p", VLT_TEST_LIBRARY});
   ASSERT_EQ(result.exitCode, 0) << result.err;
   std::istringstream in(result.out);
-  const std::set<std::string> allowed = {
-      "libstdc++.so.6", "libgcc_s.so.1",        "libm.so.6",    "libc.so.6", "libpthread.so.0",
-      "libdl.so.2",     "ld-linux-x86-64.so.2", "ld-linux.so.2"};
+  std::set<std::string> allowed = {"libgcc_s.so.1",   "libm.so.6",  "libc.so.6",
+                                   "libpthread.so.0", "libdl.so.2", "ld-linux-x86-64.so.2",
+                                   "ld-linux.so.2"};
+  allowed.insert(std::begin(kCppRuntime), std::end(kCppRuntime));
   int needed = 0;
   for (std::string key, value; in >> key;) {
     if (key == "SONAME") {
