@@ -175,7 +175,7 @@ TEST(VltctlLintNew, EachKindBuildsLintsCleanIsListedAndIsSound) {
               source + "/CMakeLists.txt\n" + source + "/Widget.cpp\n" + source + "/Info.vlr\n");
     std::string flags = sizeof(void*) == 4 ? "-DCMAKE_CXX_FLAGS=-m32" : "-DCMAKE_CXX_FLAGS=-m64";
     for (const std::vector<std::string>& step :
-         {std::vector<std::string>{"cmake", "-S", source, "-B", build, flags},
+         {std::vector<std::string>{"cmake", "-G", "Ninja", "-S", source, "-B", build, flags},
           {"cmake", "--build", build},
           {"cmake", "--install", build, "--prefix", installation.root()}}) {
       ProgramResult result = RunProgram(step);
