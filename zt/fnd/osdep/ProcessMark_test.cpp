@@ -4,7 +4,6 @@
 #include <sched.h>
 #include <signal.h>
 #include <sys/prctl.h>
-#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -42,11 +41,11 @@ TEST(ProcessMark, IsCurrentInItsProcessOnly) {
 
 TEST(ProcessMark, IsNotCurrentInAChildMadeWithoutTheHandlersOfFork) {
   ProcessMark mark = ProcessMark::Current();
-  long pid = syscall(SYS_clone, SIGCHLD, nullptr, nullptr, nullptr, nullptr);
+  pid_t pid = _Fork();
   if (pid == 0) _exit(mark.isCurrent() ? 1 : 0);
   ASSERT_GT(pid, 0);
   int status = -1;
-  ASSERT_EQ(pid, waitpid(static_cast<pid_t>(pid), &status, 0));
+  ASSERT_EQ(pid, waitpid(pid, &status, 0));
   EXPECT_EQ(status, 0);
 }
 
