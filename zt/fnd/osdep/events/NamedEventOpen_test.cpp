@@ -24,6 +24,7 @@
 #include "tests/support/PosixErrorOf.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/ThreadState.h"
+#include "zt/fnd/ByteOrder.h"
 #include "zt/fnd/String.h"
 #include "zt/fnd/osdep/NamedEvent.h"
 #include "zt/fnd/osdep/events/EventStateFile.h"
@@ -81,9 +82,9 @@ TEST(NamedEventOpen, FirstEventTakesSlotZeroOfSetOne) {
   ASSERT_EQ(state.size(), 1298u);
   EXPECT_EQ(state.substr(0, 18),
             std::string("\x31\x5E\xE3\x15\0\1\x80\0\0\0\x7F\0\0\0\1\0\0\0", 18));
-  int64_t key = ftok(place.file("name").c_str(), 1);
-  std::string record = std::string("\1\1") + std::string(reinterpret_cast<char*>(&key), 8);
-  EXPECT_EQ(record, state.substr(18, 10));
+  unsigned char record[10] = {1, 1};
+  little_endian::Put(&record[2], int64_t{ftok(place.file("name").c_str(), 1)});
+  EXPECT_EQ(std::string(std::begin(record), std::end(record)), state.substr(18, 10));
   EXPECT_EQ(state.substr(28, 10), std::string("\0\0\2\0\0\0\0\0\0\0", 10));
   EXPECT_EQ(state.substr(1288), std::string("\0\0\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF", 10));
 }
