@@ -23,6 +23,7 @@ endif()
 # Tests that take more than two seconds, by themselves or with their like. They get the label
 # "slow", and ./dev alone leaves them out.
 set(slow_tests "Check.AHang*" "Check.AnExit*" "CheckBundles.Thousands*" "Failures/Oom.EveryCall*" "FailingCall.*"
+  "Faults.AtEachPoint*"
   "FindFiles.ManyEntries*" "ForkStorm.*" "ForkThreads.*" "Hostile.A*Million*"
   "Help.ZshCompletes*" "Hostile.AHundredThousand*" "IniFileLockLocale.*" "Locales.*" "NamedEventHostile.LockFileShared*"
   "NamedEventHostile.SetsLocked*" "NamedEventLimits.StateFilesThatCannot*"
