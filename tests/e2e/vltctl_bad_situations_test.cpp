@@ -302,11 +302,16 @@ TEST(VltctlBadSituations, AnotherUsersInstallationThatMayNotBeWritten) {
     EXPECT_EQ(result.err, "vltctl: " + installation.root() +
                               ": the database cannot be made: Permission denied; run \"vltctl list "
                               "--live\" once as a user who may write there\n");
-    result = Vltctl({"settings", "set", "NumCheckpoints", "5"});
-    EXPECT_EQ(result.exitCode, kDataUnusable);
-    EXPECT_EQ(result.err,
-              "vltctl: a file of the installation, or its lock, cannot be opened; run the command "
-              "as a user who may write them\n");
+    for (const auto& [command, file] :
+         {std::pair{std::vector<std::string>{"settings", "set", "NumCheckpoints", "5"},
+                    installation.root() + "/Data/kor.ini"},
+          {{"hook", "arm", "1", "fail"}, installation.root() + "/VLTHooks.ini"}}) {
+      result = Vltctl(command);
+      EXPECT_EQ(result.exitCode, kCannotWrite);
+      EXPECT_EQ(result.err, "vltctl: " + file +
+                                ": cannot be written: Permission denied; check the rights to its "
+                                "directory and the space on the disk\n");
+    }
   });
 }
 

@@ -119,6 +119,19 @@ std::vector<std::string> GuardedFiles() {
   return files;
 }
 
+vltctl::Failure CannotWrite(const std::string& file, int error) {
+  return {vltctl::kCannotWrite,
+          {"cannot-write", file, "cannot be written", error ? strerror(error) : "",
+           "check the rights to its directory and the space on the disk"}};
+}
+
+void ThrowCannotOpen(const std::string& file) {
+  // Its directory is made with it: what decides is the nearest thing that is there.
+  fs::path what = file;
+  while (access(what.c_str(), F_OK) != 0 && what.has_relative_path()) what = what.parent_path();
+  throw CannotWrite(file, access(what.c_str(), W_OK) == 0 ? 0 : errno);
+}
+
 FileHold::FileHold(const std::string& file) : m_mutex(IniFileLock::NameForFile(file.c_str())) {
   if (m_mutex.tryLock()) return;
   std::string holder = vltctl::HeldBy(vltctl::LockTable().holders(LockFileOf(file)));

@@ -4,6 +4,7 @@
 #include <vector>
 
 #include "source/GuardedIniFile.h"
+#include "tools/common/Output.h"
 #include "zt/fnd/osdep/Mutex.h"
 
 // The guarded files of an installation: their states in words, and their locks.
@@ -40,6 +41,23 @@ void ExpectUsableDatabase();
 
 // The lock of a guarded file.
 std::string LockFileOf(const std::string& guardedFile);
+
+// A file of the installation that the command was to write; errno, or 0 where it is not known why.
+vltctl::Failure CannotWrite(const std::string& file, int error);
+
+// Says which file cannot be opened, and why: see OpenForWriting.
+[[noreturn]] void ThrowCannotOpen(const std::string& file);
+
+// What `open` returns. The library throws an int for a guarded file that it cannot open, or whose lock it
+// cannot have; then a failure that names the file is thrown.
+template <class Open>
+auto OpenForWriting(const std::string& file, Open open) {
+  try {
+    return open();
+  } catch (int) {
+    ThrowCannotOpen(file);
+  }
+}
 
 // Holds that lock. Throws a Failure of kBusy, which names the holder, instead of waiting.
 class FileHold {

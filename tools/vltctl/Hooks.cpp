@@ -9,6 +9,7 @@
 
 #include "source/Common/vltHookPoints.h"
 #include "source/vlIniMgr.h"
+#include "tools/vltctl/GuardedFiles.h"
 #include "tools/vltctl/Reading.h"
 #include "vlloader/source/InstallLayout.h"
 
@@ -94,9 +95,7 @@ std::string PointOf(const std::string& word) {
 int Save(CvlIniMgr& ini, const std::string& file) {
   errno = 0;
   if (ini.Write() >= 0) return vltctl::kGood;
-  throw vltctl::Failure(vltctl::kCannotWrite,
-                        {"cannot-write", file, "cannot be written", errno ? strerror(errno) : "",
-                         "check the rights to its directory and the space on the disk"});
+  throw CannotWrite(file, errno);
 }
 
 }  // namespace
@@ -120,7 +119,7 @@ int HookArm(const Arguments& arguments, Output& output) {
     for (const Item& item : ItemsOf(flag)) items.push_back(item);
   }
   ExpectUsable(file);
-  CvlIniMgr ini = CvlIniMgr::OpenRaw(file);
+  CvlIniMgr ini = OpenForWriting(file, [&] { return CvlIniMgr::OpenRaw(file); });
   ini.EraseSection("Hook");
   for (const auto& [key, value] : items) ini.SetItem("Hook", key.c_str(), value.c_str(), false);
   int code = Save(ini, file);
@@ -137,7 +136,7 @@ int HookClear(const Arguments&, Output& output) {
     return vltctl::kGood;
   }
   ExpectUsable(file);
-  CvlIniMgr ini = CvlIniMgr::OpenRaw(file);
+  CvlIniMgr ini = OpenForWriting(file, [&] { return CvlIniMgr::OpenRaw(file); });
   ini.EraseSection("Hook");
   int code = Save(ini, file);
   output.line(file + ": disarmed; flags that a process has read stay set until it ends");

@@ -302,12 +302,6 @@ bool HasComments(const std::vector<IniLine>& lines) {
                      [](const IniLine& line) { return line.kind == IniLine::Kind::Comment; });
 }
 
-Failure CannotSave(const std::string& file, int error) {
-  return {vltctl::kCannotWrite,
-          {"cannot-write", file, "cannot be written", error ? strerror(error) : "",
-           "check the rights to its directory and the space on the disk"}};
-}
-
 }  // namespace
 
 int SettingsSet(const Arguments& arguments, Output& output) {
@@ -330,10 +324,12 @@ int SettingsSet(const Arguments& arguments, Output& output) {
   String wide(path.c_str());
   std::unique_ptr<CvlIniMgr> ini;
   errno = 0;
-  if (VltjarOpen(wide.c_str(), &ini) < 0 || !ini) throw CannotSave(path, errno);
+  if (OpenForWriting(path, [&] { return VltjarOpen(wide.c_str(), &ini); }) < 0 || !ini) {
+    throw CannotWrite(path, errno);
+  }
   bool isSaved = ini->SetItem(settings::kSection, key.c_str(), value.c_str(), false) >= 0 &&
                  VltjarSaveChanges(wide.c_str(), ini.get()) >= 0;
-  if (!isSaved) throw CannotSave(path, errno);
+  if (!isSaved) throw CannotWrite(path, errno);
   ini.reset();
   if (HasComments(before.lines)) {
     output.note(path + ": its comments and empty lines are gone, as with each save of the library");

@@ -100,12 +100,6 @@ int Verify(const Arguments& arguments, Output& output) {
 
 namespace {
 
-vltctl::Failure CannotWrite(const std::string& file, int error) {
-  return {vltctl::kCannotWrite,
-          {"cannot-write", file, "cannot be written", error ? strerror(error) : "",
-           "check the rights to its directory and the space on the disk"}};
-}
-
 // What a repair does about a state.
 enum class Remedy { None, Seal, Convert, TakeUp, Impossible };
 
