@@ -59,6 +59,9 @@ TEST(FileNumbers, AreThereInASandboxThatRefusesTheNewerCall) {
     Child child([&] {
       ScopedFd file(open((dir / "file").c_str(), O_RDONLY | O_CLOEXEC));
       if (!vlt::test::FailSystemCall(SYS_statx, error)) return 1;
+      struct stat info;
+      // With 64-bit times on 32 bits, the C library's fstat() is that call itself.
+      if (sizeof(void*) == 4 && fstat(file.get(), &info) != 0) return 0;
       return AreThoseOfFstat(file.get()) ? 0 : 2;
     });
     EXPECT_EQ(child.wait(), 0) << error;
