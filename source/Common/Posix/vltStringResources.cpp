@@ -121,9 +121,12 @@ class vltStringResources::Database {
     if (m_bytes && !HasPlainLines(*m_bytes)) m_bytes.reset();
   }
   void answer(ResourceTexts::Query& query) {
-    // One who wants reports gets those of the whole walk.
-    if (m_bytes && !s_warnings.wantsAll() && !mayHave(query.key)) return;
-    if (!m_texts) m_texts.emplace(read(), &s_warnings);
+    if (!m_texts) {
+      // One who wants reports gets those of the whole walk.
+      if (m_bytes && !s_warnings.wantsAll() && !mayHave(query.key)) return;
+      m_texts.emplace(read(), &s_warnings);
+      m_bytes.reset();
+    }
     m_texts->answer(query);
   }
 
@@ -145,7 +148,7 @@ class vltStringResources::Database {
   }
 
   std::string m_file;
-  std::optional<std::string> m_bytes;  // none: the parser reads the file, in its own way
+  std::optional<std::string> m_bytes;  // until it is parsed; none: the parser reads the file itself
   std::map<std::string, bool> m_keys;  // whether the bytes hold it
   std::optional<ResourceTexts> m_texts;
 };
