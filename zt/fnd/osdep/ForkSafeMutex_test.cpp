@@ -156,16 +156,23 @@ TEST(ForkSafeMutex, ChildNeverSeesAHalfChangeOfAWaitedOne) {
       second = first;
     }
   });
-  for (int i = 0; i < 100; ++i) {
+  constexpr int kChildren = 100;
+  int interrupted = 0;
+  for (int i = 0; i < kChildren; ++i) {
     Child child([&] {
       ForkSafeHold hold(mutex);
       if (mutex.takeInterrupted()) return 1;
       return first == second ? 0 : 2;
     });
-    EXPECT_EQ(0, child.wait()) << i;
+    const int result = child.wait();
+    EXPECT_TRUE(result == 0 || result == 1) << i << ": " << result;
+    interrupted += result == 1;
   }
   stop = true;
   changer.join();
+  // A fork waits a second. On a busy machine the thread may be kept from going on for longer, which the
+  // child sees as an interrupted change; that is the exception.
+  EXPECT_LT(interrupted, kChildren / 4);
 }
 
 // Nobody waits a second where the threads take two in the other order than that of the ranks.
