@@ -156,23 +156,22 @@ TEST(ForkSafeMutex, ChildNeverSeesAHalfChangeOfAWaitedOne) {
       second = first;
     }
   });
-  constexpr int kChildren = 100;
-  int interrupted = 0;
-  for (int i = 0; i < kChildren; ++i) {
+  for (int i = 0; i < 100; ++i) {
+    const auto before = std::chrono::steady_clock::now();
     Child child([&] {
       ForkSafeHold hold(mutex);
       if (mutex.takeInterrupted()) return 1;
       return first == second ? 0 : 2;
     });
+    const auto taken = std::chrono::steady_clock::now() - before;
     const int result = child.wait();
-    EXPECT_TRUE(result == 0 || result == 1) << i << ": " << result;
-    interrupted += result == 1;
+    // On a busy machine the thread may be kept from going on for longer than the second that a fork
+    // waits. Only then may the child find the change interrupted.
+    const bool isAfterItsSecond = result == 1 && taken >= std::chrono::milliseconds(900);
+    EXPECT_TRUE(result == 0 || isAfterItsSecond) << i << ": " << result;
   }
   stop = true;
   changer.join();
-  // A fork waits a second. On a busy machine the thread may be kept from going on for longer, which the
-  // child sees as an interrupted change; that is the exception.
-  EXPECT_LT(interrupted, kChildren / 4);
 }
 
 // Nobody waits a second where the threads take two in the other order than that of the ranks.
