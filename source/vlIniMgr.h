@@ -130,8 +130,9 @@ class CvlIniMgr : public IniDocument {
   bool m_lockOnly;
   bool m_saveOnDestroy;
   IniDurability m_durability = IniDurability::Synced;
-  FileState m_known;     // of the file as it was last read or written
-  Digested m_validated;  // what was found good when the file was opened, until the first write
+  FileState m_known;  // of the file as it was last read or written
+  Digested
+      m_validated;  // what was found good when the file was opened, until a write needs a digest
   bool m_lockWasLost = false;  // and the file has not been compared with m_known since
   std::unique_ptr<IniFileLock> m_lock;
 };

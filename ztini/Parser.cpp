@@ -40,8 +40,7 @@ class ItemKeys {
   static Key Of(const NameFold& fold, const char* begin, const char* end) {
     const size_t length = static_cast<size_t>(end - begin);
     if (length >= sizeof(Key) && fold.foldsAsciiOnly()) {
-      // The last eight characters at once; the length takes the place of a bit of each that case
-      // changes or that letters share.
+      // The last eight characters at once, without the bit of each that case changes.
       Key key;
       memcpy(&key, end - sizeof key, sizeof key);
       return (key & kWithoutCase) ^ (length * kOddFactor);

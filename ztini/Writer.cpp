@@ -234,8 +234,8 @@ int32_t DocumentWriter<Lines>::endWithValue(ztini::TextBuffer& line, std::string
   return m_lines.end();
 }
 
-// Of the block for a rendering after one of `sizeBytes`: a little more than that, and the same for many
-// renderings, each a little longer. An allocator gives a block of a size that was just freed from
+// Size of the block for a rendering after one of `sizeBytes`: a little more, and the same for many
+// renderings of which each is a little longer. An allocator gives a block of a size that was just freed from
 // what it has; a new size of its own comes from the system, page by page.
 size_t BlockFor(size_t sizeBytes) {
   const size_t least = sizeBytes + sizeBytes / 64;

@@ -39,8 +39,8 @@ class Faults : public testing::Test {
     MakeInstallation(m_installation);
   }
 
-  // In a process of its own, in an empty directory; then a fresh process finds everything. `body` writes
-  // the name of the call that it is about to make.
+  // In a process of its own, in an empty directory; then a fresh process finds everything. `body`
+  // writes the name of the call that it is about to make, as long as it can write.
   void run(const std::string& what, const std::function<int()>& body) {
     SCOPED_TRACE(what);
     TempDir workingDirectory;
