@@ -11,14 +11,13 @@
 #include <iterator>
 #include <memory>
 
+#include "zt/fnd/AsciiRun.h"
 #include "zt/fnd/Exception.h"
-
-#ifdef __SSE2__
-#include <emmintrin.h>
-#endif
 
 namespace zt::fnd {
 namespace {
+
+constexpr ptrdiff_t kRun = ascii_run::kLength;
 
 // Sequences by lead byte; a row holds from its lead up to the next row's.
 struct LeadRule {
@@ -111,48 +110,14 @@ inline Decoded DecodeOne(const unsigned char* s, const unsigned char* end) {
   return end - s >= 4 ? DecodeInside(s, end) : DecodeSequence(s, end);
 }
 
-// Most text is ASCII, and most of that in long runs: bytes at a time of which none has its top bit
-// set. The processor's own operations, as compilers make a move a byte of the plain form.
-constexpr ptrdiff_t kRun = 16;
-
-#ifdef __SSE2__
-static_assert(sizeof(wchar_t) == 4 && kRun == sizeof(__m128i));
-
-inline __m128i LoadRun(const unsigned char* s) {
-  return _mm_loadu_si128(reinterpret_cast<const __m128i*>(s));
-}
-
-inline bool IsAsciiRun(const unsigned char* s) { return _mm_movemask_epi8(LoadRun(s)) == 0; }
-
-inline void WidenAsciiRun(const unsigned char* s, wchar_t* out) {
-  const __m128i zero = _mm_setzero_si128(), bytes = LoadRun(s);
-  const __m128i low = _mm_unpacklo_epi8(bytes, zero), high = _mm_unpackhi_epi8(bytes, zero);
-  auto* to = reinterpret_cast<__m128i*>(out);
-  _mm_storeu_si128(to, _mm_unpacklo_epi16(low, zero));
-  _mm_storeu_si128(to + 1, _mm_unpackhi_epi16(low, zero));
-  _mm_storeu_si128(to + 2, _mm_unpacklo_epi16(high, zero));
-  _mm_storeu_si128(to + 3, _mm_unpackhi_epi16(high, zero));
-}
-#else
-inline bool IsAsciiRun(const unsigned char* s) {
-  unsigned bits = 0;
-  for (ptrdiff_t i = 0; i < kRun; ++i) bits |= s[i];
-  return bits < 0x80;
-}
-
-inline void WidenAsciiRun(const unsigned char* s, wchar_t* out) {
-  for (ptrdiff_t i = 0; i < kRun; ++i) out[i] = s[i];
-}
-#endif
-
 // Writes the runs that the text begins with, of which the first is known to be one; returns their
 // characters, which are no more than `most`.
 inline ptrdiff_t WidenAsciiRuns(const unsigned char* s, ptrdiff_t most, wchar_t* out) {
   ptrdiff_t done = 0;
   do {
-    WidenAsciiRun(s + done, out + done);
+    ascii_run::Copy(s + done, out + done);
     done += kRun;
-  } while (most - done >= kRun && IsAsciiRun(s + done));
+  } while (most - done >= kRun && ascii_run::IsAscii(s + done));
   return done;
 }
 
@@ -181,7 +146,7 @@ uint32_t GetUtf8StringLength(const unsigned char* begin, const unsigned char* en
   if (IsEmpty(begin, end)) return 0;
   uint64_t count = 0;
   while (begin != end) {
-    if (end - begin >= kRun && IsAsciiRun(begin)) {
+    if (end - begin >= kRun && ascii_run::IsAscii(begin)) {
       begin += kRun;
       count += kRun;
     } else if (end - begin >= kLongestGroup) {
@@ -204,7 +169,7 @@ uint32_t Utf8ToWideNoOverflow(const unsigned char*& begin, const unsigned char* 
   wchar_t* out = dest;
   while (s != end && out != destEnd) {
     const ptrdiff_t most = std::min(end - s, destEnd - out);
-    if (most >= kRun && IsAsciiRun(s)) {
+    if (most >= kRun && ascii_run::IsAscii(s)) {
       const ptrdiff_t ascii = WidenAsciiRuns(s, most, out);
       s += ascii;
       out += ascii;

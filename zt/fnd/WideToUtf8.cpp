@@ -7,11 +7,8 @@
 #include <cwchar>
 #include <memory>
 
+#include "zt/fnd/AsciiRun.h"
 #include "zt/fnd/Exception.h"
-
-#ifdef __SSE2__
-#include <emmintrin.h>
-#endif
 
 namespace zt::fnd {
 namespace {
@@ -32,48 +29,7 @@ unsigned EncodedBytes(uint32_t value) {
   return value <= 0x3FFFFFF ? 5 : 6;
 }
 
-// Most text is ASCII: characters at a time. The processor's own operations, as compilers make a move
-// a byte of the plain form.
-constexpr ptrdiff_t kRun = 16;
-
-#ifdef __SSE2__
-static_assert(sizeof(wchar_t) == 4);
-
-struct Run {
-  explicit Run(const wchar_t* s) {
-    for (int i = 0; i < 4; ++i) {
-      parts[i] = _mm_loadu_si128(reinterpret_cast<const __m128i*>(s + 4 * i));
-    }
-  }
-  bool isAscii() const {
-    const __m128i bits =
-        _mm_or_si128(_mm_or_si128(parts[0], parts[1]), _mm_or_si128(parts[2], parts[3]));
-    const __m128i beyond = _mm_andnot_si128(_mm_set1_epi32(0x7F), bits);
-    return _mm_movemask_epi8(_mm_cmpeq_epi32(beyond, _mm_setzero_si128())) == 0xFFFF;
-  }
-  void narrow(unsigned char* out) const {
-    const __m128i low = _mm_packs_epi32(parts[0], parts[1]);
-    const __m128i high = _mm_packs_epi32(parts[2], parts[3]);
-    _mm_storeu_si128(reinterpret_cast<__m128i*>(out), _mm_packus_epi16(low, high));
-  }
-
-  __m128i parts[4];
-};
-#else
-struct Run {
-  explicit Run(const wchar_t* s) : text(s) {}
-  bool isAscii() const {
-    uint32_t bits = 0;
-    for (ptrdiff_t i = 0; i < kRun; ++i) bits |= ValueOf(text[i]);
-    return bits <= 0x7F;
-  }
-  void narrow(unsigned char* out) const {
-    for (ptrdiff_t i = 0; i < kRun; ++i) out[i] = static_cast<unsigned char>(text[i]);
-  }
-
-  const wchar_t* text;
-};
-#endif
+constexpr ptrdiff_t kRun = ascii_run::kLength;
 
 // Writes the sequence of a value of `count` bytes and returns the place after it.
 unsigned char* EncodeOne(uint32_t value, unsigned count, unsigned char* dest) {
@@ -126,7 +82,7 @@ uint32_t GetUtf8EncodingBytes(const wchar_t* begin, const wchar_t* end) {
   if (IsEmpty(begin, end)) return 0;
   uint64_t count = 0;
   while (begin != end) {
-    if (end - begin >= kRun && Run(begin).isAscii()) {
+    if (end - begin >= kRun && ascii_run::IsAscii(begin)) {
       begin += kRun;
       count += kRun;
     } else {
@@ -157,8 +113,8 @@ uint32_t WideToUtf8NoOverflow(const wchar_t*& begin, const wchar_t* end, unsigne
   const wchar_t* s = begin;
   unsigned char* out = dest;
   while (s != end && out != destEnd) {
-    if (end - s >= kRun && destEnd - out >= kRun && Run(s).isAscii()) {
-      Run(s).narrow(out);
+    if (end - s >= kRun && destEnd - out >= kRun && ascii_run::IsAscii(s)) {
+      ascii_run::Copy(s, out);
       s += kRun;
       out += kRun;
       continue;

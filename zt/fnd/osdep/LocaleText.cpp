@@ -11,6 +11,7 @@
 #include <cwchar>
 #include <memory>
 
+#include "zt/fnd/AsciiRun.h"
 #include "zt/fnd/NumericCast.h"
 #include "zt/fnd/SafeInteger.h"
 #include "zt/fnd/osdep/IConv.h"
@@ -46,9 +47,10 @@ bool IsAsciiCodeset(const char* codeset) {
 
 // The host may change its locale at any time, so the answer for "" is never kept.
 ByHand ByHandOf(const char* encoding) {
-  if (Same(encoding, "US-ASCII")) return ByHand::Ascii;
-  if (Same(encoding, "UTF-8")) return ByHand::Utf8;
-  if (*encoding != '\0') return ByHand::Nothing;
+  if (*encoding != '\0') {
+    if (Same(encoding, "US-ASCII")) return ByHand::Ascii;
+    return Same(encoding, "UTF-8") ? ByHand::Utf8 : ByHand::Nothing;
+  }
   const char* const codeset = nl_langinfo(CODESET);
   if (Same(codeset, "UTF-8")) return ByHand::Utf8;
   return IsAsciiCodeset(codeset) ? ByHand::LocaleAscii : ByHand::Nothing;
@@ -59,9 +61,21 @@ bool IsAscii(wchar_t c) { return static_cast<uint32_t>(c) < 0x80; }
 bool IsTag(char) { return false; }
 bool IsTag(wchar_t c) { return static_cast<uint32_t>(c) >> 7 == 0xE0000 >> 7; }
 
+// Copies the ASCII that the text begins with, as far as there are whole runs of it and space.
+template <class In, class Out>
+void CopyAsciiRuns(const In*& begin, const In* end, Out*& dest, Out* destEnd) {
+  using ascii_run::kLength;
+  while (end - begin >= kLength && destEnd - dest >= kLength && ascii_run::IsAscii(begin)) {
+    ascii_run::Copy(begin, dest);
+    begin += kLength;
+    dest += kLength;
+  }
+}
+
 // Copies as far as there is space, with "?" in the place of what is not ASCII. Returns the end.
 template <class In, class Out>
 Out* CopyAscii(const In* begin, const In* end, Out* dest, Out* destEnd, bool leaveOutTags) {
+  CopyAsciiRuns(begin, end, dest, destEnd);
   for (; begin != end && dest != destEnd; ++begin) {
     if (leaveOutTags && IsTag(*begin)) continue;
     *dest++ = IsAscii(*begin) ? static_cast<Out>(*begin) : static_cast<Out>('?');
@@ -100,7 +114,12 @@ size_t ReadUtf8(const char* begin, const char* end, uint32_t& c) {
 
 // Of each malformed sequence every byte becomes a "?" of its own.
 wchar_t* ConvertUtf8(const char* begin, const char* end, wchar_t* dest, wchar_t* destEnd) {
+  CopyAsciiRuns(begin, end, dest, destEnd);
   for (; begin != end && dest != destEnd; ++dest) {
+    if (IsAscii(*begin)) {
+      *dest = static_cast<wchar_t>(*begin++);
+      continue;
+    }
     uint32_t c;
     const size_t n = ReadUtf8(begin, end, c);
     *dest = n == 0 ? L'?' : static_cast<wchar_t>(c);
@@ -123,8 +142,13 @@ void WriteUtf8(uint32_t c, size_t n, char* dest) {
 
 // A character that has no space becomes a "?" too, and the next ones may have space again.
 char* ConvertUtf8(const wchar_t* begin, const wchar_t* end, char* dest, char* destEnd) {
+  CopyAsciiRuns(begin, end, dest, destEnd);
   for (; begin != end && dest != destEnd; ++begin) {
     uint32_t c = static_cast<uint32_t>(*begin);
+    if (c < 0x80) {
+      *dest++ = static_cast<char>(c);
+      continue;
+    }
     size_t n = Utf8Length(c);
     if (!IsCharacter(c) || n > static_cast<size_t>(destEnd - dest)) {
       c = '?';
