@@ -51,7 +51,9 @@ wchar_t* vltGuidToStructString2(GUID g) {
 int vltCLSIDFromString(const wchar_t* s, GUID* out) {
   try {
     // The one strict reader of GUIDs; this source only decides what bad text means.
-    *out = zt::fnd::Guid(zt::fnd::String(s)).get();
+    zt::fnd::Guid guid;
+    guid.fromString(s, s ? s + wcslen(s) : s);
+    *out = guid.get();
     return 0;
   } catch (const zt::fnd::exception::BadGuidString&) {
     // Bad text is a result here, not a failure: it reads as the null GUID.

@@ -67,14 +67,12 @@ void Guid::toString(String& out) const {
   out.assign(text, kTextLength);
 }
 
-void Guid::fromString(const String& text) {
+void Guid::fromString(const wchar_t* cursor, const wchar_t* end) {
   // Before the parse, which would accept text after the closing brace.
-  if (text.length() != kTextLength) ZT_RAISE(exception::BadGuidString());
+  if (end - cursor != kTextLength) ZT_RAISE(exception::BadGuidString());
   // Parsed aside: a text that turns out bad at its end leaves the value as it was.
   GuidByteArray bytes = {};
   unsigned char* out = bytes.data();
-  const wchar_t* cursor = text.begin();
-  const wchar_t* const end = text.end();
   bool ok = true;
   SkipCharacter(cursor, end, L'{', ok);
   ParseHex<uint32_t>(cursor, end, out, ok);

@@ -38,7 +38,8 @@ class Guid {
   void toString(String& out) const;
 
   // Throws BadGuidString for anything but the text form; the value is then unchanged.
-  void fromString(const String& text);
+  void fromString(const String& text) { fromString(text.begin(), text.end()); }
+  void fromString(const wchar_t* begin, const wchar_t* end);
 
   // Wire form: the 16 bytes of GuidBytes. Throws DeserializationError if fewer remain
   // below `limit`; value and cursor are then unchanged.

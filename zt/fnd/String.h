@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <type_traits>
 
+#include "zt/fnd/Relocatable.h"
 #include "zt/fnd/StringFwd.h"
 
 namespace zt::fnd {
@@ -260,6 +261,9 @@ inline bool operator!=(const String& a, const AnsiString& b) { return a.compare(
 inline bool operator!=(const AnsiString& a, const String& b) { return b.compare(a) != 0; }
 inline bool operator<(const String& a, const AnsiString& b) { return a.compare(b) < 0; }
 inline bool operator<(const AnsiString& a, const String& b) { return b.compare(a) > 0; }
+
+template <class T, class Other, class Encoding>
+inline constexpr bool kIsRelocatable<StringBase<T, Other, Encoding>> = true;
 
 static_assert(sizeof(String) == 3 * sizeof(void*), "a string is three pointers");
 

@@ -2,11 +2,13 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 #include <memory>
 #include <new>
 #include <utility>
 
 #include "zt/fnd/DLLAlloc.h"
+#include "zt/fnd/Relocatable.h"
 #include "zt/fnd/SafeInteger.h"
 
 namespace zt::fnd {
@@ -103,6 +105,13 @@ class Builder {
     ++m_end;
   }
 
+  // Moves the elements, as bytes, to `to`.
+  void relocateTo(T* to) noexcept {
+    const size_t count = static_cast<size_t>(m_end - m_begin);
+    memcpy(static_cast<void*>(to), static_cast<const void*>(m_begin), count * sizeof(T));
+    m_end = m_begin;
+  }
+
   // Exchanges the block with another one; its old elements go with the builder.
   void exchange(T*& begin, T*& end) noexcept {
     std::swap(m_begin, begin);
@@ -141,12 +150,25 @@ void Vector<T>::push_back(const T& value) {
     ++m_end;
     return;
   }
-  uint32_t newCapacity = calculateNewCapacity();
-  vector_detail::Builder<T> block(newCapacity);
-  for (const T& old : *this) block.add(old);
-  // Before the old block goes, as `value` may lie in it.
-  block.add(value);
-  block.exchange(m_begin, m_end);
+  const uint32_t newCapacity = calculateNewCapacity();
+  if constexpr (kIsRelocatable<T>) {
+    // Before the block moves, as `value` may lie in it.
+    vector_detail::Builder<T> last(1);
+    last.add(value);
+    const uint32_t oldSize = size();
+    const auto bytes =
+        SafeInteger<uint32_t>::Multiply(newCapacity, static_cast<uint32_t>(sizeof(T)));
+    m_begin = static_cast<T*>(DLLRealloc(m_begin, bytes));
+    m_end = m_begin + oldSize;
+    last.relocateTo(m_end);
+    ++m_end;
+  } else {
+    vector_detail::Builder<T> block(newCapacity);
+    for (const T& old : *this) block.add(old);
+    // Before the old block goes, as `value` may lie in it.
+    block.add(value);
+    block.exchange(m_begin, m_end);
+  }
   m_capacityEnd = m_begin + newCapacity;
 }
 

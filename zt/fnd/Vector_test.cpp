@@ -4,6 +4,8 @@
 
 #include <string>
 
+#include "zt/fnd/String.h"
+
 namespace zt::fnd {
 namespace {
 
@@ -87,6 +89,16 @@ TEST(Vector, PushBackOfAnOwnElementSurvivesTheMove) {
   v.push_back("a text that is long enough for a block of its own");
   v.push_back(v[0]);
   EXPECT_EQ(v[0], v[1]);
+}
+
+TEST(Vector, OfStringsGrowsWithoutACopyOfEach) {
+  static_assert(kIsRelocatable<std::pair<String, int>> && !kIsRelocatable<std::string>);
+  Vector<std::pair<String, int>> v;
+  v.push_back({String(L"the first"), 0});
+  const wchar_t* const text = v[0].first.c_str();
+  for (int i = 1; i < 100; ++i) v.push_back(v[static_cast<unsigned>(i) / 2]);
+  EXPECT_EQ(v[0].first.c_str(), text);
+  for (const auto& [string, number] : v) EXPECT_EQ(string, L"the first");
 }
 
 // Element whose nth copy throws, counting how many live.

@@ -34,7 +34,7 @@ bool SameCharacter(wchar_t a, wchar_t b) {
 }
 
 struct Mask {
-  String directory, pattern;
+  String directory, pattern, prefix;  // of full names
 
   explicit Mask(const String& mask) {
     String::size_type slash = mask.find_last_of(String(L"/\\"));
@@ -45,6 +45,7 @@ struct Mask {
       directory = mask.substr(0, slash);
       pattern = mask.substr(slash + 1);
     }
+    prefix = directory + L"/";
   }
 };
 
@@ -80,11 +81,7 @@ void AddEntry(const Mask& mask, Flags flags, const dirent* entry, Vector<String>
   if (entry->d_name[0] == '.' && !Has(flags, Flags::Hidden)) return;
   String name(entry->d_name);
   if (!WildcardFit(mask.pattern.c_str(), name.c_str())) return;
-  String full(mask.directory);
-  // One allocation an entry; directories of thousands are listed here.
-  full.reserve(mask.directory.length() + name.length() + 2);
-  full += L'/';
-  full += name;
+  String full(mask.prefix, name);
   if (Has(flags, Flags::Directories)) {
     if (SurelyNoDirectory(entry) || !path::IsDirectory(full.c_str())) return;
     path::MakePathEndInSlash(full);

@@ -1,5 +1,6 @@
 #include "zt/fnd/osdep/path.h"
 
+#include <algorithm>
 #include <cwchar>
 #include <utility>
 #include <vector>
@@ -21,11 +22,11 @@ bool EndsInSlash(const S& text) {
 template <class S>
 S JoinText(const S& a, const S& b) {
   if (a.empty() || (!b.empty() && b[0] == '/')) return b;
-  if (EndsInSlash(a)) return a + b;
-  S joined(a);
-  joined.reserve(a.length() + 1 + b.length());
-  joined += typename S::value_type('/');
-  joined += b;
+  if (EndsInSlash(a)) return S(a, b);
+  // Of slashes, of which one stays: one allocation.
+  S joined(a.length() + 1 + b.length(), typename S::value_type('/'));
+  std::copy(a.begin(), a.end(), joined.begin());
+  std::copy(b.begin(), b.end(), joined.begin() + a.length() + 1);
   return joined;
 }
 
