@@ -61,9 +61,10 @@ namespace {
 const char* Value(IniStructForwardReferenceTag* document, const char* section, const char* item,
                   bool decoded) {
   const char* value = nullptr;
-  int32_t status = decoded ? IniGetPointerToString(document, section, item, &value)
-                           : IniGetPointerToRawString(document, section, item, &value);
-  return status == 1 ? value : nullptr;
+  if (IniGetPointerToRawString(document, section, item, &value) != 1) return nullptr;
+  // Most values have no escapes: what is stored is the value.
+  if (!decoded || !strchr(value, '\\')) return value;
+  return IniGetPointerToString(document, section, item, &value) == 1 ? value : nullptr;
 }
 
 template <class Out>

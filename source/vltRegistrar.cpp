@@ -110,10 +110,8 @@ HRESULT CvltRegistrar::AddComponent(CvltComponent* component) {
   // From the first line: whatever throws below, the component goes.
   std::unique_ptr<CvltComponent> owned(component);
   ComponentMap::Hold map(m_components);
-  // A copy, as the arguments of emplace are evaluated in no certain order.
-  GUID identifier = owned->record().identifier;
-  removeEntry(*map, identifier);
-  map->emplace(identifier, std::move(owned));
+  auto& entry = (*map)[owned->record().identifier];
+  entry = std::move(owned);
   return S_OK;
 }
 

@@ -10,6 +10,8 @@
 
 #include <stdio.h>
 
+#include <charconv>
+#include <system_error>
 #include <vector>
 
 #include "source/Database/databaseText.h"
@@ -49,6 +51,18 @@ struct Stamp {
     high = static_cast<uint32_t>(ticks >> 32);
   }
   std::string text() const { return Decimal(low) + " " + Decimal(high); }
+  bool isIn(const std::string& stored) const {
+    // As text() writes it: without the time that sscanf takes for a pattern.
+    const char* const end = stored.data() + stored.size();
+    uint32_t first = 0, second = 0;
+    auto [afterFirst, error] = std::from_chars(stored.data(), end, first);
+    if (error == std::errc() && afterFirst != end && *afterFirst == ' ' && first == low &&
+        std::from_chars(afterFirst + 1, end, second).ptr == end && second == high) {
+      return true;
+    }
+    unsigned long one = 0, other = 0;
+    return sscanf(stored.c_str(), "%lu %lu", &one, &other) == 2 && one == low && other == high;
+  }
 
   uint32_t low, high;
 };
@@ -61,13 +75,9 @@ bool Scan::isUpToDate(const std::string& file, const zt::fnd::AbsTime& time) {
   m_filesSeen.insert(file);
   std::string stored;
   if (m_database.GetItem(kRegistrations, file.c_str(), &stored) < 0) return false;
-  Stamp stamp(time);
-  if (stored == stamp.text()) return true;
-  unsigned long low = 0, high = 0;
   // Any difference counts, not only a later time: a bundle that is replaced by an older one has
   // changed as well.
-  return sscanf(stored.c_str(), "%lu %lu", &low, &high) == 2 && low == stamp.low &&
-         high == stamp.high;
+  return Stamp(time).isIn(stored);
 }
 
 void Scan::setStamp(const std::string& file, const zt::fnd::AbsTime& time) {

@@ -56,6 +56,25 @@ TEST_F(ScanTest, AFileIsUpToDateWithItsStampOnly) {
   EXPECT_FALSE(scan->isUpToDate("/b", Seconds(1000000)));
 }
 
+TEST_F(ScanTest, StampsAreComparedAsNumbers) {
+  scan->setStamp("/a", Seconds(1000000));
+  const std::string stamp = value("Registration", "/a");
+  const std::string low = stamp.substr(0, stamp.find(' ')), high = stamp.substr(low.size() + 1);
+  auto isUpToDate = [&](const std::string& stored) {
+    database->SetItem("Registration", "/a", stored.c_str(), true);
+    return scan->isUpToDate("/a", Seconds(1000000));
+  };
+  for (const std::string& same :
+       {stamp, low + "  " + high, low + "\t" + high, "0" + low + " " + high, "+" + low + " " + high,
+        stamp + " and more", stamp + "x"}) {
+    EXPECT_TRUE(isUpToDate(same)) << same;
+  }
+  for (const std::string& other : {low, low + high, low + " ", low + "," + high, stamp + "0",
+                                   high + " " + low, "-" + stamp, std::string(), "x" + stamp}) {
+    EXPECT_FALSE(isUpToDate(other)) << other;
+  }
+}
+
 TEST_F(ScanTest, AFileThatWasSeenIsPresent) {
   scan->isUpToDate("/seen", Seconds(1));
   EXPECT_TRUE(scan->isPresent("/seen"));

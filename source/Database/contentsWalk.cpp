@@ -1,5 +1,7 @@
 #include "source/Database/contentsWalk.h"
 
+#include <utility>
+
 #include "source/Database/databaseText.h"
 #include "source/IniDocument.h"
 #include "zt/fnd/osdep/StringCompare.h"
@@ -33,13 +35,13 @@ std::vector<ContentsItem> ReadContents(const IniDocument& database) {
     if (database.GetNthItemName(registrar::kContents, i + 1, &name) < 0) continue;
     database.GetItem(registrar::kContents, name.c_str(), &value);
     bool piece = IsPiece(name);
-    std::string component = piece ? BaseOf(name) : name;
+    std::string component = piece ? BaseOf(name) : std::move(name);
     // Neighbours only: two runs of one name are two items.
     if (piece && inPieces && items.back().component == component) {
       items.back().file += value;
       items.back().last = i;
     } else {
-      items.push_back({component, value, i, i, piece});
+      items.push_back({std::move(component), std::move(value), i, i, piece});
     }
     inPieces = piece;
   }

@@ -43,9 +43,7 @@ inline constexpr uint32_t kDictionaryVersion = 2;
 inline constexpr uint32_t kExpertVersion = 3;
 
 // In the process's locale; null counts as empty.
-inline std::string Narrow(const wchar_t* text) {
-  return text ? std::string(zt::fnd::AnsiString(text).c_str()) : std::string();
-}
+std::string Narrow(const wchar_t* text);
 inline std::string Narrow(const zt::fnd::String& text) { return Narrow(text.c_str()); }
 inline zt::fnd::String Widen(const std::string& text) { return zt::fnd::String(text.c_str()); }
 

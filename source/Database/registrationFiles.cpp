@@ -82,14 +82,15 @@ void AppendRegistrationFiles(const String& directory, const String& mask,
   if (names.empty()) return;
   const FilesBelow below(Narrow(directory));
   const String registrationFile(kRegistrationFile);
+  RegistrationFiles::value_type found;
+  auto& [file, time] = found;
   for (const String& name : names) {
-    String bundle = path::IsAbs(name) ? name : path::Join(directory, name);
-    String file = path::Join(bundle, registrationFile);
+    file = path::IsAbs(name) ? path::Join(name, registrationFile)
+                             : path::Join(path::Join(directory, name), registrationFile);
     const std::string narrow = Narrow(file);
     // The path becomes the name of an item, where a line end would write lines of its own.
     if (HasLineEnd(narrow)) continue;
-    zt::fnd::AbsTime time;
-    if (RegistrationTime(below, narrow, &time)) files.push_back({file, time});
+    if (RegistrationTime(below, narrow, &time)) files.push_back(found);
   }
 }
 

@@ -16,6 +16,7 @@
 #include "source/Pharlap/registrarText.h"
 #include "source/Pharlap/vltPharlapRegistrar.h"
 #include "vlloader/source/InstallLayout.h"
+#include "zt/fnd/osdep/LocaleText.h"
 #include "zt/fnd/osdep/path.h"
 
 using zt::fnd::osdep::path;
@@ -24,8 +25,18 @@ using zt::fnd::String;
 
 namespace {
 
+// Widened straight into its block; null as CopyOf gives it.
 wchar_t* CopyOfNarrow(const std::optional<std::string>& text) {
-  return text ? CopyOf(Widen(*text).c_str()) : nullptr;
+  if (!text) return nullptr;
+  const char* begin = text->c_str();
+  const char* end = begin + strlen(begin);
+  const size_t most = zt::fnd::osdep::GetAnsiToWideRequiredBufferLength(begin, end, "");
+  TaskMem<wchar_t> copy(static_cast<wchar_t*>(ZtTaskMemAlloc((most + 1) * sizeof(wchar_t))));
+  if (!copy) return nullptr;
+  wchar_t* stop = copy.get() + most;
+  zt::fnd::osdep::AnsiToWideNoAlloc(begin, end, "", copy.get(), stop);
+  *stop = L'\0';
+  return copy.release();
 }
 
 }  // namespace

@@ -73,19 +73,20 @@ void CvltLinuxRegistrar::addIfOwn(const _vltComponent2* record, const CvltBindin
 }
 
 HRESULT CvltLinuxRegistrar::PopulateBindingClasses(_vltComponent2* record) {
-  String file(record->fileName ? record->fileName : L"");
-  auto found = m_bindingClassesByFile.find(file);
-  if (found != m_bindingClassesByFile.end()) {
-    addIfOwn(record, *found->second);
-    return S_OK;
+  const wchar_t* file = record->fileName ? record->fileName : L"";
+  if (!m_bindingClassesByFile.empty()) {
+    auto found = m_bindingClassesByFile.find(String(file));
+    if (found != m_bindingClassesByFile.end()) {
+      addIfOwn(record, *found->second);
+      return S_OK;
+    }
   }
   // The text is asked for once a file and kept: all experts of one bundle share it.
   TaskMem<char> text;
-  HRESULT result =
-      m_resources.get(":", file.c_str(), L"BINDING_CLASSES", text.out(), kLongestResource);
+  HRESULT result = m_resources.get(":", file, L"BINDING_CLASSES", text.out(), kLongestResource);
   // S_OK with no text, which the query gives for empty ones, is none either.
   if (result < 0 || !text || !*text.get()) return E_FAIL;
-  auto& classes = m_bindingClassesByFile[file];
+  auto& classes = m_bindingClassesByFile[String(file)];
   classes = std::make_unique<CvltBindingClasses>(String(text.get()));
   addIfOwn(record, *classes);
   return result;

@@ -1,18 +1,23 @@
 // Most installations have no text of a key that is optional, and a start asks for one for each
 // component. Whether the key is anywhere in the database's bytes is found in a fifth of the time that
-// parsing takes, so that the database is parsed only for a key that is there.
+// parsing takes, so that the database is parsed only for a key that is there. A key that is not is
+// remembered as it was asked for.
 #include <ctype.h>
 #include <fcntl.h>
 #include <string.h>
 #include <sys/stat.h>
 #include <unistd.h>
+#include <wchar.h>
 
 #include <algorithm>
 #include <array>
 #include <optional>
+#include <string_view>
+#include <vector>
 
 #include "source/Common/Posix/vltlinuxos.h"
 #include "source/Common/vltcmn.h"
+#include "source/Database/databaseText.h"
 #include "source/Database/resourceTexts.h"
 #include "vlloader/source/vlloader.h"
 #include "zt/posix/Files.h"
@@ -66,90 +71,100 @@ class Warnings final : public registrar::ResourceObserver {
 
 Warnings s_warnings;
 
-// Nothing where the bytes cannot be had whole just now.
-std::optional<std::string> BytesOf(const std::string& file) {
-  zt::posix::ScopedFd fd = zt::posix::OpenExisting(file.c_str(), O_RDONLY);
-  struct stat info;
-  if (!fd || fstat(fd.get(), &info) != 0 || info.st_size > ztini::kLargestFileBytes) {
-    return std::nullopt;
+// Finds a name in a text that comes in blocks, in the case rules of names. Horspool's search, which
+// steps over what cannot be the end of the name.
+class NameSearch {
+ public:
+  explicit NameSearch(const std::string& name) {
+    auto isSpace = [](char c) { return isspace(static_cast<unsigned char>(c)) != 0; };
+    auto first = std::find_if_not(name.begin(), name.end(), isSpace);
+    m_wanted.assign(first,
+                    std::find_if_not(name.rbegin(), std::reverse_iterator(first), isSpace).base());
+    for (size_t c = 0; c < m_folded.size(); ++c)
+      m_folded[c] = static_cast<unsigned char>(toupper(static_cast<int>(c)));
+    m_step.fill(m_wanted.size());
+    for (size_t i = 0; i + 1 < m_wanted.size(); ++i)
+      m_step[fold(m_wanted[i])] = m_wanted.size() - 1 - i;
   }
-  std::string bytes(static_cast<size_t>(info.st_size), '\0');
-  size_t got = zt::posix::MoveAll(bytes.size(), [&](size_t done, size_t rest) {
-    return read(fd.get(), bytes.data() + done, rest);
-  });
-  return got == bytes.size() ? std::optional(std::move(bytes)) : std::nullopt;
-}
+
+  size_t size() const { return m_wanted.size(); }
+  bool isIn(std::string_view text) const {
+    if (m_wanted.empty()) return true;
+    auto same = [this](char a, char b) { return fold(a) == fold(b); };
+    for (size_t at = size() - 1; at < text.size(); at += m_step[fold(text[at])]) {
+      if (std::equal(m_wanted.rbegin(), m_wanted.rend(),
+                     text.rend() - static_cast<ptrdiff_t>(at) - 1, same)) {
+        return true;
+      }
+    }
+    return false;
+  }
+
+ private:
+  size_t fold(char c) const { return m_folded[static_cast<unsigned char>(c)]; }
+
+  std::string m_wanted;  // without white space around it
+  std::array<unsigned char, 256> m_folded;
+  std::array<size_t, 256> m_step;
+};
 
 // False where the parser may join what stands apart in the bytes: see ztini/TextLines.h.
-bool HasPlainLines(const std::string& bytes) {
+bool HasPlainLines(std::string_view block, bool isFirst) {
   constexpr size_t kNeverLong = 255;
-  return bytes.find('\n') < kNeverLong && bytes.find('\r') == std::string::npos &&
-         bytes.find('\0') == std::string::npos;
+  return (!isFirst || block.find('\n') < kNeverLong) && block.find('\r') == std::string::npos &&
+         block.find('\0') == std::string::npos;
 }
 
-// Whether the bytes hold the name, in the case rules of names. Horspool's search, which steps over
-// what cannot be the end of the name.
-bool Holds(const std::string& bytes, const std::string& name) {
-  auto isSpace = [](char c) { return isspace(static_cast<unsigned char>(c)) != 0; };
-  auto first = std::find_if_not(name.begin(), name.end(), isSpace);
-  std::string wanted(first,
-                     std::find_if_not(name.rbegin(), std::reverse_iterator(first), isSpace).base());
-  std::array<unsigned char, 256> folded;
-  for (int c = 0; c < 256; ++c)
-    folded[static_cast<size_t>(c)] = static_cast<unsigned char>(toupper(c));
-  auto fold = [&](char c) { return folded[static_cast<unsigned char>(c)]; };
-  const size_t size = wanted.size();
-  if (size == 0) return true;
-  std::array<size_t, 256> step;
-  step.fill(size);
-  for (size_t i = 0; i + 1 < size; ++i) step[fold(wanted[i])] = size - 1 - i;
-  auto same = [&](char a, char b) { return fold(a) == fold(b); };
-  for (size_t at = size - 1; at < bytes.size(); at += step[fold(bytes[at])]) {
-    if (std::equal(wanted.rbegin(), wanted.rend(), bytes.rend() - static_cast<ptrdiff_t>(at) - 1,
-                   same)) {
-      return true;
-    }
+// False only if a parser finds no such name in the file. Reads it in blocks: a start has the text of
+// the database in memory already, and should not have it twice.
+bool MayHold(const std::string& file, const std::string& name) {
+  zt::posix::ScopedFd fd = zt::posix::OpenExisting(file.c_str(), O_RDONLY);
+  struct stat info;
+  if (!fd || fstat(fd.get(), &info) != 0 || info.st_size > ztini::kLargestFileBytes) return true;
+  const NameSearch search(name);
+  const size_t blockBytes = 65536 + search.size();
+  std::vector<char> buffer(blockBytes + search.size());
+  size_t kept = 0;  // the end of the block before, in which the name may begin
+  for (bool isFirst = true;; isFirst = false) {
+    size_t got = zt::posix::MoveAll(blockBytes, [&](size_t done, size_t rest) {
+      return read(fd.get(), buffer.data() + kept + done, rest);
+    });
+    if (got < blockBytes && errno != 0) return true;
+    std::string_view text(buffer.data(), kept + got);
+    if (!HasPlainLines(text.substr(kept), isFirst) || search.isIn(text)) return true;
+    if (got < blockBytes) return false;
+    kept = search.size() - 1;
+    std::copy(text.end() - static_cast<ptrdiff_t>(kept), text.end(), buffer.begin());
   }
-  return false;
 }
 
 }  // namespace
 
 class vltStringResources::Database {
  public:
-  explicit Database(std::string file) : m_file(std::move(file)), m_bytes(BytesOf(m_file)) {
-    if (m_bytes && !HasPlainLines(*m_bytes)) m_bytes.reset();
+  explicit Database(std::string file) : m_file(std::move(file)) {}
+  // False only if no component has a text of the key.
+  bool mayHave(const std::string& key) {
+    // One who wants reports gets those of the whole walk.
+    if (m_texts || s_warnings.wantsAll()) return true;
+    auto known = m_keys.find(key);
+    if (known == m_keys.end()) known = m_keys.emplace(key, MayHold(m_file, key)).first;
+    return known->second;
   }
   void answer(ResourceTexts::Query& query) {
-    if (!m_texts) {
-      // One who wants reports gets those of the whole walk.
-      if (m_bytes && !s_warnings.wantsAll() && !mayHave(query.key)) return;
-      m_texts.emplace(read(), &s_warnings);
-      m_bytes.reset();
-    }
+    if (!m_texts) m_texts.emplace(read(), &s_warnings);
     m_texts->answer(query);
   }
 
  private:
-  bool mayHave(const std::string& key) {
-    auto known = m_keys.find(key);
-    if (known == m_keys.end()) known = m_keys.emplace(key, Holds(*m_bytes, key)).first;
-    return known->second;
-  }
   IniStructForwardReferenceTag* read() const {
     IniStructForwardReferenceTag* document = ResourceTexts::NewDocument();
-    if (!document) return nullptr;
-    if (m_bytes) {
-      IniReadBytes(document, m_bytes->data(), m_bytes->size());
-    } else {
-      IniReadFromFile(document, m_file.c_str());  // A missing file is an empty one.
-    }
+    if (document) IniReadFromFile(document, m_file.c_str());  // A missing file is an empty one.
     return document;
   }
 
   std::string m_file;
-  std::optional<std::string> m_bytes;  // until it is parsed; none: the parser reads the file itself
-  std::map<std::string, bool> m_keys;  // whether the bytes hold it
+  std::map<std::string, bool> m_keys;  // whether the file may hold it
   std::optional<ResourceTexts> m_texts;
 };
 
@@ -158,15 +173,19 @@ vltStringResources::~vltStringResources() = default;
 
 void vltStringResources::forget() {
   m_databases.clear();
+  m_installed = nullptr;
+  m_missing.clear();
   m_lookedUp = false;
 }
 
 vltStringResources::Database* vltStringResources::databaseFor(const std::string& file) {
   std::string directory;
   // A dictionary of the previous version brings its database along, in its own directory.
-  if (file.find("/Last/") != std::string::npos) {
+  const bool isPrevious = file.find("/Last/") != std::string::npos;
+  if (isPrevious) {
     directory = file.substr(0, file.rfind('/'));
   } else {
+    if (m_installed) return m_installed;
     if (!m_lookedUp) {
       m_installDirectory = vlLookUpInstallDirectory();
       m_lookedUp = true;
@@ -183,17 +202,29 @@ vltStringResources::Database* vltStringResources::databaseFor(const std::string&
   }
   auto& database = m_databases[directory];
   if (!database) database = std::make_unique<Database>(directory + "/vlt.vlr");
+  if (!isPrevious) m_installed = database.get();
   return database.get();
+}
+
+// The answer to most questions, without a conversion of their texts.
+bool vltStringResources::isKnownMissing(const wchar_t* file, const wchar_t* key) const {
+  return file && key && !m_missing.empty() && m_missing == key && !wcsstr(file, L"/Last/") &&
+         !s_warnings.wantsAll();
 }
 
 HRESULT vltStringResources::get(const char* separator, const wchar_t* file, const wchar_t* key,
                                 char** out, unsigned maxLength) {
   if (!out) return E_POINTER;
-  std::string narrowFile = zt::fnd::AnsiString(file ? file : L"").c_str();
-  ResourceTexts::Query q{separator, ResourceTexts::TargetOf(narrowFile),
-                         zt::fnd::AnsiString(key ? key : L"").c_str(), maxLength, ""};
+  if (isKnownMissing(file, key)) return E_FAIL;
+  std::string narrowFile = registrar::Narrow(file), narrowKey = registrar::Narrow(key);
   Database* database = databaseFor(narrowFile);
   if (!database) return E_FAIL;
+  if (!database->mayHave(narrowKey)) {
+    if (key && database == m_installed) m_missing = key;
+    return E_FAIL;
+  }
+  ResourceTexts::Query q{separator, ResourceTexts::TargetOf(narrowFile), std::move(narrowKey),
+                         maxLength, ""};
   database->answer(q);
   HRESULT result = q.found ? S_OK : E_FAIL;
   if (q.joined.empty()) return result;

@@ -45,10 +45,13 @@ class vltStringResources {
   class Database;
   // Null, after a word where that is asked for, if there is no install directory.
   Database* databaseFor(const std::string& file);
+  bool isKnownMissing(const wchar_t* file, const wchar_t* key) const;
 
   std::string m_installDirectory;
   bool m_lookedUp = false;
   std::map<std::string, std::unique_ptr<Database>> m_databases;
+  Database* m_installed = nullptr;  // of these, that of the install directory
+  std::wstring m_missing;           // a key that it does not have; empty if none is known
 };
 
 HRESULT vltGetStringResourceImpl(const char* separator, const wchar_t* file, const wchar_t* key,

@@ -181,6 +181,51 @@ TEST(vltlinuxosStringResource, AnswersAreTheParsersWhateverTheBytes) {
   }
 }
 
+// The search reads blocks of 65,536 bytes and the key's length.
+TEST(vltlinuxosStringResource, AKeyMayLieAcrossTwoBlocks) {
+  constexpr size_t kBlock = 65536 + 3;
+  const std::string head = "[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/x/f\"\n;\n";
+  for (size_t blocks : {1, 2}) {
+    for (size_t before = 0; before <= 5; ++before) {
+      std::string filler(blocks * kBlock - before - head.size(), '\n');
+      Database root(head + filler + "Key = \"v\"\n");
+      SCOPED_TRACE(before);
+      Expect(Ask(nullptr, L"/x/f"), S_OK, "v");
+      Expect(Ask(nullptr, L"/x/f", L"Kez"), E_FAIL, "(untouched)");
+    }
+  }
+}
+
+TEST(vltlinuxosStringResource, AKeyMayBeLongerThanABlock) {
+  const std::string key(200000, 'k');
+  Database root("[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/x/f\"\n" + key + " = \"v\"\n");
+  const std::wstring wide(key.begin(), key.end());
+  Expect(Ask(nullptr, L"/x/f", wide.c_str()), S_OK, "v");
+  Expect(Ask(nullptr, L"/x/f", (wide + L"k").c_str()), E_FAIL, "(untouched)");
+}
+
+TEST_IN_CHILD(vltlinuxosStringResource, AKeyThatIsMissingIsMissingInThatDatabaseOnly) {
+  Database d;
+  std::filesystem::create_directories(d.root() + "/Last");
+  WriteBytes(d.root() + "/Last/vlt.vlr",
+             "[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/x/One.vle\"\nGone = \"g\"\n");
+  vltStringResources resources;
+  auto ask = [&](const std::string& file, const wchar_t* key) {
+    TaskMem<char> out;
+    resources.get(nullptr, std::wstring(file.begin(), file.end()).c_str(), key, out.out(), 100);
+    return std::string(out ? out.get() : "none");
+  };
+  for (int round = 0; round < 2; ++round) {
+    EXPECT_EQ(ask("/two.vle", L"Gone"), "none");
+    EXPECT_EQ(ask("/two.vle", L"Key"), "third");
+    EXPECT_EQ(ask(d.root() + "/Last/One.vle", L"Gone"), "g");
+  }
+  WriteBytes(d.database(),
+             "[KORComponents]\nA = \"A\"\n[A]\nFileName = \"/two.vle\"\nGone = \"back\"\n");
+  resources.forget();
+  EXPECT_EQ(ask("/two.vle", L"Gone"), "back");
+}
+
 TEST(vltlinuxosStringResource, PreviousDictionariesHaveADatabaseBesideThem) {
   Database d;
   std::filesystem::create_directories(d.root() + "/Data Dictionaries/Last");
