@@ -83,7 +83,7 @@ IniEntry* IniNewEntry(const char* name, const char* value, int32_t readOptions) 
     return nullptr;
   }
   // After the copy, which has cut the white space.
-  entry->knownNameLength = IniKnownLength(strlen(entry->name));
+  entry->knownNameLength = IniKnownNameLength(strlen(entry->name));
   IniNewEntryHandleQuotes(entry, readOptions);
   return entry;
 }
@@ -123,9 +123,9 @@ void IniDisposeEntry(IniEntry* entry) {
 void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions) {
   const size_t length = strlen(entry->value);
   entry->quote = IniEnclosingQuote(entry->value, length, readOptions);
-  entry->knownValueLength = IniKnownLength(length);
+  entry->knownValueLength = IniKnownValueLength(length);
   if (!entry->quote) return;
-  entry->knownValueLength = IniKnownLength(length - 2);
+  entry->knownValueLength = IniKnownValueLength(length - 2);
   memmove(entry->value, entry->value + 1, length - 2);
   entry->value[length - 2] = 0;
 }
@@ -133,7 +133,7 @@ void IniNewEntryHandleQuotes(IniEntry* entry, int32_t readOptions) {
 void IniReplaceValue(IniEntry* entry, char* value) {
   if (!entry->valueInArena) free(entry->value);
   entry->value = value;
-  entry->knownValueLength = IniKnownLength(strlen(value));
+  entry->knownValueLength = IniKnownValueLength(strlen(value));
   entry->valueInArena = 0;
 }
 

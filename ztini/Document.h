@@ -25,12 +25,13 @@ inline constexpr char kIniNullSectionName[] = "(null)";
 struct IniEntry : ztini::NameNode {
   char* value = nullptr;  // without surrounding white space and enclosing quotes
   int32_t line = -1;      // -1: not from a file
+  // Lengths of both texts, so that a save does not count them; 0 where that is unknown. No field
+  // lies in two halves of a word: the parser would wait for each half that it has just written.
+  uint16_t knownNameLength : 7 = 0;
   // What encloses the value in the file: 0, 34, 39, or as put. More than a character, because a put
   // of 256 is not one of 0: it writes the character 0.
-  uint32_t quote : 9 = 0;
-  // Lengths of both texts, so that a save does not count them; 0 where that is unknown.
-  uint32_t knownNameLength : 11 = 0;
-  uint32_t knownValueLength : 12 = 0;
+  uint16_t quote : 9 = 0;
+  uint16_t knownValueLength = 0;
 
   std::string_view nameText() const {
     return {name, knownNameLength ? knownNameLength : strlen(name)};
@@ -41,14 +42,17 @@ struct IniEntry : ztini::NameNode {
 };
 
 // The field for a quote as put.
-inline uint32_t IniQuoteField(int32_t quote) {
+inline uint16_t IniQuoteField(int32_t quote) {
   const auto character = static_cast<unsigned char>(quote);
   return character == 0 && quote != 0 ? 256 : character;
 }
 
 // For the fields above: 0 for what they cannot hold.
-inline uint32_t IniKnownLength(size_t length) {
-  return length < 1u << 11 ? static_cast<uint32_t>(length) : 0;
+inline uint16_t IniKnownNameLength(size_t length) {
+  return length < 1u << 7 ? static_cast<uint16_t>(length) : 0;
+}
+inline uint16_t IniKnownValueLength(size_t length) {
+  return length <= UINT16_MAX ? static_cast<uint16_t>(length) : 0;
 }
 
 struct IniSection : ztini::NameNode {
@@ -164,14 +168,13 @@ inline IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, siz
     ++value;
     valueLength -= 2;
   }
-  // The fields of bits one after the other, so that they become one store.
   auto* entry = new (place) IniEntry;
   entry->name = name;
   entry->value = value;
   entry->nameInArena = entry->valueInArena = entry->recordInArena = 1;
-  entry->quote = static_cast<uint32_t>(quote);
-  entry->knownNameLength = IniKnownLength(nameLength);
-  entry->knownValueLength = IniKnownLength(valueLength);
+  entry->quote = static_cast<uint16_t>(quote);
+  entry->knownNameLength = IniKnownNameLength(nameLength);
+  entry->knownValueLength = IniKnownValueLength(valueLength);
   return entry;
 }
 
