@@ -54,13 +54,18 @@ char* Arena::addBlock(size_t sizeBytes) {
   return reinterpret_cast<char*>(block + 1);
 }
 
+bool Arena::addPresentBlock(size_t sizeBytes) {
+  char* front = addBlock(sizeBytes);
+  if (!front) return false;
+  m_front = front;
+  m_back = front + sizeBytes;
+  return true;
+}
+
 bool Arena::makeRoom(size_t sizeBytes) {
   // Less than a quarter of the block is asked for, so one block suffices.
   const size_t room = m_nextBlockBytes - sizeof(Block) - kMallocBytes;
-  char* front = addBlock(room);
-  if (!front) return false;
-  m_front = front;
-  m_back = front + room;
+  if (!addPresentBlock(room)) return false;
   if (m_nextBlockBytes < kLargestBlockBytes) m_nextBlockBytes *= 2;
   return sizeBytes <= room;
 }

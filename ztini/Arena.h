@@ -30,6 +30,14 @@ class Arena {
   // A terminated copy of the bytes; null without memory.
   char* text(const char* begin, size_t length);
 
+  // Makes one block of so many bytes, the guess of all that will be asked for. Without memory for
+  // it, and once it is full, blocks grow as they do without a guess.
+  void expect(size_t sizeBytes) { (void)(sizeBytes <= roomLeft() || addPresentBlock(sizeBytes)); }
+
+  // Makes sure that the next records, of so many bytes in all and less than a quarter of a block,
+  // need no memory. False without memory.
+  bool reserve(size_t sizeBytes) { return sizeBytes <= roomLeft() || makeRoom(sizeBytes); }
+
   // Frees everything at once.
   void clear();
 
@@ -41,6 +49,7 @@ class Arena {
   void* recordElsewhere(size_t sizeBytes);
   char* addBlock(size_t sizeBytes);
   bool makeRoom(size_t sizeBytes);
+  bool addPresentBlock(size_t sizeBytes);
   bool needsOwnBlock(size_t sizeBytes) const { return sizeBytes > m_nextBlockBytes / 4; }
   size_t roomLeft() const { return static_cast<size_t>(m_back - m_front); }
 

@@ -64,4 +64,34 @@ TEST(Arena, WithoutMemoryItGivesNullAndStaysUsable) {
   EXPECT_EQ(arena.text("a", 1), nullptr);
 }
 
+TEST(Arena, WhatWasExpectedLiesInOneBlock) {
+  Arena arena;
+  arena.expect(100000);
+  ztini::test::FailFromAllocation fail(1);
+  for (int i = 0; i < 100000 / 40; ++i) ASSERT_NE(arena.record(40), nullptr) << i;
+  EXPECT_EQ(arena.record(40), nullptr);
+}
+
+TEST(Arena, WithoutMemoryForWhatIsExpectedBlocksGrow) {
+  Arena arena;
+  {
+    ztini::test::FailOneAllocation fail(1);
+    arena.expect(100000);
+  }
+  for (int i = 0; i < 100000 / 40; ++i) ASSERT_NE(arena.record(40), nullptr) << i;
+}
+
+TEST(Arena, ReservedRecordsNeedNoMemory) {
+  Arena arena;
+  EXPECT_TRUE(arena.reserve(200));
+  {
+    ztini::test::FailFromAllocation fail(1);
+    EXPECT_NE(arena.record(40), nullptr);
+    EXPECT_NE(arena.record(160), nullptr);
+    arena.clear();
+    EXPECT_FALSE(arena.reserve(200));
+  }
+  EXPECT_TRUE(arena.reserve(200));
+}
+
 }  // namespace

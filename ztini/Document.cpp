@@ -154,7 +154,9 @@ void IniEmptyDocument(IniStructForwardReferenceTag* doc) {
   // Without removing each from the list: nothing looks names up any more, and the index goes as a
   // whole.
   for (int32_t n = doc->sections.count(); n >= 1; --n) {
-    IniDisposeSection(static_cast<IniSection*>(sections[n - 1]));
+    auto* section = static_cast<IniSection*>(sections[n - 1]);
+    // Most sections of a file are never changed, and their items are not touched for the last time.
+    if (!section->isAllInArena()) IniDisposeSection(section);
   }
   doc->sections.keepFirst(0);
   // Last: the records that lie there were disposed of above.

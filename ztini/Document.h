@@ -71,7 +71,15 @@ struct IniSection : ztini::NameNode {
   uint32_t renderedSize = 0;
 
   // For each change of a name, an item or a value.
-  void markChanged() { renderedSize = 0; }
+  void markChanged() {
+    renderedSize = 0;
+    valueInArena = 0;
+  }
+
+  // Whether it may go without being disposed of: all that it has lies in the arena.
+  bool isAllInArena() const {
+    return nameInArena && valueInArena && recordInArena && items.ownsNoBlock();
+  }
 };
 
 struct IniStructForwardReferenceTag {

@@ -120,6 +120,18 @@ TEST(Hostile, RecordsOfAFileTakeFewBytesAndFewBlocks) {
   }
 }
 
+// A text that is read as a whole is the document's, and few blocks beside it.
+TEST(Hostile, ATextIsReadIntoAHandfulOfBlocks) {
+  constexpr int kRecords = 100000;
+  const std::string text = Repeat(
+      kRecords, [](int i) { return "[" + std::to_string(i) + "]\na=\"1\"\nb=\"2\"\nc=3\n"; });
+  Document doc = NewDocument();
+  ztini::test::CountAllocations count;
+  EXPECT_EQ(IniReadBytes(doc.get(), text.data(), text.size()), 0);
+  EXPECT_LT(static_cast<double>(count.bytes() - text.size()) / kRecords, 240);
+  EXPECT_LT(count.blocks(), 40u);
+}
+
 TEST(Hostile, ManyPutsAndRemovalsFromEitherEnd) {
   Deadline deadline;
   constexpr int kCount = 200000;

@@ -61,7 +61,10 @@ bool SectionJoin::run() {
     m_items[kept++] = m_items[next];
     next = end;
   }
-  if (changed) m_section->items.keepFirst(kept);
+  if (changed) {
+    m_section->items.keepFirst(kept);
+    m_section->markChanged();
+  }
   return good;
 }
 

@@ -60,11 +60,14 @@ bool Grow(ztini_List list, uint32_t needed) {
   // On 32 bits, where a count that fits may still be too many bytes.
   if (capacity > SIZE_MAX / list->itemSize) return false;
   const size_t bytes = static_cast<size_t>(capacity) * list->itemSize;
-  void* block = ztini::Reallocate(list->capacity ? list->block : nullptr, bytes);
+  const bool ownsBlock = list->capacity && !list->blockIsLent;
+  void* block = ztini::Reallocate(ownsBlock ? list->block : nullptr, bytes);
   if (!block) return false;
   // Before `block` is set, which lies over the one item.
-  if (!list->capacity && list->count) memcpy(block, list->only, list->itemSize);
+  if (!ownsBlock && list->count)
+    memcpy(block, Place(list, 0), size_t(list->count) * list->itemSize);
   list->block = static_cast<char*>(block);
+  list->blockIsLent = 0;
   list->capacity = static_cast<uint32_t>(capacity);
   return true;
 }
@@ -86,9 +89,17 @@ void ztini_ListDispose(ztini_List list) {
 
 void ztini_ListClear(ztini_List list) {
   if (!list) return;
-  if (list->capacity) free(list->block);
+  if (list->capacity && !list->blockIsLent) free(list->block);
   list->block = nullptr;
+  list->blockIsLent = 0;
   list->capacity = list->first = list->count = 0;
+}
+
+void ztini_ListLend(ztini_List list, void* block, uint32_t count) {
+  ztini_ListClear(list);
+  list->block = static_cast<char*>(block);
+  list->blockIsLent = 1;
+  list->capacity = list->count = count;
 }
 
 int32_t ztini_ListNumItems(const ztini_ListRecord* list) {

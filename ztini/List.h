@@ -19,7 +19,9 @@ struct ztini_ListRecord {
     char* block = nullptr;
     char only[sizeof(char*)];  // the one item of a list without a block
   };
-  uint32_t itemSize = 0;
+  uint32_t itemSize : 31 = 0;
+  uint32_t blockIsLent : 1 =
+      0;  // the block belongs to another owner; a larger one will be the list's
   uint32_t capacity = 0;
   uint32_t first = 0;  // place of item 1 in the block
   uint32_t count = 0;
@@ -32,6 +34,10 @@ using ztini_ListCompareFunction = int (*)(const void* left, const void* right);
 // An empty list; null when memory runs out or the size is 0. Free with ztini_ListDispose.
 ztini_List ztini_ListNew(uint32_t itemSize);
 void ztini_ListDispose(ztini_List list);
+
+// Fills an empty list with `count` items, at least one, in a block that outlives the list and stays
+// the caller's. The list changes the block as its own, and leaves it when it grows.
+void ztini_ListLend(ztini_List list, void* block, uint32_t count);
 
 // Frees the items of a record that its owner holds by value; it is empty afterwards.
 void ztini_ListClear(ztini_List list);

@@ -205,4 +205,30 @@ TEST(List, MixedUseAgreesWithAVector) {
   EXPECT_EQ(Items(list), model);
 }
 
+TEST(List, ALentBlockIsChangedInPlaceAndLeftWhenTheListGrows) {
+  int32_t block[] = {1, 2, 3};
+  Owned list(ztini_ListNew(sizeof block[0]));
+  ztini_ListLend(list.get(), block, 3);
+  EXPECT_EQ(Items(list), (Ints{1, 2, 3}));
+  const int32_t nine = 9;
+  ztini_ListRemoveItem(list.get(), nullptr, 1);
+  EXPECT_EQ(ztini_ListInsertItem(list.get(), &nine, 2), 1);
+  EXPECT_EQ(Items(list), (Ints{2, 9, 3}));
+  EXPECT_EQ(block[1], 9);
+  {
+    FailFromAllocation fail(1);
+    EXPECT_EQ(ztini_ListInsertItem(list.get(), &nine, -1), 0);
+  }
+  EXPECT_EQ(Items(list), (Ints{2, 9, 3}));
+  EXPECT_EQ(ztini_ListInsertItem(list.get(), &nine, -1), 1);
+  block[0] = block[1] = block[2] = 0;
+  EXPECT_EQ(Items(list), (Ints{9, 2, 9, 3}));
+  // Freed by the list are its own blocks only: others are no malloc blocks.
+  ztini_ListLend(list.get(), block, 3);
+  ztini_ListClear(list.get());
+  EXPECT_EQ(ztini_ListNumItems(list.get()), 0);
+  ztini_ListLend(list.get(), block, 2);
+  EXPECT_EQ(Items(list), (Ints{0, 0}));
+}
+
 }  // namespace

@@ -15,8 +15,8 @@ struct NameNode {
   // Of the index: the node's record among equal names, 0 while it is the only one. A field of bits,
   // so that it shares a word with what the owner of the node has to know.
   uint32_t twin : 29 = 0;
-  uint32_t nameInArena : 1 = 0;    // else a malloc block of the record
-  uint32_t valueInArena : 1 = 0;   // the same of an item's value
+  uint32_t nameInArena : 1 = 0;   // else a malloc block of the record
+  uint32_t valueInArena : 1 = 0;  // the same of an item's value, or all that a section's items have
   uint32_t recordInArena : 1 = 0;  // the same of the record itself
 };
 

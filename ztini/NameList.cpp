@@ -88,7 +88,7 @@ NameList::Way NameList::wayToFind(FoldState fold) {
 
 bool NameList::build() {
   m_index = New<NameIndex>();
-  bool good = m_index && m_index->create(*m_fold, m_list.count);
+  bool good = m_index && m_index->create(*m_fold, m_list.capacity);
   NameNode** all = nodes();
   for (uint32_t i = 0; good && i < m_list.count; ++i) {
     good = m_index->insert(*m_fold, inOrder(), all[i]);
@@ -129,6 +129,11 @@ void NameList::appendAnywhere(NameNode* node, NameHash hash) {
   // Out of memory is no failure here: the record is in the list, and the index is built again when
   // it is needed.
   if (!indexIsCurrent() || !m_index->insert(*m_fold, inOrder(), node, hash)) dropIndex();
+}
+
+void NameList::lend(NameNode** nodes, uint32_t count) {
+  for (uint32_t i = 0; i < count; ++i) nodes[i]->sequence = i;
+  ztini_ListLend(&m_list, nodes, count);
 }
 
 void NameList::remove(NameNode* node) {

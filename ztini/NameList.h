@@ -68,6 +68,12 @@ class NameList {
     ++m_list.count;
   }
 
+  // The records of an empty list, as an array that outlives the list and stays the caller's.
+  void lend(NameNode** nodes, uint32_t count);
+
+  // Whether nothing is lost with an object that is not destroyed.
+  bool ownsNoBlock() const { return !m_index && (!m_list.capacity || m_list.blockIsLent); }
+
   // Takes a record of the list out; it is the caller's afterwards.
   void remove(NameNode* node);
 

@@ -177,4 +177,33 @@ TEST_F(NameListTest, RecordsAreNumberedAgainWhenTheNumbersRunOut) {
   EXPECT_EQ(list.positionOf(all[59]), 58);
 }
 
+TEST_F(NameListTest, LentRecordsAreInOrderAndAnswerAsAppendedOnes) {
+  NameNode nodes[3] = {
+      {.name = ztini_StrDup("a")}, {.name = ztini_StrDup("b")}, {.name = ztini_StrDup("c")}};
+  NameNode* lent[] = {&nodes[0], &nodes[1], &nodes[2]};
+  EXPECT_TRUE(list.ownsNoBlock());
+  list.lend(lent, 3);
+  EXPECT_TRUE(list.ownsNoBlock());
+  EXPECT_EQ(find("B"), &nodes[1]);
+  EXPECT_EQ(list.positionOf(&nodes[2]), 3);
+  list.remove(&nodes[0]);
+  EXPECT_EQ(list.positionOf(&nodes[2]), 2);
+  EXPECT_EQ(list.positionOf(add("d")), 3);
+  EXPECT_TRUE(list.ownsNoBlock());
+  EXPECT_EQ(list.positionOf(add("e")), 4);
+  EXPECT_FALSE(list.ownsNoBlock());
+  EXPECT_EQ(find("c"), &nodes[2]);
+  for (NameNode& node : nodes) free(node.name);
+}
+
+TEST_F(NameListTest, AnIndexIsABlock) {
+  for (int i = 0; i < 20; ++i) add("n" + std::to_string(i));
+  std::vector<NameNode*> lent(list.nodes(), list.nodes() + list.count());
+  NameList other(&fold);
+  other.lend(lent.data(), static_cast<uint32_t>(lent.size()));
+  EXPECT_TRUE(other.ownsNoBlock());
+  EXPECT_EQ(other.find("n7", NameMatch::IgnoreCase), lent[7]);
+  EXPECT_FALSE(other.ownsNoBlock());
+}
+
 }  // namespace

@@ -6,6 +6,11 @@
 // A repeated name updates the first one, so that every item asks whether its section has one of its
 // name. Most do not, and ItemKeys answers most of these questions from a word made of the name's
 // ends.
+//
+// Where the document owns the text, one block takes all records, its size guessed from the first
+// lines. The C library keeps such a block, or as much, for the next document; many blocks in a row
+// it gave back to the system, which has to clear each page again. The list of a section's items is
+// made in that block as well, when the section ends.
 #include "ztini/Parser.h"
 
 #include <algorithm>
@@ -35,6 +40,7 @@ constexpr int32_t kMostExpected = 16;
 class ItemKeys {
  public:
   using Key = uint64_t;
+  static constexpr int kMost = 16;
 
   // Equal for names that are equal; of a trimmed name that is not empty.
   static Key Of(const NameFold& fold, const char* begin, const char* end) {
@@ -71,7 +77,6 @@ class ItemKeys {
   }
 
  private:
-  static constexpr int kMost = 16;
   static constexpr Key kWithoutCase = 0xdfdfdfdfdfdfdfdfu;
   static constexpr Key kOddFactor = 0x9e3779b97f4a7c15u;
 
@@ -93,8 +98,8 @@ class DocumentBuilder {
   // kIniOutOfMemory.
   int32_t takeLine(char* begin, char* end, int32_t line);
 
-  // After the last line.
-  int32_t finish();
+  // After the last line, or the first status that is not 0.
+  int32_t finish(int32_t status);
 
  private:
   int32_t takeHeader(char* begin, char* end, int32_t line);
@@ -104,6 +109,8 @@ class DocumentBuilder {
   int32_t appendEntry(char* name, char* nameEnd, char* value, char* valueEnd, int32_t line);
   int32_t openSection(char* name, char* nameEnd, int32_t line, ztini::NameHash hash = {});
   int32_t openNullSection();
+  int32_t gather(IniEntry* entry);
+  void endGathering();
   int32_t badLine(int32_t line);
   char* keep(char* begin, char* end);
   bool has(IniReadOption option) const { return (m_doc->readOptions & option) != 0; }
@@ -116,6 +123,11 @@ class DocumentBuilder {
   IniSection* m_section = nullptr;
   int32_t m_itemsExpected = 1;  // besides the first
   ItemKeys m_keys;              // of m_section
+  // Items of m_section that are not in its list yet, which is empty then. The arena has space
+  // for the list.
+  ztini::NameNode* m_gathered[ItemKeys::kMost];
+  uint32_t m_gatheredCount = 0;
+  bool m_gathers = false;
   bool m_hasPieces = false;
   bool m_hasNullSection = false;
 };
@@ -152,6 +164,7 @@ int32_t DocumentBuilder::takeHeader(char* begin, char* end, int32_t line) {
   if (!bracket) return badLine(line);
   char* nameEnd = cutTrailingWhite(name, bracket);
   if (nameEnd == name) return badLine(line);
+  endGathering();
   IniSection* known = nullptr;
   ztini::NameHash hash;
   if (m_doc->duplicateChecking && IniSeekSection(m_doc, name, &known, FoldState::Fresh, &hash) < 0)
@@ -174,6 +187,7 @@ int32_t DocumentBuilder::openSection(char* name, char* nameEnd, int32_t line,
   if (m_section) m_itemsExpected = std::clamp(m_section->items.count() - 1, 1, kMostExpected);
   m_section = section;
   m_keys.start(0);
+  m_gathers = m_life == TextLife::Document;
   return 0;
 }
 
@@ -210,9 +224,9 @@ int32_t DocumentBuilder::store(char* name, char* nameEnd, char* value, char* val
   }
   const ItemKeys::Key key = ItemKeys::Of(m_doc->fold, name, nameEnd);
   IniEntry* known = nullptr;
-  if (m_doc->duplicateChecking && m_keys.mayHave(key) &&
-      IniSeekEntry(m_doc, m_section, name, &known, FoldState::Fresh) < 0) {
-    return kIniOutOfMemory;
+  if (m_doc->duplicateChecking && m_keys.mayHave(key)) {
+    endGathering();
+    if (IniSeekEntry(m_doc, m_section, name, &known, FoldState::Fresh) < 0) return kIniOutOfMemory;
   }
   if (known) return replace(known, value, line);
   m_keys.add(key);
@@ -226,6 +240,7 @@ int32_t DocumentBuilder::replace(IniEntry* entry, const char* value, int32_t lin
   IniReplaceValue(entry, copy);
   IniNewEntryHandleQuotes(entry, m_doc->readOptions);
   entry->line = line;
+  m_section->markChanged();
   return 0;
 }
 
@@ -234,13 +249,39 @@ int32_t DocumentBuilder::appendEntry(char* name, char* nameEnd, char* value, cha
   char* keptName = keep(name, nameEnd);
   char* keptValue = keptName ? keep(value, valueEnd) : nullptr;
   if (!keptValue) return kIniOutOfMemory;
+  const size_t listBytes = m_gathers ? (m_gatheredCount + 1) * sizeof *m_gathered : 0;
+  if (!m_doc->arena.reserve(sizeof(IniEntry) + listBytes)) return kIniOutOfMemory;
   IniEntry* entry = IniReadEntry(m_doc, keptName, static_cast<size_t>(nameEnd - name), keptValue,
                                  static_cast<size_t>(valueEnd - value));
   if (!entry) return kIniOutOfMemory;
   entry->line = line;
+  if (m_gathers) return gather(entry);
   // As many as the section before has; without memory the append tries again.
   if (m_section->items.count() == 1) m_section->items.reserve(m_itemsExpected);
   return IniAppendEntry(m_section, entry) ? 0 : kIniOutOfMemory;
+}
+
+int32_t DocumentBuilder::gather(IniEntry* entry) {
+  m_gathered[m_gatheredCount++] = entry;
+  if (m_gatheredCount == ItemKeys::kMost) endGathering();
+  return 0;
+}
+
+// Makes the list of the section's items. Later ones are added to it one by one.
+void DocumentBuilder::endGathering() {
+  if (!m_gathers) return;
+  m_gathers = false;
+  ztini::NameList& items = m_section->items;
+  if (m_gatheredCount == 1) {
+    items.append(m_gathered[0]);
+  } else if (m_gatheredCount > 1) {
+    const size_t bytes = m_gatheredCount * sizeof *m_gathered;
+    void* list = m_doc->arena.record(bytes);
+    memcpy(list, m_gathered, bytes);
+    items.lend(static_cast<ztini::NameNode**>(list), m_gatheredCount);
+  }
+  m_section->valueInArena = 1;
+  m_gatheredCount = 0;
 }
 
 char* DocumentBuilder::keep(char* begin, char* end) {
@@ -248,8 +289,10 @@ char* DocumentBuilder::keep(char* begin, char* end) {
                                       : m_doc->arena.text(begin, static_cast<size_t>(end - begin));
 }
 
-int32_t DocumentBuilder::finish() {
-  const int32_t status = m_hasPieces ? IniJoinPieces(m_doc) : 0;
+int32_t DocumentBuilder::finish(int32_t status) {
+  endGathering();
+  if (status < 0) return status;
+  if (m_hasPieces) status = IniJoinPieces(m_doc);
   m_doc->settled = status == 0 && !m_hasPieces && !m_hasNullSection && m_doc->duplicateChecking &&
                    !has(kIniReadColons);
   // Names that were cut under one locale may be equal, or have white space, under another.
@@ -264,6 +307,30 @@ void StartRead(IniStructForwardReferenceTag* doc) {
   doc->fold.refresh();
 }
 
+// Asks for the memory of the document's records at once, guessed from the text's first lines.
+// Without memory for it, and for what was not guessed, reading asks piece by piece.
+void ExpectRecords(IniStructForwardReferenceTag* doc, const char* begin, const char* end) {
+  constexpr double kMostBytes = 2;  // for one of the text: a file of empty lines needs nothing
+  const auto size = end - begin;
+  const char* sampleEnd = begin + std::min(size, ptrdiff_t(4096));
+  size_t headers = 0, items = 0;
+  for (const char* at = begin; at < sampleEnd;) {
+    ++(*at == '[' ? headers : items);
+    const void* lineEnd = memchr(at, '\n', static_cast<size_t>(sampleEnd - at));
+    at = lineEnd ? static_cast<const char*>(lineEnd) + 1 : sampleEnd;
+  }
+  const size_t bytes =
+      headers * sizeof(IniSection) + items * (sizeof(IniEntry) + sizeof(IniEntry*));
+  if (!bytes) return;
+  double times = 1;
+  if (sampleEnd < end) {
+    times = std::min(double(size) / double(sampleEnd - begin),
+                     kMostBytes * double(size) / double(bytes));
+  }
+  doc->arena.expect(static_cast<size_t>(times * double(bytes)) & ~(alignof(IniSection) - 1));
+  doc->sections.reserve(static_cast<uint32_t>(times * double(headers)));
+}
+
 }  // namespace
 
 int32_t ztini::IniReadText(IniStructForwardReferenceTag* doc, OwnedText text, size_t begin,
@@ -271,13 +338,14 @@ int32_t ztini::IniReadText(IniStructForwardReferenceTag* doc, OwnedText text, si
   StartRead(doc);
   doc->text = std::move(text);
   char* bytes = doc->text.get();
+  ExpectRecords(doc, bytes + begin, bytes + end);
   TextLines lines(bytes + begin, bytes + end);
   DocumentBuilder builder(doc, TextLife::Document);
   while (lines.next()) {
     const int32_t status = builder.takeLine(lines.begin(), lines.end(), lines.lineNumber());
-    if (status < 0) return status;
+    if (status < 0) return builder.finish(status);
   }
-  return builder.finish();
+  return builder.finish(0);
 }
 
 int32_t IniRead(IniStructForwardReferenceTag* doc, IniLineInputFunction input, void* context) {
@@ -292,7 +360,7 @@ int32_t IniRead(IniStructForwardReferenceTag* doc, IniLineInputFunction input, v
     if (status >= 0 && line.complete()) {
       status = builder.takeLine(line.text(), line.text() + strlen(line.text()), line.lineNumber());
     }
-    if (status < 0) return status;
+    if (status < 0) return builder.finish(status);
   } while (!line.atEnd());
-  return builder.finish();
+  return builder.finish(0);
 }

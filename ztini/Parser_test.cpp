@@ -270,6 +270,46 @@ TEST(Parser, EveryFailedAllocationIsOutOfMemoryWithAUsableDocument) {
   EXPECT_LT(number, 1000);
 }
 
+// The same of a text as a whole. Memory that is asked for in advance may be refused: then it is asked
+// for piece by piece. What was read is there after a failure, and can be changed.
+TEST(Parser, EveryFailedAllocationOfATextLeavesWhatWasRead) {
+  std::string text = "[first]\nx=1\nx=2\ny=1\n";
+  for (int i = 0; i < 40; ++i) text += "[c" + std::to_string(i) + "]\nx=1\ny=2\nz=3\nz=4\nu=5\n";
+  text += "[long]\n";
+  for (int i = 0; i < 40; ++i) text += "i" + std::to_string(i) + "=1\n";
+  int failures = 0;
+  for (int number = 1; number < 1000; ++number) {
+    Document doc = NewDocument();
+    int32_t status;
+    bool failed;
+    {
+      FailFromAllocation fail(number);
+      status = IniReadBytes(doc.get(), text.data(), text.size());
+      failed = fail.failed();
+    }
+    if (status == 0) {
+      EXPECT_FALSE(failed);
+      EXPECT_EQ(RawValue(doc, "long", "I39"), "1");
+      EXPECT_EQ(RawValue(doc, "c39", "z"), "4");
+      EXPECT_GT(failures, 40);
+      return;
+    }
+    ++failures;
+    EXPECT_EQ(status, kIniOutOfMemory) << number;
+    const int32_t sections = IniNumberOfSections(doc.get());
+    // Of a section that ended before, all items are there.
+    for (int32_t s = 2; s < sections && s < 42; ++s) {
+      EXPECT_EQ(doc->section(s)->items.count(), 4) << number;
+    }
+    EXPECT_EQ(IniPut(doc.get(), "c0", "new", "2", 0), 1) << number;
+    EXPECT_EQ(RawValue(doc, "c0", "new"), "2") << number;
+    if (sections > 1) {
+      EXPECT_EQ(RawValue(doc, "c0", "x"), "1") << number;
+    }
+  }
+  FAIL() << "never succeeded";
+}
+
 // A document made of many names, as two sections that a reader must look through.
 std::string ManyNames(int number) {
   std::string text;
