@@ -20,35 +20,33 @@ using Doc = IniStructForwardReferenceTag;
 // which are compared before the whole.
 class WantedName {
  public:
+  // The fold is fresh.
   WantedName(const ztini::NameFold& fold, const char* name)
-      : m_fold(fold), m_name(name), m_begin(ztini::SkipSpace(fold, name)) {
-    m_length = strlen(m_begin);
-    while (m_length > 0 && fold.isSpace(m_begin[m_length - 1])) --m_length;
+      : m_fold(fold), m_name(name), m_trimmed(ztini::Trimmed(fold, name)) {
+    if (m_trimmed.length) m_last = fold.upper(m_trimmed.begin[m_trimmed.length - 1]);
   }
 
-  bool is(const IniEntry* entry) const {
-    if (differsAtAGlance(entry)) return false;
-    if (m_length != 0 && entry->knownNameLength == m_length &&
-        memcmp(entry->name, m_begin, m_length) == 0)
-      return true;
-    return ztini::CompareNames(m_fold, entry->name, m_name) == 0;
+  ztini::NameHash hash() const { return {m_fold, m_trimmed}; }
+
+  // Whether it is this name, of this length; 0 where that is unknown.
+  bool is(const char* name, size_t length) const {
+    if (length && length == m_trimmed.length) {
+      if (m_fold.upper(name[length - 1]) != m_last) return false;
+      if (memcmp(name, m_trimmed.begin, length) == 0) return true;
+    } else if (length && m_trimmed.length && !m_fold.isSpace(*name) &&
+               !m_fold.isSpace(name[length - 1])) {
+      // Stored names have no white space around them, but for what another locale has seen as
+      // letters.
+      return false;
+    }
+    return ztini::CompareNames(m_fold, name, m_name) == 0;
   }
 
  private:
-  // Of a name with white space at its ends, which another locale may have seen as letters, nothing
-  // is said.
-  bool differsAtAGlance(const IniEntry* entry) const {
-    const size_t length = entry->knownNameLength;
-    if (length == 0 || m_length == 0) return false;
-    const char last = entry->name[length - 1];
-    if (m_fold.isSpace(*entry->name) || m_fold.isSpace(last)) return false;
-    return length != m_length || m_fold.upper(last) != m_fold.upper(m_begin[m_length - 1]);
-  }
-
   const ztini::NameFold& m_fold;
   const char* m_name;
-  const char* m_begin;  // without the white space around it
-  size_t m_length;
+  ztini::TrimmedName m_trimmed;
+  unsigned char m_last = 0;
 };
 
 // The fold is fresh.
@@ -60,7 +58,7 @@ IniEntry* FindInSection(Doc* doc, IniSection* section, const char* item) {
   ztini::NameNode** node = section->items.nodes();
   for (ztini::NameNode** end = node + section->items.count(); node < end; ++node) {
     auto* entry = static_cast<IniEntry*>(*node);
-    if (wanted.is(entry)) return entry;
+    if (wanted.is(entry->name, entry->knownNameLength)) return entry;
   }
   return nullptr;
 }
@@ -75,25 +73,15 @@ IniEntry* NthItem(Doc* doc, const char* section, int32_t n) {
   return found ? found->item(n) : nullptr;
 }
 
-// True only for names that are different. Names with white space around them are left to the whole
-// comparison.
-bool DifferAtTheirEnds(const ztini::NameFold& fold, const char* a, const char* b) {
-  const size_t aLength = strlen(a), bLength = strlen(b);
-  if (!aLength || !bLength) return false;
-  const char aLast = a[aLength - 1], bLast = b[bLength - 1];
-  for (char end : {*a, aLast, *b, bLast}) {
-    if (fold.isSpace(end)) return false;
-  }
-  return aLength != bLength || fold.upper(aLast) != fold.upper(bLast);
+// Byte by byte, white space included, as names are stored without any.
+bool IsCurrentExactly(const Doc* doc, const char* name) {
+  return doc->currentSection && strcmp(doc->currentSection->name, name) == 0;
 }
 
-// The fold is fresh.
-bool IsCurrent(Doc* doc, const char* name) {
-  if (!doc->currentSection) return false;
-  // Byte by byte, white space included, as names are stored without any.
-  if (strcmp(doc->currentSection->name, name) == 0) return true;
-  return !doc->caseSensitive && !DifferAtTheirEnds(doc->fold, doc->currentSection->name, name) &&
-         ztini::CompareNames(doc->fold, doc->currentSection->name, name) == 0;
+// By the engine's rule.
+bool IsCurrent(const Doc* doc, const WantedName& wanted) {
+  const IniSection* current = doc->currentSection;
+  return current && !doc->caseSensitive && wanted.is(current->name, strlen(current->name));
 }
 
 int32_t Give(const char* text, const char** out) {
@@ -106,8 +94,11 @@ int32_t Give(const char* text, const char** out) {
 IniSection* IniFindSection(Doc* doc, const char* section) {
   if (!doc || !section) return nullptr;
   doc->fold.refresh();
-  if (IsCurrent(doc, section)) return doc->currentSection;
-  ztini::NameNode* found = doc->sections.find(section, doc->match(), ztini::FoldState::Fresh);
+  if (IsCurrentExactly(doc, section)) return doc->currentSection;
+  const WantedName wanted(doc->fold, section);
+  if (IsCurrent(doc, wanted)) return doc->currentSection;
+  const auto hash = doc->sections.isScanned() ? ztini::NameHash() : wanted.hash();
+  ztini::NameNode* found = doc->sections.find(section, doc->match(), ztini::FoldState::Fresh, hash);
   // A section that is not there changes nothing: the next question is likely to be about the same
   // one as before.
   if (found) doc->currentSection = static_cast<IniSection*>(found);
@@ -119,7 +110,7 @@ int32_t IniSeekSection(Doc* doc, const char* name, IniSection** found, ztini::Fo
   *found = nullptr;
   if (fold == ztini::FoldState::Unknown) doc->fold.refresh();
   ztini::NameNode* node = nullptr;
-  if (IsCurrent(doc, name)) {
+  if (IsCurrentExactly(doc, name) || IsCurrent(doc, WantedName(doc->fold, name))) {
     node = doc->currentSection;
   } else if (!doc->sections.seek(name, doc->match(), &node, ztini::FoldState::Fresh, hash)) {
     return kIniOutOfMemory;

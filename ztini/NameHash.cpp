@@ -1,6 +1,6 @@
-// SipHash-1-3 over the folded and trimmed name: one round for each word of eight bytes, three at
-// the end. The four constants are those of the algorithm. The characters are folded as they go in,
-// a word at a time: a folded copy would take memory, which look-up must not need.
+// Words of eight characters, folded as they go in: a folded copy would take memory, which look-up
+// must not need. Each is mixed into the hash by a multiplication with the secret key, whose product
+// is folded so that its high bits, which depend on all of the word, reach the low ones.
 #include "ztini/NameHash.h"
 
 #include <pthread.h>
@@ -31,49 +31,18 @@ Key DrawKey() noexcept {
     key.low = static_cast<uint64_t>(std::chrono::steady_clock::now().time_since_epoch().count());
     key.high = reinterpret_cast<uintptr_t>(&key);
   }
+  key.high |= 1;  // a factor
   return key;
 }
 
-struct Range {
-  const char* begin;
-  const char* end;
-};
-
-Range Trimmed(const NameFold& fold, const char* name) {
-  name = SkipSpace(fold, name);
-  const char* end = name + strlen(name);
-  while (end > name && fold.isSpace(end[-1])) --end;
-  return {name, end};
+// The upper half of the product of two words and its lower half, one over the other. From products
+// of 32 bits each: not every platform has larger ones.
+uint64_t MultiplyFold(uint64_t a, uint64_t b) {
+  const uint64_t aLow = a & UINT32_MAX, aHigh = a >> 32, bLow = b & UINT32_MAX, bHigh = b >> 32;
+  const uint64_t low = aLow * bLow, middle = aHigh * bLow + (low >> 32);
+  const uint64_t other = aLow * bHigh + (middle & UINT32_MAX);
+  return (aHigh * bHigh + (middle >> 32) + (other >> 32)) ^ (other << 32 | (low & UINT32_MAX));
 }
-
-uint64_t Rotate(uint64_t word, int bits) { return (word << bits) | (word >> (64 - bits)); }
-
-struct SipState {
-  uint64_t v0, v1, v2, v3;
-
-  explicit SipState(const Key& key)
-      : v0(key.low ^ 0x736f6d6570736575u),
-        v1(key.high ^ 0x646f72616e646f6du),
-        v2(key.low ^ 0x6c7967656e657261u),
-        v3(key.high ^ 0x7465646279746573u) {}
-
-  void round() {
-    v0 += v1, v1 = Rotate(v1, 13) ^ v0, v0 = Rotate(v0, 32);
-    v2 += v3, v3 = Rotate(v3, 16) ^ v2;
-    v0 += v3, v3 = Rotate(v3, 21) ^ v0;
-    v2 += v1, v1 = Rotate(v1, 17) ^ v2, v2 = Rotate(v2, 32);
-  }
-  void take(uint64_t word) {
-    v3 ^= word;
-    round();
-    v0 ^= word;
-  }
-  uint64_t finish() {
-    v2 ^= 0xff;
-    for (int i = 0; i < 3; ++i) round();
-    return v0 ^ v1 ^ v2 ^ v3;
-  }
-};
 
 // Eight characters of which those from a to z become A to Z. Each byte is compared on its own:
 // without its top bit, no sum carries into the next.
@@ -84,20 +53,37 @@ uint64_t UpperAscii(uint64_t word) {
   return word ^ ((fromA & ~pastZ & ~word & kTops) >> 2);
 }
 
+// So many bytes, fewer than eight, the first one in the lowest byte. By two words, which may
+// overlap: a copy of a size that the compiler does not know is a call.
+uint64_t ShortWord(const char* text, size_t length) {
+  if (length >= 4) {
+    uint32_t first, last;
+    memcpy(&first, text, sizeof first);
+    memcpy(&last, text + length - sizeof last, sizeof last);
+    return first | static_cast<uint64_t>(last) << 8 * (length - sizeof last);
+  }
+  uint64_t word = 0;
+  for (size_t i = 0; i < length; ++i) {
+    word |= static_cast<uint64_t>(static_cast<unsigned char>(text[i])) << 8 * i;
+  }
+  return word;
+}
+
 // Up to eight characters, folded, the first one in the lowest byte.
 uint64_t FoldedWord(const NameFold& fold, const char* text, size_t length) {
   uint64_t word = 0;
   if (fold.foldsAsciiOnly() && std::endian::native == std::endian::little) {
-    memcpy(&word, text, length);
+    if (length < sizeof word) return UpperAscii(ShortWord(text, length));
+    memcpy(&word, text, sizeof word);
     return UpperAscii(word);
   }
   for (size_t i = 0; i < length; ++i) word |= static_cast<uint64_t>(fold.upper(text[i])) << 8 * i;
   return word;
 }
 
-// One key for the process: an index may outlive the call that made it, and is asked by any later one.
-// No static of a function: a child that is forked while another thread makes one waits for that thread,
-// which it does not have. pthread_once makes the key again there.
+// One key for the process: an index may outlive the call that made it, and is asked by any later
+// one. No static of a function: a child that is forked while another thread makes one waits for
+// that thread, which it does not have. pthread_once makes the key again there.
 const Key& ProcessKey() {
   static pthread_once_t once = PTHREAD_ONCE_INIT;
   static constinit Key key = {};
@@ -107,23 +93,31 @@ const Key& ProcessKey() {
 
 }  // namespace
 
-uint64_t HashName(const NameFold& fold, const char* name) {
-  const Range range = Trimmed(fold, name);
-  const size_t length = static_cast<size_t>(range.end - range.begin);
-  SipState state(ProcessKey());
-  const char* at = range.begin;
-  for (size_t left = length / 8; left > 0; --left, at += 8) state.take(FoldedWord(fold, at, 8));
-  // What is left of the name, at most seven bytes, with the length in the top one.
-  state.take(FoldedWord(fold, at, length % 8) | static_cast<uint64_t>(length) << 56);
-  return state.finish();
+TrimmedName Trimmed(const NameFold& fold, const char* name) {
+  name = SkipSpace(fold, name);
+  size_t length = strlen(name);
+  while (length > 0 && fold.isSpace(name[length - 1])) --length;
+  return {name, length};
+}
+
+uint64_t HashName(const NameFold& fold, TrimmedName name) {
+  const Key& key = ProcessKey();
+  uint64_t hash = key.low ^ name.length;
+  const char* at = name.begin;
+  size_t left = name.length;
+  for (; left > 8; left -= 8, at += 8)
+    hash = MultiplyFold(hash ^ FoldedWord(fold, at, 8), key.high);
+  hash = MultiplyFold(hash ^ FoldedWord(fold, at, left), key.high);
+  // Once more: of words that differ in few bits, the products are as far apart as the words.
+  return MultiplyFold(hash ^ key.low, key.high);
 }
 
 bool SameFoldedName(const NameFold& fold, const char* left, const char* right) {
   if (strcmp(left, right) == 0) return true;
-  const Range l = Trimmed(fold, left), r = Trimmed(fold, right);
-  if (l.end - l.begin != r.end - r.begin) return false;
-  for (const char *p = l.begin, *q = r.begin; p < l.end; ++p, ++q) {
-    if (fold.upper(*p) != fold.upper(*q)) return false;
+  const TrimmedName l = Trimmed(fold, left), r = Trimmed(fold, right);
+  if (l.length != r.length) return false;
+  for (size_t i = 0; i < l.length; ++i) {
+    if (fold.upper(l.begin[i]) != fold.upper(r.begin[i])) return false;
   }
   return true;
 }

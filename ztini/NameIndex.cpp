@@ -10,7 +10,6 @@
 #include <cstring>
 
 #include "ztini/Alloc.h"
-#include "ztini/NameHash.h"
 
 namespace ztini {
 namespace {
@@ -20,7 +19,7 @@ constexpr uint32_t kFirstTwins = 8;
 constexpr uint32_t kMostTwins = (uint32_t(1) << 29) - 1;  // NameNode::twin
 
 uint32_t ShortHash(const NameFold& fold, const char* name) {
-  return static_cast<uint32_t>(HashName(fold, name));
+  return static_cast<uint32_t>(HashName(fold, Trimmed(fold, name)));
 }
 
 uint32_t ShortHash(const NameFold& fold, const char* name, NameHash known) {
@@ -29,8 +28,8 @@ uint32_t ShortHash(const NameFold& fold, const char* name, NameHash known) {
 
 }  // namespace
 
-NameHash::NameHash(const NameFold& fold, const char* name)
-    : value(ShortHash(fold, name)), isKnown(true) {}
+NameHash::NameHash(const NameFold& fold, TrimmedName name)
+    : value(static_cast<uint32_t>(HashName(fold, name))), isKnown(true) {}
 
 // Its place is `last` or before.
 uint32_t NodesInOrder::search(uint32_t sequence, uint32_t last) const {

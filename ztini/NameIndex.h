@@ -4,6 +4,7 @@
 #include <cstdint>
 
 #include "ztini/NameFold.h"
+#include "ztini/NameHash.h"
 
 namespace ztini {
 
@@ -46,7 +47,7 @@ struct NodesInOrder {
 // once.
 struct NameHash {
   NameHash() = default;
-  NameHash(const NameFold& fold, const char* name);
+  NameHash(const NameFold& fold, TrimmedName name);
 
   uint32_t value = 0;
   bool isKnown = false;

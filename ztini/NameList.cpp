@@ -37,10 +37,9 @@ NameNode** NameList::nodes() const {
   return static_cast<NameNode**>(ztini_ListItem(&m_list, -1));
 }
 
-NameNode* NameList::find(const char* name, NameMatch match, FoldState fold) {
+NameNode* NameList::find(const char* name, NameMatch match, FoldState fold, NameHash hash) {
   if (!name) return nullptr;
-  return wayToFind(fold) == Way::Index ? findInIndex(name, match, NameHash(*m_fold, name))
-                                       : scan(name, match);
+  return wayToFind(fold) == Way::Index ? findInIndex(name, match, hash) : scan(name, match);
 }
 
 bool NameList::seek(const char* name, NameMatch match, NameNode** found, FoldState fold,
@@ -53,7 +52,7 @@ bool NameList::seek(const char* name, NameMatch match, NameNode** found, FoldSta
     *found = scan(name, match);
     return true;
   }
-  const NameHash computed(*m_fold, name);
+  const NameHash computed(*m_fold, Trimmed(*m_fold, name));
   if (hash) *hash = computed;
   *found = findInIndex(name, match, computed);
   return true;

@@ -39,7 +39,9 @@ class NameList {
 
   // First in order with this name, or null. Takes time linear in count() while there is no memory
   // for the index of a long list; each call tries to build it.
-  NameNode* find(const char* name, NameMatch match, FoldState fold = FoldState::Unknown);
+  // `hash`: of the name under a fresh fold, if the caller knows it.
+  NameNode* find(const char* name, NameMatch match, FoldState fold = FoldState::Unknown,
+                 NameHash hash = {});
 
   // As find(), into `found`, but never scans a long list: false, with null, without memory for its
   // index. *hash, if asked for, is set where the index was asked.
