@@ -152,14 +152,13 @@ int32_t DocumentWriter<Lines>::write() {
 template <class Lines>
 int32_t DocumentWriter<Lines>::writeSection(IniSection* section, const IniSection* previous) {
   const bool fromFile = IniSectionWasReadFromFile(section);
-  const bool isNull = IniSectionIsNull(section);
   int32_t status = 0;
   // A section that was added gets an empty line before it, so that it does not run into the file's
   // own ones.
   if (tight() && !fromFile && IniSectionWasReadFromFile(previous)) status = writeEmptyLine();
   if (status >= 0 && !m_lines.reuse(section)) status = writeHeaderAndItems(section);
   if (status < 0) return status;
-  return tight() && (fromFile || isNull) ? 0 : writeEmptyLine();
+  return tight() && (fromFile || IniSectionIsNull(section)) ? 0 : writeEmptyLine();
 }
 
 template <class Lines>
