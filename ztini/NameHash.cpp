@@ -35,14 +35,21 @@ Key DrawKey() noexcept {
   return key;
 }
 
-// The upper half of the product of two words and its lower half, one over the other. From products
-// of 32 bits each: not every platform has larger ones.
+// The upper half of the product of two words and its lower half, one over the other.
+#ifdef __SIZEOF_INT128__
+uint64_t MultiplyFold(uint64_t a, uint64_t b) {
+  __extension__ using Product = unsigned __int128;
+  const Product product = static_cast<Product>(a) * b;
+  return static_cast<uint64_t>(product >> 64) ^ static_cast<uint64_t>(product);
+}
+#else
 uint64_t MultiplyFold(uint64_t a, uint64_t b) {
   const uint64_t aLow = a & UINT32_MAX, aHigh = a >> 32, bLow = b & UINT32_MAX, bHigh = b >> 32;
   const uint64_t low = aLow * bLow, middle = aHigh * bLow + (low >> 32);
   const uint64_t other = aLow * bHigh + (middle & UINT32_MAX);
   return (aHigh * bHigh + (middle >> 32) + (other >> 32)) ^ (other << 32 | (low & UINT32_MAX));
 }
+#endif
 
 // Eight characters of which those from a to z become A to Z. Each byte is compared on its own:
 // without its top bit, no sum carries into the next.
