@@ -65,16 +65,19 @@ struct IniSection : ztini::NameNode {
   int32_t flags = 0;
   int32_t line = -1;  // of the header; -1: not from a file
 
-  // Where the header and the items are in the document's last rendering; size 0 where they have
-  // changed since, or were in none.
+  // Where the header and the first so many items are in the document's last rendering; size 0 where
+  // they have changed since, or were in none.
   uint32_t renderedAt = 0;
   uint32_t renderedSize = 0;
+  int32_t renderedItems = 0;
 
   // For each change of a name, an item or a value.
   void markChanged() {
     renderedSize = 0;
     valueInArena = 0;
   }
+  // For an item that comes last.
+  void markAppended() { valueInArena = 0; }
 
   // Whether it may go without being disposed of: all that it has lies in the arena.
   bool isAllInArena() const {
@@ -192,6 +195,6 @@ inline bool IniAppendEntry(IniSection* section, IniEntry* entry) {
     return false;
   }
   section->items.append(entry);
-  section->markChanged();
+  section->markAppended();
   return true;
 }

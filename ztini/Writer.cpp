@@ -37,8 +37,8 @@ class FunctionLines {
 };
 
 // Puts lines together in one text, as they are in a file. Sections that have not changed since the
-// rendering before are copied from there, neighbours at once: a save of a long document that
-// differs in few places costs little more than its bytes.
+// rendering before, but for items added at their end, are copied from there, neighbours at once: a
+// save of a long document that differs in few places costs little more than its bytes.
 class TextInMemory {
  public:
   TextInMemory(ztini::TextBuffer* text, std::string_view before, bool marked)
@@ -54,7 +54,7 @@ class TextInMemory {
     return m_text->ok() && m_first.ok() ? 0 : kIniOutOfMemory;
   }
 
-  // Takes the section from the rendering before, if it is there.
+  // Takes what was rendered of the section from the rendering before, if it is there.
   bool reuse(IniSection* section) {
     m_sectionAt = size();
     m_sectionIsFirst = m_isFirst;
@@ -75,6 +75,7 @@ class TextInMemory {
     const bool fits = size() <= UINT32_MAX && !m_sectionIsFirst;
     section->renderedAt = fits ? static_cast<uint32_t>(m_sectionAt) : 0;
     section->renderedSize = fits ? static_cast<uint32_t>(size() - m_sectionAt) : 0;
+    section->renderedItems = section->items.count();
   }
 
   int32_t finish() {
@@ -123,6 +124,7 @@ class DocumentWriter {
  private:
   int32_t writeSection(IniSection* section, const IniSection* previous);
   int32_t writeHeaderAndItems(IniSection* section);
+  int32_t writeItems(IniSection* section, int32_t first);
   int32_t writeHeader(const IniSection* section);
   int32_t writeEmptyLine();
   int32_t writeItem(const IniEntry* entry);
@@ -156,20 +158,30 @@ int32_t DocumentWriter<Lines>::writeSection(IniSection* section, const IniSectio
   // A section that was added gets an empty line before it, so that it does not run into the file's
   // own ones.
   if (tight() && !fromFile && IniSectionWasReadFromFile(previous)) status = writeEmptyLine();
-  if (status >= 0 && !m_lines.reuse(section)) status = writeHeaderAndItems(section);
+  if (status >= 0) status = writeHeaderAndItems(section);
   if (status < 0) return status;
   return tight() && (fromFile || IniSectionIsNull(section)) ? 0 : writeEmptyLine();
 }
 
 template <class Lines>
 int32_t DocumentWriter<Lines>::writeHeaderAndItems(IniSection* section) {
-  int32_t status = IniSectionIsNull(section) ? 0 : writeHeader(section);
-  ztini::NameNode** items = section->items.nodes();
-  for (int32_t n = 0; status >= 0 && n < section->items.count(); ++n) {
-    status = writeItem(static_cast<const IniEntry*>(items[n]));
+  if (m_lines.reuse(section)) {
+    const int32_t done = section->renderedItems;
+    return done == section->items.count() ? 0 : writeItems(section, done);
   }
-  if (status >= 0) m_lines.note(section);
-  return status;
+  const int32_t status = IniSectionIsNull(section) ? 0 : writeHeader(section);
+  return status < 0 ? status : writeItems(section, 0);
+}
+
+template <class Lines>
+int32_t DocumentWriter<Lines>::writeItems(IniSection* section, int32_t first) {
+  ztini::NameNode** items = section->items.nodes();
+  for (int32_t n = first; n < section->items.count(); ++n) {
+    const int32_t status = writeItem(static_cast<const IniEntry*>(items[n]));
+    if (status < 0) return status;
+  }
+  m_lines.note(section);
+  return 0;
 }
 
 template <class Lines>
