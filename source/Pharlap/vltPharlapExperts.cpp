@@ -57,9 +57,8 @@ HRESULT CvltPharlapRegistrar::RegisterComponent(_vltComponent2* record) {
 HRESULT CvltPharlapRegistrar::GetComponent(GUID identifier, _vltComponent2* record) {
   if (!record) return E_POINTER;
   ComponentMap::Hold map(components());
-  CvltComponent* component = nullptr;
-  if (InternalGetComponentNoScan(identifier, component) < 0) return E_INVALIDARG;
-  return Duplicate(record, &component->record());
+  auto found = map->find(identifier);
+  return found == map->end() ? E_INVALIDARG : Duplicate(record, &found->second->record());
 }
 
 HRESULT CvltPharlapRegistrar::EnumComponents(_vltComponentType type,
