@@ -163,5 +163,6 @@ void IniEmptyDocument(IniStructForwardReferenceTag* doc) {
   doc->arena.clear();
   doc->text.reset();
   doc->rendering.reset();
+  doc->wasSaved = false;
   doc->settled = false;
 }

@@ -111,8 +111,10 @@ struct IniStructForwardReferenceTag {
   bool settled = false;
   uint32_t settledFold = 0;
   // The text of the last save, from which the next one copies the sections that have not changed;
-  // empty where there was none under these write options.
+  // empty where there was none under these write options, and after the first save: most documents
+  // are saved once, if at all, and would hold a second copy of their text for nothing.
   ztini::TextBuffer rendering;
+  bool wasSaved = false;  // since it was read
 
   ztini::NameMatch match() const {
     return caseSensitive ? ztini::NameMatch::Exact : ztini::NameMatch::IgnoreCase;

@@ -29,7 +29,7 @@ int32_t IniWriteToFileAndTell(IniStructForwardReferenceTag* doc, const char* pat
   if (status < 0) return status;
   // What is too large to be read back is not settled.
   if (text.size() > static_cast<size_t>(ztini::kLargestFileBytes)) doc->settled = false;
-  doc->rendering = std::move(text);
+  if (std::exchange(doc->wasSaved, true)) doc->rendering = std::move(text);
   struct stat now;
   const bool known = stat(path, &now) == 0;
   // By the path once more: another process, or a link, may have put another file there since the

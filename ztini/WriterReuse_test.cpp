@@ -95,11 +95,27 @@ TEST(WriterReuse, ASaveThatFailedLeavesNothingToCopyFrom) {
   const std::string path = dir / "a.ini";
   Document doc = NewDocument();
   for (const char* section : {"a", "b", "c"}) IniPut(doc.get(), section, "x", "1", 0);
-  ASSERT_EQ(IniWriteToFile(doc.get(), path.c_str()), 0);
+  for (int saves = 0; saves < 2; ++saves) ASSERT_EQ(IniWriteToFile(doc.get(), path.c_str()), 0);
+  ASSERT_GT(doc->rendering.size(), 0u);
   IniPut(doc.get(), "b", "x", "longer than before", 0);
   EXPECT_LT(IniWriteToFile(doc.get(), (dir / "no/a.ini").c_str()), 0);
   ASSERT_EQ(IniWriteToFile(doc.get(), path.c_str()), 0);
   EXPECT_EQ(ReadBytes(path), "[a]\nx = 1\n\n[b]\nx = longer than before\n\n[c]\nx = 1\n\n");
+}
+
+TEST(WriterReuse, ADocumentThatIsSavedOnceKeepsNoSecondText) {
+  TempDir dir;
+  const std::string path = dir / "a.ini";
+  Document doc = NewDocument();
+  IniPut(doc.get(), "a", "x", "1", 0);
+  for (int reads = 0; reads < 2; ++reads) {
+    ASSERT_EQ(IniWriteToFile(doc.get(), path.c_str()), 0);
+    EXPECT_EQ(doc->rendering.size(), 0u);
+    ASSERT_EQ(IniWriteToFile(doc.get(), path.c_str()), 0);
+    EXPECT_EQ(doc->rendering.size(), ReadBytes(path).size());
+    ASSERT_EQ(IniReadFromFile(doc.get(), path.c_str()), 0);
+    EXPECT_EQ(doc->rendering.size(), 0u);
+  }
 }
 
 }  // namespace
