@@ -19,10 +19,10 @@ struct ztini_ListRecord {
     char* block = nullptr;
     char only[sizeof(char*)];  // the one item of a list without a block
   };
-  uint32_t itemSize : 31 = 0;
-  uint32_t blockIsLent : 1 =
-      0;  // the block belongs to another owner; a larger one will be the list's
-  uint32_t capacity = 0;
+  uint32_t itemSize = 0;
+  uint32_t capacity : 31 = 0;
+  // The block is another owner's; a larger one is the list's own.
+  uint32_t blockIsLent : 1 = 0;
   uint32_t first = 0;  // place of item 1 in the block
   uint32_t count = 0;
 };

@@ -37,6 +37,8 @@ TEST(List, NewListIsEmptyWithoutCapacity) {
   EXPECT_EQ(ztini_ListNumItems(list.get()), 0);
   EXPECT_EQ(list->capacity, 0u);
   EXPECT_EQ(list->itemSize, 8u);
+  Owned huge(ztini_ListNew(UINT32_MAX));
+  EXPECT_EQ(huge->itemSize, UINT32_MAX);
 }
 
 TEST(List, GetKnowsZeroAsLastAndMinusOneAsFirst) {
