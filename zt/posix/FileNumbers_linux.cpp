@@ -2,7 +2,12 @@
 
 #include <fcntl.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <sys/sysmacros.h>
+#include <unistd.h>
+#ifndef STATX_INO  // not in musl before 1.2.5
+#include <linux/stat.h>
+#endif
 
 #include <cerrno>
 
@@ -12,7 +17,7 @@ namespace zt::posix {
 // with the next write, which takes as long again as the write.
 bool GetFileNumbers(int fd, dev_t& device, ino_t& inode) {
   struct statx wanted;
-  if (statx(fd, "", AT_EMPTY_PATH, STATX_INO, &wanted) == 0) {
+  if (syscall(SYS_statx, fd, "", AT_EMPTY_PATH, STATX_INO, &wanted) == 0) {
     device = makedev(wanted.stx_dev_major, wanted.stx_dev_minor);
     inode = static_cast<ino_t>(wanted.stx_ino);
     return true;

@@ -2,6 +2,7 @@
 // opens that very file later.
 #include "zt/posix/HeldFiles.h"
 
+#include <linux/fs.h>
 #include <linux/openat2.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
