@@ -42,7 +42,7 @@ wchar_t* vltGuidToString2(GUID g) {
 wchar_t* vltGuidToStructString2(GUID g) {
   char text[128];
   const unsigned char* b = g.Data4;
-  snprintf(text, sizeof text, "{%#lx,%#hx,%#hx,{%#hx,%#hx,%#hx,%#hx,%#hx,%#hx,%#hx,%#hx}}",
+  snprintf(text, sizeof text, "{%#lx,%#hx,%#hx,{%#hhx,%#hhx,%#hhx,%#hhx,%#hhx,%#hhx,%#hhx,%#hhx}}",
            static_cast<unsigned long>(g.Data1), g.Data2, g.Data3, b[0], b[1], b[2], b[3], b[4],
            b[5], b[6], b[7]);
   return Dup(zt::fnd::String(text).c_str());
