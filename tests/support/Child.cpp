@@ -16,6 +16,8 @@
 #include <stdexcept>
 #include <system_error>
 
+#include "tests/support/Emulation.h"
+
 // Of the coverage build only: writes the counters down, which _exit would lose.
 extern "C" void __gcov_dump() __attribute__((weak));
 
@@ -206,7 +208,7 @@ bool Eventually(const std::function<bool()>& condition, int deadlineMs) {
 bool BlockedIn(pid_t pid, long systemCallNumber) {
   std::ifstream in("/proc/" + std::to_string(pid) + "/syscall");
   long number = -1;
-  return in >> number && number == systemCallNumber;
+  return in >> number && number == NumberInProc(systemCallNumber);
 }
 
 }  // namespace vlt::test

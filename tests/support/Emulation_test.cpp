@@ -1,6 +1,7 @@
 #include "tests/support/Emulation.h"
 
 #include <gtest/gtest.h>
+#include <sys/syscall.h>
 
 namespace vlt::test {
 namespace {
@@ -8,6 +9,7 @@ namespace {
 TEST(Emulation, AKernelsOwnProcessorIsNotEmulated) {
 #if defined(__x86_64__) || defined(__i386__)
   EXPECT_FALSE(IsEmulated());
+  EXPECT_EQ(NumberInProc(SYS_flock), SYS_flock);
 #else
   GTEST_SKIP() << "NOT TESTED: this processor may be emulated";
 #endif
