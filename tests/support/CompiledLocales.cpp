@@ -30,7 +30,10 @@ void CompiledLocales::make(const std::string& name, const std::string& charmap) 
 }
 
 bool CompiledLocales::use(const std::string& locale) const {
-  setenv("LOCPATH", m_dir.path().c_str(), 1);
+  // The system's may be in a place of their own, as another processor's are.
+  const char* others = getenv("LOCPATH");
+  std::string places = m_dir.path() + (others ? std::string(":") + others : "");
+  setenv("LOCPATH", places.c_str(), 1);
   return std::setlocale(LC_CTYPE, locale.c_str()) != nullptr;
 }
 
