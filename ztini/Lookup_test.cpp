@@ -1,13 +1,11 @@
 #include <gtest/gtest.h>
 
 #include <clocale>
-#include <cstdlib>
 #include <random>
 #include <string>
 
-#include "tests/support/Child.h"
+#include "tests/support/CompiledLocales.h"
 #include "tests/support/FailingAlloc.h"
-#include "tests/support/TempDir.h"
 #include "tests/support/TestDocument.h"
 #include "ztini/NameCompare.h"
 
@@ -246,18 +244,18 @@ TEST(Lookup, LongListsAnswerLikeShortOnes) {
   }
 }
 
-// An 8-bit locale made on the spot, in which the letters above 127 have two cases.
-bool SetLatin1(const vlt::test::TempDir& dir) {
-  const std::string name = "de_DE.ISO-8859-1";
-  const auto made =
-      vlt::test::RunProgram({"localedef", "-f", "ISO-8859-1", "-i", "de_DE", dir / name});
-  if (made.exitCode != 0) return false;
-  setenv("LOCPATH", dir.path().c_str(), 1);
-  return setlocale(LC_CTYPE, name.c_str()) != nullptr;
-}
+// An 8-bit locale in which the letters above 127 have two cases.
+class Latin1 {
+ public:
+  Latin1() { m_locales.make("de_DE", "ISO-8859-1"); }
+  bool use() const { return m_locales.use("de_DE.ISO-8859-1"); }
+
+ private:
+  vlt::test::CompiledLocales m_locales;
+};
 
 TEST(Lookup, ALocaleChangeBetweenCallsIsFollowed) {
-  vlt::test::TempDir dir;
+  const Latin1 latin1;
   Document doc = NewDocument();
   for (int i = 0; i < 100; ++i) {
     const std::string n = std::to_string(i);
@@ -270,7 +268,7 @@ TEST(Lookup, ALocaleChangeBetweenCallsIsFollowed) {
                      "\xc4"
                      "50"),
             "<absent>");
-  if (!SetLatin1(dir)) GTEST_SKIP() << "no 8-bit locale can be made here";
+  ASSERT_TRUE(latin1.use());
   EXPECT_EQ(RawValue(doc, "\xc4 I50", "x"), "50");
   EXPECT_EQ(RawValue(doc, "all",
                      "\xc4"
@@ -344,12 +342,12 @@ void CompareRandomLookups(unsigned seeds, const char* put, const char* look) {
 TEST(Lookup, RandomNamesAreFoundAsTheyCompare) { CompareRandomLookups(500, "C", "C"); }
 
 TEST(Lookup, RandomNamesAreFoundAsTheyCompareInEveryPairOfLocales) {
-  vlt::test::TempDir dir;
-  if (!SetLatin1(dir)) GTEST_SKIP() << "no 8-bit locale can be made here";
-  const std::string latin1 = setlocale(LC_CTYPE, nullptr);
-  CompareRandomLookups(300, latin1.c_str(), latin1.c_str());
-  CompareRandomLookups(300, latin1.c_str(), "C");
-  CompareRandomLookups(300, "C", latin1.c_str());
+  const Latin1 latin1;
+  ASSERT_TRUE(latin1.use());
+  const std::string name = setlocale(LC_CTYPE, nullptr);
+  CompareRandomLookups(300, name.c_str(), name.c_str());
+  CompareRandomLookups(300, name.c_str(), "C");
+  CompareRandomLookups(300, "C", name.c_str());
   setlocale(LC_CTYPE, "C");
 }
 
