@@ -54,10 +54,14 @@ struct Stamp {
   bool isIn(const std::string& stored) const {
     // As text() writes it: without the time that sscanf takes for a pattern.
     const char* const end = stored.data() + stored.size();
+    auto read = [end](const char* from, uint32_t* number) {
+      auto [after, error] = std::from_chars(from, end, *number);
+      return error == std::errc() ? after : nullptr;
+    };
     uint32_t first = 0, second = 0;
-    auto [afterFirst, error] = std::from_chars(stored.data(), end, first);
-    if (error == std::errc() && afterFirst != end && *afterFirst == ' ' && first == low &&
-        std::from_chars(afterFirst + 1, end, second).ptr == end && second == high) {
+    const char* const space = read(stored.data(), &first);
+    if (space && space != end && *space == ' ' && read(space + 1, &second) == end && first == low &&
+        second == high) {
       return true;
     }
     unsigned long one = 0, other = 0;

@@ -13,7 +13,7 @@ namespace {
 using vlt::test::TempDir;
 using vlt::test::WriteBytes;
 
-zt::fnd::AbsTime Seconds(long seconds) {
+zt::fnd::AbsTime Seconds(time_t seconds) {
   timeval time = {};
   time.tv_sec = seconds;
   return zt::fnd::osdep::TimevalToAbsTime(time);
@@ -72,6 +72,19 @@ TEST_F(ScanTest, StampsAreComparedAsNumbers) {
   for (const std::string& other : {low, low + high, low + " ", low + "," + high, stamp + "0",
                                    high + " " + low, "-" + stamp, std::string(), "x" + stamp}) {
     EXPECT_FALSE(isUpToDate(other)) << other;
+  }
+}
+
+// A number that cannot be read leaves the 0 that it is compared with.
+TEST_F(ScanTest, AStampWhoseUpperHalfIsZeroIsComparedAsWell) {
+  const zt::fnd::AbsTime first = Seconds(-11644473599);  // one second into 1601
+  scan->setStamp("/a", first);
+  const std::string stamp = value("Registration", "/a");
+  ASSERT_EQ(stamp, "10000000 0");
+  EXPECT_TRUE(scan->isUpToDate("/a", first));
+  for (const char* other : {"10000000 99999999999", "10000000 ", "10000000", "10000000 x"}) {
+    database->SetItem("Registration", "/a", other, true);
+    EXPECT_FALSE(scan->isUpToDate("/a", first)) << other;
   }
 }
 
