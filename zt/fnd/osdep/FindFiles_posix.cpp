@@ -34,7 +34,8 @@ bool SameCharacter(wchar_t a, wchar_t b) {
 }
 
 struct Mask {
-  String directory, pattern, prefix;  // of full names
+  String directory, pattern;
+  String prefix;  // of full names: the directory and a slash
 
   explicit Mask(const String& mask) {
     String::size_type slash = mask.find_last_of(String(L"/\\"));
