@@ -88,6 +88,7 @@ struct IniSection : ztini::NameNode {
 struct IniStructForwardReferenceTag {
   ztini::Arena arena;     // of what was read
   ztini::OwnedText text;  // of the file, cut into names and values; null: they are in the arena
+  size_t textSize = 0;    // bytes of the file that was read last; 0 where it was read by lines
   ztini::NameFold fold;
   ztini::NameList sections{&fold};       // of IniSection
   IniSection* currentSection = nullptr;  // the section last found, asked first
@@ -155,7 +156,7 @@ void IniReplaceValue(IniEntry* entry, char* value);
 // Appends the record, or disposes it. False without memory.
 bool IniAppendSection(IniStructForwardReferenceTag* doc, IniSection* section,
                       ztini::NameHash hash = {});
-bool IniAppendEntry(IniSection* section, IniEntry* entry);
+bool IniAppendEntry(IniSection* section, IniEntry* entry, ztini::NameHash hash = {});
 
 // IniFindSection and IniFindEntry for those who ask again and again: 0 with the record or null, or
 // kIniOutOfMemory with null where only a scan of many names could find it.
@@ -163,7 +164,11 @@ int32_t IniSeekSection(IniStructForwardReferenceTag* doc, const char* name, IniS
                        ztini::FoldState fold = ztini::FoldState::Unknown,
                        ztini::NameHash* hash = nullptr);
 int32_t IniSeekEntry(IniStructForwardReferenceTag* doc, IniSection* section, const char* name,
-                     IniEntry** found, ztini::FoldState fold = ztini::FoldState::Unknown);
+                     IniEntry** found, ztini::FoldState fold = ztini::FoldState::Unknown,
+                     ztini::NameHash* hash = nullptr);
+
+// The item of a section that has just been looked up: the fold is fresh. Null if it is not there.
+IniEntry* IniFindFresh(IniStructForwardReferenceTag* doc, IniSection* section, const char* item);
 
 // Removes all sections, the last one first.
 void IniEmptyDocument(IniStructForwardReferenceTag* doc);
@@ -191,12 +196,12 @@ inline IniEntry* IniReadEntry(IniStructForwardReferenceTag* doc, char* name, siz
   return entry;
 }
 
-inline bool IniAppendEntry(IniSection* section, IniEntry* entry) {
+inline bool IniAppendEntry(IniSection* section, IniEntry* entry, ztini::NameHash hash) {
   if (!section->items.reserve(1)) {
     IniDisposeEntry(entry);
     return false;
   }
-  section->items.append(entry);
+  section->items.append(entry, hash);
   section->markAppended();
   return true;
 }

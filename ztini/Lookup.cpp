@@ -49,23 +49,9 @@ class WantedName {
   unsigned char m_last = 0;
 };
 
-// The fold is fresh.
-IniEntry* FindInSection(Doc* doc, IniSection* section, const char* item) {
-  if (!item || doc->caseSensitive || !section->items.isScanned()) {
-    return static_cast<IniEntry*>(section->items.find(item, doc->match(), ztini::FoldState::Fresh));
-  }
-  const WantedName wanted(doc->fold, item);
-  ztini::NameNode** node = section->items.nodes();
-  for (ztini::NameNode** end = node + section->items.count(); node < end; ++node) {
-    auto* entry = static_cast<IniEntry*>(*node);
-    if (wanted.is(entry->name, entry->knownNameLength)) return entry;
-  }
-  return nullptr;
-}
-
 IniEntry* FindItem(Doc* doc, const char* section, const char* item) {
   IniSection* found = IniFindSection(doc, section);
-  return found ? FindInSection(doc, found, item) : nullptr;
+  return found ? IniFindFresh(doc, found, item) : nullptr;
 }
 
 IniEntry* NthItem(Doc* doc, const char* section, int32_t n) {
@@ -119,10 +105,23 @@ int32_t IniSeekSection(Doc* doc, const char* name, IniSection** found, ztini::Fo
   return 0;
 }
 
+IniEntry* IniFindFresh(Doc* doc, IniSection* section, const char* item) {
+  if (!item || doc->caseSensitive || !section->items.isScanned()) {
+    return static_cast<IniEntry*>(section->items.find(item, doc->match(), ztini::FoldState::Fresh));
+  }
+  const WantedName wanted(doc->fold, item);
+  ztini::NameNode** node = section->items.nodes();
+  for (ztini::NameNode** end = node + section->items.count(); node < end; ++node) {
+    auto* entry = static_cast<IniEntry*>(*node);
+    if (wanted.is(entry->name, entry->knownNameLength)) return entry;
+  }
+  return nullptr;
+}
+
 int32_t IniSeekEntry(Doc* doc, IniSection* section, const char* name, IniEntry** found,
-                     ztini::FoldState fold) {
+                     ztini::FoldState fold, ztini::NameHash* hash) {
   ztini::NameNode* node = nullptr;
-  const bool good = section->items.seek(name, doc->match(), &node, fold);
+  const bool good = section->items.seek(name, doc->match(), &node, fold, hash);
   *found = static_cast<IniEntry*>(node);
   return good ? 0 : kIniOutOfMemory;
 }

@@ -106,7 +106,8 @@ class DocumentBuilder {
   int32_t takeItem(char* begin, char* end, int32_t line);
   int32_t store(char* name, char* nameEnd, char* value, char* valueEnd, int32_t line);
   int32_t replace(IniEntry* entry, const char* value, int32_t line);
-  int32_t appendEntry(char* name, char* nameEnd, char* value, char* valueEnd, int32_t line);
+  int32_t appendEntry(char* name, char* nameEnd, char* value, char* valueEnd, int32_t line,
+                      ztini::NameHash hash);
   int32_t openSection(char* name, char* nameEnd, int32_t line, ztini::NameHash hash = {});
   int32_t openNullSection();
   int32_t gather(IniEntry* entry);
@@ -224,14 +225,16 @@ int32_t DocumentBuilder::store(char* name, char* nameEnd, char* value, char* val
   }
   const ItemKeys::Key key = ItemKeys::Of(m_doc->fold, name, nameEnd);
   IniEntry* known = nullptr;
+  ztini::NameHash hash;
   if (m_doc->duplicateChecking && m_keys.mayHave(key)) {
     endGathering();
-    if (IniSeekEntry(m_doc, m_section, name, &known, FoldState::Fresh) < 0) return kIniOutOfMemory;
+    const int32_t status = IniSeekEntry(m_doc, m_section, name, &known, FoldState::Fresh, &hash);
+    if (status < 0) return status;
   }
   if (known) return replace(known, value, line);
   m_keys.add(key);
   m_hasPieces = m_hasPieces || IniMayBePiece(name, nameEnd);
-  return appendEntry(name, nameEnd, value, valueEnd, line);
+  return appendEntry(name, nameEnd, value, valueEnd, line, hash);
 }
 
 int32_t DocumentBuilder::replace(IniEntry* entry, const char* value, int32_t line) {
@@ -245,7 +248,7 @@ int32_t DocumentBuilder::replace(IniEntry* entry, const char* value, int32_t lin
 }
 
 int32_t DocumentBuilder::appendEntry(char* name, char* nameEnd, char* value, char* valueEnd,
-                                     int32_t line) {
+                                     int32_t line, ztini::NameHash hash) {
   char* keptName = keep(name, nameEnd);
   char* keptValue = keptName ? keep(value, valueEnd) : nullptr;
   if (!keptValue) return kIniOutOfMemory;
@@ -258,7 +261,7 @@ int32_t DocumentBuilder::appendEntry(char* name, char* nameEnd, char* value, cha
   if (m_gathers) return gather(entry);
   // As many as the section before has; without memory the append tries again.
   if (m_section->items.count() == 1) m_section->items.reserve(m_itemsExpected);
-  return IniAppendEntry(m_section, entry) ? 0 : kIniOutOfMemory;
+  return IniAppendEntry(m_section, entry, hash) ? 0 : kIniOutOfMemory;
 }
 
 int32_t DocumentBuilder::gather(IniEntry* entry) {
@@ -302,33 +305,63 @@ int32_t DocumentBuilder::finish(int32_t status) {
 
 void StartRead(IniStructForwardReferenceTag* doc) {
   IniEmptyDocument(doc);
+  doc->textSize = 0;
   doc->firstBadLine = -1;
   // Once for the whole text: the locale in force at the beginning decides for every line.
   doc->fold.refresh();
 }
 
-// Asks for the memory of the document's records at once, guessed from the text's first lines.
+// Lines of a text, and how many bytes they take.
+struct Sample {
+  size_t headers = 0, items = 0;
+  ptrdiff_t sizeBytes = 0;
+  bool isPart = false;
+
+  // The lines that begin and end in [begin, end), the first one at `begin`.
+  void take(const char* begin, const char* end) {
+    for (const char* at = begin; at < end;) {
+      const void* lineEnd = memchr(at, '\n', static_cast<size_t>(end - at));
+      if (!lineEnd) return;
+      ++(*at == '[' ? headers : items);
+      const char* next = static_cast<const char*>(lineEnd) + 1;
+      sizeBytes += next - at;
+      at = next;
+    }
+  }
+};
+
+// From places all over the text: a file may begin with a long list, and go on with small sections.
+Sample SampleOf(const char* begin, const char* end) {
+  constexpr ptrdiff_t kPlaces = 8, kPlaceBytes = 512;
+  Sample sample;
+  const auto size = end - begin;
+  if (size <= kPlaces * kPlaceBytes) {
+    sample.take(begin, end);
+    return sample;
+  }
+  sample.isPart = true;
+  sample.take(begin, begin + kPlaceBytes);
+  for (ptrdiff_t n = 1; n < kPlaces; ++n) {
+    const char* place = begin + size / kPlaces * n;
+    const void* lineEnd = memchr(place, '\n', kPlaceBytes);
+    if (lineEnd) sample.take(static_cast<const char*>(lineEnd) + 1, place + kPlaceBytes);
+  }
+  return sample;
+}
+
+// Asks for the memory of the document's records at once, guessed from some of the text's lines.
 // Without memory for it, and for what was not guessed, reading asks piece by piece.
 void ExpectRecords(IniStructForwardReferenceTag* doc, const char* begin, const char* end) {
   constexpr double kMostBytes = 2;  // for one of the text: a file of empty lines needs nothing
-  const auto size = end - begin;
-  const char* sampleEnd = begin + std::min(size, ptrdiff_t(4096));
-  size_t headers = 0, items = 0;
-  for (const char* at = begin; at < sampleEnd;) {
-    ++(*at == '[' ? headers : items);
-    const void* lineEnd = memchr(at, '\n', static_cast<size_t>(sampleEnd - at));
-    at = lineEnd ? static_cast<const char*>(lineEnd) + 1 : sampleEnd;
-  }
+  const Sample sample = SampleOf(begin, end);
   const size_t bytes =
-      headers * sizeof(IniSection) + items * (sizeof(IniEntry) + sizeof(IniEntry*));
+      sample.headers * sizeof(IniSection) + sample.items * (sizeof(IniEntry) + sizeof(IniEntry*));
   if (!bytes) return;
-  double times = 1;
-  if (sampleEnd < end) {
-    times = std::min(double(size) / double(sampleEnd - begin),
-                     kMostBytes * double(size) / double(bytes));
-  }
+  const auto size = double(end - begin);
+  double times = size / double(sample.sizeBytes);
+  if (sample.isPart) times = std::min(times, kMostBytes * size / double(bytes));
   doc->arena.expect(static_cast<size_t>(times * double(bytes)) & ~(alignof(IniSection) - 1));
-  doc->sections.reserve(static_cast<uint32_t>(times * double(headers)));
+  doc->sections.reserve(static_cast<uint32_t>(times * double(sample.headers)));
 }
 
 }  // namespace
@@ -337,6 +370,7 @@ int32_t ztini::IniReadText(IniStructForwardReferenceTag* doc, OwnedText text, si
                            size_t end) {
   StartRead(doc);
   doc->text = std::move(text);
+  doc->textSize = end;
   char* bytes = doc->text.get();
   ExpectRecords(doc, bytes + begin, bytes + end);
   TextLines lines(bytes + begin, bytes + end);

@@ -277,7 +277,7 @@ int32_t ztini::IniRender(IniStructForwardReferenceTag* doc, TextBuffer* text) {
   const bool marked = (doc->writeOptions & kIniWriteMark) != 0;
   // The sections' places in it are overwritten one by one, so it serves once only.
   const TextBuffer before = std::move(doc->rendering);
-  text->reserve(BlockFor(before.size()));
+  text->reserve(BlockFor(before.size() ? before.size() : doc->textSize));
   if (marked) text->append(kUtf8Mark);
   TextInMemory lines(text, before.view(), marked);
   const int32_t status = DocumentWriter(doc, &lines).write();
