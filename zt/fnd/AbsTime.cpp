@@ -100,6 +100,8 @@ constexpr Value kLeast(0x80000000, 0, 0, 0);
 
 // Seconds from 1904 in which 64 bits of ticks surely end, on either side, and well before 65 would.
 constexpr Value kTicksEnd(1000000000000LL);
+constexpr int64_t kTicksPerSecond = 10000000;
+constexpr int64_t kSurelyFit = 900000000000;
 
 int64_t Limit(bool negative) {
   return negative ? std::numeric_limits<int64_t>::min() : std::numeric_limits<int64_t>::max();
@@ -155,6 +157,11 @@ int64_t AbsTime::toLKTIME(bool round) const noexcept {
   // The change of its sign reveals a product that is too large, but only up to twice the range.
   const bool negative = m_value.IsNegative();
   if (negative ? m_value < -kTicksEnd : m_value > kTicksEnd) return Limit(negative);
+  // Times of files: whole seconds, of which the ticks fit.
+  const int64_t seconds = m_value.integerPart();
+  if (m_value.fractionBits() == 0 && seconds >= -kSurelyFit && seconds <= kSurelyFit) {
+    return (seconds + kLktimeEpoch) * kTicksPerSecond;
+  }
   return CountSince(m_value, kLktimeEpoch, nZTSS100::kTimeUnitTicks, round);
 }
 

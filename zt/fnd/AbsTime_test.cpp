@@ -84,6 +84,27 @@ TEST(AbsTime, TicksCountFrom1601) {
   EXPECT_EQ(AbsTime(Fixed(7) / Fixed(100000000)).toLKTIME(false), 95616288000000000);
 }
 
+// A hair after a whole second is truncated to it: both ways of counting give the same.
+TEST(AbsTime, WholeSecondsCountAsTheirNeighbours) {
+  const Fixed hair = Fixed(1) / Fixed(1000000000);
+  for (int64_t seconds : {INT64_C(0), INT64_C(1), INT64_C(2082844800), INT64_C(3878000000),
+                          INT64_C(899999999999), INT64_C(900000000000), INT64_C(900000000001),
+                          INT64_C(912775574885), INT64_C(912775574886), INT64_C(1000000000001)}) {
+    const Fixed whole(static_cast<long long>(seconds));
+    for (bool round : {false, true}) {
+      EXPECT_EQ(AbsTime(whole).toLKTIME(round), AbsTime(whole + hair).toLKTIME(false)) << seconds;
+    }
+  }
+  // Below 1601 truncation goes up to the second.
+  for (int64_t seconds : {INT64_C(-9561628801), INT64_C(-899999999999), INT64_C(-900000000001),
+                          INT64_C(-931898832486), INT64_C(-1000000000001)}) {
+    const Fixed whole(static_cast<long long>(seconds));
+    for (bool round : {false, true}) {
+      EXPECT_EQ(AbsTime(whole).toLKTIME(round), AbsTime(whole - hair).toLKTIME(false)) << seconds;
+    }
+  }
+}
+
 TEST(AbsTime, WhatDoesNotFitEndsAtTheLimits) {
   EXPECT_EQ(kLeast, AbsTime::min.toTime_T(true));
   EXPECT_EQ(kLeast, AbsTime::min.toTime_T(false));

@@ -51,7 +51,10 @@ class Vector {
   const T& operator[](unsigned int i) const noexcept { return m_begin[i]; }
 
   // Appends a copy. `value` may be an element of this array.
-  void push_back(const T& value);
+  void push_back(const T& value) { emplace_back(value); }
+  // Appends an element made of the arguments, which may refer to elements of this array.
+  template <class... Arguments>
+  void emplace_back(Arguments&&... arguments);
 
   // Exchanges the blocks; pointers to elements stay good and follow them.
   void swap(Vector& other) noexcept {
@@ -99,9 +102,10 @@ class Builder {
   Builder(const Builder&) = delete;
   Builder& operator=(const Builder&) = delete;
 
-  // The element counts as built only when its copy is complete.
-  void add(const T& value) {
-    ::new (static_cast<void*>(m_end)) T(value);
+  // The element counts as built only when it is complete.
+  template <class... Arguments>
+  void add(Arguments&&... arguments) {
+    ::new (static_cast<void*>(m_end)) T(std::forward<Arguments>(arguments)...);
     ++m_end;
   }
 
@@ -144,17 +148,18 @@ uint32_t Vector<T>::calculateNewCapacity() const {
 }
 
 template <class T>
-void Vector<T>::push_back(const T& value) {
+template <class... Arguments>
+void Vector<T>::emplace_back(Arguments&&... arguments) {
   if (m_end != m_capacityEnd) {
-    ::new (static_cast<void*>(m_end)) T(value);
+    ::new (static_cast<void*>(m_end)) T(std::forward<Arguments>(arguments)...);
     ++m_end;
     return;
   }
   const uint32_t newCapacity = calculateNewCapacity();
   if constexpr (kIsRelocatable<T>) {
-    // Before the block moves, as `value` may lie in it.
+    // Before the block moves, as the arguments may lie in it.
     vector_detail::Builder<T> last(1);
-    last.add(value);
+    last.add(std::forward<Arguments>(arguments)...);
     const uint32_t oldSize = size();
     const auto bytes =
         SafeInteger<uint32_t>::Multiply(newCapacity, static_cast<uint32_t>(sizeof(T)));
@@ -165,8 +170,8 @@ void Vector<T>::push_back(const T& value) {
   } else {
     vector_detail::Builder<T> block(newCapacity);
     for (const T& old : *this) block.add(old);
-    // Before the old block goes, as `value` may lie in it.
-    block.add(value);
+    // Before the old block goes, as the arguments may lie in it.
+    block.add(std::forward<Arguments>(arguments)...);
     block.exchange(m_begin, m_end);
   }
   m_capacityEnd = m_begin + newCapacity;

@@ -91,6 +91,14 @@ TEST(Vector, PushBackOfAnOwnElementSurvivesTheMove) {
   EXPECT_EQ(v[0], v[1]);
 }
 
+TEST(Vector, ElementsAreMadeInPlaceFromTheVectorsOwn) {
+  Vector<String> v;
+  v.emplace_back(3u, L'a');
+  for (int i = 0; i < 20; ++i) v.emplace_back(v[0], v[v.size() - 1]);
+  EXPECT_EQ(v.size(), 21u);
+  EXPECT_EQ(v[20], String(63u, L'a'));
+}
+
 TEST(Vector, OfStringsGrowsWithoutACopyOfEach) {
   static_assert(kIsRelocatable<std::pair<String, int>> && !kIsRelocatable<std::string>);
   Vector<std::pair<String, int>> v;

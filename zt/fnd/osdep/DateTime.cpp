@@ -104,7 +104,12 @@ AbsTime TimevalToAbsTime(const timeval& time) {
   const uint64_t micros =
       static_cast<uint64_t>(time.tv_sec) * 1000000 + static_cast<uint64_t>(time.tv_usec);
   AbsTime::Value value(static_cast<int64_t>(micros));
-  tSSTimeValue::_CorrectUnits(tSSTimeValue::kToSeconds, nZTSS100::kTimeUnitMicro, value, nullptr);
+  const bool isWhole = time.tv_usec == 0 && static_cast<int64_t>(micros) / 1000000 == time.tv_sec;
+  if (isWhole) {
+    value = AbsTime::Value(static_cast<int64_t>(time.tv_sec));
+  } else {
+    tSSTimeValue::_CorrectUnits(tSSTimeValue::kToSeconds, nZTSS100::kTimeUnitMicro, value, nullptr);
+  }
   value += kUnixEpoch;
   return AbsTime(value);
 }

@@ -6,6 +6,7 @@
 #include <cmath>
 #include <cstdlib>
 #include <ctime>
+#include <limits>
 #include <string>
 
 #include "tests/support/ScopedLocale.h"
@@ -207,6 +208,22 @@ TEST(DateTimeClock, TimevalKeepsItsMicroseconds) {
   time.tv_sec = -1;
   time.tv_usec = 0;
   EXPECT_EQ(TimevalToAbsTime(time).getSeconds(), 2082844799);
+}
+
+// Also where the microseconds of so many seconds wrap.
+TEST(DateTimeClock, WholeSecondsAreDividedAsOthersAre) {
+  constexpr int64_t kWraps = std::numeric_limits<int64_t>::max() / 1000000;
+  for (int64_t seconds :
+       {INT64_C(0), INT64_C(1), INT64_C(-1), INT64_C(1794663265), kWraps, kWraps + 1, -kWraps,
+        -kWraps - 2, 3 * kWraps, std::numeric_limits<int64_t>::max(),
+        std::numeric_limits<int64_t>::min()}) {
+    timeval time = {};
+    time.tv_sec = static_cast<time_t>(seconds);
+    AbsTime::Value divided(static_cast<int64_t>(static_cast<uint64_t>(seconds) * 1000000));
+    divided /= AbsTime::Value(1000000);
+    divided += AbsTime::kUnixEpoch;
+    EXPECT_TRUE(TimevalToAbsTime(time) == AbsTime(divided)) << seconds;
+  }
 }
 
 TEST(DateTimeClock, CurrentTimeIsNow) {

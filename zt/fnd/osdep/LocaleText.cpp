@@ -29,7 +29,7 @@ bool Same(const char* a, const char* b) { return strcmp(a, b) == 0; }
 const char* EncodingOf(const char* locale) {
   // "carbon" is the name of the system's own conversion on another platform; here it is the
   // locale's.
-  return !locale || Same(locale, "carbon") ? "" : locale;
+  return !locale || *locale == '\0' || Same(locale, "carbon") ? "" : locale;
 }
 
 // The encodings that need no iconv, which is slow to open and has locks of its own.
