@@ -2,6 +2,7 @@
 
 #include <string.h>
 
+#include "ztini/Document.h"
 #include "ztini/Render.h"
 
 namespace {
@@ -57,21 +58,10 @@ void IniDocument::Dispose() {
 
 namespace {
 
-// The value as stored, or decoded; null when absent.
-const char* Value(IniStructForwardReferenceTag* document, const char* section, const char* item,
-                  bool decoded) {
-  const char* value = nullptr;
-  if (IniGetPointerToRawString(document, section, item, &value) != 1) return nullptr;
-  // Most values have no escapes: what is stored is the value.
-  if (!decoded || !strchr(value, '\\')) return value;
-  return IniGetPointerToString(document, section, item, &value) == 1 ? value : nullptr;
-}
-
 template <class Out>
-HRESULT GetValue(IniStructForwardReferenceTag* document, const char* section, const char* item,
-                 bool decoded, Out* out) {
+HRESULT GetValue(const IniDocument& document, const char* section, const char* item, Out* out) {
   if (!section || !item || IsNull(out)) return E_POINTER;
-  const char* value = Value(document, section, item, decoded);
+  const char* value = IniDocument::Section(document, section).value(item);
   // Sections and items that are missing are not distinguished: callers ask for the value.
   return value ? CopyOut(value, out) : E_FAIL;
 }
@@ -93,11 +83,11 @@ HRESULT GetItemName(IniStructForwardReferenceTag* document, const char* section,
 }  // namespace
 
 HRESULT IniDocument::GetItem(char const* section, char const* item, char** out) const {
-  return GetValue(m_ini, section, item, m_useEscapes, out);
+  return GetValue(*this, section, item, out);
 }
 
 HRESULT IniDocument::GetItem(char const* section, char const* item, std::string* out) const {
-  return GetValue(m_ini, section, item, m_useEscapes, out);
+  return GetValue(*this, section, item, out);
 }
 
 HRESULT IniDocument::SetItem(char const* section, char const* item, char const* value, bool quote) {
@@ -150,4 +140,26 @@ HRESULT IniDocument::GetNthItemName(char const* section, int n, char** out) cons
 }
 HRESULT IniDocument::GetNthItemName(char const* section, int n, std::string* out) const {
   return GetItemName(m_ini, section, n, out);
+}
+
+IniDocument::Section::Section(const IniDocument& document, const char* name)
+    : m_document(document), m_name(name), m_section(IniFindSection(document.m_ini, name)) {}
+
+bool IniDocument::Section::has(const char* item) const {
+  return m_section && IniFindFresh(m_document.m_ini, m_section, item);
+}
+
+const char* IniDocument::Section::value(const char* item) const {
+  const IniEntry* entry = m_section ? IniFindFresh(m_document.m_ini, m_section, item) : nullptr;
+  if (!entry || !entry->value) return nullptr;
+  // Most values have no escapes: what is stored is the value.
+  if (!m_document.m_useEscapes || !strchr(entry->value, '\\')) return entry->value;
+  const char* decoded = nullptr;
+  return IniGetPointerToString(m_document.m_ini, m_name, item, &decoded) == 1 ? decoded : nullptr;
+}
+
+int IniDocument::Section::count() const { return m_section ? m_section->items.count() : 0; }
+
+const char* IniDocument::Section::itemName(int n) const {
+  return IniEntryName(m_section ? m_section->item(n) : nullptr);
 }

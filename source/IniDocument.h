@@ -37,6 +37,9 @@ class IniDocument {
   HRESULT EraseSection(char const* section);
   int GetNumberOfSections() const;
   int GetNumberOfItems(char const* section) const;  // 0 for an unknown section
+  // One section for many questions; nothing, if it is not there.
+  class Section;
+
   // n from 1; 0 is the last and -1 the first.
   HRESULT GetNthSectionName(int n, char** out) const;
   HRESULT GetNthSectionName(int n, std::string* out) const;
@@ -51,4 +54,23 @@ class IniDocument {
   IniStructForwardReferenceTag* m_ini = nullptr;
   bool m_dirty = false;  // changed since it was made
   bool m_useEscapes;
+};
+
+// Answers as the document does, and looks the section up once. Good until the document changes or
+// another section of it is asked for.
+class IniDocument::Section {
+ public:
+  Section(const IniDocument& document, const char* name);
+
+  // Null for an item that is not there. Decoded where the document's values are; valid until the
+  // next question.
+  const char* value(const char* item) const;
+  bool has(const char* item) const;
+  int count() const;
+  const char* itemName(int n) const;  // n as above
+
+ private:
+  const IniDocument& m_document;
+  const char* m_name;
+  IniSection* m_section;
 };

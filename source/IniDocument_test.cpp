@@ -51,6 +51,37 @@ TEST(IniDocument, AnUnsupportedEncodingLeavesAnEmptyDocument) {
   EXPECT_EQ(document.GetNumberOfSections(), 0);
 }
 
+TEST(IniDocument, ASectionAnswersAsTheDocument) {
+  for (bool escapes : {false, true}) {
+    IniDocument document(escapes);
+    EXPECT_EQ(document.Parse("[a]\nx=1\ny=\"two\\x41\"\nz=\n[b]\nx=3\n"), 0);
+    for (const char* name : {"a", " A ", "b", "none", ""}) {
+      const IniDocument::Section section(document, name);
+      EXPECT_EQ(section.count(), document.GetNumberOfItems(name)) << name;
+      for (const char* item : {"x", "Y", " z ", "none", ""}) {
+        std::string value;
+        const bool has = document.ItemExists(name, item) == S_OK;
+        EXPECT_EQ(section.has(item), has) << name << item;
+        const bool found = document.GetItem(name, item, &value) == S_OK;
+        const char* own = section.value(item);
+        EXPECT_EQ(own != nullptr, found) << name << item;
+        if (own) {
+          EXPECT_EQ(own, value);
+        }
+      }
+      for (int n = -2; n < 5; ++n) {
+        std::string item;
+        const bool found = document.GetNthItemName(name, n, &item) == S_OK;
+        const char* own = section.itemName(n);
+        EXPECT_EQ(own != nullptr, found) << name << n;
+        if (own) {
+          EXPECT_EQ(own, item);
+        }
+      }
+    }
+  }
+}
+
 TEST(IniDocument, ValuesAreDecodedOnlyWhereEscapesAreUsed) {
   IniDocument escaped(true), raw(false);
   for (IniDocument* document : {&escaped, &raw}) ASSERT_EQ(document->Parse("[a]\nx=\\x41\n"), 0);

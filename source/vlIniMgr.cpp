@@ -53,13 +53,6 @@ ScopedFd OpenForReading(const std::string& fileName) {
 // disk. The one status of a parser is left over: a file in an encoding that cannot be read.
 bool ConcernsTheContents(int32_t status) { return status == kIniUnsupportedEncoding; }
 
-// The whole file; false if it could not be read to its length.
-bool ReadWhole(int fd, int32_t lengthBytes, std::vector<unsigned char>* data) {
-  if (lengthBytes < 0) return false;
-  data->resize(static_cast<size_t>(lengthBytes));
-  return zt::fnd::osdep::BinaryFile::ReadExactSize(fd, data->data(), data->size()) >= 0;
-}
-
 void SetAsideIfPossible(const std::string& fileName) {
   // The caller is about to throw anyway; a file that cannot be set aside is met again next time.
   vlt::Attempt<zt::fnd::exception::Exception>(
@@ -154,13 +147,25 @@ void CvlIniMgr::GetMD5Checksum(const unsigned char* data, unsigned long lengthBy
   md5.getDigest(digest);
 }
 
+// Of the whole file; false if it could not be read to its length.
+bool CvlIniMgr::Digest(int fd, Digested* of) {
+  const int32_t length = GetFileLength(fd);
+  if (length < 0) return false;
+  of->sizeBytes = static_cast<size_t>(length);
+  of->bytes = std::make_unique_for_overwrite<unsigned char[]>(of->sizeBytes);
+  if (zt::fnd::osdep::BinaryFile::ReadExactSize(fd, of->bytes.get(), of->sizeBytes) < 0) {
+    return false;
+  }
+  GetMD5Checksum(of->bytes.get(), of->sizeBytes, of->digest.data());
+  return true;
+}
+
 bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest, Digested* validated) {
   if (!digest) return true;
   // What cannot be checked is not accepted.
   return vlt::Attempt<std::bad_alloc>([&] {
     Digested found;
-    if (!ReadWhole(fd, GetFileLength(fd), &found.bytes)) return false;
-    GetMD5Checksum(found.bytes.data(), found.bytes.size(), found.digest.data());
+    if (!Digest(fd, &found)) return false;
     if (memcmp(found.digest.data(), digest, found.digest.size()) != 0) return false;
     *validated = std::move(found);
     return true;
@@ -170,8 +175,8 @@ bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest, Digested* vali
 // A start that finds nothing new saves what it has read. Comparing that is much quicker than MD5.
 IniSidecar::Digest CvlIniMgr::digestOf(const unsigned char* text, size_t sizeBytes) {
   Digested known = std::exchange(m_validated, Digested());
-  if (sizeBytes == 0 || known.bytes.size() != sizeBytes ||
-      memcmp(known.bytes.data(), text, sizeBytes) != 0) {
+  if (sizeBytes == 0 || known.sizeBytes != sizeBytes ||
+      memcmp(known.bytes.get(), text, sizeBytes) != 0) {
     GetMD5Checksum(text, sizeBytes, known.digest.data());
   }
   return known.digest;
@@ -334,9 +339,9 @@ HRESULT CvlIniMgr::DigestFile(IniSidecar::Digest* digest) const {
   if (!fd.valid()) return E_FAIL;
   // Out of memory is the one failure here that has a result of its own.
   return vlt::ResultOf<std::bad_alloc>(E_OUTOFMEMORY, [&] {
-    std::vector<unsigned char> data;
-    if (!ReadWhole(fd.get(), GetFileLength(fd.get()), &data)) return E_FAIL;
-    GetMD5Checksum(data.data(), data.size(), digest->data());
+    Digested found;
+    if (!Digest(fd.get(), &found)) return E_FAIL;
+    *digest = found.digest;
     return S_OK;
   });
 }

@@ -103,11 +103,13 @@ class CvlIniMgr : public IniDocument {
  private:
   void Initialize(unsigned char const* digest);
   void CreateFile();
-  // Bytes and their digest.
+  // What a file held, and its digest.
   struct Digested {
-    std::vector<unsigned char> bytes;
+    std::unique_ptr<unsigned char[]> bytes;  // never filled with zeros first
+    size_t sizeBytes = 0;
     IniSidecar::Digest digest = {};
   };
+  static bool Digest(int fd, Digested* of);
   static bool ValidateFile(int fd, unsigned char const* digest, Digested* validated);
   IniSidecar::Digest digestOf(const unsigned char* text, size_t sizeBytes);
   static int32_t GetFileLength(int fd);
@@ -130,9 +132,8 @@ class CvlIniMgr : public IniDocument {
   bool m_lockOnly;
   bool m_saveOnDestroy;
   IniDurability m_durability = IniDurability::Synced;
-  FileState m_known;  // of the file as it was last read or written
-  Digested
-      m_validated;  // what was found good when the file was opened, until a write needs a digest
+  FileState m_known;           // of the file as it was last read or written
+  Digested m_validated;        // what the opening found good, until a write needs a digest
   bool m_lockWasLost = false;  // and the file has not been compared with m_known since
   std::unique_ptr<IniFileLock> m_lock;
 };

@@ -73,10 +73,26 @@ struct Stamp {
 
 }  // namespace
 
+bool FilesSeen::has(std::string_view file) {
+  // Components of one file come one after the other.
+  for (size_t n = m_next; n < m_files.size() && n < m_next + 2; ++n) {
+    if (m_files[n] != file) continue;
+    m_next = n;
+    return true;
+  }
+  if (m_places.empty()) {
+    for (size_t n = 0; n < m_files.size(); ++n) m_places.emplace(m_files[n], n);
+  }
+  auto found = m_places.find(file);
+  if (found == m_places.end()) return false;
+  m_next = found->second;
+  return true;
+}
+
 Scan::Scan(IniDocument& database) : m_database(database) {}
 
 bool Scan::isUpToDate(const std::string& file, const zt::fnd::AbsTime& time) {
-  m_filesSeen.insert(file);
+  m_filesSeen.add(file);
   std::string stored;
   if (m_database.GetItem(kRegistrations, file.c_str(), &stored) < 0) return false;
   // Any difference counts, not only a later time: a bundle that is replaced by an older one has
@@ -168,8 +184,8 @@ bool Scan::mergeSection(const IniDocument& fragment, const String& installDirect
   return hasFileName;
 }
 
-bool Scan::isPresent(const std::string& file) const {
-  return m_filesSeen.count(file) != 0 || isThere(file);
+bool Scan::isPresent(std::string_view file) {
+  return m_filesSeen.has(file) || isThere(std::string(file));
 }
 
 bool Scan::isThere(const std::string& file) const { return FileIsThere(file); }

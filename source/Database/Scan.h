@@ -2,7 +2,9 @@
 
 #include <cstdint>
 #include <string>
-#include <unordered_set>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
 
 #include "source/Database/contentsWalk.h"
 #include "zt/fnd/AbsTime.h"
@@ -11,6 +13,22 @@
 class IniDocument;
 
 namespace registrar {
+
+// The files that a scan has met. They are asked for again in nearly the same order, so that the next
+// one in line is mostly the right one; the others are found by a hash.
+class FilesSeen {
+ public:
+  void add(const std::string& file) {
+    m_files.push_back(file);
+    m_places.clear();
+  }
+  bool has(std::string_view file);
+
+ private:
+  std::vector<std::string> m_files;
+  size_t m_next = 0;                                      // in m_files
+  std::unordered_map<std::string_view, size_t> m_places;  // of all of m_files, or empty
+};
 
 // What one comparison of the installation with the database knows, and the changes of the database
 // that it makes. Its user walks the files and their sections.
@@ -46,7 +64,7 @@ class Scan {
                     const std::string& file, const std::string& section, bool changed);
 
   // Whether the file is still in the installation, as far as this user can see.
-  bool isPresent(const std::string& file) const;
+  bool isPresent(std::string_view file);
   // Erases a component whose registration file is gone, but for its items in the list of contents.
   void erase(const std::string& component, const std::string& file);
   // Whether an entry was erased that no file can have made: such must not come back with the next
@@ -64,7 +82,7 @@ class Scan {
                  const std::string& file, const std::string& section, const std::string& item);
 
   IniDocument& m_database;
-  std::unordered_set<std::string> m_filesSeen;
+  FilesSeen m_filesSeen;
   ContentsFiles m_contentsFiles;
   bool m_droppedPlanted = false;
   bool m_isIncomplete = false;  // what was merged since beginFile

@@ -2,6 +2,9 @@
 
 #include <gtest/gtest.h>
 
+#include <string>
+#include <vector>
+
 #include "source/Database/databaseText.h"
 #include "source/vlIniMgr.h"
 #include "tests/support/TempDir.h"
@@ -93,6 +96,21 @@ TEST_F(ScanTest, AFileThatWasSeenIsPresent) {
   EXPECT_TRUE(scan->isPresent("/seen"));
   EXPECT_FALSE(scan->isPresent("/unseen"));
   EXPECT_TRUE(scan->isPresent(addFile("there", "")));
+}
+
+TEST(FilesSeen, AreFoundInAnyOrder) {
+  FilesSeen seen;
+  EXPECT_FALSE(seen.has("/a"));
+  const std::vector<std::string> files = {"/a", "/b", "/c", "/d", "/e", ""};
+  for (const std::string& file : files) seen.add(file);
+  for (const char* wanted : {"/a", "/a", "/b", "/e", "/a", "/d", "/e", "", "/c"}) {
+    EXPECT_TRUE(seen.has(wanted)) << wanted;
+    EXPECT_FALSE(seen.has("/x"));
+  }
+  seen.add("/x");
+  EXPECT_TRUE(seen.has("/x"));
+  EXPECT_TRUE(seen.has("/b"));
+  EXPECT_FALSE(seen.has("/B"));
 }
 
 TEST_F(ScanTest, MergesWhatAComponentBringsAndErasesItAgain) {

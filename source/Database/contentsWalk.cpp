@@ -29,11 +29,13 @@ std::string BaseOf(const std::string& name) {
 std::vector<ContentsItem> ReadContents(const IniDocument& database) {
   std::vector<ContentsItem> items;
   bool inPieces = false;  // The last item may go on with the next piece.
-  int count = database.GetNumberOfItems(registrar::kContents);
+  const IniDocument::Section contents(database, registrar::kContents);
+  const int count = contents.count();
+  items.reserve(static_cast<size_t>(count));
   for (int i = 0; i < count; ++i) {
-    std::string name, value;
-    if (database.GetNthItemName(registrar::kContents, i + 1, &name) < 0) continue;
-    database.GetItem(registrar::kContents, name.c_str(), &value);
+    std::string name = contents.itemName(i + 1);
+    const char* found = contents.value(name.c_str());
+    std::string value = found ? found : "";
     bool piece = IsPiece(name);
     std::string component = piece ? BaseOf(name) : std::move(name);
     // Neighbours only: two runs of one name are two items.

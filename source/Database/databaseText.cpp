@@ -2,6 +2,9 @@
 
 #include <wchar.h>
 
+#include <algorithm>
+
+#include "source/Common/vltcmn.h"
 #include "zt/fnd/osdep/LocaleText.h"
 
 namespace registrar {
@@ -17,6 +20,16 @@ std::string Narrow(const wchar_t* text) {
   char* stop = narrow + zt::fnd::osdep::GetWideToAnsiRequiredBufferLength(text, end, "");
   zt::fnd::osdep::WideToAnsiNoAlloc(text, end, "", narrow, stop);
   return std::string(narrow, stop);
+}
+
+GUID GuidOf(const char* text) {
+  // All characters of a GUID are ASCII, which needs no conversion; others are bad as they are.
+  constexpr size_t kLongest = 38;
+  wchar_t wide[kLongest + 1] = {};
+  const size_t length = strlen(text);
+  if (length > kLongest) return GUID_NULL;
+  std::transform(text, text + length, wide, [](char c) { return static_cast<unsigned char>(c); });
+  return vltGuidFromString2(wide);
 }
 
 }  // namespace registrar

@@ -66,8 +66,11 @@ inline std::string WithoutBraces(std::string text) {
 }
 
 inline std::string Decimal(uint32_t value) { return std::to_string(value); }
-inline uint32_t Number(const std::string& text) {
-  return static_cast<uint32_t>(strtoul(text.c_str(), nullptr, 10));
+inline uint32_t Number(const char* text) {
+  return static_cast<uint32_t>(strtoul(text, nullptr, 10));
 }
+inline uint32_t Number(const std::string& text) { return Number(text.c_str()); }
+// With or without braces; the null GUID for anything else.
+GUID GuidOf(const char* text);
 
 }  // namespace registrar

@@ -13,45 +13,35 @@ using zt::fnd::String;
 namespace registrar {
 namespace {
 
-class Section {
- public:
-  Section(const IniDocument& database, const std::string& name)
-      : m_database(database), m_name(name) {}
+std::optional<std::string> Text(const IniDocument::Section& section, const char* item) {
+  const char* value = section.value(item);
+  return value ? std::optional<std::string>(value) : std::nullopt;
+}
 
-  bool has(const char* item) const { return m_database.ItemExists(m_name.c_str(), item) >= 0; }
-  std::optional<std::string> text(const char* item) const {
-    std::string value;
-    if (m_database.GetItem(m_name.c_str(), item, &value) < 0) return std::nullopt;
-    return value;
-  }
-  uint32_t number(const char* item, uint32_t fallback) const {
-    std::string value = text(item).value_or("");
-    return value.empty() ? fallback : Number(value);
-  }
+uint32_t NumberOr(uint32_t fallback, const IniDocument::Section& section, const char* item) {
+  const char* value = section.value(item);
+  return value && *value ? Number(value) : fallback;
+}
 
- private:
-  const IniDocument& m_database;
-  const std::string& m_name;
-};
-
-void ReadDictionary(const Section& section, RecordText* record) {
+void ReadDictionary(const IniDocument::Section& section, RecordText* record) {
   record->type = vltComponentDataDictionary;
   record->version = kDictionaryVersion;
-  record->prefix = section.text(kPrefix);
-  record->schemaVersion = section.number(kSchemaVersion, 0);
-  record->fragmentRegistered = section.number(kFragmentRegistered, 0);
-  record->lastInstalledSchemaVersion = section.number(kLastInstalledSchemaVersion, kNeverInstalled);
+  record->prefix = Text(section, kPrefix);
+  record->schemaVersion = NumberOr(0, section, kSchemaVersion);
+  record->fragmentRegistered = NumberOr(0, section, kFragmentRegistered);
+  record->lastInstalledSchemaVersion =
+      NumberOr(kNeverInstalled, section, kLastInstalledSchemaVersion);
 }
 
 }  // namespace
 
 RecordText ReadRecord(const IniDocument& database, const std::string& name,
                       EmptyFileName emptyFileName) {
-  Section section(database, name);
+  const IniDocument::Section section(database, name.c_str());
   RecordText record;
-  std::string identifier = section.text(kIdentifier).value_or("");
-  if (!identifier.empty()) record.identifier = vltGuidFromString2(Widen(identifier).c_str());
-  record.file = section.text(kFileName);
+  const char* identifier = section.value(kIdentifier);
+  if (identifier && *identifier) record.identifier = GuidOf(identifier);
+  record.file = Text(section, kFileName);
   if (section.has(kSchemaVersion)) {
     ReadDictionary(section, &record);
     return record;
@@ -60,7 +50,7 @@ RecordText ReadRecord(const IniDocument& database, const std::string& name,
   record.type = vltComponentObjectExpert;
   if (!section.has(kPnp)) return record;
   record.type = vltComponentResourceExpert;
-  record.pnp = section.text(kPnp);
+  record.pnp = Text(section, kPnp);
   if (emptyFileName == EmptyFileName::IsNone && record.file && record.file->empty()) {
     record.file.reset();
   }

@@ -5,6 +5,8 @@
 #include <limits.h>
 #include <sys/stat.h>
 
+#include <tuple>
+
 #include "source/Database/databaseText.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/DateTime.h"
@@ -81,16 +83,17 @@ void AppendRegistrationFiles(const String& directory, const String& mask,
   Vector<String> names = zt::fnd::osdep::FindFiles().getFilenames(path::Join(directory, mask));
   if (names.empty()) return;
   const FilesBelow below(Narrow(directory));
-  const String registrationFile(kRegistrationFile);
-  RegistrationFiles::value_type found;
-  auto& [file, time] = found;
-  for (const String& name : names) {
-    file = path::IsAbs(name) ? path::Join(name, registrationFile)
-                             : path::Join(path::Join(directory, name), registrationFile);
-    const std::string narrow = Narrow(file);
+  const String inBundle(L"/" + String(kRegistrationFile));
+  const std::string narrowInBundle = Narrow(inBundle);
+  for (String& bundle : names) {
+    if (!path::IsAbs(bundle)) bundle = path::Join(directory, bundle);
+    const std::string file = Narrow(bundle) + narrowInBundle;
     // The path becomes the name of an item, where a line end would write lines of its own.
-    if (HasLineEnd(narrow)) continue;
-    if (RegistrationTime(below, narrow, &time)) files.push_back(found);
+    if (HasLineEnd(file)) continue;
+    zt::fnd::AbsTime time;
+    if (!RegistrationTime(below, file, &time)) continue;
+    files.emplace_back(std::piecewise_construct, std::forward_as_tuple(bundle, inBundle),
+                       std::forward_as_tuple(time));
   }
 }
 

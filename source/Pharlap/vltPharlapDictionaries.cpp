@@ -107,13 +107,13 @@ HRESULT CvltPharlapRegistrar::HasDDChanged(CvlIniMgr& fragment, const wchar_t* w
   GUID known = GUID_NULL;
   HRESULT result =
       ReadOrWarn(*m_registrationIni, section, kIdentifier, false, kNoIdentifier, &text);
-  if (result >= 0 && !text.empty()) known = vltGuidFromString2(Widen(text).c_str());
+  if (result >= 0 && !text.empty()) known = GuidOf(text.c_str());
   ReadOrWarn(*m_registrationIni, section, kFileName, true, kNoFileName, &text);
   ReadOrWarn(*m_registrationIni, section, kSchemaVersion, false, kNoSchemaVersion, &text);
 
   GUID brought = GUID_NULL;
   result = ReadOrWarn(fragment, section, kIdentifier, false, kNoFragmentIdentifier, &text);
-  if (result >= 0 && !text.empty()) brought = vltGuidFromString2(Widen(text).c_str());
+  if (result >= 0 && !text.empty()) brought = GuidOf(text.c_str());
   if (brought == GUID_NULL || !(brought == known)) return result;
   HRESULT versionResult = fragment.GetItem(section.c_str(), kSchemaVersion, &text);
   return versionResult < 0 ? versionResult : result;

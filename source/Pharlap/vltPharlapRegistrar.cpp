@@ -9,6 +9,8 @@
 #include <string.h>
 #include <wchar.h>
 
+#include <vector>
+
 #include "source/Common/vltFileSecurity.h"
 #include "source/Common/vltResultOf.h"
 #include "source/Common/vltcmn.h"
@@ -134,12 +136,14 @@ void CvltPharlapRegistrar::registerBuiltInDictionary() {
 }
 
 void CvltPharlapRegistrar::readComponents() {
-  int count = m_registrationIni->GetNumberOfItems(kComponents);
-  for (int n = 1; n <= count; ++n) {
-    std::string section;
-    if (m_registrationIni->GetNthItemName(kComponents, n, &section) < 0 || section.empty())
-      continue;
-    ReadComponent(Widen(section).c_str());
+  // As they are before the first is read, which may put its file's directory into the database.
+  std::vector<String> names;
+  const IniDocument::Section list(*m_registrationIni, kComponents);
+  const int count = list.count();
+  names.reserve(static_cast<size_t>(count));
+  for (int n = 1; n <= count; ++n) names.emplace_back(list.itemName(n));
+  for (const String& name : names) {
+    if (!name.empty()) ReadComponent(name.c_str());
   }
 }
 

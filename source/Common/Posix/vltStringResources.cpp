@@ -71,8 +71,8 @@ class Warnings final : public registrar::ResourceObserver {
 
 Warnings s_warnings;
 
-// Finds a name in a text that comes in blocks, in the case rules of names. Horspool's search, which
-// steps over what cannot be the end of the name.
+// Finds a name in a text that comes in blocks, in the case rules of names. Looks for one of its
+// characters, and compares the whole where that is.
 class NameSearch {
  public:
   explicit NameSearch(const std::string& name) {
@@ -82,30 +82,39 @@ class NameSearch {
                     std::find_if_not(name.rbegin(), std::reverse_iterator(first), isSpace).base());
     for (size_t c = 0; c < m_folded.size(); ++c)
       m_folded[c] = static_cast<unsigned char>(toupper(static_cast<int>(c)));
-    m_step.fill(m_wanted.size());
-    for (size_t i = 0; i + 1 < m_wanted.size(); ++i)
-      m_step[fold(m_wanted[i])] = m_wanted.size() - 1 - i;
+    // Letters are in every word; others are rare.
+    auto isLetter = [](char c) { return isalpha(static_cast<unsigned char>(c)) != 0; };
+    auto rare = std::find_if_not(m_wanted.begin(), m_wanted.end(), isLetter);
+    if (rare != m_wanted.end()) m_anchor = static_cast<size_t>(rare - m_wanted.begin());
+    for (size_t c = 0; !m_wanted.empty() && c < m_folded.size(); ++c) {
+      if (m_folded[c] == fold(m_wanted[m_anchor])) m_forms += static_cast<char>(c);
+    }
   }
 
   size_t size() const { return m_wanted.size(); }
   bool isIn(std::string_view text) const {
     if (m_wanted.empty()) return true;
+    return std::any_of(m_forms.begin(), m_forms.end(), [&](char c) { return isIn(text, c); });
+  }
+
+ private:
+  unsigned char fold(char c) const { return m_folded[static_cast<unsigned char>(c)]; }
+
+  // With this form of the character.
+  bool isIn(std::string_view text, char form) const {
     auto same = [this](char a, char b) { return fold(a) == fold(b); };
-    for (size_t at = size() - 1; at < text.size(); at += m_step[fold(text[at])]) {
-      if (std::equal(m_wanted.rbegin(), m_wanted.rend(),
-                     text.rend() - static_cast<ptrdiff_t>(at) - 1, same)) {
-        return true;
-      }
+    for (size_t at = text.find(form, m_anchor); at != text.npos; at = text.find(form, at + 1)) {
+      const std::string_view rest = text.substr(at - m_anchor);
+      if (rest.size() < size()) return false;
+      if (std::equal(m_wanted.begin(), m_wanted.end(), rest.begin(), same)) return true;
     }
     return false;
   }
 
- private:
-  size_t fold(char c) const { return m_folded[static_cast<unsigned char>(c)]; }
-
   std::string m_wanted;  // without white space around it
+  size_t m_anchor = 0;   // the character that is looked for
+  std::string m_forms;   // all characters that fold as that one does
   std::array<unsigned char, 256> m_folded;
-  std::array<size_t, 256> m_step;
 };
 
 // False where the parser may join what stands apart in the bytes: see ztini/TextLines.h.
@@ -206,9 +215,21 @@ vltStringResources::Database* vltStringResources::databaseFor(const std::string&
   return database.get();
 }
 
+namespace {
+
+// As wcsstr finds it, which goes character by character.
+bool IsOfPreviousVersion(const wchar_t* file) {
+  for (const wchar_t* l = wcschr(file, L'L'); l; l = wcschr(l + 1, L'L')) {
+    if (l != file && l[-1] == L'/' && wcsncmp(l, L"Last/", 5) == 0) return true;
+  }
+  return false;
+}
+
+}  // namespace
+
 // The answer to most questions, without a conversion of their texts.
 bool vltStringResources::isKnownMissing(const wchar_t* file, const wchar_t* key) const {
-  return file && key && !m_missing.empty() && m_missing == key && !wcsstr(file, L"/Last/") &&
+  return file && key && !m_missing.empty() && m_missing == key && !IsOfPreviousVersion(file) &&
          !s_warnings.wantsAll();
 }
 

@@ -157,14 +157,16 @@ TEST(vltStringResources, AnswersAreTheParsersWhateverTheBytes) {
       "",
       "Key",
       list + head + "K\u00c9Y = \"v\"\n",
+      list + head + "__ = \"u\"\n_ = \"w\"\nA_K_1_K_1 = \"x\"\nk_1 = \"v\"\n",
+      list + head + "K_",
   };
   for (const std::string& bytes : databases) {
     Database root(bytes);
     IniStructForwardReferenceTag* document = registrar::ResourceTexts::NewDocument();
     IniReadFromFile(document, root.database().c_str());
     registrar::ResourceTexts parsed(document, nullptr);
-    for (const wchar_t* key :
-         {L"Key", L"kEY", L" key\t", L"Ke", L"K\u00c9y", L"No such key", L""}) {
+    for (const wchar_t* key : {L"Key", L"kEY", L" key\t", L"Ke", L"K\u00c9y", L"No such key", L"",
+                               L"K_1", L" k_1 ", L"_K", L"_", L"1", L"k_11"}) {
       registrar::ResourceTexts::Query query{";", "f", zt::fnd::AnsiString(key).c_str(), 1024, ""};
       parsed.answer(query);
       SCOPED_TRACE(bytes + " asked for \"" + query.key + "\"");
