@@ -7,6 +7,7 @@
 #include <optional>
 
 #include "source/Common/vltInterfaces.h"
+#include "source/GuidMap.h"
 #include "source/vlrHelpers.h"
 #include "source/xcomponent.h"
 #include "zt/fnd/Guid.h"
@@ -20,10 +21,10 @@
 //
 //   CvlrProtectedMap<GUID, int>::Hold map(protectedMap);
 //   map->erase(key);
-template <class Key, class Value>
+template <class Key, class Value, class Ordered = std::map<Key, Value>>
 class CvlrProtectedMap {
  public:
-  using Map = std::map<Key, Value>;
+  using Map = Ordered;
 
   // Recursive: the holder of one may make another.
   class SCOPED_CAPABILITY Hold {
@@ -111,7 +112,8 @@ class CvltRegistrar : public IvltRegistrar2 {
   static _vltComponentType MapStringToType(const wchar_t* text);
 
  protected:
-  using ComponentMap = CvlrProtectedMap<GUID, std::unique_ptr<CvltComponent>>;
+  using OwnedComponent = std::unique_ptr<CvltComponent>;
+  using ComponentMap = CvlrProtectedMap<GUID, OwnedComponent, GuidMap<OwnedComponent>>;
 
   // All identifiers in map order.
   zt::fnd::Vector<GUID> SnapshotIdentifiers();

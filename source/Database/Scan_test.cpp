@@ -98,7 +98,7 @@ TEST_F(ScanTest, AFileThatWasSeenIsPresent) {
   EXPECT_TRUE(scan->isPresent(addFile("there", "")));
 }
 
-TEST(FilesSeen, AreFoundInAnyOrder) {
+TEST(ScanFilesSeen, AreFoundInAnyOrder) {
   FilesSeen seen;
   EXPECT_FALSE(seen.has("/a"));
   const std::vector<std::string> files = {"/a", "/b", "/c", "/d", "/e", ""};
