@@ -21,7 +21,6 @@
 #include <utility>
 #include <vector>
 
-#include "source/Cmd5vlt.h"
 #include "source/Common/vltFailure.h"
 #include "source/Common/vltFileSecurity.h"
 #include "source/Common/vltResultOf.h"
@@ -173,13 +172,26 @@ bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest, Digested* vali
 }
 
 // A start that finds nothing new saves what it has read. Comparing that is much quicker than MD5.
-IniSidecar::Digest CvlIniMgr::digestOf(const unsigned char* text, size_t sizeBytes) {
-  Digested known = std::exchange(m_validated, Digested());
-  if (sizeBytes == 0 || known.sizeBytes != sizeBytes ||
-      memcmp(known.bytes.get(), text, sizeBytes) != 0) {
-    GetMD5Checksum(text, sizeBytes, known.digest.data());
+// Of a text that begins as the last one, the digest goes on from there.
+IniSidecar::Digest CvlIniMgr::digestOf(const unsigned char* text, size_t sizeBytes,
+                                       size_t unchangedBytes) {
+  const Digested known = std::exchange(m_validated, Digested());
+  if (sizeBytes != 0 && known.sizeBytes == sizeBytes &&
+      memcmp(known.bytes.get(), text, sizeBytes) == 0) {
+    m_beginning = Beginning();
+    return known.digest;
   }
-  return known.digest;
+  if (m_beginning.sizeBytes > unchangedBytes) m_beginning = Beginning();
+  auto add = [text](Cmd5vlt* md5, size_t from, size_t to) {
+    md5->addString(text + from, static_cast<unsigned>(to - from));
+  };
+  add(&m_beginning.md5, m_beginning.sizeBytes, unchangedBytes);
+  m_beginning.sizeBytes = unchangedBytes;
+  Cmd5vlt md5 = m_beginning.md5;
+  add(&md5, unchangedBytes, sizeBytes);
+  IniSidecar::Digest digest;
+  md5.getDigest(digest.data());
+  return digest;
 }
 
 namespace {
@@ -323,10 +335,14 @@ HRESULT CvlIniMgr::writeDocument(IniSidecar::Digest* digest, bool* isInPlace) {
     CvlIniMgr* of;
     IniSidecar::Digest* digest;
   } wanted = {this, digest};
-  IniTextFunction takeDigest = [](void* context, const char* text, size_t sizeBytes) {
+  IniTextFunction takeDigest = [](void* context, const char* text, size_t sizeBytes,
+                                  size_t unchangedBytes) {
     auto* to = static_cast<Wanted*>(context);
-    *to->digest = to->of->digestOf(reinterpret_cast<const unsigned char*>(text), sizeBytes);
+    *to->digest =
+        to->of->digestOf(reinterpret_cast<const unsigned char*>(text), sizeBytes, unchangedBytes);
   };
+  // Of a text that is not digested nothing is known.
+  if (!digest) m_beginning = Beginning();
   int32_t status = IniWriteToFileAndTell(m_ini, m_fileName.c_str(), digest ? takeDigest : nullptr,
                                          &wanted, &m_known);
   *isInPlace = m_known.isKnown();

@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "source/Cmd5vlt.h"
 #include "source/Common/vltTypes.h"
 #include "source/IniDocument.h"
 #include "source/IniFileLock.h"
@@ -111,7 +112,7 @@ class CvlIniMgr : public IniDocument {
   };
   static bool Digest(int fd, Digested* of);
   static bool ValidateFile(int fd, unsigned char const* digest, Digested* validated);
-  IniSidecar::Digest digestOf(const unsigned char* text, size_t sizeBytes);
+  IniSidecar::Digest digestOf(const unsigned char* text, size_t sizeBytes, size_t unchangedBytes);
   static int32_t GetFileLength(int fd);
   static void GetMD5Checksum(const unsigned char* data, unsigned long lengthBytes,
                              unsigned char* digest);
@@ -132,8 +133,14 @@ class CvlIniMgr : public IniDocument {
   bool m_lockOnly;
   bool m_saveOnDestroy;
   IniDurability m_durability = IniDurability::Synced;
-  FileState m_known;           // of the file as it was last read or written
-  Digested m_validated;        // what the opening found good, until a write needs a digest
+  FileState m_known;     // of the file as it was last read or written
+  Digested m_validated;  // what the opening found good, until a write needs a digest
+  // The digest of the beginning of what was written last.
+  struct Beginning {
+    size_t sizeBytes = 0;
+    Cmd5vlt md5;
+  };
+  Beginning m_beginning;
   bool m_lockWasLost = false;  // and the file has not been compared with m_known since
   std::unique_ptr<IniFileLock> m_lock;
 };

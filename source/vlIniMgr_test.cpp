@@ -9,6 +9,7 @@
 
 #include <filesystem>
 #include <iterator>
+#include <random>
 #include <thread>
 
 #include "source/Common/vltFileSecurity.h"
@@ -314,6 +315,46 @@ TEST(vlIniMgr, TheDigestIsThatOfWhatIsWritten) {
     ASSERT_EQ(ini.WriteAndGetDigest(&digest), S_OK);
     EXPECT_EQ(ReadBytes(file), std::string("[s]\na = ") + value + "\n");
     EXPECT_EQ(Hex(std::string(digest.begin(), digest.end())), Md5Sum(file));
+  }
+}
+
+// The digest goes on from where the text before was the same: edits of its beginning, its middle and
+// its end, longer and shorter, with saves between them that ask for no digest, fail, or find another
+// file.
+TEST(vlIniMgr, TheDigestIsThatOfTheFileAfterAnyEdits) {
+  TempDir dir;
+  const std::string file = dir / "x.ini";
+  CvlIniMgr ini = CvlIniMgr::OpenForUpdate(file);
+  std::mt19937 random(1);
+  auto below = [&](unsigned end) { return static_cast<unsigned>(random() % end); };
+  for (int round = 0; round < 300; ++round) {
+    const std::string section = "s" + std::to_string(below(40));
+    if (below(8) == 0) {
+      ini.EraseSection(section.c_str());
+    } else {
+      const std::string item = "item" + std::to_string(below(20));
+      ini.SetItem(section.c_str(), item.c_str(), std::string(below(60), 'v').c_str(), true);
+    }
+    switch (below(12)) {
+      case 0:
+        EXPECT_EQ(ini.Write(), S_OK);
+        break;
+      case 1: {
+        // No file can take the place of a directory with entries.
+        std::filesystem::rename(file, dir / "kept");
+        std::filesystem::create_directories(file + "/in");
+        IniSidecar::Digest none;
+        EXPECT_LT(ini.WriteAndGetDigest(&none), 0);
+        std::filesystem::remove_all(file);
+        std::filesystem::rename(dir / "kept", file);
+        break;
+      }
+      default:
+        break;
+    }
+    IniSidecar::Digest digest = {};
+    ASSERT_EQ(ini.WriteAndGetDigest(&digest), S_OK) << round;
+    ASSERT_EQ(Hex(std::string(digest.begin(), digest.end())), Md5Sum(file)) << round;
   }
 }
 

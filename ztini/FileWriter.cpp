@@ -21,9 +21,10 @@ int32_t IniWriteToFileAndTell(IniStructForwardReferenceTag* doc, const char* pat
   ztini::FileReplacement file(path, doc->writeOptions);
   int32_t status = file.open();
   ztini::TextBuffer text;
-  if (status == 0) status = ztini::IniRender(doc, &text);
+  size_t unchanged = 0;
+  if (status == 0) status = ztini::IniRender(doc, &text, seen ? &unchanged : nullptr);
   if (status == 0) status = file.write(text.text(), text.size());
-  if (status == 0 && seen) seen(context, text.text(), text.size());
+  if (status == 0 && seen) seen(context, text.text(), text.size(), unchanged);
   IniFileState state;
   if (status == 0) status = file.commit(doc->durability, &state);
   if (status < 0) return status;

@@ -254,6 +254,15 @@ size_t BlockFor(size_t sizeBytes) {
   return (least / step + 1) * step;
 }
 
+// Bytes that both texts begin with, in whole blocks.
+size_t SharedStart(std::string_view a, std::string_view b) {
+  constexpr size_t kBlock = 256;
+  const size_t end = std::min(a.size(), b.size());
+  size_t at = 0;
+  while (at + kBlock <= end && memcmp(a.data() + at, b.data() + at, kBlock) == 0) at += kBlock;
+  return at;
+}
+
 }  // namespace
 
 int32_t IniWrite(IniStructForwardReferenceTag* doc, IniLineOutputFunction output, void* stream) {
@@ -273,7 +282,8 @@ int32_t IniFileOutputFunc(void* file, const char* line) {
   return status < 0 ? status : ztini_WriteStringToFile(stream, "\n");
 }
 
-int32_t ztini::IniRender(IniStructForwardReferenceTag* doc, TextBuffer* text) {
+int32_t ztini::IniRender(IniStructForwardReferenceTag* doc, TextBuffer* text,
+                         size_t* unchangedBytes) {
   const bool marked = (doc->writeOptions & kIniWriteMark) != 0;
   // The sections' places in it are overwritten one by one, so it serves once only.
   const TextBuffer before = std::move(doc->rendering);
@@ -281,7 +291,10 @@ int32_t ztini::IniRender(IniStructForwardReferenceTag* doc, TextBuffer* text) {
   if (marked) text->append(kUtf8Mark);
   TextInMemory lines(text, before.view(), marked);
   const int32_t status = DocumentWriter(doc, &lines).write();
-  return status < 0 ? status : lines.finish();
+  if (status < 0) return status;
+  const int32_t finished = lines.finish();
+  if (unchangedBytes) *unchangedBytes = SharedStart(before.view(), text->view());
+  return finished;
 }
 
 int32_t ztini_IniWriteToFileHelper(IniStructForwardReferenceTag* doc, FILE* file) {

@@ -241,8 +241,10 @@ struct IniFileState {
 };
 IniFileState IniFileStateOf(const struct stat& status);
 
-// Takes all bytes of a file that is about to be put in place.
-using IniTextFunction = void (*)(void* context, const char* text, size_t sizeBytes);
+// Takes all bytes of a file that is about to be put in place. So many of them at least, from the
+// first, are as they were in the document's last save; 0 where that is not known.
+using IniTextFunction = void (*)(void* context, const char* text, size_t sizeBytes,
+                                 size_t unchangedBytes);
 
 // IniWriteToFile for a caller who goes on with what was written: passes the bytes on, if `seen` is
 // not null, and sets *written to the state of the file. That stays unknown on a failure, and where
