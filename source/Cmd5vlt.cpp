@@ -5,8 +5,13 @@
 
 #include <string.h>
 
+#include <algorithm>
 #include <bit>
 #include <utility>
+
+#include "zt/fnd/ByteOrder.h"
+
+namespace little_endian = zt::fnd::little_endian;
 
 namespace {
 
@@ -32,8 +37,10 @@ constexpr unsigned kWordStart[4] = {0, 1, 5, 0};
 
 // Step i of the 64. Each step waits for the b of the one before, so what does not need b is added
 // first: the auxiliary functions of RFC 1321 are written so that b comes in as late as possible.
+// Inlined at all times: a call in the loop over the blocks would keep the state in memory.
 template <unsigned i>
-inline void Step(uint32_t& a, uint32_t b, uint32_t c, uint32_t d, const uint32_t* words) {
+[[gnu::always_inline]] inline void Step(uint32_t& a, uint32_t b, uint32_t c, uint32_t d,
+                                        const uint32_t* words) {
   constexpr unsigned round = i / 16;
   a += words[(kWordStart[round] + i * kWordStep[round]) % 16] + kSines[i];
   if constexpr (round == 0) {
@@ -51,7 +58,8 @@ inline void Step(uint32_t& a, uint32_t b, uint32_t c, uint32_t d, const uint32_t
 
 // Four steps bring every word of the state back to its place.
 template <unsigned i>
-inline void FourSteps(uint32_t& a, uint32_t& b, uint32_t& c, uint32_t& d, const uint32_t* words) {
+[[gnu::always_inline]] inline void FourSteps(uint32_t& a, uint32_t& b, uint32_t& c, uint32_t& d,
+                                             const uint32_t* words) {
   Step<i>(a, b, c, d, words);
   Step<i + 1>(d, a, b, c, words);
   Step<i + 2>(c, d, a, b, words);
@@ -59,8 +67,9 @@ inline void FourSteps(uint32_t& a, uint32_t& b, uint32_t& c, uint32_t& d, const 
 }
 
 template <unsigned... quarter>
-inline void AllSteps(uint32_t& a, uint32_t& b, uint32_t& c, uint32_t& d, const uint32_t* words,
-                     std::integer_sequence<unsigned, quarter...>) {
+[[gnu::always_inline]] inline void AllSteps(uint32_t& a, uint32_t& b, uint32_t& c, uint32_t& d,
+                                            const uint32_t* words,
+                                            std::integer_sequence<unsigned, quarter...>) {
   (FourSteps<4 * quarter>(a, b, c, d, words), ...);
 }
 
@@ -76,14 +85,16 @@ void Cmd5vlt::addString(const unsigned char* data, unsigned int lengthBytes) {
   if (m_count[0] < bits) ++m_count[1];
   m_count[1] += lengthBytes >> 29;
   while (lengthBytes > 0) {
-    unsigned taken = lengthBytes < kBlock - used ? lengthBytes : kBlock - used;
-    if (taken == kBlock) {
-      Transform(m_state, data);  // A whole block needs no copy.
+    unsigned taken;
+    if (used == 0 && lengthBytes >= kBlock) {
+      taken = lengthBytes / kBlock * kBlock;
+      Transform(m_state, data, lengthBytes / kBlock);  // Whole blocks need no copy.
     } else {
+      taken = std::min(lengthBytes, kBlock - used);
       memcpy(m_buffer + used, data, taken);
-      if (used + taken == kBlock) Transform(m_state, m_buffer);
+      used = (used + taken) % kBlock;
+      if (used == 0) Transform(m_state, m_buffer, 1);
     }
-    used = (used + taken) % kBlock;
     data += taken;
     lengthBytes -= taken;
   }
@@ -102,27 +113,32 @@ void Cmd5vlt::getDigest(unsigned char* digest16) {
   memset(static_cast<void*>(this), 0, sizeof *this);
 }
 
-void Cmd5vlt::Transform(unsigned int* state, const unsigned char* block) {
-  uint32_t words[16];
-  Decode(words, block, kBlock);
+void Cmd5vlt::Transform(unsigned int* state, const unsigned char* blocks, unsigned int count) {
+  // The state stays in registers from block to block: the first step waits for it, and would wait
+  // for a store and a load as well.
   uint32_t a = state[0], b = state[1], c = state[2], d = state[3];
-  AllSteps(a, b, c, d, words, std::make_integer_sequence<unsigned, 16>());
-  state[0] += a;
-  state[1] += b;
-  state[2] += c;
-  state[3] += d;
+  for (; count > 0; --count, blocks += kBlock) {
+    uint32_t words[16];
+    Decode(words, blocks, kBlock);
+    const uint32_t oldA = a, oldB = b, oldC = c, oldD = d;
+    AllSteps(a, b, c, d, words, std::make_integer_sequence<unsigned, 16>());
+    a += oldA;
+    b += oldB;
+    c += oldC;
+    d += oldD;
+  }
+  state[0] = a;
+  state[1] = b;
+  state[2] = c;
+  state[3] = d;
 }
 
 void Cmd5vlt::Encode(unsigned char* out, const unsigned int* in, unsigned int lengthBytes) {
-  for (unsigned i = 0; i < lengthBytes; ++i) {
-    // The algorithm is little-endian on every host.
-    out[i] = static_cast<unsigned char>(in[i / 4] >> 8 * (i % 4));
-  }
+  for (unsigned i = 0; i < lengthBytes; i += 4) little_endian::Put(out + i, in[i / 4]);
 }
 
 void Cmd5vlt::Decode(unsigned int* out, const unsigned char* in, unsigned int lengthBytes) {
   for (unsigned i = 0; i < lengthBytes; i += 4) {
-    out[i / 4] = in[i] | static_cast<uint32_t>(in[i + 1]) << 8 |
-                 static_cast<uint32_t>(in[i + 2]) << 16 | static_cast<uint32_t>(in[i + 3]) << 24;
+    out[i / 4] = little_endian::Get<uint32_t>(in + i);
   }
 }

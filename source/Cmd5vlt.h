@@ -14,7 +14,8 @@ class Cmd5vlt {
   void getDigest(unsigned char* digest16);
 
  private:
-  void Transform(unsigned int* state, const unsigned char* block);
+  // Adds `count` blocks of 64 bytes to the state.
+  static void Transform(unsigned int* state, const unsigned char* blocks, unsigned int count);
   static void Encode(unsigned char* out, const unsigned int* in, unsigned int lengthBytes);
   static void Decode(unsigned int* out, const unsigned char* in, unsigned int lengthBytes);
 

@@ -64,6 +64,18 @@ TEST(Cmd5vlt, PaddingAtEveryLengthAroundABlock) {
   EXPECT_EQ(Digest(std::string(64, ' ')), "4763107ec64e92a517d228fb2743cb96");
 }
 
+TEST(Cmd5vlt, ManyBlocksAtOnceGiveTheDigestOfSingleBytes) {
+  // By the system's md5sum, as above.
+  const char* expected = "7707d6ae4e027c70eea2a935c2296f21";
+  std::string text(1000000, 'a');
+  EXPECT_EQ(Digest(text), expected);
+  Cmd5vlt md5;
+  for (char c : text) Add(md5, std::string(1, c));
+  unsigned char digest[16];
+  md5.getDigest(digest);
+  EXPECT_EQ(Hex(digest), expected);
+}
+
 TEST(Cmd5vlt, AfterTheDigestTheObjectIsZeroed) {
   Cmd5vlt md5;
   unsigned char digest[16];
