@@ -96,7 +96,7 @@ void RunStreams() {
   Run({"13",
        "memory stream, 4 bytes a million times",
        [] {
-         CztComPtr<CztMemoryStream> stream(CztMemoryStream::CreateStream());
+         auto stream = CztComPtr<CztMemoryStream>::Attach(CztMemoryStream::CreateStream());
          unsigned done = 0;
          for (int i = 0; i < kWrites; ++i) stream->Write(&i, sizeof i, &done);
        },
