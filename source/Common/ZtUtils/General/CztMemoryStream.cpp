@@ -41,15 +41,16 @@ HRESULT CztMemoryStream::Read(void* buffer, unsigned int count, unsigned int* do
 }
 
 HRESULT CztMemoryStream::Write(const void* buffer, unsigned int count, unsigned int* done) {
-  if (done) *done = 0;
   const int64_t end = m_cursor + int64_t{sizeof(uint32_t)};
   // What streams are mostly made of, where there is space; a call of memcpy would take longer.
-  if (count != sizeof(uint32_t) || !buffer || m_external || m_cursor < 0 || end > m_capacity) {
+  if (count != sizeof(uint32_t) || !buffer || m_external || m_cursor < 0 || end > m_capacity)
+      [[unlikely]] {
     return writeAny(buffer, count, done);
   }
   memcpy(m_begin + m_cursor, buffer, sizeof(uint32_t));
   m_cursor = end;
-  m_size = std::max(m_size, static_cast<uint32_t>(end));
+  // A branch: the larger of the two without one would wait for the size of the write before.
+  if (end > m_size) m_size = static_cast<uint32_t>(end);
   if (done) *done = sizeof(uint32_t);
   return S_OK;
 }
@@ -57,6 +58,7 @@ HRESULT CztMemoryStream::Write(const void* buffer, unsigned int count, unsigned 
 // Out of line, so that the usual write saves no registers.
 [[gnu::noinline]] HRESULT CztMemoryStream::writeAny(const void* buffer, unsigned int count,
                                                     unsigned int* done) {
+  if (done) *done = 0;
   if (m_external) return E_FAIL;
   if (m_cursor < 0 || (!buffer && count > 0)) return E_INVALIDARG;
   uint64_t end = static_cast<uint64_t>(m_cursor) + count;
