@@ -96,8 +96,7 @@ void Run(const Contest& contest) {
   }
 }
 
-void Require(bool condition, const char* what) {
-  if (condition) return;
+void Fail(const char* what) {
   fprintf(stderr, "peers: %s\n", what);
   exit(1);
 }

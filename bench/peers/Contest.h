@@ -34,6 +34,9 @@ void Run(const Contest& contest);
 void PrintHead();
 
 // Ends the program with a message: a result that is wrong has no time.
-void Require(bool condition, const char* what);
+[[noreturn]] void Fail(const char* what);
+inline void Require(bool condition, const char* what) {
+  if (!condition) Fail(what);
+}
 
 }  // namespace peers
