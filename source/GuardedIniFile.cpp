@@ -20,7 +20,7 @@ using zt::fnd::String;
 namespace {
 
 // Its answer does not matter: nothing is allocated here.
-void Pass(const char* hookPoint) { vltTestHook(hookPoint); }
+void Pass(const char* hookPoint) { vlt::hook::Strikes(hookPoint); }
 
 void Trace(const char* message) {
   if (message) vltTraceError("%s", message);
@@ -38,7 +38,7 @@ std::unique_ptr<CvlIniMgr> GuardedIniFile::create(const char* hookPoint,
   if (!m_kind.openSignature) {
     return std::make_unique<CvlIniMgr>(m_file.c_str(), false, digest, false, m_kind.useEscapes);
   }
-  if (vltTestHook(hookPoint)) return nullptr;
+  if (vlt::hook::Strikes(hookPoint)) return nullptr;
   return std::unique_ptr<CvlIniMgr>(
       new (std::nothrow) CvlIniMgr(m_file.c_str(), false, digest, false, m_kind.useEscapes));
 }

@@ -150,7 +150,7 @@ HRESULT AppendArray(IvltObject* object, unsigned id, const char* hookPoint, Stri
   // Asked for with a null buffer first. The array may change until the second call, which gets its
   // own count.
   if (result >= 0 && count > 0) {
-    if (vltTestHook(hookPoint)) return ReportOutOfMemory();
+    if (vlt::hook::Strikes(hookPoint)) return ReportOutOfMemory();
     ElementBuffer<Kind> buffer(count);
     if (!buffer) return ReportOutOfMemory();
     result = buffer.fill(object, id);

@@ -61,7 +61,7 @@ Vector<GUID> CvltBindingClasses::GetComponentVector() const {
   Vector<GUID> components;
   try {
     for (const auto& [component, classes] : m_table) {
-      if (components.size()) vltTestHook(vlt::hook::kGetComponentVector);
+      if (components.size()) vlt::hook::Strikes(vlt::hook::kGetComponentVector);
       components.push_back(component);
     }
   } catch (const std::bad_alloc&) {
@@ -91,7 +91,7 @@ void vltAddBindingClasses(const _vltComponent2* record, const CvltBindingClasses
     // Before the first entry: the undo below must not need memory.
     entered.reserve(wanted.size());
     for (unsigned i = 0; i < wanted.size(); ++i) {
-      if (i == 1) vltTestHook(vlt::hook::kAddBindingClass);
+      if (i == 1) vlt::hook::Strikes(vlt::hook::kAddBindingClass);
       entered.push_back(map->emplace(wanted[i], record->identifier));
     }
   } catch (const std::bad_alloc&) {
@@ -117,7 +117,7 @@ HRESULT vltGetComponentsForBindingClass(GUID bindingClass, unsigned int* count,
   Vector<GUID> found;
   try {
     for (auto entry = begin; entry != end; ++entry) {
-      vltTestHook(vlt::hook::kCopyComponentOfClass);
+      vlt::hook::Strikes(vlt::hook::kCopyComponentOfClass);
       found.push_back(entry->second);
     }
   } catch (const std::bad_alloc&) {
@@ -126,7 +126,9 @@ HRESULT vltGetComponentsForBindingClass(GUID bindingClass, unsigned int* count,
   }
   size_t sizeBytes = found.size() * sizeof(GUID);
   void* array = nullptr;
-  if (!vltTestHook(vlt::hook::kGetComponentsForBindingClass)) array = vltTaskMemAlloc(sizeBytes);
+  if (!vlt::hook::Strikes(vlt::hook::kGetComponentsForBindingClass)) {
+    array = vltTaskMemAlloc(sizeBytes);
+  }
   if (!array) return vltReportOutOfMemory(kGetComponentsSignature);
   memcpy(array, found.begin(), sizeBytes);
   *components = static_cast<GUID*>(array);

@@ -21,6 +21,14 @@ wchar_t* AllocateText(size_t characters) {
 
 }  // namespace
 
+wchar_t* Dup(const wchar_t* text) {
+  if (!text) return nullptr;
+  size_t sizeBytes = (wcslen(text) + 1) * sizeof(wchar_t);
+  auto* copy = static_cast<wchar_t*>(vltTaskMemAlloc(sizeBytes));
+  if (copy) memcpy(copy, text, sizeBytes);
+  return copy;
+}
+
 HRESULT vltDuplicateString(const wchar_t* s, wchar_t** out) {
   if (!s || !out) return E_POINTER;
   wchar_t* copy = Dup(s);
@@ -31,7 +39,7 @@ HRESULT vltDuplicateString(const wchar_t* s, wchar_t** out) {
 
 HRESULT vltDuplicateString2(const wchar_t* s, wchar_t** out) {
   if (!s || !out) return E_POINTER;
-  wchar_t* copy = vltTestHook(vlt::hook::kDuplicateString2) ? nullptr : Dup(s);
+  wchar_t* copy = vlt::hook::Strikes(vlt::hook::kDuplicateString2) ? nullptr : Dup(s);
   if (!copy) {
     return vltReportOutOfMemory("HRESULT vltDuplicateString2(const wchar_t*, wchar_t**)");
   }
@@ -48,7 +56,8 @@ HRESULT vltAppendString2(wchar_t** buffer, const wchar_t* tail, size_t* capacity
   if (needed >= *capacity) {
     // Until one character more than needed fits, in whole steps.
     *capacity += ((needed - *capacity) / kAppendStep + 1) * kAppendStep;
-    wchar_t* grown = vltTestHook(vlt::hook::kAppendString2) ? nullptr : AllocateText(*capacity);
+    wchar_t* grown =
+        vlt::hook::Strikes(vlt::hook::kAppendString2) ? nullptr : AllocateText(*capacity);
     if (!grown) {
       return vltReportOutOfMemory("HRESULT vltAppendString2(wchar_t**, const wchar_t*, size_t*)");
     }

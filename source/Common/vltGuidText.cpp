@@ -17,7 +17,7 @@ HRESULT vltStringFromCLSID(const GUID* g, wchar_t** out) {
   zt::fnd::Guid(*g).toString(text);
   size_t sizeBytes = (text.length() + 1) * sizeof(wchar_t);
   wchar_t* copy = nullptr;
-  if (!vltTestHook(vlt::hook::kStringFromClsid)) {
+  if (!vlt::hook::Strikes(vlt::hook::kStringFromClsid)) {
     copy = static_cast<wchar_t*>(vltTaskMemAlloc(sizeBytes));
   }
   if (!copy) {

@@ -8,14 +8,6 @@
 #include "source/Common/vltcmn.h"
 #include "zt/fnd/osdep/StringCompare.h"
 
-wchar_t* Dup(const wchar_t* text) {
-  if (!text) return nullptr;
-  size_t sizeBytes = (wcslen(text) + 1) * sizeof(wchar_t);
-  auto* copy = static_cast<wchar_t*>(vltTaskMemAlloc(sizeBytes));
-  if (copy) memcpy(copy, text, sizeBytes);
-  return copy;
-}
-
 wchar_t* Dup(const char* text) {
   if (!text) return nullptr;
   size_t sizeBytes = (strlen(text) + 1) * sizeof(wchar_t);

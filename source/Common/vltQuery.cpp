@@ -130,7 +130,7 @@ HRESULT ReadFrame(IvltInputStream* stream, _vltQuery* query) {
 
 HRESULT MakeTerms(_vltQuery* query) {
   query->terms = nullptr;
-  if (!vltTestHook(vlt::hook::kMarshalQueryFromStream)) {
+  if (!vlt::hook::Strikes(vlt::hook::kMarshalQueryFromStream)) {
     query->terms = static_cast<_vltQueryTerm*>(
         AllocateZeroed(uint64_t{query->termCount} * sizeof(_vltQueryTerm)));
   }
@@ -261,7 +261,7 @@ HRESULT vltMarshalQueryFromStream(IvltInputStream* stream, _vltQuery* query) {
 
 HRESULT vltConvertQueryToString(const _vltQuery* query, wchar_t** text) {
   if (!query || !text) return E_POINTER;
-  if (vltTestHook(vlt::hook::kConvertQueryToString)) return ReportNoLine();
+  if (vlt::hook::Strikes(vlt::hook::kConvertQueryToString)) return ReportNoLine();
   Line line(query->termCount * kCharactersPerTerm + kCharactersOfFrame);
   if (!line) return ReportNoLine();
   line << Owned(vltGuidToString2(query->queryGuid)) << (query->tFlag ? L",t" : L",f")

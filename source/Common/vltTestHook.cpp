@@ -19,8 +19,6 @@ constinit std::atomic<bool> simulateMemoryAllocationFailure{false};
 constinit std::atomic<bool> simulateMemoryAllocationFailureAndThrow{false};
 constinit std::atomic<void (*)()> causeMemoryAllocationFailure{nullptr};
 constinit std::atomic<uint32_t> hangTimeInMSecs{vlt::hook::Faults::kForeverInMSecs};
-// Replaced whole, since another thread may be comparing with the old one.
-constinit std::atomic<const char*> currentHookName{""};
 
 // A copy that stays for good; one for each name, as a process may refresh as often as it likes.
 struct KeptNames {
@@ -38,8 +36,11 @@ const char* Kept(const std::string& name) {
 
 namespace vlt::hook {
 
+// Replaced whole, since another thread may be comparing with the old one.
+constinit std::atomic<const char*> armedName{""};
+
 void Arm(const std::string& name, const Faults& faults) {
-  currentHookName = Kept(name);
+  armedName = Kept(name);
   if (faults.crash) causeCrash = true;
   if (faults.hang) {
     // Before the flag: a thread that sees the flag waits for this time.
@@ -56,8 +57,8 @@ void Arm(const std::string& name, const Faults& faults) {
 }  // namespace vlt::hook
 
 extern "C" unsigned vltTestHook(const char* name) {
-  // No point has an empty name, so the usual process pays this one comparison.
-  const char* armed = currentHookName;
+  // No point has an empty name.
+  const char* armed = vlt::hook::armedName;
   if (!*armed || !name || strcmp(armed, name) != 0) return 0;
   if (causeHang) {
     zt::fnd::osdep::Sleep(hangTimeInMSecs);

@@ -6,6 +6,7 @@
 // An unarmed process pays one comparison with an empty name a point. Threads: any may pass a point;
 // arming while others do is safe, and seen by them at once or a little later.
 
+#include <atomic>
 #include <cstdint>
 #include <string>
 
@@ -18,6 +19,14 @@
 VLT_EXPORT unsigned vltTestHook(const char* name);
 
 namespace vlt::hook {
+
+// Empty in the usual process; for Strikes alone.
+extern std::atomic<const char*> armedName;
+
+// What the library asks at its own points: vltTestHook without a call in the usual process.
+inline bool Strikes(const char* hookPoint) {
+  return *armedName.load() && vltTestHook(hookPoint) != 0;
+}
 
 // What an armed point does. The members are in order of precedence.
 struct Faults {

@@ -25,7 +25,7 @@ inline constexpr AllocationPoint kJarPoint = {
 template <class Make>
 auto Allocate(const AllocationPoint& point, Make make) -> decltype(make()) {
   const char* hookPoint = point.hookPoint;
-  return vltTestHook(hookPoint) ? nullptr : make();
+  return hook::Strikes(hookPoint) ? nullptr : make();
 }
 
 }  // namespace vlt

@@ -120,11 +120,11 @@ TEST_F(Diagnostics, ThePointsInTheSourcesAreThoseOfTheList) {
   }
   EXPECT_EQ(points, kPoints);
   // Each call passes one of the names above, or what it was given of them.
-  std::regex call("vltTestHook\\(([^)]*)\\)");
+  std::regex call("(?:vltTestHook|Strikes)\\(([^)]*)\\)");
   for (std::sregex_iterator i(sources.begin(), sources.end(), call), end; i != end; ++i) {
     std::string argument = (*i)[1];
     EXPECT_TRUE(argument.starts_with("vlt::hook::k") || argument == "hookPoint" ||
-                argument == "const char* name")
+                argument == "const char* hookPoint" || argument == "const char* name")
         << argument;
   }
 }
