@@ -1,6 +1,7 @@
 // One pass over the directory, each entry judged by the cheapest test first: its first character,
 // the mask, the type that the listing gives for nothing, and only then calls of stat.
 #include <dirent.h>
+#include <wchar.h>
 
 #include <cerrno>
 #include <memory>
@@ -28,9 +29,21 @@ bool HasNoCase(wchar_t c) {
   return c < 0x80 && !(c >= L'a' && c <= L'z') && !(c >= L'A' && c <= L'Z');
 }
 
-bool SameCharacter(wchar_t a, wchar_t b) {
-  if (a == b) return true;
-  return !HasNoCase(a) && !HasNoCase(b) && StringCaseCompare(&a, &a + 1, &b, &b + 1) == 0;
+// Of a pattern's character that is no "*".
+bool FitsCharacter(wchar_t wanted, wchar_t c) {
+  if (wanted == c || wanted == L'?') return true;
+  return !HasNoCase(wanted) && !HasNoCase(c) &&
+         StringCaseCompare(&wanted, &wanted + 1, &c, &c + 1) == 0;
+}
+
+// A pattern without "*" that takes the last characters of the name.
+bool FitsEnd(const wchar_t* pattern, const wchar_t* name) {
+  size_t wanted = wcslen(pattern), length = wcslen(name);
+  if (length < wanted) return false;
+  for (name += length - wanted; *pattern != L'\0'; ++pattern, ++name) {
+    if (!FitsCharacter(*pattern, *name)) return false;
+  }
+  return true;
 }
 
 struct Mask {
@@ -76,21 +89,28 @@ bool SurelyNoDirectory(const dirent* entry) {
   return entry->d_type != DT_DIR && entry->d_type != DT_LNK && entry->d_type != DT_UNKNOWN;
 }
 
-void AddEntry(const Mask& mask, Flags flags, const dirent* entry, Vector<String>& found) {
+// `full` begins with the prefix, and is the same text for all entries.
+void AddEntry(const Mask& mask, Flags flags, const dirent* entry, String& full,
+              Vector<String>& found) {
   // Whatever the pattern: a walk that descends into what it finds would never end.
   if (IsDotOrDotDot(entry->d_name)) return;
   if (entry->d_name[0] == '.' && !Has(flags, Flags::Hidden)) return;
-  String name(entry->d_name);
-  if (!WildcardFit(mask.pattern.c_str(), name.c_str())) return;
-  String full(mask.prefix, name);
+  full.erase(mask.prefix.length(), String::npos, BufferStrategy::Keep);
+  full.append(entry->d_name);
+  if (!WildcardFit(mask.pattern.c_str(), full.c_str() + mask.prefix.length())) return;
+  if (!Has(flags, Flags::Directories | Flags::FollowLinks)) {
+    found.push_back(full);
+    return;
+  }
+  String listed(full);
   if (Has(flags, Flags::Directories)) {
-    if (SurelyNoDirectory(entry) || !path::IsDirectory(full.c_str())) return;
-    path::MakePathEndInSlash(full);
+    if (SurelyNoDirectory(entry) || !path::IsDirectory(listed.c_str())) return;
+    path::MakePathEndInSlash(listed);
   }
-  if (Has(flags, Flags::FollowLinks) && path::IsSymLink(full.c_str())) {
-    full = path::ResolveSymLink(full);
+  if (Has(flags, Flags::FollowLinks) && path::IsSymLink(listed.c_str())) {
+    listed = path::ResolveSymLink(listed);
   }
-  found.push_back(full);
+  found.push_back(listed);
 }
 
 Vector<String> List(const String& text, Flags flags, Errors errors) {
@@ -103,7 +123,8 @@ Vector<String> List(const String& text, Flags flags, Errors errors) {
     if (errors == Errors::Thrown) ZT_RAISE(PosixError());
     return found;
   }
-  while (const dirent* entry = NextEntry(dir.get())) AddEntry(mask, flags, entry, found);
+  String full(mask.prefix);
+  while (const dirent* entry = NextEntry(dir.get())) AddEntry(mask, flags, entry, full, found);
   // Without flags a listing that breaks off returns what it has, as it returns nothing for a
   // directory that cannot be opened.
   if (errno != 0 && errors == Errors::Thrown) ZT_RAISE(PosixError());
@@ -125,7 +146,9 @@ bool WildcardFit(const wchar_t* pattern, const wchar_t* name) {
     if (*pattern == L'*') {
       star = ++pattern;
       resume = name;
-    } else if (*pattern != L'\0' && (*pattern == L'?' || SameCharacter(*pattern, *name))) {
+      // What follows the last one of all is the end of the name.
+      if (!wcschr(star, L'*')) return FitsEnd(star, name);
+    } else if (*pattern != L'\0' && FitsCharacter(*pattern, *name)) {
       ++pattern;
       ++name;
     } else if (star) {

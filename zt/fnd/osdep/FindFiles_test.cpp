@@ -3,9 +3,11 @@
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 #include <unistd.h>
+#include <wchar.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <random>
 #include <string>
 #include <vector>
 
@@ -14,6 +16,7 @@
 #include "tests/support/TempDir.h"
 #include "zt/fnd/Exception.h"
 #include "zt/fnd/osdep/OSException.h"
+#include "zt/fnd/osdep/StringCompare.h"
 #include "zt/fnd/osdep/path.h"
 
 namespace zt::fnd::osdep {
@@ -188,6 +191,34 @@ TEST(FindFilesWildcard, Table) {
   for (const auto& row : rows) {
     EXPECT_EQ(row.fits, WildcardFit(row.pattern, row.name)) << String(row.pattern).length();
   }
+}
+
+// The rule as it is worded: a "*" takes any run of characters, none first.
+bool PlainFit(const wchar_t* pattern, const wchar_t* name) {
+  if (*pattern == L'*') {
+    return PlainFit(pattern + 1, name) || (*name != L'\0' && PlainFit(pattern, name + 1));
+  }
+  if (*name == L'\0') return *pattern == L'\0';
+  bool fits = *pattern == L'?' || StringCaseCompare(pattern, pattern + 1, name, name + 1) == 0;
+  return fits && PlainFit(pattern + 1, name + 1);
+}
+
+TEST(FindFilesWildcard, RandomPatternsFitAsByThePlainRule) {
+  std::minstd_rand random(1);
+  auto text = [&](const wchar_t* alphabet, unsigned longest) {
+    std::wstring made(random() % (longest + 1), L'a');
+    for (wchar_t& c : made) c = alphabet[random() % wcslen(alphabet)];
+    return made;
+  };
+  int fitting = 0;
+  for (int i = 0; i < 100000; ++i) {
+    std::wstring pattern = text(L"aAb.*?*", 6), name = text(L"aBb.", 7);
+    bool fits = PlainFit(pattern.c_str(), name.c_str());
+    ASSERT_EQ(fits, WildcardFit(pattern.c_str(), name.c_str()))
+        << AnsiString(pattern.c_str()).c_str() << ' ' << AnsiString(name.c_str()).c_str();
+    fitting += fits;
+  }
+  EXPECT_GT(fitting, 10000);
 }
 
 // One that tried every split of the name would meet the child's deadline.
