@@ -64,10 +64,12 @@ bool IsCurrentExactly(const Doc* doc, const char* name) {
   return doc->currentSection && strcmp(doc->currentSection->name, name) == 0;
 }
 
-// By the engine's rule.
+// By the engine's rule, and ahead of others of the same name: where there is none, the index finds
+// it as well.
 bool IsCurrent(const Doc* doc, const WantedName& wanted) {
   const IniSection* current = doc->currentSection;
-  return current && !doc->caseSensitive && wanted.is(current->name, strlen(current->name));
+  return current && !doc->caseSensitive && !doc->sections.isKnownAsOnlyOne(current) &&
+         wanted.is(current->name, strlen(current->name));
 }
 
 int32_t Give(const char* text, const char** out) {

@@ -120,6 +120,21 @@ TEST(Lookup, EqualNamesFindTheFirstUnlessAnotherOneWasAskedForByNumber) {
   EXPECT_EQ(RawValue(doc, "s", "x"), "first");
 }
 
+// As above, in a list that has an index, and by another spelling.
+TEST(Lookup, OfEqualNamesInALongListTheOneAskedForByNumberIsFound) {
+  std::string text;
+  for (int i = 0; i < 40; ++i) text += "[Name" + std::to_string(i) + "]\nK=1\n";
+  Document doc = Parse(text + "[Twin]\nK=first\n[TWIN]\nK=second\n", 2, 0);
+  EXPECT_EQ(RawValue(doc, "twin", "K"), "first");
+  const char* name = nullptr;
+  ASSERT_EQ(IniNthSectionName(doc.get(), 42, &name), 1);
+  EXPECT_EQ(RawValue(doc, " twin ", "K"), "second");
+  EXPECT_EQ(RawValue(doc, "name7", "K"), "1");
+  EXPECT_EQ(RawValue(doc, "twin", "K"), "first");
+  ASSERT_EQ(IniRemoveSection(doc.get(), "twin"), 1);
+  EXPECT_EQ(RawValue(doc, "twin", "K"), "second");
+}
+
 TEST(Lookup, ValuePointersOutliveOtherChanges) {
   Document doc = Sample();
   const char *value = nullptr, *name = nullptr;

@@ -90,19 +90,19 @@ bool NameIndex::grow() {
   return true;
 }
 
-size_t NameIndex::find(const NameFold& fold, NodesInOrder nodes, const char* name, uint32_t hash,
-                       bool* isExact) const {
+// In line: every look-up comes here.
+inline NameIndex::Place NameIndex::find(const NameFold& fold, NodesInOrder nodes, const char* name,
+                                        uint32_t hash) const {
   size_t at = hash & m_mask;
   for (; m_slots[at].head != kNoSequence; at = (at + 1) & m_mask) {
     const Slot& slot = m_slots[at];
     if (slot.hash != hash) continue;
     // The first node has the name of its whole chain.
-    const char* known = nodes.bySequence(slot.head)->name;
-    const bool same = strcmp(known, name) == 0;
-    if (isExact) *isExact = same;
-    if (same || SameFoldedName(fold, known, name)) break;
+    NameNode* first = nodes.bySequence(slot.head);
+    const bool isExact = strcmp(first->name, name) == 0;
+    if (isExact || SameFoldedName(fold, first->name, name)) return {at, {first, isExact}};
   }
-  return at;
+  return {at, {nullptr, false}};
 }
 
 bool NameIndex::insert(const NameFold& fold, NodesInOrder nodes, NameNode* node, NameHash known) {
@@ -112,7 +112,7 @@ bool NameIndex::insert(const NameFold& fold, NodesInOrder nodes, NameNode* node,
   }
   node->twin = 0;
   const uint32_t hash = ShortHash(fold, node->name, known);
-  Slot* slot = &m_slots[find(fold, nodes, node->name, hash)];
+  Slot* slot = &m_slots[find(fold, nodes, node->name, hash).slot];
   if (slot->head == kNoSequence) {
     *slot = {hash, node->sequence};
     ++m_used;
@@ -176,7 +176,7 @@ void NameIndex::linkInOrder(Slot* slot, uint32_t first, uint32_t added) {
 }
 
 void NameIndex::remove(const NameFold& fold, NodesInOrder nodes, NameNode* node) {
-  const size_t at = find(fold, nodes, node->name, ShortHash(fold, node->name));
+  const size_t at = find(fold, nodes, node->name, ShortHash(fold, node->name)).slot;
   Slot* slot = &m_slots[at];
   if (slot->head == kNoSequence) return;
   const uint32_t gone = node->twin;
@@ -220,10 +220,9 @@ void NameIndex::freeSlot(size_t at) {
   --m_used;
 }
 
-NameNode* NameIndex::chain(const NameFold& fold, NodesInOrder nodes, const char* name,
-                           NameHash known, bool* isExact) const {
-  const Slot& slot = m_slots[find(fold, nodes, name, ShortHash(fold, name, known), isExact)];
-  return slot.head == kNoSequence ? nullptr : nodes.bySequence(slot.head);
+NameIndex::Chain NameIndex::chain(const NameFold& fold, NodesInOrder nodes, const char* name,
+                                  NameHash known) const {
+  return find(fold, nodes, name, ShortHash(fold, name, known)).chain;
 }
 
 NameNode* NameIndex::nextSame(NodesInOrder nodes, const NameNode* node) const {

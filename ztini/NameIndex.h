@@ -89,10 +89,12 @@ class NameIndex {
   // Takes out a node that is in the index, before its name changes or goes.
   void remove(const NameFold& fold, NodesInOrder nodes, NameNode* node);
 
-  // First in order of the nodes with this name, or null. *isExact, if asked for: whether its name is
-  // the same byte by byte.
-  NameNode* chain(const NameFold& fold, NodesInOrder nodes, const char* name, NameHash hash = {},
-                  bool* isExact = nullptr) const;
+  // First in order of the nodes with this name, or null.
+  struct Chain {
+    NameNode* first;
+    bool isExact;  // its name is the same byte by byte
+  };
+  Chain chain(const NameFold& fold, NodesInOrder nodes, const char* name, NameHash hash = {}) const;
 
   // The next node in order with the same name, or null.
   NameNode* nextSame(NodesInOrder nodes, const NameNode* node) const;
@@ -110,8 +112,13 @@ class NameIndex {
     uint32_t prev;
   };
 
-  size_t find(const NameFold& fold, NodesInOrder nodes, const char* name, uint32_t hash,
-              bool* isExact = nullptr) const;
+  // Of a name: its slot with its chain, or the free one where it belongs with none.
+  struct Place {
+    size_t slot;
+    Chain chain;
+  };
+
+  Place find(const NameFold& fold, NodesInOrder nodes, const char* name, uint32_t hash) const;
   bool allocateSlots(size_t slots);
   bool full() const { return (m_used + 1) * 8 > (m_mask + 1) * 7; }
   bool grow();

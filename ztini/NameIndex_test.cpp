@@ -37,7 +37,8 @@ class Nodes {
 std::vector<NameNode*> Chain(const NameIndex& index, const NameFold& fold, NodesInOrder order,
                              const char* name) {
   std::vector<NameNode*> nodes;
-  for (NameNode* node = index.chain(fold, order, name); node; node = index.nextSame(order, node)) {
+  for (NameNode* node = index.chain(fold, order, name).first; node;
+       node = index.nextSame(order, node)) {
     nodes.push_back(node);
   }
   return nodes;
@@ -57,10 +58,10 @@ TEST(NameIndex, FindsNamesThroughGrowth) {
   }
   for (int i = 0; i < 1000; ++i) {
     const std::string query = "  nAME" + std::to_string(i) + "\t";
-    ASSERT_EQ(index.chain(fold, nodes.order(), query.c_str()), all[static_cast<size_t>(i)])
+    ASSERT_EQ(index.chain(fold, nodes.order(), query.c_str()).first, all[static_cast<size_t>(i)])
         << query;
   }
-  EXPECT_EQ(index.chain(fold, nodes.order(), "Name1000"), nullptr);
+  EXPECT_EQ(index.chain(fold, nodes.order(), "Name1000").first, nullptr);
 }
 
 TEST(NameIndex, EqualNamesChainInSequenceOrderHoweverTheyCome) {
@@ -97,7 +98,7 @@ TEST(NameIndex, RemovalKeepsTheOthersReachable) {
   for (size_t i = 0; i < all.size(); i += 3) index.remove(fold, nodes.order(), all[i]);
   for (size_t i = 0; i < all.size(); ++i) {
     NameNode* expected = i % 3 == 0 ? nullptr : all[i];
-    ASSERT_EQ(index.chain(fold, nodes.order(), all[i]->name), expected) << i;
+    ASSERT_EQ(index.chain(fold, nodes.order(), all[i]->name).first, expected) << i;
   }
 }
 

@@ -59,9 +59,9 @@ bool NameList::seek(const char* name, NameMatch match, NameNode** found, FoldSta
 }
 
 NameNode* NameList::findInIndex(const char* name, NameMatch match, NameHash hash) const {
-  bool isExact = false;
-  NameNode* node = m_index->chain(*m_fold, inOrder(), name, hash, &isExact);
-  if (node && isExact) return node;
+  const auto [first, isExact] = m_index->chain(*m_fold, inOrder(), name, hash);
+  if (isExact) return first;
+  NameNode* node = first;
   while (node && !Matches(*m_fold, match, node->name, name)) {
     node = m_index->nextSame(inOrder(), node);
   }

@@ -51,6 +51,9 @@ class NameList {
   // Whether find() compares the names one by one.
   bool isScanned() const { return !m_index && count() < kIndexFrom; }
 
+  // Whether the index knows that no other record has the name of this one of the list.
+  bool isKnownAsOnlyOne(const NameNode* node) const { return indexIsCurrent() && !node->twin; }
+
   // 1-based position of a record of the list.
   int32_t positionOf(const NameNode* node) const;
 
