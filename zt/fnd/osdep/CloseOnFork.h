@@ -45,7 +45,7 @@ class CloseOnForkFd {
   // Whether a child keeps its copy from here on, and owns it.
   void keepOnFork(bool keep) noexcept;
 
-  // Closes what this process owns, once. Keeps errno.
+  // Closes what this process owns, once; no child of that moment keeps a copy. Keeps errno.
   void reset() noexcept;
 
  private:

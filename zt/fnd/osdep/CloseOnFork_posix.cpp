@@ -146,9 +146,11 @@ void CloseOnForkFd::keepOnFork(bool keep) noexcept {
 void CloseOnForkFd::reset() noexcept {
   ScopedFd closes(get());
   if (valid() && m_process.isCurrent()) {
-    // Before the descriptor is closed, as its number may serve another file then.
+    // Both in one hold: the child of a fork between them would keep a descriptor without a mark, and
+    // its lock.
     Hold hold(s_lock);
     if (Mark* mark = FindMark(m_fd, m_serial)) *mark = Mark();
+    closes.reset();
   }
   m_fd = -1;
 }

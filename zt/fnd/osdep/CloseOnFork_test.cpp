@@ -28,6 +28,7 @@ namespace zt::fnd::osdep {
 namespace {
 
 using vlt::test::Child;
+using vlt::test::Eventually;
 using vlt::test::IsOpen;
 using vlt::test::PosixErrorOf;
 using vlt::test::ReusedDescriptor;
@@ -155,19 +156,24 @@ TEST(CloseOnFork, FailedOpenMarksNothing) {
 // Whatever the moment of the fork: no child keeps a lock that its parent's thread had.
 TEST(CloseOnFork, ForksAtAnyMomentLeaveNoLockBehind) {
   TempDir dir;
+  // Made once: a thread that allocates may leave a child the heap of a sanitizer locked.
+  const AnsiString path = Path(dir, "file");
   std::atomic<bool> stop{false};
+  std::atomic<int> turns{0};
   std::thread opener([&] {
     while (!stop) {
-      CloseOnForkFd fd = CloseOnForkFd::OpenShared(Path(dir, "file"));
-      Flock(fd.get(), LOCK_EX);
-      fd.keepOnFork(true);  // a child of this moment shares an open file that is unlocked next
-      Flock(fd.get(), LOCK_UN);
+      CloseOnForkFd fd = CloseOnForkFd::OpenShared(path);
+      Flock(fd.get(), LOCK_EX | LOCK_NB);  // a child has the last one until its handlers have run
+      fd.reset();                          // with its lock, which any copy would prolong
+      ++turns;
     }
   });
   vlt::test::Signal end;
   std::vector<Child> alive;
   alive.reserve(100);
-  for (int i = 0; i < 100; ++i) {
+  for (int seen = 0; alive.size() < 100; seen = turns) {
+    // On a busy machine all forks may otherwise come before the opener's first turn.
+    if (!Eventually([&] { return turns > seen; })) break;
     alive.emplace_back([&] {
       end.await();
       return 0;
@@ -175,9 +181,12 @@ TEST(CloseOnFork, ForksAtAnyMomentLeaveNoLockBehind) {
   }
   stop = true;
   opener.join();
+  EXPECT_EQ(100u, alive.size());
   ScopedFd other(::open((dir / "file").c_str(), O_RDWR | O_CLOEXEC));
-  EXPECT_EQ(0, Flock(other.get(), LOCK_EX | LOCK_NB));
-  for (int i = 0; i < 100; ++i) end.notify();
+  // Well before the children end by themselves.
+  EXPECT_TRUE(Eventually([&] { return Flock(other.get(), LOCK_EX | LOCK_NB) == 0; },
+                         vlt::test::kDeadlineMs / 3));
+  for (size_t i = 0; i < alive.size(); ++i) end.notify();
   for (Child& child : alive) EXPECT_EQ(0, child.wait());
 }
 
