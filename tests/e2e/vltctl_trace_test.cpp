@@ -142,6 +142,33 @@ TEST_F(VltctlTrace, OfAProcessThatHasEndedWithoutALogThereIsNone) {
   EXPECT_EQ(result.problems.at(0)["code"], "no-log");
 }
 
+// The places are shown all the same.
+TEST_F(VltctlTrace, WithoutFollowingALogThatIsMissingIsReported) {
+  const std::string pid = std::to_string(m_writer.pid());
+  ProgramResult runs = Vltctl({"trace", pid});
+  EXPECT_EQ(runs.exitCode, kNotFound);
+  EXPECT_NE(runs.out.find(m_logs), std::string::npos) << runs.out;
+  EXPECT_EQ(runs.err,
+            "vltctl: " + m_logs + ": there is no log of process " + pid +
+                ": it has traced nothing yet, or runs as another user, whose logs are elsewhere; "
+                "\"vltctl trace -f " +
+                pid + "\" waits for its first line\n");
+  m_writer.end();
+  JsonResult ended = VltctlJson({"trace", pid});
+  EXPECT_EQ(ended.exitCode, kNotFound);
+  EXPECT_EQ(ItemWith(ended.items, "name", "directory")["value"], m_logs);
+  EXPECT_EQ(ended.problems.at(0)["code"], "no-log");
+  EXPECT_EQ(ended.problems.at(0)["why"], "no process with this id runs");
+}
+
+// Of no process in particular there may be none.
+TEST_F(VltctlTrace, WithoutAPidThePlacesAreAllThereIs) {
+  ProgramResult result = Vltctl({"trace"});
+  EXPECT_EQ(result.exitCode, kGood);
+  EXPECT_NE(result.out.find(m_logs), std::string::npos) << result.out;
+  EXPECT_EQ(result.err, "");
+}
+
 TEST_F(VltctlTrace, AsJsonEachLineIsAnItem) {
   append(log(m_writer.pid()), "  one\n  two\n");
   RunningVltctl trace({"trace", "-f", "--json"});

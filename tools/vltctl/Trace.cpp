@@ -46,6 +46,19 @@ pid_t ProcessOf(const Arguments& arguments) {
                          "\"vltctl locks\" shows processes with locks"});
 }
 
+vltctl::Problem NoLog(const std::string& directory, pid_t process, bool hasEnded) {
+  const std::string id = std::to_string(process);
+  vltctl::Problem problem = {"no-log", directory, "there is no log of process " + id, "", ""};
+  if (hasEnded) {
+    problem.why = "no process with this id runs";
+    problem.next = "\"vltctl trace\" shows the newest log";
+  } else {
+    problem.why = "it has traced nothing yet, or runs as another user, whose logs are elsewhere";
+    problem.next = "\"vltctl trace -f " + id + "\" waits for its first line";
+  }
+  return problem;
+}
+
 // ---- Reading
 
 // A log that grows, is cut or is replaced while it is read.
@@ -161,12 +174,7 @@ std::string AwaitLog(const std::string& directory, pid_t process, ChangeWatch* w
     bool hasEnded = process != 0 && HasEnded(process);  // before the look: it may write at its end
     std::string name = NewestLog(directory, process);
     if (!name.empty()) return name;
-    if (hasEnded) {
-      throw vltctl::Failure(vltctl::kNotFound, {"no-log", directory,
-                                                "there is no log of process " +
-                                                    std::to_string(process) + ", which has ended",
-                                                "", "\"vltctl trace\" shows the newest log"});
-    }
+    if (hasEnded) throw vltctl::Failure(vltctl::kNotFound, NoLog(directory, process, hasEnded));
     if (isFirst) {
       output.note(directory + ": there is no log yet; a process makes it with its first line");
     }
@@ -208,9 +216,15 @@ int Trace(const Arguments& arguments, Output& output) {
                            Option(document, "Severity", "1"),
                            Option(document, "Target", "1"),
                            Option(document, "LowDiskThreshold", "0")};
-  std::string newest = NewestLog(directory, ProcessOf(arguments));
+  const pid_t process = ProcessOf(arguments);
+  const bool hasEnded = process != 0 && HasEnded(process);  // first, as in AwaitLog
+  std::string newest = NewestLog(directory, process);
   if (!newest.empty()) rows.push_back({"newest log", directory + newest, ""});
   Print(rows, output);
+  if (newest.empty() && process != 0) {
+    output.problem(NoLog(directory, process, hasEnded));
+    return vltctl::kNotFound;
+  }
   if (newest.empty() || output.json()) return vltctl::kGood;
   std::string changed;
   GrowingLog log(directory + newest);
