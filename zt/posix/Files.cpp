@@ -63,6 +63,11 @@ class Walk {
   int m_links = 0;
 };
 
+// A directory is not held where its caller may not enter it.
+ScopedFd CannotEnter(const Found& found) {
+  return Failure(S_ISDIR(found.unheld->st_mode) ? EACCES : ENOTDIR);
+}
+
 ScopedFd Walk::start(int at, const char* path) {
   if (!*path) return Failure(ENOENT);
   return *path == '/' ? HoldDirectory(AT_FDCWD, "/") : HoldDirectory(at, ".");
@@ -109,7 +114,7 @@ Found Walk::resolve(int at, const char* path, bool follow) {
     name[length] = 0;
     path += length;
     bool last = !*path;
-    if (!here.fd) return Failure(ENOTDIR);
+    if (!here.fd) return CannotEnter(here);
     here = step(here, name, follow || !last);
     // A slash at the end asks for a directory.
     struct stat info;
@@ -215,7 +220,7 @@ namespace {
 
 ScopedFd HoldForEntry(const char* path) {
   Found found = LookUp(path);
-  return found.unheld ? Failure(ENOTDIR) : std::move(found.fd);
+  return found.unheld ? CannotEnter(found) : std::move(found.fd);
 }
 
 }  // namespace

@@ -150,6 +150,21 @@ TEST(Files, PathsAreReadAsTheSystemReadsThem) {
   EXPECT_EQ(errno, ENAMETOOLONG);
 }
 
+TEST(Files, BelowADirectoryThatMayNotBeEnteredAllIsEACCES) {
+  TempDir dir;
+  chmod(dir.path().c_str(), 0777);
+  const std::string closed = dir.makeDir("closed");
+  WriteBytes(closed + "/file", "x");
+  chmod(closed.c_str(), 0);
+  Child child([&] {
+    if (geteuid() == 0 && setresuid(kUser, kUser, kUser) != 0) return 1;
+    if (OpenExisting((closed + "/file").c_str(), O_RDONLY) || errno != EACCES) return 2;
+    return !CreateNew((closed + "/new").c_str(), O_RDWR, 0666) && errno == EACCES ? 0 : 3;
+  });
+  EXPECT_EQ(child.wait(), 0);
+  chmod(closed.c_str(), 0700);
+}
+
 TEST(Files, WhatIsNoRegularFileIsNeverOpened) {
   TempDir dir;
   ASSERT_EQ(mkfifo((dir / "fifo").c_str(), 0666), 0);
