@@ -34,9 +34,8 @@ class InheritingChild {
 class InheritingProgram {
  public:
   InheritingProgram() {
-    if (pipe2(m_feed, O_CLOEXEC) != 0 || pipe2(m_output, O_CLOEXEC) != 0) {
-      throw std::system_error(errno, std::generic_category(), "pipe2");
-    }
+    Open(m_feed);
+    Open(m_output);
   }
   ~InheritingProgram() {
     for (int fd : {m_feed[0], m_feed[1], m_output[0], m_output[1]}) close(fd);
@@ -61,6 +60,18 @@ class InheritingProgram {
   }
 
  private:
+  // Above the standard streams, without which the test may have been started.
+  static void Open(int (&ends)[2]) {
+    int made[2];
+    if (pipe2(made, O_CLOEXEC) != 0) {
+      throw std::system_error(errno, std::generic_category(), "pipe2");
+    }
+    for (int i : {0, 1}) {
+      ends[i] = fcntl(made[i], F_DUPFD_CLOEXEC, STDERR_FILENO + 1);
+      close(made[i]);
+    }
+  }
+
   bool echoes() const {
     char byte;
     pollfd output = {m_output[0], POLLIN, 0};
