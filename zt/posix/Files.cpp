@@ -168,17 +168,22 @@ Found LookUp(const char* path, bool follow) {
 }
 
 ScopedFd OpenExisting(const char* path, int flags, Kind kind, LastLink link) {
-  Found found = LookUp(path, link == LastLink::Judged);
-  struct stat info;
-  if (!found.examine(&info)) return ScopedFd();
-  // Only with LastLink::Refused: LookUp has followed all others.
-  if (S_ISLNK(info.st_mode)) return Failure(ELOOP);
-  if (S_ISDIR(info.st_mode)) {
-    if (kind != Kind::FileOrDirectory) return Failure(EISDIR);
-  } else if (!S_ISREG(info.st_mode)) {
-    return Failure(ENXIO);
+  for (int race = 0; race < kMostRaces; ++race) {
+    Found found = LookUp(path, link == LastLink::Judged);
+    struct stat info;
+    if (!found.examine(&info)) return ScopedFd();
+    // Only with LastLink::Refused: LookUp has followed all others.
+    if (S_ISLNK(info.st_mode)) return Failure(ELOOP);
+    if (S_ISDIR(info.st_mode)) {
+      if (kind != Kind::FileOrDirectory) return Failure(EISDIR);
+    } else if (!S_ISREG(info.st_mode)) {
+      return Failure(ENXIO);
+    }
+    ScopedFd fd = Reopen(found, path, flags);
+    // ELOOP: without /proc, where another file has taken the place; it is judged in its turn.
+    if (fd || errno != ELOOP) return fd;
   }
-  return Reopen(found, path, flags);
+  return Failure(ELOOP);
 }
 
 ScopedFd CreateNew(const char* path, int flags, mode_t mode) {

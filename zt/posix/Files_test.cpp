@@ -8,6 +8,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstring>
 #include <string>
 
 #include "tests/support/Child.h"
@@ -163,6 +164,25 @@ TEST(Files, BelowADirectoryThatMayNotBeEnteredAllIsEACCES) {
   });
   EXPECT_EQ(child.wait(), 0);
   chmod(closed.c_str(), 0700);
+}
+
+TEST(Files, AFileThatIsReplacedAllTheTimeIsOpened) {
+  TempDir dir;
+  const std::string file = dir / "file", other = dir / "other";
+  WriteBytes(file, "x");
+  vlt::test::Signal replaced;
+  Child replacer([&] {
+    for (bool isFirst = true;; isFirst = false) {
+      ScopedFd(open(other.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0666));
+      rename(other.c_str(), file.c_str());
+      if (isFirst) replaced.notify();
+    }
+    return 0;
+  });
+  ASSERT_TRUE(replaced.await());
+  for (int i = 0; i < 3000; ++i) {
+    ASSERT_TRUE(OpenExisting(file.c_str(), O_RDWR)) << i << ": " << strerror(errno);
+  }
 }
 
 TEST(Files, WhatIsNoRegularFileIsNeverOpened) {
