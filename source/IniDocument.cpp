@@ -150,16 +150,25 @@ bool IniDocument::Section::has(const char* item) const {
 }
 
 const char* IniDocument::Section::value(const char* item) const {
-  const IniEntry* entry = m_section ? IniFindFresh(m_document.m_ini, m_section, item) : nullptr;
+  return m_section ? decoded(IniFindFresh(m_document.m_ini, m_section, item)) : nullptr;
+}
+
+const char* IniDocument::Section::decoded(const IniEntry* entry) const {
   if (!entry || !entry->value) return nullptr;
   // Most values have no escapes: what is stored is the value.
   if (!m_document.m_useEscapes || !strchr(entry->value, '\\')) return entry->value;
-  const char* decoded = nullptr;
-  return IniGetPointerToString(m_document.m_ini, m_name, item, &decoded) == 1 ? decoded : nullptr;
+  const char* text = nullptr;
+  return IniGetPointerToString(m_document.m_ini, m_name, entry->name, &text) == 1 ? text : nullptr;
 }
 
 int IniDocument::Section::count() const { return m_section ? m_section->items.count() : 0; }
 
 const char* IniDocument::Section::itemName(int n) const {
   return IniEntryName(m_section ? m_section->item(n) : nullptr);
+}
+
+const char* IniDocument::Section::itemValue(int n) const {
+  const IniEntry* entry = m_section ? m_section->item(n) : nullptr;
+  if (!entry) return nullptr;
+  return m_section->items.isKnownAsOnlyOne(entry) ? decoded(entry) : value(entry->name);
 }

@@ -68,8 +68,12 @@ class IniDocument::Section {
   bool has(const char* item) const;
   int count() const;
   const char* itemName(int n) const;  // n as above
+  // What value() gives for that name: of several items of one name, that of the first.
+  const char* itemValue(int n) const;
 
  private:
+  const char* decoded(const IniEntry* entry) const;
+
   const IniDocument& m_document;
   const char* m_name;
   IniSection* m_section;

@@ -74,11 +74,35 @@ TEST(IniDocument, ASectionAnswersAsTheDocument) {
         const bool found = document.GetNthItemName(name, n, &item) == S_OK;
         const char* own = section.itemName(n);
         EXPECT_EQ(own != nullptr, found) << name << n;
+        const char* value = section.itemValue(n);
+        EXPECT_EQ(value != nullptr, found) << name << n;
         if (own) {
           EXPECT_EQ(own, item);
+          EXPECT_STREQ(value, section.value(own));
         }
       }
     }
+  }
+}
+
+// Long enough for an index, which knows most names as those of one item.
+TEST(IniDocument, AnItemsValueIsThatOfItsName) {
+  IniDocument document(true);
+  std::string text = "[s]\n";
+  for (int n = 0; n < 40; ++n)
+    text += "n" + std::to_string(n) + "=" + std::to_string(n) + "\\x41\n";
+  ASSERT_EQ(document.Parse(text), 0);
+  for (bool changed : {false, true}) {
+    const IniDocument::Section section(document, "s");
+    for (int n = 1; n <= section.count(); ++n) {
+      const std::string expected = section.value(section.itemName(n));
+      EXPECT_EQ(section.itemValue(n), expected);
+      EXPECT_NE(expected.find(changed && n == section.count() ? 'Z' : 'A'), std::string::npos) << expected;
+    }
+    document.EraseItem("s", "n20");
+    document.SetItem("s", "N7", "Z", false);
+    document.EraseItem("s", "n7");
+    document.SetItem("s", "n7", "Z", false);
   }
 }
 

@@ -9,6 +9,7 @@
 #include "source/Database/Scan.h"
 
 #include <stdio.h>
+#include <string.h>
 
 #include <charconv>
 #include <system_error>
@@ -51,21 +52,21 @@ struct Stamp {
     high = static_cast<uint32_t>(ticks >> 32);
   }
   std::string text() const { return Decimal(low) + " " + Decimal(high); }
-  bool isIn(const std::string& stored) const {
+  bool isIn(const char* stored) const {
     // As text() writes it: without the time that sscanf takes for a pattern.
-    const char* const end = stored.data() + stored.size();
+    const char* const end = stored + strlen(stored);
     auto read = [end](const char* from, uint32_t* number) {
       auto [after, error] = std::from_chars(from, end, *number);
       return error == std::errc() ? after : nullptr;
     };
     uint32_t first = 0, second = 0;
-    const char* const space = read(stored.data(), &first);
+    const char* const space = read(stored, &first);
     if (space && space != end && *space == ' ' && read(space + 1, &second) == end && first == low &&
         second == high) {
       return true;
     }
     unsigned long one = 0, other = 0;
-    return sscanf(stored.c_str(), "%lu %lu", &one, &other) == 2 && one == low && other == high;
+    return sscanf(stored, "%lu %lu", &one, &other) == 2 && one == low && other == high;
   }
 
   uint32_t low, high;
@@ -93,8 +94,8 @@ Scan::Scan(IniDocument& database) : m_database(database) {}
 
 bool Scan::isUpToDate(const std::string& file, const zt::fnd::AbsTime& time) {
   m_filesSeen.add(file);
-  std::string stored;
-  if (m_database.GetItem(kRegistrations, file.c_str(), &stored) < 0) return false;
+  const char* stored = IniDocument::Section(m_database, kRegistrations).value(file.c_str());
+  if (!stored) return false;
   // Any difference counts, not only a later time: a bundle that is replaced by an older one has
   // changed as well.
   return Stamp(time).isIn(stored);

@@ -34,7 +34,7 @@ std::vector<ContentsItem> ReadContents(const IniDocument& database) {
   items.reserve(static_cast<size_t>(count));
   for (int i = 0; i < count; ++i) {
     std::string name = contents.itemName(i + 1);
-    const char* found = contents.value(name.c_str());
+    const char* found = contents.itemValue(i + 1);
     std::string value = found ? found : "";
     bool piece = IsPiece(name);
     std::string component = piece ? BaseOf(name) : std::move(name);

@@ -3,6 +3,7 @@
 #include <wchar.h>
 
 #include <algorithm>
+#include <iterator>
 
 #include "source/Common/vltcmn.h"
 #include "zt/fnd/osdep/LocaleText.h"
@@ -24,12 +25,16 @@ std::string Narrow(const wchar_t* text) {
 
 GUID GuidOf(const char* text) {
   // All characters of a GUID are ASCII, which needs no conversion; others are bad as they are.
-  constexpr size_t kLongest = 38;
-  wchar_t wide[kLongest + 1] = {};
+  wchar_t wide[] = L"{00000000-0000-0000-0000-000000000000}";
+  constexpr size_t kLength = std::size(wide) - 1;
   const size_t length = strlen(text);
-  if (length > kLongest) return GUID_NULL;
-  std::transform(text, text + length, wide, [](char c) { return static_cast<unsigned char>(c); });
-  return vltGuidFromString2(wide);
+  const bool isBare = length == kLength - 2;
+  if (!isBare && length != kLength) return GUID_NULL;
+  std::transform(text, text + length, wide + (isBare ? 1 : 0),
+                 [](char c) { return static_cast<unsigned char>(c); });
+  GUID guid;
+  vltStringToGUID(wide, &guid);
+  return guid;
 }
 
 }  // namespace registrar
