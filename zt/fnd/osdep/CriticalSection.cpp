@@ -10,6 +10,8 @@
 #include <cerrno>
 #include <cstdint>
 
+#include "zt/fnd/osdep/AbandonedMutex.h"
+
 namespace zt::fnd::osdep {
 
 struct UnixCriticalSection::Block {
@@ -34,8 +36,12 @@ UnixCriticalSection::UnixCriticalSection() : m_block(new Block) {
 
 UnixCriticalSection::~UnixCriticalSection() {
   // A section whose owner never left it (the owner's lock was released by another thread) cannot be
-  // destroyed as a mutex; its memory alone is given back.
-  if (m_block->count.load(std::memory_order_relaxed) == 0) pthread_mutex_destroy(&m_block->mutex);
+  // destroyed as a mutex; its memory alone is given back, or left where the system still uses it.
+  if (m_block->count.load(std::memory_order_relaxed) == 0) {
+    pthread_mutex_destroy(&m_block->mutex);
+  } else if (!AbandonedMutexMayGo()) {
+    return;
+  }
   delete m_block;
 }
 
