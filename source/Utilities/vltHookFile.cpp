@@ -39,7 +39,7 @@ vlt::hook::Faults FaultsOf(const CvlIniMgr& ini) {
   faults.hang = IsTrue(ini, "Hang");
   std::string hangTime;
   if (ini.GetItem("Hook", "HangTime", &hangTime) >= 0) {
-    faults.hangTimeInMSecs = static_cast<uint32_t>(atol(hangTime.c_str()));
+    faults.hangTimeInMSecs = static_cast<uint32_t>(strtol(hangTime.c_str(), nullptr, 10));
   }
   faults.simulateMemoryAllocationFailure = IsTrue(ini, "SimulateMemoryAllocationFailure");
   faults.simulateMemoryAllocationFailureAndThrow =

@@ -38,6 +38,11 @@ constexpr int kEndpointLimit = 62101;
 // Twice around the circle: with a family that answers, every port may be in use.
 constexpr int kMostRounds = 400;
 
+// By strtol, since atoi leaves open what it returns for a number that is too large.
+int NumberIn(const std::string& text) {
+  return static_cast<int>(strtol(text.c_str(), nullptr, 10));
+}
+
 // <install>/Data/, whether it is there or not; empty without an install directory.
 String DataDirectory() {
   String root = vlt::layout::InstallRoot();
@@ -132,7 +137,7 @@ HRESULT vltGetServerCookieFromFile(int* out, String& dataDir) {
   return WithPreparedJar(dataDir, [&](const wchar_t* jar, CvlIniMgr& ini) {
     std::string value;
     HRESULT result = ini.GetItem(kCookieSection, kLastServerCookie, &value);
-    *out = result >= 0 ? atoi(value.c_str()) : 0;
+    *out = result >= 0 ? NumberIn(value) : 0;
     if (result >= 0) return result;
     return SetAndSave(jar, ini, kCookieSection, kLastServerCookie, "0");
   });
@@ -169,7 +174,7 @@ namespace {
 std::string TakeCandidate(CvlIniMgr& ini) {
   std::string value;
   int candidate = kFirstEndpoint;
-  if (ini.GetItem(kOfflineSection, kNextEndpoint, &value) >= 0) candidate = atoi(value.c_str());
+  if (ini.GetItem(kOfflineSection, kNextEndpoint, &value) >= 0) candidate = NumberIn(value);
   int next = candidate < kEndpointLimit - 1 ? candidate + 1 : kFirstEndpoint;
   ini.SetItem(kOfflineSection, kNextEndpoint, std::to_string(next).c_str(), false);
   return std::to_string(candidate);

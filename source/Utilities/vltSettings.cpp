@@ -80,7 +80,7 @@ class Settings {
 
   long number(const PlainNumber& row) const {
     std::string value;
-    return read(row.key, &value) ? atol(value.c_str()) : row.fallback;
+    return read(row.key, &value) ? strtol(value.c_str(), nullptr, 10) : row.fallback;
   }
 
  private:

@@ -6,6 +6,7 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <climits>
 #include <filesystem>
 #include <functional>
 #include <thread>
@@ -239,11 +240,37 @@ TEST_F(vltjar, AStoragesEntryIsItsEndpoint) {
             0);
 }
 
+// Numbers of the file, and what they are read as. The greatest long is cut like any other.
+constexpr struct {
+  const char* text;
+  int number;
+} kHostileNumbers[] = {{"2147483647", INT_MAX},
+                       {"99999999999999999999", static_cast<int>(LONG_MAX)},
+                       {"-99999999999999999999", static_cast<int>(LONG_MIN)},
+                       {"-5", -5},
+                       {"abc", 0}};
+
 TEST_F(vltjar, AHostileCounterOverflowsNothing) {
   makeData();
-  for (const char* value : {"2147483647", "99999999999999999999", "-5", "abc"}) {
-    WriteBytes(jar(), std::string("[OfflineStorageSection]\nNextEndpt=") + value + "\n");
-    EXPECT_EQ(run([] { return Endpoint(L"x") == "failed" ? 1 : 0; }), 0) << value;
+  for (const auto& row : kHostileNumbers) {
+    WriteBytes(jar(), std::string("[OfflineStorageSection]\nNextEndpt=") + row.text + "\n");
+    EXPECT_EQ(run([&] { return Endpoint(L"x") == std::to_string(row.number) ? 0 : 1; }), 0)
+        << row.text;
+  }
+}
+
+TEST_F(vltjar, AHostileCookieIsCut) {
+  makeData();
+  for (const auto& row : kHostileNumbers) {
+    WriteBytes(jar(), std::string("[CookieSection]\nLastServerCookie=") + row.text + "\n");
+    EXPECT_EQ(run([&] {
+                int cookie = 1;
+                String dataDir;
+                if (vltGetServerCookieFromFile(&cookie, dataDir) != S_OK) return 1;
+                return cookie == row.number ? 0 : 2;
+              }),
+              0)
+        << row.text;
   }
 }
 
