@@ -236,6 +236,8 @@ String path::ResolveSymLink(const String& path) {
   std::string text(static_cast<size_t>(info.st_size), '\0');
   ssize_t length = RetryEintr([&] { return ::readlink(narrow.c_str(), text.data(), text.size()); });
   if (length < 0) ZT_RAISE(PosixError());
+  // A link without a length, as of the process file system. Some C libraries report no error.
+  if (text.empty()) ZT_RAISE(PosixError(EINVAL));
   return String(text.data(), static_cast<String::size_type>(length));
 }
 
