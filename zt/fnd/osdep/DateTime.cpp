@@ -68,7 +68,17 @@ String Join(const String& first, const String& second) {
   return first.empty() || second.empty() ? first + second : first + L" " + second;
 }
 
-String Format(const tm& fields, const String& format) {
+// "%#S" prints what "%S" does, since a number has no case; not every strftime knows the flag.
+void DropFlagsOfSeconds(String& format) {
+  for (String::size_type i = 0; i + 2 < format.length(); ++i) {
+    if (format[i] != L'%') continue;
+    ++i;  // what follows begins no specification, as in "%%#S"
+    if (format[i] == L'#' && format[i + 1] == L'S') format.erase(i, 1);
+  }
+}
+
+String Format(const tm& fields, String format) {
+  DropFlagsOfSeconds(format);
   // strftime gives 0 both for a result that does not fit and for an empty one; both are the empty
   // text.
   char text[kTextSize];

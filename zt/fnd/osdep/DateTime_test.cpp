@@ -109,6 +109,12 @@ TEST(DateTimeText, FractionStandsBehindEverySecond) {
   EXPECT_EQ(L"25", Text(At(kSeconds, 0.5), L"%S", L"%M", 1).substr(0, 2)) << "not in the date";
 }
 
+TEST(DateTimeText, TheFlagOfSecondsChangesNothing) {
+  EXPECT_EQ(L"25", Text(At(kSeconds), L"", L"%#S", 0));
+  EXPECT_EQ(L"25 25", Text(At(kSeconds), L"%#S", L"%#S", 0)) << "in the date, too";
+  EXPECT_EQ(L"%#S%25", Text(At(kSeconds), L"", L"%%#S%%%#S", 0)) << "text that only looks like it";
+}
+
 TEST(DateTimeText, SeparatorComesFromTheLastArgument) {
   EXPECT_EQ(L"25.5", Text(At(kSeconds, 0.5), L"", L"%S", 1, 1));
   EXPECT_EQ(L"25,5", Text(At(kSeconds, 0.5), L"", L"%S", 1, 2));
