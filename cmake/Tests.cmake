@@ -14,6 +14,11 @@ set_target_properties(vlt_test_support PROPERTIES POSITION_INDEPENDENT_CODE OFF)
 target_compile_options(vlt_test_support PRIVATE -fPIE)
 # The library is what is to be fast, not what looks at it: a test compiles in half the time.
 target_compile_options(vlt_test_support PUBLIC $<$<CONFIG:RelWithDebInfo>:-O0>)
+# What tests copy to load it.
+add_library(vlt_test_module MODULE tests/support/modules/cosine.cpp)
+add_dependencies(vlt_test_support vlt_test_module)
+set_source_files_properties(tests/support/Modules.cpp PROPERTIES SKIP_PRECOMPILE_HEADERS ON
+  COMPILE_DEFINITIONS VLT_TEST_MODULE="$<TARGET_FILE:vlt_test_module>")
 if(VLT_PCH)
   target_precompile_headers(vlt_test_support PRIVATE <gtest/gtest.h> <algorithm> <atomic> <chrono>
     <filesystem> <fstream> <functional> <future> <iostream> <map> <memory> <set> <sstream> <string>

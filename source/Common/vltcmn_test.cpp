@@ -1,6 +1,5 @@
 #include "source/Common/vltcmn.h"
 
-#include <dlfcn.h>
 #include <gtest/gtest.h>
 
 #include <cmath>
@@ -9,6 +8,7 @@
 
 #include "source/Utilities/vltutils.h"
 #include "tests/support/Child.h"
+#include "tests/support/Modules.h"
 #include "tests/support/TempDir.h"
 
 namespace {
@@ -185,8 +185,7 @@ int CreateWith(const std::string& source) {
   auto built = vlt::test::RunProgram(command);
   EXPECT_EQ(built.exitCode, 0) << built.err;
   return vlt::test::Child([&] {
-           // Loaded by its path first: the bare name then means the same library.
-           if (!dlopen((dir / "libZT-RPC.so").c_str(), RTLD_NOW)) return 50;
+           if (!vlt::test::LoadForItsName(dir / "libZT-RPC.so")) return 50;
            GUID out = {};
            HRESULT result = vltCreateGuid(&out);
            if (result == S_OK) return vltCreateGuid(&out) == S_OK && out.Data1 == 7 ? 0 : 51;

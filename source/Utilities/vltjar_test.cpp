@@ -1,6 +1,5 @@
 #include "source/Utilities/vltjar.h"
 
-#include <dlfcn.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
@@ -22,6 +21,7 @@
 #include "tests/support/FailSystemCall.h"
 #include "tests/support/InChild.h"
 #include "tests/support/Installation.h"
+#include "tests/support/Modules.h"
 
 namespace {
 
@@ -173,8 +173,8 @@ class Identities {
                 "extern \"C\" int UuidCreate(unsigned* id) { static unsigned n; id[0] = ++n; "
                 "return 0; }\n");
   }
-  // For this process: what was loaded by its path is found by its name.
-  bool load() const { return dlopen((m_dir / "libZT-RPC.so").c_str(), RTLD_NOW) != nullptr; }
+  // For this process.
+  bool load() const { return LoadForItsName(m_dir / "libZT-RPC.so"); }
 
  private:
   TempDir m_dir;

@@ -9,8 +9,7 @@
 
 namespace vlt::test {
 
-// Compiles the C++ text to a shared object of this process's word size at the path. Once it is loaded by
-// that path, it is found by its bare name as well.
+// Compiles the C++ text to a shared object of this process's word size at the path, under that name.
 inline void BuildModule(const std::string& path, const std::string& source) {
   TempDir dir;
   WriteBytes(dir / "module.cpp", source);

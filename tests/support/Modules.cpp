@@ -1,24 +1,21 @@
 #include "tests/support/Modules.h"
 
 #include <dlfcn.h>
-#include <gtest/gtest.h>
 
-#include <cmath>
 #include <filesystem>
 #include <fstream>
+#include <system_error>
 
 namespace vlt::test {
+namespace {
+
+bool IsLoaded(const std::string& name) { return dlopen(name.c_str(), RTLD_NOW | RTLD_NOLOAD); }
+
+}  // namespace
 
 void MakeModule(const std::string& path) {
-  void* system = dlopen("libm.so.6", RTLD_NOW | RTLD_NOLOAD);
-  Dl_info info = {};
-  if (!system || !dladdr(dlsym(system, "cos"), &info)) {
-    ADD_FAILURE() << "the mathematics library cannot be found";
-    return;
-  }
-  std::filesystem::copy_file(info.dli_fname, path,
+  std::filesystem::copy_file(VLT_TEST_MODULE, path,
                              std::filesystem::copy_options::overwrite_existing);
-  dlclose(system);
 }
 
 bool IsCosine(void* function) {
@@ -32,6 +29,21 @@ bool IsMapped(const std::string& path) {
     if (slash != std::string::npos && line.substr(slash) == path) return true;
   }
   return false;
+}
+
+bool LoadForItsName(const std::string& path) {
+  if (!dlopen(path.c_str(), RTLD_NOW)) return false;
+  const std::filesystem::path module = path;
+  if (IsLoaded(module.filename())) return true;
+  // musl knows a module by its bare name once it has found it by that name. Its row's programs search
+  // the directory "named" of the working directory.
+  const std::filesystem::path before = std::filesystem::current_path();
+  std::filesystem::current_path(module.parent_path());
+  std::error_code alreadyThere;
+  std::filesystem::create_directory_symlink(".", "named", alreadyThere);
+  const bool found = IsLoaded(module.filename());
+  std::filesystem::current_path(before);
+  return found;
 }
 
 }  // namespace vlt::test

@@ -19,6 +19,7 @@ namespace {
 
 using vlt::test::IsCosine;
 using vlt::test::IsMapped;
+using vlt::test::kUnloadsModules;
 using vlt::test::MakeModule;
 using vlt::test::TempDir;
 using vlt::test::Wide;
@@ -46,7 +47,7 @@ TEST(Bundle, OpensTheFirstModuleInsideThatLoads) {
         EXPECT_TRUE(IsCosine(bundle.getFunctionPointer(L"cos", false)));
         EXPECT_TRUE(IsMapped(module));
       }
-      EXPECT_FALSE(IsMapped(module));
+      EXPECT_EQ(IsMapped(module), !kUnloadsModules);
     }
   }
 }
@@ -65,7 +66,7 @@ TEST(Bundle, OrderInsideIsLibraryPlainBare) {
   MakeModule(dir / "X.bundle/libX.so");
   Bundle bundle(Wide(dir / "X"));
   EXPECT_TRUE(IsMapped(dir / "X.bundle/libX.so"));
-  EXPECT_FALSE(IsMapped(dir / "X.bundle/X.so"));
+  EXPECT_EQ(IsMapped(dir / "X.bundle/X.so"), !kUnloadsModules);
 }
 
 TEST(Bundle, WhatIsNoDirectoryIsNoBundle) {
@@ -113,7 +114,7 @@ TEST(Bundle, CopiesShareTheModule) {
     EXPECT_TRUE(copy.isOpened());
     EXPECT_TRUE(IsCosine(copy.getFunctionPointer(L"cos", false)));
   }
-  EXPECT_FALSE(IsMapped(dir / "X.bundle/libX.so"));
+  EXPECT_EQ(IsMapped(dir / "X.bundle/libX.so"), !kUnloadsModules);
 }
 
 }  // namespace
