@@ -91,6 +91,7 @@ constexpr struct {
 } kWaits[] = {
     {SYS_read, 0},
     {SYS_write, 1},
+    {SYS_writev, 20},
     {SYS_nanosleep, 35},
     {SYS_flock, 73},
     {SYS_futex, 202},

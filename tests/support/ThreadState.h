@@ -58,6 +58,10 @@ class WatchedThread {
   bool blocksIn(long systemCallNumber) const {
     return blocks([=](pid_t id) { return BlockedIn(id, systemCallNumber); });
   }
+  // In a write of a stream, which is one call or the other, by the C library.
+  bool blocksInWrite() const {
+    return blocks([](pid_t id) { return BlockedIn(id, SYS_write) || BlockedIn(id, SYS_writev); });
+  }
   bool fallsAsleep() const {
     return blocks([](pid_t id) { return Sleeps(id); });
   }

@@ -3,7 +3,6 @@
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/prctl.h>
-#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -81,7 +80,7 @@ TEST_IN_CHILD(vlTracerFork, ChildOfAForkDuringAWriteKeepsNoLock) {
   fcntl(ends[1], F_SETFL, 0);
   Start(dir.makeDir("logs"), vlTracer::kTargetError);
   WatchedThread writer([] { Say("stuck"); });
-  ASSERT_TRUE(writer.blocksIn(SYS_write));
+  ASSERT_TRUE(writer.blocksInWrite());
   // Not Child, which flushes the stream that the thread is inside.
   pid_t idle = fork();
   if (idle == 0) {

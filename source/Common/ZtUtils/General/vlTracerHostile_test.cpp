@@ -2,7 +2,6 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
-#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <ctime>
@@ -86,7 +85,7 @@ TEST(vlTracerHostile, TheEndDoesNotWaitForAWriteThatDoesNotEnd) {
               fcntl(ends[1], F_SETFL, 0);
               Start(vlTracer::kTargetError, nullptr);
               WatchedThread writer([] { vlt_vlTracer::TraceOutput(' ', "stuck", false); });
-              if (!writer.blocksIn(SYS_write)) return 2;
+              if (!writer.blocksInWrite()) return 2;
               WatchedThread waiter([] { vlt_vlTracer::TraceOutput(' ', "late", false); });
               if (!waiter.blocksInLock()) return 3;
               vlTracer::Cleanup();
