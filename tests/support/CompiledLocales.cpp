@@ -7,8 +7,13 @@
 #include <clocale>
 
 #include "tests/support/Child.h"
+#include "tests/support/PlainPosix.h"
 
 namespace vlt::test {
+
+std::string CompiledLocales::Missing() {
+  return kGlibc ? "" : "this C library does not read locales of the kind that localedef makes";
+}
 
 void CompiledLocales::make(const std::string& name, const std::string& charmap) const {
   std::string source = "LC_CTYPE\ncopy \"" + name + "\"\nEND LC_CTYPE\n";

@@ -14,6 +14,9 @@ namespace vlt::test {
 //   ... in a child: locales.use("tr_TR.UTF-8")
 class CompiledLocales {
  public:
+  // Why this system reads none of them; empty if it does.
+  static std::string Missing();
+
   // Makes "NAME.CHARMAP". Fails the test if the machine cannot (package "locales").
   void make(const std::string& name, const std::string& charmap) const;
 

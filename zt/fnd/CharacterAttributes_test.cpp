@@ -31,8 +31,13 @@ TEST(CharacterAttributes, NamedLocale) {
 }
 
 TEST(CharacterAttributes, UnknownNameRaisesWithTheReason) {
+  constexpr const char* kNone = "no_SUCH.locale";
+  if (locale_t taken = newlocale(LC_ALL_MASK, kNone, nullptr)) {
+    freelocale(taken);
+    GTEST_SKIP() << "NOT TESTED: this C library takes any name for a locale's";
+  }
   try {
-    const CharacterAttributes<char> none("no_SUCH.locale");
+    const CharacterAttributes<char> none(kNone);
     FAIL();
   } catch (const exception::InvalidArgument2& e) {
     EXPECT_EQ(strncmp(e.what(), "Invalid argument(s): ", 21), 0);

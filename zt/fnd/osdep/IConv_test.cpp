@@ -116,6 +116,11 @@ TEST(IConv, TheQuestionMarkIsOursWhereIConvWritesAnother) {
 }
 
 TEST(IConv, TransliterationIsNoSubstitution) {
+  const iconv_t known = iconv_open("US-ASCII//TRANSLIT", kWideEncoding);
+  if (known == reinterpret_cast<iconv_t>(-1)) {
+    GTEST_SKIP() << "NOT TESTED: this iconv knows no transliteration";
+  }
+  iconv_close(known);
   EXPECT_EQ("aEURb", ToNarrow(L"a\x20AC"
                               L"b",
                               "US-ASCII//TRANSLIT"));

@@ -1,5 +1,6 @@
 // The conversions by hand beside those of iconv, which they replace: the same for any input.
 #include <gtest/gtest.h>
+#include <iconv.h>
 
 #include <clocale>
 #include <random>
@@ -122,8 +123,27 @@ const std::vector<wchar_t>& HostileCharacters() {
   return characters;
 }
 
+// Whether the system's own iconv takes the present locale for UTF-8.
+bool SystemReadsUtf8() {
+  const iconv_t converter = iconv_open(kWideEncoding, "");
+  char bytes[] = "\xC2\x80";
+  wchar_t character = 0;
+  char* in = bytes;
+  char* out = reinterpret_cast<char*>(&character);
+  size_t inLeft = 2, outLeft = sizeof character;
+  iconv(converter, &in, &inLeft, &out, &outLeft);
+  iconv_close(converter);
+  return character == 0x80;
+}
+
 class LocaleTextIConv : public testing::TestWithParam<const char*> {
  protected:
+  void SetUp() override {
+    if (GetParam() == std::string("C") && SystemReadsUtf8()) {
+      GTEST_SKIP() << "NOT TESTED: this iconv takes the \"C\" locale for UTF-8";
+    }
+  }
+
   size_t below(size_t n) { return std::uniform_int_distribution<size_t>(0, n - 1)(m_random); }
 
   std::string bytes(size_t pieces) {
