@@ -97,7 +97,8 @@ TEST(IniDocument, AnItemsValueIsThatOfItsName) {
     for (int n = 1; n <= section.count(); ++n) {
       const std::string expected = section.value(section.itemName(n));
       EXPECT_EQ(section.itemValue(n), expected);
-      EXPECT_NE(expected.find(changed && n == section.count() ? 'Z' : 'A'), std::string::npos) << expected;
+      EXPECT_NE(expected.find(changed && n == section.count() ? 'Z' : 'A'), std::string::npos)
+          << expected;
     }
     document.EraseItem("s", "n20");
     document.SetItem("s", "N7", "Z", false);

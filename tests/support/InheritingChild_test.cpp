@@ -8,7 +8,7 @@
 namespace vlt::test {
 namespace {
 
-TEST(InheritingProgram, LivesUntilItsEnd) {
+TEST(InheritingChild, LivesUntilItsEnd) {
   Child child([] {
     InheritingProgram program;
     program.fork();
@@ -18,7 +18,7 @@ TEST(InheritingProgram, LivesUntilItsEnd) {
   EXPECT_EQ(child.wait(), 0);
 }
 
-TEST(InheritingProgram, NeedsNoStandardStreams) {
+TEST(InheritingChild, NeedsNoStandardStreams) {
   Child child([] {
     for (int fd : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) close(fd);
     InheritingProgram program;
