@@ -8,7 +8,7 @@
 namespace vlt::test {
 namespace {
 
-TEST(InheritingChild, LivesUntilItsEnd) {
+TEST(InheritingChild, ProgramLivesUntilItsEnd) {
   Child child([] {
     InheritingProgram program;
     program.fork();
@@ -18,7 +18,7 @@ TEST(InheritingChild, LivesUntilItsEnd) {
   EXPECT_EQ(child.wait(), 0);
 }
 
-TEST(InheritingChild, NeedsNoStandardStreams) {
+TEST(InheritingChild, ProgramNeedsNoStandardStreams) {
   Child child([] {
     for (int fd : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) close(fd);
     InheritingProgram program;
