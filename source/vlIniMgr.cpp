@@ -151,7 +151,8 @@ bool CvlIniMgr::Digest(int fd, Digested* of) {
   const int32_t length = GetFileLength(fd);
   if (length < 0) return false;
   of->sizeBytes = static_cast<size_t>(length);
-  of->bytes = std::make_unique_for_overwrite<unsigned char[]>(of->sizeBytes);
+  // Not by make_unique, which fills with zeros.
+  of->bytes.reset(new unsigned char[of->sizeBytes]);
   if (zt::fnd::osdep::BinaryFile::ReadExactSize(fd, of->bytes.get(), of->sizeBytes) < 0) {
     return false;
   }
