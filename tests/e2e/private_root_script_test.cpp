@@ -18,7 +18,7 @@ const std::string kScript = std::string(VLT_TEST_SOURCE) + "/tools/demo/private-
 class PrivateRootScript : public testing::Test {
  protected:
   void SetUp() override {
-    if (geteuid() != 0) GTEST_SKIP() << "only the superuser gets a root directory of its own";
+    if (geteuid() != 0) GTEST_SKIP() << "NOT TESTED: needs root, who alone gets a root directory";
     if (RunProgram({"unshare", "--mount", "--propagation", "unchanged", "true"}).exitCode != 0) {
       GTEST_SKIP() << "NOT TESTED: needs the right to mount";
     }

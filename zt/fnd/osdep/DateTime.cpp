@@ -72,7 +72,7 @@ String Join(const String& first, const String& second) {
 void DropFlagsOfSeconds(String& format) {
   for (String::size_type i = 0; i + 2 < format.length(); ++i) {
     if (format[i] != L'%') continue;
-    ++i;  // what follows begins no specification, as in "%%#S"
+    ++i;  // what follows begins no conversion, as in "%%#S"
     if (format[i] == L'#' && format[i + 1] == L'S') format.erase(i, 1);
   }
 }
