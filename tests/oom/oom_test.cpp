@@ -111,10 +111,12 @@ TEST_P(Oom, FirstCallsSurviveEveryFailedAllocation) {
   for (const Call& call : firsts) {
     Installation installation;
     MakeInstallation(installation);
+    TempDir workingDirectory;
     WriteBytes(g_root + "/vlttrace.txt", "1 2\n");
     long n = 0;
     for (int outcome = 0; outcome != kNoFailure; ++n) {
       Child first([&] {
+        if (chdir(workingDirectory.path().c_str()) != 0) return static_cast<int>(kFailsAfterwards);
         Outcome first = Attempt(call.run, n, GetParam());
         return call.run() < 0 ? kFailsAfterwards : static_cast<int>(first);
       });
