@@ -31,6 +31,7 @@
 #include "zt/fnd/osdep/path.h"
 #include "zt/posix/Files.h"
 #include "ztini/OpenFile.h"
+#include "ztini/Render.h"
 #include "ztini/ztini.h"
 
 using zt::fnd::AnsiString;
@@ -114,6 +115,7 @@ void CvlIniMgr::Initialize(unsigned char const* digest) {
   // What is read is what was validated, also if another file takes the name meanwhile.
   int32_t status = fd.valid() ? readDocument(fd.get()) : InitializeIniBindings();
   if (status != 0) CleanupAndThrow(ConcernsTheContents(status));
+  ztini::IniKeepSource(m_ini, std::move(m_validated.bytes));
   m_known = fd.valid() ? StateOf(fd.get()) : stateOfFile();
 }
 
@@ -150,13 +152,12 @@ void CvlIniMgr::GetMD5Checksum(const unsigned char* data, unsigned long lengthBy
 bool CvlIniMgr::Digest(int fd, Digested* of) {
   const int32_t length = GetFileLength(fd);
   if (length < 0) return false;
-  of->sizeBytes = static_cast<size_t>(length);
-  // Not by make_unique, which fills with zeros.
-  of->bytes.reset(new unsigned char[of->sizeBytes]);
-  if (zt::fnd::osdep::BinaryFile::ReadExactSize(fd, of->bytes.get(), of->sizeBytes) < 0) {
-    return false;
-  }
-  GetMD5Checksum(of->bytes.get(), of->sizeBytes, of->digest.data());
+  const auto sizeBytes = static_cast<size_t>(length);
+  char* bytes = of->bytes.fill(sizeBytes);
+  if (!bytes) throw std::bad_alloc();
+  if (zt::fnd::osdep::BinaryFile::ReadExactSize(fd, bytes, sizeBytes) < 0) return false;
+  of->sizeBytes = sizeBytes;
+  GetMD5Checksum(reinterpret_cast<const unsigned char*>(bytes), sizeBytes, of->digest.data());
   return true;
 }
 
@@ -172,16 +173,13 @@ bool CvlIniMgr::ValidateFile(int fd, unsigned char const* digest, Digested* vali
   });
 }
 
-// A start that finds nothing new saves what it has read. Comparing that is much quicker than MD5.
-// Of a text that begins as the last one, the digest goes on from there.
+// A start that finds nothing new saves what it has read, whose digest is known. Of a text that
+// begins as the last one, the digest goes on from there.
 IniSidecar::Digest CvlIniMgr::digestOf(const unsigned char* text, size_t sizeBytes,
                                        size_t unchangedBytes) {
   const Digested known = std::exchange(m_validated, Digested());
-  if (sizeBytes != 0 && known.sizeBytes == sizeBytes &&
-      memcmp(known.bytes.get(), text, sizeBytes) == 0) {
-    m_beginning = Beginning();
+  if (sizeBytes != 0 && sizeBytes == known.sizeBytes && sizeBytes == unchangedBytes)
     return known.digest;
-  }
   if (m_beginning.sizeBytes > unchangedBytes) m_beginning = Beginning();
   auto add = [text](Cmd5vlt* md5, size_t from, size_t to) {
     md5->addString(text + from, static_cast<unsigned>(to - from));
@@ -318,6 +316,9 @@ void CvlIniMgr::AbandonDocument() {
   m_dirty = false;
   m_lockWasLost = true;
   m_known = FileState();
+  // The other thread may have been taking a digest.
+  m_beginning = Beginning();
+  m_validated = Digested();
   InitializeIniBindings();
 }
 
@@ -342,8 +343,12 @@ HRESULT CvlIniMgr::writeDocument(IniSidecar::Digest* digest, bool* isInPlace) {
     *to->digest =
         to->of->digestOf(reinterpret_cast<const unsigned char*>(text), sizeBytes, unchangedBytes);
   };
-  // Of a text that is not digested nothing is known.
-  if (!digest) m_beginning = Beginning();
+  // Of a text that is not digested nothing is known, and no later one is compared with what was
+  // checked.
+  if (!digest) {
+    m_beginning = Beginning();
+    m_validated = Digested();
+  }
   int32_t status = IniWriteToFileAndTell(m_ini, m_fileName.c_str(), digest ? takeDigest : nullptr,
                                          &wanted, &m_known);
   *isInPlace = m_known.isKnown();

@@ -4,13 +4,13 @@
 #include <cstdint>
 #include <memory>
 #include <string>
-#include <vector>
 
 #include "source/Cmd5vlt.h"
 #include "source/Common/vltTypes.h"
 #include "source/IniDocument.h"
 #include "source/IniFileLock.h"
 #include "source/IniSidecar.h"
+#include "ztini/TextBuffer.h"
 #include "ztini/ztini.h"
 
 // The one door to a shared INI file.
@@ -106,7 +106,7 @@ class CvlIniMgr : public IniDocument {
   void CreateFile();
   // What a file held, and its digest.
   struct Digested {
-    std::unique_ptr<unsigned char[]> bytes;  // never filled with zeros first
+    ztini::TextBuffer bytes;
     size_t sizeBytes = 0;
     IniSidecar::Digest digest = {};
   };
@@ -133,8 +133,9 @@ class CvlIniMgr : public IniDocument {
   bool m_lockOnly;
   bool m_saveOnDestroy;
   IniDurability m_durability = IniDurability::Synced;
-  FileState m_known;     // of the file as it was last read or written
-  Digested m_validated;  // what the opening found good, until a write needs a digest
+  FileState m_known;  // of the file as it was last read or written
+  // What the opening found good, until a write; its bytes are the document's source.
+  Digested m_validated;
   // The digest of the beginning of what was written last.
   struct Beginning {
     size_t sizeBytes = 0;

@@ -6,10 +6,16 @@
 #include <sys/file.h>
 #include <unistd.h>
 
+#include <atomic>
+#include <chrono>
 #include <filesystem>
+#include <thread>
+#include <vector>
 
 #include "tests/support/Child.h"
 #include "tests/support/InChild.h"
+#include "tests/support/Installation.h"
+#include "tests/support/Sanitizer.h"
 #include "tests/support/TempDir.h"
 #include "tests/support/TestIni.h"
 #include "zt/posix/Files.h"
@@ -146,6 +152,50 @@ TEST_F(vlIniMgrFork, AnAbandonedDocumentIsReadAsSoonAsItsFileCanBe) {
   EXPECT_EQ(Save(*ini, "b", "2"), S_OK);
   ini.reset();
   expectOnDisk("a", "1");
+}
+
+// Forks while a thread takes the digest of its save: what it had digested so far is not the
+// beginning of what a child writes.
+TEST_F(vlIniMgrFork, ADigestThatAForkInterruptedDoesNotGoOnInTheChild) {
+  if (!kCanForkWhileThreadsAllocate) GTEST_SKIP() << "the sanitizer's allocator is not fork-safe";
+  ini.reset();
+  std::string bytes;
+  for (int n = 0; n < 8; ++n) {
+    bytes += "[s" + std::to_string(n) + "]\na = " + std::string(1u << 19, 'v') + "\n";
+  }
+  WriteBytes(file, bytes);
+  IniSidecar::Digest digest;
+  ASSERT_EQ(opened()->WriteAndGetDigest(&digest), S_OK);
+  ini.reset(new CvlIniMgr(file.c_str(), false, digest.data(), false, true));
+  ini->SetDurability(IniDurability::None);
+  ini->SetItem("z", "a", "1", false);
+
+  Signal freed;
+  std::atomic<bool> isSaved = false;
+  std::vector<Child> children;
+  std::thread save([&] {
+    EXPECT_EQ(ini->WriteAndGetDigest(&digest), S_OK);
+    isSaved = true;
+  });
+  while (!isSaved && children.size() < 8) {
+    children.emplace_back([&] {
+      if (!freed.await()) return 1;
+      ini->AbandonDocument();
+      if (!Eventually([&] { return ini->MakeSureOfLock() == S_OK; })) return 2;
+      const std::string value = std::to_string(getpid());
+      IniSidecar::Digest own;
+      ini->SetItem("z", "child", value.c_str(), false);
+      if (ini->WriteAndGetDigest(&own) != S_OK) return 3;
+      EXPECT_EQ(Hex(std::string(own.begin(), own.end())), Md5Sum(file));
+      ini.reset();
+      return 0;
+    });
+    std::this_thread::sleep_for(std::chrono::milliseconds(1));
+  }
+  save.join();
+  ini.reset();
+  for (size_t n = 0; n < children.size(); ++n) freed.notify();
+  for (Child& child : children) EXPECT_EQ(child.wait(), 0);
 }
 
 }  // namespace

@@ -111,9 +111,11 @@ struct IniStructForwardReferenceTag {
   // has this generation.
   bool settled = false;
   uint32_t settledFold = 0;
-  // The text of the last save, from which the next one copies the sections that have not changed;
-  // empty where there was none under these write options, and after the first save: most documents
-  // are saved once, if at all, and would hold a second copy of their text for nothing.
+  // What the next save is made from. Before the first one, the bytes that the document was read
+  // from, where the reader has left them (IniKeepSource): most are written again as they are. Later
+  // the text of the last save, from which the sections that have not changed are copied. Empty
+  // where there was none under these write options, and after the first save: most documents are
+  // saved once, if at all, and would hold a second copy of their text for nothing.
   ztini::TextBuffer rendering;
   bool wasSaved = false;  // since it was read
 

@@ -18,7 +18,16 @@ bool TextBuffer::fit(size_t length, size_t capacity) {
   (void)m_text.release();
   m_text.reset(static_cast<char*>(text));
   m_capacity = capacity;
+  m_text.get()[m_length] = 0;
   return true;
+}
+
+char* TextBuffer::fill(size_t sizeBytes) {
+  reset();
+  m_good = fit(sizeBytes, sizeBytes + 1);
+  if (!m_good) return nullptr;
+  cut(sizeBytes);
+  return m_text.get();
 }
 
 TextBuffer& TextBuffer::appendGrowing(std::string_view text) {

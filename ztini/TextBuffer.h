@@ -27,10 +27,7 @@ class TextBuffer {
   // Empty again, without its block.
   void reset() { *this = TextBuffer(); }
   // Empties the text and keeps its block. A failure stays.
-  void clear() {
-    m_length = 0;
-    if (m_text) m_text.get()[0] = 0;
-  }
+  void clear() { cut(0); }
   TextBuffer& append(std::string_view text) {
     if (!m_good || text.size() >= m_capacity - m_length) return appendGrowing(text);
     memcpy(m_text.get() + m_length, text.data(), text.size());
@@ -41,6 +38,14 @@ class TextBuffer {
   TextBuffer& append(char c) { return append(std::string_view(&c, 1)); }
   // "%04d": four digits, more from 10000.
   TextBuffer& appendNumber(unsigned number);
+
+  // Only the first so many bytes, at most all, stay.
+  void cut(size_t length) {
+    m_length = length;
+    if (m_text) m_text.get()[length] = 0;
+  }
+  // A text of so many bytes, which the caller writes; null, with the text empty, without memory.
+  char* fill(size_t sizeBytes);
 
   // Makes space for a text of so many bytes in all. Without memory for it, appending tries again.
   void reserve(size_t sizeBytes) {

@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdlib>
+#include <cstring>
 #include <string>
 
 #include "tests/support/FailingAlloc.h"
@@ -19,6 +21,39 @@ TEST(TextBuffer, AppendsTextCharactersAndNumbers) {
   buffer.append("z");
   EXPECT_STREQ(buffer.text(), "z");
   EXPECT_TRUE(buffer.ok());
+}
+
+TEST(TextBuffer, IsFilledByTheCallerCutAndGoesOn) {
+  TextBuffer buffer;
+  buffer.append("before");
+  char* bytes = buffer.fill(4);
+  ASSERT_NE(bytes, nullptr);
+  memcpy(bytes, "abcd", 4);
+  EXPECT_EQ(buffer.view(), "abcd");
+  buffer.cut(2);
+  EXPECT_STREQ(buffer.text(), "ab");
+  buffer.append("xyz");
+  EXPECT_STREQ(buffer.text(), "abxyz");
+  EXPECT_NE(buffer.fill(0), nullptr);
+  EXPECT_STREQ(buffer.text(), "");
+}
+
+TEST(TextBuffer, IsTerminatedInABlockThatNothingWasAppendedTo) {
+  // A block of this size that is not cleared, for the allocator to give again.
+  void* used = malloc(100);
+  memset(used, 'x', 100);
+  free(used);
+  TextBuffer buffer;
+  buffer.reserve(99);
+  EXPECT_STREQ(buffer.text(), "");
+}
+
+TEST(TextBuffer, WithoutMemoryItIsNotFilled) {
+  TextBuffer buffer;
+  ztini::test::FailFromAllocation fail(0);
+  EXPECT_EQ(buffer.fill(10), nullptr);
+  EXPECT_EQ(buffer.size(), 0u);
+  EXPECT_FALSE(buffer.ok());
 }
 
 TEST(TextBuffer, GrowsAsFarAsNeeded) {

@@ -36,13 +36,46 @@ class FunctionLines {
   ztini::TextBuffer m_line;
 };
 
+// Size of the block for a rendering after one of `sizeBytes`: a little more, and the same for many
+// renderings of which each is a little longer. An allocator gives a block of a size that was just
+// freed from what it has; a new size of its own comes from the system, page by page.
+size_t BlockFor(size_t sizeBytes) {
+  const size_t least = sizeBytes + sizeBytes / 64;
+  const size_t step = std::bit_floor(least) / 8 + 1;
+  return (least / step + 1) * step;
+}
+
+// Bytes that both texts begin with, in whole blocks.
+size_t SharedStart(std::string_view a, std::string_view b) {
+  constexpr size_t kBlock = 256;
+  const size_t end = std::min(a.size(), b.size());
+  size_t at = 0;
+  while (at + kBlock <= end && memcmp(a.data() + at, b.data() + at, kBlock) == 0) at += kBlock;
+  return at;
+}
+
 // Puts lines together in one text, as they are in a file. Sections that have not changed since the
 // rendering before, but for items added at their end, are copied from there, neighbours at once: a
 // save of a long document that differs in few places costs little more than its bytes.
+//
+// Of a document that was not saved yet, a few lines at a time are compared with the source that it
+// was read from. As long as they are the same they are not kept, and from the first difference on the
+// text goes on in the source's own block: most starts save what they have read, and need no second
+// block for it.
 class TextInMemory {
  public:
-  TextInMemory(ztini::TextBuffer* text, std::string_view before, bool marked)
-      : m_text(text), m_before(before), m_isFirst(!marked) {}
+  // `wasSaved`: `before` is the text of the last save, otherwise the source, or empty.
+  TextInMemory(ztini::TextBuffer* text, ztini::TextBuffer before, bool wasSaved, size_t sizeHint,
+               bool marked)
+      : m_text(text),
+        m_before(std::move(before)),
+        m_reuses(wasSaved && m_before.size()),
+        m_follows(!wasSaved && m_before.size()),
+        m_isFirst(!marked) {
+    const size_t whole = BlockFor(m_before.size() ? m_before.size() : sizeHint);
+    m_text->reserve(m_follows ? std::min(whole, kStepBytes + kStepBytes / 4) : whole);
+    if (marked) m_text->append(ztini::kUtf8Mark);
+  }
 
   ztini::TextBuffer& begin() {
     copyReused();
@@ -51,14 +84,16 @@ class TextInMemory {
   int32_t end() {
     if (m_isFirst) endFirst();
     m_text->append('\n');
-    return m_text->ok() && m_first.ok() ? 0 : kIniOutOfMemory;
+    if (!m_text->ok() || !m_first.ok()) return kIniOutOfMemory;
+    if (m_follows && m_text->size() >= kStepBytes) follow();
+    return m_text->ok() ? 0 : kIniOutOfMemory;
   }
 
   // Takes what was rendered of the section from the rendering before, if it is there.
   bool reuse(IniSection* section) {
     m_sectionAt = size();
     m_sectionIsFirst = m_isFirst;
-    if (m_isFirst || m_before.empty() || !section->renderedSize) return false;
+    if (m_isFirst || !m_reuses || !section->renderedSize) return false;
     const size_t at = section->renderedAt;
     if (at != m_reusedEnd) {
       copyReused();
@@ -78,18 +113,54 @@ class TextInMemory {
     section->renderedItems = section->items.count();
   }
 
-  int32_t finish() {
+  // *unchangedBytes: as IniRender's.
+  int32_t finish(size_t* unchangedBytes) {
     copyReused();
-    return m_text->ok() ? 0 : kIniOutOfMemory;
+    if (!m_text->ok()) return kIniOutOfMemory;
+    if (m_follows) follow();
+    if (m_follows) takeOverSource();
+    if (!m_text->ok()) return kIniOutOfMemory;
+    if (unchangedBytes)
+      *unchangedBytes = m_reuses ? SharedStart(m_before.view(), m_text->view()) : m_unchanged;
+    return 0;
   }
 
  private:
-  size_t size() const { return m_text->size() + (m_reusedEnd - m_reusedBegin); }
+  // Of text that is compared at once: it stays in the processor's first cache.
+  static constexpr size_t kStepBytes = 8192;
+
+  size_t size() const { return m_same + m_text->size() + (m_reusedEnd - m_reusedBegin); }
 
   void copyReused() {
     if (m_reusedEnd == m_reusedBegin) return;
-    m_text->append(m_before.substr(m_reusedBegin, m_reusedEnd - m_reusedBegin));
+    m_text->append(m_before.view().substr(m_reusedBegin, m_reusedEnd - m_reusedBegin));
     m_reusedBegin = m_reusedEnd;
+  }
+
+  void follow() {
+    if (m_before.view().substr(m_same).starts_with(m_text->view())) {
+      m_same += m_text->size();
+      m_text->clear();
+      return;
+    }
+    const size_t whole = BlockFor(m_before.size());
+    if (m_same == 0) {
+      m_follows = false;
+      m_before.reset();
+      m_text->reserve(whole);
+    } else {
+      m_before.reserve(whole);
+      takeOverSource();
+    }
+  }
+
+  // The text is what is the same in the source, and what was made since.
+  void takeOverSource() {
+    m_follows = false;
+    m_before.cut(m_same);
+    m_unchanged = std::exchange(m_same, 0);
+    m_before.append(m_text->view());
+    *m_text = std::move(m_before);
   }
 
   // A name may begin with the bytes of a byte order mark. As the first bytes of the file they would
@@ -102,7 +173,11 @@ class TextInMemory {
   }
 
   ztini::TextBuffer* m_text;
-  std::string_view m_before;
+  ztini::TextBuffer m_before;
+  bool m_reuses;   // from the text of the last save
+  bool m_follows;  // the source, whose first m_same bytes the text has, too
+  size_t m_same = 0;
+  size_t m_unchanged = 0;                     // m_same at the end of that
   size_t m_reusedBegin = 0, m_reusedEnd = 0;  // of m_before, not yet copied
   size_t m_sectionAt = 0;
   bool m_sectionIsFirst = false;
@@ -245,24 +320,6 @@ int32_t DocumentWriter<Lines>::endWithValue(ztini::TextBuffer& line, std::string
   return m_lines.end();
 }
 
-// Size of the block for a rendering after one of `sizeBytes`: a little more, and the same for many
-// renderings of which each is a little longer. An allocator gives a block of a size that was just freed from
-// what it has; a new size of its own comes from the system, page by page.
-size_t BlockFor(size_t sizeBytes) {
-  const size_t least = sizeBytes + sizeBytes / 64;
-  const size_t step = std::bit_floor(least) / 8 + 1;
-  return (least / step + 1) * step;
-}
-
-// Bytes that both texts begin with, in whole blocks.
-size_t SharedStart(std::string_view a, std::string_view b) {
-  constexpr size_t kBlock = 256;
-  const size_t end = std::min(a.size(), b.size());
-  size_t at = 0;
-  while (at + kBlock <= end && memcmp(a.data() + at, b.data() + at, kBlock) == 0) at += kBlock;
-  return at;
-}
-
 }  // namespace
 
 int32_t IniWrite(IniStructForwardReferenceTag* doc, IniLineOutputFunction output, void* stream) {
@@ -286,15 +343,14 @@ int32_t ztini::IniRender(IniStructForwardReferenceTag* doc, TextBuffer* text,
                          size_t* unchangedBytes) {
   const bool marked = (doc->writeOptions & kIniWriteMark) != 0;
   // The sections' places in it are overwritten one by one, so it serves once only.
-  const TextBuffer before = std::move(doc->rendering);
-  text->reserve(BlockFor(before.size() ? before.size() : doc->textSize));
-  if (marked) text->append(kUtf8Mark);
-  TextInMemory lines(text, before.view(), marked);
+  TextInMemory lines(text, std::move(doc->rendering), doc->wasSaved, doc->textSize, marked);
   const int32_t status = DocumentWriter(doc, &lines).write();
-  if (status < 0) return status;
-  const int32_t finished = lines.finish();
-  if (unchangedBytes) *unchangedBytes = SharedStart(before.view(), text->view());
-  return finished;
+  return status < 0 ? status : lines.finish(unchangedBytes);
+}
+
+void ztini::IniKeepSource(IniStructForwardReferenceTag* doc, TextBuffer bytes) {
+  // The text of a save has the sections' places.
+  if (!doc->wasSaved) doc->rendering = std::move(bytes);
 }
 
 int32_t ztini_IniWriteToFileHelper(IniStructForwardReferenceTag* doc, FILE* file) {

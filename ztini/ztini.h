@@ -242,7 +242,8 @@ struct IniFileState {
 IniFileState IniFileStateOf(const struct stat& status);
 
 // Takes all bytes of a file that is about to be put in place. So many of them at least, from the
-// first, are as they were in the document's last save; 0 where that is not known.
+// first, are as they were in the document's last save, or, at the first one, in the file that it was
+// read from; 0 where that is not known.
 using IniTextFunction = void (*)(void* context, const char* text, size_t sizeBytes,
                                  size_t unchangedBytes);
 

@@ -50,12 +50,12 @@ class CvltPharlapRegistrar::ScanHold {
 HRESULT CvltPharlapRegistrar::UpdateRegistrationFile() {
   String directory = m_installDirectory;
   path::MakePathEndInSlash(directory);
-  RegistrationFiles files;
-  FindRegistrationFiles(files);
+  std::optional<RegistrationFiles> files(std::in_place);
+  FindRegistrationFiles(*files);
   ScanHold scan(*this);
   // One save for each changed file: a start that is killed has merged what it has merged, and the
   // next one begins with the rest.
-  for (const auto& [wideFile, time] : files) {
+  for (const auto& [wideFile, time] : *files) {
     std::string file = Narrow(wideFile);
     if (scan->isUpToDate(file, time)) continue;
     bool opened = scan->openFragment(file);
@@ -67,6 +67,8 @@ HRESULT CvltPharlapRegistrar::UpdateRegistrationFile() {
     scan->setStamp(file, time);
     SaveChanges();
   }
+  // Of many bundles, the paths take as much memory as the components will.
+  files.reset();
   // After the merges: a component that moved from one file to another belongs to the new one by
   // now.
   HRESULT result = RemoveDeletedComponents();
