@@ -12,6 +12,7 @@
 #include <unistd.h>
 
 #include <filesystem>
+#include <vector>
 
 #include "bench/peers/Contest.h"
 #include "bench/peers/Parts.h"
@@ -31,6 +32,7 @@ int OpenLock(const char* name) {
 void RunLock() {
   zt::fnd::osdep::Mutex mutex{zt::fnd::String(L"peers")};
   int bare = OpenLock("bare.lock");
+  const std::string path = Place() + "/bare.lock";
   Run({"11",
        "named lock, taken and given back",
        [&] {
@@ -38,7 +40,11 @@ void RunLock() {
          mutex.unlock();
        },
        {{"flock", 1.3,
-         [=] { Require(flock(bare, LOCK_EX) == 0 && flock(bare, LOCK_UN) == 0, "flock"); }}}});
+         [=] { Require(flock(bare, LOCK_EX) == 0 && flock(bare, LOCK_UN) == 0, "flock"); }},
+        {"lstat of its path", 0, [=] {
+           struct stat info;
+           Require(lstat(path.c_str(), &info) == 0, "lstat");
+         }}}});
   close(bare);
 }
 
@@ -67,8 +73,10 @@ void RunLog() {
 
 void RunScan() {
   std::string experts = Place() + "/scan";
+  std::vector<std::string> paths;
   for (int i = 0; i < 1000; ++i) {
-    std::filesystem::create_directories(experts + "/Expert" + std::to_string(i) + ".vle");
+    paths.push_back(experts + "/Expert" + std::to_string(i) + ".vle");
+    std::filesystem::create_directories(paths.back());
   }
   zt::fnd::String directory(experts.c_str());
   Run({"15",
@@ -87,6 +95,12 @@ void RunScan() {
              stat((experts + "/" + entry->d_name).c_str(), &info);
            }
            closedir(dir);
+         }},
+        // All that the second half of the job has to ask, as it takes a path.
+        {"stat of ready paths", 0,
+         [paths] {
+           struct stat info;
+           for (const std::string& path : paths) Require(stat(path.c_str(), &info) == 0, "stat");
          }},
         {"opendir, fstatat", 1.2, [=] {
            DIR* dir = opendir(experts.c_str());
